@@ -1,0 +1,175 @@
+#include <cerrno>
+#include <fcntl.h>
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include "kor/fileNative.h"
+
+namespace tav::kor
+{
+namespace
+{
+static_assert(sizeof(off_t) == 8, "file offsets are 64-bit");
+
+struct ErrorCode
+{
+  int error;
+  uint32_t code;
+};
+
+constexpr ErrorCode kErrorCodes[] = {
+    {ENOENT, KOR_RC_NO_SUCH_FILE},
+    {ENOTDIR, KOR_RC_NOT_A_FOLDER},
+    {EISDIR, KOR_RC_IS_FOLDER},
+    {EEXIST, KOR_RC_FILE_EXISTS},
+    {EACCES, KOR_RC_NO_PERMISSION},
+    {EPERM, KOR_RC_NO_PERMISSION},
+    {EROFS, KOR_RC_READ_ONLY},
+    {ENAMETOOLONG, KOR_RC_BAD_NAME},
+    {ELOOP, KOR_RC_BAD_NAME},
+    {EILSEQ, KOR_RC_BAD_NAME},
+    {EMFILE, KOR_RC_TOO_MANY_FILES},
+    {ENFILE, KOR_RC_TOO_MANY_FILES},
+    {ENOSPC, KOR_RC_NO_SPACE},
+    {EDQUOT, KOR_RC_NO_SPACE},
+    {EFBIG, KOR_RC_FILE_TOO_LARGE},
+    {EOVERFLOW, KOR_RC_FILE_TOO_LARGE},
+    {EIO, KOR_RC_IO_ERROR},
+    {EPIPE, KOR_RC_IO_ERROR},
+    {EINTR, KOR_RC_IO_ERROR}, // of close alone, which cannot be repeated: the last writes may not have arrived
+    {EBADF, KOR_RC_NOT_OPEN},
+    {ESPIPE, KOR_RC_NOT_SEEKABLE},
+    {EWOULDBLOCK, KOR_RC_LOCKED}, // descriptors are never non-blocking: only a lock answers so
+    {EBUSY, KOR_RC_BUSY},
+    {ETXTBSY, KOR_RC_BUSY},
+    {ENOMEM, TAV_RC_NO_MEMORY},
+    {ENOSYS, TAV_RC_NOT_SUPPORTED},
+    {EOPNOTSUPP, TAV_RC_NOT_SUPPORTED},
+    {EFAULT, TAV_RC_BAD_PARAM},
+};
+
+uint32_t codeOf(int error)
+{
+  for (const ErrorCode& known : kErrorCodes)
+    if (known.error == error) return known.code;
+  return KOR_RC_OS_ERROR;
+}
+
+/// The code of a failed transfer or lock: the descriptor is our own, so it is the direction that does not fit.
+uint32_t transferCodeOf(int error)
+{
+  return error == EBADF ? KOR_RC_WRONG_ACCESS : codeOf(error);
+}
+
+/// Repeats a system call for as long as signals interrupt it.
+template<class Call>
+auto uninterrupted(Call call)
+{
+  auto result = call();
+  while (result < 0 && errno == EINTR) result = call();
+  return result;
+}
+
+int descriptor(intptr_t file)
+{
+  return static_cast<int>(file);
+}
+
+int accessOf(const OpenMode& mode)
+{
+  if (mode.read && mode.write) return O_RDWR;
+  return mode.write ? O_WRONLY : O_RDONLY;
+}
+
+int flagsOf(const OpenMode& mode)
+{
+  int flags = accessOf(mode) | O_CLOEXEC | O_NOCTTY;
+  if (mode.create) flags |= O_CREAT;
+  if (mode.truncate) flags |= O_TRUNC;
+  if (mode.exclusive) flags |= O_EXCL;
+  return flags;
+}
+} // namespace
+
+uint32_t openNative(const char* pPath, const OpenMode& mode, intptr_t& file)
+{
+  const auto permissions = static_cast<mode_t>(mode.permissions & 07777);
+  const int opened = uninterrupted([&] { return ::open(pPath, flagsOf(mode), permissions); });
+  if (opened < 0) return codeOf(errno);
+
+  // A folder can be opened for reading; only its reads would fail.
+  struct stat status = {};
+  uint32_t code = ::fstat(opened, &status) == 0 ? TAV_RC_OK : codeOf(errno);
+  if (code == TAV_RC_OK && S_ISDIR(status.st_mode)) code = KOR_RC_IS_FOLDER;
+  if (code == TAV_RC_OK)
+    file = opened;
+  else
+    ::close(opened);
+  return code;
+}
+
+uint32_t closeNative(intptr_t file)
+{
+  // Never repeated: the descriptor is free after a failure, and may be another file's by then.
+  return ::close(descriptor(file)) == 0 ? TAV_RC_OK : codeOf(errno);
+}
+
+uint32_t readSome(intptr_t file, void* bytes, std::size_t length, std::size_t& done)
+{
+  const ssize_t count = uninterrupted([&] { return ::read(descriptor(file), bytes, length); });
+  if (count < 0) return transferCodeOf(errno);
+  done = static_cast<std::size_t>(count);
+  return TAV_RC_OK;
+}
+
+uint32_t writeSome(intptr_t file, const void* bytes, std::size_t length, std::size_t& done)
+{
+  const ssize_t count = uninterrupted([&] { return ::write(descriptor(file), bytes, length); });
+  if (count < 0) return transferCodeOf(errno);
+  done = static_cast<std::size_t>(count);
+  return count == 0 ? KOR_RC_IO_ERROR : TAV_RC_OK;
+}
+
+uint32_t seekNative(intptr_t file, int64_t offset, uint64_t& position)
+{
+  const off_t landed = ::lseek(descriptor(file), offset, SEEK_SET);
+  if (landed < 0) return codeOf(errno);
+  position = static_cast<uint64_t>(landed);
+  return TAV_RC_OK;
+}
+
+uint32_t lockNative(intptr_t file, bool exclusive, bool wait, bool /*held*/)
+{
+  // flock belongs to the open file: it holds against other opens of this process too, and it is not lost
+  // when the process closes another descriptor of the same file.
+  const int operation = (exclusive ? LOCK_EX : LOCK_SH) | (wait ? 0 : LOCK_NB);
+  const int result = uninterrupted([&] { return ::flock(descriptor(file), operation); });
+  return result == 0 ? TAV_RC_OK : transferCodeOf(errno);
+}
+
+uint32_t unlockNative(intptr_t file)
+{
+  const int result = uninterrupted([&] { return ::flock(descriptor(file), LOCK_UN); });
+  return result == 0 ? TAV_RC_OK : codeOf(errno);
+}
+
+uint32_t sizeNative(intptr_t file, uint64_t& size)
+{
+  struct stat status = {};
+  if (::fstat(descriptor(file), &status) != 0) return codeOf(errno);
+  if (S_ISREG(status.st_mode))
+  {
+    size = static_cast<uint64_t>(status.st_size);
+    return TAV_RC_OK;
+  }
+
+  // Devices tell their size by their end only.
+  const off_t here = ::lseek(descriptor(file), 0, SEEK_CUR);
+  if (here < 0) return codeOf(errno);
+  const off_t end = ::lseek(descriptor(file), 0, SEEK_END);
+  if (end < 0 || ::lseek(descriptor(file), here, SEEK_SET) != here) return codeOf(errno);
+  size = static_cast<uint64_t>(end);
+  return TAV_RC_OK;
+}
+} // namespace tav::kor
