@@ -1,0 +1,51 @@
+/// @file dictionary.h
+/// The element dictionary: two names for an element id. Constant data, so any thread may look up at any time.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+
+/// One element. The id stands in a 64-bit slot of which only the low 16 bits count.
+struct TAVElementEntry
+{
+  uint64_t id;
+  const char* enumName;
+  const char* tagName;
+};
+
+/// One range of entries, sorted by ascending id. In a dense range the entry at index k has id `firstId` + k.
+struct TAVElementRange
+{
+  uint8_t dense;
+  uint16_t firstId;
+  uint64_t count;
+  const TAVElementEntry* pEntries;
+};
+
+namespace tav
+{
+
+/// Ranges in the directory, without the all-zero record that closes it.
+inline constexpr size_t kElementRangeCount = 10;
+
+/// Both names of an id without an entry.
+inline constexpr const char* kUnknownElement = "Unknown Element";
+
+/// The directory: kElementRangeCount ranges, then an all-zero record.
+const TAVElementRange* elementDirectory();
+
+/// The entry of an id within a range: by index when the range is dense, else by binary search.
+///
+/// @return the entry, or null when the range has none for `id`
+const TAVElementEntry* findInRange(const TAVElementRange& range, uint16_t id);
+
+/// The entry of an id, or null when no range has one. Cost: at most five comparisons and an index.
+const TAVElementEntry* findElement(uint16_t id);
+
+/// The enum name of an id, kUnknownElement when it has no entry. The string lives for ever.
+const char* elementEnumName(uint16_t id);
+
+/// The tag name of an id, kUnknownElement when it has no entry. The string lives for ever.
+const char* elementTagName(uint16_t id);
+
+} // namespace tav
