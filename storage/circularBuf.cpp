@@ -1,0 +1,385 @@
+/// Construction, chunks, writes and marks of the circular buffer. How pages come and go: circularPages.cpp.
+#include <algorithm>
+#include <cstring>
+
+#include "format/layout.h"
+#include "kor/traceFrame.h"
+#include "tav/probes.h"
+#include "tav/tav.h"
+
+using namespace tav;
+
+namespace
+{
+
+constexpr const char* kUnit = "tavCircularBuf";
+constexpr uint64_t kDefaultPageSize = 0x10000;
+constexpr uint64_t kSeekHint = 1;
+
+uint64_t pagesFor(uint64_t size, uint64_t pageSize)
+{
+  // Rounded down where rounding up would pass 64 bits.
+  return size > ~uint64_t{0} - (pageSize - 1) ? size / pageSize : unitsFor(size, pageSize);
+}
+
+/// The next smaller ring to try: a quarter less, and 1 page after 2 or 3.
+uint64_t fewerPages(uint64_t pages)
+{
+  return pages / 4 != 0 ? pages - pages / 4 : 1;
+}
+
+} // namespace
+
+TAVCircularBuf::TAVCircularBuf(TAVSideStorage* storage, uint64_t size, uint32_t* rc)
+    : status(TAV_RC_OK), pRing(nullptr), ringSize(0), head(0), tail(0), headOffset(0), pageSize(0), pageCount(0),
+      pPageFlags(nullptr), pStorage(storage), storageWritable(0), empty(1)
+{
+  TraceFrame frame(probe::circularBuf);
+  frame.dump(0, storage, size, rc);
+  if (frame.require(10, storage != nullptr && storage->getStatus() == TAV_RC_OK, TAV_RC_BAD_PARAM))
+  {
+    storageWritable = storage->hasAttributes(TAV_ATTR_WRITABLE) ? 1 : 0;
+    pageSize = storage->ioUnit != 0 ? storage->ioUnit : kDefaultPageSize;
+    if (frame.require(20, roundUp8Checked(pageSize), TAV_RC_BAD_PARAM))
+    {
+      pageCount = pagesFor(size, pageSize);
+      static_cast<void>(frame.require(30, pageCount != 0, TAV_RC_BAD_PARAM) && frame.step(40, allocate()));
+    }
+  }
+  status = frame.code();
+  if (rc != nullptr)
+  {
+    *rc = status;
+  }
+  frame.dump(100, pageSize, pageCount, ringSize);
+}
+
+/// Allocates ring and flags, with fewer and fewer pages while memory is short.
+uint32_t TAVCircularBuf::allocate()
+{
+  for (;;)
+  {
+    ringSize = pageCount * pageSize;
+    void* ring = nullptr;
+    uint32_t rc = korMemAlloc(&ring, 0, ringSize, KOR_MEM_PLAIN, kUnit, 156);
+    if (rc == TAV_RC_OK)
+    {
+      void* flags = nullptr;
+      rc = korMemAlloc(&flags, 0, 2 * pageCount, KOR_MEM_PLAIN, kUnit, 163);
+      if (rc == TAV_RC_OK)
+      {
+        pRing = static_cast<uint8_t*>(ring);
+        pPageFlags = static_cast<uint8_t*>(flags);
+        std::memset(pPageFlags, 0, 2 * pageCount);
+        return TAV_RC_OK;
+      }
+      korMemFree(&ring, 0, 0, kUnit, 169);
+    }
+    if (pageCount == 1)
+    {
+      pageCount = 0;
+      ringSize = 0;
+      return rc;
+    }
+    pageCount = fewerPages(pageCount);
+  }
+}
+
+TAVCircularBuf::~TAVCircularBuf()
+{
+  TraceFrame frame(probe::circularBufEnd);
+  if (!isEmpty())
+  {
+    static_cast<void>(frame.step(10, releasePages(pageCount, false)));
+  }
+  storageWritable = 0;
+  head = 0;
+  tail = 0;
+  pageSize = 0;
+  pageCount = 0;
+  ringSize = 0;
+  if (pRing != nullptr)
+  {
+    void* ring = pRing;
+    korMemFree(&ring, 0, 0, kUnit, 239);
+    pRing = nullptr;
+  }
+  if (pPageFlags != nullptr)
+  {
+    void* flags = pPageFlags;
+    korMemFree(&flags, 0, 0, kUnit, 244);
+    pPageFlags = nullptr;
+  }
+}
+
+uint32_t TAVCircularBuf::getChunk(uint64_t offset, uint64_t length, TAVCBUserArea* area, bool backward, bool copy)
+{
+  TraceFrame frame(probe::cbGetChunk);
+  frame.dump(0, offset, length, area, backward, copy);
+  if (!frame.require(10, area != nullptr, TAV_RC_BAD_PARAM) ||
+      !frame.require(20, !copy || area->pChunk != nullptr, TAV_RC_BAD_PARAM))
+  {
+    return frame.code();
+  }
+  uint64_t index = 0;
+  if (!indexOf(offset, index))
+  {
+    const uint32_t filled = fill(offset, unitsFor(length, pageSize), backward, Purpose::read);
+    const bool usable = filled == TAV_RC_OK || filled == TAV_RC_END_OF_STORAGE;
+    if (!frame.step(30, usable ? TAV_RC_OK : filled) ||
+        !frame.require(40, indexOf(offset, index), TAV_RC_END_OF_STORAGE))
+    {
+      return frame.code();
+    }
+  }
+  const uint8_t* first = pRing + index;
+  if (backward)
+  {
+    static_cast<void>(frame.step(50, cutBackward(offset, index, length, *area, first)));
+  }
+  else
+  {
+    area->chunkLength = std::min(length, index > tail ? ringSize - index : tail - index + 1);
+    area->chunkOffset = offset;
+  }
+  deliver(*area, first, copy);
+  frame.dump(100, trace::record(area));
+  return frame.code();
+}
+
+/// The chunk that ends at an index. Where it starts in the stream comes out of offsetOf, whose oddities stay.
+uint32_t TAVCircularBuf::cutBackward(uint64_t offset, uint64_t index, uint64_t length, TAVCBUserArea& area,
+                                     const uint8_t*& first) const
+{
+  uint64_t contiguous = index + 1;
+  if (head < index)
+  {
+    contiguous = index - head + 1;
+  }
+  else if (head == index)
+  {
+    contiguous = 1; // what stands before the first cached byte is not part of the stream
+  }
+  area.chunkLength = std::min(length, contiguous);
+  first = pRing + (index + 1 - area.chunkLength);
+  return offsetOf(offset, area.chunkOffset);
+}
+
+void TAVCircularBuf::deliver(TAVCBUserArea& area, const uint8_t* first, bool copy) const
+{
+  if (copy)
+  {
+    std::memcpy(area.pChunk, first, area.chunkLength);
+  }
+  else
+  {
+    area.pChunk = pRing + (first - pRing);
+  }
+}
+
+uint32_t TAVCircularBuf::write(uint64_t offset, const void* data, uint64_t size, bool direct)
+{
+  TraceFrame frame(probe::cbWrite);
+  frame.dump(0, offset, data, size, direct);
+  if (!frame.require(10, storageWritable != 0, TAV_RC_NOT_SUPPORTED) ||
+      !frame.require(20, data != nullptr, TAV_RC_BAD_PARAM) || !frame.require(30, size != 0, TAV_RC_BAD_PARAM))
+  {
+    return frame.code();
+  }
+  const auto* const bytes = static_cast<const uint8_t*>(data);
+  const bool large = size >= ringSize - pageSize;
+  uint64_t index = 0;
+  bool cached = indexOf(offset, index);
+  const uint64_t contiguous = !cached ? 0 : (index > tail ? ringSize - index : tail - index + 1);
+  if (!direct && !large && size > contiguous)
+  {
+    static_cast<void>(fill(offset, unitsFor(size, pageSize), false, Purpose::write));
+    cached = indexOf(offset, index);
+  }
+  if (cached)
+  {
+    static_cast<void>(frame.step(40, writeCached(index, offset, bytes, size, direct)));
+    return frame.code();
+  }
+  const bool overlaps = !isEmpty() && offset < headOffset && headOffset - offset < size;
+  if (frame.require(50, direct || large, TAV_RC_BAD_PARAM) &&
+      (!(large || overlaps) || frame.step(60, releasePages(pageCount, false))))
+  {
+    static_cast<void>(frame.step(70, writeStraight(offset, bytes, size)));
+  }
+  return frame.code();
+}
+
+/// Copies into the ring from an index on; what runs past the cached end goes straight to the storage.
+uint32_t TAVCircularBuf::writeCached(uint64_t index, uint64_t offset, const uint8_t* data, uint64_t size, bool direct)
+{
+  uint64_t copied = 0;
+  if (index > tail)
+  {
+    copied = std::min(size, ringSize - index);
+    std::memcpy(pRing + index, data, copied);
+    index = 0;
+  }
+  if (copied < size && index <= tail)
+  {
+    const uint64_t piece = std::min(size - copied, tail - index + 1);
+    std::memcpy(pRing + index, data + copied, piece);
+    copied += piece;
+  }
+  if (copied == size)
+  {
+    return TAV_RC_OK;
+  }
+  uint32_t rc = reset();
+  if (rc == TAV_RC_OK)
+  {
+    rc = writeStraight(offset + copied, data + copied, size - copied);
+    if (rc == TAV_RC_OK && !direct)
+    {
+      headOffset += size - copied;
+    }
+  }
+  return rc;
+}
+
+uint32_t TAVCircularBuf::writeStraight(uint64_t offset, const uint8_t* data, uint64_t size)
+{
+  uint32_t rc = seekStorage(offset);
+  if (rc == TAV_RC_OK)
+  {
+    uint64_t written = 0;
+    rc = pStorage->write(data, size, &written);
+    if (rc == TAV_RC_OK && written != size)
+    {
+      rc = TAV_RC_NO_MEMORY;
+    }
+  }
+  return rc;
+}
+
+/// Brings the storage's cursor to an offset; a storage that stands there already is left alone.
+uint32_t TAVCircularBuf::seekStorage(uint64_t offset)
+{
+  uint64_t position = 0;
+  const uint32_t rc = pStorage->getPosition(&position);
+  if (rc != TAV_RC_OK || position == offset)
+  {
+    return rc;
+  }
+  return pStorage->seek(offset, kSeekHint);
+}
+
+uint32_t TAVCircularBuf::reset()
+{
+  TraceFrame frame(probe::cbReset);
+  static_cast<void>(frame.step(10, releasePages(pageCount, false)));
+  return frame.code();
+}
+
+uint32_t TAVCircularBuf::reposition(uint64_t offset, int8_t adjustment, uint8_t pages)
+{
+  TraceFrame frame(probe::cbReposition);
+  frame.dump(0, offset, adjustment, pages);
+  if (frame.step(10, reset()))
+  {
+    const uint64_t from = offset + static_cast<uint64_t>(int64_t{adjustment});
+    static_cast<void>(frame.step(20, fill(from, pages, false, Purpose::read)));
+  }
+  return frame.code();
+}
+
+uint32_t TAVCircularBuf::markPages(uint64_t offset, uint64_t length)
+{
+  TraceFrame frame(probe::cbMarkPages);
+  frame.dump(0, offset, length);
+  if (!frame.require(10, storageWritable != 0, TAV_RC_NOT_SUPPORTED) || !frame.require(20, !isEmpty(), TAV_RC_BAD_PARAM))
+  {
+    return frame.code();
+  }
+  const uint64_t end = addSaturated(offset, length);
+  uint64_t index = head;
+  if (!(offset <= headOffset && headOffset <= end) && !frame.require(30, indexOf(offset, index), TAV_RC_BAD_PARAM))
+  {
+    return frame.code();
+  }
+  uint64_t page = pageOf(index);
+  const uint64_t last = indexOf(end, index) ? pageOf(index) : pageOf(tail);
+  pPageFlags[2 * page] = 1;
+  while (page != last && last < pageCount)
+  {
+    page = page + 1 < pageCount ? page + 1 : 0;
+    pPageFlags[2 * page] = 1;
+  }
+  return frame.code();
+}
+
+bool TAVCircularBuf::isCached(uint64_t offset) const
+{
+  uint64_t index = 0;
+  return indexOf(offset, index);
+}
+
+uint64_t TAVCircularBuf::cachedCount() const
+{
+  const TraceFrame frame(probe::cbCachedCount);
+  if (empty != 0)
+  {
+    return 0;
+  }
+  return head <= tail ? tail - head + 1 : tail + (ringSize - head) + 1;
+}
+
+bool TAVCircularBuf::isEmpty() const
+{
+  const TraceFrame frame(probe::cbIsEmpty);
+  return empty != 0;
+}
+
+/// The ring index of a stream offset; false when it is not cached.
+bool TAVCircularBuf::indexOf(uint64_t offset, uint64_t& index) const
+{
+  const TraceFrame frame(probe::cbOffsetToIndex);
+  if (isEmpty() || offset < headOffset || offset - headOffset >= cachedCount())
+  {
+    return false;
+  }
+  const uint64_t distance = offset - headOffset;
+  index = distance < ringSize - head ? head + distance : distance - (ringSize - head);
+  return true;
+}
+
+/// The mapping behind the chunkOffset of a backward chunk. It is given a stream offset where an index is meant, and
+/// its comparisons are chained; readers of such chunks have always seen these values.
+uint32_t TAVCircularBuf::offsetOf(uint64_t value, uint64_t& offset) const
+{
+  TraceFrame frame(probe::cbIndexToOffset);
+  frame.dump(0, value);
+  const uint64_t headReached = head <= value ? 1 : 0;
+  if (head < tail && headReached <= tail)
+  {
+    offset = headOffset - head + value;
+  }
+  else if (head > tail && value > tail && headReached < ringSize)
+  {
+    offset = headOffset - head + value;
+  }
+  else if (head > tail && value <= tail)
+  {
+    offset = headOffset + ringSize - head + value;
+  }
+  else if (value == (head == tail ? 1U : 0U))
+  {
+    offset = headOffset;
+  }
+  else
+  {
+    static_cast<void>(frame.fail(10, TAV_RC_CB_STATE));
+  }
+  return frame.code();
+}
+
+uint64_t TAVCircularBuf::pageOf(uint64_t index) const
+{
+  const TraceFrame frame(probe::cbPageOfIndex);
+  return index / pageSize;
+}

@@ -1,0 +1,42 @@
+#include "kor/traceFrame.h"
+#include "tav/probes.h"
+#include "tav/tav.h"
+
+using namespace tav;
+
+namespace
+{
+
+constexpr uint64_t kDefaultIoUnit = 0x10000;
+
+}
+
+TAVSideStorage::TAVSideStorage()
+    : TAVSideStorage(0, 0)
+{
+}
+
+TAVSideStorage::TAVSideStorage(uint32_t storageKind, uint64_t attributeBits)
+    : kind(storageKind), attributes(attributeBits), ioUnit(kDefaultIoUnit), status(TAV_RC_OK)
+{
+  const TraceFrame frame(probe::sideStorage);
+  frame.dump(0, kind, attributes);
+}
+
+TAVSideStorage::~TAVSideStorage()
+{
+  const TraceFrame frame(probe::sideStorageEnd);
+  status = TAV_STATUS_DESTROYED;
+}
+
+uint32_t TAVSideStorage::getStatus() const
+{
+  const TraceFrame frame(probe::ssGetStatus);
+  return status;
+}
+
+bool TAVSideStorage::hasAttributes(uint64_t mask) const
+{
+  const TraceFrame frame(probe::ssHasAttributes);
+  return (attributes & mask) >= mask;
+}
