@@ -1,0 +1,36 @@
+/// How bytes reach the stream: the one step under every writing operation.
+#pragma once
+
+#include <cstdint>
+
+#include "tav/tav.h"
+
+namespace tav
+{
+
+inline bool isDirect(const TAVHandle& handle)
+{
+  return (handle.options & TAV_OPT_DIRECT) != 0;
+}
+
+inline bool isReadOnly(const TAVHandle& handle)
+{
+  return (handle.options & TAV_OPT_READ) != 0;
+}
+
+/// Whether a run of bytes fits into the direct block: TAV_RC_END_OF_STORAGE when it would reach the block's last byte.
+uint32_t checkRoom(const TAVHandle& handle, uint64_t position, uint64_t length);
+
+/// Writes a run of bytes at `position`, which moves past it on success. No bytes are a success.
+uint32_t rawWrite(TAVHandle& handle, uint64_t& position, const void* bytes, uint64_t length);
+
+/// Writes the payload of a data element in the stream's byte order at `position`, which moves past what was written.
+uint32_t writePayload(TAVHandle& handle, uint64_t& position, uint16_t type, const uint8_t* payload, uint64_t size);
+
+/// The innermost open group; null when there is none or the handle keeps none.
+TAVHeader* openGroup(TAVHandle& handle);
+
+/// Whether a child may stand under the open group, or as a root where there is none.
+uint32_t validateChild(TAVHandle& handle, const TAVHeader& child);
+
+} // namespace tav

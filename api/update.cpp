@@ -1,0 +1,43 @@
+/// Overwriting a data element's payload in place.
+#include "api/rawWrite.h"
+#include "format/layout.h"
+#include "kor/traceFrame.h"
+#include "tav/probes.h"
+
+using namespace tav;
+
+namespace
+{
+
+bool isSameNode(const TAVHeader& a, const TAVHeader& b)
+{
+  return sizeOf(a) == sizeOf(b) && typeOf(a) == typeOf(b) && elmOf(a) == elmOf(b);
+}
+
+} // namespace
+
+uint32_t tavUpdateElement(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
+{
+  TraceFrame frame(probe::updateElement);
+  frame.dump(0, options, handle, "tav element data", trace::record(headerData));
+  if (!frame.require(10, handle != nullptr, TAV_RC_BAD_PARAM) ||
+      !frame.require(20, headerData != nullptr, TAV_RC_BAD_PARAM) ||
+      !frame.require(30, !isReadOnly(*handle), TAV_RC_WRONG_MODE) ||
+      !frame.require(40, options == 0, TAV_RC_BAD_OPTIONS) ||
+      !frame.require(50, !isGroup(headerData->header), TAV_RC_BAD_PARAM))
+  {
+    return frame.code();
+  }
+  const TAVHeader& header = headerData->header;
+  const uint64_t size = sizeOf(header);
+  TAVHeaderData stored{};
+  uint64_t position = header.nodeOffset + headerLength(header.hdrType);
+  if (frame.step(60, tavReadNodeInt(0, handle, header.nodeOffset, is64(header), &stored)) &&
+      frame.require(70, isSameNode(header, stored.header), TAV_RC_BAD_PARAM) &&
+      frame.require(80, headerData->pDataBuf != nullptr || size == 0, TAV_RC_BAD_PARAM) &&
+      frame.step(90, writePayload(*handle, position, typeOf(header), headerData->pDataBuf, size)))
+  {
+    frame.dump(100, position);
+  }
+  return frame.code();
+}

@@ -1,0 +1,122 @@
+/// Appending strings, and runs of nodes that are encoded already.
+#include "api/rawWrite.h"
+#include "format/layout.h"
+#include "kor/traceFrame.h"
+#include "tav/probes.h"
+
+using namespace tav;
+
+namespace
+{
+
+constexpr uint64_t kCodePageLength = sizeof(uint16_t);
+
+bool isStringType(uint16_t type, uint16_t codePage)
+{
+  return (type == TAV_TYPE_ASCII_STRING && codePage == TAV_CODE_PAGE_ASCII) || type == TAV_TYPE_UTF8_STRING;
+}
+
+void countCodePage(TAVHeader& header)
+{
+  if (is64(header))
+  {
+    header.hdr64.size += kCodePageLength;
+  }
+  else
+  {
+    header.hdr32.size += static_cast<uint32_t>(kCodePageLength);
+  }
+}
+
+uint32_t writeCodePage(TAVHandle& handle, uint64_t& position, uint16_t codePage)
+{
+  const uint16_t word = handle.swapBytes != 0 ? kor::byteswap16(codePage) : codePage;
+  return rawWrite(handle, position, &word, sizeof word);
+}
+
+/// What follows the header. A UTF-8 string's size counts the code page already, and that many bytes of text follow
+/// the code page: 2 more than counted. Its pair is in host order in either stream. Existing streams have it so.
+uint32_t writeText(TAVHandle& handle, const TAVHeader& header, uint64_t& position, const uint8_t* text,
+                   uint16_t codePage)
+{
+  const uint64_t size = sizeOf(header);
+  uint32_t rc = TAV_RC_OK;
+  if (typeOf(header) == TAV_TYPE_UTF8_STRING)
+  {
+    rc = writeCodePage(handle, position, codePage);
+  }
+  if (rc == TAV_RC_OK)
+  {
+    rc = rawWrite(handle, position, text, size);
+  }
+  if (rc != TAV_RC_OK)
+  {
+    return rc;
+  }
+  if (handle.alignMode == 1 && size % 8 != 0)
+  {
+    position += 8 - size % 8;
+  }
+  if (hasEyeSize(header))
+  {
+    const EyeSizeBytes pair = encodeEyeSize(dataDistance(size), false);
+    rc = rawWrite(handle, position, pair.data(), pair.size());
+  }
+  return rc;
+}
+
+} // namespace
+
+uint32_t tavAddString(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData, uint16_t codePage)
+{
+  TraceFrame frame(probe::addString);
+  frame.dump(0, options, handle, "Element header", trace::record(headerData), codePage);
+  if (!frame.require(10, handle != nullptr, TAV_RC_BAD_PARAM) ||
+      !frame.require(20, headerData != nullptr, TAV_RC_BAD_PARAM))
+  {
+    return frame.code();
+  }
+  TAVHeader& header = headerData->header;
+  const bool utf8 = typeOf(header) == TAV_TYPE_UTF8_STRING;
+  if (!frame.require(30, isStringType(typeOf(header), codePage), TAV_RC_BAD_PARAM) ||
+      !frame.step(40, validateChild(*handle, header)) ||
+      !frame.require(50, headerData->pDataBuf != nullptr || (!utf8 && sizeOf(header) == 0), TAV_RC_BAD_PARAM))
+  {
+    return frame.code();
+  }
+  if (utf8)
+  {
+    countCodePage(header);
+  }
+  uint64_t position = handle->streamBytes;
+  if (frame.step(60, tavWriteNodeInt(options, handle, &header, &position, nullptr, 0)) &&
+      frame.step(70, writeText(*handle, header, position, headerData->pDataBuf, codePage)))
+  {
+    handle->streamBytes = position;
+    frame.dump(100, position);
+  }
+  return frame.code();
+}
+
+uint32_t tavAddStream(uint64_t options, TAVHandle* handle, uint32_t hdrKind, uint8_t* bytes, uint64_t length)
+{
+  TraceFrame frame(probe::addStream);
+  frame.dump(0, options, handle, hdrKind, bytes, length);
+  if (!frame.require(10, handle != nullptr, TAV_RC_BAD_PARAM) ||
+      !frame.require(20, bytes != nullptr, TAV_RC_BAD_PARAM) ||
+      !frame.require(30, !isReadOnly(*handle), TAV_RC_WRONG_MODE) ||
+      !frame.require(40, options == 0, TAV_RC_BAD_OPTIONS) ||
+      !frame.require(50, hdrKind == TAV_HDR_32 || hdrKind == TAV_HDR_64, TAV_RC_BAD_PARAM))
+  {
+    return frame.code();
+  }
+  const TAVHeader* const group = openGroup(*handle);
+  uint64_t position = handle->streamBytes;
+  if (frame.require(60, group != nullptr && typeOf(*group) == hdrKind, TAV_RC_BAD_CHILD_HDR) &&
+      frame.step(70, rawWrite(*handle, position, bytes, length)))
+  {
+    handle->streamBytes = position;
+    frame.dump(100, position);
+  }
+  return frame.code();
+}
