@@ -1,0 +1,95 @@
+/// Reading the node at an offset.
+#include <algorithm>
+#include <array>
+
+#include "api/fetch.h"
+#include "api/rawWrite.h"
+#include "format/layout.h"
+#include "kor/traceFrame.h"
+#include "tav/probes.h"
+
+using namespace tav;
+
+namespace
+{
+
+uint32_t readBuffered(TAVHandle& handle, uint64_t offset, bool wide, TAVHeaderData& out)
+{
+  out.header.hdrType = wide ? TAV_HDR_64 : TAV_HDR_32;
+  const uint64_t length = headerLength(out.header.hdrType);
+  std::array<uint8_t, kHeaderSize64> bytes;
+  uint32_t rc = fetchBytes(*handle.pCircularBuf, offset, bytes.data(), length);
+  if (rc != TAV_RC_OK)
+  {
+    return rc;
+  }
+  decodeHeader(bytes.data(), wide, handle.swapBytes != 0, out.header);
+  if (isGroup(out.header))
+  {
+    return TAV_RC_OK;
+  }
+  const uint64_t size = sizeOf(out.header);
+  TAVCBUserArea area = areaOf(handle);
+  rc = fetchData(*handle.pCircularBuf, offset + length, size, area);
+  setArea(handle, area);
+  out.pDataBuf = area.pChunk;
+  out.dataBufSize = std::min(area.chunkLength, size);
+  out.dataBufOffset = 0;
+  return rc;
+}
+
+/// The room is what the block holds beyond the absolute offset, also when it begins elsewhere in the stream, and a
+/// 32-bit header of type 2 counts as a data element: both have always been so over direct memory.
+uint32_t readDirect(const TAVHandle& handle, uint64_t offset, bool wide, TAVHeaderData& out)
+{
+  out.header.hdrType = wide ? TAV_HDR_64 : TAV_HDR_32;
+  const uint64_t length = headerLength(out.header.hdrType);
+  uint64_t relative = 0;
+  if (!isInDirectData(handle, offset, relative) || offset > handle.directDataSize ||
+      handle.directDataSize - offset < length)
+  {
+    return TAV_RC_NO_MEMORY;
+  }
+  const uint8_t* const node = handle.pDirectData + relative;
+  decodeHeader(node, wide, handle.swapBytes != 0, out.header);
+  const bool group = wide ? isGroup(out.header) : out.header.hdr32.type == TAV_TYPE_HEADER32;
+  if (!group)
+  {
+    out.pDataBuf = handle.pDirectData + relative + length;
+    out.dataBufSize = handle.directDataSize - relative - length;
+    out.dataBufOffset = 0;
+  }
+  return TAV_RC_OK;
+}
+
+bool isDataWhole(const TAVHeaderData& node)
+{
+  return node.pDataBuf == nullptr || isGroup(node.header) || sizeOf(node.header) <= node.dataBufSize;
+}
+
+} // namespace
+
+uint32_t tavReadNodeInt(uint64_t options, TAVHandle* handle, uint64_t offset, bool is64, TAVHeaderData* out)
+{
+  TraceFrame frame(probe::readNode);
+  frame.dump(0, options, handle, offset, is64, out);
+  if (!frame.require(10, handle != nullptr, TAV_RC_BAD_PARAM) || !frame.require(20, out != nullptr, TAV_RC_BAD_PARAM))
+  {
+    return frame.code();
+  }
+  out->pDataBuf = nullptr;
+  out->dataBufSize = 0;
+  out->dataBufOffset = 0;
+  out->header.nodeOffset = offset;
+  const bool read =
+      isDirect(*handle)
+          ? frame.require(50, handle->pDirectData != nullptr, TAV_RC_NO_MEMORY) &&
+                frame.step(60, readDirect(*handle, offset, is64, *out))
+          : frame.require(30, handle->pCircularBuf != nullptr, TAV_RC_NO_CIRCULAR_BUF) &&
+                frame.step(40, readBuffered(*handle, offset, is64, *out));
+  if (read && frame.require(70, isDataWhole(*out), TAV_RC_DATA_TOO_LARGE))
+  {
+    frame.dump(100, trace::record(out));
+  }
+  return frame.code();
+}
