@@ -22,8 +22,8 @@ constexpr bool isLeapYear(uint64_t year)
   return (year % 4 == 0 && year % 100 != 0) || year % 400 == 0;
 }
 
-/// Year, month and day of a day count. The single correction for leap years is off by a day from February to the
-/// cycle's end and has no month for a cycle's last day; dates in existing texts are these.
+/// Year, month and day of a day count. The single correction for leap years leaves February of a leap year a day late,
+/// and a year's last day without a month or in the next year; dates in existing texts are these.
 void setDay(uint64_t days, TAVDate& date)
 {
   uint64_t shifted = days + kDaysToEpoch;

@@ -634,9 +634,10 @@ TAV_API uint32_t tavValidateSubtreeInt(uint64_t options, TAVHandle* handle, TAVH
 TAV_API uint32_t tavPrintSubtree(uint64_t options, TAVHandle* handle, TAVHeaderData* start, TAVPrintParam* param,
                                  uint64_t* bytesPrinted);
 
-/// Breaks a timestamp into calendar fields by plain arithmetic that is off by a day around the ends of leap years:
-/// 31 December of a leap year leaves `month` and `day` as they were. Streams and their texts have always had these
-/// dates. @retval TAV_RC_BAD_PARAM  `date` is null
+/// Breaks a timestamp into calendar fields by plain arithmetic that streams and their texts have always used, and that
+/// is off by a day in some places: in February of leap years, and at the end of a year: 31 December gives the next
+/// year with `month` and `day` left as they were, or 1 January when the next year is a leap year.
+/// @retval TAV_RC_BAD_PARAM  `date` is null
 TAV_API uint32_t tavTimeStampToDateInt(TAVTimeStamp timestamp, TAVDate* date);
 /// @}
 }
