@@ -339,7 +339,8 @@ private:
   uint32_t readPages(uint64_t pages, bool backward, uint64_t offset, Purpose purpose);
   uint32_t readPageForward(uint64_t offset, Purpose purpose, bool& full);
   uint32_t readPageBackward(uint64_t offset, bool& full);
-  uint32_t makeRoom(uint64_t offset, bool fromTail, bool& kept);
+  uint32_t makeRoom(uint64_t needed, uint64_t offset, bool fromTail, bool& kept);
+  uint64_t nextIndex() const;
   uint32_t readStorage(uint64_t index, uint64_t wanted, uint64_t& got, bool& ended);
   void zeroPending(uint64_t index, uint64_t length);
 

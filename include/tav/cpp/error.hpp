@@ -1,0 +1,119 @@
+/// @file error.hpp
+/// Return codes as std::error_code.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <system_error>
+
+#include "tav/codes.h"
+
+namespace tav
+{
+
+namespace detail
+{
+
+struct CodeText
+{
+  uint32_t code;
+  const char* name;
+  const char* sentence;
+};
+
+inline constexpr CodeText kCodeTexts[] = {
+#define TAV_CODE_TEXT(name, value, sentence) {value, #name, sentence},
+    TAV_CODE_LIST(TAV_CODE_TEXT)
+#undef TAV_CODE_TEXT
+};
+
+class Category : public std::error_category
+{
+public:
+  [[nodiscard]] const char* name() const noexcept override
+  {
+    return "tav";
+  }
+
+  /// "TAV_RC_NOT_FOUND: nothing was found, or no group is open"
+  [[nodiscard]] std::string message(int value) const override
+  {
+    for (const CodeText& text : kCodeTexts)
+    {
+      if (text.code == static_cast<uint32_t>(value))
+      {
+        return std::string(text.name) + ": " + text.sentence;
+      }
+    }
+    return "unknown code";
+  }
+
+  [[nodiscard]] std::error_condition default_error_condition(int value) const noexcept override
+  {
+    switch (static_cast<uint32_t>(value))
+    {
+    case TAV_RC_NO_MEMORY:
+      return std::errc::not_enough_memory;
+    case TAV_RC_NOT_SUPPORTED:
+      return std::errc::not_supported;
+    case TAV_RC_BAD_PARAM:
+      return std::errc::invalid_argument;
+    case KOR_RC_NO_SUCH_FILE:
+      return std::errc::no_such_file_or_directory;
+    case KOR_RC_NO_PERMISSION:
+      return std::errc::permission_denied;
+    case KOR_RC_NO_SPACE:
+      return std::errc::no_space_on_device;
+    case KOR_RC_IS_FOLDER:
+      return std::errc::is_a_directory;
+    case KOR_RC_IO_ERROR:
+      return std::errc::io_error;
+    case KOR_RC_FILE_EXISTS:
+      return std::errc::file_exists;
+    default:
+      return {value, *this};
+    }
+  }
+};
+
+} // namespace detail
+
+/// The category "tav". A code's value is the return code.
+inline const std::error_category& category() noexcept
+{
+  static const detail::Category instance;
+  return instance;
+}
+
+/// A return code as std::error_code; 0 is no error.
+inline std::error_code makeError(uint32_t code) noexcept
+{
+  return code == TAV_RC_OK ? std::error_code() : std::error_code(static_cast<int>(code), category());
+}
+
+/// The return code in an error of this category; TAV_RC_OK for no error and for errors of others.
+inline uint32_t codeOf(const std::error_code& error) noexcept
+{
+  return error && error.category() == category() ? static_cast<uint32_t>(error.value()) : TAV_RC_OK;
+}
+
+namespace detail
+{
+
+[[noreturn]] inline void raise(uint32_t code, const char* what)
+{
+  throw std::system_error(makeError(code), what);
+}
+
+/// The throwing form of an operation: nothing for success.
+inline void demand(uint32_t code, const char* what)
+{
+  if (code != TAV_RC_OK) [[unlikely]]
+  {
+    raise(code, what);
+  }
+}
+
+} // namespace detail
+
+} // namespace tav

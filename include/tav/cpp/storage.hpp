@@ -1,0 +1,120 @@
+/// @file storage.hpp
+/// What readers and writers sit on: options, files, and a block that grows.
+#pragma once
+
+#include <algorithm>
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+#include <filesystem>
+#include <memory>
+#include <new>
+#include <utility>
+
+#include "tav/cpp/error.hpp"
+#include "tav/cpp/values.hpp"
+
+namespace tav
+{
+
+/// How a stream is laid out; reader and writer must agree, nothing in the stream tells.
+struct StreamOptions
+{
+  ByteOrder byteOrder = ByteOrder::native;
+  bool align8 = false;               ///< payloads are padded to multiples of 8
+  Width root = Width::bits64;        ///< header of the stream's first node
+  uint64_t ringBytes = 10ULL << 20U; ///< memory of the ring over a file; a data element can be as large, not larger
+};
+
+/// How a file is written.
+struct FileOptions
+{
+  bool overwrite = false; ///< replace an existing file instead of refusing it
+};
+
+namespace detail
+{
+
+/// Opens a handle over a storage.
+inline uint32_t openHandle(TAVSideStorage* storage, uint64_t mode, const StreamOptions& options, TAVHandle*& handle)
+{
+  const uint64_t root = options.root == Width::bits32 ? TAV_OPT_ROOT32 : 0;
+  TAVInitParam param(storage, mode | root, options.ringBytes, 0,
+                     options.byteOrder == ByteOrder::swapped ? TAV_BYTE_ORDER_SWAPPED : uint8_t{0},
+                     options.align8 ? uint8_t{1} : uint8_t{0});
+  return tavInitHandle(&handle, &param);
+}
+
+inline uint32_t openFile(const std::filesystem::path& path, uint64_t options, std::unique_ptr<TAVSideStorage>& storage)
+{
+  const std::u8string utf8 = path.u8string();
+  const std::string name(utf8.begin(), utf8.end());
+  KORFileOpenParam param;
+  param.pPath = name.c_str();
+  param.options = options;
+  uint32_t rc = TAV_RC_OK;
+  storage.reset(new (std::nothrow) TAVSSFile(&param, &rc));
+  return storage != nullptr ? rc : TAV_RC_NO_MEMORY;
+}
+
+/// A block of memory that grows ahead of what is written. The handle addresses it directly, so it is told of each move.
+class GrowingBlock
+{
+public:
+  GrowingBlock()
+      : storage_(nullptr, 0)
+  {
+  }
+  ~GrowingBlock()
+  {
+    ::operator delete(storage_.pBuffer);
+  }
+  GrowingBlock(const GrowingBlock&) = delete;
+  GrowingBlock& operator=(const GrowingBlock&) = delete;
+
+  TAVSideStorage& storage()
+  {
+    return storage_;
+  }
+
+  /// Makes room for `more` bytes behind `used`. New bytes are zero: paddings show them.
+  uint32_t reserve(TAVHandle* handle, uint64_t used, uint64_t more)
+  {
+    if (more < storage_.bufferSize && used < storage_.bufferSize - more) [[likely]]
+    {
+      return TAV_RC_OK;
+    }
+    if (!layout::addChecked(more, used) || !layout::addChecked(more, kFirstSize))
+    {
+      return TAV_RC_NO_MEMORY;
+    }
+    const uint64_t size = std::max(more, 2 * storage_.bufferSize);
+    auto* const block = static_cast<uint8_t*>(::operator new(static_cast<size_t>(size), std::nothrow));
+    if (block == nullptr)
+    {
+      return TAV_RC_NO_MEMORY;
+    }
+    if (used != 0)
+    {
+      std::memcpy(block, storage_.pBuffer, static_cast<size_t>(used));
+    }
+    std::memset(block + used, 0, static_cast<size_t>(size - used));
+    ::operator delete(storage_.pBuffer);
+    storage_.pBuffer = block;
+    storage_.bufferSize = size;
+    if (handle != nullptr)
+    {
+      handle->pDirectData = block;
+      handle->directDataSize = size;
+    }
+    return TAV_RC_OK;
+  }
+
+private:
+  static constexpr uint64_t kFirstSize = 4096;
+  TAVSSMemory storage_;
+};
+
+} // namespace detail
+
+} // namespace tav
