@@ -1,0 +1,82 @@
+#include "tav/kor.h"
+
+#include <algorithm>
+#include <array>
+#include <cinttypes>
+#include <cwchar>
+#include <gtest/gtest.h>
+#include <string>
+
+namespace
+{
+/// A buffer that shows which of its bytes were written.
+class Buffer
+{
+public:
+  Buffer() { bytes_.fill(kUntouched); }
+
+  char* data() { return bytes_.data(); }
+  std::string text() const { return bytes_.data(); }
+  bool isUntouchedFrom(std::size_t place) const
+  {
+    return std::all_of(bytes_.begin() + static_cast<std::ptrdiff_t>(place), bytes_.end(),
+                       [](char byte) { return byte == kUntouched; });
+  }
+
+private:
+  static constexpr char kUntouched = '#';
+  std::array<char, 64> bytes_{};
+};
+
+TEST(Print, FormatsAndTellsTheCharactersStored)
+{
+  Buffer buffer;
+  EXPECT_EQ(korSnprintf(buffer.data(), 64, "%s %" PRIu64 " 0x%04X", "node", UINT64_MAX, 0xABu), 32u);
+  EXPECT_EQ(buffer.text(), "node 18446744073709551615 0x00AB");
+  EXPECT_TRUE(buffer.isUntouchedFrom(33));
+}
+
+TEST(Print, ATextThatFitsExactlyIsWhole)
+{
+  Buffer buffer;
+  EXPECT_EQ(korSnprintf(buffer.data(), 6, "%s", "12345"), 5u);
+  EXPECT_EQ(buffer.text(), "12345");
+  EXPECT_TRUE(buffer.isUntouchedFrom(6));
+}
+
+TEST(Print, ATextThatDoesNotFitIsCut)
+{
+  Buffer buffer;
+  EXPECT_EQ(korSnprintf(buffer.data(), 5, "%s", "12345"), 4u);
+  EXPECT_EQ(buffer.text(), "1234");
+  EXPECT_TRUE(buffer.isUntouchedFrom(5));
+}
+
+TEST(Print, RoomForTheEndAloneGivesAnEmptyText)
+{
+  Buffer buffer;
+  EXPECT_EQ(korSnprintf(buffer.data(), 1, "%s", "12345"), 0u);
+  EXPECT_EQ(buffer.text(), "");
+  EXPECT_TRUE(buffer.isUntouchedFrom(1));
+}
+
+TEST(Print, NoRoomAtAllWritesNothing)
+{
+  Buffer buffer;
+  EXPECT_EQ(korSnprintf(buffer.data(), 0, "%s", "12345"), 0u);
+  EXPECT_TRUE(buffer.isUntouchedFrom(0));
+}
+
+TEST(Print, ANullBufferWithoutRoomIsAccepted)
+{
+  EXPECT_EQ(korSnprintf(nullptr, 0, "%s", "12345"), 0u);
+}
+
+TEST(Print, AFormatThatFailsStoresAnEmptyText)
+{
+  Buffer buffer;
+  const wchar_t notACharacter[] = {static_cast<wchar_t>(0x110000), L'\0'};
+  EXPECT_EQ(korSnprintf(buffer.data(), 64, "before %ls", notACharacter), 0u);
+  EXPECT_EQ(buffer.text(), "");
+}
+} // namespace
