@@ -20,21 +20,17 @@ uint32_t rawWrite(TAVHandle& handle, uint64_t& position, const void* bytes, uint
 {
   TraceFrame frame(probe::rawWrite);
   frame.dump(0, position, bytes, length);
-  if (length == 0)
-  {
-    return frame.code();
-  }
   if (isDirect(handle))
   {
     if (frame.require(20, handle.pDirectData != nullptr, TAV_RC_NO_MEMORY) &&
-        frame.step(30, checkRoom(handle, position, length)))
+        frame.step(30, checkRoom(handle, position, length)) && length != 0)
     {
-      std::memcpy(handle.pDirectData + position, bytes, length);
+      std::memmove(handle.pDirectData + position, bytes, length); // the bytes may lie in the block themselves
       position += length;
     }
     return frame.code();
   }
-  if (frame.require(10, handle.pCircularBuf != nullptr, TAV_RC_NO_CIRCULAR_BUF) &&
+  if (frame.require(10, handle.pCircularBuf != nullptr, TAV_RC_NO_CIRCULAR_BUF) && length != 0 &&
       frame.step(40, handle.pCircularBuf->write(position, bytes, length, false)))
   {
     if (handle.pCircularBuf->isCached(position))

@@ -21,7 +21,8 @@ inline bool isReadOnly(const TAVHandle& handle)
 /// Whether a run of bytes fits into the direct block: TAV_RC_END_OF_STORAGE when it would reach the block's last byte.
 uint32_t checkRoom(const TAVHandle& handle, uint64_t position, uint64_t length);
 
-/// Writes a run of bytes at `position`, which moves past it on success. No bytes are a success.
+/// Writes a run of bytes at `position`, which moves past it on success. No bytes need a place all the same, but
+/// nothing is written: the circular buffer refuses a run of none.
 uint32_t rawWrite(TAVHandle& handle, uint64_t& position, const void* bytes, uint64_t length);
 
 /// Writes the payload of a data element in the stream's byte order at `position`, which moves past what was written.

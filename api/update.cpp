@@ -9,9 +9,10 @@ using namespace tav;
 namespace
 {
 
+/// A header form that no node has is never the one that was read.
 bool isSameNode(const TAVHeader& a, const TAVHeader& b)
 {
-  return sizeOf(a) == sizeOf(b) && typeOf(a) == typeOf(b) && elmOf(a) == elmOf(b);
+  return a.hdrType == b.hdrType && sizeOf(a) == sizeOf(b) && typeOf(a) == typeOf(b) && elmOf(a) == elmOf(b);
 }
 
 } // namespace

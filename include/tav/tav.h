@@ -479,6 +479,7 @@ TAV_API uint32_t tavGetSideStorage(TAVHandle* handle, TAVSideStorage** outStorag
 /// @retval TAV_RC_BAD_PAYLOAD     `dataBufSize` is smaller than the header's size
 /// @retval TAV_RC_END_OF_STORAGE  the block is full
 /// @retval TAV_RC_NO_MEMORY       more than 4,000 open groups: the group's header is written, but it is not open
+/// @retval TAV_RC_NO_HDR_STACK    a group on a handle without a header stack: likewise
 /// Codes of the storage come up unchanged.
 TAV_API uint32_t tavAddElement(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData);
 
@@ -512,7 +513,8 @@ TAV_API uint32_t tavWriteNodeInt(uint64_t options, TAVHandle* handle, TAVHeader*
 TAV_API uint32_t tavCloseHeader(uint64_t options, TAVHandle* handle);
 
 /// Overwrites the payload of a data element in place. Size, type and element id must be those in the stream.
-/// @retval TAV_RC_BAD_PARAM  null argument, a group, or a header that differs from the stored one
+/// @retval TAV_RC_BAD_PARAM  null argument or payload, a group, or a header that differs from the stored one
+/// @retval TAV_RC_WRONG_MODE, TAV_RC_BAD_OPTIONS  misuse
 /// Codes of the reader come up unchanged; through a ring, an element larger than it gives TAV_RC_DATA_TOO_LARGE.
 TAV_API uint32_t tavUpdateElement(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData);
 /// @}
