@@ -77,9 +77,9 @@ void printString(TAVPrintCtx& ctx, const TAVHeaderData& node)
   constexpr uint64_t longestPiece = 1U << 30U;
   const auto* text = reinterpret_cast<const char*>(node.pDataBuf);
   uint64_t length = sizeOf(node.header);
-  if (length >= kUnboundedText)
+  if (length >= kUnboundedText) // no text is so long: the bytes at hand are meant, or all up to the NUL
   {
-    length = node.dataBufSize; // no text is so long: the bytes at hand are meant
+    length = node.dataBufSize != 0 ? node.dataBufSize : std::strlen(text);
   }
   do
   {
