@@ -40,8 +40,8 @@ uint32_t attachMemory(TAVHandle& handle)
 {
   handle.pCircularBuf = nullptr;
   handle.options |= TAV_OPT_DIRECT;
-  void* block = nullptr;
-  uint64_t size = 0;
+  void* block = handle.pDirectData; // a storage that refuses leaves them as they were
+  uint64_t size = handle.directDataSize;
   const uint32_t rc = handle.pSideStorage->getMemory(&block, &size);
   handle.pDirectData = static_cast<uint8_t*>(block);
   handle.directDataSize = size;

@@ -36,6 +36,10 @@ public:
       {
         rc = goBack();
       }
+      else if (place_.count != 0)
+      {
+        rc = TAV_RC_NOT_FOUND; // every round puts the parent on its stack, and a full stack ends no miss either
+      }
       if (rc != TAV_RC_OK && rc != TAV_RC_NOT_FOUND)
       {
         return rc;

@@ -5,6 +5,7 @@
 #include <new>
 
 #include "api/printer.h"
+#include "api/walkGuard.h"
 #include "format/layout.h"
 #include "kor/traceFrame.h"
 #include "tav/probes.h"
@@ -112,6 +113,7 @@ uint32_t walk(TAVPrintCtx& ctx, TAVHandle& handle, TAVHdrStack& stack)
 {
   std::array<TAVHeaderData, 2> slots{};
   TAVHeader* previous = nullptr;
+  WalkGuard guard(stack.pEntries[0]);
   for (size_t current = 0; stack.count != 0; current ^= 1U)
   {
     TAVHeaderData& child = slots[current];
@@ -123,7 +125,7 @@ uint32_t walk(TAVPrintCtx& ctx, TAVHandle& handle, TAVHdrStack& stack)
     }
     else if (rc == TAV_RC_OK)
     {
-      rc = printChild(ctx, handle, child);
+      rc = guard.visit(child.header.nodeOffset) ? printChild(ctx, handle, child) : TAV_RC_OUTSIDE_PARENT;
       if (rc == TAV_RC_OK && isGroup(child.header))
       {
         rc = enterGroup(ctx, stack, child.header);

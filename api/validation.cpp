@@ -3,6 +3,7 @@
 #include <memory>
 #include <new>
 
+#include "api/walkGuard.h"
 #include "format/layout.h"
 #include "kor/traceFrame.h"
 #include "tav/probes.h"
@@ -30,6 +31,7 @@ uint32_t walk(uint64_t options, TAVHandle& handle, TAVHdrStack& stack)
   std::array<TAVHeaderData, 2> slots{};
   size_t current = 0;
   bool descended = true;
+  WalkGuard guard(stack.pEntries[0]);
   for (;;)
   {
     TAVHeader* const parent = stack.top();
@@ -47,7 +49,8 @@ uint32_t walk(uint64_t options, TAVHandle& handle, TAVHdrStack& stack)
     }
     else if (rc == TAV_RC_OK)
     {
-      if ((options & kContainment) != 0 && !isContained(child.header, *parent))
+      const bool contained = (options & kContainment) == 0 || isContained(child.header, *parent);
+      if (!contained || !guard.visit(child.header.nodeOffset))
       {
         return TAV_RC_OUTSIDE_PARENT;
       }
