@@ -1,4 +1,5 @@
-/// Construction, chunks, writes and marks of the circular buffer. How pages come and go: circularPages.cpp.
+/// Construction, chunks, writes and marks of the circular buffer. How pages come and go:
+/// circularFill.cpp and circularRelease.cpp.
 #include <algorithm>
 #include <cstring>
 
@@ -116,7 +117,7 @@ uint32_t TAVCircularBuf::getChunk(uint64_t offset, uint64_t length, TAVCBUserAre
 {
   TraceFrame frame(probe::cbGetChunk);
   frame.dump(0, offset, length, area, backward, copy);
-  if (!frame.require(10, area != nullptr, TAV_RC_BAD_PARAM) ||
+  if (!frame.require(10, area != nullptr && pRing != nullptr, TAV_RC_BAD_PARAM) ||
       !frame.require(20, !copy || area->pChunk != nullptr, TAV_RC_BAD_PARAM))
   {
     return frame.code();
@@ -182,7 +183,7 @@ uint32_t TAVCircularBuf::write(uint64_t offset, const void* data, uint64_t size,
   TraceFrame frame(probe::cbWrite);
   frame.dump(0, offset, data, size, direct);
   if (!frame.require(10, storageWritable != 0, TAV_RC_NOT_SUPPORTED) ||
-      !frame.require(20, data != nullptr, TAV_RC_BAD_PARAM) || !frame.require(30, size != 0, TAV_RC_BAD_PARAM))
+      !frame.require(20, data != nullptr && pRing != nullptr, TAV_RC_BAD_PARAM) || !frame.require(30, size != 0, TAV_RC_BAD_PARAM))
   {
     return frame.code();
   }
@@ -257,16 +258,22 @@ uint32_t TAVCircularBuf::writeStraight(uint64_t offset, const uint8_t* data, uin
   return rc;
 }
 
-/// Brings the storage's cursor to an offset; a storage that stands there already is left alone.
+/// Brings the storage's cursor to an offset; a storage that stands there already is left alone. One that lands
+/// elsewhere must be neither read nor written there.
 uint32_t TAVCircularBuf::seekStorage(uint64_t offset)
 {
   uint64_t position = 0;
-  const uint32_t rc = pStorage->getPosition(&position);
+  uint32_t rc = pStorage->getPosition(&position);
   if (rc != TAV_RC_OK || position == offset)
   {
     return rc;
   }
-  return pStorage->seek(offset, kSeekHint);
+  rc = pStorage->seek(offset, kSeekHint);
+  if (rc == TAV_RC_OK)
+  {
+    rc = pStorage->getPosition(&position);
+  }
+  return rc != TAV_RC_OK || position == offset ? rc : TAV_RC_NO_MEMORY;
 }
 
 uint32_t TAVCircularBuf::reset()
@@ -280,7 +287,7 @@ uint32_t TAVCircularBuf::reposition(uint64_t offset, int8_t adjustment, uint8_t 
 {
   TraceFrame frame(probe::cbReposition);
   frame.dump(0, offset, adjustment, pages);
-  if (frame.step(10, reset()))
+  if (frame.step(10, pRing != nullptr ? reset() : TAV_RC_BAD_PARAM))
   {
     const uint64_t from = offset + static_cast<uint64_t>(int64_t{adjustment});
     static_cast<void>(frame.step(20, fill(from, pages, false, Purpose::read)));
@@ -292,7 +299,8 @@ uint32_t TAVCircularBuf::markPages(uint64_t offset, uint64_t length)
 {
   TraceFrame frame(probe::cbMarkPages);
   frame.dump(0, offset, length);
-  if (!frame.require(10, storageWritable != 0, TAV_RC_NOT_SUPPORTED) || !frame.require(20, !isEmpty(), TAV_RC_BAD_PARAM))
+  if (!frame.require(10, storageWritable != 0, TAV_RC_NOT_SUPPORTED) ||
+      !frame.require(20, !isEmpty(), TAV_RC_BAD_PARAM))
   {
     return frame.code();
   }

@@ -131,10 +131,11 @@ uint32_t TAVCircularBuf::readPages(uint64_t pages, bool backward, uint64_t offse
   return frame.code();
 }
 
-/// Frees a page when none is free. `kept`: that page holds `offset`, so it stays and nothing is to be read.
-uint32_t TAVCircularBuf::makeRoom(uint64_t offset, bool fromTail, bool& kept)
+/// Frees a page at the other end when fewer than `needed` bytes are free. `kept`: that page holds `offset`, so it stays
+/// and nothing is to be read. A page that the storage filled in part can be completed in a ring that is full otherwise.
+uint32_t TAVCircularBuf::makeRoom(uint64_t needed, uint64_t offset, bool fromTail, bool& kept)
 {
-  if (cachedCount() <= ringSize - pageSize)
+  if (needed <= ringSize - cachedCount())
   {
     return TAV_RC_OK;
   }
@@ -143,17 +144,22 @@ uint32_t TAVCircularBuf::makeRoom(uint64_t offset, bool fromTail, bool& kept)
   return kept ? TAV_RC_OK : releasePages(1, fromTail);
 }
 
+/// Where the next page read begins: behind the tail, whose page it completes, or anywhere in an empty ring.
+uint64_t TAVCircularBuf::nextIndex() const
+{
+  return isEmpty() || tail + 1 == ringSize ? 0 : tail + 1;
+}
+
 uint32_t TAVCircularBuf::readPageForward(uint64_t offset, Purpose purpose, bool& full)
 {
   bool kept = false;
-  uint32_t rc = makeRoom(offset, false, kept);
+  uint32_t rc = makeRoom(pageSize - nextIndex() % pageSize, offset, false, kept);
   full = rc == TAV_RC_OK && !kept;
   if (!full)
   {
     return rc;
   }
-  const bool wasEmpty = isEmpty();
-  const uint64_t index = wasEmpty || tail + 1 == ringSize ? 0 : tail + 1;
+  const uint64_t index = nextIndex();
   const uint64_t room = pageSize - index % pageSize;
   uint64_t got = 0;
   bool ended = false;
@@ -189,7 +195,7 @@ uint32_t TAVCircularBuf::readPageBackward(uint64_t offset, bool& full)
     return TAV_RC_END_OF_STORAGE;
   }
   bool kept = false;
-  uint32_t rc = makeRoom(offset, true, kept);
+  uint32_t rc = makeRoom(pageSize, offset, true, kept);
   if (rc != TAV_RC_OK || kept)
   {
     return rc;

@@ -20,7 +20,8 @@ TAVCircularBuf::Piece TAVCircularBuf::pieceAt(bool fromTail) const
   return {start, headOffset + cachedCount() - length, length, together};
 }
 
-/// Writes up to `pages` pages back and drops them, from the head end or from the tail end; all of them empty the ring.
+/// Writes up to `pages` pages back and drops them, from the head end or from the tail end. All of them empty the ring,
+/// also where its two ends share a page, which makes one piece more than there are pages.
 uint32_t TAVCircularBuf::releasePages(uint64_t pages, bool fromTail)
 {
   TraceFrame frame(probe::cbReleasePages);
@@ -35,7 +36,8 @@ uint32_t TAVCircularBuf::releasePages(uint64_t pages, bool fromTail)
     return frame.code();
   }
   bool seekNeeded = position != headOffset;
-  for (uint64_t done = 0; done < pages && !isEmpty(); ++done)
+  const uint64_t most = pages < pageCount ? pages : pageCount + 1;
+  for (uint64_t done = 0; done < most && !isEmpty(); ++done)
   {
     const Piece piece = pieceAt(fromTail);
     seekNeeded = seekNeeded || fromTail;
@@ -52,7 +54,7 @@ uint32_t TAVCircularBuf::releasePages(uint64_t pages, bool fromTail)
 
 uint32_t TAVCircularBuf::writePiece(const Piece& piece, bool& seekNeeded)
 {
-  uint32_t rc = seekNeeded ? pStorage->seek(piece.offset, 1) : TAV_RC_OK;
+  uint32_t rc = seekNeeded ? seekStorage(piece.offset) : TAV_RC_OK;
   if (rc != TAV_RC_OK)
   {
     return rc;

@@ -96,12 +96,16 @@ uint32_t TAVSSMemory::read(uint64_t wanted, void** ppData, uint64_t bufSize, uin
   TraceFrame frame(probe::ssMemoryRead);
   frame.dump(0, wanted, ppData, bufSize, pRead, zeroCopy, backward);
   if (!frame.require(120, ppData != nullptr && pRead != nullptr, TAV_RC_BAD_PARAM) ||
-      !frame.require(110, position < bufferSize, TAV_RC_END_OF_STORAGE) ||
-      !frame.require(90, zeroCopy || *ppData != nullptr, TAV_RC_BAD_PARAM))
+      !frame.require(110, position < bufferSize, TAV_RC_END_OF_STORAGE))
   {
     return frame.code();
   }
   uint64_t length = std::min(bufferSize - position, wanted);
+  *pRead = length; // told even when there is no buffer to take it
+  if (!frame.require(90, zeroCopy || *ppData != nullptr, TAV_RC_BAD_PARAM))
+  {
+    return frame.code();
+  }
   if (zeroCopy)
   {
     *ppData = pBuffer + position;
