@@ -1,0 +1,159 @@
+"""Exit statuses, standard error, pipes, devices, output files and interrupts."""
+import os
+import signal
+import struct
+import subprocess
+import time
+import unittest
+
+from support import TAV, ToolTest, generate, tav
+
+
+class Behaviour(ToolTest):
+    def test_help_fits_a_screen_and_names_every_command(self):
+        result = tav("--help")
+        self.assertEqual((result.status, result.err), (0, ""))
+        self.assertLessEqual(len(result.out.splitlines()), 30)
+        for command in ("snapshot", "info", "tree", "print", "get", "hex", "elements"):
+            self.assertIn(f"\n  {command} ", result.out)
+            page = tav(command, "--help")
+            self.assertEqual(page.status, 0)
+            self.assertLessEqual(len(page.out.splitlines()), 50)
+
+    def test_wrong_usage_is_status_2_with_a_hint(self):
+        path = self.snapshot()
+        for arguments in ((), ("nonsense",), ("tree",), ("tree", path, path), ("tree", "--depth", "x", path),
+                          ("tree", "--nonsense", path), ("get", path), ("tree", "--byte-order", "middle", path),
+                          ("get", "--raw", "--json", path, "/system"), ("--trace-probe", "tavReadNodeInt", "info", path),
+                          ("elements", "a", "b")):
+            with self.subTest(arguments=arguments):
+                result = tav(*arguments)
+                self.assertEqual((result.status, result.out), (2, ""))
+                self.assertNotEqual(result.err, "")
+
+    def test_files_that_cannot_be_read_are_status_2(self):
+        for path, code in ((self.folder / "none", "KOR_RC_NO_SUCH_FILE"), (self.folder, "KOR_RC_IS_FOLDER")):
+            for command in ("info", "tree", "hex", "print"):
+                result = tav(command, path)
+                self.assertEqual((result.status, result.out), (2, ""))
+                self.assertIn(code, result.err)
+                self.assertTrue(result.err.startswith(f"tav: {path}: "), result.err)
+
+    def test_what_is_no_stream_is_status_3(self):
+        for content in (b"", b"x", bytes(1000), b"The quick brown fox jumps over the lazy dog. " * 20, os.urandom(4096)):
+            path = self.folder / "no.tav"
+            path.write_bytes(content)
+            for command in ("info", "tree", "print"):
+                self.assertEqual(tav(command, path).status, 3, (command, content[:20]))
+
+    def test_standard_input_works_as_a_file_does(self):
+        path = self.snapshot("--eye-size")
+        for arguments in (("tree", "{}"), ("get", "{}", "/system/host/os/osName"), ("hex", "{}"), ("print", "{}", "--xml")):
+            from_file = tav(*[str(a).format(path) for a in arguments])
+            from_pipe = tav(*[str(a).format("-") for a in arguments], stdin=path.read_bytes())
+            self.assertEqual((from_pipe.status, from_pipe.raw), (0, from_file.raw))
+            self.assertNotEqual(from_pipe.raw, b"")
+
+    def test_a_named_pipe_works_as_a_file_does(self):
+        path = self.snapshot()
+        pipe = self.folder / "pipe"
+        os.mkfifo(pipe)
+        with subprocess.Popen(["cp", str(path), str(pipe)]) as writer:
+            result = tav("tree", pipe)
+            writer.wait()
+        self.assertEqual((result.status, result.raw), (0, tav("tree", path).raw))
+
+    def test_no_temporary_file_stays(self):
+        path = self.snapshot()
+        folder = self.folder / "temporary"
+        folder.mkdir()
+        tav("tree", "-", stdin=path.read_bytes(), env={**os.environ, "TMPDIR": str(folder)})
+        self.assertEqual(list(folder.iterdir()), [])
+
+    def test_a_closed_pipe_ends_quietly(self):
+        path = self.folder / "g.tav"
+        children = b"".join(struct.pack("<QIHHI", 4, 0, 55, 307, i) for i in range(50000))
+        path.write_bytes(struct.pack("<QIHH", len(children), 0, 2, 60100) + children)
+        for command in ("tree", "hex", "print"):
+            with self.subTest(command=command):
+                with subprocess.Popen([TAV, command, str(path)], stdout=subprocess.PIPE, stderr=subprocess.PIPE) as run:
+                    run.stdout.read(10)
+                    run.stdout.close()
+                    errors = run.stderr.read()
+                    self.assertEqual((run.wait(timeout=60), errors), (0, b""))
+
+    @unittest.skipUnless(os.path.exists("/dev/full"), "there is no /dev/full")
+    def test_a_full_disk_is_told(self):
+        path = self.snapshot()
+        for arguments in (["tree", path], ["print", path], ["hex", path], ["get", path, "/system/host/hostName"],
+                          ["info", path], ["elements"], ["--help"]):
+            with self.subTest(arguments=arguments), open("/dev/full", "wb") as full:
+                run = subprocess.run([TAV, *map(str, arguments)], stdout=full, stderr=subprocess.PIPE, timeout=60)
+                self.assertEqual(run.returncode, 2)
+                self.assertIn(b"KOR_RC_NO_SPACE", run.stderr)
+        result = tav("snapshot", "-o", "/dev/full")
+        self.assertEqual(result.status, 2)
+        self.assertIn("KOR_RC_NO_SPACE", result.err)
+
+    def test_an_existing_file_is_replaced_only_by_force(self):
+        path = self.folder / "y.tav"
+        path.write_bytes(b"precious")
+        result = tav("snapshot", "-o", path)
+        self.assertEqual(result.status, 2)
+        self.assertIn("KOR_RC_FILE_EXISTS", result.err)
+        self.assertIn("--force", result.err)
+        self.assertEqual(path.read_bytes(), b"precious")
+        self.assertEqual(tav("snapshot", "-o", path, "--force").status, 0)
+        self.assertEqual(tav("info", path).status, 0)
+        self.assertEqual([entry.name for entry in self.folder.iterdir()], ["y.tav"])
+
+    def test_an_output_that_cannot_be_made_is_told(self):
+        for path in (self.folder, self.folder / "none" / "x.tav"):
+            self.assertEqual(tav("snapshot", "-o", path).status, 2)
+
+    def test_an_interrupt_leaves_no_temporary_file(self):
+        folder = self.folder / "temporary"
+        folder.mkdir()
+        for number in (signal.SIGINT, signal.SIGTERM):
+            with subprocess.Popen([TAV, "tree", "-"], stdin=subprocess.PIPE, stdout=subprocess.DEVNULL,
+                                  env={**os.environ, "TMPDIR": str(folder)}) as run:
+                deadline = time.monotonic() + 30
+                while not list(folder.iterdir()) and time.monotonic() < deadline:
+                    time.sleep(0.01)
+                self.assertEqual(len(list(folder.iterdir())), 1)
+                run.send_signal(number)
+                self.assertEqual(run.wait(timeout=30), -number)
+            self.assertEqual(list(folder.iterdir()), [])
+
+    def test_the_trace_is_written_and_filtered(self):
+        path = self.snapshot()
+        trace = self.folder / "trace"
+        self.assertEqual(tav("print", path, "--trace", trace).status, 0)
+        everything = trace.read_text()
+        self.assertIn("tavGetNextChild", everything)
+        self.assertEqual(tav("print", path, "--trace", trace, "--trace-probe", "tavReadNodeInt").status, 0)
+        filtered = trace.read_text().splitlines()
+        self.assertGreater(len(filtered), 0)
+        self.assertLess(len(filtered), len(everything.splitlines()))
+        self.assertTrue(all(line.startswith("tavReadNodeInt ") for line in filtered))
+
+    def test_no_progress_and_no_colour_without_a_terminal(self):
+        path = self.folder / "g.tav"
+        generate(path, "--nodes", 3000)
+        result = tav("tree", path)
+        self.assertEqual(result.err, "")
+        self.assertNotIn("\033", result.out)
+        self.assertIn("\033[", tav("tree", path, "--color", "always").out)
+
+    def test_completions_and_the_manual_page_name_every_option(self):
+        texts = [tav("help", "--man").out.replace("\\-", "-")] + \
+                [tav("completion", shell).out for shell in ("bash", "zsh", "fish")]
+        for text in texts:
+            for word in ("snapshot", "elements", "depth", "trace-probe", "byte-order", "swapped"):
+                self.assertIn(word, text)
+        self.assertEqual(subprocess.run(["bash", "-n"], input=texts[1].encode(), timeout=60).returncode, 0)
+        self.assertEqual(tav("completion", "csh").status, 2)
+
+
+if __name__ == "__main__":
+    unittest.main()

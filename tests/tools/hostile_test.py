@@ -1,0 +1,136 @@
+"""Damaged and hostile bytes: no crash, no endless run, no memory beyond the depth, every byte accounted for once."""
+import os
+import random
+import struct
+import time
+import unittest
+
+from support import SANITIZED, ToolTest, bytes_of_hex, generate, tav, tav_in_little_memory, tree_rows
+
+OPEN = 2**64 - 1
+
+
+def group(size, elm=60100, info=0, kind=2):
+    return struct.pack("<QIHH", size, info, kind, elm)
+
+
+def number(value, elm=307, info=0):
+    return struct.pack("<QIHHI", 4, info, 55, elm, value)
+
+
+def damage(rng, content):
+    """One of the ways in which files go bad."""
+    content = bytearray(content)
+    way = rng.randrange(5)
+    at = rng.randrange(len(content))
+    if way == 0:
+        return content[:at]
+    if way == 1:
+        length = min(rng.choice((1, 8, 100, 1024)), len(content) - at)
+        content[at:at + length] = bytes(length)
+    elif way == 2:
+        for _ in range(rng.choice((1, 2, 10))):
+            content[rng.randrange(len(content))] ^= 1 << rng.randrange(8)
+    elif way == 3:
+        for _ in range(rng.choice((1, 2, 10))):
+            content[rng.randrange(len(content))] = rng.choice((0, 1, 2, 255))
+    else:
+        return rng.randbytes(rng.randrange(2000))
+    return content
+
+
+class Hostile(ToolTest):
+    def file(self, content):
+        path = self.folder / "h.tav"
+        path.write_bytes(content)
+        return path
+
+    def test_every_byte_of_damaged_files_is_shown_once(self):
+        rng = random.Random(1)
+        choices = ("--swap", "--align", "--root32", "--pairs", "--strings", "--utf8", "--mixed", "--open", "--unfinished",
+                   "--wild")
+        for case in range(int(os.environ.get("TAV_TEST_CASES", "120"))):
+            options = [name for name in choices if rng.random() < 0.4]
+            path = self.folder / "d.tav"
+            generate(path, *options, "--seed", case, "--nodes", rng.choice((3, 40, 200)))
+            content = bytes(damage(rng, path.read_bytes()))
+            path.write_bytes(content)
+            with self.subTest(case=case, options=options):
+                shown = tav("hex", path)
+                self.assertIn(shown.status, (0, 1), shown.err)
+                self.assertEqual(bytes_of_hex(shown.out), content)
+                for command in ("info", "tree"):
+                    result = tav(command, path)
+                    self.assertIn(result.status, (0, 1, 3), result.err)
+
+    def test_nodes_behind_a_damaged_region_are_found_again(self):
+        children = [number(i) for i in range(200)]
+        content = bytearray(group(sum(map(len, children))) + b"".join(children))
+        content[416:516] = bytes(100)  # from the middle of node 20 to the middle of node 25
+        result = tav("tree", self.file(content), "--paths", "--width", "0")
+        nodes, damaged = tree_rows(result.out)
+        self.assertEqual(result.status, 1)
+        whole = {0} | {16 + 20 * i for i in range(200) if not 20 <= i <= 24}
+        self.assertLessEqual(whole, {node[0] for node in nodes})
+        self.assertEqual(len(damaged), 1)
+
+    def test_a_subtree_behind_damage_is_found_by_its_pair(self):
+        strange = struct.pack("<QIHHQ", 8, 0x00400000, 60000, 1, 5) + struct.pack("<QQ", 0xC0DED5EEDDEC0DED, 24)
+        content = group(16 * 3 + len(strange)) + b"\xff" * 48 + strange
+        nodes, damaged = tree_rows(tav("tree", self.file(content), "--paths", "--width", "0").out)
+        self.assertEqual(([node[0] for node in nodes], damaged), ([0, 64], [16]))
+
+    def test_claims_of_4_GiB_in_small_files(self):
+        for content in (group(2**32) + struct.pack("<QIHH", 2**32, 0, 101, 60102) + b"x" * 8,
+                        group(OPEN) + struct.pack("<QIHH", OPEN - 40, 0, 101, 60102) + b"x" * 8,
+                        group(OPEN - 8) + number(1), struct.pack("<IHH", 2**32 - 2, 1, 60100) + bytes(32)):
+            path = self.file(content)
+            for command in ("info", "tree", "hex", "print"):
+                run = tav_in_little_memory(command, path)
+                self.assertIn(run.status, (0, 1, 3), run.err)
+                self.assertNotIn("memory", run.err if command != "print" else "")
+
+    def test_100000_levels(self):
+        for content in (group(OPEN) * 100_000, b"".join(group(16 * (99_999 - i)) for i in range(100_000))):
+            path = self.file(content)
+            for command in ("info", "tree"):
+                start = time.monotonic()
+                run = tav_in_little_memory(command, path)
+                self.assertEqual(run.status, 0, run.err[:200])
+                self.assertLess(time.monotonic() - start, 20)
+            self.assertIn("depth             100000", tav("info", path).out)
+            self.assertIn("(99999)", tav("tree", path).out.splitlines()[-1])
+
+    def test_info_of_a_sparse_file_of_8_GiB_is_quick(self):
+        path = self.snapshot()
+        os.truncate(path, 8 << 30)
+        best = 60.0
+        for _ in range(5):
+            start = time.monotonic()
+            result = tav("info", path)
+            best = min(best, time.monotonic() - start)
+            self.assertEqual(result.status, 0, result.out)
+            self.assertIn("nodes             16,", result.out)
+        self.assertLess(best, 1.0 if SANITIZED else 0.05)
+
+    def test_get_of_an_early_match_reads_a_hundredth(self):
+        path = self.folder / "big.tav"
+        hosts = [number(i) for i in range(50_000)]
+        inner = group(len(hosts) * 20, 60102) + b"".join(hosts)
+        count = 110
+        with open(path, "wb") as file:
+            file.write(group(len(inner) * count))
+            for _ in range(count):
+                file.write(inner)
+        for wanted in ("/system/host/#307[100]", "**/node_number"):
+            result = tav("get", path, wanted, "--stats")
+            self.assertEqual(result.status, 0, result.err)
+            read = int(result.err.split(": ")[-1].split()[0])
+            self.assertLess(read, path.stat().st_size / 100)
+        last = tav("get", path, f"/system/host[{count}]/#307[1]", "--stats")
+        self.assertEqual(last.out, "0\n")
+        self.assertLess(int(last.err.split(": ")[-1].split()[0]), path.stat().st_size / 10)
+
+
+if __name__ == "__main__":
+    unittest.main()

@@ -1,0 +1,80 @@
+"""What the tests of the program share: running it, making streams, a folder for files."""
+import json
+import os
+import pathlib
+import resource
+import subprocess
+import tempfile
+import unittest
+
+TAV = os.environ["TAV_TOOL"]
+GENERATE = os.environ["TAV_GENERATE"]
+# A build with sanitizers needs terabytes of addresses and more time: limits of memory and of time say nothing there.
+SANITIZED = os.environ.get("TAV_SANITIZED", "") != ""
+
+
+class Result:
+    def __init__(self, done):
+        self.status = done.returncode
+        self.raw = done.stdout
+        self.out = done.stdout.decode("utf-8", "replace")
+        self.err = done.stderr.decode("utf-8", "replace")
+
+
+def tav(*arguments, stdin=None, **more):
+    """Runs the program; it has to end within a minute."""
+    done = subprocess.run([TAV, *map(str, arguments)], input=stdin if stdin is not None else b"",
+                          capture_output=True, timeout=60, **more)
+    return Result(done)
+
+
+def tav_in_little_memory(*arguments):
+    """Runs the program where it gets 400 MiB of addresses, its own code included."""
+    if SANITIZED:
+        return tav(*arguments)
+    return tav(*arguments, preexec_fn=lambda: resource.setrlimit(resource.RLIMIT_AS, (400 << 20, 400 << 20)))
+
+
+def generate(path, *options):
+    """Writes a random stream and returns what is in it."""
+    done = subprocess.run([GENERATE, str(path), *map(str, options)], capture_output=True, check=True, timeout=60)
+    return json.loads(done.stdout)
+
+
+def tree_rows(text):
+    """Offset, size and path of every node that `tav tree --paths --width 0` lists, and the damaged rows apart."""
+    nodes, damaged = [], []
+    for line in text.splitlines():
+        fields = line.split()
+        if " damaged  " in line or line.endswith(" damaged"):
+            damaged.append(int(fields[0], 16))
+        elif len(fields) > 2 and fields[2].startswith("/"):
+            nodes.append((int(fields[0], 16), fields[1], fields[2]))
+    return nodes, damaged
+
+
+def bytes_of_hex(text):
+    """The bytes that the rows of `tav hex` show, and whether each stands at its own place, once."""
+    made = bytearray()
+    for line in text.splitlines():
+        if line.startswith(";") or line == "*":
+            continue
+        offset = int(line.split(":")[0], 16)
+        if offset < len(made):
+            raise AssertionError(f"the byte at {offset:#x} is shown twice")
+        made += bytes(offset - len(made))
+        made += bytes.fromhex(line.split(": ", 1)[1][:40].replace(" ", ""))
+    return bytes(made)
+
+
+class ToolTest(unittest.TestCase):
+    def setUp(self):
+        folder = tempfile.TemporaryDirectory(prefix="tav-test-")
+        self.addCleanup(folder.cleanup)
+        self.folder = pathlib.Path(folder.name)
+
+    def snapshot(self, *options):
+        path = self.folder / "x.tav"
+        result = tav("snapshot", "-o", path, "--force", *options)
+        self.assertEqual((result.status, result.err), (0, ""))
+        return path

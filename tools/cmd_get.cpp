@@ -1,0 +1,225 @@
+// tav get: values by path.
+#include <algorithm>
+#include <memory>
+
+#include <nlohmann/json.hpp>
+
+#include "tools/locate.h"
+#include "tools/options.h"
+#include "tools/output.h"
+#include "tools/path.h"
+#include "tools/progress.h"
+#include "tools/report.h"
+#include "tools/session.h"
+#include "tools/value.h"
+#include "tools/walker.h"
+
+namespace tav::tool
+{
+
+namespace
+{
+
+constexpr uint64_t kMostText = 1024 * 1024; ///< longer values are copied piece by piece
+
+/// A path with what was found so far.
+struct Wanted
+{
+  explicit Wanted(const std::string& text)
+      : path(text), matcher(path) {}
+
+  Path path;
+  PathMatcher matcher;
+  uint64_t found = 0;
+};
+
+class Getter
+{
+public:
+  explicit Getter(const Invocation& invocation)
+      : stream_(openStream(invocation)), out_("-"), raw_(invocation.has("--raw")), json_(invocation.has("--json")),
+        all_(invocation.has("--all")), paths_(invocation.has("--paths"))
+  {
+    if (raw_ && json_)
+    {
+      throw Failure("get: --raw and --json exclude each other");
+    }
+    for (size_t i = 1; i < invocation.arguments().size(); ++i)
+    {
+      wanted_.push_back(std::make_unique<Wanted>(invocation.arguments()[i]));
+    }
+  }
+
+  Status run(const Invocation& invocation)
+  {
+    Walker walker(stream_.bytes(), stream_.form());
+    Progress progress("get", stream_.bytes().size());
+    Event event;
+    while (!isDone() && walker.next(event))
+    {
+      progress.at(event.offset);
+      if (event.what == What::nodeBegin)
+      {
+        visit(walker, event);
+      }
+    }
+    out_.commit();
+    tellStatistics(invocation, stream_.bytes());
+    Status status = kFine;
+    for (const auto& wanted : wanted_)
+    {
+      if (wanted->found == 0)
+      {
+        status = kFindings;
+        report(Problem{.file = stream_.bytes().name(), .path = wanted->path.text(), .sentence = "no match"});
+      }
+    }
+    return status;
+  }
+
+private:
+  bool isDone() const
+  {
+    return !all_ && std::all_of(wanted_.begin(), wanted_.end(), [](const auto& wanted) { return wanted->found != 0; });
+  }
+
+  void visit(Walker& walker, const Event& event)
+  {
+    bool reaches = false;
+    for (const auto& wanted : wanted_)
+    {
+      const bool matches = wanted->matcher.matches(event.node);
+      const bool open = all_ || wanted->found == 0;
+      if (matches && open)
+      {
+        ++wanted->found;
+        put(walker, event);
+      }
+      reaches = reaches || ((all_ || wanted->found == 0) && wanted->matcher.reachesBelow());
+    }
+    if (event.node.isGroup() && !reaches)
+    {
+      walker.skip();
+    }
+  }
+
+  void put(const Walker& walker, const Event& event)
+  {
+    const Node& node = event.node;
+    if (raw_)
+    {
+      copyPayload(node);
+      return;
+    }
+    if (json_)
+    {
+      putJson(walker, event);
+      return;
+    }
+    if (paths_)
+    {
+      out_.write(walker.path(event) + "\t");
+    }
+    if (node.isGroup())
+    {
+      // A group has no value; its path and size tell that it is there.
+      out_.write((paths_ ? "" : walker.path(event) + ": ") + "group of " +
+                 counted(node.limit - node.payloadOffset(), "byte"));
+    }
+    else if (const auto text = plainText(stream_.bytes(), stream_.form(), node, kMostText))
+    {
+      out_.write(*text);
+    }
+    else
+    {
+      copyPayload(node);
+    }
+    out_.write("\n");
+  }
+
+  void putJson(const Walker& walker, const Event& event)
+  {
+    const Node& node = event.node;
+    nlohmann::ordered_json object;
+    object["path"] = walker.path(event);
+    object["offset"] = node.offset();
+    object["size"] = node.size();
+    object["type"] = typeText(node.type());
+    if (!node.isGroup())
+    {
+      object["value"] = jsonValue(node);
+    }
+    out_.write(object.dump() + "\n");
+  }
+
+  nlohmann::ordered_json jsonValue(const Node& node)
+  {
+    const std::string text = plainText(stream_.bytes(), stream_.form(), node, ~uint64_t{0}).value_or("");
+    const uint16_t type = node.type();
+    const auto& info = layout::typeInfo(type);
+    const bool number = type >= TAV_TYPE_UINT8 && type <= TAV_TYPE_SINT64 && info.valueSize == node.size();
+    if (number)
+    {
+      return nlohmann::ordered_json::parse(text);
+    }
+    if (!isUtf8(text))
+    {
+      const std::string escaped = tool::quoted(text);
+      return escaped.substr(1, escaped.size() - 2);
+    }
+    return text;
+  }
+
+  void copyPayload(const Node& node)
+  {
+    const uint64_t end = node.isGroup() ? node.limit : node.payloadOffset() + node.size();
+    for (uint64_t at = node.payloadOffset(); at < end;)
+    {
+      const auto piece = stream_.bytes().view(at);
+      if (piece.empty())
+      {
+        return;
+      }
+      const auto count = static_cast<size_t>(std::min<uint64_t>(piece.size(), end - at));
+      out_.write(piece.first(count));
+      at += count;
+    }
+  }
+
+  Stream stream_;
+  Output out_;
+  bool raw_;
+  bool json_;
+  bool all_;
+  bool paths_;
+  std::vector<std::unique_ptr<Wanted>> wanted_{};
+};
+
+int run(const Invocation& invocation)
+{
+  return Getter(invocation).run(invocation);
+}
+
+const Registration registration{{
+    .place = 50,
+    .name = "get",
+    .arguments = "FILE PATH...",
+    .summary = "values by path",
+    .description =
+        "Prints the value of the first node that each path leads to, in the order of the stream, one a line:\n"
+        "texts as they are, numbers in decimal, bytes in hexadecimal. A path is made of tags, enum names or\n"
+        "ids (#12345); [2] is the second of its name among its siblings, * any one node, ** any number of\n"
+        "levels. Every path that any command prints is understood. Exit status 1: a path leads nowhere.",
+    .options = {{.names = "-a,--all", .help = "every node that a path leads to, not only the first"},
+                {.names = "--raw", .help = "the payload's bytes as they stand in the file, without line ends"},
+                {.names = "--json", .help = "one JSON object a match: path, offset, size, type, value"},
+                {.names = "--paths", .help = "each value behind its path and a tab"}},
+    .examples = {{"tav get x.tav /system/host/hostName", "one value"},
+                 {"tav get x.tav --all --paths '**/hostName'", "every host name in the file, with its path"},
+                 {"tav get x.tav --raw '/system/host[2]/#60123' > bytes", "the bytes of a value"}},
+    .run = run,
+}};
+
+} // namespace
+
+} // namespace tav::tool

@@ -1,0 +1,32 @@
+/// @file trace.h
+#pragma once
+
+#include <cstdio>
+#include <string>
+#include <vector>
+
+#include "tools/options.h"
+
+namespace tav::tool
+{
+
+/// The library's trace as text in a file, from now until the object goes: --trace and --trace-probe.
+class TraceFile
+{
+public:
+  explicit TraceFile(const Invocation& invocation);
+  ~TraceFile();
+  TraceFile(const TraceFile&) = delete;
+  TraceFile& operator=(const TraceFile&) = delete;
+
+  struct Filter
+  {
+    FILE* file = nullptr;
+    std::vector<uint32_t> probes{}; ///< empty: all
+  };
+
+private:
+  Filter filter_{};
+};
+
+} // namespace tav::tool
