@@ -26,7 +26,8 @@ TAVSideStorage::TAVSideStorage(uint32_t storageKind, uint64_t attributeBits)
 TAVSideStorage::~TAVSideStorage()
 {
   const TraceFrame frame(probe::sideStorageEnd);
-  status = TAV_STATUS_DESTROYED;
+  // Whoever still holds the storage may ask it: the store is made although the object ends here.
+  static_cast<volatile uint32_t&>(status) = TAV_STATUS_DESTROYED;
 }
 
 uint32_t TAVSideStorage::getStatus() const
