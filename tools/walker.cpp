@@ -133,8 +133,7 @@ void Walker::begin(TAVHeader& header)
   const bool overruns = node.size() > top.limit - start && !(node.isGroup() && isSizeUnknown(header));
   const bool strange = belief == Belief::fits && !node.isGroup() && isStrange(header);
   const bool blank = node.size() == 0 && node.type() == 0;
-  const bool wildGroup = node.isGroup() && overruns &&
-                         prober_.judge(start, hasChildren64(header), top.limit) < Belief::named &&
+  const bool wildGroup = node.isGroup() && overruns && !holdsNodes(header, top.limit) &&
                          !prober_.isChain(start, hasChildren64(header), top.limit);
   if (blank || strange || wildGroup || (overruns && !node.isGroup()))
   {
@@ -143,6 +142,33 @@ void Walker::begin(TAVHeader& header)
   }
   node.ordinal = countChild(node.elm());
   node.isGroup() ? beginGroup(node) : takeData(node);
+}
+
+bool Walker::holdsNodes(TAVHeader group, uint64_t limit)
+{
+  // The end of a file cuts all groups around it, each the first child of the one before, perhaps.
+  constexpr int mostLevels = 64;
+  for (int level = 0; level < mostLevels; ++level)
+  {
+    const uint64_t start = group.nodeOffset + headerLength(group.hdrType);
+    const bool wide = hasChildren64(group);
+    if (prober_.judge(start, wide, limit) >= Belief::named)
+    {
+      return true;
+    }
+    TAVHeader child{};
+    if (!prober_.header(start, wide, limit, child))
+    {
+      return Prober::isNamed(elmOf(group));
+    }
+    const uint64_t inside = start + headerLength(child.hdrType);
+    if (!isGroup(child) || !Prober::isNamed(elmOf(child)) || sizeOf(child) <= limit - inside)
+    {
+      return false;
+    }
+    group = child;
+  }
+  return true;
 }
 
 bool Walker::isStrange(const TAVHeader& header)

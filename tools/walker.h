@@ -112,6 +112,7 @@ private:
   bool endByZeros();
   void begin(TAVHeader& header);
   void beginGroup(Node& node);
+  bool holdsNodes(TAVHeader group, uint64_t limit);
   bool isStrange(const TAVHeader& header);
   bool looksUnfinished(const Node& node, const Frame& parent);
   void takeData(Node& node);
