@@ -1,0 +1,53 @@
+# libkor and libtav from the rooms' objects, and tav_internal for the tests.
+
+# tav_add_library(NAME ROOM...): the library and its alias tav::NAME.
+function(tav_add_library name)
+  set(objects)
+  foreach(room IN LISTS ARGN)
+    list(APPEND objects $<TARGET_OBJECTS:${room}_objects>)
+  endforeach()
+  add_library(${name} ${TAV_LIBRARY_TYPE} ${objects})
+  add_library(tav::${name} ALIAS ${name})
+  target_compile_features(${name} PUBLIC cxx_std_20)
+  target_include_directories(${name} PUBLIC
+    $<BUILD_INTERFACE:${PROJECT_SOURCE_DIR}/include>
+    $<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}>)
+  set_target_properties(${name} PROPERTIES
+    LINKER_LANGUAGE CXX
+    VERSION ${TAV_ABI_VERSION}.${PROJECT_VERSION}
+    SOVERSION ${TAV_ABI_VERSION})
+  if(TAV_LIBRARY_TYPE STREQUAL "STATIC")
+    string(TOUPPER ${name} upper)
+    target_compile_definitions(${name} PUBLIC ${upper}_STATIC)
+  elseif(UNIX AND NOT APPLE)
+    # Instances of the standard library's templates have its visibility, not ours; keep them inside.
+    target_link_options(${name} PRIVATE "LINKER:--version-script=${PROJECT_SOURCE_DIR}/cmake/hide-std.map")
+    set_property(TARGET ${name} APPEND PROPERTY LINK_DEPENDS "${PROJECT_SOURCE_DIR}/cmake/hide-std.map")
+    if(NOT TAV_SANITIZE)
+      target_link_options(${name} PRIVATE LINKER:-z,defs)
+    endif()
+  endif()
+endfunction()
+
+include(GNUInstallDirs)
+tav_add_library(kor kor)
+target_link_libraries(kor PRIVATE Threads::Threads)
+tav_add_library(tav format storage dictionary api)
+target_link_libraries(tav PUBLIC kor)
+# Where the pair is installed together, libtav finds libkor beside itself, wherever the prefix was moved to.
+if(UNIX AND NOT APPLE AND NOT DEFINED CMAKE_INSTALL_RPATH)
+  set_target_properties(tav PROPERTIES INSTALL_RPATH "$ORIGIN")
+endif()
+
+if(TAV_BUILD_TESTS OR TAV_BUILD_BENCH)
+  set(objects)
+  foreach(room IN LISTS TAV_ROOMS)
+    list(APPEND objects $<TARGET_OBJECTS:${room}_objects>)
+  endforeach()
+  add_library(tav_internal STATIC EXCLUDE_FROM_ALL ${objects})
+  target_compile_features(tav_internal PUBLIC cxx_std_20)
+  target_compile_definitions(tav_internal INTERFACE KOR_STATIC TAV_STATIC)
+  target_include_directories(tav_internal INTERFACE "${PROJECT_SOURCE_DIR}/include" "${PROJECT_SOURCE_DIR}")
+  target_link_libraries(tav_internal PUBLIC Threads::Threads)
+  set_target_properties(tav_internal PROPERTIES LINKER_LANGUAGE CXX)
+endif()

@@ -1,0 +1,39 @@
+# The options, and the flags that hold for everything when the project is built for itself. As a part of another
+# project it adds nothing but its libraries and leaves that project's flags alone.
+
+option(TAV_BUILD_TESTS "Build the tests" ${PROJECT_IS_TOP_LEVEL})
+option(TAV_BUILD_EXAMPLES "Build the examples" ${PROJECT_IS_TOP_LEVEL})
+option(TAV_BUILD_TOOLS "Build the command line program" ${PROJECT_IS_TOP_LEVEL})
+option(TAV_BUILD_BENCH "Build the benchmarks" OFF)
+option(TAV_INSTALL "Add the libraries to what is installed" ${PROJECT_IS_TOP_LEVEL})
+option(TAV_WERROR "Treat warnings as errors" ${PROJECT_IS_TOP_LEVEL})
+set(TAV_SANITIZE "" CACHE STRING "Sanitizers, as -fsanitize takes them: address,undefined or thread")
+
+# Shared unless BUILD_SHARED_LIBS says otherwise; the variable itself is the surrounding project's.
+if(DEFINED BUILD_SHARED_LIBS AND NOT BUILD_SHARED_LIBS)
+  set(TAV_LIBRARY_TYPE STATIC)
+else()
+  set(TAV_LIBRARY_TYPE SHARED)
+endif()
+
+if(PROJECT_IS_TOP_LEVEL)
+  set(CMAKE_EXPORT_COMPILE_COMMANDS ON)
+  set(CMAKE_CXX_STANDARD 20)
+  set(CMAKE_CXX_STANDARD_REQUIRED ON)
+  set(CMAKE_CXX_EXTENSIONS OFF)
+  if(NOT CMAKE_BUILD_TYPE AND NOT CMAKE_CONFIGURATION_TYPES)
+    set(CMAKE_BUILD_TYPE Release CACHE STRING "Kind of build" FORCE)
+  endif()
+  if(CMAKE_CXX_COMPILER_ID MATCHES "GNU|Clang")
+    add_compile_options(-Wall -Wextra -Wpedantic -Wconversion -Wshadow)
+    if(TAV_WERROR)
+      add_compile_options(-Werror)
+    endif()
+  endif()
+endif()
+
+if(TAV_SANITIZE)
+  # The whole program has to agree on them, so they are no property of single targets.
+  add_compile_options(-fsanitize=${TAV_SANITIZE} -fno-sanitize-recover=all -fno-omit-frame-pointer)
+  add_link_options(-fsanitize=${TAV_SANITIZE})
+endif()

@@ -1,0 +1,40 @@
+#!/usr/bin/env bash
+# Builds the Debian packages, runs lintian over them, and installs, uses and removes them in a fresh root.
+#   check-packages.sh [BUILD_FOLDER]        default: build/package
+set -euo pipefail
+cd "$(dirname "${BASH_SOURCE[0]}")/.."
+build=${1:-build/package}
+
+work=$(mktemp -d)
+trap 'rm -rf "$work"' EXIT
+quietly() { "$@" >"$work/log" 2>&1 || { cat "$work/log"; return 1; }; }
+
+quietly cmake -S . -B "$build" -G Ninja -DCMAKE_BUILD_TYPE=Release -DCMAKE_INSTALL_PREFIX=/usr \
+  -DCMAKE_SKIP_INSTALL_RPATH=ON -DTAV_BUILD_TESTS=OFF -DTAV_BUILD_EXAMPLES=OFF
+quietly cmake --build "$build" --parallel "$(nproc)"
+quietly cpack --config "$build/CPackConfig.cmake" -B "$work/packages"
+mapfile -t packages < <(find "$work/packages" -maxdepth 1 -name '*.deb' | sort)
+((${#packages[@]} == 3)) || { echo "expected three packages, got: ${packages[*]}"; exit 1; }
+
+echo "== lintian"
+lintian --fail-on error --suppress-tags initial-upload-closes-no-bugs "${packages[@]}"
+
+echo "== install in a fresh root"
+root=$work/root
+mkdir -p "$root/var/lib/dpkg/info" "$root/var/lib/dpkg/updates"
+: >"$root/var/lib/dpkg/status"
+dpkg_here() { dpkg --root="$root" --log=/dev/null --force-depends --force-not-root --force-script-chrootless "$@"; }
+quietly dpkg_here --install "${packages[@]}"
+libraries=$(dirname "$(find "$root/usr/lib" -name 'libtav.so.1')")
+
+echo "== run"
+LD_LIBRARY_PATH=$libraries "$root/usr/bin/tav" --version
+read -ra flags <<<"$(PKG_CONFIG_PATH=$libraries/pkgconfig pkg-config --cflags --libs tav)"
+g++ -std=c++20 tests/install/outside/main.cpp -o "$work/outside" "${flags[@]}"
+LD_LIBRARY_PATH=$libraries "$work/outside"
+
+echo "== remove"
+quietly dpkg_here --purge tav-tools libtav-dev libtav1
+left=$(find "$root" -type f -not -path "$root/var/lib/dpkg/*")
+[[ -z $left ]] || { echo "left behind: $left"; exit 1; }
+echo "the packages install, run and go without a trace"

@@ -1,0 +1,106 @@
+#!/usr/bin/env python3
+"""Holds the order of the rooms: what each folder of the source tree may include and test for.
+
+    check-rooms.py [ROOT]
+
+Includes point one way: tools -> api -> storage, dictionary -> format -> kor. The operating system, its headers and
+the byte order are kor's business.
+"""
+import pathlib
+import re
+import sys
+
+# Room -> the rooms whose internal headers it may include. Public headers (tav/...) are open to all but kor.
+ROOMS = {
+    "kor": {"kor"},
+    "format": {"format", "kor"},
+    "storage": {"storage", "format", "kor"},
+    "dictionary": {"dictionary", "format", "kor"},
+    "api": {"api", "storage", "dictionary", "format", "kor"},
+    "tools": {"tools"},
+    "include": set(),
+}
+# libkor knows nothing of libtav.
+KOR_PUBLIC = {"tav/kor.h", "tav/codes.h", "tav/byteOrder.h"}
+KOR_HEADERS = {f"include/{header}" for header in KOR_PUBLIC}
+# Who may know the platform: libkor, and the one file of the program that describes the machine.
+PLATFORM = ("kor/", "include/tav/kor.h", "include/tav/byteOrder.h", "tools/machine.cpp")
+# Libraries of others that a room may use.
+THIRD_PARTY = {"tools": ("CLI/", "nlohmann/")}
+
+STANDARD = set(
+    """algorithm any array atomic barrier bit bitset cassert cctype cerrno cfenv cfloat charconv chrono cinttypes
+    climits clocale cmath codecvt compare complex concepts condition_variable coroutine csetjmp csignal cstdarg cstddef
+    cstdint cstdio cstdlib cstring ctime cuchar cwchar cwctype deque exception execution filesystem format
+    forward_list fstream functional future initializer_list iomanip ios iosfwd iostream istream iterator latch limits
+    list locale map memory memory_resource mutex new numbers numeric optional ostream queue random ranges ratio regex
+    scoped_allocator semaphore set shared_mutex source_location span sstream stack stdexcept stop_token streambuf
+    string string_view strstream syncstream system_error thread tuple type_traits typeindex typeinfo unordered_map
+    unordered_set utility valarray variant vector version""".split()
+)
+
+INCLUDE = re.compile(r'^\s*#\s*include\s*(?P<open>[<"])(?P<path>[^>"]+)[>"]')
+PLATFORM_TEST = re.compile(
+    r"\b(_WIN32|_WIN64|WIN32|__unix__|__linux__|__linux|__APPLE__|__FreeBSD__|_MSC_VER|__MINGW\w*|__CYGWIN__|"
+    r"__BYTE_ORDER__|__BYTE_ORDER|__ORDER_\w+_ENDIAN__|__(?:BIG|LITTLE)_ENDIAN__|WORDS_BIGENDIAN|"
+    r"std::endian|htonl|htons|ntohl|ntohs|hto[bl]e(?:16|32|64)|[bl]e(?:16|32|64)toh)\b"
+)
+COMMENT = re.compile(r"//.*$")
+
+
+def include_error(name, room, opening, path):
+    """Why a file must not include `path`, or None."""
+    first = path.split("/")[0]
+    if path.startswith("tav/"):
+        if (room == "kor" or name in KOR_HEADERS) and path not in KOR_PUBLIC:
+            return f"libkor includes {path} of libtav"
+        return None
+    if opening == '"':
+        if "/" not in path:
+            return f'"{path}" is named without its room'
+        if first in ROOMS and first in ROOMS[room]:
+            return None
+        return f"{room} must not include {path}"
+    if path in STANDARD or name.startswith(PLATFORM) or path.startswith(THIRD_PARTY.get(room, ())):
+        return None
+    return f"<{path}> is no header of the standard library; the system is reached through kor"
+
+
+def check_text(name, text):
+    """Yields (line number, what is wrong) of one file; `name` is its path from the root."""
+    room = name.split("/")[0]
+    for number, line in enumerate(text.splitlines(), start=1):
+        match = INCLUDE.match(line)
+        if match:
+            error = include_error(name, room, match["open"], match["path"])
+            if error:
+                yield number, error
+        elif not name.startswith(PLATFORM):
+            found = PLATFORM_TEST.search(COMMENT.sub("", line))
+            if found:
+                yield number, f"{found[0]}: the platform and the byte order are kor's business"
+
+
+def check_tree(root):
+    """Returns (number of files looked at, findings as lines of text)."""
+    files = 0
+    findings = []
+    for room in ROOMS:
+        for path in sorted((root / room).rglob("*")):
+            if path.suffix not in (".h", ".hpp", ".cpp", ".def"):
+                continue
+            files += 1
+            name = path.relative_to(root).as_posix()
+            findings += [f"{name}:{line}: {what}" for line, what in check_text(name, path.read_text(encoding="utf-8"))]
+    return files, findings
+
+
+def main(arguments):
+    root = pathlib.Path(arguments[0]) if arguments else pathlib.Path(__file__).resolve().parent.parent
+    files, findings = check_tree(root)
+    print("\n".join(findings + [f"{files} files, {len(findings)} findings"]))
+    return 1 if findings or files == 0 else 0
+
+
+if __name__ == "__main__":
+    sys.exit(main(sys.argv[1:]))

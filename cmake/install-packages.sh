@@ -1,0 +1,60 @@
+#!/usr/bin/env bash
+# Installs the Debian packages of the named groups that are missing. This is the one list of them.
+#   cmake/install-packages.sh GROUP...        groups: build, test, full
+set -euo pipefail
+
+declare -A groups=(
+  [build]="g++ cmake ninja-build libcli11-dev nlohmann-json3-dev"
+  [test]="libgtest-dev libgmock-dev pkg-config python3 binutils"
+  [full]="clang clang-format clang-tidy libclang-rt-dev ccache"
+)
+
+if (($# == 0)); then
+  echo "usage: $0 GROUP...   (groups: ${!groups[*]})" >&2
+  exit 2
+fi
+
+wanted=()
+for group in "$@"; do
+  if [[ -z ${groups[$group]:-} ]]; then
+    echo "$0: no group '$group'; there are: ${!groups[*]}" >&2
+    exit 2
+  fi
+  read -ra names <<<"${groups[$group]}"
+  wanted+=("${names[@]}")
+done
+
+if ! command -v apt-get >/dev/null || ! command -v dpkg-query >/dev/null; then
+  echo "$0: this script installs with apt-get, which is not here; install the equivalents of: ${wanted[*]}" >&2
+  exit 1
+fi
+
+missing=()
+for name in "${wanted[@]}"; do
+  # shellcheck disable=SC2016  # the variable is dpkg-query's, not the shell's
+  [[ $(dpkg-query -W -f='${db:Status-Status}' "$name" 2>/dev/null) == installed ]] || missing+=("$name")
+done
+((${#missing[@]} > 0)) || exit 0
+
+as_root=()
+if ((EUID != 0)); then
+  if ! command -v sudo >/dev/null; then
+    echo "$0: missing packages: ${missing[*]}; run as root, or install sudo" >&2
+    exit 1
+  fi
+  as_root=(sudo)
+fi
+
+echo "installing ${missing[*]}"
+log=$(mktemp)
+trap 'rm -f "$log"' EXIT
+quietly()
+{
+  if ! "${as_root[@]}" env DEBIAN_FRONTEND=noninteractive "$@" >"$log" 2>&1 </dev/null; then
+    cat "$log" >&2
+    echo "$0: '$*' failed; these packages are missing: ${missing[*]}" >&2
+    exit 1
+  fi
+}
+quietly apt-get update -qq
+quietly apt-get install -y -qq --no-install-recommends "${missing[@]}"

@@ -1,0 +1,119 @@
+#!/usr/bin/env bash
+# Installs what is missing, builds and runs every test.
+#   ./test.sh          with g++, optimised
+#   ./test.sh --full   what CI runs: the checks of the sources, both compilers, the sanitizers, static libraries
+set -euo pipefail
+cd "$(dirname "${BASH_SOURCE[0]}")"
+
+passed=0
+failed=0
+skipped=0
+
+# stage TITLE COMMAND...: runs the command under a header and prints how long it took.
+stage()
+{
+  local title=$1 start=$SECONDS
+  shift
+  printf '\n== %s\n' "$title"
+  "$@"
+  printf '== %s: %d s\n' "$title" $((SECONDS - start))
+}
+
+totals()
+{
+  local line="$passed passed, $failed failed"
+  if ((skipped > 0)); then line+=", $skipped skipped"; fi
+  printf '\n%s\n' "$line"
+}
+
+build()
+{
+  local preset=$1
+  shift
+  cmake --preset "$preset" -DTAV_BUILD_TESTS=ON -DTAV_BUILD_TOOLS=ON >"$work/configure.log" || { cat "$work/configure.log"; return 1; }
+  cmake --build --preset "$preset" --parallel "$(nproc)" "$@" >"$work/build.log" || { grep -v '^\[[0-9]*/' "$work/build.log"; return 1; }
+}
+
+# attribute NAME: a number in the head of the report that ctest wrote.
+attribute()
+{
+  grep -m 1 -oE "^[[:space:]]*$1=\"[0-9]+\"" "$work/report.xml" | grep -oE '[0-9]+'
+}
+
+# run_tests PRESET [CTEST ARGUMENT...]: runs them and adds to the totals what ctest's own report counts. A run without
+# a test is a failure.
+run_tests()
+{
+  local preset=$1 status=0 tests bad out
+  shift
+  rm -f "$work/report.xml"
+  ctest --preset "$preset" --parallel "$(nproc)" --output-junit "$work/report.xml" "$@" >"$work/tests.log" 2>&1 || status=$?
+  [[ -s $work/report.xml ]] || { cat "$work/tests.log"; echo "no report of the tests of preset $preset"; return 1; }
+  tests=$(attribute tests)
+  bad=$(attribute failures)
+  out=$(($(attribute skipped) + $(attribute disabled)))
+  passed=$((passed + tests - bad - out))
+  failed=$((failed + bad))
+  skipped=$((skipped + out))
+  echo "$tests tests, $bad failed, $out skipped"
+  if ((status != 0 || bad > 0 || tests == out)); then
+    sed -n '/Test project/,$p' "$work/tests.log" | grep -vE '^ *[0-9]+/[0-9]+ Test .* Passed|^ *Start ' || true
+    totals
+    return 1
+  fi
+}
+
+build_and_test()
+{
+  build "$1"
+  run_tests "$@"
+}
+
+check_tidy()
+{
+  cmake --preset clang -DTAV_BUILD_TESTS=OFF -DTAV_BUILD_TOOLS=OFF >"$work/configure.log" || { cat "$work/configure.log"; return 1; }
+  find kor format storage dictionary api -name '*.cpp' ! -name '*Windows.cpp' -print0 |
+    xargs -0 -n 2 -P "$(nproc)" clang-tidy --quiet -p build/clang 2>"$work/tidy.log" || { cat "$work/tidy.log"; return 1; }
+}
+
+check_thread()
+{
+  build tsan --target kor_tests
+  run_tests tsan --label-regex '^kor$'
+}
+
+full()
+{
+  stage "format" cmake/format.sh --check
+  stage "rooms" cmake/check-rooms.py
+  stage "clang-tidy" check_tidy
+  stage "demo" ./demo.sh
+  stage "g++" build_and_test release
+  stage "clang++" build_and_test clang
+  stage "static libraries" build_and_test static
+  stage "g++, address and undefined behaviour" build_and_test asan
+  stage "clang++, address and undefined behaviour" build_and_test asan-clang
+  stage "g++, threads" check_thread
+}
+
+work=$(mktemp -d)
+trap 'rm -rf "$work"' EXIT
+
+case ${1:-} in
+  "")
+    stage "packages" cmake/install-packages.sh build test
+    stage "g++" build_and_test release
+    ;;
+  --full)
+    stage "packages" cmake/install-packages.sh build test full
+    # The same sources are compiled again and again, at every place where the project is checked out.
+    export CMAKE_CXX_COMPILER_LAUNCHER=ccache CCACHE_BASEDIR=$PWD CCACHE_NOHASHDIR=1
+    export CCACHE_SLOPPINESS=pch_defines,time_macros,include_file_mtime,include_file_ctime
+    full
+    ;;
+  *)
+    echo "usage: $0 [--full]" >&2
+    exit 2
+    ;;
+esac
+totals

@@ -1,0 +1,56 @@
+#!/usr/bin/env bash
+# Installs a build into a fresh prefix, moves the prefix, and builds and runs a small project from outside against it:
+# with the CMake package and with pkg-config.
+#   run.sh BUILD_FOLDER [COMPILER]       the build is complete; shared or static, as it was configured
+set -euo pipefail
+here=$(cd "$(dirname "${BASH_SOURCE[0]}")" && pwd)
+build=$(cd "$1" && pwd)
+compiler=${2:-c++}
+
+work=$(mktemp -d)
+trap 'rm -rf "$work"' EXIT
+prefix=$work/moved
+
+cmake --install "$build" --prefix "$work/installed" >"$work/install.log"
+mv "$work/installed" "$prefix"
+if grep -rIlF -e "$work/installed" -e "$build" "$prefix"; then
+  echo "the installed files above name a folder of the build"
+  exit 1
+fi
+if [[ -e $prefix/include/tav && -z $(find "$prefix/include" -name '*.h') ]]; then
+  echo "no headers were installed"
+  exit 1
+fi
+
+echo "== CMake package"
+cmake -S "$here/outside" -B "$work/outside" -DCMAKE_PREFIX_PATH="$prefix" -DCMAKE_CXX_COMPILER="$compiler" \
+  -DCMAKE_FIND_USE_PACKAGE_REGISTRY=OFF >"$work/configure.log"
+grep -q "tav_DIR:PATH=$prefix/" "$work/outside/CMakeCache.txt"
+cmake --build "$work/outside"
+"$work/outside/outside"
+"$work/outside/outside_kor"
+
+echo "== pkg-config"
+PKG_CONFIG_PATH=$(dirname "$(find "$prefix" -name tav.pc)")
+export PKG_CONFIG_PATH
+mode=()
+if [[ -n $(find "$prefix" -name libtav.a) ]]; then
+  mode=(--static)
+else
+  LD_LIBRARY_PATH=$(pkg-config --variable=libdir tav)
+  export LD_LIBRARY_PATH
+fi
+pkg-config --print-errors --exact-version="$(sed -n 's/^CMAKE_PROJECT_VERSION:STATIC=//p' "$build/CMakeCache.txt")" tav
+for part in tav:main kor:kor; do
+  read -ra flags <<<"$(pkg-config "${mode[@]}" --cflags --libs "${part%%:*}")"
+  program=$work/${part##*:}
+  "$compiler" -std=c++20 -Wall -Wextra -Werror "$here/outside/${part##*:}.cpp" -o "$program" "${flags[@]}"
+  "$program"
+done
+
+if ((${#mode[@]} == 0)); then
+  echo "== shared libraries find each other"
+  unset LD_LIBRARY_PATH
+  readelf -d "$work/main" | grep -q 'NEEDED.*libtav\.so\.1' || { echo "the program does not ask for libtav.so.1"; exit 1; }
+fi
+echo "the installed package works"
