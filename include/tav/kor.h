@@ -136,7 +136,7 @@ struct KORTraceRecord
 };
 
 /// Receives records. It may be called by several threads at a time and must not call back into the handle
-/// that is being traced; it may start and stop traces.
+/// that is being traced; it may start and stop traces. What it does itself is not traced: that would never end.
 typedef void (*KORTraceSink)(void* context, const KORTraceRecord* record);
 
 extern "C" {
