@@ -76,6 +76,13 @@ check_tidy()
     xargs -0 -n 2 -P "$(nproc)" clang-tidy --quiet -p build/clang 2>"$work/tidy.log" || { cat "$work/tidy.log"; return 1; }
 }
 
+check_documents()
+{
+  mkdir -p build
+  doxygen docs/Doxyfile
+  tests/docs/check_links.py .
+}
+
 check_thread()
 {
   build tsan --target kor_tests
@@ -87,6 +94,7 @@ full()
   stage "format" cmake/format.sh --check
   stage "rooms" cmake/check-rooms.py
   stage "clang-tidy" check_tidy
+  stage "documents" check_documents
   stage "demo" ./demo.sh
   stage "g++" build_and_test release
   stage "clang++" build_and_test clang
@@ -94,6 +102,8 @@ full()
   stage "g++, address and undefined behaviour" build_and_test asan
   stage "clang++, address and undefined behaviour" build_and_test asan-clang
   stage "g++, threads" check_thread
+  stage "Debian packages" cmake/check-packages.sh
+  stage "binary interface" tests/abi/check.sh
 }
 
 work=$(mktemp -d)

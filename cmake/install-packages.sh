@@ -5,8 +5,8 @@ set -euo pipefail
 
 declare -A groups=(
   [build]="g++ cmake ninja-build libcli11-dev nlohmann-json3-dev"
-  [test]="libgtest-dev libgmock-dev pkg-config python3 binutils"
-  [full]="clang clang-format clang-tidy libclang-rt-dev ccache"
+  [test]="libgtest-dev libgmock-dev pkg-config python3 binutils jq libxml2-utils"
+  [full]="clang clang-format clang-tidy libclang-rt-dev ccache doxygen lintian dpkg-dev file gzip abigail-tools"
 )
 
 if (($# == 0)); then
