@@ -34,12 +34,12 @@ void setDay(uint64_t days, TAVDate& date)
   {
     ++day;
   }
-  for (uint16_t month = 1; month < kMonthStarts.size(); ++month)
+  for (size_t month = 1; month < kMonthStarts.size(); ++month)
   {
-    if (kMonthStarts[month - 1U] < day && day <= kMonthStarts[month])
+    if (kMonthStarts[month - 1] < day && day <= kMonthStarts[month])
     {
-      date.month = month;
-      date.day = static_cast<uint16_t>(day - kMonthStarts[month - 1U]);
+      date.month = static_cast<uint16_t>(month);
+      date.day = static_cast<uint16_t>(day - kMonthStarts[month - 1]);
     }
   }
   date.year = static_cast<uint16_t>(year);

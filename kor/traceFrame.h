@@ -30,7 +30,7 @@ namespace trace
 template<class Value>
 KORTraceItem item(const Value& value)
 {
-  return {&value, sizeof value};
+  return {&value, sizeof value}; // NOLINT(bugprone-sizeof-expression): of a pointer, its own bytes are meant
 }
 
 inline KORTraceItem item(const KORTraceItem& ready)

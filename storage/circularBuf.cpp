@@ -363,11 +363,7 @@ uint32_t TAVCircularBuf::offsetOf(uint64_t value, uint64_t& offset) const
   TraceFrame frame(probe::cbIndexToOffset);
   frame.dump(0, value);
   const uint64_t headReached = head <= value ? 1 : 0;
-  if (head < tail && headReached <= tail)
-  {
-    offset = headOffset - head + value;
-  }
-  else if (head > tail && value > tail && headReached < ringSize)
+  if ((head < tail && headReached <= tail) || (head > tail && value > tail && headReached < ringSize))
   {
     offset = headOffset - head + value;
   }

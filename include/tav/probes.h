@@ -94,7 +94,7 @@ namespace tav::probe
 /// A probe id is this base plus a function number.
 inline constexpr uint32_t kBase = 0x088A0000;
 
-#define TAV_DEFINE_PROBE(name, number, function) inline constexpr uint32_t name = kBase + number; ///< function
+#define TAV_DEFINE_PROBE(name, number, function) inline constexpr uint32_t name = kBase + (number); ///< function
 TAV_PROBE_LIST(TAV_DEFINE_PROBE)
 #undef TAV_DEFINE_PROBE
 
@@ -104,7 +104,7 @@ constexpr const char* functionName(uint32_t id)
   switch (id)
   {
 #define TAV_NAME_PROBE(name, number, function) \
-  case kBase + number:                         \
+  case kBase + (number):                         \
     return function;
     TAV_PROBE_LIST(TAV_NAME_PROBE)
 #undef TAV_NAME_PROBE
