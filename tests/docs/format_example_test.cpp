@@ -30,8 +30,9 @@ Bytes bytesOfPage(const std::string& path)
       continue;
     }
     EXPECT_EQ(std::stoul(line.substr(2), nullptr, 16), bytes.size()) << line;
-    std::istringstream cells(line.substr(line.find('`') + 1, line.rfind("` |") - line.find('`') - 1));
-    for (std::string byte; cells >> byte && byte.size() == 2;)
+    const size_t first = line.find('`') + 1;
+    std::istringstream cells(line.substr(first, line.find('`', first) - first));
+    for (std::string byte; cells >> byte;)
     {
       bytes.push_back(static_cast<uint8_t>(std::stoul(byte, nullptr, 16)));
     }
