@@ -104,7 +104,7 @@ constexpr const char* functionName(uint32_t id)
   switch (id)
   {
 #define TAV_NAME_PROBE(name, number, function) \
-  case kBase + (number):                         \
+  case kBase + (number):                       \
     return function;
     TAV_PROBE_LIST(TAV_NAME_PROBE)
 #undef TAV_NAME_PROBE

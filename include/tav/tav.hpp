@@ -1,10 +1,11 @@
 /// @file tav.hpp
 /// The C++ layer of libtav, header only: writers and readers that own what they use, groups that close themselves,
 /// values by their C++ type, ranges, paths, and errors as std::error_code. Every operation comes in a form that throws
-/// std::system_error and in one with a std::error_code at the end.
+/// std::system_error and in one with a std::error_code at the end, which throws nothing but what an allocation throws.
 #pragma once
 
 #include "tav/cpp/error.hpp"
 #include "tav/cpp/reader.hpp"
+#include "tav/cpp/updater.hpp"
 #include "tav/cpp/writer.hpp"
 #include "tav/tav.h"

@@ -105,6 +105,12 @@ namespace detail
   throw std::system_error(makeError(code), what);
 }
 
+/// The form with an error code of an operation.
+inline void report(uint32_t code, std::error_code& ec) noexcept
+{
+  ec = makeError(code);
+}
+
 /// The throwing form of an operation: nothing for success.
 inline void demand(uint32_t code, const char* what)
 {

@@ -5,6 +5,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <iterator>
+#include <optional>
 #include <ranges>
 #include <vector>
 
@@ -16,25 +17,26 @@ namespace tav
 namespace detail
 {
 
-/// An iterator over a walk that lives in its range. `Walk` has `done`, `current` and `advance()`.
+/// An iterator over a walk that lives in its range. `Walk` has `isDone()`, `current()` and `advance()`.
 template<class Walk>
 class WalkIterator
 {
 public:
+  using iterator_concept = std::input_iterator_tag;
   using value_type = Node;
   using difference_type = std::ptrdiff_t;
 
   WalkIterator() = default;
-  explicit WalkIterator(Walk& walk)
+  explicit WalkIterator(Walk& walk) noexcept
       : walk_(&walk)
   {
   }
 
-  const Node& operator*() const
+  const Node& operator*() const noexcept
   {
     return walk_->current();
   }
-  const Node* operator->() const
+  const Node* operator->() const noexcept
   {
     return &walk_->current();
   }
@@ -47,13 +49,13 @@ public:
   {
     walk_->advance();
   }
-  friend bool operator==(const WalkIterator& iterator, std::default_sentinel_t)
+  friend bool operator==(const WalkIterator& iterator, std::default_sentinel_t) noexcept
   {
     return iterator.isAtEnd();
   }
 
 private:
-  [[nodiscard]] bool isAtEnd() const
+  [[nodiscard]] bool isAtEnd() const noexcept
   {
     return walk_->isDone();
   }
@@ -61,205 +63,233 @@ private:
   Walk* walk_ = nullptr;
 };
 
+/// The end of a walk: kept for who asks, or thrown.
+inline void endWalk(uint32_t rc, std::error_code* ec, const char* what)
+{
+  const uint32_t failure = rc == TAV_RC_NO_MORE_CHILDREN ? TAV_RC_OK : rc;
+  if (ec == nullptr)
+  {
+    demand(failure, what);
+    return;
+  }
+  report(failure, *ec);
+}
+
 } // namespace detail
 
-/// The children of a group. A single pass; the range holds the place of the walk.
+/// Children of a group. A single pass; the range holds the place of the walk, so an iterator must not outlive it.
 class ChildRange : public std::ranges::view_base
 {
 public:
-  ChildRange(const Node& parent, std::error_code* ec, EndElements endElements)
-      : parent_(parent), ec_(ec), endElements_(endElements)
-  {
-  }
   ChildRange(ChildRange&&) = default;
   ChildRange& operator=(ChildRange&&) = default;
 
-  detail::WalkIterator<ChildRange> begin()
+  detail::WalkIterator<ChildRange> begin() &
   {
     if (!begun_)
     {
-      advance();
+      begun_ = true;
+      first_ == TAV_RC_OK ? advance() : finish(first_);
     }
     return detail::WalkIterator<ChildRange>(*this);
   }
-  static std::default_sentinel_t end()
+  static std::default_sentinel_t end() noexcept
   {
     return std::default_sentinel;
   }
 
 private:
+  friend class Node;
   friend class detail::WalkIterator<ChildRange>;
-  friend class DescendantRange;
 
-  [[nodiscard]] const Node& current() const
+  /// All children of a node.
+  ChildRange(const Node& parent, EndElements endElements, std::error_code* ec) noexcept
+      : current_(parent.state_), ec_(ec), endElements_(endElements),
+        first_(parent.isGroup() ? TAV_RC_OK : TAV_RC_NO_MORE_CHILDREN)
+  {
+    current_.parent_ = parent.data_.header;
+  }
+  struct Behind
+  {
+    const Node& node;
+  };
+  /// The siblings behind a node.
+  ChildRange(Behind behind, EndElements endElements, std::error_code* ec) noexcept
+      : current_(behind.node), ec_(ec), endElements_(endElements), hasReference_(true),
+        first_(whyNoSiblings(behind.node))
+  {
+  }
+
+  /// The stream's first node stands alone.
+  static uint32_t whyNoSiblings(const Node& node) noexcept
+  {
+    if (node.hasParent())
+    {
+      return TAV_RC_OK;
+    }
+    return node.state_ != nullptr && node.isRoot_ ? TAV_RC_NO_MORE_CHILDREN : TAV_RC_NOT_SUPPORTED;
+  }
+
+  [[nodiscard]] const Node& current() const noexcept
   {
     return current_;
   }
-  [[nodiscard]] bool isDone() const
+  [[nodiscard]] bool isDone() const noexcept
   {
     return done_;
   }
 
   void advance()
   {
+    uint32_t rc = TAV_RC_OK;
     do
     {
-      step();
-    } while (!done_ && endElements_ == EndElements::skip && layout::isEndElement(current_.elm()));
+      rc = step();
+    } while (rc == TAV_RC_OK && endElements_ == EndElements::skip && layout::isEndElement(current_.elm()));
+    if (rc != TAV_RC_OK)
+    {
+      finish(rc);
+    }
   }
 
-  void step()
+  void finish(uint32_t rc)
   {
-    TAVHeaderData next;
-    TAVHeader* const reference = begun_ ? &current_.header_ : nullptr;
-    uint32_t rc = TAV_RC_NO_MORE_CHILDREN;
-    begun_ = true;
-    if (parent_.isGroup())
-    {
-      ++parent_.state_->fetches;
-      rc = tavGetNextChild(0, parent_.state_->handle, &parent_.header_, reference, &next);
-      // A sibling behind a group that was never closed is found by its eye catcher, which damage can place anywhere.
-      if (rc == TAV_RC_OK && reference != nullptr && next.header.nodeOffset <= reference->nodeOffset)
-      {
-        rc = TAV_RC_OUTSIDE_PARENT;
-      }
-    }
-    done_ = rc != TAV_RC_OK;
-    if (!done_)
-    {
-      current_ = Node(*parent_.state_, next);
-      return;
-    }
-    const uint32_t failure = rc == TAV_RC_NO_MORE_CHILDREN ? TAV_RC_OK : rc;
-    if (ec_ == nullptr)
-    {
-      detail::demand(failure, "walking the children of a group");
-      return;
-    }
-    *ec_ = makeError(failure);
+    done_ = true;
+    detail::endWalk(rc, ec_, "walking the nodes of a group");
   }
 
-  Node parent_;
-  Node current_;
+  uint32_t step() noexcept
+  {
+    const uint64_t last = current_.offset();
+    TAVHeader* const reference = hasReference_ ? &current_.data_.header : nullptr;
+    const uint32_t rc = current_.readNext(&current_.parent_, reference);
+    // A sibling behind a group that was never closed is found by its eye catcher, which damage can place anywhere.
+    if (rc == TAV_RC_OK && hasReference_ && current_.offset() <= last)
+    {
+      return TAV_RC_OUTSIDE_PARENT;
+    }
+    hasReference_ = true;
+    return rc;
+  }
+
+  Node current_; ///< knows the group that is walked
   std::error_code* ec_;
   EndElements endElements_;
+  bool hasReference_ = false;
   bool begun_ = false;
   bool done_ = false;
+  uint32_t first_; ///< why there is nothing to walk
 };
 
 /// All nodes below a group, depth first. A single pass; the range holds the place of the walk, 32 bytes a level.
 class DescendantRange : public std::ranges::view_base
 {
 public:
-  DescendantRange(const Node& start, std::error_code* ec, EndElements endElements)
-      : start_(start), ec_(ec), endElements_(endElements)
-  {
-  }
   DescendantRange(DescendantRange&&) = default;
   DescendantRange& operator=(DescendantRange&&) = default;
 
-  detail::WalkIterator<DescendantRange> begin()
+  detail::WalkIterator<DescendantRange> begin() &
   {
     if (!begun_)
     {
       begun_ = true;
-      last_ = start_.offset();
-      if (ec_ != nullptr)
-      {
-        ec_->clear();
-      }
-      done_ = !start_.isGroup();
+      done_ = open_.empty();
       if (!done_)
       {
-        open_.push_back(start_.header_);
         advance();
       }
     }
     return detail::WalkIterator<DescendantRange>(*this);
   }
-  static std::default_sentinel_t end()
+  static std::default_sentinel_t end() noexcept
   {
     return std::default_sentinel;
   }
 
   /// Levels between the start and the present node; its children are on level 1.
-  [[nodiscard]] size_t depth() const
+  [[nodiscard]] size_t depth() const noexcept
   {
     return depth_;
   }
 
 private:
+  friend class Node;
   friend class detail::WalkIterator<DescendantRange>;
 
-  [[nodiscard]] const Node& current() const
+  DescendantRange(const Node& start, EndElements endElements, std::error_code* ec)
+      : current_(start), ec_(ec), endElements_(endElements)
+  {
+    if (start.isGroup())
+    {
+      open_.push_back(start.data_.header);
+    }
+  }
+
+  [[nodiscard]] const Node& current() const noexcept
   {
     return current_;
   }
-  [[nodiscard]] bool isDone() const
+  [[nodiscard]] bool isDone() const noexcept
   {
     return done_;
   }
 
   void advance()
   {
+    uint32_t rc = TAV_RC_OK;
     do
     {
-      step();
-    } while (!done_ && endElements_ == EndElements::skip && layout::isEndElement(current_.elm()));
+      rc = step();
+    } while (rc == TAV_RC_OK && endElements_ == EndElements::skip && layout::isEndElement(current_.elm()));
+    done_ = rc != TAV_RC_OK;
+    if (done_)
+    {
+      detail::endWalk(rc, ec_, "walking below a group");
+    }
   }
 
-  void step()
+  /// Down into a group, on to the sibling, or up until there is one.
+  uint32_t step()
   {
-    TAVHeader reference = current_.header_;
-    bool hasReference = depth_ != 0;
-    if (hasReference && current_.isGroup())
+    const uint64_t last = current_.offset();
+    TAVHeader ended;
+    TAVHeader* reference = depth_ != 0 ? &current_.data_.header : nullptr;
+    if (reference != nullptr && current_.isGroup())
     {
-      open_.push_back(reference);
-      hasReference = false;
+      open_.push_back(*reference);
+      reference = nullptr;
     }
     while (!open_.empty())
     {
-      TAVHeaderData next;
-      ++start_.state_->fetches;
-      uint32_t rc = tavGetNextChild(0, start_.state_->handle, &open_.back(), hasReference ? &reference : nullptr, &next);
-      if (rc == TAV_RC_NO_MORE_CHILDREN)
+      const uint32_t rc = current_.readNext(&open_.back(), reference);
+      if (rc != TAV_RC_NO_MORE_CHILDREN)
       {
-        reference = open_.back();
-        open_.pop_back();
-        hasReference = true;
-        continue;
+        return rc == TAV_RC_OK ? arrive(last) : rc;
       }
-      if (rc == TAV_RC_OK && next.header.nodeOffset <= last_)
-      {
-        rc = TAV_RC_OUTSIDE_PARENT; // backwards: only damage leads there
-      }
-      if (rc != TAV_RC_OK)
-      {
-        fail(rc);
-        return;
-      }
-      last_ = next.header.nodeOffset;
-      depth_ = open_.size();
-      current_ = Node(*start_.state_, next);
-      return;
+      ended = open_.back();
+      open_.pop_back();
+      reference = &ended;
     }
-    done_ = true;
+    return TAV_RC_NO_MORE_CHILDREN;
   }
 
-  void fail(uint32_t rc)
+  /// Backwards is where only damage leads.
+  uint32_t arrive(uint64_t last) noexcept
   {
-    done_ = true;
-    if (ec_ == nullptr)
+    if (current_.offset() <= last)
     {
-      detail::raise(rc, "walking below a group");
+      return TAV_RC_OUTSIDE_PARENT;
     }
-    *ec_ = makeError(rc);
+    if (current_.parent_.nodeOffset != open_.back().nodeOffset || depth_ == 0)
+    {
+      current_.parent_ = open_.back();
+    }
+    depth_ = open_.size();
+    return TAV_RC_OK;
   }
 
-  Node start_;
   Node current_;
   std::vector<TAVHeader> open_;
-  uint64_t last_ = 0;
   size_t depth_ = 0;
   std::error_code* ec_;
   EndElements endElements_;
@@ -269,24 +299,49 @@ private:
 
 inline ChildRange Node::children(EndElements endElements) const
 {
-  return {*this, nullptr, endElements};
+  return {*this, endElements, nullptr};
 }
 
 inline ChildRange Node::children(std::error_code& ec, EndElements endElements) const
 {
   ec.clear();
-  return {*this, &ec, endElements};
+  return {*this, endElements, &ec};
+}
+
+inline ChildRange Node::siblings(EndElements endElements) const
+{
+  return {ChildRange::Behind{*this}, endElements, nullptr};
+}
+
+inline ChildRange Node::siblings(std::error_code& ec, EndElements endElements) const
+{
+  ec.clear();
+  return {ChildRange::Behind{*this}, endElements, &ec};
 }
 
 inline DescendantRange Node::descendants(EndElements endElements) const
 {
-  return {*this, nullptr, endElements};
+  return {*this, endElements, nullptr};
 }
 
 inline DescendantRange Node::descendants(std::error_code& ec, EndElements endElements) const
 {
   ec.clear();
-  return {*this, &ec, endElements};
+  return {*this, endElements, &ec};
+}
+
+inline std::optional<Node> Node::next() const
+{
+  ChildRange behind = siblings();
+  const auto first = behind.begin();
+  return first == behind.end() ? std::nullopt : std::optional(*first);
+}
+
+inline std::optional<Node> Node::next(std::error_code& ec) const
+{
+  ChildRange behind = siblings(ec);
+  const auto first = behind.begin();
+  return first == behind.end() ? std::nullopt : std::optional(*first);
 }
 
 } // namespace tav

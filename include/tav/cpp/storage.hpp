@@ -36,7 +36,8 @@ namespace detail
 {
 
 /// Opens a handle over a storage.
-inline uint32_t openHandle(TAVSideStorage* storage, uint64_t mode, const StreamOptions& options, TAVHandle*& handle)
+inline uint32_t openHandle(TAVSideStorage* storage, uint64_t mode, const StreamOptions& options,
+                           TAVHandle*& handle) noexcept
 {
   const uint64_t root = options.root == Width::bits32 ? TAV_OPT_ROOT32 : 0;
   TAVInitParam param(storage, mode | root, options.ringBytes, 0,
@@ -58,10 +59,11 @@ inline uint32_t openFile(const std::filesystem::path& path, uint64_t options, st
 }
 
 /// A block of memory that grows ahead of what is written. The handle addresses it directly, so it is told of each move.
+/// Bytes that no node was written to are zero: paddings show them.
 class GrowingBlock
 {
 public:
-  GrowingBlock()
+  GrowingBlock() noexcept
       : storage_(nullptr, 0)
   {
   }
@@ -72,18 +74,32 @@ public:
   GrowingBlock(const GrowingBlock&) = delete;
   GrowingBlock& operator=(const GrowingBlock&) = delete;
 
-  TAVSideStorage& storage()
+  TAVSideStorage& storage() noexcept
   {
     return storage_;
   }
 
-  /// Makes room for `more` bytes behind `used`. New bytes are zero: paddings show them.
-  uint32_t reserve(TAVHandle* handle, uint64_t used, uint64_t more)
+  /// Makes room for `more` bytes behind `used`.
+  uint32_t reserve(TAVHandle* handle, uint64_t used, uint64_t more) noexcept
   {
     if (more < storage_.bufferSize && used < storage_.bufferSize - more) [[likely]]
     {
       return TAV_RC_OK;
     }
+    return grow(handle, used, more);
+  }
+
+  /// Wipes bytes that were taken back.
+  void clear(uint64_t from, uint64_t to) noexcept
+  {
+    std::memset(storage_.pBuffer + from, 0, static_cast<size_t>(to - from));
+  }
+
+private:
+  static constexpr uint64_t kFirstSize = 4096;
+
+  uint32_t grow(TAVHandle* handle, uint64_t used, uint64_t more) noexcept
+  {
     if (!layout::addChecked(more, used) || !layout::addChecked(more, kFirstSize))
     {
       return TAV_RC_NO_MEMORY;
@@ -110,8 +126,6 @@ public:
     return TAV_RC_OK;
   }
 
-private:
-  static constexpr uint64_t kFirstSize = 4096;
   TAVSSMemory storage_;
 };
 

@@ -1,0 +1,300 @@
+/// @file decode.hpp
+/// Payloads as C++ values.
+#pragma once
+
+#include <algorithm>
+#include <array>
+#include <chrono>
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+#include <utility>
+#include <vector>
+
+#include "tav/cpp/values.hpp"
+
+namespace tav::detail
+{
+
+/// A payload as it stands in the stream.
+struct RawValue
+{
+  uint16_t type;
+  const uint8_t* bytes;
+  uint64_t size;
+  bool swap; ///< the stream is in the other byte order
+
+  [[nodiscard]] size_t length() const noexcept
+  {
+    return static_cast<size_t>(size);
+  }
+};
+
+/// Copies a fixed-size value into this machine's order. TAV_RC_NOT_SUPPORTED for another type, TAV_RC_OUTSIDE_PARENT
+/// for another size.
+template<class Value>
+uint32_t fixedValue(const RawValue& raw, uint16_t type, Value& out) noexcept
+{
+  if (raw.type != type)
+  {
+    return TAV_RC_NOT_SUPPORTED;
+  }
+  if (raw.size != sizeof out)
+  {
+    return TAV_RC_OUTSIDE_PARENT;
+  }
+  const layout::SwapRule rule = layout::typeInfo(type).swapRule;
+  std::array<uint8_t, sizeof out> reversed;
+  const uint8_t* from = raw.bytes;
+  if (raw.swap && layout::swappedPrefix(rule, sizeof out) == sizeof out)
+  {
+    layout::swapPayload(rule, raw.bytes, reversed.data(), sizeof out);
+    from = reversed.data();
+  }
+  std::memcpy(&out, from, sizeof out);
+  return TAV_RC_OK;
+}
+
+template<StreamInteger T>
+uint32_t decode(const RawValue& raw, T& out) noexcept
+{
+  return fixedValue(raw, integerType<T>(), out);
+}
+
+inline uint32_t decode(const RawValue& raw, std::byte& out) noexcept
+{
+  return fixedValue(raw, TAV_TYPE_BYTE, out);
+}
+
+inline uint32_t decode(const RawValue& raw, TAVTimeStamp& out) noexcept
+{
+  return fixedValue(raw, TAV_TYPE_UTC_TIMESTAMP, out);
+}
+
+/// Any of the 128-bit types.
+template<Integer128 T>
+uint32_t decode(const RawValue& raw, T& out) noexcept
+{
+  if constexpr (BuiltinInteger128<T>)
+  {
+    return fixedValue(raw, std::same_as<T, BuiltinUint128> ? TAV_TYPE_UINT128 : TAV_TYPE_SINT128, out);
+  }
+  else
+  {
+    std::array<uint64_t, 2> words{};
+    const uint32_t rc = fixedValue(raw, std::same_as<T, Uint128> ? TAV_TYPE_UINT128 : TAV_TYPE_SINT128, words);
+    const auto [first, second] = words;
+    out.high = static_cast<decltype(out.high)>(kor::isLittleEndian ? second : first);
+    out.low = kor::isLittleEndian ? first : second;
+    return rc;
+  }
+}
+
+/// False for seconds that a clock of this precision cannot show.
+template<class Duration>
+bool fromTimeStamp(const TAVTimeStamp& stamp, std::chrono::sys_time<Duration>& time) noexcept
+{
+  using namespace std::chrono;
+  constexpr double most = std::min(9.2e12, duration<double>(Duration::max()).count()); // in microseconds: 63 bits
+  constexpr double fractions = 100;                                                    // can add a minute
+  if (!(static_cast<double>(stamp.seconds) < most - fractions))
+  {
+    return false;
+  }
+  const sys_seconds whole{seconds(static_cast<int64_t>(stamp.seconds))};
+  time = floor<Duration>(whole + milliseconds(stamp.fractionA) + microseconds(stamp.fractionB));
+  return true;
+}
+
+/// The moment. The time zone of the stamp is for showing it and moves nothing.
+template<class Duration>
+uint32_t decode(const RawValue& raw, std::chrono::sys_time<Duration>& out) noexcept
+{
+  TAVTimeStamp stamp{};
+  const uint32_t rc = decode(raw, stamp);
+  return rc == TAV_RC_OK && !fromTimeStamp(stamp, out) ? TAV_RC_OUTSIDE_PARENT : rc;
+}
+
+inline uint32_t decode(const RawValue& raw, std::string_view& out) noexcept
+{
+  if (raw.type != TAV_TYPE_ASCII_STRING)
+  {
+    return TAV_RC_NOT_SUPPORTED;
+  }
+  out = {reinterpret_cast<const char*>(raw.bytes), raw.length()};
+  return TAV_RC_OK;
+}
+
+inline uint32_t decode(const RawValue& raw, Utf8& out) noexcept
+{
+  if (raw.type != TAV_TYPE_UTF8_STRING)
+  {
+    return TAV_RC_NOT_SUPPORTED;
+  }
+  uint16_t codePage = 0;
+  if (raw.size < sizeof codePage)
+  {
+    return TAV_RC_OUTSIDE_PARENT;
+  }
+  std::memcpy(&codePage, raw.bytes, sizeof codePage);
+  out.codePage = raw.swap ? kor::byteswap16(codePage) : codePage;
+  out.text = {reinterpret_cast<const char*>(raw.bytes) + sizeof codePage, raw.length() - sizeof codePage};
+  return TAV_RC_OK;
+}
+
+inline uint32_t decode(const RawValue& raw, Utf8Text& out)
+{
+  Utf8 view;
+  const uint32_t rc = decode(raw, view);
+  out.text.assign(view.text);
+  out.codePage = view.codePage;
+  return rc;
+}
+
+/// Text of code page 1208 only: others are not what the type says.
+inline uint32_t decode(const RawValue& raw, std::u8string_view& out) noexcept
+{
+  Utf8 view;
+  const uint32_t rc = decode(raw, view);
+  if (rc != TAV_RC_OK)
+  {
+    return rc;
+  }
+  if (view.codePage != kCodePageUtf8)
+  {
+    return TAV_RC_NOT_SUPPORTED;
+  }
+  out = {reinterpret_cast<const char8_t*>(view.text.data()), view.text.size()};
+  return TAV_RC_OK;
+}
+
+inline uint32_t decode(const RawValue& raw, std::u8string& out)
+{
+  std::u8string_view view;
+  const uint32_t rc = decode(raw, view);
+  out.assign(view);
+  return rc;
+}
+
+/// Text of either string type, whatever its code page.
+inline uint32_t decode(const RawValue& raw, std::string& out)
+{
+  Utf8 view;
+  const bool ascii = raw.type == TAV_TYPE_ASCII_STRING;
+  const uint32_t rc = ascii ? decode(raw, view.text) : decode(raw, view);
+  out.assign(view.text);
+  return rc;
+}
+
+inline uint32_t decode(const RawValue& raw, std::span<const std::byte>& out) noexcept
+{
+  if (raw.type != TAV_TYPE_BINARY)
+  {
+    return TAV_RC_NOT_SUPPORTED;
+  }
+  out = {reinterpret_cast<const std::byte*>(raw.bytes), raw.length()};
+  return TAV_RC_OK;
+}
+
+inline uint32_t decode(const RawValue& raw, std::vector<std::byte>& out)
+{
+  std::span<const std::byte> view;
+  const uint32_t rc = decode(raw, view);
+  out.assign(view.begin(), view.end());
+  return rc;
+}
+
+inline uint32_t decode(const RawValue& raw, std::vector<uint64_t>& out)
+{
+  if (raw.type != TAV_TYPE_UINT64_ARRAY)
+  {
+    return TAV_RC_NOT_SUPPORTED;
+  }
+  if (raw.size % sizeof(uint64_t) != 0)
+  {
+    return TAV_RC_OUTSIDE_PARENT;
+  }
+  out.resize(raw.length() / sizeof(uint64_t));
+  auto* const to = reinterpret_cast<uint8_t*>(out.data());
+  if (raw.swap)
+  {
+    layout::swapPayload(layout::SwapRule::all64, raw.bytes, to, raw.size);
+  }
+  else if (raw.size != 0)
+  {
+    std::memcpy(to, raw.bytes, raw.length());
+  }
+  return TAV_RC_OK;
+}
+
+template<class T>
+concept Decodable = requires(const RawValue& raw, T& out)
+{
+  {
+    decode(raw, out)
+    } -> std::same_as<uint32_t>;
+};
+
+/// The number in a node of any integer type, if `T` can hold it.
+template<StreamInteger T>
+uint32_t decodeNumber(const RawValue& raw, T& out) noexcept
+{
+  const auto fit = [&out](auto number) {
+    if (!std::in_range<T>(number))
+    {
+      return TAV_RC_OUTSIDE_PARENT;
+    }
+    out = static_cast<T>(number);
+    return TAV_RC_OK;
+  };
+  const auto read = [&](auto number) {
+    const uint32_t rc = decode(raw, number);
+    return rc == TAV_RC_OK ? fit(number) : rc;
+  };
+  const auto readLong = [&](auto number) {
+    const uint32_t rc = decode(raw, number);
+    const bool negative = std::cmp_less(number.high, 0);
+    const auto sign = static_cast<uint64_t>(number.high); // all ones above a negative number, else zero
+    const auto low = static_cast<int64_t>(number.low);
+    const bool isShort = negative ? sign == ~uint64_t{0} && low < 0 : sign == 0;
+    return rc != TAV_RC_OK ? rc : !isShort ? TAV_RC_OUTSIDE_PARENT
+                              : negative   ? fit(low)
+                                           : fit(number.low);
+  };
+  switch (raw.type)
+  {
+  case TAV_TYPE_UINT8:
+    return read(uint8_t{});
+  case TAV_TYPE_SINT8:
+    return read(int8_t{});
+  case TAV_TYPE_UINT16:
+    return read(uint16_t{});
+  case TAV_TYPE_SINT16:
+    return read(int16_t{});
+  case TAV_TYPE_UINT32:
+    return read(uint32_t{});
+  case TAV_TYPE_SINT32:
+    return read(int32_t{});
+  case TAV_TYPE_UINT64:
+    return read(uint64_t{});
+  case TAV_TYPE_SINT64:
+    return read(int64_t{});
+  case TAV_TYPE_UINT128:
+    return readLong(Uint128{});
+  case TAV_TYPE_SINT128:
+    return readLong(Sint128{});
+  default:
+    return TAV_RC_NOT_SUPPORTED;
+  }
+}
+
+} // namespace tav::detail
+
+namespace tav
+{
+
+/// What Node::as gives.
+template<class T>
+concept Readable = detail::Decodable<T>;
+
+} // namespace tav

@@ -1,0 +1,214 @@
+/// @file encode.hpp
+/// C++ values as payloads.
+#pragma once
+
+#include <algorithm>
+#include <array>
+#include <chrono>
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+#include <memory>
+#include <new>
+#include <utility>
+
+#include "tav/cpp/values.hpp"
+
+namespace tav::detail
+{
+
+/// The C++ type of an integer type code; void for others.
+template<uint16_t Type>
+constexpr auto makeIntegerOf() noexcept
+{
+  // clang-format off
+  if constexpr (Type == TAV_TYPE_UINT8 || Type == TAV_TYPE_BYTE) return std::type_identity<uint8_t>();
+  else if constexpr (Type == TAV_TYPE_SINT8) return std::type_identity<int8_t>();
+  else if constexpr (Type == TAV_TYPE_UINT16) return std::type_identity<uint16_t>();
+  else if constexpr (Type == TAV_TYPE_SINT16) return std::type_identity<int16_t>();
+  else if constexpr (Type == TAV_TYPE_UINT32) return std::type_identity<uint32_t>();
+  else if constexpr (Type == TAV_TYPE_SINT32) return std::type_identity<int32_t>();
+  else if constexpr (Type == TAV_TYPE_UINT64) return std::type_identity<uint64_t>();
+  else if constexpr (Type == TAV_TYPE_SINT64) return std::type_identity<int64_t>();
+  else return std::type_identity<void>();
+  // clang-format on
+}
+
+template<uint16_t Type>
+using IntegerOf = typename decltype(makeIntegerOf<Type>())::type;
+
+/// The 16 bytes of a value of two halves, in this machine's order.
+constexpr std::array<uint64_t, 2> joinHalves(uint64_t high, uint64_t low) noexcept
+{
+  return kor::isLittleEndian ? std::array<uint64_t, 2>{low, high} : std::array<uint64_t, 2>{high, low};
+}
+
+/// Fraction A holds the milliseconds, fraction B the microseconds of the millisecond. False for a time that seconds
+/// since 1970 in 64 bits cannot tell.
+template<class Duration>
+bool toTimeStamp(std::chrono::sys_time<Duration> time, TAVTimeStamp& stamp) noexcept
+{
+  using namespace std::chrono;
+  constexpr double tooLate = 9.2e12; // the same in microseconds still fits 63 bits
+  const double about = duration<double>(time.time_since_epoch()).count();
+  if (!(about >= 0 && about < tooLate))
+  {
+    return false;
+  }
+  const auto whole = floor<seconds>(time);
+  const auto fraction = duration_cast<microseconds>(time - whole).count();
+  stamp = {static_cast<uint64_t>(whole.time_since_epoch().count()), static_cast<uint16_t>(fraction / 1000),
+           static_cast<uint16_t>(fraction % 1000), 0, 0};
+  return true;
+}
+
+/// Text up to its NUL; an array that has none ends with its last character.
+template<class T>
+std::string_view textOf(const T& value) noexcept
+{
+  if constexpr (std::is_array_v<T>)
+  {
+    constexpr size_t size = std::extent_v<T>;
+    const void* const end = std::memchr(value, '\0', size);
+    return {value, end != nullptr ? static_cast<size_t>(static_cast<const char*>(end) - value) : size};
+  }
+  else
+  {
+    return value;
+  }
+}
+
+/// Calls `write(type, bytes, size)` with the payload of UTF-8 text: code page and bytes. Short texts are not allocated.
+template<class Write>
+uint32_t withUtf8Payload(std::string_view text, uint16_t codePage, Write& write) noexcept
+{
+  std::array<uint8_t, 256> room;
+  const size_t size = sizeof codePage + text.size();
+  std::unique_ptr<uint8_t[]> larger;
+  uint8_t* bytes = room.data();
+  if (size > room.size())
+  {
+    larger.reset(new (std::nothrow) uint8_t[size]);
+    bytes = larger.get();
+  }
+  if (bytes == nullptr)
+  {
+    return TAV_RC_NO_MEMORY;
+  }
+  std::memcpy(bytes, &codePage, sizeof codePage);
+  std::copy(text.begin(), text.end(), bytes + sizeof codePage);
+  return write(TAV_TYPE_UTF8_STRING, bytes, uint64_t{size});
+}
+
+/// Calls `write(type, bytes, size)` with a 128-bit value.
+template<Integer128 T, class Write>
+uint32_t withHalves(const T& value, Write& write) noexcept
+{
+  if constexpr (BuiltinInteger128<T>)
+  {
+    return write(std::same_as<T, BuiltinUint128> ? TAV_TYPE_UINT128 : TAV_TYPE_SINT128, bytesOf(&value),
+                 uint64_t{sizeof value});
+  }
+  else
+  {
+    const auto words = joinHalves(static_cast<uint64_t>(value.high), value.low);
+    return write(std::same_as<T, Uint128> ? TAV_TYPE_UINT128 : TAV_TYPE_SINT128, bytesOf(words.data()),
+                 uint64_t{sizeof words});
+  }
+}
+
+/// Calls `write(type, bytes, size)` with a text, a UTF-8 text, bytes or words. A null pointer is TAV_RC_BAD_PARAM.
+template<class T, class Write>
+uint32_t withView(const T& value, Write& write) noexcept
+{
+  if constexpr (std::is_pointer_v<T>)
+  {
+    if (value == nullptr)
+    {
+      return TAV_RC_BAD_PARAM;
+    }
+  }
+  if constexpr (Text<T>)
+  {
+    const std::string_view text = textOf(value);
+    return write(TAV_TYPE_ASCII_STRING, bytesOf(text.data()), uint64_t{text.size()});
+  }
+  else if constexpr (Utf8View<T>)
+  {
+    const std::u8string_view text = value;
+    return withUtf8Payload({reinterpret_cast<const char*>(text.data()), text.size()}, kCodePageUtf8, write);
+  }
+  else if constexpr (BytesView<T>)
+  {
+    const std::span<const std::byte> bytes = value;
+    return write(TAV_TYPE_BINARY, bytesOf(bytes.data()), uint64_t{bytes.size()});
+  }
+  else
+  {
+    const std::span<const uint64_t> words = value;
+    return write(TAV_TYPE_UINT64_ARRAY, bytesOf(words.data()), uint64_t{words.size_bytes()});
+  }
+}
+
+/// Calls `write(type, bytes, size)` with a value's payload in this machine's byte order, and returns its code. A value
+/// that its type cannot hold is TAV_RC_OUTSIDE_PARENT.
+template<Addable T, class Write>
+uint32_t withPayload(const T& value, Write&& write) noexcept
+{
+  if constexpr (StreamInteger<T>)
+  {
+    return write(integerType<T>(), bytesOf(&value), uint64_t{sizeof value});
+  }
+  else if constexpr (std::same_as<T, std::byte>)
+  {
+    return write(TAV_TYPE_BYTE, bytesOf(&value), uint64_t{sizeof value});
+  }
+  else if constexpr (Integer128<T>)
+  {
+    return withHalves(value, write);
+  }
+  else if constexpr (std::same_as<T, TAVTimeStamp>)
+  {
+    return write(TAV_TYPE_UTC_TIMESTAMP, bytesOf(&value), uint64_t{sizeof value});
+  }
+  else if constexpr (isSysTime<T>)
+  {
+    TAVTimeStamp stamp;
+    return toTimeStamp(value, stamp) ? withPayload(stamp, write) : TAV_RC_OUTSIDE_PARENT;
+  }
+  else if constexpr (std::same_as<T, Utf8> || std::same_as<T, Utf8Text>)
+  {
+    return withUtf8Payload(value.text, value.codePage, write);
+  }
+  else
+  {
+    return withView(value, write);
+  }
+}
+
+/// As withPayload, with an integer as a value of a given type.
+template<uint16_t Type, StreamInteger T, class Write>
+uint32_t withPayloadAs(T value, Write&& write) noexcept
+{
+  using Number = IntegerOf<Type>;
+  if constexpr (Type == TAV_TYPE_SINT128 || Type == TAV_TYPE_UINT128)
+  {
+    const bool negative = std::cmp_less(value, 0);
+    const auto words = joinHalves(negative ? ~uint64_t{0} : 0, static_cast<uint64_t>(value));
+    return negative && Type == TAV_TYPE_UINT128 ? TAV_RC_OUTSIDE_PARENT
+                                                : write(Type, bytesOf(words.data()), uint64_t{sizeof words});
+  }
+  else
+  {
+    const auto number = static_cast<Number>(value);
+    return std::in_range<Number>(value) ? write(Type, bytesOf(&number), uint64_t{sizeof number})
+                                        : TAV_RC_OUTSIDE_PARENT;
+  }
+}
+
+/// The type codes that withPayloadAs takes.
+template<uint16_t Type>
+inline constexpr bool isIntegerTypeCode =
+    !std::is_void_v<IntegerOf<Type>> || Type == TAV_TYPE_UINT128 || Type == TAV_TYPE_SINT128;
+
+} // namespace tav::detail

@@ -1,0 +1,289 @@
+/// @file group.hpp
+/// Open groups of a stream that is written.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <span>
+#include <utility>
+
+#include "tav/cpp/encode.hpp"
+#include "tav/cpp/header.hpp"
+#include "tav/cpp/writerState.hpp"
+
+namespace tav
+{
+
+/// An open group. Close it, abandon it, or let it go: its destructor closes it. Groups nest: only the innermost open
+/// one takes nodes, another answers TAV_RC_BAD_PARAM, and so does a group that outlives its writer. A failure in a
+/// destructor is kept: the next operation on the writer or a group of it reports it, at the latest finish(). Move-only.
+class [[nodiscard]] Group
+{
+public:
+  Group(Group&& other) noexcept
+      : state_(std::move(other.state_)), level_(std::exchange(other.level_, 0)), outer_(other.outer_)
+  {
+  }
+  Group& operator=(Group&&) = delete;
+  ~Group()
+  {
+    if (level_ != 0 && state_->handle != nullptr)
+    {
+      closeForGood();
+    }
+  }
+
+  /// Appends a data element whose type follows from the value's; gives its header, by which Writer::update finds it.
+  template<class T>
+  HeaderView add(uint16_t elm, const T& value, const NodeOptions& options = {})
+  {
+    TAVHeaderData node{};
+    detail::demand(append(node, elm, value, options), "adding an element");
+    return HeaderView(node.header);
+  }
+  template<class T>
+  HeaderView add(uint16_t elm, const T& value, std::error_code& ec) noexcept
+  {
+    return add(elm, value, NodeOptions{}, ec);
+  }
+  template<class T>
+  HeaderView add(uint16_t elm, const T& value, const NodeOptions& options, std::error_code& ec) noexcept
+  {
+    TAVHeaderData node{};
+    detail::report(append(node, elm, value, options), ec);
+    return HeaderView(node.header);
+  }
+
+  /// Appends an integer as a given type: `add<TAV_TYPE_UINT8>(elm, 5)`. A number that the type cannot hold is refused
+  /// with TAV_RC_OUTSIDE_PARENT.
+  template<uint16_t Type, class T>
+  HeaderView add(uint16_t elm, T value, const NodeOptions& options = {})
+  {
+    TAVHeaderData node{};
+    detail::demand(appendAs<Type>(node, elm, value, options), "adding an element");
+    return HeaderView(node.header);
+  }
+  template<uint16_t Type, class T>
+  HeaderView add(uint16_t elm, T value, std::error_code& ec) noexcept
+  {
+    return add<Type>(elm, value, NodeOptions{}, ec);
+  }
+  template<uint16_t Type, class T>
+  HeaderView add(uint16_t elm, T value, const NodeOptions& options, std::error_code& ec) noexcept
+  {
+    TAVHeaderData node{};
+    detail::report(appendAs<Type>(node, elm, value, options), ec);
+    return HeaderView(node.header);
+  }
+
+  /// Appends a data element of any type with its payload in this machine's byte order.
+  HeaderView addRaw(uint16_t type, uint16_t elm, std::span<const std::byte> payload, const NodeOptions& options = {})
+  {
+    TAVHeaderData node{};
+    detail::demand(appendRaw(node, type, elm, payload, options), "adding an element");
+    return HeaderView(node.header);
+  }
+  HeaderView addRaw(uint16_t type, uint16_t elm, std::span<const std::byte> payload, const NodeOptions& options,
+                    std::error_code& ec) noexcept
+  {
+    TAVHeaderData node{};
+    detail::report(appendRaw(node, type, elm, payload, options), ec);
+    return HeaderView(node.header);
+  }
+
+  /// Appends nodes that are encoded already, with headers of a width, byte for byte. TAV_RC_BAD_CHILD_HDR when the
+  /// group takes the other width.
+  void addStream(Width width, std::span<const std::byte> nodes)
+  {
+    detail::demand(appendStream(width, nodes), "adding encoded nodes");
+  }
+  void addStream(Width width, std::span<const std::byte> nodes, std::error_code& ec) noexcept
+  {
+    detail::report(appendStream(width, nodes), ec);
+  }
+
+  /// Opens a group inside.
+  Group group(uint16_t elm, const GroupOptions& options = {}) &
+  {
+    uint32_t rc = TAV_RC_OK;
+    Group inner = open(state_, own(), elm, options, rc);
+    detail::demand(rc, "opening a group");
+    return inner;
+  }
+  Group group(uint16_t elm, const GroupOptions& options, std::error_code& ec) & noexcept
+  {
+    uint32_t rc = TAV_RC_OK;
+    Group inner = open(state_, own(), elm, options, rc);
+    detail::report(rc, ec);
+    return inner;
+  }
+  Group group(uint16_t elm, std::error_code& ec) & noexcept
+  {
+    return group(elm, GroupOptions{}, ec);
+  }
+  Group group(uint16_t, const GroupOptions& = {}) && = delete;
+  Group group(uint16_t, const GroupOptions&, std::error_code&) && = delete;
+  Group group(uint16_t, std::error_code&) && = delete;
+
+  /// Closes the group; afterwards it takes nothing more. After a failure it is still open.
+  void close()
+  {
+    detail::demand(end(0), "closing a group");
+  }
+  void close(std::error_code& ec) noexcept
+  {
+    detail::report(end(0), ec);
+  }
+
+  /// Takes back the group and all in it: the next node is written in its place.
+  void abandon()
+  {
+    detail::demand(end(1), "abandoning a group");
+  }
+  void abandon(std::error_code& ec) noexcept
+  {
+    detail::report(end(1), ec);
+  }
+
+  /// Whether nodes can still be added. False for a group whose opening failed.
+  [[nodiscard]] bool isOpen() const noexcept
+  {
+    return level_ != 0 && state_->handle != nullptr;
+  }
+
+private:
+  friend class Writer;
+
+  static constexpr uint32_t kNoLevel = ~uint32_t{0};
+
+  Group(detail::WriterRef state, uint32_t level, uint32_t outer) noexcept
+      : state_(std::move(state)), level_(level), outer_(outer)
+  {
+  }
+
+  static Group open(const detail::WriterRef& state, uint32_t outer, uint16_t elm, const GroupOptions& options,
+                    uint32_t& rc) noexcept
+  {
+    rc = state ? state->enter(outer) : TAV_RC_BAD_PARAM;
+    if (rc == TAV_RC_OK)
+    {
+      rc = state->openGroup(elm, options);
+    }
+    if (rc != TAV_RC_OK)
+    {
+      return Group(detail::WriterRef(nullptr), 0, 0);
+    }
+    state->innermost = state->depth();
+    return Group(state, state->innermost, outer);
+  }
+
+  /// The level for the shared checks: one that no group has when this one is closed.
+  [[nodiscard]] uint32_t own() const noexcept
+  {
+    return level_ != 0 ? level_ : kNoLevel;
+  }
+
+  [[nodiscard]] uint32_t enter(uint64_t how = 0) const noexcept
+  {
+    return state_ ? state_->enter(own(), how) : TAV_RC_BAD_PARAM;
+  }
+
+  template<class T>
+  uint32_t append(TAVHeaderData& node, uint16_t elm, const T& value, const NodeOptions& options) noexcept
+  {
+    static_assert(detail::Addable<T>,
+                  "a value of this type has no type in the stream: use a sized integer, std::byte, "
+                  "text, tav::Utf8, bytes, 64-bit words, tav::Uint128, a timestamp or a system time");
+    if constexpr (detail::Addable<T>)
+    {
+      const uint32_t rc = enter();
+      const auto write = [&](uint16_t type, const uint8_t* bytes, uint64_t size) {
+        return state_->append(node, type, elm, options, bytes, size);
+      };
+      return rc == TAV_RC_OK ? detail::withPayload(value, write) : rc;
+    }
+  }
+
+  template<uint16_t Type, class T>
+  uint32_t appendAs(TAVHeaderData& node, uint16_t elm, T value, const NodeOptions& options) noexcept
+  {
+    static_assert(detail::isIntegerTypeCode<Type>, "this is not the code of an integer type: use add with a value of "
+                                                   "the type, or addRaw");
+    static_assert(StreamInteger<T>, "only an integer can be added as an integer type");
+    if constexpr (detail::isIntegerTypeCode<Type> && StreamInteger<T>)
+    {
+      const uint32_t rc = enter();
+      const auto write = [&](uint16_t type, const uint8_t* bytes, uint64_t size) {
+        return state_->append(node, type, elm, options, bytes, size);
+      };
+      return rc == TAV_RC_OK ? detail::withPayloadAs<Type>(value, write) : rc;
+    }
+  }
+
+  uint32_t appendRaw(TAVHeaderData& node, uint16_t type, uint16_t elm, std::span<const std::byte> payload,
+                     const NodeOptions& options) noexcept
+  {
+    uint32_t rc = enter();
+    if (rc == TAV_RC_OK && layout::isGroupType(type))
+    {
+      rc = TAV_RC_BAD_PARAM;
+    }
+    return rc == TAV_RC_OK
+               ? state_->append(node, type, elm, options, detail::bytesOf(payload.data()), payload.size())
+               : rc;
+  }
+
+  uint32_t appendStream(Width width, std::span<const std::byte> nodes) noexcept
+  {
+    uint32_t rc = enter();
+    if (rc == TAV_RC_OK)
+    {
+      rc = state_->reserve(nodes.size());
+    }
+    if (rc == TAV_RC_OK && !nodes.empty())
+    {
+      auto* const bytes = const_cast<uint8_t*>(detail::bytesOf(nodes.data())); // only read
+      rc = tavAddStream(0, state_->handle, static_cast<uint32_t>(width), bytes, nodes.size());
+    }
+    return rc;
+  }
+
+  uint32_t end(uint64_t how) noexcept
+  {
+    uint32_t rc = enter(how);
+    if (rc == TAV_RC_OK)
+    {
+      rc = state_->endInnermost(how);
+    }
+    if (rc == TAV_RC_OK)
+    {
+      level_ = 0;
+      state_->innermost = outer_;
+    }
+    return rc;
+  }
+
+  /// What can still go wrong is kept for the next who can report it.
+  void closeForGood() noexcept
+  {
+    detail::WriterState& state = *state_;
+    const bool last = state.innermost == level_;
+    const uint32_t rc = state.deferred != TAV_RC_OK ? state.deferred : end(0);
+    if (rc == TAV_RC_OK)
+    {
+      return;
+    }
+    state.deferred = rc;
+    if (last)
+    {
+      ++state.orphans;
+      state.innermost = outer_;
+    }
+  }
+
+  detail::WriterRef state_;
+  uint32_t level_; ///< 1 for the root; 0 when closed
+  uint32_t outer_; ///< level of the group around it
+};
+
+} // namespace tav

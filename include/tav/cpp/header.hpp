@@ -1,0 +1,83 @@
+/// @file header.hpp
+/// What a node's header says.
+#pragma once
+
+#include <cstdint>
+#include <string_view>
+
+#include "tav/cpp/values.hpp"
+#include "tav/dictionary.hpp"
+
+namespace tav
+{
+
+/// A node's header: what writing a node gives, and what nodes that are read and their copies share.
+class HeaderView
+{
+public:
+  HeaderView() = default;
+  explicit HeaderView(const TAVHeader& header) noexcept
+      : data_{header, nullptr, 0, 0}
+  {
+  }
+
+  [[nodiscard]] const TAVHeader& header() const noexcept
+  {
+    return data_.header;
+  }
+  /// Offset of the header's first byte in the stream.
+  [[nodiscard]] uint64_t offset() const noexcept
+  {
+    return data_.header.nodeOffset;
+  }
+  /// Bytes of the payload; all ones in the width of the header for a group that was never closed.
+  [[nodiscard]] uint64_t size() const noexcept
+  {
+    return layout::sizeOf(data_.header);
+  }
+  [[nodiscard]] uint16_t type() const noexcept
+  {
+    return layout::typeOf(data_.header);
+  }
+  [[nodiscard]] uint16_t elm() const noexcept
+  {
+    return layout::elmOf(data_.header);
+  }
+  [[nodiscard]] Width width() const noexcept
+  {
+    return layout::is64(data_.header) ? Width::bits64 : Width::bits32;
+  }
+  /// The flag bits, 0 for a 32-bit header.
+  [[nodiscard]] uint32_t info() const noexcept
+  {
+    return layout::infoOf(data_.header);
+  }
+  [[nodiscard]] uint16_t infoKey() const noexcept
+  {
+    return static_cast<uint16_t>(info() & TAV_INFO_KEY_MASK);
+  }
+  [[nodiscard]] bool isGroup() const noexcept
+  {
+    return layout::isGroup(data_.header);
+  }
+  /// Whether this is a group that was never closed.
+  [[nodiscard]] bool isOpen() const noexcept
+  {
+    return isGroup() && layout::isSizeUnknown(data_.header);
+  }
+  /// The element's enum name, empty for an unknown id.
+  [[nodiscard]] std::string_view name() const noexcept
+  {
+    return dictionary::nameOf(elm());
+  }
+  /// The element's tag name, empty for an unknown id.
+  [[nodiscard]] std::string_view tag() const noexcept
+  {
+    return dictionary::tagOf(elm());
+  }
+
+protected:
+  TAVHeaderData data_{}; ///< whole, so that a walk can read its next node right into the present one
+};
+
+} // namespace tav

@@ -1,0 +1,120 @@
+/// @file payload.hpp
+/// What a reader and its nodes share, and payloads as they stand in the stream.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <ranges>
+#include <stdexcept>
+
+#include "tav/cpp/storage.hpp"
+
+/// Whether payloads that were kept too long are found out. The same in every source file of a program.
+#if !defined(TAV_CHECK_PAYLOADS)
+#if defined(NDEBUG)
+#define TAV_CHECK_PAYLOADS 0
+#else
+#define TAV_CHECK_PAYLOADS 1
+#endif
+#endif
+
+namespace tav
+{
+
+namespace detail
+{
+
+struct ReaderState
+{
+  std::unique_ptr<TAVSideStorage> owned;
+  TAVHandle* handle = nullptr;
+  uint64_t fetches = 0; ///< payload pointers into a ring last until the next one
+
+  ReaderState() = default;
+  ReaderState(const ReaderState&) = delete;
+  ReaderState& operator=(const ReaderState&) = delete;
+  ~ReaderState()
+  {
+    if (handle != nullptr)
+    {
+      tavTermHandle(&handle);
+    }
+  }
+
+  [[nodiscard]] bool isBuffered() const noexcept
+  {
+    return handle->pCircularBuf != nullptr;
+  }
+  [[nodiscard]] bool isSwapped() const noexcept
+  {
+    return handle->swapBytes != 0;
+  }
+};
+
+} // namespace detail
+
+/// A node's payload as it stands in the stream. Over memory it lives as long as the memory, over a file or another
+/// storage until anything else is read through the reader: then, in debug builds, using it throws std::logic_error.
+/// It converts to std::span<const std::byte>, which is not checked. It must not outlive the reader.
+class PayloadView
+{
+public:
+  PayloadView() = default;
+  PayloadView(const uint8_t* bytes, uint64_t size, const detail::ReaderState* state) noexcept
+      : bytes_(bytes), size_(static_cast<size_t>(size)),
+        state_(state != nullptr && state->isBuffered() ? state : nullptr), fetch_(state != nullptr ? state->fetches : 0)
+  {
+  }
+
+  [[nodiscard]] const std::byte* data() const
+  {
+    checkAlive();
+    return reinterpret_cast<const std::byte*>(bytes_);
+  }
+  [[nodiscard]] size_t size() const noexcept
+  {
+    return size_;
+  }
+  [[nodiscard]] bool empty() const noexcept
+  {
+    return size_ == 0;
+  }
+  [[nodiscard]] const std::byte* begin() const
+  {
+    return data();
+  }
+  [[nodiscard]] const std::byte* end() const
+  {
+    return data() + size_;
+  }
+  /// The byte at a place below size().
+  [[nodiscard]] std::byte operator[](size_t at) const
+  {
+    return data()[at];
+  }
+
+private:
+  void checkAlive() const
+  {
+    if constexpr (TAV_CHECK_PAYLOADS != 0)
+    {
+      if (state_ != nullptr && state_->fetches != fetch_)
+      {
+        throw std::logic_error("a payload was used after another node was read through the same ring");
+      }
+    }
+  }
+
+  const uint8_t* bytes_ = nullptr;
+  size_t size_ = 0;
+  const detail::ReaderState* state_ = nullptr; ///< null over memory; here in all builds, which so fit together
+  uint64_t fetch_ = 0;
+};
+
+} // namespace tav
+
+/// @cond  A payload's iterators do not need the view.
+template<>
+inline constexpr bool std::ranges::enable_borrowed_range<tav::PayloadView> = true;
+/// @endcond

@@ -1,0 +1,264 @@
+/// @file writerState.hpp
+/// What a writer and its groups share.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <span>
+#include <utility>
+
+#include "tav/cpp/storage.hpp"
+
+namespace tav
+{
+
+/// What a data element may have beside its value. Nodes with 32-bit headers have none of it.
+struct NodeOptions
+{
+  bool eyeSize = false; ///< ends with an eye/size pair, so that it can be found from behind
+  uint32_t info = 0;    ///< further bits of `info`; whether a payload is padded is the writer's to say
+  uint16_t infoKey = 0; ///< a search key of 11 bits, in `info`
+};
+
+/// How a group is opened. Its own header has the form that the open group, or StreamOptions::root, asks for.
+struct GroupOptions
+{
+  Width children = Width::bits64; ///< of the headers of its children; always 32-bit under a 32-bit header
+  bool eyeSize = false;           ///< ends with an end element, to be found from behind; 64-bit headers only
+  uint32_t info = 0;              ///< as in NodeOptions
+  uint16_t infoKey = 0;           ///< as in NodeOptions
+};
+
+namespace detail
+{
+
+template<class Options>
+uint32_t infoOf(const Options& options) noexcept
+{
+  return (options.info & ~TAV_INFO_ALIGNED8) | options.infoKey | (options.eyeSize ? TAV_INFO_EYE_SIZE : 0);
+}
+
+/// Kept by a plain count: a writer and its groups belong to one thread.
+struct WriterState
+{
+  uint32_t users = 1;
+  TAVHandle* handle = nullptr;
+  std::unique_ptr<TAVSideStorage> owned;
+  std::unique_ptr<GrowingBlock> block;
+  Width root = Width::bits64;
+  uint32_t innermost = 0;              ///< level of the innermost Group that is there and open; 1 for the root
+  uint32_t orphans = 0;                ///< groups inside it that are still open, their Group objects gone
+  uint32_t deferred = TAV_RC_OK;       ///< the first failure that a destructor could not report
+  std::span<const std::byte> finished; ///< the stream, when it was in memory, after its end
+  uint64_t finishedSize = 0;
+  bool isFinished = false;
+
+  WriterState() = default;
+  WriterState(const WriterState&) = delete;
+  WriterState& operator=(const WriterState&) = delete;
+  ~WriterState()
+  {
+    closeHandle();
+  }
+
+  void closeHandle() noexcept
+  {
+    if (handle != nullptr)
+    {
+      tavTermHandle(&handle);
+    }
+  }
+
+  /// Groups that are open in the stream.
+  [[nodiscard]] uint32_t depth() const noexcept
+  {
+    return handle->pHdrStack->count;
+  }
+
+  /// The header form that the innermost open group prescribes.
+  [[nodiscard]] Width width() const noexcept
+  {
+    const TAVHdrStack& stack = *handle->pHdrStack;
+    const bool wide = stack.count == 0 ? root == Width::bits64 : layout::hasChildren64(stack.pEntries[stack.count - 1]);
+    return wide ? Width::bits64 : Width::bits32;
+  }
+
+  [[nodiscard]] std::span<const std::byte> bytes() const noexcept
+  {
+    const bool direct = handle != nullptr && (handle->options & TAV_OPT_DIRECT) != 0 && handle->streamBytes != 0;
+    return direct ? std::span(reinterpret_cast<const std::byte*>(handle->pDirectData),
+                              static_cast<size_t>(handle->streamBytes))
+                  : finished;
+  }
+
+  /// What stands before every operation on the group at a level; 0 stands for the stream. What a destructor could not
+  /// report comes first; then groups that a destructor could not end are ended, in the way in which this one is.
+  uint32_t enter(uint32_t level, uint64_t how = 0) noexcept
+  {
+    if (handle == nullptr)
+    {
+      return TAV_RC_BAD_PARAM;
+    }
+    if (deferred != TAV_RC_OK) [[unlikely]]
+    {
+      return std::exchange(deferred, TAV_RC_OK);
+    }
+    if (innermost != level || depth() != level + orphans) [[unlikely]]
+    {
+      return TAV_RC_BAD_PARAM;
+    }
+    while (orphans != 0) [[unlikely]]
+      {
+        if (const uint32_t rc = endInnermost(how); rc != TAV_RC_OK)
+        {
+          return rc;
+        }
+        --orphans;
+      }
+    return TAV_RC_OK;
+  }
+
+  uint32_t reserve(uint64_t bytes) noexcept
+  {
+    constexpr uint64_t around = 128; // header, padding, pair, an end element
+    if (block == nullptr)
+    {
+      return TAV_RC_OK;
+    }
+    return layout::addChecked(bytes, around) ? block->reserve(handle, handle->streamBytes, bytes) : TAV_RC_NO_MEMORY;
+  }
+
+  /// Appends a data element with the header form that the open group prescribes.
+  uint32_t append(TAVHeaderData& node, uint16_t type, uint16_t elm, const NodeOptions& options, const uint8_t* bytes,
+                  uint64_t size) noexcept
+  {
+    const bool wide = width() == Width::bits64;
+    if (options.infoKey > TAV_INFO_KEY_MASK || (!wide && size >= layout::kSizeUnknown32))
+    {
+      return TAV_RC_BAD_PARAM;
+    }
+    if (const uint32_t rc = reserve(size); rc != TAV_RC_OK)
+    {
+      return rc;
+    }
+    static constexpr uint8_t nothing = 0;
+    fillHeader(node, wide, type, elm, infoOf(options), size);
+    node.pDataBuf = const_cast<uint8_t*>(bytes != nullptr ? bytes : &nothing); // only read
+    node.dataBufSize = size;
+    return tavAddElement(0, handle, &node);
+  }
+
+  /// Opens a group of unknown size.
+  uint32_t openGroup(uint16_t elm, const GroupOptions& options) noexcept
+  {
+    if (options.infoKey > TAV_INFO_KEY_MASK)
+    {
+      return TAV_RC_BAD_PARAM;
+    }
+    if (const uint32_t rc = reserve(0); rc != TAV_RC_OK)
+    {
+      return rc;
+    }
+    const bool wide = width() == Width::bits64;
+    const auto type = static_cast<uint16_t>(wide ? options.children : Width::bits32);
+    TAVHeaderData node{};
+    fillHeader(node, wide, type, elm, infoOf(options), wide ? TAV_SIZE_UNKNOWN : layout::kSizeUnknown32);
+    const uint64_t start = handle->streamBytes;
+    const uint32_t rc = tavAddElement(0, handle, &node);
+    if (rc != TAV_RC_OK)
+    {
+      handle->streamBytes = start; // a group that is nested too deeply has left its header
+    }
+    return rc;
+  }
+
+  /// Closes (0) or abandons (1) the innermost open group.
+  uint32_t endInnermost(uint64_t how) noexcept
+  {
+    const uint64_t end = handle->streamBytes;
+    uint32_t rc = reserve(0);
+    if (rc == TAV_RC_OK)
+    {
+      rc = tavCloseHeader(how, handle);
+    }
+    if (rc == TAV_RC_OK && block != nullptr && handle->streamBytes < end)
+    {
+      block->clear(handle->streamBytes, end);
+    }
+    return rc;
+  }
+
+  static void fillHeader(TAVHeaderData& node, bool wide, uint16_t type, uint16_t elm, uint32_t info,
+                         uint64_t size) noexcept
+  {
+    if (wide)
+    {
+      node.header.hdr64 = {size, info, type, elm};
+      node.header.hdrType = TAV_HDR_64;
+      return;
+    }
+    node.header.hdr32 = {static_cast<uint32_t>(size), type, elm};
+    node.header.hdrType = TAV_HDR_32;
+  }
+};
+
+/// One use of the shared state.
+class WriterRef
+{
+public:
+  explicit WriterRef(WriterState* state) noexcept
+      : state_(state)
+  {
+  }
+  WriterRef(const WriterRef& other) noexcept
+      : state_(other.state_)
+  {
+    if (state_ != nullptr)
+    {
+      ++state_->users;
+    }
+  }
+  WriterRef(WriterRef&& other) noexcept
+      : state_(std::exchange(other.state_, nullptr))
+  {
+  }
+  WriterRef& operator=(WriterRef other) noexcept
+  {
+    std::swap(state_, other.state_);
+    return *this;
+  }
+  ~WriterRef()
+  {
+    if (state_ != nullptr && --state_->users == 0)
+    {
+      destroy(state_);
+    }
+  }
+
+  WriterState& operator*() const noexcept
+  {
+    return *state_;
+  }
+  WriterState* operator->() const noexcept
+  {
+    return state_;
+  }
+  explicit operator bool() const noexcept
+  {
+    return state_ != nullptr;
+  }
+
+private:
+  /// Out of line: optimisers that lose count of the users warn of a use behind it.
+  [[gnu::noinline]] static void destroy(WriterState* state) noexcept
+  {
+    delete state;
+  }
+
+  WriterState* state_;
+};
+
+} // namespace detail
+
+} // namespace tav

@@ -1,0 +1,83 @@
+/// What the tests of the C++ layer share.
+#pragma once
+
+#define TAV_CHECK_PAYLOADS 1 // also where NDEBUG is defined
+
+#include <unistd.h>
+
+#include <filesystem>
+#include <string>
+#include <system_error>
+
+#include <gtest/gtest.h>
+
+#include "support/byteRows.h"
+#include "support/vectorStorage.h"
+#include "tav/tav.hpp"
+
+namespace test
+{
+
+/// The code that a throwing form gives, TAV_RC_OK when it does not throw.
+template<class Call>
+uint32_t thrownBy(Call&& call)
+{
+  try
+  {
+    call();
+  }
+  catch (const std::system_error& error)
+  {
+    return tav::codeOf(error.code());
+  }
+  return TAV_RC_OK;
+}
+
+/// The code that a form with an error code gives. The error code held another error before.
+template<class Call>
+uint32_t givenBy(Call&& call)
+{
+  std::error_code ec = std::make_error_code(std::errc::interrupted);
+  call(ec);
+  EXPECT_TRUE(!ec || ec.category() == tav::category());
+  return tav::codeOf(ec);
+}
+
+inline Bytes bytesOf(std::span<const std::byte> bytes)
+{
+  const auto* const first = reinterpret_cast<const uint8_t*>(bytes.data());
+  return {first, first + bytes.size()};
+}
+
+inline std::span<const std::byte> spanOf(const Bytes& bytes)
+{
+  return std::as_bytes(std::span(bytes));
+}
+
+/// A path that names nothing yet; what it names later is removed.
+class TemporaryPath
+{
+public:
+  TemporaryPath()
+      : path(std::filesystem::temp_directory_path() / nextName())
+  {
+  }
+  ~TemporaryPath()
+  {
+    std::error_code ignored;
+    std::filesystem::remove(path, ignored);
+  }
+  TemporaryPath(const TemporaryPath&) = delete;
+  TemporaryPath& operator=(const TemporaryPath&) = delete;
+
+  const std::filesystem::path path;
+
+private:
+  static std::string nextName()
+  {
+    static int count = 0;
+    return "tav-layer-" + std::to_string(getpid()) + "-" + std::to_string(++count);
+  }
+};
+
+} // namespace test

@@ -1,0 +1,152 @@
+#include <vector>
+
+#include "cpp/layer.h"
+
+using namespace test;
+
+namespace
+{
+
+/// system { host { hostName "a" }, host { os { osName "b" }, hostName "c", hostName "d" }, 60105 "e" }
+Bytes sample()
+{
+  tav::Writer writer;
+  {
+    tav::Group system = writer.group(TAV_ELM_CMN_SYSTEM);
+    {
+      tav::Group host = system.group(TAV_ELM_CMN_HOST);
+      host.add(TAV_ELM_CMN_HOST_NAME, "a");
+    }
+    {
+      tav::Group host = system.group(TAV_ELM_CMN_HOST);
+      {
+        tav::Group os = host.group(TAV_ELM_CMN_OS);
+        os.add(TAV_ELM_CMN_OS_NAME, "b");
+      }
+      host.add(TAV_ELM_CMN_HOST_NAME, "c");
+      host.add(TAV_ELM_CMN_HOST_NAME, "d");
+    }
+    system.add(60105, "e");
+  }
+  writer.finish();
+  return bytesOf(writer.bytes());
+}
+
+class LayerPath : public ::testing::Test
+{
+protected:
+  const Bytes stream = sample();
+  const tav::Reader reader{spanOf(stream)};
+
+  [[nodiscard]] std::string first(std::string_view path) const
+  {
+    const auto node = reader.path(path);
+    return !node ? "nothing" : node->isGroup() ? "group"
+                                               : node->as<std::string>();
+  }
+  [[nodiscard]] std::string all(std::string_view path) const
+  {
+    std::string texts;
+    for (const tav::Node& node : reader.all(path))
+    {
+      texts += node.isGroup() ? "group" : node.as<std::string>();
+    }
+    return texts;
+  }
+};
+
+} // namespace
+
+TEST_F(LayerPath, TagsEnumNamesConstantsAndIdsAllName)
+{
+  EXPECT_EQ(first("system/host/hostName"), "a");
+  EXPECT_EQ(first("TAV_ELM_CMN_SYSTEM/TAV_ELM_CMN_HOST/TAV_ELM_CMN_HOST_NAME"), "a");
+  EXPECT_EQ(first("system/60105"), "e");
+  EXPECT_EQ(first("system/#60105"), "e");
+}
+
+TEST_F(LayerPath, SlashMayLead)
+{
+  EXPECT_EQ(first("/system/host/hostName"), "a");
+}
+
+TEST_F(LayerPath, RootAloneIsAPath)
+{
+  EXPECT_EQ(reader.path("/system")->offset(), 0U);
+  EXPECT_EQ(first("/host"), "nothing");
+}
+
+TEST_F(LayerPath, SearchGoesBackToTheNextMatchOfTheLevelAbove)
+{
+  EXPECT_EQ(first("system/host/os/osName"), "b");
+}
+
+TEST_F(LayerPath, StarIsAnyNode)
+{
+  EXPECT_EQ(first("system/*/*"), "a");
+  EXPECT_EQ(all("system/*/*"), "agroupcd");
+  EXPECT_EQ(first("*/60105"), "e");
+}
+
+TEST_F(LayerPath, NumberInBracketsCountsTheMatchesAmongSiblings)
+{
+  EXPECT_EQ(first("system/host[2]/hostName"), "c");
+  EXPECT_EQ(first("system/host[2]/hostName[2]"), "d");
+  EXPECT_EQ(first("system/*[3]"), "e");
+  EXPECT_EQ(first("system/host[3]"), "nothing");
+  EXPECT_EQ(first("system[1]/host"), "group");
+  EXPECT_EQ(first("system[2]/host"), "nothing");
+}
+
+TEST_F(LayerPath, AllMatchesComeInStreamOrder)
+{
+  EXPECT_EQ(all("system/host/hostName"), "acd");
+  EXPECT_EQ(all("system/host[2]/hostName"), "cd");
+  EXPECT_EQ(all("system/host/hostName[1]"), "ac");
+  EXPECT_EQ(all("system/host/cpuOnline"), "");
+}
+
+TEST_F(LayerPath, PathBelowANodeBeginsWithItsChildren)
+{
+  const tav::Node root = reader.root();
+  EXPECT_EQ(root.path("host/hostName")->as<std::string>(), "a");
+  EXPECT_FALSE(root.path("system/host"));
+  EXPECT_EQ(root.all("host").size(), 2U);
+}
+
+TEST_F(LayerPath, IsReadOnceAndUsedOften)
+{
+  const tav::Path path("host/hostName");
+  const tav::Node root = reader.root();
+  EXPECT_EQ(root.path(path)->as<std::string>(), "a");
+  EXPECT_EQ(root.all(path).size(), 3U);
+  EXPECT_EQ(givenBy([&](std::error_code& ec) { EXPECT_TRUE(root.path(path, ec)); }), TAV_RC_OK);
+  EXPECT_EQ(givenBy([&](std::error_code& ec) { EXPECT_EQ(root.all(path, ec).size(), 3U); }), TAV_RC_OK);
+}
+
+TEST_F(LayerPath, WhatIsNoPathIsRefused)
+{
+  for (const char* const text :
+       {"", "/", "//host", "host//hostName", "host/", "noSuchElement", "host[0]", "host[", "host[x]", "host]", "[1]",
+        "host[1x]", "host[-1]", "65536", "#", "host[99999999999999999999]", "invalid_element"})
+  {
+    EXPECT_EQ(thrownBy([&] { const tav::Path path(text); }), TAV_RC_BAD_PARAM) << text;
+    EXPECT_EQ(thrownBy([&] { static_cast<void>(reader.path(text)); }), TAV_RC_BAD_PARAM) << text;
+    EXPECT_EQ(thrownBy([&] { static_cast<void>(reader.all(text)); }), TAV_RC_BAD_PARAM) << text;
+    EXPECT_EQ(thrownBy([&] { static_cast<void>(reader.root().path(text)); }), TAV_RC_BAD_PARAM) << text;
+    EXPECT_EQ(givenBy([&](std::error_code& ec) { static_cast<void>(reader.root().all(text, ec)); }), TAV_RC_BAD_PARAM)
+        << text;
+  }
+}
+
+TEST_F(LayerPath, DamageOnTheWayIsReportedButNotWhatLiesBehindTheMatch)
+{
+  Bytes damaged = stream;
+  const uint64_t second = reader.path("system/host[2]")->offset();
+  damaged[second + 7] = 0x7F; // its size leads far past the stream
+  const tav::Reader other(spanOf(damaged));
+  EXPECT_EQ(other.path("system/host/hostName")->as<std::string>(), "a");
+  EXPECT_EQ(thrownBy([&] { static_cast<void>(other.path("system/60105")); }), TAV_RC_OUTSIDE_PARENT);
+  EXPECT_EQ(givenBy([&](std::error_code& ec) { static_cast<void>(other.all("system/60105", ec)); }),
+            TAV_RC_OUTSIDE_PARENT);
+}
