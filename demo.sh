@@ -1,14 +1,34 @@
 #!/usr/bin/env bash
-# Installs what is missing, builds the libraries and shows them at work: this machine, described as a stream, read back
-# and printed as text and as XML.
+# Installs what is missing, builds, and shows tav at work: this machine described as a stream, in memory and in a file,
+# printed as text and as XML, looked into with the program, damaged, and recovered.
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")"
 
 cmake/install-packages.sh build
-log=$(mktemp)
-trap 'rm -f "$log"' EXIT
-if ! { cmake --preset release -DTAV_BUILD_TESTS=OFF -DTAV_BUILD_TOOLS=OFF && cmake --build --preset release --target snapshot; } >"$log" 2>&1; then
-  cat "$log" >&2
+work=$(mktemp -d)
+trap 'rm -rf "$work"' EXIT
+if ! { cmake --preset release -DTAV_BUILD_TESTS=OFF && cmake --build --preset release --target snapshot tav_tool; } >"$work/log" 2>&1; then
+  cat "$work/log" >&2
   exit 1
 fi
-build/release/examples/snapshot
+
+show() { printf '\n$ %s\n' "$*"; "$@"; }
+# Findings (status 1) are what some of these commands are asked for.
+look() { show "$@" || (($? == 1)); }
+
+PATH=$PWD/build/release/tools:$PWD/build/release/examples:$PATH
+show snapshot "$work/snapshot.tav"
+cd "$work"
+show tav info snapshot.tav
+show tav tree snapshot.tav
+show tav get snapshot.tav /system/host/hostName
+show tav xml snapshot.tav
+
+printf '\n# The same file, with 40 bytes in its middle overwritten and its end cut off:\n'
+cp snapshot.tav damaged.tav
+printf '%040d' 0 | dd of=damaged.tav bs=1 seek=150 conv=notrunc status=none
+truncate --size 450 damaged.tav
+look tav check damaged.tav
+look tav recover damaged.tav -o recovered.tav
+show tav check recovered.tav
+show tav tree recovered.tav

@@ -273,7 +273,9 @@ bool Walker::extraBehind(const Node& node, uint64_t base, uint64_t limit)
   if (without == with && node.is64() && hasEyeSize(node.header))
   {
     // Neither eye catcher is whole: what follows the pair tells where it stands.
-    const auto follows = [&](uint64_t at) { return at == limit || prober_.judge(at, top.wide, limit) >= Belief::named; };
+    const auto follows = [&](uint64_t at) {
+      return at == limit || prober_.judge(at, top.wide, limit) >= Belief::named;
+    };
     without = follows(base + kEyeSizeLength);
     with = follows(base + kEyeSizeLength + 2);
   }
