@@ -61,7 +61,8 @@ inline TAVHeader header64(uint64_t size, uint16_t type, uint16_t elm, uint32_t i
 inline Element element(bool wide, uint16_t type, uint16_t elm, Bytes payload, uint32_t info = 0)
 {
   const uint64_t size = payload.size();
-  return {wide ? header64(size, type, elm, info) : header32(static_cast<uint32_t>(size), type, elm), std::move(payload)};
+  return {wide ? header64(size, type, elm, info) : header32(static_cast<uint32_t>(size), type, elm),
+          std::move(payload)};
 }
 
 template<class Value>

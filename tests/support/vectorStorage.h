@@ -16,7 +16,8 @@ namespace test
 class VectorStorage : public TAVSideStorage
 {
 public:
-  static constexpr uint64_t kReadWrite = TAV_ATTR_WRITABLE | TAV_ATTR_READ_FORWARD | TAV_ATTR_READ_BACKWARD | TAV_ATTR_SEEK;
+  static constexpr uint64_t kReadWrite =
+      TAV_ATTR_WRITABLE | TAV_ATTR_READ_FORWARD | TAV_ATTR_READ_BACKWARD | TAV_ATTR_SEEK;
   static constexpr uint64_t kReadOnly = TAV_ATTR_READ_FORWARD | TAV_ATTR_READ_BACKWARD | TAV_ATTR_SEEK;
 
   /// `pageBytes` becomes the ioUnit.

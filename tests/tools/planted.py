@@ -1,0 +1,162 @@
+"""Writes streams byte by byte, without the library, so that defects can be planted at known places.
+
+A tree of Node objects is encoded by Encoder; afterwards every node knows where its parts are. Fields that begin with
+`force` make it wrong."""
+import random
+
+EYE = 0xC0DED5EEDDEC0DED
+EYE_SIZE = 0x00400000
+ALIGNED = 0x00100000
+END = 65001
+MARKER = 65000
+NAMED = [20, 307, 321, 60001, 60002, 60003, 60004, 60005, 60006, 60007, 60008, 60103]
+SIZES = {51: 1, 52: 1, 53: 2, 54: 2, 55: 4, 56: 4, 57: 8, 58: 8, 100: 16, 103: 16, 104: 16, 105: 1}
+FREE = [50, 101, 102, 106]
+HOST = "little"
+
+
+class Form:
+    def __init__(self, big=False, wide=True, align=False):
+        self.big, self.wide, self.align = big, wide, align
+
+    @property
+    def order(self):
+        return "big" if self.big else "little"
+
+    def options(self):
+        return ["--byte-order", self.order, "--root", "64" if self.wide else "32",
+                "--align" if self.align else "--no-align"]
+
+
+def random_form(rng):
+    return Form(rng.random() < 0.5, rng.random() < 0.6, rng.random() < 0.4)
+
+
+class Node:
+    """A group when `children` is a list, else a data element."""
+
+    def __init__(self, elm, kind, payload=b"", children=None, info=0, extra=b""):
+        self.elm, self.kind, self.payload, self.children, self.info, self.extra = elm, kind, payload, children, info, extra
+        self.by_string = bool(extra)   # the writer's string operation: its pair is in the host's order
+        self.force_size = None         # in the header
+        self.add_size = 0              # to the right size, in the header
+        self.force_bits = None         # info as it stands in the file
+        self.force_pair = None         # 16 bytes, or b"" for none
+        self.force_padding = None
+        self.force_end = None          # an own Node instead of the end element; False: none
+        self.after_end = []            # nodes behind the end element
+        self.tail = b""                # behind the last child
+        self.offset = self.payload_offset = self.pair_offset = self.padding_offset = self.end = None
+        self.end_element = None
+        self.parent = None
+
+    @property
+    def is_group(self):
+        return self.children is not None
+
+    @property
+    def eye(self):
+        return bool(self.info & EYE_SIZE)
+
+    def walk(self):
+        yield self
+        for child in self.children or []:
+            yield from child.walk()
+
+
+class Encoder:
+    def __init__(self, form):
+        self.form = form
+        self.out = bytearray()
+
+    def number(self, value, width, order=None):
+        return (value & ((1 << 8 * width) - 1)).to_bytes(width, order or self.form.order)
+
+    def header(self, size, kind, elm, info, wide):
+        if wide:
+            return self.number(size, 8) + self.number(info, 4) + self.number(kind, 2) + self.number(elm, 2)
+        return self.number(size, 4) + self.number(kind, 2) + self.number(elm, 2)
+
+    def pair(self, distance, order=None):
+        return self.number(EYE, 8, order) + self.number(distance, 8, order)
+
+    def put(self, node, wide, parent=None):
+        node.parent, node.wide, node.offset = parent, wide, len(self.out)
+        self.out += bytes(16 if wide else 8)
+        node.payload_offset = len(self.out)
+        self.put_children(node, wide) if node.is_group else self.put_payload(node, wide)
+        node.end = len(self.out)
+        if node.is_group:
+            right = node.end - node.payload_offset
+        else:
+            right = len(node.payload)
+        size = right + node.add_size if node.force_size is None else node.force_size
+        bits = node.info | (ALIGNED if self.form.align else 0)
+        bits = bits if node.force_bits is None else node.force_bits
+        head = self.header(size, node.kind, node.elm, bits, wide)
+        self.out[node.offset:node.offset + len(head)] = head
+
+    def put_payload(self, node, wide):
+        self.out += node.payload + node.extra
+        node.padding_offset = len(self.out)
+        padding = bytes(-len(node.payload) % 8 if self.form.align else 0)
+        self.out += padding if node.force_padding is None else node.force_padding
+        node.pair_offset = len(self.out)
+        if wide and node.eye:
+            pair = self.pair(len(node.payload) + 16, HOST if node.by_string else None)
+            self.out += pair if node.force_pair is None else node.force_pair
+
+    def put_children(self, node, wide):
+        inner = wide and node.kind == 2
+        for child in node.children:
+            self.put(child, inner, node)
+        if wide and node.eye and node.force_end is not False:
+            length = len(self.out) - node.payload_offset
+            end = node.force_end or Node(END, 101, self.pair(length + (32 if inner else 16)))
+            self.put(end, inner, node)
+            node.end_element = end
+        for child in node.after_end:
+            self.put(child, inner, node)
+        self.out += node.tail
+
+
+def encode(form, root):
+    encoder = Encoder(form)
+    encoder.put(root, form.wide)
+    return encoder.out
+
+
+def text(rng, length):
+    return bytes(rng.randrange(97, 123) for _ in range(length))
+
+
+def random_data(rng, form, wide, pairs=0.5, strings=0.5, kinds=None):
+    kind = rng.choice(kinds or list(SIZES) + FREE * 2)
+    extra = b""
+    if kind in SIZES:
+        payload = rng.randbytes(SIZES[kind])
+    elif kind == 106:
+        payload = rng.randbytes(8 * rng.randrange(4))
+    elif kind == 102:
+        payload = (1208).to_bytes(2, form.order) + text(rng, rng.randrange(20))
+        extra = b"~~" if rng.random() < strings else b""
+    else:
+        payload = text(rng, rng.randrange(24)) if kind == 50 else rng.randbytes(rng.randrange(40))
+    info = EYE_SIZE if wide and rng.random() < pairs else 0
+    return Node(rng.choice(NAMED), kind, payload, info=info, extra=extra)
+
+
+def random_group(rng, form, wide, depth=3, pairs=0.5, strings=0.5, nodes=6, mixed=0.25):
+    inner = wide and rng.random() >= mixed
+    children = []
+    for _ in range(rng.randrange(2, nodes + 2)):
+        if depth > 0 and rng.random() < 0.35:
+            children.append(random_group(rng, form, inner, depth - 1, pairs, strings, nodes, mixed))
+        else:
+            children.append(random_data(rng, form, inner, pairs, strings))
+    info = EYE_SIZE if wide and rng.random() < pairs else 0
+    return Node(rng.choice(NAMED), 2 if inner else 1, children=children, info=info)
+
+
+def random_tree(rng, form, **more):
+    return random_group(rng, form, form.wide, **more)

@@ -1,0 +1,374 @@
+"""recover brings back every node whose own bytes are whole and to which whole bytes lead, and accounts for every byte."""
+import json
+import os
+import random
+import unittest
+
+from planted import (END, EYE, EYE_SIZE, FREE, HOST, NAMED, SIZES, Form, Node, encode, random_form,
+                     random_tree)
+from support import ToolTest, generate, tav
+
+DAMAGES = int(os.environ.get("TAV_DAMAGES", "400"))  # 10000 on demand
+KILOBYTE = 1024
+PAGE = 512
+KINDS = (1, 2, *SIZES, *FREE)
+
+
+def zeroed(rng, made):
+    length = rng.randrange(1, min(KILOBYTE, len(made)) + 1) if rng.random() < 0.5 else KILOBYTE
+    start = rng.randrange(len(made))
+    made[start:start + length] = bytes(len(made[start:start + length]))
+    return made
+
+
+def cut(rng, made):
+    return made[:rng.randrange(1, len(made))]
+
+
+def flipped(rng, made):
+    for _ in range(rng.choice((1, 1, 2, 8))):
+        made[rng.randrange(len(made))] ^= 1 << rng.randrange(8)
+    return made
+
+
+def swapped_pages(rng, made):
+    pages = len(made) // PAGE
+    if pages < 2:
+        return flipped(rng, made)
+    one, two = (PAGE * page for page in rng.sample(range(pages), 2))
+    made[one:one + PAGE], made[two:two + PAGE] = made[two:two + PAGE], made[one:one + PAGE]
+    return made
+
+
+DAMAGE = (zeroed, cut, flipped, swapped_pages)
+
+
+class Judge:
+    """Tells from the tree that was written, and from where the bytes differ, which nodes have to come back. It looks at
+    no header and searches for nothing."""
+
+    def __init__(self, root, made, damaged):
+        self.made, self.damaged = made, damaged
+        self.wrong = [0]
+        for i, byte in enumerate(made):
+            self.wrong.append(self.wrong[-1] + (i >= len(damaged) or damaged[i] != byte))
+        self.root = root
+
+    def whole(self, start, end):
+        return self.wrong[end] == self.wrong[start]
+
+    def own(self, node):
+        """A data element's header, payload and pair; padding says nothing. A group's header."""
+        if node.is_group:
+            return self.whole(node.offset, node.payload_offset)
+        return (self.whole(node.offset, node.payload_offset + len(node.payload) + len(node.extra)) and
+                self.whole(node.pair_offset, node.end))
+
+    def due(self):
+        """The nodes that have to come back: whole ones whose enclosing pairs are all whole. A group without a pair has its
+        header instead."""
+        due = []
+        self.visit(self.root, due)
+        return due
+
+    def visit(self, node, due):
+        if self.own(node):
+            due.append(node)
+        if not node.is_group:
+            return
+        end = node.end_element
+        if self.whole(end.offset, end.end) if end else self.whole(node.offset, node.payload_offset):
+            for child in node.children:
+                self.visit(child, due)
+
+
+def identity(node):
+    return (node.elm, node.kind, None if node.is_group else bytes(node.payload))
+
+
+def read_back(made, form):
+    """The nodes of a sound stream, by their sizes alone."""
+    def number(at, width):
+        return int.from_bytes(made[at:at + width], form.order)
+
+    def begins(at, end, wide, info):
+        """Whether a pair, a node or the end stands here, not two bytes farther on."""
+        if info & EYE_SIZE:
+            return number(at, 8) == EYE or int.from_bytes(made[at:at + 8], HOST) == EYE
+        kind, elm = (number(at + 12, 2), number(at + 14, 2)) if wide else (number(at + 4, 2), number(at + 6, 2))
+        return at == end or (kind in KINDS and elm in (*NAMED, END))
+
+    def nodes(at, end, wide):
+        while at < end:
+            size, kind, elm = (number(at, 8), number(at + 12, 2), number(at + 14, 2)) if wide else (
+                number(at, 4), number(at + 4, 2), number(at + 6, 2))
+            info = number(at + 8, 4) if wide else 0
+            start = at + (16 if wide else 8)
+            if kind in (1, 2):
+                yield elm, kind, None
+                yield from nodes(start, start + size, wide and kind == 2)
+                at = start + size
+                continue
+            if elm != END:
+                yield elm, kind, bytes(made[start:start + size])
+            at = start + size + (-size % 8 if form.align else 0)
+            at += 2 if kind == 102 and not begins(at, end, wide, info) else 0
+            at += 16 if info & EYE_SIZE else 0
+    return list(nodes(0, len(made), form.wide))
+
+
+def missing(due, back):
+    """Nodes that are due and did not come back, in their order."""
+    counts = {}
+    for node in back:
+        counts[node] = counts.get(node, 0) + 1
+    lacking = []
+    for node in due:
+        counts[identity(node)] = counts.get(identity(node), 0) - 1
+        if counts[identity(node)] < 0:
+            lacking.append(node)
+    return lacking
+
+
+class Recover(ToolTest):
+    def recover(self, made, *options):
+        source, target = self.folder / "damaged.tav", self.folder / "saved.tav"
+        source.write_bytes(made)
+        result = tav("recover", source, "-o", target, "--force", "--json", *options)
+        if result.status == 3:
+            return None, b""
+        self.assertEqual(result.err, "")
+        report = json.loads(result.out)
+        self.assertEqual(report["kept"] + report["lost"] + report["unread"], len(made))
+        self.assertEqual(sum(loss["length"] for loss in report["list"]), report["lost"])
+        repaired = sum(report[name] for name in ("lost", "unread", "groupsClosed", "groupsMade", "pairsMade"))
+        self.assertEqual(result.status, 1 if repaired else 0)
+        saved = target.read_bytes()
+        self.assertEqual(report["written"], len(saved))
+        return report, saved
+
+    def test_a_sound_stream_comes_back_byte_for_byte(self):
+        for seed in range(200):
+            rng = random.Random(seed)
+            form = random_form(rng)
+            made = encode(form, random_tree(rng, form, depth=4))
+            with self.subTest(seed=seed):
+                report, saved = self.recover(made, *form.options())
+                self.assertEqual((saved, report["kept"], report["losses"]), (made, len(made), 0))
+
+    def damages(self, pairs):
+        for number in range(DAMAGES):
+            rng = random.Random(f"{pairs} {number}")
+            form = random_form(rng)
+            form.wide = form.wide or pairs == 1
+            root = random_tree(rng, form, depth=4, pairs=pairs, nodes=rng.choice((4, 8)))
+            made = encode(form, root)
+            damage = DAMAGE[number % len(DAMAGE)]
+            yield number, damage, form, root, made, damage(rng, bytearray(made))
+
+    def check(self, pairs):
+        due_count = 0
+        for number, damage, form, root, made, damaged in self.damages(pairs):
+            with self.subTest(number=number, damage=damage.__name__, form=form.options()):
+                due = Judge(root, made, damaged).due()
+                report, saved = self.recover(damaged, *form.options())
+                back = read_back(saved, form)
+                lacking = missing(due, back)
+                self.assertEqual([(node.offset, *identity(node)) for node in lacking], [])
+                due_count += len(due)
+                if report is not None:
+                    sound = tav("check", self.folder / "saved.tav", *form.options())
+                    self.assertEqual(sound.status, 0, sound.out)
+        return due_count
+
+    def test_what_is_whole_comes_back_from_streams_with_pairs(self):
+        self.assertGreater(self.check(1), DAMAGES * 10)
+
+    def test_what_is_whole_comes_back_from_streams_without_pairs(self):
+        self.assertGreater(self.check(0), DAMAGES * 10)
+
+    def test_what_is_whole_comes_back_from_streams_with_some_pairs(self):
+        self.assertGreater(self.check(0.5), DAMAGES * 10)
+
+
+
+class Unfinished(ToolTest):
+    """Streams of a writer that was killed: groups open, the last bytes missing."""
+
+    def saved(self, path, *options):
+        target = self.folder / "saved.tav"
+        result = tav("recover", path, "-o", target, "--force", "--json", *options)
+        self.assertEqual((result.status, result.err), (1, ""))
+        self.assertEqual(tav("check", target, *options).status, 0)
+        return json.loads(result.out), target.read_bytes()
+
+    def test_open_groups_are_closed_and_all_nodes_come_back(self):
+        path = self.folder / "g.tav"
+        for seed in range(1, 30):
+            form = Form(wide=seed % 3 != 0, align=seed % 2 == 0)
+            options = [*(["--align"] if form.align else []), *([] if form.wide else ["--root32"])]
+            with self.subTest(seed=seed):
+                made = generate(path, *options, "--unfinished", "--seed", seed, "--nodes", 80)
+                report, _ = self.saved(path, *form.options())
+                self.assertEqual((report["lost"], report["nodes"]), (0, len(made["nodes"])))
+                self.assertGreater(report["groupsClosed"], 0)
+
+    def test_a_file_without_its_last_page_keeps_what_is_before(self):
+        for seed in range(40):
+            rng = random.Random(seed)
+            form = random_form(rng)
+            root = random_tree(rng, form, depth=3, pairs=0, nodes=8)
+            for node in root.walk():
+                if node.is_group:
+                    node.force_size = -1 if seed % 2 else None
+            root.force_size = -1
+            made = encode(form, root)
+            if len(made) < 2 * PAGE:
+                continue
+            path = self.folder / "cut.tav"
+            end = len(made) // PAGE * PAGE
+            path.write_bytes(made[:end])
+            with self.subTest(seed=seed):
+                report, saved = self.saved(path, *form.options())
+                due = [node for node in root.walk()
+                       if (node.payload_offset if node.is_group else node.padding_offset) <= end]
+                self.assertEqual([node.offset for node in missing(due, read_back(saved, form))], [])
+                self.assertEqual(report["kept"] + report["lost"], end)
+
+    def test_a_group_whose_header_is_lost_comes_back_by_its_end_element(self):
+        children = [Node(NAMED[4], 55, b"abcd"), Node(NAMED[5], 50, b"text")]
+        group = Node(NAMED[3], 1, children=children, info=EYE_SIZE)
+        root = Node(NAMED[0], 2, children=[Node(NAMED[1], 57, bytes(8)), group, Node(NAMED[2], 57, bytes(8))], info=EYE_SIZE)
+        form = Form()
+        made = encode(form, root)
+        made[group.offset:group.payload_offset] = b"\xff" * 16
+        path = self.folder / "x.tav"
+        path.write_bytes(made)
+        report, saved = self.saved(path, *form.options())
+        self.assertEqual((report["groupsMade"], report["lost"], len(saved)), (1, 16, len(made)))
+        self.assertEqual(tav("get", self.folder / "saved.tav", *form.options(), "/docRoot/docRoot/*", "--all").out.splitlines()[0],
+                         str(int.from_bytes(b"abcd", "little")))
+
+    def test_nodes_that_lost_all_groups_come_back_under_a_root_of_their_own(self):
+        form = Form()
+        root = Node(NAMED[3], 2, children=[Node(NAMED[1], 57, bytes(range(8))), Node(NAMED[2], 57, bytes(range(8, 16)))])
+        made = encode(form, root)
+        made[0:16] = bytes(16)
+        path = self.folder / "x.tav"
+        path.write_bytes(made)
+        report, saved = self.saved(path, *form.options())
+        self.assertEqual((report["groupsMade"], report["lost"], report["nodes"]), (1, 16, 2))
+        self.assertEqual(saved[12:16], bytes([2, 0, 20, 0]))
+
+
+class Cost(ToolTest):
+    def bytes_read(self, *arguments):
+        result = tav(*arguments, "--stats", "--ring", "64K")
+        return int(next(line for line in result.err.splitlines() if "bytes read" in line).split(": ")[-1].split()[0])
+
+    def test_at_most_three_times_a_plain_walk(self):
+        path = self.folder / "big.tav"
+        generate(path, "--pairs", "--mixed", "--nodes", 20000, "--depth", 6, "--seed", 3)
+        made = path.read_bytes()
+        rng = random.Random(1)
+        for name, damage in (("none", lambda made: made), ("zeroed", zeroed), ("flipped", flipped), ("swapped", swapped_pages)):
+            damaged = bytearray(made)
+            for _ in range(20):
+                damaged = damage(rng, damaged) if name != "none" else damaged
+            path.write_bytes(damaged)
+            with self.subTest(damage=name):
+                walk = self.bytes_read("check", path, "--byte-order", "little", "--root", "64", "--no-align")
+                cost = self.bytes_read("recover", path, "-o", self.folder / "saved.tav", "--force", "--byte-order", "little",
+                                       "--root", "64", "--no-align")
+                self.assertLessEqual(cost, 3 * walk)
+
+    def test_hostile_streams_end_soon(self):
+        path = self.folder / "x.tav"
+        nest = bytes.fromhex("FFFFFFFF01001400")
+        eye = bytes.fromhex("ED0DECDDEED5DEC0")
+        for name, made in (("nested", nest * 100000), ("nested with data", nest * 50000 + bytes.fromhex("040000003700140007000000") * 50000),
+                           ("claims", bytes.fromhex("0000001001001400") + bytes.fromhex("005ED0B265001400") * 100000),
+                           ("eyes", (eye + bytes([16]) + bytes(7)) * 100000), ("headers", bytes.fromhex("FFFF000066001400") * 100000)):
+            path.write_bytes(made)
+            with self.subTest(stream=name):
+                for command in (["check"], ["recover", "-o", self.folder / "saved.tav", "--force"]):
+                    result = tav(*command, path)
+                    self.assertIn(result.status, (1, 3), result.err)
+
+
+class Command(ToolTest):
+    def damaged(self):
+        path = self.snapshot("--eye-size")
+        made = bytearray(path.read_bytes())
+        made[len(made) // 2:len(made) // 2 + 30] = bytes(30)
+        path.write_bytes(made)
+        return path, made
+
+    def test_the_report_accounts_for_every_byte(self):
+        path, made = self.damaged()
+        result = tav("recover", path, "-o", self.folder / "y.tav")
+        self.assertEqual((result.status, result.err), (1, ""))
+        numbers = [int(word) for word in result.out.split("bytes  ")[1].split("\n")[0].split() if word.isdigit()]
+        self.assertEqual(numbers[0], len(made))
+        self.assertEqual(sum(numbers[1:4]), len(made))
+        self.assertEqual(tav("check", self.folder / "y.tav").status, 0)
+
+    def test_a_sound_stream_is_copied_and_nothing_is_told(self):
+        path = self.snapshot()
+        result = tav("recover", path, "-o", self.folder / "y.tav")
+        self.assertEqual((result.status, result.err), (0, ""))
+        self.assertEqual((self.folder / "y.tav").read_bytes(), path.read_bytes())
+
+    def test_standard_input_and_output_work(self):
+        path, made = self.damaged()
+        result = tav("recover", "-", "-o", "-", stdin=bytes(made))
+        self.assertIn("kept", result.err)
+        tav("recover", path, "-o", self.folder / "y.tav")
+        self.assertEqual(result.raw, (self.folder / "y.tav").read_bytes())
+
+    def test_the_report_goes_to_a_file_when_asked(self):
+        path, made = self.damaged()
+        result = tav("recover", path, "-o", self.folder / "y.tav", "--json", "--report", self.folder / "r.json")
+        self.assertEqual((result.status, result.out, result.err), (1, "", ""))
+        report = json.loads((self.folder / "r.json").read_text())
+        self.assertEqual(report["kept"] + report["lost"] + report["unread"], len(made))
+
+    def test_an_existing_file_is_not_replaced_without_force(self):
+        path, _ = self.damaged()
+        (self.folder / "y.tav").write_bytes(b"mine")
+        result = tav("recover", path, "-o", self.folder / "y.tav")
+        self.assertEqual((result.status, (self.folder / "y.tav").read_bytes()), (2, b"mine"))
+        self.assertIn("KOR_RC_FILE_EXISTS", result.err)
+
+    def test_nothing_is_written_when_nothing_is_whole(self):
+        path = self.folder / "x.tav"
+        path.write_bytes(b"no stream at all, but text" * 10)
+        result = tav("recover", path, "-o", self.folder / "y.tav")
+        self.assertEqual((result.status, [entry.name for entry in self.folder.iterdir()]), (3, ["x.tav"]))
+
+    def test_a_full_disk_is_told(self):
+        path, _ = self.damaged()
+        result = tav("recover", path, "-o", "/dev/full")
+        self.assertEqual(result.status, 2)
+        self.assertIn("KOR_RC_NO_SPACE", result.err)
+
+    def test_what_was_not_searched_is_unread(self):
+        path = self.folder / "x.tav"
+        form = Form()
+        made = encode(form, Node(20, 2, children=[Node(NAMED[1], 57, bytes(8))]))
+        path.write_bytes(made + b"\xff" * 200000)
+        result = tav("recover", path, "-o", self.folder / "y.tav", "--json", "--search", "20000", *form.options())
+        report = json.loads(result.out)
+        self.assertGreater(report["unread"], 0)
+        self.assertEqual(report["kept"] + report["lost"] + report["unread"], len(made) + 200000)
+
+    def test_wrong_usage_is_told(self):
+        path, _ = self.damaged()
+        for arguments in ([path], [], ["/nonexistent/x.tav", "-o", self.folder / "y.tav"]):
+            result = tav("recover", *arguments)
+            self.assertEqual(result.status, 2)
+            self.assertTrue(result.err.startswith("tav: "), result.err)
+
+
+if __name__ == "__main__":
+    unittest.main()
