@@ -97,7 +97,7 @@ slow='tools\.(json|check|recover|build)_test'
 # The tests link the library's objects statically everywhere; here the installed static libraries are what is new.
 check_static()
 {
-  build static --target tav kor tav_tool snapshot growing_storage layer_tour
+  build static --target tav kor tav_texts snapshot growing_storage layer_tour
   run_tests static --tests-regex '^(install|examples)\.'
 }
 

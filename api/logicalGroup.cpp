@@ -109,7 +109,8 @@ uint32_t tavFindLogicalGroup(uint64_t options, TAVHandle* handle, TAVHeader* par
   if (!frame.require(10, handle != nullptr, TAV_RC_BAD_PARAM) ||
       !frame.require(20, parent != nullptr, TAV_RC_BAD_PARAM) ||
       !frame.require(30, param != nullptr, TAV_RC_BAD_PARAM) || !frame.require(40, out != nullptr, TAV_RC_BAD_PARAM) ||
-      !frame.require(50, options == 0, TAV_RC_BAD_OPTIONS) || !frame.require(60, isReadOnly(*handle), TAV_RC_WRONG_MODE) ||
+      !frame.require(50, options == 0, TAV_RC_BAD_OPTIONS) ||
+      !frame.require(60, isReadOnly(*handle), TAV_RC_WRONG_MODE) ||
       !frame.require(70, param->pPath != nullptr || param->pathCount == 0, TAV_RC_BAD_PARAM))
   {
     return frame.code();

@@ -137,7 +137,8 @@ uint32_t tavGetNextChild(uint64_t options, TAVHandle* handle, TAVHeader* parent,
   frame.dump(0, options, handle, "Parent and reference child headers", trace::record(parent), trace::record(refChild),
              out);
   if (!frame.require(10, handle != nullptr, TAV_RC_BAD_PARAM) || !frame.require(20, out != nullptr, TAV_RC_BAD_PARAM) ||
-      !frame.require(30, options == 0, TAV_RC_BAD_OPTIONS) || !frame.require(40, isReadOnly(*handle), TAV_RC_WRONG_MODE))
+      !frame.require(30, options == 0, TAV_RC_BAD_OPTIONS) ||
+      !frame.require(40, isReadOnly(*handle), TAV_RC_WRONG_MODE))
   {
     return frame.code();
   }

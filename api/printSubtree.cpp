@@ -59,7 +59,8 @@ uint32_t printKeys(TAVPrintCtx& ctx, TAVHandle& handle, TAVHeader& group)
   }
 }
 
-/// A group's opening with its keys as attributes. Its children, the keys among them, are walked afterwards all the same.
+/// A group's opening with its keys as attributes. Its children, the keys among them, are walked afterwards all the
+/// same.
 uint32_t printWithKeys(TAVPrintCtx& ctx, TAVHandle& handle, TAVHeaderData& group)
 {
   ctx.attributeForm = 1;

@@ -23,9 +23,10 @@ struct Wanted
 
 bool matches(const Wanted& wanted, const TAVHeader& node, uint64_t depth)
 {
-  const bool keyMatches = wanted.infoKey == 0 || (is64(node) && (node.hdr64.info & TAV_INFO_KEY_MASK) == wanted.infoKey);
-  return depth >= uint64_t{wanted.minDepth} + 1 && depth <= uint64_t{wanted.maxDepth} + 1 && elmOf(node) == wanted.elm &&
-         keyMatches;
+  const bool keyMatches =
+      wanted.infoKey == 0 || (is64(node) && (node.hdr64.info & TAV_INFO_KEY_MASK) == wanted.infoKey);
+  return depth >= uint64_t{wanted.minDepth} + 1 && depth <= uint64_t{wanted.maxDepth} + 1 &&
+         elmOf(node) == wanted.elm && keyMatches;
 }
 
 /// Looks through one level, from after `previous` on. A group on the way is entered by pushing it, and the caller gets

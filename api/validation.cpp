@@ -85,7 +85,8 @@ uint32_t tavValidateSubtreeInt(uint64_t options, TAVHandle* handle, TAVHeader* h
 {
   TraceFrame frame(probe::validateSubtree);
   frame.dump(0, options, handle, trace::record(header));
-  if (!frame.require(10, handle != nullptr, TAV_RC_BAD_PARAM) || !frame.require(20, header != nullptr, TAV_RC_BAD_PARAM))
+  if (!frame.require(10, handle != nullptr, TAV_RC_BAD_PARAM) ||
+      !frame.require(20, header != nullptr, TAV_RC_BAD_PARAM))
   {
     return frame.code();
   }

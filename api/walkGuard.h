@@ -15,7 +15,8 @@ namespace tav
 class WalkGuard
 {
 public:
-  explicit WalkGuard(const TAVHeader& start) : start_(start.nodeOffset)
+  explicit WalkGuard(const TAVHeader& start)
+      : start_(start.nodeOffset)
   {
   }
 

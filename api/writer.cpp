@@ -113,7 +113,8 @@ uint32_t tavAddElement(uint64_t options, TAVHandle* handle, TAVHeaderData* heade
   frame.dump(0, options, handle, "Element to be appended", trace::record(headerData));
   if (!frame.require(10, handle != nullptr, TAV_RC_BAD_PARAM) ||
       !frame.require(20, headerData != nullptr, TAV_RC_BAD_PARAM) ||
-      !frame.require(30, !isReadOnly(*handle), TAV_RC_WRONG_MODE) || !frame.require(40, options == 0, TAV_RC_BAD_OPTIONS))
+      !frame.require(30, !isReadOnly(*handle), TAV_RC_WRONG_MODE) ||
+      !frame.require(40, options == 0, TAV_RC_BAD_OPTIONS))
   {
     return frame.code();
   }

@@ -10,7 +10,7 @@ trap 'rm -rf "$work"' EXIT
 quietly() { "$@" >"$work/log" 2>&1 || { cat "$work/log"; return 1; }; }
 
 quietly cmake -S . -B "$build" -G Ninja -DCMAKE_BUILD_TYPE=Release -DCMAKE_INSTALL_PREFIX=/usr \
-  -DCMAKE_SKIP_INSTALL_RPATH=ON -DTAV_BUILD_TESTS=OFF -DTAV_BUILD_EXAMPLES=OFF
+  -DCMAKE_SKIP_INSTALL_RPATH=ON -DTAV_BUILD_TESTS=OFF -DTAV_BUILD_EXAMPLES=OFF -DTAV_COMPRESS_MANUAL=ON
 quietly cmake --build "$build" --parallel "$(nproc)"
 quietly cpack --config "$build/CPackConfig.cmake" -B "$work/packages"
 mapfile -t packages < <(find "$work/packages" -maxdepth 1 -name '*.deb' | sort)

@@ -85,7 +85,9 @@ template<class... Items>
 [[gnu::cold, gnu::noinline]] void variables(uint32_t probe, uint32_t point, const Items&... items)
 {
   const auto triple = [](const KORTraceItem& one) { return std::make_tuple(uint32_t{0}, one.length, one.pData); };
-  const auto emit = [&](auto... flat) { _wtraceVar(threadId(), probe, point, KOR_TRACE_VAR, static_cast<uint32_t>(sizeof...(Items)), flat...); };
+  const auto emit = [&](auto... flat) {
+    _wtraceVar(threadId(), probe, point, KOR_TRACE_VAR, static_cast<uint32_t>(sizeof...(Items)), flat...);
+  };
   std::apply(emit, std::tuple_cat(triple(items)...));
 }
 

@@ -183,7 +183,8 @@ uint32_t TAVCircularBuf::write(uint64_t offset, const void* data, uint64_t size,
   TraceFrame frame(probe::cbWrite);
   frame.dump(0, offset, data, size, direct);
   if (!frame.require(10, storageWritable != 0, TAV_RC_NOT_SUPPORTED) ||
-      !frame.require(20, data != nullptr && pRing != nullptr, TAV_RC_BAD_PARAM) || !frame.require(30, size != 0, TAV_RC_BAD_PARAM))
+      !frame.require(20, data != nullptr && pRing != nullptr, TAV_RC_BAD_PARAM) ||
+      !frame.require(30, size != 0, TAV_RC_BAD_PARAM))
   {
     return frame.code();
   }

@@ -264,7 +264,7 @@ public:
                 bool backward) override; ///< a backward read fills the end of the buffer
   uint32_t write(const void* pData, uint64_t size, uint64_t* pWritten) override;
   uint32_t getMemory(void** ppData, uint64_t* pSize) override; ///< not supported
-  uint32_t lock(uint32_t mode) override;                       ///< exclusive, refused at once when another process holds it
+  uint32_t lock(uint32_t mode) override;                       ///< exclusive, refused at once when it is held
   uint32_t unlock() override;
 
   KORHFile* pFile;   ///< null when opening failed
