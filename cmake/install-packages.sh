@@ -1,11 +1,12 @@
 #!/usr/bin/env bash
 # Installs the Debian packages of the named groups that are missing. This is the one list of them.
-#   cmake/install-packages.sh GROUP...        groups: build, test, full
+#   cmake/install-packages.sh GROUP...        groups: build, test, full, bench
 set -euo pipefail
 
 declare -A groups=(
   [build]="g++ cmake ninja-build libcli11-dev nlohmann-json3-dev"
   [test]="libgtest-dev libgmock-dev pkg-config python3 binutils jq libxml2-utils"
+  [bench]="libbenchmark-dev"
   [full]="clang clang-format clang-tidy libclang-rt-dev ccache doxygen lintian dpkg-dev file gzip abigail-tools"
 )
 
