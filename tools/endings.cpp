@@ -39,7 +39,8 @@ public:
 
   std::vector<Ending> run()
   {
-    constexpr size_t kWindow = 256 * 1024;
+    // What was read stays at hand for the look at what an eye catcher ends.
+    constexpr size_t kWindow = ByteSource::kPage;
     std::vector<uint8_t> window(kWindow + kEyeLength - 1);
     for (uint64_t at = from_; at < source_.size(); at += kWindow)
     {
