@@ -92,6 +92,7 @@ private:
     bool hidden = false; ///< too deep: its children go to the group around
   };
 
+  static bool isKnown(const TAVHeader& header);
   Candidate look(uint64_t offset, bool wide);
   void lookAtGroup(Candidate& found, uint64_t limit);
   void lookAtData(Candidate& found, uint64_t limit);
@@ -145,6 +146,8 @@ private:
   uint64_t position_ = 0;
   uint64_t sureFrom_ = 0; ///< the first node beyond doubt at or behind this place is at sureAt_
   uint64_t sureAt_ = 0;
+  bool sureFound_ = false;
+  bool sureWide_ = false; ///< as seen from nodes with these headers
 };
 
 } // namespace tav::tool
