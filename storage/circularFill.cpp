@@ -173,9 +173,11 @@ uint32_t TAVCircularBuf::readPageForward(uint64_t offset, Purpose purpose, bool&
   {
     return rc;
   }
-  if (ended && !full && purpose == Purpose::write && storageWritable != 0 && (got != 0 || !isCached(offset)))
+  if (ended && !full && purpose == Purpose::write && storageWritable != 0 && !isCached(offset))
   {
-    zeroPending(index + got, room - got); // the stream grows here
+    // The stream grows here. While the byte that is written is cached there is no need: a file that ends in this page
+    // would get more zeros at its end each time that the ring begins anew.
+    zeroPending(index + got, room - got);
     got = room;
   }
   if (got == 0)
