@@ -120,6 +120,15 @@ TEST(FillAtTheEnd, MakesNoPageForAWriteWhoseOffsetIsCached)
   EXPECT_EQ(small.storage.bytes.size(), 8U);
 }
 
+TEST(FillAtTheEnd, DoesNotLengthenTheStorageForAWriteWhoseOffsetIsCached)
+{
+  SmallRing small(13);
+  const std::vector<uint8_t> bytes(4, 'x');
+  ASSERT_EQ(small.ring.write(2, bytes.data(), bytes.size(), false), TAV_RC_OK); // 2 pages from 2 on: 10 and 3 bytes
+  ASSERT_EQ(small.ring.reset(), TAV_RC_OK);
+  EXPECT_EQ(small.storage.bytes.size(), 13U) << "the page that the storage ends in stays short";
+}
+
 TEST(FillAtTheEnd, MakesPagesUpToAWriteFartherBehind)
 {
   SmallRing small(8);
