@@ -92,7 +92,7 @@ check_thread()
 # Tests that compile programs say nothing new under a sanitizer; the longest ones of the program run once, with g++ and
 # without sanitizers.
 compiles='cpp\.misuse|install\..*'
-slow='tools\.(json|check|recover|build)_test'
+slow='tools\.(json|check|recover|build|forms)_test'
 
 # The tests link the library's objects statically everywhere; here the installed static libraries are what is new.
 check_static()
