@@ -1,4 +1,7 @@
 /// Closing and abandoning groups.
+#include <array>
+#include <cstring>
+
 #include "api/rawWrite.h"
 #include "format/layout.h"
 #include "kor/traceFrame.h"
@@ -11,18 +14,28 @@ namespace
 
 constexpr uint64_t kAbandon = 1;
 
-/// Writes the size of a group's header, the header's first field, over the one in the stream.
+/// Encodes the size of a group's header, the header's first field, and returns its length.
+uint64_t encodeGroupSize(uint64_t size, bool wide, bool swap, uint8_t* to)
+{
+  if (wide)
+  {
+    const uint64_t word = swap ? kor::byteswap64(size) : size;
+    std::memcpy(to, &word, sizeof word);
+    return sizeof word;
+  }
+  const auto narrow = static_cast<uint32_t>(size);
+  const uint32_t word = swap ? kor::byteswap32(narrow) : narrow;
+  std::memcpy(to, &word, sizeof word);
+  return sizeof word;
+}
+
+/// Writes the size of a group over the one in the stream.
 uint32_t patchSize(TAVHandle& handle, const TAVHeader& group)
 {
   uint64_t position = group.nodeOffset;
-  const bool swap = handle.swapBytes != 0;
-  if (is64(group))
-  {
-    const uint64_t size = swap ? kor::byteswap64(group.hdr64.size) : group.hdr64.size;
-    return rawWrite(handle, position, &size, sizeof size);
-  }
-  const uint32_t size = swap ? kor::byteswap32(group.hdr32.size) : group.hdr32.size;
-  return rawWrite(handle, position, &size, sizeof size);
+  std::array<uint8_t, sizeof(uint64_t)> bytes;
+  const uint64_t length = encodeGroupSize(sizeOf(group), is64(group), handle.swapBytes != 0, bytes.data());
+  return rawWrite(handle, position, bytes.data(), length);
 }
 
 uint32_t abandonGroup(TAVHandle& handle, const TAVHeader& group)
@@ -90,9 +103,7 @@ uint32_t closeGroup(TAVHandle& handle, TAVHeader& group)
   }
 }
 
-} // namespace
-
-uint32_t tavCloseHeader(uint64_t options, TAVHandle* handle)
+[[gnu::noinline]] uint32_t closeTraced(uint64_t options, TAVHandle* handle)
 {
   TraceFrame frame(probe::closeHeader);
   frame.dump(0, options, handle);
@@ -110,4 +121,38 @@ uint32_t tavCloseHeader(uint64_t options, TAVHandle* handle)
     frame.dump(100, handle->streamBytes);
   }
   return frame.code();
+}
+
+/// Closes the innermost group in place while tracing is off and it has no end element; false, with nothing done, where
+/// anything else is to be done.
+bool closeSilently(TAVHandle& handle)
+{
+  TAVHdrStack* const stack = handle.pHdrStack;
+  if (stack == nullptr || stack->count == 0 || isReadOnly(handle)) [[unlikely]]
+  {
+    return false;
+  }
+  const TAVHeader& group = stack->pEntries[stack->count - 1];
+  if (!isKnownHdrType(group.hdrType) || hasEyeSize(group)) [[unlikely]]
+  {
+    return false;
+  }
+  const uint64_t payload = handle.streamBytes - group.nodeOffset - headerLength(group.hdrType);
+  const bool wide = is64(group);
+  uint8_t* const to = takePlace(handle, group.nodeOffset, wide ? sizeof payload : sizeof(uint32_t));
+  if (to == nullptr) [[unlikely]]
+  {
+    return false;
+  }
+  encodeGroupSize(payload, wide, handle.swapBytes != 0, to);
+  --stack->count;
+  return true;
+}
+
+} // namespace
+
+uint32_t tavCloseHeader(uint64_t options, TAVHandle* handle)
+{
+  const bool silent = !tracing() && options == 0 && handle != nullptr;
+  return silent && closeSilently(*handle) ? TAV_RC_OK : closeTraced(options, handle);
 }

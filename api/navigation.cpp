@@ -1,80 +1,17 @@
 /// Walking forward: first children and siblings.
-#include "api/rawWrite.h"
-#include "format/layout.h"
-#include "kor/traceFrame.h"
-#include "tav/probes.h"
+#include "api/nodeStep.h"
 
 using namespace tav;
 
 namespace
 {
 
-/// Where a child would start, and where its parent's content ends.
-struct Place
-{
-  uint64_t start = 0;
-  uint64_t end = 0;
-  bool wide = true; ///< the child has a 64-bit header
-  bool fits = true; ///< neither offset passes 64 bits
-};
-
 /// The stream's first node. Whether the storage tells its size is not asked: the bound decides.
-Place placeOfRoot(const TAVHandle& handle)
+Level levelOfRoot(const TAVHandle& handle)
 {
-  Place place;
-  place.wide = (handle.options & TAV_OPT_ROOT32) == 0;
-  static_cast<void>(handle.pSideStorage->getTotalSize(&place.end));
-  return place;
-}
-
-/// A group's content. An open group with a 32-bit header ends at 4 GiB, one with a 64-bit header nowhere.
-Place placeOfFirstChild(const TAVHeader& parent)
-{
-  Place place;
-  place.wide = hasChildren64(parent);
-  place.start = parent.nodeOffset;
-  place.fits = addChecked(place.start, headerLength(parent.hdrType));
-  if (isSizeUnknown(parent))
-  {
-    place.end = sizeOf(parent);
-    return place;
-  }
-  place.end = place.start;
-  place.fits = addChecked(place.end, sizeOf(parent)) && place.fits;
-  return place;
-}
-
-/// The bytes from a node's start to its sibling's.
-bool lengthOf(const TAVHandle& handle, const TAVHeader& node, uint64_t& length)
-{
-  const bool element = !isGroup(node);
-  length = sizeOf(node);
-  bool fits = true;
-  if (element && (handle.alignMode == 1 || (infoOf(node) & TAV_INFO_ALIGNED8) != 0))
-  {
-    fits = roundUp8Checked(length);
-  }
-  fits = addChecked(length, headerLength(node.hdrType)) && fits;
-  if (element && hasEyeSize(node))
-  {
-    fits = addChecked(length, kEyeSizeLength) && fits;
-  }
-  return fits;
-}
-
-bool findSibling(TraceFrame& frame, const TAVHandle& handle, const TAVHeader& reference, Place& place)
-{
-  if (!frame.require(70, is64(reference) == place.wide, TAV_RC_BAD_PARAM) ||
-      !frame.require(80, place.end > reference.nodeOffset, TAV_RC_BAD_PARAM) ||
-      !frame.require(90, !isEndElement(elmOf(reference)), TAV_RC_NO_MORE_CHILDREN))
-  {
-    return false;
-  }
-  uint64_t length = 0;
-  place.fits = lengthOf(handle, reference, length) && place.fits;
-  place.start = reference.nodeOffset;
-  place.fits = addChecked(place.start, length) && place.fits;
-  return true;
+  uint64_t end = 0;
+  static_cast<void>(handle.pSideStorage->getTotalSize(&end));
+  return {0, end, (handle.options & TAV_OPT_ROOT32) == 0, true};
 }
 
 bool isSameOpenGroup(const TAVHeader& node, const TAVHeader& reference)
@@ -116,22 +53,8 @@ uint32_t readAfterOpenGroup(TAVHandle& handle, const TAVHeader& parent, const TA
   }
 }
 
-bool findPlace(TraceFrame& frame, const TAVHandle& handle, const TAVHeader* parent, const TAVHeader* reference,
-               Place& place)
-{
-  place = parent != nullptr ? placeOfFirstChild(*parent) : placeOfRoot(handle);
-  if (parent != nullptr && reference != nullptr && !findSibling(frame, handle, *reference, place))
-  {
-    return false;
-  }
-  return frame.require(110, place.fits && place.start <= place.end, TAV_RC_OUTSIDE_PARENT) &&
-         frame.require(120, place.start != place.end, TAV_RC_NO_MORE_CHILDREN);
-}
-
-} // namespace
-
-uint32_t tavGetNextChild(uint64_t options, TAVHandle* handle, TAVHeader* parent, TAVHeader* refChild,
-                         TAVHeaderData* out)
+[[gnu::noinline]] uint32_t nextChildTraced(uint64_t options, TAVHandle* handle, TAVHeader* parent, TAVHeader* refChild,
+                                           TAVHeaderData* out)
 {
   TraceFrame frame(probe::getNextChild);
   frame.dump(0, options, handle, "Parent and reference child headers", trace::record(parent), trace::record(refChild),
@@ -142,15 +65,130 @@ uint32_t tavGetNextChild(uint64_t options, TAVHandle* handle, TAVHeader* parent,
   {
     return frame.code();
   }
-  Place place;
-  const bool afterOpen = parent != nullptr && refChild != nullptr && isSizeUnknown(*refChild);
-  const bool found = afterOpen ? frame.require(50, isGroup(*refChild), TAV_RC_NOT_SUPPORTED) &&
-                                     frame.step(60, readAfterOpenGroup(*handle, *parent, *refChild, *out))
-                               : findPlace(frame, *handle, parent, refChild, place) &&
-                                     frame.step(130, tavReadNodeInt(0, handle, place.start, place.wide, out));
+  const bool sibling = parent != nullptr && refChild != nullptr;
+  bool found = false;
+  if (sibling && isSizeUnknown(*refChild))
+  {
+    found = frame.require(50, isGroup(*refChild), TAV_RC_NOT_SUPPORTED) &&
+            frame.step(60, readAfterOpenGroup(*handle, *parent, *refChild, *out));
+  }
+  else
+  {
+    const Level level = parent != nullptr ? levelBelow(nodeOf(*parent)) : levelOfRoot(*handle);
+    uint64_t start = 0;
+    found = findPlace(frame, handle->alignMode == 1, level, !sibling, sibling ? nodeOf(*refChild) : Node{}, start) &&
+            frame.step(130, tavReadNodeInt(0, handle, start, level.wide, out));
+  }
   if (found)
   {
     frame.dump(100, trace::record(out));
   }
   return frame.code();
+}
+
+/// The usual step, over closed groups; else `kUnusual`, with nothing done. Made for each form of the children,
+/// with its lengths as constants.
+template<bool Wide>
+uint32_t nextChildSilently(TAVHandle& handle, const TAVHeader& parent, const TAVHeader* reference, TAVHeaderData& out)
+{
+  const Node group = nodeOf(parent);
+  uint64_t start = group.offset;
+  uint64_t end = 0;
+  if (group.sizeUnknown() || !addFits(start, group.length(), start) || !addFits(start, group.fields.size, end))
+      [[unlikely]]
+  {
+    return kUnusual;
+  }
+  if (reference != nullptr)
+  {
+    const Node before = nodeOf<Wide>(*reference);
+    uint64_t length = 0;
+    if (before.sizeUnknown() || end <= before.offset || !lengthOf(handle.alignMode == 1, before, length) ||
+        !addFits(before.offset, length, start)) [[unlikely]]
+    {
+      return kUnusual;
+    }
+    if (isEndElement(before.fields.elm)) [[unlikely]]
+    {
+      return TAV_RC_NO_MORE_CHILDREN;
+    }
+  }
+  if (start >= end) [[unlikely]]
+  {
+    return start == end ? TAV_RC_NO_MORE_CHILDREN : kUnusual;
+  }
+  Node node{start, {}, Wide};
+  return readSilently(handle, node, out) ? TAV_RC_OK : kUnusual;
+}
+
+/// Everything but the plain step.
+[[gnu::noinline]] uint32_t nextChildOther(uint64_t options, TAVHandle* handle, TAVHeader* parent, TAVHeader* refChild,
+                                          TAVHeaderData* out)
+{
+  // Without a parent the storage is asked for its size: a call that leaves the library.
+  const bool silent =
+      !tracing() && handle != nullptr && parent != nullptr && out != nullptr && options == 0 && isReadOnly(*handle);
+  uint32_t rc = kUnusual;
+  if (silent && hasChildren64(*parent))
+  {
+    rc = refChild == nullptr || is64(*refChild) ? nextChildSilently<true>(*handle, *parent, refChild, *out) : kUnusual;
+  }
+  else if (silent)
+  {
+    rc =
+        refChild == nullptr || !is64(*refChild) ? nextChildSilently<false>(*handle, *parent, refChild, *out) : kUnusual;
+  }
+  return rc != kUnusual ? rc : nextChildTraced(options, handle, parent, refChild, out);
+}
+
+/// Where the sibling after a plain node starts; false for what is not plain.
+[[gnu::always_inline]] inline bool findPlainSibling(const TAVHeader& reference, uint64_t end, uint64_t& start)
+{
+  const uint64_t left = end - reference.nodeOffset;
+  const uint64_t size = reference.hdr64.size;
+  start = reference.nodeOffset + size + kHeaderSize64;
+  // A size below what is left passes no sum.
+  return is64(reference) && reference.nodeOffset < end && size < left && !isEndElement(reference.hdr64.elm) &&
+         (reference.hdr64.info & (TAV_INFO_ALIGNED8 | TAV_INFO_EYE_SIZE)) == 0;
+}
+
+} // namespace
+
+uint32_t tavGetNextChild(uint64_t options, TAVHandle* handle, TAVHeader* parent, TAVHeader* refChild,
+                         TAVHeaderData* out)
+{
+  // Closed groups of 64-bit headers in memory are what most walks are over. Every other way out ends in one call.
+  if (tracing() || handle == nullptr || parent == nullptr || out == nullptr || options != 0 ||
+      !readsPlainBlock(*handle) || !hasChildren64(*parent)) [[unlikely]]
+  {
+    return nextChildOther(options, handle, parent, refChild, out);
+  }
+  Node node{0, {}, true};
+  uint64_t end = 0;
+  if (!addFits(parent->nodeOffset, kHeaderSize64, node.offset) || !addFits(node.offset, parent->hdr64.size, end) ||
+      (refChild != nullptr && !findPlainSibling(*refChild, end, node.offset))) [[unlikely]]
+  {
+    return nextChildOther(options, handle, parent, refChild, out);
+  }
+  if (node.offset >= end) [[unlikely]]
+  {
+    return node.offset == end ? TAV_RC_NO_MORE_CHILDREN : nextChildOther(options, handle, parent, refChild, out);
+  }
+  const Block block{handle->pDirectData, handle->directDataSize, false, false};
+  DataPlace data{};
+  if (!readHeader(block, node, data)) [[unlikely]]
+  {
+    return nextChildOther(options, handle, parent, refChild, out);
+  }
+  if (node.group()) [[unlikely]]
+  {
+    handOut(node, data, false, false, *out);
+    return TAV_RC_OK;
+  }
+  if (node.fields.size > data.room) [[unlikely]]
+  {
+    return nextChildOther(options, handle, parent, refChild, out);
+  }
+  handOut(node, data, true, false, *out);
+  return TAV_RC_OK;
 }

@@ -1,8 +1,11 @@
 /// How bytes reach the stream: the one step under every writing operation.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
+#include <cstring>
 
+#include "storage/cachedRun.h"
 #include "tav/tav.h"
 
 namespace tav
@@ -20,6 +23,29 @@ inline bool isReadOnly(const TAVHandle& handle)
 
 /// Whether a run of bytes fits into the direct block: TAV_RC_END_OF_STORAGE when it would reach the block's last byte.
 uint32_t checkRoom(const TAVHandle& handle, uint64_t position, uint64_t length);
+
+/// Whether the stream is in host order and unpadded: both flags in one look.
+[[gnu::always_inline]] inline bool isPlain(const TAVHandle& handle)
+{
+  static_assert(offsetof(TAVHandle, swapBytes) == offsetof(TAVHandle, alignMode) + 1);
+  uint16_t both = 0;
+  std::memcpy(&both, &handle.alignMode, sizeof both);
+  return both == 0;
+}
+
+/// Where `length` bytes at `position` can be written in place: in the block, or in bytes that the ring caches next to
+/// each other, of which the pages are marked then. Null where rawWrite has more to do, or to refuse.
+inline uint8_t* takePlace(TAVHandle& handle, uint64_t position, uint64_t length)
+{
+  if (isDirect(handle)) [[likely]]
+  {
+    const uint64_t size = handle.directDataSize;
+    const bool fits = handle.pDirectData != nullptr && length < size && position < size - length;
+    return fits ? handle.pDirectData + position : nullptr;
+  }
+  TAVCircularBuf* const ring = handle.pCircularBuf;
+  return ring != nullptr && ring->storageWritable != 0 ? takeCachedRun(*ring, position, length) : nullptr;
+}
 
 /// Writes a run of bytes at `position`, which moves past it on success. No bytes need a place all the same, but
 /// nothing is written: the circular buffer refuses a run of none.

@@ -1,12 +1,5 @@
 /// Reading the node at an offset.
-#include <algorithm>
-#include <array>
-
-#include "api/fetch.h"
-#include "api/rawWrite.h"
-#include "format/layout.h"
-#include "kor/traceFrame.h"
-#include "tav/probes.h"
+#include "api/nodeStep.h"
 
 using namespace tav;
 
@@ -38,8 +31,8 @@ uint32_t readBuffered(TAVHandle& handle, uint64_t offset, bool wide, TAVHeaderDa
   return rc;
 }
 
-/// The room is what the block holds beyond the absolute offset, also when it begins elsewhere in the stream, and a
-/// 32-bit header of type 2 counts as a data element: both have always been so over direct memory.
+/// The room is what the block holds beyond the absolute offset, also when it begins elsewhere in the stream: it has
+/// always been so over direct memory.
 uint32_t readDirect(const TAVHandle& handle, uint64_t offset, bool wide, TAVHeaderData& out)
 {
   out.header.hdrType = wide ? TAV_HDR_64 : TAV_HDR_32;
@@ -50,15 +43,9 @@ uint32_t readDirect(const TAVHandle& handle, uint64_t offset, bool wide, TAVHead
   {
     return TAV_RC_NO_MEMORY;
   }
-  const uint8_t* const node = handle.pDirectData + relative;
-  decodeHeader(node, wide, handle.swapBytes != 0, out.header);
-  const bool group = wide ? isGroup(out.header) : out.header.hdr32.type == TAV_TYPE_HEADER32;
-  if (!group)
-  {
-    out.pDataBuf = handle.pDirectData + relative + length;
-    out.dataBufSize = handle.directDataSize - relative - length;
-    out.dataBufOffset = 0;
-  }
+  Node node{offset, decodeFields(handle.pDirectData + relative, wide, handle.swapBytes != 0), wide};
+  handOut(node, {handle.pDirectData + relative + length, handle.directDataSize - relative - length},
+          hasDirectData(node), handle.swapBytes != 0, out);
   return TAV_RC_OK;
 }
 
@@ -67,12 +54,11 @@ bool isDataWhole(const TAVHeaderData& node)
   return node.pDataBuf == nullptr || isGroup(node.header) || sizeOf(node.header) <= node.dataBufSize;
 }
 
-} // namespace
-
-uint32_t tavReadNodeInt(uint64_t options, TAVHandle* handle, uint64_t offset, bool is64, TAVHeaderData* out)
+[[gnu::noinline]] uint32_t readTraced(uint64_t options, TAVHandle* handle, uint64_t offset, bool wide,
+                                      TAVHeaderData* out)
 {
   TraceFrame frame(probe::readNode);
-  frame.dump(0, options, handle, offset, is64, out);
+  frame.dump(0, options, handle, offset, wide, out);
   if (!frame.require(10, handle != nullptr, TAV_RC_BAD_PARAM) || !frame.require(20, out != nullptr, TAV_RC_BAD_PARAM))
   {
     return frame.code();
@@ -84,12 +70,24 @@ uint32_t tavReadNodeInt(uint64_t options, TAVHandle* handle, uint64_t offset, bo
   const bool read =
       isDirect(*handle)
           ? frame.require(50, handle->pDirectData != nullptr, TAV_RC_NO_MEMORY) &&
-                frame.step(60, readDirect(*handle, offset, is64, *out))
+                frame.step(60, readDirect(*handle, offset, wide, *out))
           : frame.require(30, handle->pCircularBuf != nullptr, TAV_RC_NO_CIRCULAR_BUF) &&
-                frame.step(40, readBuffered(*handle, offset, is64, *out));
+                frame.step(40, readBuffered(*handle, offset, wide, *out));
   if (read && frame.require(70, isDataWhole(*out), TAV_RC_DATA_TOO_LARGE))
   {
     frame.dump(100, trace::record(out));
   }
   return frame.code();
+}
+
+} // namespace
+
+uint32_t tavReadNodeInt(uint64_t options, TAVHandle* handle, uint64_t offset, bool is64, TAVHeaderData* out)
+{
+  Node node{offset, {}, is64};
+  if (!tracing() && handle != nullptr && out != nullptr && readSilently(*handle, node, *out)) [[likely]]
+  {
+    return TAV_RC_OK;
+  }
+  return readTraced(options, handle, offset, is64, out);
 }

@@ -3,10 +3,8 @@
 #include <memory>
 #include <new>
 
+#include "api/nodeStep.h"
 #include "api/walkGuard.h"
-#include "format/layout.h"
-#include "kor/traceFrame.h"
-#include "tav/probes.h"
 
 using namespace tav;
 
@@ -17,47 +15,66 @@ constexpr uint64_t kContainment = 0x1;
 
 /// Whether a child lies inside its parent. The parent's end leaves out the length of its header, so some sound streams
 /// are refused: an empty last child, or the last child of a 64-bit group of type 1.
-bool isContained(const TAVHeader& child, const TAVHeader& parent)
+bool isContained(const Node& child, const Node& parent)
 {
-  uint64_t parentEnd = parent.nodeOffset;
-  uint64_t childEnd = child.nodeOffset;
-  return addChecked(parentEnd, sizeOf(parent)) && addChecked(childEnd, sizeOf(child)) &&
-         child.nodeOffset < parentEnd && child.nodeOffset > parent.nodeOffset && childEnd <= parentEnd;
+  uint64_t parentEnd = parent.offset;
+  uint64_t childEnd = child.offset;
+  return addChecked(parentEnd, parent.fields.size) && addChecked(childEnd, child.fields.size) &&
+         child.offset < parentEnd && child.offset > parent.offset && childEnd <= parentEnd;
 }
 
-/// Visits every node below the group on the stack, depth first.
-uint32_t walk(uint64_t options, TAVHandle& handle, TAVHdrStack& stack)
+/// A walk under way: every node below the group on the stack, depth first.
+struct Walk
+{
+  Walk(uint64_t options, TAVHandle& reader, TAVHdrStack& groups)
+      : handle(reader), stack(groups), guard(groups.pEntries[0]), containment((options & kContainment) != 0)
+  {
+  }
+
+  TAVHandle& handle;
+  TAVHdrStack& stack;
+  WalkGuard guard;
+  bool containment;
+  bool descended = true; ///< the next node is the first below the top of the stack
+  TAVHeader last{};      ///< else the one after this
+};
+
+/// Whether the walk may take the node that it has come to.
+bool isAccepted(bool containment, WalkGuard& guard, const Node& child, const Node& parent)
+{
+  return (!containment || isContained(child, parent)) && guard.visit(child.offset);
+}
+
+/// Goes on through the exported steps, whose records tell of every node.
+uint32_t walkTraced(Walk& walk)
 {
   std::array<TAVHeaderData, 2> slots{};
-  size_t current = 0;
-  bool descended = true;
-  WalkGuard guard(stack.pEntries[0]);
-  for (;;)
+  slots[1].header = walk.last;
+  for (size_t current = 0;;)
   {
-    TAVHeader* const parent = stack.top();
-    TAVHeader* const previous = descended ? nullptr : &slots[current ^ 1U].header;
+    TAVHeader* const parent = walk.stack.top();
+    TAVHeader* const previous = walk.descended ? nullptr : &slots[current ^ 1U].header;
     TAVHeaderData& child = slots[current];
-    descended = false;
-    uint32_t rc = tavGetNextChild(0, &handle, parent, previous, &child);
+    walk.descended = false;
+    uint32_t rc = tavGetNextChild(0, &walk.handle, parent, previous, &child);
     if (rc == TAV_RC_NO_MORE_CHILDREN)
     {
-      if (stack.count < 2)
+      if (walk.stack.count < 2)
       {
         return TAV_RC_OK;
       }
-      rc = stack.pop(&slots[current ^ 1U].header);
+      rc = walk.stack.pop(&slots[current ^ 1U].header);
     }
     else if (rc == TAV_RC_OK)
     {
-      const bool contained = (options & kContainment) == 0 || isContained(child.header, *parent);
-      if (!contained || !guard.visit(child.header.nodeOffset))
+      if (!isAccepted(walk.containment, walk.guard, nodeOf(child.header), nodeOf(*parent)))
       {
         return TAV_RC_OUTSIDE_PARENT;
       }
       if (isGroup(child.header))
       {
-        rc = stack.push(&child.header);
-        descended = true;
+        rc = walk.stack.push(&child.header);
+        walk.descended = true;
       }
       current ^= 1U;
     }
@@ -66,6 +83,85 @@ uint32_t walk(uint64_t options, TAVHandle& handle, TAVHdrStack& stack)
       return rc;
     }
   }
+}
+
+/// The children of the group on top of the stack from `node` on, up to a group among them or the end of the level.
+/// Everything that a step needs is kept in registers.
+template<bool Wide>
+uint32_t walkLevel(Walk& walk, const Block& memory, const Node& parent, const Level& children, Node& node)
+{
+  const Block block = memory;
+  const Level level = children;
+  const bool containment = walk.containment;
+  WalkGuard guard = walk.guard;
+  Node child = node;
+  uint32_t rc = TAV_RC_OK;
+  for (bool first = walk.descended;; first = false)
+  {
+    rc = stepInBlock<Wide>(block, level, first, child);
+    if (rc != TAV_RC_OK) [[unlikely]]
+    {
+      break;
+    }
+    if (!isAccepted(containment, guard, child, parent)) [[unlikely]]
+    {
+      rc = TAV_RC_OUTSIDE_PARENT;
+      break;
+    }
+    if (child.group()) [[unlikely]]
+    {
+      break;
+    }
+  }
+  walk.guard = guard;
+  node = child;
+  return rc;
+}
+
+/// The same walk over direct memory, until its end, an open group's sibling, or until tracing is switched on.
+uint32_t walkBlock(Walk& walk)
+{
+  Block block{};
+  Node node{};
+  while (blockOf(walk.handle, block) && !tracing())
+  {
+    const Node parent = nodeOf(*topEntry<SilentFrame>(walk.stack));
+    const Level level = levelBelow(parent);
+    uint32_t rc = level.wide ? walkLevel<true>(walk, block, parent, level, node)
+                             : walkLevel<false>(walk, block, parent, level, node);
+    walk.descended = rc == TAV_RC_OK;
+    if (rc == TAV_RC_OK)
+    {
+      TAVHeader group{};
+      toHeader(node, group);
+      rc = pushEntry<SilentFrame>(walk.stack, &group);
+    }
+    else if (rc == TAV_RC_NO_MORE_CHILDREN)
+    {
+      if (walk.stack.count < 2)
+      {
+        return TAV_RC_OK;
+      }
+      rc = popEntry<SilentFrame>(walk.stack, &walk.last);
+      node = nodeOf(walk.last);
+    }
+    if (rc == kUnusual)
+    {
+      toHeader(node, walk.last);
+      break;
+    }
+    if (rc != TAV_RC_OK)
+    {
+      return rc;
+    }
+  }
+  return walkTraced(walk);
+}
+
+uint32_t walkBelow(uint64_t options, TAVHandle& handle, TAVHdrStack& stack)
+{
+  Walk walk(options, handle, stack);
+  return isDirect(handle) && isReadOnly(handle) ? walkBlock(walk) : walkTraced(walk);
 }
 
 } // namespace
@@ -92,7 +188,7 @@ uint32_t tavValidateSubtreeInt(uint64_t options, TAVHandle* handle, TAVHeader* h
   }
   const std::unique_ptr<TAVHdrStack> stack(new (std::nothrow) TAVHdrStack);
   static_cast<void>(frame.require(30, stack != nullptr, TAV_RC_NO_HDR_STACK) && frame.step(40, stack->push(header)) &&
-                    frame.step(50, walk(options, *handle, *stack)));
+                    frame.step(50, walkBelow(options, *handle, *stack)));
   const uint32_t result = frame.code();
   frame.dump(100, result);
   return frame.code();

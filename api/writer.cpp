@@ -1,7 +1,11 @@
 /// Appending nodes: elements and groups, and the step that encodes one node.
 #include <array>
+#include <cstring>
 
+#include "api/nodeStep.h"
 #include "api/rawWrite.h"
+#include "format/copySmall.h"
+#include "format/hdrStack.h"
 #include "format/layout.h"
 #include "kor/traceFrame.h"
 #include "tav/probes.h"
@@ -80,6 +84,151 @@ uint32_t pushGroup(TAVHandle& handle, const TAVHeader& group)
   return handle.pHdrStack != nullptr ? handle.pHdrStack->push(&group) : TAV_RC_NO_HDR_STACK;
 }
 
+/// The bytes of a payload with its padding.
+uint64_t paddedSize(const TAVHandle& handle, uint64_t size)
+{
+  if (handle.alignMode == 1)
+  {
+    roundUp8Checked(size);
+  }
+  return size;
+}
+
+/// Whether a payload stands apart from the place that its node is encoded to.
+bool isApart(const uint8_t* payload, uint64_t size, const uint8_t* to, uint64_t length)
+{
+  const auto from = reinterpret_cast<uintptr_t>(payload);
+  const auto start = reinterpret_cast<uintptr_t>(to);
+  return from + size <= start || start + length <= from;
+}
+
+/// Encodes a payload at its place, in the other byte order if `swap`.
+void encodePayload(uint16_t type, bool swap, const uint8_t* payload, uint64_t size, uint8_t* to)
+{
+  uint64_t prefix = 0;
+  if (swap) [[unlikely]]
+  {
+    const SwapRule rule = typeInfo(type).swapRule;
+    prefix = swappedPrefix(rule, size);
+    swapPayload(rule, payload, to, prefix);
+  }
+  copySmall(to + prefix, payload + prefix, size - prefix);
+}
+
+/// Whether a child of this form may stand under the open group. A stream's first node is not a usual child.
+template<bool Wide>
+[[gnu::always_inline]] inline bool isUsualChild(const TAVHandle& handle)
+{
+  const TAVHdrStack* const stack = handle.pHdrStack;
+  if (stack == nullptr || stack->count == 0 || isReadOnly(handle)) [[unlikely]]
+  {
+    return false;
+  }
+  const TAVHeader& parent = stack->pEntries[stack->count - 1];
+  return Wide ? is64(parent) && parent.hdr64.type != TAV_TYPE_HEADER32 : typeOf(parent) == TAV_TYPE_HEADER32;
+}
+
+constexpr uint64_t kUsualSize = ~uint64_t{0} / 2; // far from where sums would pass 64 bits
+
+/// Whether a data element comes with its payload, of a size that can be.
+[[gnu::always_inline]] inline bool hasUsualPayload(const TAVHeaderData& node, const HeaderFields& fields)
+{
+  const bool complete = node.dataBufSize == 0 || node.dataBufSize >= fields.size;
+  return node.pDataBuf != nullptr && complete && fields.size <= kUsualSize;
+}
+
+/// Opens a group in place.
+template<bool Wide>
+uint32_t openSilently(TAVHandle& handle, TAVHeader& header, HeaderFields fields)
+{
+  const uint64_t position = handle.streamBytes;
+  constexpr uint64_t length = Wide ? kHeaderSize64 : kHeaderSize32;
+  uint8_t* const to = takePlace(handle, position, length);
+  if (to == nullptr) [[unlikely]]
+  {
+    return kUnusual;
+  }
+  if (Wide && handle.alignMode == 1)
+  {
+    fields.info |= TAV_INFO_ALIGNED8;
+    header.hdr64.info = fields.info;
+  }
+  encodeFields(fields, Wide, handle.swapBytes != 0, to);
+  header.nodeOffset = position;
+  handle.streamBytes = position + length;
+  return pushEntry<SilentFrame>(*handle.pHdrStack, &header);
+}
+
+/// Appends a data element in place, whether or not it is in the other byte order, padded, or followed by a pair.
+template<bool Wide>
+[[gnu::noinline]] uint32_t addInPlace(TAVHandle& handle, TAVHeaderData& node, HeaderFields fields)
+{
+  constexpr uint64_t headerSize = Wide ? kHeaderSize64 : kHeaderSize32;
+  const uint64_t size = fields.size;
+  const uint64_t padded = paddedSize(handle, size);
+  const bool pair = (fields.info & TAV_INFO_EYE_SIZE) != 0;
+  const uint64_t length = headerSize + padded + (pair ? kEyeSizeLength : 0);
+  const uint64_t position = handle.streamBytes;
+  const bool swap = handle.swapBytes != 0;
+  uint8_t* const to = takePlace(handle, position, length);
+  if (to == nullptr || (swap && !isApart(node.pDataBuf, size, to, length))) [[unlikely]]
+  {
+    return kUnusual;
+  }
+  if (Wide && handle.alignMode == 1)
+  {
+    fields.info |= TAV_INFO_ALIGNED8;
+    node.header.hdr64.info = fields.info;
+  }
+  encodeFields(fields, Wide, swap, to);
+  encodePayload(fields.type, swap, node.pDataBuf, size, to + headerSize);
+  if (pair)
+  {
+    const EyeSizeBytes bytes = encodeEyeSize(dataDistance(size), swap);
+    std::memcpy(to + headerSize + padded, bytes.data(), bytes.size());
+  }
+  node.header.nodeOffset = position;
+  handle.streamBytes = position + length;
+  return TAV_RC_OK;
+}
+
+/// Appends a node in place, other than by addPlain; else `kUnusual`, with nothing done.
+template<bool Wide>
+uint32_t addSilently(TAVHandle& handle, TAVHeaderData& node)
+{
+  if (!isUsualChild<Wide>(handle))
+  {
+    return kUnusual;
+  }
+  const HeaderFields fields = fieldsOf<Wide>(node.header);
+  if (isGroupType(fields.type))
+  {
+    return openSilently<Wide>(handle, node.header, fields);
+  }
+  return hasUsualPayload(node, fields) ? addInPlace<Wide>(handle, node, fields) : kUnusual;
+}
+
+/// The same for a node of either form.
+uint32_t addSilently(TAVHandle& handle, TAVHeaderData& node)
+{
+  switch (node.header.hdrType)
+  {
+  case TAV_HDR_64:
+    return addSilently<true>(handle, node);
+  case TAV_HDR_32:
+    return addSilently<false>(handle, node);
+  default:
+    return kUnusual;
+  }
+}
+
+/// Copies what copySmall would call for: as a function of its own that ends the caller, which then saves no registers.
+[[gnu::noinline]] uint32_t copyLong(uint8_t* to, const uint8_t* from, uint64_t length)
+{
+  std::memmove(to, from, length);
+  return TAV_RC_OK;
+}
+
 } // namespace
 
 uint32_t tavWriteNodeInt(uint64_t options, TAVHandle* handle, TAVHeader* header, uint64_t* position, uint8_t* payload,
@@ -107,7 +256,10 @@ uint32_t tavWriteNodeInt(uint64_t options, TAVHandle* handle, TAVHeader* header,
   return frame.code();
 }
 
-uint32_t tavAddElement(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
+namespace
+{
+
+[[gnu::noinline]] uint32_t addTraced(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
 {
   TraceFrame frame(probe::addElement);
   frame.dump(0, options, handle, "Element to be appended", trace::record(headerData));
@@ -134,4 +286,48 @@ uint32_t tavAddElement(uint64_t options, TAVHandle* handle, TAVHeaderData* heade
     frame.dump(100, header.nodeOffset, position);
   }
   return frame.code();
+}
+
+/// Everything but the plain element.
+[[gnu::noinline]] uint32_t addOther(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
+{
+  const bool silent = !tracing() && options == 0 && handle != nullptr && headerData != nullptr;
+  const uint32_t rc = silent ? addSilently(*handle, *headerData) : kUnusual;
+  return rc != kUnusual ? rc : addTraced(options, handle, headerData);
+}
+
+} // namespace
+
+uint32_t tavAddElement(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
+{
+  // The data element with a 64-bit header in host order is what streams are made of. Every other way out ends in one
+  // call.
+  if (tracing() || options != 0 || handle == nullptr || headerData == nullptr || !is64(headerData->header) ||
+      !isPlain(*handle) || !isUsualChild<true>(*handle)) [[unlikely]]
+  {
+    return addOther(options, handle, headerData);
+  }
+  const HeaderFields fields = fieldsOf<true>(headerData->header);
+  const uint64_t size = fields.size;
+  const uint8_t* const payload = headerData->pDataBuf;
+  if (isGroupType(fields.type) || (fields.info & TAV_INFO_EYE_SIZE) != 0 || payload == nullptr ||
+      headerData->dataBufSize < size || size > kUsualSize) [[unlikely]]
+  {
+    return addOther(options, handle, headerData);
+  }
+  const uint64_t position = handle->streamBytes;
+  uint8_t* const to = takePlace(*handle, position, kHeaderSize64 + size);
+  if (to == nullptr) [[unlikely]]
+  {
+    return addOther(options, handle, headerData);
+  }
+  headerData->header.nodeOffset = position;
+  handle->streamBytes = position + kHeaderSize64 + size;
+  encodeFields(fields, true, false, to);
+  if (size > kLongestSmall)
+  {
+    return copyLong(to + kHeaderSize64, payload, size);
+  }
+  copySmall(to + kHeaderSize64, payload, size);
+  return TAV_RC_OK;
 }

@@ -1,8 +1,6 @@
 #include <cstring>
 
-#include "kor/traceFrame.h"
-#include "tav/probes.h"
-#include "tav/tav.h"
+#include "format/hdrStack.h"
 
 namespace tav
 {
@@ -12,11 +10,6 @@ namespace
 constexpr uint32_t kFirstCapacity = 1000;
 constexpr uint32_t kIncrement = 200;
 constexpr const char* kUnit = "tavHdrStack";
-
-void* blockOf(TAVHeader* pEntries)
-{
-  return pEntries;
-}
 
 } // namespace
 } // namespace tav
@@ -41,7 +34,7 @@ TAVHdrStack::~TAVHdrStack()
   const TraceFrame frame(probe::hdrStackEnd);
   if (pEntries != nullptr)
   {
-    void* block = blockOf(pEntries);
+    void* block = pEntries;
     _korMemFree(&block, 0, 0, kUnit, 93);
     pEntries = nullptr;
   }
@@ -49,64 +42,45 @@ TAVHdrStack::~TAVHdrStack()
   count = 0;
 }
 
-/// Raises the capacity. The entries stay where they are: a reserved block has room for every capacity that the
-/// allocator grants, and the block asked for here only decides whether it is granted. It is released with the entries.
-uint32_t TAVHdrStack::grow()
+/// The entries stay where they are: a reserved block has room for every capacity that the allocator grants, and the
+/// block asked for here only decides whether it is granted. It is released with the entries.
+uint32_t tav::growStack(TAVHdrStack& stack)
 {
   TraceFrame frame(probe::hdrStackGrow);
-  frame.dump(0, capacity, kIncrement);
-  void* block = blockOf(pEntries);
-  const uint64_t bytes = (uint64_t{capacity} + kIncrement) * sizeof(TAVHeader);
+  frame.dump(0, stack.capacity, kIncrement);
+  void* block = stack.pEntries;
+  const uint64_t bytes = (uint64_t{stack.capacity} + kIncrement) * sizeof(TAVHeader);
   if (frame.step(10, _korMemAlloc(&block, 0, bytes, KOR_MEM_RESERVED, kUnit, 117)))
   {
-    if (pEntries == nullptr)
+    if (stack.pEntries == nullptr)
     {
-      pEntries = static_cast<TAVHeader*>(block);
+      stack.pEntries = static_cast<TAVHeader*>(block);
     }
     else
     {
-      std::memcpy(block, pEntries, capacity * sizeof(TAVHeader));
+      std::memcpy(block, stack.pEntries, stack.capacity * sizeof(TAVHeader));
     }
-    capacity += kIncrement;
+    stack.capacity += kIncrement;
   }
   return frame.code();
 }
 
 uint32_t TAVHdrStack::push(const TAVHeader* header)
 {
-  TraceFrame frame(probe::hdrStackPush);
-  frame.dump(0, trace::record(header), count, capacity);
-  if (frame.require(10, header != nullptr, TAV_RC_BAD_PARAM) && (count < capacity || frame.step(20, grow())))
-  {
-    pEntries[count++] = *header;
-  }
-  return frame.code();
+  return pushEntry<TraceFrame>(*this, header);
 }
 
 TAVHeader* TAVHdrStack::top()
 {
-  const TraceFrame frame(probe::hdrStackTop);
-  TAVHeader* const entry = count != 0 ? pEntries + (count - 1) : nullptr;
-  frame.dump(0, count, trace::record(entry));
-  return entry;
+  return topEntry<TraceFrame>(*this);
 }
 
 uint32_t TAVHdrStack::pop()
 {
-  TraceFrame frame(probe::hdrStackPop);
-  if (frame.require(10, count != 0, TAV_RC_NO_MEMORY))
-  {
-    --count;
-  }
-  return frame.code();
+  return popEntry<TraceFrame>(*this);
 }
 
 uint32_t TAVHdrStack::pop(TAVHeader* out)
 {
-  TraceFrame frame(probe::hdrStackPopCopy);
-  if (frame.require(10, out != nullptr, TAV_RC_BAD_PARAM) && frame.require(20, count != 0, TAV_RC_NO_MEMORY))
-  {
-    *out = pEntries[--count];
-  }
-  return frame.code();
+  return popEntry<TraceFrame>(*this, out);
 }

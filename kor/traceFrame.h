@@ -1,11 +1,11 @@
 /// The trace frame of a function: entry, dumps, errors and exit in one scope object.
 #pragma once
 
-#include <atomic>
 #include <cstdint>
 #include <cstring>
 #include <tuple>
 
+#include "kor/shared.h"
 #include "tav/kor.h"
 
 namespace tav
@@ -14,12 +14,12 @@ namespace tav
 /// Whether a record would go anywhere. Asked before every record: tracing may be switched in mid-call.
 inline bool tracing()
 {
-  const KORTraceCB* const block = std::atomic_ref<KORTraceCB*>(g_pWTCB).load(std::memory_order_acquire);
+  const KORTraceCB* const block = kor::loadAcquire(g_pWTCB);
   if (block == nullptr) [[likely]]
   {
     return false;
   }
-  return std::atomic_ref<uint32_t>(const_cast<uint32_t&>(block->enable)).load(std::memory_order_relaxed) != 0;
+  return kor::loadRelaxed(block->enable) != 0;
 }
 
 /// What a dump shows of its arguments.
@@ -58,6 +58,19 @@ KORTraceItem record(const Record* pRecord)
   return {pRecord, pRecord != nullptr ? sizeof(Record) : 0};
 }
 
+/// What a dump keeps of its argument until the record is written: a text stays where it is, anything else is copied.
+template<class Value>
+Value kept(const Value& value)
+{
+  return value;
+}
+
+template<size_t Size>
+KORTraceItem kept(const char (&text)[Size])
+{
+  return item(text);
+}
+
 inline constexpr uint32_t kEntryLevel = 1000000;
 
 inline uint32_t threadId()
@@ -81,14 +94,15 @@ inline uint32_t threadId()
                   static_cast<const void*>(&code));
 }
 
-template<class... Items>
-[[gnu::cold, gnu::noinline]] void variables(uint32_t probe, uint32_t point, const Items&... items)
+/// Takes its values as copies: a variable whose address went to a record would have to live in memory in every call.
+template<class... Values>
+[[gnu::cold, gnu::noinline]] void variables(uint32_t probe, uint32_t point, Values... values)
 {
   const auto triple = [](const KORTraceItem& one) { return std::make_tuple(uint32_t{0}, one.length, one.pData); };
   const auto emit = [&](auto... flat) {
-    _wtraceVar(threadId(), probe, point, KOR_TRACE_VAR, static_cast<uint32_t>(sizeof...(Items)), flat...);
+    _wtraceVar(threadId(), probe, point, KOR_TRACE_VAR, static_cast<uint32_t>(sizeof...(Values)), flat...);
   };
-  std::apply(emit, std::tuple_cat(triple(items)...));
+  std::apply(emit, std::tuple_cat(triple(item(values))...));
 }
 
 /// Dumps items under a probe, for the one record that carries another probe than its function.
@@ -97,7 +111,7 @@ void dump(uint32_t probe, uint32_t point, const Values&... values)
 {
   if (tracing()) [[unlikely]]
   {
-    variables(probe, point, item(values)...);
+    variables(probe, point, kept(values)...);
   }
 }
 
@@ -178,6 +192,43 @@ public:
 
 private:
   uint32_t probe_;
+  uint32_t code_ = TAV_RC_OK;
+};
+
+/// A frame without records, for a call that began while tracing was off and that calls nothing outside the library:
+/// nobody can tell it from one that asks before every record.
+class SilentFrame
+{
+public:
+  explicit SilentFrame(uint32_t /*probe*/) {}
+
+  template<class... Values>
+  void dump(uint32_t /*point*/, const Values&... /*values*/) const
+  {
+  }
+
+  [[nodiscard]] bool require(uint32_t point, bool holds, uint32_t code)
+  {
+    return holds || fail(point, code);
+  }
+
+  [[nodiscard]] bool step(uint32_t point, uint32_t code)
+  {
+    return code == TAV_RC_OK || fail(point, code);
+  }
+
+  bool fail(uint32_t /*point*/, uint32_t code)
+  {
+    code_ = code;
+    return false;
+  }
+
+  [[nodiscard]] uint32_t code() const
+  {
+    return code_;
+  }
+
+private:
   uint32_t code_ = TAV_RC_OK;
 };
 

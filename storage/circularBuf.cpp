@@ -5,6 +5,7 @@
 
 #include "format/layout.h"
 #include "kor/traceFrame.h"
+#include "storage/cachedRun.h"
 #include "tav/probes.h"
 #include "tav/tav.h"
 
@@ -140,7 +141,7 @@ uint32_t TAVCircularBuf::getChunk(uint64_t offset, uint64_t length, TAVCBUserAre
   }
   else
   {
-    area->chunkLength = std::min(length, index > tail ? ringSize - index : tail - index + 1);
+    area->chunkLength = std::min(length, contiguousFrom(*this, index));
     area->chunkOffset = offset;
   }
   deliver(*area, first, copy);
@@ -192,7 +193,7 @@ uint32_t TAVCircularBuf::write(uint64_t offset, const void* data, uint64_t size,
   const bool large = size >= ringSize - pageSize;
   uint64_t index = 0;
   bool cached = indexOf(offset, index);
-  const uint64_t contiguous = !cached ? 0 : (index > tail ? ringSize - index : tail - index + 1);
+  const uint64_t contiguous = cached ? contiguousFrom(*this, index) : 0;
   if (!direct && !large && size > contiguous)
   {
     static_cast<void>(fill(offset, unitsFor(size, pageSize), false, Purpose::write));
@@ -311,14 +312,9 @@ uint32_t TAVCircularBuf::markPages(uint64_t offset, uint64_t length)
   {
     return frame.code();
   }
-  uint64_t page = pageOf(index);
+  const uint64_t page = pageOf(index);
   const uint64_t last = indexOf(end, index) ? pageOf(index) : pageOf(tail);
-  pPageFlags[2 * page] = 1;
-  while (page != last && last < pageCount)
-  {
-    page = page + 1 < pageCount ? page + 1 : 0;
-    pPageFlags[2 * page] = 1;
-  }
+  markPending(*this, page, last);
   return frame.code();
 }
 
@@ -331,11 +327,7 @@ bool TAVCircularBuf::isCached(uint64_t offset) const
 uint64_t TAVCircularBuf::cachedCount() const
 {
   const TraceFrame frame(probe::cbCachedCount);
-  if (empty != 0)
-  {
-    return 0;
-  }
-  return head <= tail ? tail - head + 1 : tail + (ringSize - head) + 1;
+  return cachedBytes(*this);
 }
 
 bool TAVCircularBuf::isEmpty() const
@@ -352,9 +344,7 @@ bool TAVCircularBuf::indexOf(uint64_t offset, uint64_t& index) const
   {
     return false;
   }
-  const uint64_t distance = offset - headOffset;
-  index = distance < ringSize - head ? head + distance : distance - (ringSize - head);
-  return true;
+  return cachedIndex(*this, offset, index);
 }
 
 /// The mapping behind the chunkOffset of a backward chunk. It is given a stream offset where an index is meant, and
@@ -386,5 +376,5 @@ uint32_t TAVCircularBuf::offsetOf(uint64_t value, uint64_t& offset) const
 uint64_t TAVCircularBuf::pageOf(uint64_t index) const
 {
   const TraceFrame frame(probe::cbPageOfIndex);
-  return index / pageSize;
+  return pageOfIndex(*this, index);
 }

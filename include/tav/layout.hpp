@@ -31,6 +31,12 @@ constexpr bool addChecked(uint64_t& sum, uint64_t amount)
   return true;
 }
 
+/// Adds into `sum`; false when the result passes 64 bits.
+inline bool addFits(uint64_t a, uint64_t b, uint64_t& sum)
+{
+  return !__builtin_add_overflow(a, b, &sum);
+}
+
 /// The sum, or the largest offset when it would pass 64 bits.
 constexpr uint64_t addSaturated(uint64_t a, uint64_t b)
 {
@@ -150,26 +156,64 @@ inline void swapFields(TAVHeader64& header)
   header.elm = kor::byteswap16(header.elm);
 }
 
-/// Writes the header's stream form to `out` and returns its length.
-inline uint64_t encodeHeader(const TAVHeader& header, bool swap, uint8_t* out)
+/// What a header says, whichever form it has; a 32-bit header has no flag bits.
+struct HeaderFields
 {
-  if (header.hdrType == TAV_HDR_32)
+  uint64_t size;
+  uint32_t info;
+  uint16_t type;
+  uint16_t elm;
+};
+
+/// Reads the fields of a header's stream form.
+inline HeaderFields decodeFields(const uint8_t* bytes, bool wide, bool swap)
+{
+  if (wide)
   {
-    TAVHeader32 copy = header.hdr32;
+    TAVHeader64 header;
+    std::memcpy(&header, bytes, sizeof header);
     if (swap)
     {
-      swapFields(copy);
+      swapFields(header);
     }
-    std::memcpy(out, &copy, sizeof copy);
-    return sizeof copy;
+    return {header.size, header.info, header.type, header.elm};
   }
-  TAVHeader64 copy = header.hdr64;
+  TAVHeader32 header;
+  std::memcpy(&header, bytes, sizeof header);
   if (swap)
   {
-    swapFields(copy);
+    swapFields(header);
   }
-  std::memcpy(out, &copy, sizeof copy);
-  return sizeof copy;
+  return {header.size, 0, header.type, header.elm};
+}
+
+/// Sets a header's form and its fields, nothing else.
+inline void setHeader(const HeaderFields& fields, bool wide, TAVHeader& header)
+{
+  if (wide)
+  {
+    header.hdrType = TAV_HDR_64;
+    header.hdr64 = {fields.size, fields.info, fields.type, fields.elm};
+    return;
+  }
+  header.hdrType = TAV_HDR_32;
+  header.hdr32 = {static_cast<uint32_t>(fields.size), fields.type, fields.elm};
+}
+
+/// Copies words one by one. Who reads a header's fields straight afterwards would wait for a wider store.
+template<size_t Words>
+inline void copyWords(void* to, const uint8_t* from)
+{
+  for (size_t word = 0; word < Words; ++word)
+  {
+    uint64_t value = 0;
+    std::memcpy(&value, from + word * sizeof value, sizeof value);
+#if defined(__GNUC__)
+    __asm__(""
+            : "+r"(value)); // keeps the compiler from joining the words
+#endif
+    std::memcpy(static_cast<uint8_t*>(to) + word * sizeof value, &value, sizeof value);
+  }
 }
 
 /// Reads the header's stream form: sets the form and its fields, nothing else.
@@ -178,7 +222,7 @@ inline void decodeHeader(const uint8_t* bytes, bool wide, bool swap, TAVHeader& 
   if (wide)
   {
     header.hdrType = TAV_HDR_64;
-    std::memcpy(&header.hdr64, bytes, sizeof header.hdr64);
+    copyWords<2>(&header.hdr64, bytes);
     if (swap)
     {
       swapFields(header.hdr64);
@@ -186,11 +230,58 @@ inline void decodeHeader(const uint8_t* bytes, bool wide, bool swap, TAVHeader& 
     return;
   }
   header.hdrType = TAV_HDR_32;
-  std::memcpy(&header.hdr32, bytes, sizeof header.hdr32);
+  copyWords<1>(&header.hdr32, bytes);
   if (swap)
   {
     swapFields(header.hdr32);
   }
+}
+
+/// The fields of a header of a form that is known. They are loaded one by one, which `volatile` keeps the compiler from
+/// joining: who fills a header stores them one by one, and a wide load straight afterwards would wait until those
+/// stores have left the store buffer.
+template<bool Wide>
+inline HeaderFields fieldsOf(const TAVHeader& header)
+{
+  if constexpr (Wide)
+  {
+    const volatile TAVHeader64& from = header.hdr64;
+    return {from.size, from.info, from.type, from.elm};
+  }
+  else
+  {
+    const volatile TAVHeader32& from = header.hdr32;
+    return {from.size, 0, from.type, from.elm};
+  }
+}
+
+/// Writes a header's stream form to `out` and returns its length.
+inline uint64_t encodeFields(const HeaderFields& fields, bool wide, bool swap, uint8_t* out)
+{
+  if (wide)
+  {
+    TAVHeader64 header{fields.size, fields.info, fields.type, fields.elm};
+    if (swap)
+    {
+      swapFields(header);
+    }
+    std::memcpy(out, &header, sizeof header);
+    return sizeof header;
+  }
+  TAVHeader32 header{static_cast<uint32_t>(fields.size), fields.type, fields.elm};
+  if (swap)
+  {
+    swapFields(header);
+  }
+  std::memcpy(out, &header, sizeof header);
+  return sizeof header;
+}
+
+/// Writes the header's stream form to `out` and returns its length.
+inline uint64_t encodeHeader(const TAVHeader& header, bool swap, uint8_t* out)
+{
+  return header.hdrType == TAV_HDR_32 ? encodeFields(fieldsOf<false>(header), false, swap, out)
+                                      : encodeFields(fieldsOf<true>(header), true, swap, out);
 }
 
 /// @}

@@ -378,9 +378,6 @@ public:
   TAVHeader* pEntries; ///< entry 0 is the outermost group
   uint32_t capacity;
   uint32_t count;
-
-private:
-  uint32_t grow();
 };
 
 /// How to open a handle.

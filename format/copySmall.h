@@ -1,0 +1,58 @@
+/// Copying of payloads, which are mostly as long as one value.
+#pragma once
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+
+namespace tav
+{
+
+/// The leading and the last bytes of a run of `Size` to 2 * `Size` bytes, which overlap in the middle.
+template<size_t Size>
+void copyEnds(uint8_t* to, const uint8_t* from, uint64_t length)
+{
+  std::array<uint8_t, Size> first;
+  std::array<uint8_t, Size> last;
+  std::memcpy(first.data(), from, Size);
+  std::memcpy(last.data(), from + length - Size, Size);
+  std::memcpy(to, first.data(), Size);
+  std::memcpy(to + length - Size, last.data(), Size);
+}
+
+/// The longest run that copySmall copies itself.
+inline constexpr uint64_t kLongestSmall = 32;
+
+/// Copies like memmove: everything is loaded before anything is stored. Few branches, as lengths alternate.
+inline void copySmall(uint8_t* to, const void* bytes, uint64_t length)
+{
+  const auto* const from = static_cast<const uint8_t*>(bytes);
+  if (length > kLongestSmall)
+  {
+    std::memmove(to, from, length);
+  }
+  else if (length > 16)
+  {
+    copyEnds<16>(to, from, length);
+  }
+  else if (length >= 8)
+  {
+    copyEnds<8>(to, from, length);
+  }
+  else if (length >= 4)
+  {
+    copyEnds<4>(to, from, length);
+  }
+  else if (length != 0)
+  {
+    const uint8_t first = from[0];
+    const uint8_t middle = from[length / 2];
+    const uint8_t last = from[length - 1];
+    to[0] = first;
+    to[length / 2] = middle;
+    to[length - 1] = last;
+  }
+}
+
+} // namespace tav
