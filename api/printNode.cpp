@@ -1,6 +1,4 @@
 /// Printing one node: opening, body, closing, as text or as XML.
-#include <cinttypes>
-
 #include "api/printer.h"
 #include "dictionary/dictionary.h"
 #include "format/layout.h"
@@ -9,7 +7,9 @@
 
 using namespace tav;
 using tav::print::has;
-using tav::print::line;
+using tav::print::lineOf;
+using tav::print::piece;
+using tav::print::ReadyTag;
 
 namespace
 {
@@ -27,42 +27,21 @@ bool hasValue(const TAVHeaderData& node)
   return !isGroup(node.header) && sizeOf(node.header) != 0;
 }
 
-void dumpHeaderText(TAVPrintCtx& ctx, const TAVHeader& header)
-{
-  line(ctx, "   TAVHeader\n");
-  line(ctx, "   {\n");
-  line(ctx, is64(header) ? "      TAVHeader64\n" : "      TAVHeader32\n");
-  line(ctx, "      {\n");
-  line(ctx, "         size = %" PRIu64 "\n", sizeOf(header));
-  if (is64(header))
-  {
-    line(ctx, "         info = %X\n", header.hdr64.info);
-  }
-  line(ctx, "         type = %hu ( %s )\n", typeOf(header), typePrintName(typeOf(header)));
-  line(ctx, "         elm  = %hu ( %s )\n", elmOf(header), elementEnumName(elmOf(header)));
-  line(ctx, "      }\n");
-  line(ctx, "      hdrType    = %hu ( %s )\n", header.hdrType, typePrintName(header.hdrType));
-  line(ctx, "      nodeOffset = %" PRIu64 "\n", header.nodeOffset);
-  line(ctx, "   }\n");
-}
-
 uint32_t dataText(TAVPrintCtx& ctx, TAVHeaderData& node)
 {
   if (has(ctx, TAV_PRINT_DESCRIPTORS))
   {
-    line(ctx, "   pDataBuf      = %016" PRIX64 "\n", static_cast<uint64_t>(reinterpret_cast<uintptr_t>(node.pDataBuf)));
-    line(ctx, "   dataBufSize   = %" PRIu64 "\n", node.dataBufSize);
-    line(ctx, "   dataBufOffset = %" PRIu64 "\n", node.dataBufOffset);
+    tav::print::descriptor(ctx, node);
   }
   if (!hasValue(node))
   {
     return TAV_RC_OK;
   }
-  line(ctx, "   ");
+  lineOf(ctx, {"   "});
   const uint32_t rc = tavPrintValue(&ctx, &node);
   if (rc == TAV_RC_OK)
   {
-    tavPrintf(&ctx, "\n");
+    piece(ctx, "\n");
   }
   return rc;
 }
@@ -75,7 +54,7 @@ uint32_t bodyText(TAVPrintCtx& ctx, TAVHeaderData& node)
   }
   if (has(ctx, TAV_PRINT_HEADERS))
   {
-    dumpHeaderText(ctx, node.header);
+    tav::print::header(ctx, node.header);
   }
   return has(ctx, TAV_PRINT_DATA) ? dataText(ctx, node) : TAV_RC_OK;
 }
@@ -84,53 +63,32 @@ uint32_t nodeText(TAVPrintCtx& ctx, TAVHeaderData& node, const Parts& parts)
 {
   if (parts.open)
   {
-    line(ctx, "%s\n", elementEnumName(elmOf(node.header)));
-    line(ctx, "{\n");
+    lineOf(ctx, {elementEnumName(elmOf(node.header)), "\n"});
+    lineOf(ctx, {"{\n"});
   }
   const uint32_t rc = parts.body ? bodyText(ctx, node) : TAV_RC_OK;
   if (rc == TAV_RC_OK && parts.close)
   {
-    line(ctx, "}\n");
+    lineOf(ctx, {"}\n"});
   }
   return rc;
-}
-
-void dumpHeaderXml(TAVPrintCtx& ctx, const TAVHeader& header)
-{
-  const char* const form = is64(header) ? "64" : "32";
-  line(ctx, "   <tavHeader>\n");
-  line(ctx, "      <tavHeader%s>\n", form);
-  line(ctx, "         <size>%" PRIu64 "</size>\n", sizeOf(header));
-  if (is64(header))
-  {
-    line(ctx, "         <info>%X</info>\n", header.hdr64.info);
-  }
-  line(ctx, "         <type>%s</type>\n", typePrintName(typeOf(header)));
-  line(ctx, "         <elm>%s</elm>\n", elementEnumName(elmOf(header)));
-  line(ctx, "      </tavHeader%s>\n", form);
-  line(ctx, "      <hdrType>%s</hdrType>\n", typePrintName(header.hdrType));
-  line(ctx, "      <nodeOffset>%" PRIu64 "</nodeOffset>\n", header.nodeOffset);
-  line(ctx, "   </tavHeader>\n");
 }
 
 uint32_t dataXml(TAVPrintCtx& ctx, TAVHeaderData& node)
 {
   if (has(ctx, TAV_PRINT_DESCRIPTORS))
   {
-    line(ctx, "   <pDataBuf>%016" PRIX64 "</pDataBuf>\n",
-         static_cast<uint64_t>(reinterpret_cast<uintptr_t>(node.pDataBuf)));
-    line(ctx, "   <dataBufSize>%" PRIu64 "</dataBufSize>\n", node.dataBufSize);
-    line(ctx, "   <dataBufOffset>%" PRIu64 "</dataBufOffset>\n", node.dataBufOffset);
+    tav::print::descriptor(ctx, node);
   }
   const bool wrapped = has(ctx, TAV_PRINT_HEADERS | TAV_PRINT_DESCRIPTORS);
   if (wrapped)
   {
-    line(ctx, "   <tavData>");
+    lineOf(ctx, {"   <tavData>"});
   }
   const uint32_t rc = hasValue(node) ? tavPrintValue(&ctx, &node) : TAV_RC_OK;
   if (rc == TAV_RC_OK && wrapped)
   {
-    tavPrintf(&ctx, "</tavData>\n");
+    piece(ctx, "</tavData>\n");
   }
   return rc;
 }
@@ -143,31 +101,60 @@ uint32_t bodyXml(TAVPrintCtx& ctx, TAVHeaderData& node)
   }
   if (has(ctx, TAV_PRINT_HEADERS))
   {
-    dumpHeaderXml(ctx, node.header);
+    tav::print::header(ctx, node.header);
   }
   return has(ctx, TAV_PRINT_DATA) ? dataXml(ctx, node) : TAV_RC_OK;
 }
 
-uint32_t nodeXml(TAVPrintCtx& ctx, TAVHeaderData& node, const Parts& parts)
+/// The tags of a node that is one line, when the block has them ready.
+const ReadyTag* readyTag(const TAVPrintCtx& ctx, const TAVHeaderData& node, const Parts& parts)
+{
+  const bool oneLine = parts.open && parts.close && !has(ctx, TAV_PRINT_HEADERS);
+  return oneLine && ctx.pBlock != nullptr ? ctx.pBlock->tags.find(elmOf(node.header), ctx.depth) : nullptr;
+}
+
+void openXml(TAVPrintCtx& ctx, const TAVHeaderData& node, const Parts& parts)
+{
+  const bool oneLine = parts.close && !has(ctx, TAV_PRINT_HEADERS);
+  lineOf(ctx, {"<", elementTagName(elmOf(node.header)), oneLine ? ">" : ">\n"});
+}
+
+void closeXml(TAVPrintCtx& ctx, const TAVHeaderData& node, const Parts& parts)
 {
   const char* const tag = elementTagName(elmOf(node.header));
-  const bool headers = has(ctx, TAV_PRINT_HEADERS);
-  if (parts.open)
+  if (has(ctx, TAV_PRINT_HEADERS) || (!parts.open && !parts.body))
   {
-    line(ctx, parts.close && !headers ? "<%s>" : "<%s>\n", tag);
+    lineOf(ctx, {"</", tag, ">\n"});
+  }
+  else
+  {
+    tavPrintf(&ctx, "</%s>\n", tag); // behind the value, on its line
+  }
+}
+
+uint32_t nodeXml(TAVPrintCtx& ctx, TAVHeaderData& node, const Parts& parts)
+{
+  const ReadyTag* const ready = readyTag(ctx, node, parts);
+  if (ready != nullptr)
+  {
+    ctx.pBlock->addReady(ready->opening, ready->openingLength);
+  }
+  else if (parts.open)
+  {
+    openXml(ctx, node, parts);
   }
   const uint32_t rc = parts.body ? bodyXml(ctx, node) : TAV_RC_OK;
   if (rc != TAV_RC_OK || !parts.close)
   {
     return rc;
   }
-  if (headers || (!parts.open && !parts.body))
+  if (ready != nullptr)
   {
-    line(ctx, "</%s>\n", tag);
+    ctx.pBlock->addReady(ready->closing, ready->closingLength);
   }
   else
   {
-    tavPrintf(&ctx, "</%s>\n", tag); // behind the value, on its line
+    closeXml(ctx, node, parts);
   }
   return rc;
 }
@@ -177,7 +164,7 @@ uint32_t nodeAttributes(TAVPrintCtx& ctx, TAVHeaderData& node, const Parts& part
   const char* const tag = elementTagName(elmOf(node.header));
   if (parts.open)
   {
-    line(ctx, "<%s", tag);
+    lineOf(ctx, {"<", tag});
   }
   uint32_t rc = TAV_RC_OK;
   if (parts.body)
@@ -187,7 +174,7 @@ uint32_t nodeAttributes(TAVPrintCtx& ctx, TAVHeaderData& node, const Parts& part
   }
   if (rc == TAV_RC_OK && parts.close)
   {
-    tavPrintf(&ctx, ">\n");
+    piece(ctx, ">\n");
   }
   return rc;
 }

@@ -1,23 +1,76 @@
+#include <algorithm>
 #include <cstdarg>
 
 #include "api/printer.h"
 
+using tav::print::has;
+
 namespace
 {
 
-constexpr int64_t kBlanksPerLevel = 3;
 constexpr size_t kLongestLine = 512; // the longest names of the dictionary stay well below
 
-uint64_t printToBuffer(char* buffer, uint64_t size, const char* format, va_list arguments)
+/// What fits of a piece of `length` characters, which stands in the buffer so far; the NUL is set.
+uint64_t endInBuffer(TAVPrintCtx& ctx, uint64_t length)
 {
-  if (size == 0)
-  {
-    return 0;
-  }
-  const int length = vsnprintf(buffer, size, format, arguments);
-  const uint64_t count = length < 0 || static_cast<uint64_t>(length) >= size ? size - 1 : static_cast<uint64_t>(length);
-  buffer[count] = '\0';
+  const uint64_t count = std::min(length, ctx.bufferSize - 1);
+  ctx.pBuffer[count] = '\0';
   return count;
+}
+
+uint64_t formatToBuffer(TAVPrintCtx& ctx, const char* format, va_list arguments)
+{
+  const int length = vsnprintf(ctx.pBuffer, ctx.bufferSize, format, arguments);
+  return endInBuffer(ctx, length < 0 ? ctx.bufferSize : static_cast<uint64_t>(length));
+}
+
+bool isToBuffer(const TAVPrintCtx& ctx)
+{
+  return ctx.pStream == nullptr && ctx.pBuffer != nullptr;
+}
+
+uint64_t formatAlone(TAVPrintCtx& ctx, const char* format, va_list arguments)
+{
+  if (isToBuffer(ctx))
+  {
+    return ctx.bufferSize != 0 ? formatToBuffer(ctx, format, arguments) : 0;
+  }
+  const int length = vfprintf(tav::print::streamOf(ctx), format, arguments);
+  return length < 0 ? 0 : static_cast<uint64_t>(length);
+}
+
+/// Formats a piece of at most a line's length, cutting what is longer.
+std::string_view formatLine(std::array<char, kLongestLine>& text, const char* format, va_list arguments)
+{
+  const int length = vsnprintf(text.data(), text.size(), format, arguments);
+  return {text.data(), length < 0 ? 0 : std::min(static_cast<size_t>(length), text.size() - 1)};
+}
+
+/// What stands before a line of the text form, a piece of its own.
+void depthPrefix(TAVPrintCtx& ctx)
+{
+  if (ctx.pBlock == nullptr)
+  {
+    tavPrintf(&ctx, "%3d|", static_cast<int>(ctx.depth));
+    return;
+  }
+  constexpr size_t width = 3;
+  std::array<char, tav::digits::kLongest> text;
+  char* end = tav::digits::writeDecimal(text.data(), static_cast<uint64_t>(ctx.depth));
+  *end++ = '|';
+  const auto length = static_cast<size_t>(end - text.data());
+  ctx.pBlock->add(width + 1 - std::min(length, width + 1), {text.data(), length});
+}
+
+/// A line whose text has a NUL behind it.
+void indented(TAVPrintCtx& ctx, std::string_view text)
+{
+  if (ctx.pBlock != nullptr)
+  {
+    ctx.pBlock->add(static_cast<size_t>(ctx.depth * tav::print::kBlanksPerLevel), text);
+    return;
+  }
+  tavPrintf(&ctx, ctx.indentFormat.data(), "", text.data());
 }
 
 } // namespace
@@ -27,26 +80,51 @@ uint64_t tavPrintf(TAVPrintCtx* ctx, const char* format, ...)
   va_list arguments;
   va_start(arguments, format);
   uint64_t count = 0;
-  if (ctx->pStream == nullptr && ctx->pBuffer != nullptr)
+  if (ctx->pBlock != nullptr)
   {
-    count = printToBuffer(ctx->pBuffer, ctx->bufferSize, format, arguments);
+    std::array<char, kLongestLine> text;
+    count = ctx->pBlock->add(0, formatLine(text, format, arguments));
   }
   else
   {
-    const int length = vfprintf(ctx->pStream != nullptr ? ctx->pStream : stdout, format, arguments);
-    count = length < 0 ? 0 : static_cast<uint64_t>(length);
+    count = formatAlone(*ctx, format, arguments);
+    ctx->bytesWritten += count;
   }
   va_end(arguments);
-  ctx->bytesWritten += count;
   return count;
 }
 
 namespace tav::print
 {
 
+FILE* streamOf(const TAVPrintCtx& ctx)
+{
+  return ctx.pStream != nullptr ? ctx.pStream : stdout;
+}
+
+uint64_t pieceAlone(TAVPrintCtx& ctx, std::string_view text)
+{
+  uint64_t count = 0;
+  if (!isToBuffer(ctx))
+  {
+    count = std::fwrite(text.data(), 1, text.size(), streamOf(ctx)) == text.size() ? text.size() : 0;
+  }
+  else if (ctx.bufferSize != 0)
+  {
+    std::copy_n(text.data(), std::min<uint64_t>(text.size(), ctx.bufferSize - 1), ctx.pBuffer);
+    count = endInBuffer(ctx, text.size());
+  }
+  ctx.bytesWritten += count;
+  return count;
+}
+
 void setDepth(TAVPrintCtx& ctx, int64_t depth)
 {
   ctx.depth = depth;
+  if (ctx.pBlock != nullptr)
+  {
+    return; // which is told the blanks themselves
+  }
   if (depth == 0)
   {
     ctx.indentFormat = kNoIndent; // a width of 0 would read as a flag
@@ -61,13 +139,26 @@ void line(TAVPrintCtx& ctx, const char* format, ...)
   std::array<char, kLongestLine> text;
   va_list arguments;
   va_start(arguments, format);
-  vsnprintf(text.data(), text.size(), format, arguments);
+  const std::string_view formatted = formatLine(text, format, arguments);
   va_end(arguments);
+  lineOf(ctx, {formatted});
+}
+
+void lineOf(TAVPrintCtx& ctx, std::initializer_list<std::string_view> parts)
+{
+  std::array<char, kLongestLine> text;
+  char* end = text.data();
+  for (const std::string_view part : parts)
+  {
+    const auto room = static_cast<size_t>(text.data() + text.size() - 1 - end);
+    end = std::copy_n(part.data(), std::min(part.size(), room), end);
+  }
+  *end = '\0';
   if (!has(ctx, TAV_PRINT_XML))
   {
-    tavPrintf(&ctx, "%3d|", static_cast<int>(ctx.depth));
+    depthPrefix(ctx);
   }
-  tavPrintf(&ctx, ctx.indentFormat.data(), "", text.data());
+  indented(ctx, {text.data(), static_cast<size_t>(end - text.data())});
 }
 
 } // namespace tav::print

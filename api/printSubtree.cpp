@@ -4,14 +4,15 @@
 #include <memory>
 #include <new>
 
-#include "api/printer.h"
-#include "api/walkGuard.h"
+#include "api/printLeaves.h"
+#include "format/hdrStack.h"
 #include "format/layout.h"
 #include "kor/traceFrame.h"
 #include "tav/probes.h"
 
 using namespace tav;
 using tav::print::has;
+using tav::print::OutputBlock;
 using tav::print::setDepth;
 
 namespace
@@ -26,12 +27,40 @@ bool isAmong(const std::array<uint16_t, 3>& ids, uint16_t elm)
   return std::find(ids.begin(), ids.end(), elm) != ids.end();
 }
 
+/// Lets the output go on piece by piece: what the block holds goes out, and nothing is put into it any more.
+void leaveBlock(TAVPrintCtx& ctx)
+{
+  ctx.pBlock->handOver();
+  ctx.pBlock = nullptr;
+  setDepth(ctx, ctx.depth);
+}
+
+/// Ends a node in the block. A trace that has begun may go where the output goes: then nothing is held back.
+uint32_t endNode(TAVPrintCtx& ctx)
+{
+  OutputBlock& block = *ctx.pBlock;
+  block.endNode();
+  if (tracing()) [[unlikely]]
+  {
+    leaveBlock(ctx);
+  }
+  return block.stopped() ? TAV_RC_NO_MEMORY : TAV_RC_OK;
+}
+
 /// Prints parts of a node that must produce something.
 uint32_t printSome(TAVPrintCtx& ctx, TAVHeaderData& node, bool open, bool body, bool close)
 {
   uint64_t count = 0;
   const uint32_t rc = tavPrintNode(&ctx, &node, open, body, close, &count);
-  return rc == TAV_RC_OK && count == 0 ? TAV_RC_NO_MEMORY : rc;
+  if (rc != TAV_RC_OK)
+  {
+    return rc;
+  }
+  if (count == 0)
+  {
+    return TAV_RC_NO_MEMORY;
+  }
+  return ctx.pBlock != nullptr ? endNode(ctx) : TAV_RC_OK;
 }
 
 /// The key elements of a group, each as an attribute.
@@ -114,9 +143,19 @@ uint32_t walk(TAVPrintCtx& ctx, TAVHandle& handle, TAVHdrStack& stack)
 {
   std::array<TAVHeaderData, 2> slots{};
   TAVHeader* previous = nullptr;
+  TAVHeader passed{};
   WalkGuard guard(stack.pEntries[0]);
   for (size_t current = 0; stack.count != 0; current ^= 1U)
   {
+    if (ctx.pBlock != nullptr &&
+        print::printLeaves(ctx, handle, *topEntry<SilentFrame>(stack), previous, guard, passed))
+    {
+      previous = &passed;
+      if (ctx.pBlock->stopped())
+      {
+        return TAV_RC_NO_MEMORY;
+      }
+    }
     TAVHeaderData& child = slots[current];
     uint32_t rc = tavGetNextChild(0, &handle, stack.top(), previous, &child);
     previous = &child.header;
@@ -141,6 +180,19 @@ uint32_t walk(TAVPrintCtx& ctx, TAVHandle& handle, TAVHdrStack& stack)
   return TAV_RC_OK;
 }
 
+/// A walk whose output goes to a stream in blocks.
+uint32_t walkInBlocks(TAVPrintCtx& ctx, TAVHandle& handle, TAVHdrStack& stack)
+{
+  OutputBlock block(print::streamOf(ctx), ctx.bytesWritten);
+  ctx.pBlock = &block;
+  const uint32_t rc = walk(ctx, handle, stack);
+  if (ctx.pBlock != nullptr)
+  {
+    leaveBlock(ctx);
+  }
+  return block.stopped() ? TAV_RC_NO_MEMORY : rc;
+}
+
 uint32_t printBelow(TAVPrintCtx& ctx, TAVHandle* handle, const TAVHeader& start)
 {
   if (handle == nullptr || !isGroup(start))
@@ -153,7 +205,12 @@ uint32_t printBelow(TAVPrintCtx& ctx, TAVHandle* handle, const TAVHeader& start)
     return TAV_RC_NO_HDR_STACK;
   }
   const uint32_t rc = enterGroup(ctx, *stack, start);
-  return rc == TAV_RC_OK ? walk(ctx, *handle, *stack) : rc;
+  if (rc != TAV_RC_OK)
+  {
+    return rc;
+  }
+  const bool toBuffer = ctx.pStream == nullptr && ctx.pBuffer != nullptr;
+  return toBuffer || tracing() ? walk(ctx, *handle, *stack) : walkInBlocks(ctx, *handle, *stack);
 }
 
 uint32_t printAll(TAVPrintCtx& ctx, TAVHandle* handle, TAVHeaderData& start)
@@ -176,7 +233,7 @@ TAVPrintCtx* makeContext(uint64_t options, const TAVHandle* handle, const TAVPri
 {
   const uint8_t swapBytes = handle != nullptr ? handle->swapBytes : uint8_t{0};
   return new (std::nothrow) TAVPrintCtx{param.pBuffer, param.bufferSize, param.pStream, 0, print::kNoIndent, 0,
-                                        swapBytes, options, 0, 0};
+                                        swapBytes, options, 0, 0, nullptr};
 }
 
 } // namespace

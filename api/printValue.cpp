@@ -1,77 +1,22 @@
 /// Printing one value.
 #include <algorithm>
-#include <array>
-#include <cinttypes>
 #include <cstring>
 
+#include "api/printValue.h"
 #include "api/printer.h"
 #include "format/layout.h"
 #include "kor/traceFrame.h"
 #include "tav/probes.h"
 
 using namespace tav;
+using tav::print::kUnboundedText;
+using tav::print::shortPiece;
+using tav::print::Value;
 
 namespace
 {
 
-constexpr uint64_t kUnboundedText = uint64_t{1} << 63U; // a text of this size ends at its NUL
-
-/// A value in host order: its first bytes reversed where the stream is in the other order.
-class Value
-{
-public:
-  Value(const TAVHeaderData& node, bool swap)
-      : bytes_(node.pDataBuf), size_(sizeOf(node.header)), rule_(typeInfo(typeOf(node.header)).swapRule), swap_(swap)
-  {
-    if (swap && rule_ != SwapRule::all64 && fits())
-    {
-      reversed_ = swappedPrefix(rule_, size_);
-      swapPayload(rule_, bytes_, first_.data(), reversed_);
-    }
-  }
-
-  /// Whether the size holds what is reversed.
-  [[nodiscard]] bool fits() const
-  {
-    return !swap_ || (rule_ == SwapRule::all64 ? size_ % 8 == 0 : size_ >= swapUnitLength(rule_));
-  }
-
-  [[nodiscard]] uint64_t size() const
-  {
-    return size_;
-  }
-
-  [[nodiscard]] uint8_t byteAt(uint64_t at) const
-  {
-    return at < reversed_ ? first_[at] : bytes_[at];
-  }
-
-  template<class Number>
-  [[nodiscard]] Number as() const
-  {
-    Number number;
-    std::memcpy(&number, reversed_ != 0 ? first_.data() : bytes_, sizeof number);
-    return number;
-  }
-
-  /// A unit of an array.
-  [[nodiscard]] uint64_t wordAt(uint64_t at) const
-  {
-    uint64_t word = 0;
-    std::memcpy(&word, bytes_ + at, sizeof word);
-    return swap_ ? kor::byteswap64(word) : word;
-  }
-
-private:
-  const uint8_t* bytes_;
-  uint64_t size_;
-  SwapRule rule_;
-  bool swap_;
-  uint64_t reversed_ = 0;
-  std::array<uint8_t, 16> first_{};
-};
-
-/// Characters up to a NUL or the size. Longer than a format's precision can say, they go in pieces.
+/// Characters up to a NUL or the size. Very many go in several pieces.
 void printString(TAVPrintCtx& ctx, const TAVHeaderData& node)
 {
   constexpr uint64_t longestPiece = 1U << 30U;
@@ -84,7 +29,7 @@ void printString(TAVPrintCtx& ctx, const TAVHeaderData& node)
   do
   {
     const uint64_t piece = std::min(length, longestPiece);
-    if (tavPrintf(&ctx, "%.*s", static_cast<int>(piece), text) < piece)
+    if (print::piece(ctx, {text, print::lengthOfText(text, piece)}) < piece)
     {
       return;
     }
@@ -97,68 +42,15 @@ void printHex(TAVPrintCtx& ctx, const Value& value)
 {
   for (uint64_t at = 0; at < value.size(); ++at)
   {
-    tavPrintf(&ctx, "%02X", static_cast<unsigned>(value.byteAt(at)));
+    shortPiece(ctx, [&](char* to) { return digits::writeHex(to, value.byteAt(at)); });
   }
-}
-
-void printTimestamp(TAVPrintCtx& ctx, const Value& value)
-{
-  const auto timestamp = value.as<TAVTimeStamp>();
-  TAVDate date{};
-  tavTimeStampToDateInt(timestamp, &date);
-  tavPrintf(&ctx, "%04d-%02d-%02d-%02d.%02d.%02d.%06d%04d", date.year, date.month, date.day, date.hour, date.minute,
-            date.second, date.fractionA / 1000 + date.fractionB, timestamp.offsetMinutes);
 }
 
 void printWords(TAVPrintCtx& ctx, const Value& value)
 {
   for (uint64_t at = 0; at < value.size(); at += sizeof(uint64_t))
   {
-    tavPrintf(&ctx, "%" PRIu64, value.wordAt(at));
-  }
-}
-
-bool isPrintable(uint16_t type)
-{
-  return typeInfo(type).known && type != TAV_TYPE_UTF8_STRING && type != TAV_TYPE_SINT128;
-}
-
-bool isSizeOfType(uint16_t type, uint64_t size)
-{
-  const uint8_t exact = typeInfo(type).valueSize;
-  return (exact == 0 || size == exact) && (type != TAV_TYPE_UINT64_ARRAY || size % 8 == 0);
-}
-
-void printNumber(TAVPrintCtx& ctx, uint16_t type, const Value& value)
-{
-  switch (type)
-  {
-  case TAV_TYPE_UINT8:
-    tavPrintf(&ctx, "%02X", static_cast<unsigned>(value.byteAt(0)));
-    break;
-  case TAV_TYPE_SINT8:
-    tavPrintf(&ctx, "%c", value.as<int8_t>());
-    break;
-  case TAV_TYPE_BYTE:
-    tavPrintf(&ctx, "%c", value.byteAt(0));
-    break;
-  case TAV_TYPE_UINT16:
-    tavPrintf(&ctx, "%hu", value.as<uint16_t>());
-    break;
-  case TAV_TYPE_SINT16:
-    tavPrintf(&ctx, "%hd", value.as<int16_t>());
-    break;
-  case TAV_TYPE_UINT32:
-    tavPrintf(&ctx, "%" PRIu32, value.as<uint32_t>());
-    break;
-  case TAV_TYPE_SINT32:
-    tavPrintf(&ctx, "%" PRId32, value.as<int32_t>());
-    break;
-  case TAV_TYPE_UINT64:
-    tavPrintf(&ctx, "%" PRIu64, value.as<uint64_t>());
-    break;
-  default:
-    tavPrintf(&ctx, "%" PRId64, value.as<int64_t>());
+    shortPiece(ctx, [&](char* to) { return digits::writeDecimal(to, value.wordAt(at)); });
   }
 }
 
@@ -170,9 +62,6 @@ void printByType(TAVPrintCtx& ctx, const TAVHeaderData& node, const Value& value
   case TAV_TYPE_ASCII_STRING:
     printString(ctx, node);
     break;
-  case TAV_TYPE_UTC_TIMESTAMP:
-    printTimestamp(ctx, value);
-    break;
   case TAV_TYPE_BINARY:
   case TAV_TYPE_UINT128:
     printHex(ctx, value);
@@ -181,7 +70,7 @@ void printByType(TAVPrintCtx& ctx, const TAVHeaderData& node, const Value& value
     printWords(ctx, value);
     break;
   default:
-    printNumber(ctx, type, value);
+    shortPiece(ctx, [&](char* to) { return print::writeShort(to, type, value); });
   }
 }
 
@@ -207,10 +96,10 @@ uint32_t tavPrintValue(TAVPrintCtx* ctx, TAVHeaderData* node)
     return frame.code();
   }
   const uint16_t type = typeOf(node->header);
-  const Value value(*node, ctx->swapBytes != 0);
+  const Value value(type, node->pDataBuf, sizeOf(node->header), ctx->swapBytes != 0);
   if (frame.require(50, value.fits(), TAV_RC_OUTSIDE_PARENT) &&
-      frame.require(60, isPrintable(type), TAV_RC_NOT_SUPPORTED) &&
-      frame.require(70, isSizeOfType(type, value.size()), TAV_RC_OUTSIDE_PARENT))
+      frame.require(60, print::isPrintable(type), TAV_RC_NOT_SUPPORTED) &&
+      frame.require(70, print::isSizeOfType(type, value.size()), TAV_RC_OUTSIDE_PARENT))
   {
     printByType(*ctx, *node, value);
   }

@@ -3,7 +3,11 @@
 
 #include <array>
 #include <cstdint>
+#include <initializer_list>
+#include <string_view>
 
+#include "api/digits.h"
+#include "api/printBlock.h"
 #include "tav/tav.h"
 
 /// One print call: where the output goes, how far it came, how deep it is.
@@ -19,6 +23,8 @@ struct TAVPrintCtx
   uint64_t options;
   uint8_t attributeForm; ///< the node in hand is printed as an opening tag with attributes
   uint8_t further;       ///< not used
+
+  tav::print::OutputBlock* pBlock = nullptr; ///< collects what goes to a stream; null: every piece goes out at once
 };
 
 /// Formats one piece of output to the stream, the buffer or standard output and returns its characters. In a buffer
@@ -43,10 +49,48 @@ inline bool has(const TAVPrintCtx& ctx, uint64_t option)
 
 inline constexpr std::array<char, 10> kNoIndent{'%', 's', '%', 's'};
 
+/// The stream that a context without a buffer prints to.
+FILE* streamOf(const TAVPrintCtx& ctx);
+
 /// Sets the depth, and the indentation of three blanks a level.
 void setDepth(TAVPrintCtx& ctx, int64_t depth);
 
 /// One line of text, indented; in the text form behind the depth.
 void line(TAVPrintCtx& ctx, const char* format, ...) KOR_PRINTF_FORMAT(2, 3);
+
+/// As `line`, of parts that stand side by side.
+void lineOf(TAVPrintCtx& ctx, std::initializer_list<std::string_view> parts);
+
+/// The lines that show a header.
+void header(TAVPrintCtx& ctx, const TAVHeader& header);
+
+/// The lines that show where a node's data lie.
+void descriptor(TAVPrintCtx& ctx, const TAVHeaderData& node);
+
+/// A piece that goes out at once.
+uint64_t pieceAlone(TAVPrintCtx& ctx, std::string_view text);
+
+/// A piece of output that is ready.
+inline uint64_t piece(TAVPrintCtx& ctx, std::string_view text)
+{
+  return ctx.pBlock != nullptr ? ctx.pBlock->add(0, text) : pieceAlone(ctx, text);
+}
+
+inline constexpr size_t kLongestShort = 64;
+
+/// A short piece that `write` puts at the place it is given, of kLongestShort characters at most; it returns the
+/// piece's end.
+template<class Write>
+void shortPiece(TAVPrintCtx& ctx, const Write& write)
+{
+  if (ctx.pBlock != nullptr)
+  {
+    char* const place = ctx.pBlock->reserve(kLongestShort);
+    ctx.pBlock->endPiece(static_cast<size_t>(write(place) - place));
+    return;
+  }
+  std::array<char, kLongestShort> place;
+  pieceAlone(ctx, {place.data(), static_cast<size_t>(write(place.data()) - place.data())});
+}
 
 } // namespace tav::print

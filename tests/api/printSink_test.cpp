@@ -4,7 +4,6 @@
 #include <memory>
 #include <string>
 #include <tuple>
-#include <unistd.h>
 #include <vector>
 
 #include <gmock/gmock.h>
@@ -12,6 +11,7 @@
 
 #include "api/printer.h"
 #include "support/elements.h"
+#include "support/platform.h"
 #include "support/printing.h"
 
 namespace
@@ -19,53 +19,6 @@ namespace
 
 using namespace test;
 using namespace std::string_literals;
-
-/// Sends standard output into a file of its own for as long as it lives.
-class CaughtStdout
-{
-public:
-  CaughtStdout()
-      : file_(std::tmpfile())
-  {
-    std::fflush(stdout);
-    before_ = dup(fileno(stdout));
-    dup2(fileno(file_), fileno(stdout));
-  }
-  ~CaughtStdout()
-  {
-    giveBack();
-    std::fclose(file_);
-  }
-  CaughtStdout(const CaughtStdout&) = delete;
-  CaughtStdout& operator=(const CaughtStdout&) = delete;
-
-  std::string text()
-  {
-    giveBack();
-    std::rewind(file_);
-    std::string result;
-    for (int c = std::fgetc(file_); c != EOF; c = std::fgetc(file_))
-    {
-      result.push_back(static_cast<char>(c));
-    }
-    return result;
-  }
-
-private:
-  void giveBack()
-  {
-    if (before_ >= 0)
-    {
-      std::fflush(stdout);
-      dup2(before_, fileno(stdout));
-      close(before_);
-      before_ = -1;
-    }
-  }
-
-  FILE* file_;
-  int before_ = -1;
-};
 
 /// A context over a caller's buffer whose bytes are all '#'.
 class BufferSink
@@ -109,7 +62,7 @@ TEST(SinkToAStream, LeavesTheBufferAlone)
 
 TEST(SinkToAStream, CountsNothingThatTheStreamRefuses)
 {
-  FILE* const readOnly = std::fopen("/dev/null", "r");
+  FILE* const readOnly = std::fopen(nullDevice(), "r");
   ASSERT_NE(readOnly, nullptr);
   TAVPrintCtx ctx = printContext(readOnly);
   EXPECT_EQ(tavPrintf(&ctx, "lost"), 0U);
@@ -363,7 +316,7 @@ TEST(SubtreeToAStream, DoesNotReadTheFirstWord)
 TEST(SubtreeToAStream, ThatRefusesIsNothingPrinted)
 {
   Seven seven;
-  FILE* const readOnly = std::fopen("/dev/null", "r");
+  FILE* const readOnly = std::fopen(nullDevice(), "r");
   ASSERT_NE(readOnly, nullptr);
   TAVPrintParam param{0, nullptr, 0, readOnly};
   uint64_t count = 0xBAD;

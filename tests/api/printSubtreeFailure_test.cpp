@@ -132,7 +132,7 @@ Bytes nestedStream(uint64_t levels)
 std::pair<uint32_t, uint64_t> printNested(uint64_t levels)
 {
   StreamReader reader(nestedStream(levels));
-  FILE* const nowhere = std::fopen("/dev/null", "w");
+  FILE* const nowhere = std::fopen(nullDevice(), "w");
   TAVPrintParam param{0, nullptr, 0, nowhere};
   uint64_t count = 0;
   const uint32_t rc = tavPrintSubtree(0x41, reader.handle(), nullptr, &param, &count);
