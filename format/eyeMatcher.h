@@ -28,7 +28,10 @@ public:
   }
 
 private:
-  uint64_t native_ = 0;
+  /// As `scan`, byte by byte.
+  const uint8_t* follow(const uint8_t* at, const uint8_t* end);
+
+  uint64_t native_ = 0; // bytes matched so far
   uint64_t reversed_ = 0;
 };
 

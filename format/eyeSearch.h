@@ -1,0 +1,27 @@
+/// Searching a run of bytes for whole eye catchers.
+#pragma once
+
+#include <array>
+#include <bit>
+#include <cstdint>
+
+#include "format/layout.h"
+
+namespace tav
+{
+
+using EyeBytes = std::array<uint8_t, kEyeLength>;
+
+inline constexpr auto kNativeEye = std::bit_cast<EyeBytes>(TAV_EYE_CATCHER);
+inline constexpr auto kReversedEye = std::bit_cast<EyeBytes>(kor::byteswap64(TAV_EYE_CATCHER));
+
+/// Finds the first eye catcher, of either byte order, that lies whole in [at, end).
+///
+/// @return its first byte; `end` when there is none
+/// Any alignment will do; nothing outside the run is read. Cost: about what reading the bytes costs.
+const uint8_t* findEye(const uint8_t* at, const uint8_t* end);
+
+/// As `findEye`, with no more than what every processor of the kind that the library is built for can do.
+const uint8_t* findEyeOnAnyProcessor(const uint8_t* at, const uint8_t* end);
+
+} // namespace tav
