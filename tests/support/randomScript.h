@@ -6,6 +6,7 @@
 #include <cstdint>
 #include <cstring>
 #include <initializer_list>
+#include <span>
 #include <sstream>
 #include <stdexcept>
 #include <string>
@@ -23,6 +24,9 @@ class Random
 public:
   explicit Random(uint64_t seed)
       : state_(seed) {}
+  /// Numbers that somebody else chose, as long as there are any: the bytes must outlive the object.
+  Random(std::span<const uint8_t> choices, uint64_t seed)
+      : state_(seed), choices_(choices) {}
 
   uint64_t next()
   {
@@ -32,7 +36,11 @@ public:
     return word ^ (word >> 31);
   }
   /// 0 to `limit` - 1.
-  uint64_t below(uint64_t limit) { return limit != 0 ? next() % limit : 0; }
+  uint64_t below(uint64_t limit)
+  {
+    if (limit == 0) return 0;
+    return (choices_.empty() ? next() : choose(limit)) % limit;
+  }
   bool oneIn(uint64_t chance) { return below(chance) == 0; }
   template<class Value>
   Value pick(std::initializer_list<Value> values)
@@ -41,7 +49,20 @@ public:
   }
 
 private:
+  /// As many bytes as the limit needs, so that a changed byte changes one choice.
+  uint64_t choose(uint64_t limit)
+  {
+    uint64_t number = 0;
+    for (uint64_t reach = 1; reach < limit && !choices_.empty() && reach < uint64_t{1} << 56; reach <<= 8)
+    {
+      number = number << 8 | choices_.front();
+      choices_ = choices_.subspan(1);
+    }
+    return number;
+  }
+
   uint64_t state_;
+  std::span<const uint8_t> choices_{};
 };
 
 /// A difference between the two ways, which no rule allows.
