@@ -141,6 +141,25 @@ uint32_t nextChildSilently(TAVHandle& handle, const TAVHeader& parent, const TAV
   return rc != kUnusual ? rc : nextChildTraced(options, handle, parent, refChild, out);
 }
 
+/// The plain step's end through a circular buffer: the child is known to start at `offset`.
+[[gnu::noinline]] uint32_t nextChildInRing(TAVHandle* handle, TAVHeader* parent, TAVHeader* refChild,
+                                           TAVHeaderData* out, uint64_t offset)
+{
+  Node node{offset, {}, true};
+  DataPlace data{};
+  if (handle->pCircularBuf == nullptr || !readCachedHeader(*handle, node, data)) [[unlikely]]
+  {
+    return nextChildOther(0, handle, parent, refChild, out);
+  }
+  const bool hasData = !node.group();
+  handOut(node, data, hasData, false, *out);
+  if (hasData)
+  {
+    setArea(*handle, {offset + kHeaderSize64, data.start, data.room});
+  }
+  return TAV_RC_OK;
+}
+
 /// Where the sibling after a plain node starts; false for what is not plain.
 [[gnu::always_inline]] inline bool findPlainSibling(const TAVHeader& reference, uint64_t end, uint64_t& start)
 {
@@ -157,9 +176,9 @@ uint32_t nextChildSilently(TAVHandle& handle, const TAVHeader& parent, const TAV
 uint32_t tavGetNextChild(uint64_t options, TAVHandle* handle, TAVHeader* parent, TAVHeader* refChild,
                          TAVHeaderData* out)
 {
-  // Closed groups of 64-bit headers in memory are what most walks are over. Every other way out ends in one call.
+  // Closed groups of 64-bit headers are what most walks are over. Every other way out ends in one call.
   if (tracing() || handle == nullptr || parent == nullptr || out == nullptr || options != 0 ||
-      !readsPlainBlock(*handle) || !hasChildren64(*parent)) [[unlikely]]
+      !isReadOnly(*handle) || !isPlain(*handle) || !hasChildren64(*parent)) [[unlikely]]
   {
     return nextChildOther(options, handle, parent, refChild, out);
   }
@@ -174,9 +193,13 @@ uint32_t tavGetNextChild(uint64_t options, TAVHandle* handle, TAVHeader* parent,
   {
     return node.offset == end ? TAV_RC_NO_MORE_CHILDREN : nextChildOther(options, handle, parent, refChild, out);
   }
+  if (!isDirect(*handle))
+  {
+    return nextChildInRing(handle, parent, refChild, out, node.offset);
+  }
   const Block block{handle->pDirectData, handle->directDataSize, false, false};
   DataPlace data{};
-  if (!readHeader(block, node, data)) [[unlikely]]
+  if (handle->pDirectData == nullptr || handle->curOffset != 0 || !readHeader(block, node, data)) [[unlikely]]
   {
     return nextChildOther(options, handle, parent, refChild, out);
   }

@@ -27,15 +27,6 @@ namespace tav
 /// Never leaves the library: a silent step met something unusual.
 inline constexpr uint32_t kUnusual = ~uint32_t{0};
 
-/// Whether a handle reads a direct block that begins with the stream, in host order and unpadded: what most walks are
-/// over, and what the shortest steps are made for.
-[[gnu::always_inline]] inline bool readsPlainBlock(const TAVHandle& handle)
-{
-  constexpr uint64_t reading = TAV_OPT_READ | TAV_OPT_DIRECT;
-  return (handle.options & reading) == reading && isPlain(handle) && handle.pDirectData != nullptr &&
-         handle.curOffset == 0;
-}
-
 /// What a walk knows of a node, in registers where a TAVHeader would live in memory.
 struct Node
 {

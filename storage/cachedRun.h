@@ -46,11 +46,18 @@ inline uint8_t* cachedRun(const TAVCircularBuf& ring, uint64_t offset, uint64_t 
   return cachedIndex(ring, offset, index) && length <= contiguousFrom(ring, index) ? ring.pRing + index : nullptr;
 }
 
+/// Whether pages begin at multiples of a power of two. std::has_single_bit counts bits, by a call where the processor's
+/// instruction cannot be taken for granted.
+inline bool hasRoundPages(const TAVCircularBuf& ring)
+{
+  return (ring.pageSize & (ring.pageSize - 1)) == 0;
+}
+
 /// The page that an index lies in. A page is nearly always a power of two, and a division costs more than all else
 /// here.
 inline uint64_t pageOfIndex(const TAVCircularBuf& ring, uint64_t index)
 {
-  return std::has_single_bit(ring.pageSize) ? index >> std::countr_zero(ring.pageSize) : index / ring.pageSize;
+  return hasRoundPages(ring) ? index >> std::countr_zero(ring.pageSize) : index / ring.pageSize;
 }
 
 /// Marks a page and those behind it, around the ring's end, up to another as pending.
@@ -73,9 +80,16 @@ inline uint8_t* takeCachedRun(TAVCircularBuf& ring, uint64_t offset, uint64_t le
   {
     return nullptr;
   }
+  const uint64_t page = pageOfIndex(ring, index);
+  const uint64_t last = ring.pageSize - 1;
+  if (hasRoundPages(ring) && length <= last && (index & last) + length <= last) [[likely]]
+  {
+    ring.pPageFlags[2 * page] = 1; // the byte behind lies in the same page, or is not cached
+    return ring.pRing + index;
+  }
   uint64_t end = ring.tail;
   cachedIndex(ring, offset + length, end);
-  markPending(ring, pageOfIndex(ring, index), pageOfIndex(ring, end));
+  markPending(ring, page, pageOfIndex(ring, end));
   return ring.pRing + index;
 }
 
