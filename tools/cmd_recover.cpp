@@ -97,7 +97,8 @@ void putReport(const Invocation& invocation, const std::string& output, const st
 
 void recoverInto(const Invocation& invocation, Stream& stream, PatchFile& file, Account& account)
 {
-  Rebuilder rebuilder(stream.bytes(), stream.form(), file);
+  Progress progress("recover", stream.bytes().size());
+  Rebuilder rebuilder(stream.bytes(), stream.form(), file, [&](uint64_t offset) { progress.at(offset); });
   Recovery recovery(stream.bytes(), stream.form(), rebuilder, invocation.number("--search").value_or(kNoOffset),
                     [&](const Loss& loss) {
                       if (account.losses.size() < kMostListed)
@@ -105,7 +106,6 @@ void recoverInto(const Invocation& invocation, Stream& stream, PatchFile& file, 
                         account.losses.push_back(loss);
                       }
                     });
-  Progress progress("recover", stream.bytes().size());
   while (recovery.step())
   {
     progress.at(recovery.position());

@@ -12,7 +12,7 @@ using namespace tav::layout;
 namespace
 {
 
-constexpr size_t kMostEndings = 256 * 1024; ///< 6 MiB
+constexpr size_t kMostEndings = size_t{256} * 1024; ///< 6 MiB
 
 bool readHeader(ByteSource& source, const Form& form, uint64_t offset, bool wide, TAVHeader& out)
 {

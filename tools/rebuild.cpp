@@ -41,6 +41,7 @@ void Rebuilder::copy(uint64_t offset, uint64_t count)
 {
   while (count != 0)
   {
+    reading_(offset);
     const auto piece = source_.view(offset);
     const uint64_t now = std::min<uint64_t>(piece.size(), count);
     if (now == 0)

@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <vector>
 
 #include "tools/build_file.h"
@@ -24,8 +25,9 @@ struct FoundData
 class Rebuilder
 {
 public:
-  Rebuilder(ByteSource& source, const Form& form, PatchFile& out)
-      : source_(source), form_(form), out_(out) {}
+  /// `reading` is told where bytes are copied from, piece by piece.
+  Rebuilder(ByteSource& source, const Form& form, PatchFile& out, std::function<void(uint64_t)> reading)
+      : source_(source), form_(form), out_(out), reading_(std::move(reading)) {}
 
   /// Opens a group; its size is set when it is closed. A group of 32-bit headers never announces 64-bit ones.
   void open(TAVHeader header);
@@ -43,6 +45,7 @@ private:
   ByteSource& source_;
   Form form_;
   PatchFile& out_;
+  std::function<void(uint64_t)> reading_;
   std::vector<TAVHeader> groups_{};
 };
 

@@ -13,7 +13,6 @@ namespace
 {
 
 constexpr uint64_t kMostNested = 4000; ///< groups that the library follows
-constexpr uint64_t kInfoBits = TAV_INFO_EYE_SIZE | TAV_INFO_ALIGNED8;
 
 TAVHeader madeHeader(bool wideHeader, bool wideChildren, bool eye)
 {
@@ -334,7 +333,7 @@ void Recovery::takeGroup(const Candidate& found)
   frame.sure = found.trust == Trust::paired;
   frame.fixed = frames_.size() == 1 && !damaged_;
   const uint64_t around = frames_.back().limit;
-  frame.open = found.open || found.end > around;
+  frame.open = found.open || found.end > around || (frames_.size() == 1 && !frame.sure && endsTooSoon(found.end));
   frame.limit = frame.open ? around : found.end;
   totals_.closed += frame.open ? 1 : 0;
   if (frame.sure && found.end > around)
@@ -350,6 +349,13 @@ void Recovery::takeGroup(const Candidate& found)
   const uint64_t length = headerLength(header.hdrType);
   totals_.kept += length;
   position_ += length;
+}
+
+/// Whether more than zeros stands where a root ends by its size, and no other root begins.
+bool Recovery::endsTooSoon(uint64_t end)
+{
+  bool gaveUp = false;
+  return end < source_.size() && !goesOn(end, form_.root64) && !prober_.zerosToEnd(end, gaveUp);
 }
 
 bool Recovery::mayEndInZeros() const
@@ -391,7 +397,7 @@ bool Recovery::isDamagedEnd(const Candidate& found, uint64_t limit)
 /// The first place from `from` on where a node can begin; false when there is none before `to`.
 bool Recovery::findNext(uint64_t from, uint64_t to, Candidate& found)
 {
-  constexpr uint64_t kWindow = 16 * 1024;
+  constexpr uint64_t kWindow = uint64_t{16} * 1024;
   std::vector<uint8_t> window(kWindow + kHeaderSize64);
   const bool own = frames_.back().wide;
   for (uint64_t at = from; at < to;)
@@ -405,15 +411,14 @@ bool Recovery::findNext(uint64_t from, uint64_t to, Candidate& found)
       if (tryAt(window.data() + i, offset, own, found))
       {
         const bool strange = found.isGroup() && found.trust == Trust::alone &&
-                             (found.open || (is64(found.header()) ? (infoOf(found.header()) & ~kInfoBits) != 0
-                                                                  : sizeOf(found.header()) == 0));
+                             (isStrange(found) || found.open || (!own && sizeOf(found.header()) == 0));
         if (!strange && !isDamagedEnd(found, to) && believe(found, false))
         {
           return true;
         }
       }
       if (canHold(!own) && form_.root64 && tryAt(window.data() + i, offset, !own, found) &&
-          found.trust >= Trust::followed && !isDamagedEnd(found, to) && isRun(offset, !own))
+          found.trust >= Trust::followed && !isDamagedEnd(found, to) && isRun(offset, !own) && believe(found, false))
       {
         return true;
       }

@@ -102,6 +102,15 @@ private:
   Belief judge(uint64_t offset, bool wide, uint64_t limit);
   bool isPlausible(uint64_t offset, bool wide, uint64_t limit);
   bool isBoundary(uint64_t offset);
+  bool holdsRun(uint64_t from, uint64_t to);
+  bool isConfirmed(const Candidate& group);
+  Belief beliefBehind(uint64_t end, bool wide, uint64_t limit);
+  bool goesOn(uint64_t offset, bool wide);
+  static bool isExact(const TAVHeader& header);
+  static bool isStrange(const Candidate& found);
+  bool isSure(const uint8_t* bytes, uint64_t offset, bool wide);
+  static bool mayHoldNodes(const Candidate& found);
+  bool isContradicted(const Candidate& found);
   bool isRun(uint64_t offset, bool wide);
   bool believe(Candidate& found, bool onWay);
   bool isDamagedEnd(const Candidate& found, uint64_t limit);
@@ -118,6 +127,7 @@ private:
   void gap();
   bool findNext(uint64_t from, uint64_t to, Candidate& found);
   bool tryAt(const uint8_t* bytes, uint64_t offset, bool wide, Candidate& found);
+  bool endsTooSoon(uint64_t end);
   bool mayEndInZeros() const;
   bool endByZeros();
   void lose(uint64_t to, std::string reason);

@@ -9,6 +9,13 @@ namespace tav::tool
 
 using namespace tav::layout;
 
+namespace
+{
+
+constexpr uint64_t kInfoBits = TAV_INFO_EYE_SIZE | TAV_INFO_ALIGNED8;
+
+} // namespace
+
 bool Recovery::isKnown(const TAVHeader& header)
 {
   return isGroup(header) || typeInfo(typeOf(header)).known;
@@ -35,11 +42,13 @@ uint64_t Recovery::sureLimit() const
   return frames_[frames_.back().sureAt].limit;
 }
 
+/// Whether a group ends at a place, or one begins whose header is lost. What nothing confirms ends a group only where
+/// nodes go on behind it: its size may be the damaged part.
 bool Recovery::isBoundary(uint64_t offset)
 {
   for (size_t i = frames_.size(); i-- > 0 && frames_[i].limit <= offset;)
   {
-    if (frames_[i].limit == offset)
+    if (frames_[i].limit == offset && (frames_[i].sure || goesOn(offset, frames_[i - 1].wide)))
     {
       return true;
     }
@@ -48,18 +57,35 @@ bool Recovery::isBoundary(uint64_t offset)
   return ending != nullptr && ending->start == offset;
 }
 
-/// As Prober::judge; a group that claims more than there is, as all around the place where a file was cut, counts by
-/// what is in it.
+/// Whether a node stands at a place, in a group with these headers or behind its end.
+bool Recovery::goesOn(uint64_t offset, bool wide)
+{
+  const uint64_t limit = sureLimit();
+  return judge(offset, wide, limit) >= Belief::named ||
+         (!wide && canHold(true) && prober_.judge(offset, true, limit) == Belief::followed);
+}
+
+/// As Prober::judge, but an element that nobody knows counts where a node follows; and what claims more than there is,
+/// as all around the place where a file was cut, counts by what is in it.
 Belief Recovery::judge(uint64_t offset, bool wide, uint64_t limit)
 {
   constexpr int kMost = 16;
   Belief belief = prober_.judge(offset, wide, limit);
+  TAVHeader header{};
+  if (belief == Belief::typed && prober_.header(offset, wide, limit, header) && prober_.isFollowed(header, limit))
+  {
+    return Belief::named;
+  }
   for (int i = 0; i < kMost && belief == Belief::none; ++i)
   {
-    TAVHeader header{};
-    if (!prober_.header(offset, wide, limit, header) || !isGroup(header) || !Prober::isNamed(elmOf(header)))
+    if (!prober_.header(offset, wide, limit, header) || !Prober::isNamed(elmOf(header)))
     {
       return Belief::none;
+    }
+    if (!isGroup(header))
+    {
+      const bool cut = i != 0 && limit == source_.size() && prober_.judgeHeader(header, kNoOffset) == Belief::named;
+      return cut ? Belief::named : Belief::none;
     }
     offset += headerLength(header.hdrType);
     wide = hasChildren64(header);
@@ -164,6 +190,16 @@ bool Recovery::isBetter(uint64_t with, uint64_t without, bool wide, uint64_t lim
   return exact(with) != exact(without) ? exact(with) : form_.extra;
 }
 
+/// What speaks for a place as the one where a node ends.
+Belief Recovery::beliefBehind(uint64_t end, bool wide, uint64_t limit)
+{
+  if (isBoundary(end))
+  {
+    return Belief::followed;
+  }
+  return goesOn(end, wide) ? std::max(Belief::named, judge(end, wide, limit)) : Belief::none;
+}
+
 void Recovery::lookAtData(Candidate& found, uint64_t limit)
 {
   const TAVHeader& header = found.header();
@@ -187,8 +223,7 @@ void Recovery::lookAtData(Candidate& found, uint64_t limit)
     for (uint64_t extra = 0; extra <= (utf8 ? 2U : 0U); extra += 2)
     {
       const uint64_t end = addSaturated(base, extra + with);
-      const Belief belief = end > limit ? Belief::none : isBoundary(end) ? Belief::followed
-                                                                         : judge(end, wide, limit);
+      const Belief belief = end > limit ? Belief::none : beliefBehind(end, wide, limit);
       if (belief > best || (extra != 0 && found.pairBytes == with && belief == best && best != Belief::typed &&
                             isBetter(end, found.end, wide, limit)))
       {
@@ -210,33 +245,65 @@ void Recovery::lookAtData(Candidate& found, uint64_t limit)
   }
 }
 
+/// Whether a size can be no other for the type: a damaged header hardly has one.
+bool Recovery::isExact(const TAVHeader& header)
+{
+  switch (typeOf(header))
+  {
+  case TAV_TYPE_ASCII_STRING:
+  case TAV_TYPE_BINARY:
+  case TAV_TYPE_UTF8_STRING:
+  case TAV_TYPE_UINT64_ARRAY:
+    return false;
+  default:
+    return !isGroup(header);
+  }
+}
+
+/// Whether several nodes follow one another, or few up to the end of a group.
 bool Recovery::isRun(uint64_t offset, bool wide)
 {
-  constexpr int kEnough = 3;
-  for (int i = 0; i < kEnough; ++i)
+  constexpr int kEnough = 6; ///< three nodes that are followed, or two whose sizes can be no others
+  for (int weight = 0; weight < kEnough;)
   {
-    if (i != 0 && isBoundary(offset))
-    {
-      return true;
-    }
     Ending ending;
-    if (i != 0 && readEnding(source_, form_, offset, wide, sureLimit(), ending))
+    if (weight != 0 && (isBoundary(offset) || readEnding(source_, form_, offset, wide, sureLimit(), ending) ||
+                        (!wide && canHold(true) && prober_.judge(offset, true, sureLimit()) == Belief::followed)))
     {
       return true;
     }
     const Candidate node = look(offset, wide);
-    if (node.trust < Trust::followed || !Prober::isNamed(elmOf(node.header())))
+    const bool exact = node.trust != Trust::none && isExact(node.header());
+    if ((node.trust < Trust::followed && !exact) || !Prober::isNamed(elmOf(node.header())))
     {
       return false;
     }
-    if (node.trust == Trust::paired)
-    {
-      return true;
-    }
+    weight += node.trust == Trust::paired ? kEnough : exact ? 3
+                                                            : 2;
     offset = node.isGroup() ? offset + headerLength(node.header().hdrType) : node.end;
     wide = node.isGroup() ? hasChildren64(node.header()) : wide;
   }
   return true;
+}
+
+/// Whether a group's header is such as no writer makes, or its claim such as few groups have.
+bool Recovery::isStrange(const Candidate& found)
+{
+  const TAVHeader& header = found.header();
+  return found.isGroup() && ((found.open && !isSizeUnknown(header)) ||
+                             (is64(header) ? (infoOf(header) & ~kInfoBits) != 0 : typeOf(header) != TAV_TYPE_HEADER32));
+}
+
+bool Recovery::isSure(const uint8_t* bytes, uint64_t offset, bool wide)
+{
+  Candidate found;
+  if (tryAt(bytes, offset, wide, found) && (found.trust >= Trust::followed || isExact(found.header())) &&
+      !isStrange(found))
+  {
+    return true;
+  }
+  return form_.root64 && canHold(!wide) && tryAt(bytes, offset, !wide, found) && found.trust >= Trust::followed &&
+         !isStrange(found) && isRun(offset, !wide);
 }
 
 /// The first node between two places that is followed or paired; `to` when there is none.
@@ -248,14 +315,14 @@ uint64_t Recovery::firstSure(uint64_t from, uint64_t to, bool wide)
   {
     return std::min(to, sureAt_);
   }
-  Candidate found;
   std::array<uint8_t, 4096 + kHeaderSize64> window{};
-  const uint64_t length = wide ? kHeaderSize64 : kHeaderSize32;
+  const uint64_t length = kHeaderSize32;
   uint64_t at = known ? sureAt_ : from;
   bool done = false;
   while (at < to && !done)
   {
     const size_t got = source_.read(at, window);
+    std::fill(window.begin() + static_cast<ptrdiff_t>(got), window.end(), uint8_t{0});
     const uint64_t tests = std::min<uint64_t>({4096, to - at, got < length ? 0 : got - length + 1});
     if (tests == 0)
     {
@@ -263,8 +330,7 @@ uint64_t Recovery::firstSure(uint64_t from, uint64_t to, bool wide)
       break;
     }
     uint64_t i = 0;
-    while (i < tests && !(tryAt(window.data() + i, at + i, wide, found) && found.trust >= Trust::followed) &&
-           !(!wide && form_.root64 && tryAt(window.data() + i, at + i, true, found) && found.trust == Trust::paired))
+    while (i < tests && !isSure(window.data() + i, at + i, wide))
     {
       ++i;
     }
@@ -278,19 +344,75 @@ uint64_t Recovery::firstSure(uint64_t from, uint64_t to, bool wide)
   return at;
 }
 
+/// Whether nodes follow one another from a place exactly to another one, into groups that end behind it.
 bool Recovery::leadsTo(uint64_t from, bool wide, uint64_t end)
 {
   constexpr int kMost = 64;
   for (int i = 0; i < kMost && from < end; ++i)
   {
-    const Candidate node = look(from, wide);
+    Candidate node = look(from, wide);
+    if (node.trust == Trust::none && canHold(!wide))
+    {
+      node = look(from, !wide);
+      node.trust = node.trust == Trust::alone ? Trust::none : node.trust;
+    }
     if (node.trust == Trust::none || node.end <= from)
     {
       return false;
     }
-    from = node.end;
+    const bool into = node.isGroup() && node.end > end;
+    from = into ? from + headerLength(node.header().hdrType) : node.end;
+    wide = into ? hasChildren64(node.header()) : is64(node.header());
   }
   return from == end;
+}
+
+/// Whether several nodes follow one another from a place in a few bytes on.
+bool Recovery::holdsRun(uint64_t from, uint64_t to)
+{
+  std::array<uint8_t, 64> window{};
+  for (uint64_t at = from; at < to; ++at)
+  {
+    source_.read(at, std::span(window).first(kHeaderSize64));
+    for (const bool wide : {true, false})
+    {
+      Candidate found;
+      if (canHold(wide) && tryAt(window.data(), at, wide, found) && found.trust >= Trust::followed &&
+          !isStrange(found) && (!found.isGroup() || isConfirmed(found)) && isRun(at, wide))
+      {
+        return true;
+      }
+    }
+  }
+  return false;
+}
+
+/// Whether something speaks for the size that a group claims.
+bool Recovery::isConfirmed(const Candidate& group)
+{
+  return group.trust == Trust::paired || isSizeUnknown(group.header()) || group.end == sureLimit() ||
+         isBoundary(group.end) || goesOn(group.end, is64(group.header()));
+}
+
+/// Whether nodes may stand in a payload: bytes may be anything, a stream, too. Text holds none; where a pair is
+/// announced it has to stand behind the payload.
+bool Recovery::mayHoldNodes(const Candidate& found)
+{
+  const uint16_t type = typeOf(found.header());
+  return (type == TAV_TYPE_BINARY || type == TAV_TYPE_UINT64_ARRAY) && !found.pairMissing && found.pairBytes == 0;
+}
+
+/// Whether nodes inside of what a node claims follow one another exactly to its end.
+bool Recovery::isContradicted(const Candidate& found)
+{
+  const TAVHeader& header = found.header();
+  if (found.isGroup() || isExact(header) || mayHoldNodes(found))
+  {
+    return false;
+  }
+  const uint64_t start = header.nodeOffset + headerLength(header.hdrType);
+  const uint64_t sure = firstSure(start, found.end, is64(header));
+  return sure < start + sizeOf(header) && leadsTo(sure, is64(header), found.end);
 }
 
 /// Whether a node stands where it seems to. On the way from node to node its header is trusted; behind damage, all its
@@ -298,20 +420,26 @@ bool Recovery::leadsTo(uint64_t from, bool wide, uint64_t end)
 bool Recovery::believe(Candidate& found, bool onWay)
 {
   const TAVHeader& header = found.header();
-  if (found.trust >= Trust::followed || (onWay && found.isGroup()))
+  if (found.trust >= Trust::followed)
   {
-    return true;
+    return found.trust == Trust::paired || !isContradicted(found);
+  }
+  const bool named = Prober::isNamed(elmOf(header));
+  const uint64_t start = header.nodeOffset + headerLength(header.hdrType);
+  if (onWay && !damaged_ && named && isExact(header))
+  {
+    return !holdsRun(start, found.end);
   }
   // Its size can be damaged: then nodes stand inside of what it claims, and go on beyond.
-  const uint64_t start = header.nodeOffset + headerLength(header.hdrType);
   const uint64_t end = found.isGroup() ? start : found.end;
-  const uint64_t sure = firstSure(onWay ? start : header.nodeOffset + 1, end, is64(header));
+  const uint64_t from = onWay && named && !found.isGroup() ? start : header.nodeOffset + 1;
+  const uint64_t sure = firstSure(from, end, is64(header));
   if (sure < end && !found.isGroup() && sure >= start + sizeOf(header))
   {
     found.end = sure; // its padding is not there
     return true;
   }
-  return sure >= end || leadsTo(sure, is64(header), end);
+  return sure >= end || (!found.isGroup() && mayHoldNodes(found) && leadsTo(sure, is64(header), end));
 }
 
 } // namespace tav::tool

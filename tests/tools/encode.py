@@ -3,6 +3,8 @@ with. Random streams come from a seed and are the same on every machine."""
 import random
 import struct
 
+from support import BIG_ENDIAN
+
 EYE = 0xC0DED5EEDDEC0DED
 EYE_SIZE = 0x00400000
 ALIGNED8 = 0x00100000
@@ -14,7 +16,7 @@ NAMES = [60100, 60102, 60103, 60101, 60104, 60105, 60109, 60111, 60117, 60118, 3
 
 
 class Form:
-    def __init__(self, big=False, root32=False, aligned=False):
+    def __init__(self, big=BIG_ENDIAN, root32=False, aligned=False):
         self.big, self.root32, self.aligned = big, root32, aligned
         self.order = ">" if big else "<"
 
@@ -136,6 +138,7 @@ class RandomStream:
             payload = draw.randbytes(16 if kind in (103, 104) else draw.randrange(40))
         if self.wild and self.chance(8):
             kind, payload = draw.choice([kind, draw.randrange(3, 65536)]), draw.randbytes(draw.randrange(30))
+            extra = extra if kind == UTF8 else b""  # behind other types they would be damage
         writer.data(self.element(), kind, payload, eye, self.info(), extra)
 
     def text(self):

@@ -6,6 +6,7 @@
 //
 // The description goes to standard output as JSON: the form, and one row a node in the order of the stream:
 // [offset, header bytes, size, type, element, depth].
+#include <algorithm>
 #include <cstdio>
 #include <cstdlib>
 #include <fstream>
@@ -223,12 +224,8 @@ private:
     }
     if (type == TAV_TYPE_UTF8_STRING && !byString && payload.size() >= 2)
     {
-      payload[0] = options_.form.swap ? 4 : 0xB8; // code page 1208, in host order before it is written
-      payload[1] = options_.form.swap ? 0xB8 : 4;
-      if (options_.form.swap)
-      {
-        std::swap(payload[0], payload[1]);
-      }
+      const test::Bytes codePage = test::bytesOfValue(uint16_t{1208}); // in host order: it is turned when it is written
+      std::copy(codePage.begin(), codePage.end(), payload.begin());
     }
     const uint64_t offset = writer_.length();
     uint64_t size = payload.size();

@@ -1,11 +1,12 @@
 """Damaged and hostile bytes: no crash, no endless run, no memory beyond the depth, every byte accounted for once."""
 import os
 import random
+import resource
 import struct
 import time
 import unittest
 
-from support import SANITIZED, ToolTest, bytes_of_hex, generate, tav, tav_in_little_memory, tree_rows
+from support import EMULATOR, SANITIZED, ToolTest, bytes_of_hex, generate, tav, tav_in_little_memory, tree_rows
 
 OPEN = 2**64 - 1
 
@@ -16,6 +17,12 @@ def group(size, elm=60100, info=0, kind=2):
 
 def number(value, elm=307, info=0):
     return struct.pack("<QIHHI", 4, info, 55, elm, value)
+
+
+def processor_time():
+    """Seconds that the programs run so far have computed: what other work on the machine does not change."""
+    used = resource.getrusage(resource.RUSAGE_CHILDREN)
+    return used.ru_utime + used.ru_stime
 
 
 def damage(rng, content):
@@ -106,9 +113,9 @@ class Hostile(ToolTest):
         os.truncate(path, 8 << 30)
         best = 60.0
         for _ in range(5):
-            start = time.monotonic()
+            before = processor_time()
             result = tav("info", path)
-            best = min(best, time.monotonic() - start)
+            best = min(best, processor_time() - before)
             self.assertEqual(result.status, 0, result.out)
             self.assertIn("nodes             16,", result.out)
         self.assertLess(best, 1.0 if SANITIZED else 0.05)
