@@ -106,7 +106,8 @@ std::string zshOption(const OptionSpec& option)
   }
   for (const std::string& name : namesOf(option))
   {
-    std::string spec = (option.many ? "*" : "") + name + "[" + help + "]";
+    std::string spec = option.many ? "*" : "";
+    spec.append(name).append("[").append(help).append("]");
     if (option.kind != ValueKind::flag)
     {
       spec += ":" + option.value + ":";

@@ -4,7 +4,7 @@
 #include <cstdio>
 #include <filesystem>
 
-#include "tools/machine.h"
+#include "kor/host.h"
 #include "tools/report.h"
 
 namespace tav::tool
@@ -13,22 +13,13 @@ namespace tav::tool
 namespace
 {
 
-constexpr size_t kBuffer = 64 * 1024;
-
-[[noreturn]] void fail(const std::string& name, uint32_t code, std::string hint = {})
-{
-  Problem problem{name};
-  problem.sentence = codeSentence(code);
-  problem.code = code;
-  problem.hint = std::move(hint);
-  throw Failure(kTrouble, problem);
-}
+constexpr size_t kBuffer = size_t{64} * 1024;
 
 /// Whether the path leads to something that is no file: a device, a pipe.
 bool isSpecial(const std::string& path)
 {
   std::error_code error;
-  const auto status = std::filesystem::status(path, error);
+  const auto status = std::filesystem::status(kor::pathOf(path), error);
   return !error && std::filesystem::exists(status) && !std::filesystem::is_regular_file(status);
 }
 
@@ -41,13 +32,13 @@ void checkWritable(const std::string& path, bool force)
   {
     return;
   }
-  if (std::filesystem::is_directory(path, error))
+  if (std::filesystem::is_directory(kor::pathOf(path), error))
   {
-    fail(path, KOR_RC_IS_FOLDER);
+    failAt(path, KOR_RC_IS_FOLDER);
   }
-  if (std::filesystem::is_regular_file(path, error))
+  if (std::filesystem::is_regular_file(kor::pathOf(path), error))
   {
-    fail(path, KOR_RC_FILE_EXISTS, "--force replaces it");
+    failAt(path, KOR_RC_FILE_EXISTS, "--force replaces it");
   }
 }
 
@@ -67,7 +58,7 @@ void Output::openFile(bool)
   for (unsigned attempt = 0;; ++attempt)
   {
     const std::string name =
-        special ? path_ : path_ + ".tav-" + std::to_string(processId()) + "-" + std::to_string(attempt);
+        special ? path_ : path_ + ".tav-" + std::to_string(kor::processId()) + "-" + std::to_string(attempt);
     KORFileOpenParam param;
     param.pPath = name.c_str();
     param.options = special ? KOR_FILE_WRITE : KOR_FILE_WRITE | KOR_FILE_CREATE | KOR_FILE_EXCLUSIVE;
@@ -75,12 +66,12 @@ void Output::openFile(bool)
     if (code == TAV_RC_OK)
     {
       temporary_ = special ? std::string() : name;
-      removeOnInterrupt(temporary_);
+      kor::removeOnInterrupt(temporary_);
       return;
     }
     if (code != KOR_RC_FILE_EXISTS || attempt == 1000)
     {
-      fail(path_, code);
+      failAt(path_, code);
     }
   }
 }
@@ -97,8 +88,8 @@ Output::~Output()
   file_.close();
   if (!temporary_.empty())
   {
-    std::remove(temporary_.c_str());
-    removeOnInterrupt({});
+    kor::removeFile(temporary_);
+    kor::removeOnInterrupt({});
   }
 }
 
@@ -116,7 +107,7 @@ void Output::writeOut(const char* bytes, size_t count)
     uint64_t done = 0;
     if (const uint32_t code = file_.write(&param, &done); code != TAV_RC_OK)
     {
-      fail(path_, code);
+      failAt(path_, code);
     }
     return;
   }
@@ -129,7 +120,7 @@ void Output::writeOut(const char* bytes, size_t count)
     {
       throw ClosedPipe{};
     }
-    fail("standard output", error == ENOSPC ? KOR_RC_NO_SPACE : KOR_RC_IO_ERROR);
+    failAt("standard output", error == ENOSPC ? KOR_RC_NO_SPACE : KOR_RC_IO_ERROR);
   }
 }
 
@@ -170,18 +161,18 @@ void Output::commit()
   }
   if (const uint32_t code = file_.close(); code != TAV_RC_OK)
   {
-    fail(path_, code);
+    failAt(path_, code);
   }
   if (temporary_.empty())
   {
     return;
   }
-  if (const uint32_t code = moveIntoPlace(temporary_, path_, force_); code != TAV_RC_OK)
+  if (const uint32_t code = kor::moveIntoPlace(temporary_, path_, force_); code != TAV_RC_OK)
   {
-    fail(path_, code, code == KOR_RC_FILE_EXISTS ? "--force replaces it" : "");
+    failAt(path_, code, code == KOR_RC_FILE_EXISTS ? "--force replaces it" : "");
   }
   temporary_.clear();
-  removeOnInterrupt({});
+  kor::removeOnInterrupt({});
 }
 
 } // namespace tav::tool

@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <cstdio>
 
-#include "tools/machine.h"
+#include "kor/host.h"
 #include "tools/report.h"
 
 namespace tav::tool
@@ -12,7 +12,7 @@ namespace tav::tool
 using namespace std::chrono_literals;
 
 Progress::Progress(std::string what, uint64_t totalBytes)
-    : what_(std::move(what)), total_(totalBytes), active_(isTerminal(stderr))
+    : what_(std::move(what)), total_(totalBytes), active_(kor::isTerminal(stderr))
 {
 }
 

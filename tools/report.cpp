@@ -107,4 +107,13 @@ Failure::Failure(std::string sentence, std::string hint)
   problem.hint = std::move(hint);
 }
 
+void failAt(const std::string& file, uint32_t code, std::string hint)
+{
+  Problem problem{file};
+  problem.sentence = codeSentence(code);
+  problem.code = code;
+  problem.hint = std::move(hint);
+  throw Failure(kTrouble, problem);
+}
+
 } // namespace tav::tool

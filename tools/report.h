@@ -55,6 +55,9 @@ public:
   Problem problem;
 };
 
+/// Ends a command because the system refused something about a file.
+[[noreturn]] void failAt(const std::string& file, uint32_t code, std::string hint = {});
+
 /// Thrown when nobody reads standard output any more: the program ends quietly.
 struct ClosedPipe
 {

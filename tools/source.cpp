@@ -4,7 +4,7 @@
 #include <cstdio>
 #include <filesystem>
 
-#include "tools/machine.h"
+#include "kor/host.h"
 #include "tools/report.h"
 
 namespace tav::tool
@@ -12,15 +12,6 @@ namespace tav::tool
 
 namespace
 {
-
-[[noreturn]] void fail(const std::string& name, uint32_t code, std::string hint = {})
-{
-  Problem problem{name};
-  problem.sentence = codeSentence(code);
-  problem.code = code;
-  problem.hint = std::move(hint);
-  throw Failure(kTrouble, problem);
-}
 
 /// Gives pieces of standard input, or of a pipe with a name.
 class PipeReader
@@ -38,7 +29,7 @@ public:
     param.options = KOR_FILE_READ;
     if (const uint32_t code = file_.open(&param); code != TAV_RC_OK)
     {
-      fail(name, code);
+      failAt(name, code);
     }
     named_ = true;
   }
@@ -50,7 +41,7 @@ public:
       const size_t count = std::fread(buffer.data(), 1, buffer.size(), stdin);
       if (count == 0 && std::ferror(stdin) != 0)
       {
-        fail(name_, KOR_RC_IO_ERROR);
+        failAt(name_, KOR_RC_IO_ERROR);
       }
       return count;
     }
@@ -60,7 +51,7 @@ public:
     const uint32_t code = file_.read(&param, buffer.data(), &count);
     if (code != TAV_RC_OK && code != TAV_RC_END_OF_STORAGE)
     {
-      fail(name_, code);
+      failAt(name_, code);
     }
     return static_cast<size_t>(count);
   }
@@ -76,8 +67,8 @@ std::string spool(const std::string& name, const std::string& path)
 {
   PipeReader reader(name, path);
   KORHFile file;
-  const std::string temporary = openTemporary(file);
-  removeOnInterrupt(temporary);
+  std::string temporary = openTemporary(file);
+  kor::removeOnInterrupt(temporary);
   std::vector<uint8_t> buffer(ByteSource::kLongRead);
   try
   {
@@ -89,14 +80,14 @@ std::string spool(const std::string& name, const std::string& path)
       uint64_t done = 0;
       if (const uint32_t code = file.write(&param, &done); code != TAV_RC_OK)
       {
-        fail(temporary, code);
+        failAt(temporary, code);
       }
     }
   }
   catch (...)
   {
-    std::remove(temporary.c_str());
-    removeOnInterrupt({});
+    kor::removeFile(temporary);
+    kor::removeOnInterrupt({});
     throw;
   }
   return temporary;
@@ -114,8 +105,8 @@ std::string openTemporary(KORHFile& file)
   }
   for (unsigned attempt = 0;; ++attempt)
   {
-    const std::string path =
-        (folder / ("tav-" + std::to_string(processId()) + "-" + std::to_string(attempt))).string();
+    std::string path =
+        kor::textOf(folder / ("tav-" + std::to_string(kor::processId()) + "-" + std::to_string(attempt)));
     KORFileOpenParam param;
     param.pPath = path.c_str();
     param.options = KOR_FILE_UPDATE | KOR_FILE_CREATE | KOR_FILE_EXCLUSIVE;
@@ -127,7 +118,7 @@ std::string openTemporary(KORHFile& file)
     }
     if (code != KOR_RC_FILE_EXISTS || attempt == 1000)
     {
-      fail(path, code, "a temporary file is needed; set TMPDIR to a folder that can be written");
+      failAt(path, code, "a temporary file is needed; set TMPDIR to a folder that can be written");
     }
   }
 }
@@ -136,10 +127,10 @@ ByteSource::ByteSource(std::string name, std::string path, uint64_t ringBytes)
     : name_(std::move(name)), maxPages_(static_cast<size_t>(std::max<uint64_t>(2, ringBytes / kPage)))
 {
   std::error_code error;
-  const auto kind = std::filesystem::status(path, error).type();
+  const auto kind = std::filesystem::status(kor::pathOf(path), error).type();
   if (kind == std::filesystem::file_type::directory)
   {
-    fail(name_, KOR_RC_IS_FOLDER);
+    failAt(name_, KOR_RC_IS_FOLDER);
   }
   const bool regular = path != "-" && (error || kind == std::filesystem::file_type::regular ||
                                        kind == std::filesystem::file_type::not_found);
@@ -155,10 +146,10 @@ ByteSource::ByteSource(std::string name, std::string path, uint64_t ringBytes)
   if (!temporary_.empty())
   {
     // Where an open file can be removed it is gone from now on, however the program ends.
-    if (std::remove(temporary_.c_str()) == 0)
+    if (kor::removeFile(temporary_))
     {
       temporary_.clear();
-      removeOnInterrupt({});
+      kor::removeOnInterrupt({});
     }
   }
   if (code == TAV_RC_OK)
@@ -167,7 +158,7 @@ ByteSource::ByteSource(std::string name, std::string path, uint64_t ringBytes)
   }
   if (code != TAV_RC_OK)
   {
-    fail(name_, code);
+    failAt(name_, code);
   }
 }
 
@@ -176,8 +167,8 @@ ByteSource::~ByteSource()
   if (!temporary_.empty())
   {
     file_.reset();
-    std::remove(temporary_.c_str());
-    removeOnInterrupt({});
+    kor::removeFile(temporary_);
+    kor::removeOnInterrupt({});
   }
 }
 
@@ -221,11 +212,11 @@ void ByteSource::fetch(uint64_t number, uint64_t count)
   bytesRead_ += done;
   if (code != TAV_RC_OK && code != TAV_RC_END_OF_STORAGE)
   {
-    fail(name_, code);
+    failAt(name_, code);
   }
   if (done < wanted)
   {
-    fail(name_, TAV_RC_END_OF_STORAGE, "the file became shorter while it was read");
+    failAt(name_, TAV_RC_END_OF_STORAGE, "the file became shorter while it was read");
   }
   for (uint64_t at = 0; at < wanted; at += kPage)
   {

@@ -14,7 +14,7 @@
 namespace tav::tool
 {
 
-inline constexpr uint64_t kDefaultRing = 10 * 1024 * 1024;
+inline constexpr uint64_t kDefaultRing = uint64_t{10} * 1024 * 1024;
 
 /// Opens a new file in the folder for temporary files and returns its path. The name is tried until nobody else has it.
 std::string openTemporary(KORHFile& file);
@@ -24,8 +24,8 @@ std::string openTemporary(KORHFile& file);
 class ByteSource
 {
 public:
-  static constexpr uint64_t kPage = 16 * 1024;
-  static constexpr uint64_t kLongRead = 64 * kPage; ///< what is read at once when reading goes straight on
+  static constexpr uint64_t kPage = uint64_t{16} * 1024;
+  static constexpr uint64_t kLongRead = uint64_t{64} * kPage; ///< what is read at once when reading goes straight on
 
   /// Opens a file, "-" for standard input. At most `ringBytes` (and at least two pages) are kept in memory.
   /// Throws Failure when that does not work.

@@ -76,7 +76,7 @@ class Behaviour(ToolTest):
         path.write_bytes(struct.pack("<QIHH", len(children), 0, 2, 60100) + children)
         for command in ("tree", "hex", "print"):
             with self.subTest(command=command):
-                with subprocess.Popen([TAV, command, str(path)], stdout=subprocess.PIPE, stderr=subprocess.PIPE) as run:
+                with subprocess.Popen([*TAV, command, str(path)], stdout=subprocess.PIPE, stderr=subprocess.PIPE) as run:
                     run.stdout.read(10)
                     run.stdout.close()
                     errors = run.stderr.read()
@@ -88,7 +88,7 @@ class Behaviour(ToolTest):
         for arguments in (["tree", path], ["print", path], ["hex", path], ["get", path, "/system/host/hostName"],
                           ["info", path], ["elements"], ["--help"]):
             with self.subTest(arguments=arguments), open("/dev/full", "wb") as full:
-                run = subprocess.run([TAV, *map(str, arguments)], stdout=full, stderr=subprocess.PIPE, timeout=60)
+                run = subprocess.run([*TAV, *map(str, arguments)], stdout=full, stderr=subprocess.PIPE, timeout=60)
                 self.assertEqual(run.returncode, 2)
                 self.assertIn(b"KOR_RC_NO_SPACE", run.stderr)
         result = tav("snapshot", "-o", "/dev/full")
@@ -115,7 +115,7 @@ class Behaviour(ToolTest):
         folder = self.folder / "temporary"
         folder.mkdir()
         for number in (signal.SIGINT, signal.SIGTERM):
-            with subprocess.Popen([TAV, "tree", "-"], stdin=subprocess.PIPE, stdout=subprocess.DEVNULL,
+            with subprocess.Popen([*TAV, "tree", "-"], stdin=subprocess.PIPE, stdout=subprocess.DEVNULL,
                                   env={**os.environ, "TMPDIR": str(folder)}) as run:
                 deadline = time.monotonic() + 30
                 while not list(folder.iterdir()) and time.monotonic() < deadline:

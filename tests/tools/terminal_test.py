@@ -1,0 +1,241 @@
+"""What the program does on a real terminal: progress, colours, its width; completion in the shells themselves; and what an
+interrupt leaves."""
+import os
+import re
+import select
+import shutil
+import signal
+import struct
+import subprocess
+import time
+import unittest
+
+try:
+    import fcntl
+    import pty
+    import termios
+except ImportError:
+    pty = None
+
+from support import EMULATOR, TAV, ToolTest, tav
+
+ESCAPE = re.compile(r"\x1b\[[0-9;]*[A-Za-z]")
+LONG = 16 << 30  # nobody waits for the end of this
+
+
+@unittest.skipIf(pty is None, "this platform has no pseudo-terminals")
+@unittest.skipIf(EMULATOR, "an emulator has its own idea of a terminal")
+class TerminalTest(ToolTest):
+    def long_stream(self):
+        """A sound stream that takes no room on the disk and long to read."""
+        path = self.folder / "long.tav"
+        with path.open("wb") as file:
+            file.write(struct.pack("<QIHH", LONG - 16, 0, 2, 20) + struct.pack("<QIHH", LONG - 32, 0, 101, 307))
+            file.truncate(LONG)
+        return path
+
+    def start(self, *arguments, width=80, terminal=("stdout", "stderr"), **more):
+        """Starts the program with some of its streams on a new terminal; the others go to a file."""
+        ours, theirs = pty.openpty()
+        self.addCleanup(os.close, ours)
+        fcntl.ioctl(theirs, termios.TIOCSWINSZ, struct.pack("HHHH", 24, width, 0, 0))
+        with open(self.folder / "elsewhere", "wb") as other:
+            streams = {name: theirs if name in terminal else other for name in ("stdout", "stderr")}
+            run = subprocess.Popen([*TAV, *map(str, arguments)], stdin=subprocess.DEVNULL, **streams,
+                                   env={**os.environ, "TERM": "xterm", **more})
+        os.close(theirs)
+        self.addCleanup(self.end, run)
+        return run, ours
+
+    def end(self, run):
+        if run.poll() is None:
+            run.kill()
+        run.wait()
+
+    def read(self, ours, until=None, seconds=60):
+        """What appears on the terminal, up to the end of the program or to a match."""
+        seen = b""
+        deadline = time.monotonic() + seconds
+        while time.monotonic() < deadline and not (until and re.search(until, seen.decode("utf-8", "replace"))):
+            ready, _, _ = select.select([ours], [], [], 0.1)
+            if not ready:
+                continue
+            try:
+                piece = os.read(ours, 65536)
+            except OSError:  # the program has ended
+                break
+            if not piece:
+                break
+            seen += piece
+        return seen.decode("utf-8", "replace")
+
+    def on_terminal(self, *arguments, **more):
+        run, ours = self.start(*arguments, **more)
+        text = self.read(ours)
+        run.wait(timeout=60)
+        return text
+
+
+class Terminal(TerminalTest):
+    def test_a_tree_has_the_terminals_width(self):
+        path = self.snapshot()
+        for width in (40, 60):
+            lines = ESCAPE.sub("", self.on_terminal("tree", path, width=width)).split("\r\n")
+            self.assertGreater(len(lines), 10)
+            self.assertEqual(max(map(len, lines)), width)
+        self.assertGreater(max(map(len, tav("tree", path).out.split("\n"))), 60)
+
+    def test_a_tree_is_coloured_unless_the_user_wants_none(self):
+        path = self.snapshot()
+        self.assertRegex(self.on_terminal("tree", path), ESCAPE)
+        for text in (self.on_terminal("tree", path, NO_COLOR="1"), self.on_terminal("tree", path, "--color", "never"),
+                     tav("tree", path).out):
+            self.assertNotRegex(text, ESCAPE)
+        self.assertRegex(self.on_terminal("tree", path, NO_COLOR=""), ESCAPE)
+
+    def test_a_difference_is_coloured_unless_the_user_wants_none(self):
+        one, other = self.snapshot(), self.folder / "other.tav"
+        made = bytearray(one.read_bytes())
+        made[-1] ^= 1
+        other.write_bytes(made)
+        self.assertRegex(self.on_terminal("diff", one, other), ESCAPE)
+        self.assertNotRegex(self.on_terminal("diff", one, other, NO_COLOR="1"), ESCAPE)
+        self.assertNotRegex(tav("diff", one, other).out, ESCAPE)
+
+    def test_help_fits_the_terminal(self):
+        for arguments in (["--help"], *([name, "--help"] for name in ("tree", "recover", "check", "json"))):
+            lines = self.on_terminal(*arguments).rstrip().split("\r\n")
+            self.assertLessEqual(max(map(len, lines)), 120)
+        self.assertLessEqual(len(self.on_terminal("--help").rstrip().split("\r\n")), 24)
+
+    def test_a_stream_of_bytes_does_not_go_to_a_terminal(self):
+        run, ours = self.start("snapshot")
+        self.assertIn("-o", self.read(ours))
+        self.assertEqual(run.wait(timeout=60), 2)
+
+
+class Progress(TerminalTest):
+    def test_long_work_shows_rate_and_remaining_time_on_standard_error(self):
+        run, ours = self.start("recover", self.long_stream(), "-o", "/dev/null", "--force", "--byte-order", "little",
+                               "--root", "64", "--no-align", terminal=("stderr",))
+        text = self.read(ours, until=r"s left")
+        self.assertRegex(text, r"recover: [\d.]+ \w+ of 16(\.0)? GiB \(\d+ %\), [\d.]+ \w+/s, \d+ s left")
+        run.send_signal(signal.SIGINT)
+        self.assertEqual(run.wait(timeout=60), -signal.SIGINT)
+
+    def test_nothing_is_shown_when_standard_error_is_no_terminal(self):
+        path = self.long_stream()
+        run, ours = self.start("recover", path, "-o", "/dev/null", "--force", "--byte-order", "little", "--root", "64",
+                               "--no-align", terminal=("stdout",))
+        self.assertEqual(self.read(ours, until="s left", seconds=1.5), "")
+        self.assertEqual((self.folder / "elsewhere").read_bytes(), b"")
+        run.send_signal(signal.SIGINT)
+        self.assertEqual(run.wait(timeout=60), -signal.SIGINT)
+
+    def test_nothing_is_shown_when_the_work_is_short(self):
+        self.assertNotIn("left", self.on_terminal("check", self.snapshot()))
+
+
+class Interrupt(TerminalTest):
+    def test_an_interrupt_leaves_neither_half_a_file_nor_a_temporary_one(self):
+        path = self.long_stream()
+        for command, number in (("recover", signal.SIGINT), ("recover", signal.SIGTERM), ("json", signal.SIGINT),
+                                ("xml", signal.SIGTERM)):
+            with self.subTest(command=command, signal=number.name):
+                target = self.folder / "target"
+                target.mkdir()
+                run, _ = self.start(command, path, "-o", target / "saved", "--byte-order", "little", "--root", "64",
+                                    "--no-align")
+                deadline = time.monotonic() + 30
+                while not list(target.iterdir()) and time.monotonic() < deadline:
+                    time.sleep(0.005)
+                begun = [entry.name for entry in target.iterdir()]
+                run.send_signal(number)
+                self.assertEqual(run.wait(timeout=60), -number)
+                self.assertEqual((len(begun), "saved" in begun), (1, False))
+                self.assertEqual(list(target.iterdir()), [])
+                target.rmdir()
+
+    def test_an_interrupt_keeps_the_file_that_was_to_be_replaced(self):
+        path, target = self.long_stream(), self.folder / "target"
+        target.mkdir()
+        (target / "saved").write_bytes(b"precious")
+        run, _ = self.start("recover", path, "-o", target / "saved", "--force", "--byte-order", "little", "--root", "64",
+                            "--no-align")
+        deadline = time.monotonic() + 30
+        while len(list(target.iterdir())) < 2 and time.monotonic() < deadline:
+            time.sleep(0.005)
+        run.send_signal(signal.SIGINT)
+        self.assertEqual(run.wait(timeout=60), -signal.SIGINT)
+        self.assertEqual([(entry.name, entry.read_bytes()) for entry in target.iterdir()], [("saved", b"precious")])
+
+
+class Completion(ToolTest):
+    """The shells complete by themselves: bash by its function, zsh on a terminal, fish by its own command."""
+
+    def script(self, shell):
+        path = self.folder / ("_tav" if shell == "zsh" else f"tav.{shell}")
+        path.write_text(tav("completion", shell).out)
+        return path
+
+    @unittest.skipUnless(shutil.which("bash"), "bash is not installed")
+    def test_bash_offers_commands_options_and_choices(self):
+        script = self.script("bash")
+        for line, wanted in ((["tav", "sn"], ["snapshot"]), (["tav", "tree", "--dep"], ["--depth"]),
+                             (["tav", "tree", "--byte-order", "sw"], ["swapped"])):
+            words = " ".join(f"'{word}'" for word in line)
+            done = subprocess.run(["bash", "-c", f". '{script}'; COMP_WORDS=({words}); COMP_CWORD={len(line) - 1}; _tav; "
+                                                 "printf '%s\\n' \"${COMPREPLY[@]}\""], capture_output=True, timeout=60)
+            self.assertEqual((done.stdout.decode().split(), done.stderr), (wanted, b""))
+
+    @unittest.skipUnless(shutil.which("fish"), "fish is not installed")
+    def test_fish_offers_commands_options_and_choices(self):
+        script = self.script("fish")
+        for line, wanted in (("tav sn", "snapshot"), ("tav tree --dep", "--depth"), ("tav tree --byte-order sw", "swapped")):
+            done = subprocess.run(["fish", "--no-config", "-c", f"source '{script}'; complete -C '{line}'"],
+                                  capture_output=True, timeout=60, env={**os.environ, "HOME": str(self.folder)})
+            offered = [row.split("\t")[0] for row in done.stdout.decode().splitlines()]
+            self.assertEqual((offered, done.stderr), ([wanted], b""))
+
+    @unittest.skipUnless(shutil.which("zsh") and pty is not None, "zsh is not installed")
+    def test_zsh_offers_commands_options_and_choices(self):
+        self.script("zsh")
+        for line, wanted in (("tav sna", "tav snapshot "), ("tav tree --dep", "tav tree --depth "),
+                             ("tav tree --byte-order sw", "tav tree --byte-order swapped ")):
+            self.assertEqual(self.completed_by_zsh(line), wanted)
+
+    def completed_by_zsh(self, line):
+        """The line as it stands after the tab key, which the shell writes to a file."""
+        answer = self.folder / "answer"
+        setup = (f"fpath=('{self.folder}' $fpath); autoload -U compinit; compinit -u -D; "
+                 f"show() {{ print -r -- \"$BUFFER|\" > '{answer}'; zle accept-line; BUFFER=exit }}; "
+                 "zle -N show; bindkey '^X' show; PS1=ready; print started")
+        (self.folder / ".zshrc").write_text(setup + "\n")
+        answer.unlink(missing_ok=True)
+        ours, theirs = pty.openpty()
+        with subprocess.Popen(["zsh", "-i"], stdin=theirs, stdout=theirs, stderr=theirs, start_new_session=True,
+                              env={**os.environ, "ZDOTDIR": str(self.folder), "HOME": str(self.folder), "TERM": "xterm"}) as run:
+            os.close(theirs)
+            try:
+                os.write(ours, (line + "\t\x18").encode())
+                deadline = time.monotonic() + 30
+                while not answer.exists() and time.monotonic() < deadline:
+                    select.select([ours], [], [], 0.05)
+                    self.drain(ours)
+                time.sleep(0.05)
+            finally:
+                run.kill()
+                os.close(ours)
+        return answer.read_text().rstrip("\n").rstrip("|")
+
+    def drain(self, ours):
+        ready, _, _ = select.select([ours], [], [], 0)
+        if ready:
+            try:
+                os.read(ours, 65536)
+            except OSError:
+                pass
+
+
+if __name__ == "__main__":
+    unittest.main()
