@@ -3,8 +3,6 @@
 
 #include "api/printer.h"
 
-using tav::print::has;
-
 namespace
 {
 
@@ -154,7 +152,7 @@ void lineOf(TAVPrintCtx& ctx, std::initializer_list<std::string_view> parts)
     end = std::copy_n(part.data(), std::min(part.size(), room), end);
   }
   *end = '\0';
-  if (!has(ctx, TAV_PRINT_XML))
+  if (!tav::print::has(ctx, TAV_PRINT_XML))
   {
     depthPrefix(ctx);
   }

@@ -19,6 +19,10 @@ function(tav_add_library name)
   if(TAV_LIBRARY_TYPE STREQUAL "STATIC")
     string(TOUPPER ${name} upper)
     target_compile_definitions(${name} PUBLIC ${upper}_STATIC)
+  elseif(WIN32)
+    target_sources(${name} PRIVATE $<TARGET_OBJECTS:module_entry>)
+    # The names on both platforms are those of the library alone: tav.dll, libtav.so.
+    set_target_properties(${name} PROPERTIES PREFIX "")
   elseif(UNIX AND NOT APPLE)
     # Instances of the standard library's templates have its visibility, not ours; keep them inside.
     target_link_options(${name} PRIVATE "LINKER:--version-script=${PROJECT_SOURCE_DIR}/cmake/hide-std.map")

@@ -7,6 +7,7 @@ option(TAV_BUILD_TOOLS "Build the command line program" ${PROJECT_IS_TOP_LEVEL})
 option(TAV_BUILD_BENCH "Build the benchmarks" OFF)
 option(TAV_INSTALL "Add the libraries to what is installed" ${PROJECT_IS_TOP_LEVEL})
 option(TAV_WERROR "Treat warnings as errors" ${PROJECT_IS_TOP_LEVEL})
+option(TAV_FUZZ "Drive the programs of fuzz/ by libFuzzer; needs clang and fuzzer-no-link in TAV_SANITIZE" OFF)
 set(TAV_SANITIZE "" CACHE STRING "Sanitizers, as -fsanitize takes them: address,undefined or thread")
 
 # Shared unless BUILD_SHARED_LIBS says otherwise; the variable itself is the surrounding project's.
@@ -21,6 +22,10 @@ if(PROJECT_IS_TOP_LEVEL)
   set(CMAKE_CXX_STANDARD 20)
   set(CMAKE_CXX_STANDARD_REQUIRED ON)
   set(CMAKE_CXX_EXTENSIONS OFF)
+  if(WIN32)
+    # Programs find their libraries beside them.
+    set(CMAKE_RUNTIME_OUTPUT_DIRECTORY "${PROJECT_BINARY_DIR}/bin")
+  endif()
   if(NOT CMAKE_BUILD_TYPE AND NOT CMAKE_CONFIGURATION_TYPES)
     set(CMAKE_BUILD_TYPE Release CACHE STRING "Kind of build" FORCE)
   endif()

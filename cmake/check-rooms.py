@@ -4,7 +4,8 @@
     check-rooms.py [ROOT]
 
 Includes point one way: tools -> api -> storage, dictionary -> format -> kor. The operating system, its headers and
-the byte order are kor's business.
+the byte order are kor's business, which has a file a platform: names that end in Posix or Windows. No other source
+asks for the platform, tests and examples included.
 """
 import pathlib
 import re
@@ -23,8 +24,13 @@ ROOMS = {
 # libkor knows nothing of libtav.
 KOR_PUBLIC = {"tav/kor.h", "tav/codes.h", "tav/byteOrder.h"}
 KOR_HEADERS = {f"include/{header}" for header in KOR_PUBLIC}
-# Who may know the platform: libkor, and the one file of the program that describes the machine.
-PLATFORM = ("kor/", "include/tav/kor.h", "include/tav/byteOrder.h", "tools/machine.cpp")
+# What kor has for the programs of this project, beside its public headers.
+FOR_TOOLS = {"kor/host.h"}
+# Who may know the platform: the public headers that declare exports and turn bytes, and kor's file of each platform.
+PLATFORM_HEADERS = ("include/tav/kor.h", "include/tav/byteOrder.h")
+PLATFORM_FILE = re.compile(r"^kor/(\w+(Posix|Windows)\.cpp|windows\.h)$")
+# Sources that are no room: they may include what they like, but must not ask for the platform.
+BESIDE = ("tests", "examples", "bench", "fuzz")
 # Libraries of others that a room may use.
 THIRD_PARTY = {"tools": ("CLI/", "nlohmann/")}
 
@@ -40,12 +46,18 @@ STANDARD = set(
 )
 
 INCLUDE = re.compile(r'^\s*#\s*include\s*(?P<open>[<"])(?P<path>[^>"]+)[>"]')
+SYSTEM = r"_WIN32|_WIN64|WIN32|__unix__|__linux__|__linux|__APPLE__|__FreeBSD__|_MSC_VER|__MINGW\w*|__CYGWIN__"
+SYSTEM_TEST = re.compile(rf"^\s*#\s*(?:if|elif|ifdef|ifndef)\b.*\b({SYSTEM}|__has_include)\b")
 PLATFORM_TEST = re.compile(
-    r"\b(_WIN32|_WIN64|WIN32|__unix__|__linux__|__linux|__APPLE__|__FreeBSD__|_MSC_VER|__MINGW\w*|__CYGWIN__|"
+    rf"\b({SYSTEM}|"
     r"__BYTE_ORDER__|__BYTE_ORDER|__ORDER_\w+_ENDIAN__|__(?:BIG|LITTLE)_ENDIAN__|WORDS_BIGENDIAN|"
     r"std::endian|htonl|htons|ntohl|ntohs|hto[bl]e(?:16|32|64)|[bl]e(?:16|32|64)toh)\b"
 )
 COMMENT = re.compile(r"//.*$")
+
+
+def knows_platform(name):
+    return name in PLATFORM_HEADERS or PLATFORM_FILE.match(name) is not None
 
 
 def include_error(name, room, opening, path):
@@ -58,10 +70,10 @@ def include_error(name, room, opening, path):
     if opening == '"':
         if "/" not in path:
             return f'"{path}" is named without its room'
-        if first in ROOMS and first in ROOMS[room]:
+        if (first in ROOMS and first in ROOMS[room]) or (room == "tools" and path in FOR_TOOLS):
             return None
         return f"{room} must not include {path}"
-    if path in STANDARD or name.startswith(PLATFORM) or path.startswith(THIRD_PARTY.get(room, ())):
+    if path in STANDARD or knows_platform(name) or path.startswith(THIRD_PARTY.get(room, ())):
         return None
     return f"<{path}> is no header of the standard library; the system is reached through kor"
 
@@ -69,13 +81,19 @@ def include_error(name, room, opening, path):
 def check_text(name, text):
     """Yields (line number, what is wrong) of one file; `name` is its path from the root."""
     room = name.split("/")[0]
+    if room in BESIDE:
+        for number, line in enumerate(text.splitlines(), start=1):
+            found = SYSTEM_TEST.search(COMMENT.sub("", line))
+            if found:
+                yield number, f"{found[1]}: the platform is kor's business; a file a platform serves the tests"
+        return
     for number, line in enumerate(text.splitlines(), start=1):
         match = INCLUDE.match(line)
         if match:
             error = include_error(name, room, match["open"], match["path"])
             if error:
                 yield number, error
-        elif not name.startswith(PLATFORM):
+        elif not knows_platform(name):
             found = PLATFORM_TEST.search(COMMENT.sub("", line))
             if found:
                 yield number, f"{found[0]}: the platform and the byte order are kor's business"
@@ -85,7 +103,7 @@ def check_tree(root):
     """Returns (number of files looked at, findings as lines of text)."""
     files = 0
     findings = []
-    for room in ROOMS:
+    for room in (*ROOMS, *BESIDE):
         for path in sorted((root / room).rglob("*")):
             if path.suffix not in (".h", ".hpp", ".cpp", ".def"):
                 continue

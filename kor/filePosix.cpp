@@ -5,6 +5,7 @@
 #include <unistd.h>
 
 #include "kor/fileNative.h"
+#include "kor/systemError.h"
 
 namespace tav::kor
 {
@@ -12,54 +13,10 @@ namespace
 {
 static_assert(sizeof(off_t) == 8, "file offsets are 64-bit");
 
-struct ErrorCode
-{
-  int error;
-  uint32_t code;
-};
-
-constexpr ErrorCode kErrorCodes[] = {
-    {ENOENT, KOR_RC_NO_SUCH_FILE},
-    {ENOTDIR, KOR_RC_NOT_A_FOLDER},
-    {EISDIR, KOR_RC_IS_FOLDER},
-    {EEXIST, KOR_RC_FILE_EXISTS},
-    {EACCES, KOR_RC_NO_PERMISSION},
-    {EPERM, KOR_RC_NO_PERMISSION},
-    {EROFS, KOR_RC_READ_ONLY},
-    {ENAMETOOLONG, KOR_RC_BAD_NAME},
-    {ELOOP, KOR_RC_BAD_NAME},
-    {EILSEQ, KOR_RC_BAD_NAME},
-    {EMFILE, KOR_RC_TOO_MANY_FILES},
-    {ENFILE, KOR_RC_TOO_MANY_FILES},
-    {ENOSPC, KOR_RC_NO_SPACE},
-    {EDQUOT, KOR_RC_NO_SPACE},
-    {EFBIG, KOR_RC_FILE_TOO_LARGE},
-    {EOVERFLOW, KOR_RC_FILE_TOO_LARGE},
-    {EIO, KOR_RC_IO_ERROR},
-    {EPIPE, KOR_RC_IO_ERROR},
-    {EINTR, KOR_RC_IO_ERROR}, // of close alone, which cannot be repeated: the last writes may not have arrived
-    {EBADF, KOR_RC_NOT_OPEN},
-    {ESPIPE, KOR_RC_NOT_SEEKABLE},
-    {EWOULDBLOCK, KOR_RC_LOCKED}, // descriptors are never non-blocking: only a lock answers so
-    {EBUSY, KOR_RC_BUSY},
-    {ETXTBSY, KOR_RC_BUSY},
-    {ENOMEM, TAV_RC_NO_MEMORY},
-    {ENOSYS, TAV_RC_NOT_SUPPORTED},
-    {EOPNOTSUPP, TAV_RC_NOT_SUPPORTED},
-    {EFAULT, TAV_RC_BAD_PARAM},
-};
-
-uint32_t codeOf(int error)
-{
-  for (const ErrorCode& known : kErrorCodes)
-    if (known.error == error) return known.code;
-  return KOR_RC_OS_ERROR;
-}
-
 /// The code of a failed transfer or lock: the descriptor is our own, so it is the direction that does not fit.
 uint32_t transferCodeOf(int error)
 {
-  return error == EBADF ? KOR_RC_WRONG_ACCESS : codeOf(error);
+  return error == EBADF ? KOR_RC_WRONG_ACCESS : codeOfSystemError(error);
 }
 
 /// Repeats a system call for as long as signals interrupt it.
@@ -96,11 +53,11 @@ uint32_t openNative(const char* pPath, const OpenMode& mode, intptr_t& file)
 {
   const auto permissions = static_cast<mode_t>(mode.permissions & 07777);
   const int opened = uninterrupted([&] { return ::open(pPath, flagsOf(mode), permissions); });
-  if (opened < 0) return codeOf(errno);
+  if (opened < 0) return codeOfSystemError(errno);
 
   // A folder can be opened for reading; only its reads would fail.
   struct stat status = {};
-  uint32_t code = ::fstat(opened, &status) == 0 ? TAV_RC_OK : codeOf(errno);
+  uint32_t code = ::fstat(opened, &status) == 0 ? TAV_RC_OK : codeOfSystemError(errno);
   if (code == TAV_RC_OK && S_ISDIR(status.st_mode)) code = KOR_RC_IS_FOLDER;
   if (code == TAV_RC_OK)
     file = opened;
@@ -112,7 +69,7 @@ uint32_t openNative(const char* pPath, const OpenMode& mode, intptr_t& file)
 uint32_t closeNative(intptr_t file)
 {
   // Never repeated: the descriptor is free after a failure, and may be another file's by then.
-  return ::close(descriptor(file)) == 0 ? TAV_RC_OK : codeOf(errno);
+  return ::close(descriptor(file)) == 0 ? TAV_RC_OK : codeOfSystemError(errno);
 }
 
 uint32_t readSome(intptr_t file, void* bytes, std::size_t length, std::size_t& done)
@@ -134,7 +91,7 @@ uint32_t writeSome(intptr_t file, const void* bytes, std::size_t length, std::si
 uint32_t seekNative(intptr_t file, int64_t offset, uint64_t& position)
 {
   const off_t landed = ::lseek(descriptor(file), offset, SEEK_SET);
-  if (landed < 0) return codeOf(errno);
+  if (landed < 0) return codeOfSystemError(errno);
   position = static_cast<uint64_t>(landed);
   return TAV_RC_OK;
 }
@@ -151,13 +108,13 @@ uint32_t lockNative(intptr_t file, bool exclusive, bool wait, bool /*held*/)
 uint32_t unlockNative(intptr_t file)
 {
   const int result = uninterrupted([&] { return ::flock(descriptor(file), LOCK_UN); });
-  return result == 0 ? TAV_RC_OK : codeOf(errno);
+  return result == 0 ? TAV_RC_OK : codeOfSystemError(errno);
 }
 
 uint32_t sizeNative(intptr_t file, uint64_t& size)
 {
   struct stat status = {};
-  if (::fstat(descriptor(file), &status) != 0) return codeOf(errno);
+  if (::fstat(descriptor(file), &status) != 0) return codeOfSystemError(errno);
   if (S_ISREG(status.st_mode))
   {
     size = static_cast<uint64_t>(status.st_size);
@@ -166,9 +123,9 @@ uint32_t sizeNative(intptr_t file, uint64_t& size)
 
   // Devices tell their size by their end only.
   const off_t here = ::lseek(descriptor(file), 0, SEEK_CUR);
-  if (here < 0) return codeOf(errno);
+  if (here < 0) return codeOfSystemError(errno);
   const off_t end = ::lseek(descriptor(file), 0, SEEK_END);
-  if (end < 0 || ::lseek(descriptor(file), here, SEEK_SET) != here) return codeOf(errno);
+  if (end < 0 || ::lseek(descriptor(file), here, SEEK_SET) != here) return codeOfSystemError(errno);
   size = static_cast<uint64_t>(end);
   return TAV_RC_OK;
 }

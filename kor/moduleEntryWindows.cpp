@@ -1,7 +1,4 @@
-#if !defined(WIN32_LEAN_AND_MEAN)
-#define WIN32_LEAN_AND_MEAN
-#endif
-#include <windows.h>
+#include "kor/windows.h"
 
 // The entry point of a dynamically loaded library of this project. It wants no calls for threads that come and go.
 extern "C" BOOL WINAPI DllMain(HINSTANCE instance, DWORD reason, LPVOID /*reserved*/)

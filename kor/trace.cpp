@@ -7,6 +7,7 @@
 #include <new>
 
 #include "kor/lock.h"
+#include "kor/shared.h"
 #include "tav/kor.h"
 
 extern "C" {
@@ -16,6 +17,7 @@ KORTraceCB* g_pWTCB = nullptr;
 namespace
 {
 using tav::kor::Lock;
+using tav::kor::store;
 
 class ActiveCall;
 
@@ -170,8 +172,8 @@ uint32_t korTraceStart(KORTraceSink sink, void* context)
   tracer.sink = sink;
   tracer.context = context;
   ++tracer.session;
-  std::atomic_ref<uint32_t>(controlBlock.enable).store(1);
-  std::atomic_ref<KORTraceCB*>(g_pWTCB).store(&controlBlock);
+  store(controlBlock.enable, uint32_t{1});
+  store(g_pWTCB, &controlBlock);
   return TAV_RC_OK;
 }
 
@@ -181,7 +183,7 @@ uint32_t korTraceStop(void)
   {
     const std::lock_guard<Lock> guard(tracer.lock);
     if (tracer.sink == nullptr) return KOR_RC_TRACE_INACTIVE;
-    std::atomic_ref<uint32_t>(controlBlock.enable).store(0);
+    store(controlBlock.enable, uint32_t{0});
     tracer.sink = nullptr;
     tracer.context = nullptr;
     session = tracer.session;

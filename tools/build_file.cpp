@@ -4,7 +4,7 @@
 #include <cstdio>
 #include <cstring>
 
-#include "tools/machine.h"
+#include "kor/host.h"
 #include "tools/report.h"
 #include "tools/source.h"
 
@@ -14,7 +14,7 @@ namespace tav::tool
 namespace
 {
 
-constexpr size_t kBuffer = 256 * 1024;
+constexpr size_t kBuffer = size_t{256} * 1024;
 
 void require(uint32_t code)
 {
@@ -53,12 +53,12 @@ void PatchFile::openOwn()
   own_ = true;
   temporary_ = openTemporary(file_);
   // Where an open file can be removed it is gone from now on, however the program ends.
-  if (std::remove(temporary_.c_str()) == 0)
+  if (kor::removeFile(temporary_))
   {
     temporary_.clear();
     return;
   }
-  removeOnInterrupt(temporary_);
+  kor::removeOnInterrupt(temporary_);
 }
 
 PatchFile::~PatchFile()
@@ -66,8 +66,8 @@ PatchFile::~PatchFile()
   file_.close();
   if (!temporary_.empty())
   {
-    std::remove(temporary_.c_str());
-    removeOnInterrupt({});
+    kor::removeFile(temporary_);
+    kor::removeOnInterrupt({});
   }
 }
 
@@ -93,7 +93,7 @@ void PatchFile::append(std::span<const uint8_t> bytes)
 
 void PatchFile::appendZeros(uint64_t count)
 {
-  constexpr uint64_t block = 64 * 1024;
+  constexpr uint64_t block = uint64_t{64} * 1024;
   const std::string zeros(static_cast<size_t>(std::min(count, block)), '\0');
   while (count != 0)
   {

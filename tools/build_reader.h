@@ -113,7 +113,7 @@ private:
 
   Level& top() { return levels_.back(); }
   void push(Where where);
-  void scalar(Scalar value);
+  void scalar(const Scalar& value);
   void scalarIn(Level& level, const Scalar& value);
   void documentKey(const std::string& name);
   void documentValue(const std::string& name, const Scalar& value);

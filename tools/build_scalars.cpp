@@ -5,6 +5,7 @@
 #include <cstring>
 #include <utility>
 
+#include "kor/host.h"
 #include "tools/build_reader.h"
 #include "tools/json_text.h"
 #include "tools/report.h"
@@ -16,8 +17,8 @@ namespace tav::tool
 namespace
 {
 
-constexpr size_t kLong = 1024 * 1024; ///< bytes of a value that are kept before they are written
-constexpr size_t kBuffer = 64 * 1024;
+constexpr size_t kLong = size_t{1024} * 1024; ///< bytes of a value that are kept before they are written
+constexpr size_t kBuffer = size_t{64} * 1024;
 
 template<class Number>
 Number wholeNumber(const std::string& name, const Scalar& value)
@@ -117,7 +118,7 @@ bool DocumentReader::binary(binary_t&)
   return false; // no part of JSON texts
 }
 
-void DocumentReader::scalar(Scalar value)
+void DocumentReader::scalar(const Scalar& value)
 {
   if (levels_.empty())
   {
@@ -408,7 +409,7 @@ void DocumentReader::dateField(const std::string& name, const Scalar& value)
 }
 
 TextSource::TextSource(const std::string& path)
-    : name_(path == "-" ? "standard input" : path), file_(path == "-" ? stdin : std::fopen(path.c_str(), "rb")),
+    : name_(path == "-" ? "standard input" : path), file_(path == "-" ? stdin : kor::openStream(path, "rb")),
       standard_(path == "-"), buffer_(kBuffer)
 {
   if (file_ == nullptr)

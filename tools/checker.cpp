@@ -16,8 +16,8 @@ using namespace tav::layout;
 namespace
 {
 
-constexpr uint64_t kMostZeros = 2 * 1024 * 1024; ///< two of the largest pages that a file is written in
-constexpr uint64_t kMostNested = 4000;           ///< groups that the library can have open at a time
+constexpr uint64_t kMostZeros = uint64_t{2} * 1024 * 1024; ///< two of the largest pages that a file is written in
+constexpr uint64_t kMostNested = 4000;                     ///< groups that the library can have open at a time
 
 bool sizeSuits(const TAVHeader& header)
 {

@@ -1,10 +1,10 @@
 // tav build: a stream from JSON.
 #include <cstdio>
 
+#include "kor/host.h"
 #include "tools/build_encoder.h"
 #include "tools/build_file.h"
 #include "tools/build_reader.h"
-#include "tools/machine.h"
 #include "tools/options.h"
 #include "tools/output.h"
 #include "tools/report.h"
@@ -26,7 +26,7 @@ int run(const Invocation& invocation)
 {
   const std::string input = invocation.arguments().empty() ? "-" : invocation.arguments().front();
   const std::string output = invocation.text("--output", "-");
-  if (output == "-" && isTerminal(stdout))
+  if (output == "-" && kor::isTerminal(stdout))
   {
     throw Failure("build: a stream is no text for a terminal", "-o FILE writes it to a file");
   }

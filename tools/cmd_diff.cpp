@@ -1,14 +1,13 @@
 // tav diff: what two streams have not in common.
 #include <algorithm>
-#include <charconv>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
 
+#include "kor/host.h"
 #include "tools/diff_align.h"
 #include "tools/diff_index.h"
 #include "tools/json_text.h"
-#include "tools/machine.h"
 #include "tools/options.h"
 #include "tools/output.h"
 #include "tools/report.h"
@@ -21,8 +20,8 @@ namespace
 {
 
 constexpr size_t kMaxChildren = 200'000; ///< of one group that are compared at once
-constexpr uint64_t kPiece = 64 * 1024;
-constexpr uint64_t kMaxJsonValue = 64 * 1024;
+constexpr uint64_t kPiece = uint64_t{64} * 1024;
+constexpr uint64_t kMaxJsonValue = uint64_t{64} * 1024;
 
 /// How far apart two numbers may be: "10", "0.5%".
 struct Tolerance
@@ -35,8 +34,11 @@ struct Tolerance
     Tolerance tolerance;
     tolerance.percent = text.ends_with('%');
     text.resize(text.size() - (tolerance.percent ? 1 : 0));
-    const auto result = std::from_chars(text.data(), text.data() + text.size(), tolerance.amount);
-    if (result.ec != std::errc() || result.ptr != text.data() + text.size() || !(tolerance.amount >= 0))
+    // Not every standard library has from_chars for this type; strtod takes blanks, hexadecimal digits and words too.
+    const bool plain = !text.empty() && text.find_first_not_of("0123456789.e-") == std::string::npos;
+    char* end = nullptr;
+    tolerance.amount = std::strtod(text.c_str(), &end);
+    if (!plain || end != text.c_str() + text.size() || !(tolerance.amount >= 0))
     {
       throw Failure("diff: --tolerance: '" + text + "' is no number", "10 is, and 0.5%");
     }
@@ -60,7 +62,8 @@ public:
     const std::string when = invocation.text("--color", "auto");
     const char* const noColour = std::getenv("NO_COLOR");
     colour_ = !json_ &&
-              (when == "always" || (when != "never" && isTerminal(stdout) && (noColour == nullptr || *noColour == 0)));
+              (when == "always" ||
+               (when != "never" && kor::isTerminal(stdout) && (noColour == nullptr || *noColour == 0)));
   }
 
   /// Compares everything; true when there is a difference.

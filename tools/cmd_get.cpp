@@ -20,7 +20,7 @@ namespace tav::tool
 namespace
 {
 
-constexpr uint64_t kMostText = 1024 * 1024; ///< longer values are copied piece by piece
+constexpr uint64_t kMostText = uint64_t{1024} * 1024; ///< longer values are copied piece by piece
 
 /// A path with what was found so far.
 struct Wanted

@@ -133,7 +133,8 @@ void Dumper::rows(uint64_t offset, uint64_t length)
     zeroBefore = zero;
     starred = false;
     char row[128];
-    int at = std::snprintf(row, sizeof row, "%08llx: ", static_cast<unsigned long long>(offset + done));
+    const unsigned long long place = offset + done;
+    int at = std::snprintf(row, sizeof row, "%08llx: ", place);
     for (size_t i = 0; i < kRow; ++i)
     {
       at += i < count ? std::snprintf(row + at, sizeof row - static_cast<size_t>(at), i % 2 == 1 ? "%02x " : "%02x",

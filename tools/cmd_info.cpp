@@ -21,8 +21,8 @@ namespace
 
 // What is counted without --full. Large files are answered at once, with the part that was counted.
 constexpr uint64_t kNodes = 100'000;
-constexpr uint64_t kRead = 8 * 1024 * 1024;
-constexpr uint64_t kSearch = 4 * 1024 * 1024;
+constexpr uint64_t kRead = uint64_t{8} * 1024 * 1024;
+constexpr uint64_t kSearch = uint64_t{4} * 1024 * 1024;
 
 struct Tally
 {

@@ -2,8 +2,8 @@
 #include <filesystem>
 #include <memory>
 
+#include "kor/host.h"
 #include "tav/byteOrder.h"
-#include "tools/machine.h"
 #include "tools/options.h"
 #include "tools/output.h"
 #include "tools/report.h"
@@ -85,7 +85,7 @@ private:
   bool pairs_;
 };
 
-void describe(SnapshotWriter& writer, const MachineFacts& facts)
+void describe(SnapshotWriter& writer, const kor::MachineFacts& facts)
 {
   writer.open(TAV_ELM_CMN_SYSTEM);
   writer.open(TAV_ELM_CMN_HOST);
@@ -122,7 +122,7 @@ bool isSwapped(const Invocation& invocation)
 
 int run(const Invocation& invocation)
 {
-  constexpr uint64_t room = 256 * 1024;
+  constexpr uint64_t room = uint64_t{256} * 1024;
   const bool narrow = invocation.has("--hdr32");
   if (narrow && invocation.has("--eye-size"))
   {
@@ -130,7 +130,7 @@ int run(const Invocation& invocation)
                   "only 64-bit headers can announce an eye/size pair");
   }
   Output out(invocation.text("--output", "-"), invocation.has("--force"));
-  if (invocation.text("--output", "-") == "-" && isTerminal(stdout))
+  if (invocation.text("--output", "-") == "-" && kor::isTerminal(stdout))
   {
     throw Failure("snapshot: a stream is no text for a terminal", "-o FILE writes it to a file");
   }
@@ -145,7 +145,7 @@ int run(const Invocation& invocation)
   const auto closing = [](TAVHandle* open) { tavTermHandle(&open); };
   const std::unique_ptr<TAVHandle, decltype(closing)> closer(handle, closing);
   SnapshotWriter writer(handle, narrow, invocation.has("--eye-size"));
-  describe(writer, describeMachine());
+  describe(writer, kor::describeMachine());
   out.write(std::span<const uint8_t>(block.get(), static_cast<size_t>(handle->streamBytes)));
   out.commit();
   return kFine;

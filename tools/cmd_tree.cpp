@@ -3,8 +3,8 @@
 #include <cstdio>
 #include <cstdlib>
 
+#include "kor/host.h"
 #include "tools/locate.h"
-#include "tools/machine.h"
 #include "tools/options.h"
 #include "tools/output.h"
 #include "tools/path.h"
@@ -36,7 +36,7 @@ Colours coloursFor(const std::string& when)
 {
   const char* const noColour = std::getenv("NO_COLOR");
   const bool wanted =
-      when == "always" || (when != "never" && isTerminal(stdout) && (noColour == nullptr || *noColour == 0));
+      when == "always" || (when != "never" && kor::isTerminal(stdout) && (noColour == nullptr || *noColour == 0));
   return wanted ? Colours{"\033[2m", "\033[1m", "\033[36m", "\033[31m", "\033[0m"} : Colours{};
 }
 
@@ -45,7 +45,7 @@ class TreePrinter
 public:
   TreePrinter(const Invocation& invocation, Stream& stream)
       : stream_(stream), out_("-"), colours_(coloursFor(invocation.text("--color", "auto"))),
-        width_(static_cast<size_t>(terminalWidth().value_or(0))), paths_(invocation.has("--paths")),
+        width_(static_cast<size_t>(kor::terminalWidth().value_or(0))), paths_(invocation.has("--paths")),
         maxDepth_(invocation.number("--depth").value_or(kNoOffset))
   {
     if (const auto width = invocation.number("--width"))
@@ -92,7 +92,7 @@ private:
   void line(const Walker& walker, const Event& event, uint64_t base);
   std::string label(const Walker& walker, const Event& event, uint64_t level) const;
   std::string remarks(const Node& node) const;
-  void put(uint64_t offset, const std::string& size, const std::string& text, const std::string& label,
+  void put(uint64_t offset, const std::string& size, const std::string& text, const std::string& bad,
            const std::string& type, const std::string& value);
 
   Stream& stream_;
@@ -154,7 +154,7 @@ void TreePrinter::line(const Walker& walker, const Event& event, uint64_t base)
     put(event.offset, std::to_string(event.length), label(walker, event, level), "damaged", "", event.reason);
     return;
   }
-  if (event.what == What::unread || (event.what == What::zeros && event.length > 2 * 1024 * 1024))
+  if (event.what == What::unread || (event.what == What::zeros && event.length > uint64_t{2} * 1024 * 1024))
   {
     put(event.offset, std::to_string(event.length), "", event.what == What::zeros ? "zeros" : "unread", "", "");
     return;

@@ -21,7 +21,7 @@ namespace tav::tool
 namespace
 {
 
-constexpr size_t kPiece = 48 * 1024;
+constexpr size_t kPiece = size_t{48} * 1024;
 constexpr uint64_t kMaxIndent = 32;
 constexpr uint64_t kMaxNumber = 64; ///< bytes of the longest value that is one number or date
 

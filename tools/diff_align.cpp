@@ -10,7 +10,7 @@ namespace tav::tool
 namespace
 {
 
-constexpr size_t kMaxTable = 4 * 1024 * 1024; ///< cells of the table of longest common parts
+constexpr size_t kMaxTable = size_t{4} * 1024 * 1024; ///< cells of the table of longest common parts
 
 using Places = std::vector<size_t>; ///< in the list of children
 
@@ -76,13 +76,12 @@ private:
   void alignByKey(const Places& a, const Places& b)
   {
     std::unordered_map<uint64_t, Places> byKey;
-    for (auto place = b.rbegin(); place != b.rend(); ++place)
-    {
-      if (second_[*place].key != 0)
+    std::for_each(b.rbegin(), b.rend(), [&](size_t place) {
+      if (second_[place].key != 0)
       {
-        byKey[second_[*place].key].push_back(*place);
+        byKey[second_[place].key].push_back(place);
       }
-    }
+    });
     for (const size_t place : a)
     {
       const auto found = byKey.find(first_[place].key);

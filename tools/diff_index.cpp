@@ -17,7 +17,7 @@ namespace
 
 constexpr uint64_t kRow = sizeof(Row);
 constexpr size_t kWindow = 256; ///< rows read at once
-constexpr uint64_t kPiece = 64 * 1024;
+constexpr uint64_t kPiece = uint64_t{64} * 1024;
 constexpr size_t kMaxSteps = 64; ///< deeper nodes are named by their offset
 
 /// Elements by which groups of one kind are told apart, with their values.
@@ -46,6 +46,7 @@ DiffIndex::DiffIndex(Stream& stream, const std::vector<Path>& ignored)
     : stream_(stream)
 {
   std::vector<PathMatcher> matchers;
+  matchers.reserve(ignored.size());
   for (const Path& path : ignored)
   {
     matchers.emplace_back(path);
@@ -240,13 +241,12 @@ std::string DiffIndex::path(uint64_t number)
     steps.front().ordinal = 0; // makes it be named by its offset
     text = "/**";
   }
-  for (auto step = steps.rbegin(); step != steps.rend(); ++step)
-  {
-    Node node = nodeOf(*step);
-    node.ordinal = step->ordinal;
-    node.header.nodeOffset = step->offset;
+  std::for_each(steps.rbegin(), steps.rend(), [&text](const auto& step) {
+    Node node = nodeOf(step);
+    node.ordinal = step.ordinal;
+    node.header.nodeOffset = step.offset;
     appendStep(text, node);
-  }
+  });
   return text.empty() ? "/" : text; // damaged bytes have the path of the group around them
 }
 

@@ -64,7 +64,7 @@ private:
   };
 
   void add(const Event& event, std::vector<PathMatcher>& matchers);
-  void addData(const Row& row);
+  void addData(const Row& given);
   void endGroup();
   Row rowOf(const Event& event) const;
   uint64_t payloadHash(const Row& row);

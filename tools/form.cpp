@@ -16,9 +16,9 @@ namespace
 {
 
 constexpr uint64_t kMaxNodes = 2000;
-constexpr uint64_t kMaxRead = 512 * 1024;   ///< bytes fetched from the file for one way of reading
-constexpr uint64_t kMaxSearch = 128 * 1024; ///< bytes looked through for nodes where the first one is whole
-constexpr uint64_t kMaxSearchDamaged = 4 * 1024 * 1024;
+constexpr uint64_t kMaxRead = uint64_t{512} * 1024;   ///< bytes fetched from the file for one way of reading
+constexpr uint64_t kMaxSearch = uint64_t{128} * 1024; ///< bytes looked through for nodes where the first one is whole
+constexpr uint64_t kMaxSearchDamaged = uint64_t{4} * 1024 * 1024;
 
 /// What one way of reading the bytes finds in them.
 struct Trial
@@ -190,7 +190,7 @@ void explainPadding(const std::vector<Trial>& trials, std::vector<std::string>& 
   }
   if (best.wide != 0 && !best.form.aligned)
   {
-    because.push_back("no 64-bit header announces padding");
+    because.emplace_back("no 64-bit header announces padding");
     return;
   }
   const auto other = std::find_if(trials.begin(), trials.end(), [&](const Trial& t) {
@@ -202,9 +202,9 @@ void explainPadding(const std::vector<Trial>& trials, std::vector<std::string>& 
     return;
   }
   const bool same = other->signature == best.signature;
-  because.push_back(same                ? "with and without padding to 8 the same nodes are found"
-                    : best.form.aligned ? "nodes are found on the way only when payloads are padded to 8"
-                                        : "nodes are found on the way only when payloads are not padded");
+  because.emplace_back(same                ? "with and without padding to 8 the same nodes are found"
+                       : best.form.aligned ? "nodes are found on the way only when payloads are padded to 8"
+                                           : "nodes are found on the way only when payloads are not padded");
 }
 
 std::vector<std::string> explain(const std::vector<Trial>& trials, const Recognition& result)

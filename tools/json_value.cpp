@@ -15,8 +15,8 @@ using namespace tav::layout;
 namespace
 {
 
-constexpr size_t kPiece = 48 * 1024;           ///< bytes of a payload in one string
-constexpr size_t kBlock = 4 * 1024;            ///< zeros are counted by blocks of this length
+constexpr size_t kPiece = size_t{48} * 1024;   ///< bytes of a payload in one string
+constexpr size_t kBlock = size_t{4} * 1024;    ///< zeros are counted by blocks of this length
 constexpr uint64_t kExact = uint64_t{1} << 53; ///< whole numbers up to here are exact in a double
 
 std::string_view asText(std::span<const uint8_t> bytes)

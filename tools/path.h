@@ -56,7 +56,7 @@ public:
   const std::vector<Step>& steps() const { return steps_; }
 
 private:
-  void addStep(std::string_view step);
+  void addStep(std::string_view text);
   void addIndex(std::string_view index, Step& step) const;
   [[noreturn]] void fail(const std::string& sentence, std::string hint = {}) const;
 

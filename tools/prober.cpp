@@ -15,7 +15,7 @@ namespace
 {
 
 constexpr uint64_t kMargin = kHeaderSize64; ///< bytes that a test at one offset looks at
-constexpr uint64_t kWindow = 64 * 1024;
+constexpr uint64_t kWindow = uint64_t{64} * 1024;
 
 uint16_t load16(const uint8_t* bytes, bool swap)
 {

@@ -6,7 +6,7 @@
 
 #include <CLI/CLI.hpp>
 
-#include "tools/machine.h"
+#include "kor/host.h"
 #include "tools/options.h"
 #include "tools/output.h"
 #include "tools/report.h"
@@ -196,10 +196,10 @@ int dispatch(const std::vector<std::string>& words)
 
 int runProgram(int argc, char** argv)
 {
-  prepareStandardStreams();
+  kor::prepareStandardStreams();
   try
   {
-    return dispatch(std::vector<std::string>(argv + std::min(argc, 1), argv + argc));
+    return dispatch(kor::commandLine(argc, argv));
   }
   catch (const Failure& failure)
   {

@@ -1,6 +1,5 @@
 #include "tools/rules.h"
 
-#include <algorithm>
 #include <array>
 
 #include <nlohmann/json.hpp>
@@ -160,8 +159,14 @@ const Rule& ruleOf(RuleId rule)
 
 const Rule* findRule(std::string_view id)
 {
-  const auto found = std::find_if(kRules.begin(), kRules.end(), [&](const Rule& rule) { return rule.id == id; });
-  return found == kRules.end() ? nullptr : &*found;
+  for (const Rule& rule : kRules)
+  {
+    if (rule.id == id)
+    {
+      return &rule;
+    }
+  }
+  return nullptr;
 }
 
 std::string rulesMarkdown()
@@ -176,9 +181,9 @@ std::string rulesMarkdown()
       "| rule | | code | what |\n| --- | --- | --- | --- |\n";
   for (const Rule& rule : kRules)
   {
-    const std::string id(rule.id);
-    text += "| [" + id + "](#" + id + ") | " + (rule.note ? "note" : "defect") + " | `" + korCodeName(rule.code) +
-            "` | " + std::string(rule.what) + " |\n";
+    text.append("| [").append(rule.id).append("](#").append(rule.id).append(") | ");
+    text.append(rule.note ? "note" : "defect").append(" | `").append(korCodeName(rule.code)).append("` | ");
+    text.append(rule.what).append(" |\n");
   }
   for (const Rule& rule : kRules)
   {

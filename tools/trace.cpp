@@ -2,6 +2,7 @@
 
 #include <algorithm>
 
+#include "kor/host.h"
 #include "tav/kor.h"
 #include "tav/probes.h"
 #include "tools/report.h"
@@ -59,7 +60,7 @@ TraceFile::TraceFile(const Invocation& invocation)
     }
     return;
   }
-  filter_.file = path == "-" ? stderr : std::fopen(path.c_str(), "w");
+  filter_.file = path == "-" ? stderr : kor::openStream(path, "wb");
   if (filter_.file == nullptr)
   {
     throw Failure("the trace file '" + path + "' cannot be written");

@@ -126,14 +126,26 @@ std::string scalarText(uint16_t type, std::span<const uint8_t> bytes, bool quote
   }
 }
 
-} // namespace
-
-std::vector<uint8_t> payloadBytes(ByteSource& source, const Form& form, const Node& node, uint64_t most)
+std::vector<uint8_t> storedBytes(ByteSource& source, const Node& node, uint64_t most)
 {
   const uint64_t size = std::min(node.size(), node.limit - std::min(node.limit, node.payloadOffset()));
   // Never more than the file has, whatever a header claims.
   std::vector<uint8_t> bytes(static_cast<size_t>(std::min({most, size, source.size()})));
   bytes.resize(source.read(node.payloadOffset(), bytes));
+  return bytes;
+}
+
+/// Whether the bytes are shown as they are stored, so that they read the same on every machine.
+bool isNoValue(const Node& node)
+{
+  return !typeInfo(node.type()).known || !sizeSuits(node.type(), node.size());
+}
+
+} // namespace
+
+std::vector<uint8_t> payloadBytes(ByteSource& source, const Form& form, const Node& node, uint64_t most)
+{
+  std::vector<uint8_t> bytes = storedBytes(source, node, most);
   const SwapRule rule = typeInfo(node.type()).swapRule;
   uint64_t prefix = form.swapped ? swappedPrefix(rule, bytes.size()) : 0;
   if (rule == SwapRule::one128 && node.size() != 16)
@@ -154,15 +166,13 @@ std::string valueText(ByteSource& source, const Form& form, const Node& node, ui
   {
     return {};
   }
-  const bool cut = node.size() > most;
-  std::vector<uint8_t> bytes = payloadBytes(source, form, node, std::max<uint64_t>(most, 16));
-  const uint16_t type = node.type();
-  const bool suits = typeInfo(type).known && sizeSuits(type, node.size());
-  if (!suits)
+  const uint64_t wanted = std::max<uint64_t>(most, 16);
+  if (isNoValue(node))
   {
-    return hexText(bytes) + (cut ? " ..." : "");
+    return hexText(storedBytes(source, node, wanted)) + (node.size() > most ? " ..." : "");
   }
-  return scalarText(type, bytes, true) + (node.size() > bytes.size() ? " ..." : "");
+  const std::vector<uint8_t> bytes = payloadBytes(source, form, node, wanted);
+  return scalarText(node.type(), bytes, true) + (node.size() > bytes.size() ? " ..." : "");
 }
 
 std::optional<std::string> plainText(ByteSource& source, const Form& form, const Node& node, uint64_t most)
@@ -171,12 +181,11 @@ std::optional<std::string> plainText(ByteSource& source, const Form& form, const
   {
     return std::nullopt;
   }
-  const std::vector<uint8_t> bytes = payloadBytes(source, form, node, most);
-  if (!typeInfo(node.type()).known || !sizeSuits(node.type(), node.size()))
+  if (isNoValue(node))
   {
-    return hexText(bytes);
+    return hexText(storedBytes(source, node, most));
   }
-  return scalarText(node.type(), bytes, false);
+  return scalarText(node.type(), payloadBytes(source, form, node, most), false);
 }
 
 std::string typeText(uint16_t type)

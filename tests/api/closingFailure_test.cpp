@@ -87,7 +87,7 @@ TEST(CloseHeaderFailure, OfTheSizeAtTheEndOfTheBlockHandsItsCodeUp)
 
 TEST(CloseHeaderFailure, OfTheEndElementKeepsTheSizeThatWasWritten)
 {
-  StreamWriter writer({}, 16 + 32); // the end element would end at the block's end
+  StreamWriter writer(lowFirst(), 16 + 32); // the end element would end at the block's end
   writer.add(group64(kRoot, TAV_TYPE_HEADER64, TAV_INFO_EYE_SIZE));
   TraceLog trace;
   EXPECT_EQ(tavCloseHeader(0, writer.handle()), TAV_RC_END_OF_STORAGE);

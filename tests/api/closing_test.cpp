@@ -239,7 +239,7 @@ TEST_P(CloseHeader, AllowsAnotherRootBehindTheFirst)
 
 TEST(CloseHeaderSize, Of32BitsIsCut)
 {
-  StreamWriter writer;
+  StreamWriter writer(lowFirst());
   writer.add(group32(kRoot));
   writer.handle()->streamBytes = 8 + 0x500000007;
   EXPECT_EQ(tavCloseHeader(0, writer.handle()), TAV_RC_OK);
@@ -249,7 +249,7 @@ TEST(CloseHeaderSize, Of32BitsIsCut)
 
 TEST(CloseHeaderSize, Of64BitsIsNotCut)
 {
-  StreamWriter writer;
+  StreamWriter writer(lowFirst());
   writer.add(group64(kRoot));
   writer.handle()->streamBytes = 16 + 0x500000007;
   EXPECT_EQ(tavCloseHeader(0, writer.handle()), TAV_RC_OK);

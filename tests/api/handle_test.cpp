@@ -415,8 +415,8 @@ TEST_F(HandleTest, TermWritesWhatTheRingStillHolds)
   EXPECT_TRUE(paged.bytes.empty());
   ASSERT_EQ(tavTermHandle(&handle), TAV_RC_OK);
   ASSERT_GE(paged.bytes.size(), 16U);
-  EXPECT_EQ(paged.bytes[12], 2U);
-  EXPECT_EQ(paged.bytes[14], 1U);
+  EXPECT_EQ(paged.bytes[kBigEndianHost ? 13 : 12], 2U);
+  EXPECT_EQ(paged.bytes[kBigEndianHost ? 15 : 14], 1U);
 }
 
 TEST_F(HandleTest, ResetReturnsAWriterOverMemoryToItsBeginning)

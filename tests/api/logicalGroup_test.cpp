@@ -1,7 +1,6 @@
+#include <cstdlib>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
-
-#include <unistd.h>
 
 #include "support/failingNew.h"
 #include "support/nestedGroups.h"
@@ -199,7 +198,7 @@ TEST_P(FindLogicalGroup, TracesEachLevelThatItSearches)
     if (record.kind == KOR_TRACE_VAR && record.point == 100)
     {
       ASSERT_EQ(record.items.size(), 3U);
-      const auto level = static_cast<uint32_t>(record.items[0][0]);
+      const auto level = static_cast<uint32_t>(record.items[0][kBigEndianHost ? 3 : 0]);
       EXPECT_THAT(record.items, ElementsAre(bytesOf(level), bytesOf(uint16_t{0}), bytesOf(uint32_t{10 * (level + 1)})));
       levels += static_cast<char>('0' + level);
     }
@@ -467,7 +466,7 @@ struct Rounds
     }
     if (*static_cast<const uint32_t*>(record->pItems[0].pData) != 0)
     {
-      _exit(kWrongLevel);
+      std::_Exit(kWrongLevel);
     }
     ++rounds.count;
     if (rounds.count == kSettled)
@@ -476,7 +475,7 @@ struct Rounds
     }
     if (rounds.count == kMany)
     {
-      _exit(allocations::live() == rounds.settled ? kGoesRound : kMemoryGrows);
+      std::_Exit(allocations::live() == rounds.settled ? kGoesRound : kMemoryGrows);
     }
   }
 };

@@ -89,14 +89,15 @@ TEST_P(AfterOpenGroup, AGroupOfAnotherSizeIsNotTheReference)
 
 TEST_P(AfterOpenGroup, APairThatLeadsBeforeTheStreamEndsTheStep)
 {
-  rows.bytes[88 + 8 + (GetParam().swap ? 0 : 7)] = 0x10;
+  rows.bytes[88 + 8 + (GetParam().swap != kBigEndianHost ? 0 : 7)] = 0x10;
   EXPECT_EQ(next(&root, &group), TAV_RC_NO_MEMORY);
   EXPECT_EQ(failures(), one(60, TAV_RC_NO_MEMORY));
 }
 
 TEST_P(AfterOpenGroup, ANodeThatCannotBeReadEndsTheStep)
 {
-  rows.bytes[32 + (GetParam().swap ? 0 : 7)] = 0x10; // the size of the element that the first pair leads to
+  // the size of the element that the first pair leads to
+  rows.bytes[32 + (GetParam().swap != kBigEndianHost ? 0 : 7)] = 0x10;
   EXPECT_EQ(next(&root, &group), TAV_RC_DATA_TOO_LARGE);
   EXPECT_EQ(failures(), one(60, TAV_RC_DATA_TOO_LARGE));
 }

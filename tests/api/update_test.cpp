@@ -231,7 +231,7 @@ INSTANTIATE_TEST_SUITE_P(Rows, UpdateClaim, ::testing::Combine(::testing::Values
 
 TEST(UpdateElementHeader, MayDifferInItsInfo)
 {
-  StreamWriter writer;
+  StreamWriter writer(lowFirst());
   writer.add(group64(kRoot));
   Element node = u32(kCpu, 7, true, 0x123);
   node.header = writer.add(node);
@@ -262,7 +262,7 @@ TEST(UpdateElementMode, OfUpdatingChangesAStreamThatIsThere)
   Bytes block = hex("14 00 00 00 00 00 00 00 00 00 00 00 02 00 14 00"
                     "04 00 00 00 00 00 00 00 00 00 00 00 37 00 CE EA 01 00 00 00 00");
   TAVSSMemory storage(block.data(), block.size());
-  Handle handle(storage, TAV_OPT_UPDATE, {});
+  Handle handle(storage, TAV_OPT_UPDATE, lowFirst());
   Bytes payload{9, 9, 9, 9};
   TAVHeaderData data{header64(4, TAV_TYPE_UINT32, kCpu, 0, 16), payload.data(), 4, 0};
   EXPECT_EQ(tavUpdateElement(0, handle.get(), &data), TAV_RC_OK);
@@ -406,7 +406,7 @@ TEST(UpdateElementRoom, EndsBeforeTheLastByteOfTheBlock)
   // The second node ends at the block's end: it can be read, not updated.
   Bytes block = hex("02 00 00 00 35 00 CE EA 01 02 02 00 00 00 35 00 CE EA 03 04");
   TAVSSMemory storage(block.data(), block.size());
-  Handle handle(storage, TAV_OPT_UPDATE, {});
+  Handle handle(storage, TAV_OPT_UPDATE, lowFirst());
   Bytes payload{9, 9};
   TAVHeaderData last{header32(2, TAV_TYPE_UINT16, kCpu, 10), payload.data(), 2, 0};
   TraceLog trace;
@@ -422,7 +422,7 @@ TEST(UpdateElementRoom, IsNeededByANodeOfNoBytesToo)
 {
   Bytes block = hex("00 00 00 00 65 00 61 EA");
   TAVSSMemory storage(block.data(), block.size());
-  Handle handle(storage, TAV_OPT_UPDATE, {});
+  Handle handle(storage, TAV_OPT_UPDATE, lowFirst());
   uint8_t nothing = 0;
   TAVHeaderData data{header32(0, TAV_TYPE_BINARY, kBlob), &nothing, 0, 0};
   EXPECT_EQ(tavUpdateElement(0, handle.get(), &data), TAV_RC_END_OF_STORAGE);

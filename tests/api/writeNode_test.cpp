@@ -91,7 +91,7 @@ TEST(WriteNodeHeader, TakesAnyOptionsAndAnyMode)
 
 TEST(WriteNodeHeader, Of32BitsCarriesNoAlignmentBit)
 {
-  StreamWriter writer({.align = true});
+  StreamWriter writer(lowFirst({.align = true}));
   TAVHeader header = header32(0, TAV_TYPE_HEADER32, kBlob);
   uint64_t position = 0;
   ASSERT_EQ(tavWriteNodeInt(0, writer.handle(), &header, &position, nullptr, 0), TAV_RC_OK);

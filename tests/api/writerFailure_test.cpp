@@ -164,7 +164,7 @@ TEST(AddElementRoom, OfASizeThatPasses64BitsIsRefused)
 TEST(AddElementRoom, DoesNotCountThePairSoThatHeaderAndPayloadStay)
 {
   uint8_t bytes[4] = {1, 2, 3, 4};
-  StreamWriter writer({}, 16 + 20 + 16); // the pair would end at the block's end
+  StreamWriter writer(lowFirst(), 16 + 20 + 16); // the pair would end at the block's end
   writer.add(group64(kRoot));
   TraceLog trace;
   EXPECT_EQ(failToAdd(writer, header64(4, TAV_TYPE_BINARY, kBlob, TAV_INFO_EYE_SIZE), bytes, 4),

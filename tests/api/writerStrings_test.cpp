@@ -159,7 +159,7 @@ TEST(AddStringText, OfAnEmptyAsciiStringMayBeMissing)
 
 TEST(AddStringText, OfAnEmptyUtf8StringIsTheCodePageAndTwoBytes)
 {
-  StreamWriter writer;
+  StreamWriter writer(lowFirst());
   writer.add(group64(kRoot));
   Bytes text{0x31, 0x32};
   TAVHeaderData data = textOf(header64(0, TAV_TYPE_UTF8_STRING, kName), text);
@@ -332,7 +332,7 @@ TEST(AddStringRoom, ForTheCountedBytesIsCheckedBeforeAnyByte)
 
 TEST(AddStringRoom, ForTheUncountedBytesIsMissedAfterTheHeader)
 {
-  StreamWriter writer({}, 16 + 16 + 5 + 2);
+  StreamWriter writer(lowFirst(), 16 + 16 + 5 + 2);
   writer.add(group64(kRoot));
   Bytes text = bytesOfText("abcde");
   TAVHeaderData data = textOf(header64(3, TAV_TYPE_UTF8_STRING, kName), text);

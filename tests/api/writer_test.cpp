@@ -257,7 +257,7 @@ Added add(StreamWriter& writer, TAVHeader header, uint8_t* payload, uint64_t pay
 TEST(AddElementPayload, OfNoBytesIsABareHeader)
 {
   uint8_t nothing = 0;
-  StreamWriter writer;
+  StreamWriter writer(lowFirst());
   writer.add(group64(kRoot));
   const Added added = add(writer, header64(0, TAV_TYPE_BINARY, kBlob), &nothing, 0);
   EXPECT_EQ(added.code, TAV_RC_OK);
@@ -269,7 +269,7 @@ TEST(AddElementPayload, OfNoBytesIsABareHeader)
 TEST(AddElementPayload, OfNoBytesIsFollowedByItsPair)
 {
   uint8_t nothing = 0;
-  StreamWriter writer;
+  StreamWriter writer(lowFirst());
   writer.add(group64(kRoot));
   ASSERT_EQ(add(writer, header64(0, TAV_TYPE_BINARY, kBlob, TAV_INFO_EYE_SIZE), &nothing, 0).code, TAV_RC_OK);
   const Bytes all = writer.bytes();
@@ -315,7 +315,7 @@ TEST(AddElementPayload, OfAGroupIsNotWritten)
 
 TEST(AddElementPayload, OfAGroupMayBeShorterThanItsSize)
 {
-  StreamWriter writer;
+  StreamWriter writer(lowFirst());
   const Added added = add(writer, header64(100, TAV_TYPE_HEADER64, kRoot), nullptr, 7);
   EXPECT_EQ(added.code, TAV_RC_OK);
   EXPECT_EQ(toHex(writer.bytes()), rows("64 00 00 00 00 00 00 00 00 00 00 00 02 00 14 00"));

@@ -27,7 +27,12 @@ class CheckRooms(unittest.TestCase):
             ("format/layout.h", "#include <cstdint>"),
             ("kor/filePosix.cpp", "#include <sys/file.h>"),
             ("include/tav/byteOrder.h", "#if __BYTE_ORDER__ == __ORDER_LITTLE_ENDIAN__"),
-            ("tools/machine.cpp", "#include <sys/utsname.h>"),
+            ("tools/output.cpp", '#include "kor/host.h"'),
+            ("kor/windows.h", "#include <windows.h>"),
+            ("kor/hostWindows.cpp", "#include <io.h>"),
+            ("tests/kor/childPosix.h", "#include <sys/wait.h>"),
+            ("tests/support/platformWindows.cpp", "#include <psapi.h>"),
+            ("tests/kor/filePosix_test.cpp", "#if defined(__SANITIZE_THREAD__)"),
             ("tools/options.cpp", "#include <CLI/CLI.hpp>"),
             ("include/tav/kor.h", "#if defined(_WIN32)"),
         ]:
@@ -60,6 +65,15 @@ class CheckRooms(unittest.TestCase):
             ("format/swap.cpp", "#ifdef _WIN32"),
             ("format/swap.cpp", "if constexpr (std::endian::native == std::endian::little)"),
             ("include/tav/tav.h", "#if defined(__linux__)"),
+            ("kor/thread.cpp", "#if defined(_WIN32)"),
+            ("kor/thread.cpp", "#include <unistd.h>"),
+            ("kor/filePosix.h", "#include <unistd.h>"),
+            ("tools/output.cpp", '#include "kor/fileNative.h"'),
+            ("tests/kor/file_test.cpp", "#ifdef _WIN32"),
+            ("tests/support/platform.h", "# if !defined(__linux__)"),
+            ("examples/snapshot.cpp", "#if defined(__APPLE__) || defined(__unix__)"),
+            ("bench/workload.cpp", "#elif _MSC_VER"),
+            ("fuzz/driver.cpp", "#if __has_include(<unistd.h>)"),
         ]:
             with self.subTest(name=name, line=line):
                 self.assertEqual(len(findings(name, line)), 1)

@@ -1,3 +1,4 @@
+#include <array>
 #include <optional>
 #include <vector>
 
@@ -17,7 +18,7 @@ std::string streamOf(const tav::Writer& writer)
 
 TEST(LayerGroup, ClosesItselfAtTheEndOfItsScope)
 {
-  tav::Writer writer;
+  tav::Writer writer({.byteOrder = kLowFirst});
   {
     tav::Group root = writer.group(0x0102);
     root.add(0x0304, uint8_t{7});
@@ -28,14 +29,14 @@ TEST(LayerGroup, ClosesItselfAtTheEndOfItsScope)
 
 TEST(LayerGroup, StandsWithAnUnknownSizeWhileItIsOpen)
 {
-  tav::Writer writer;
+  tav::Writer writer({.byteOrder = kLowFirst});
   const tav::Group root = writer.group(0x0102);
   EXPECT_EQ(streamOf(writer), rows("FF FF FF FF FF FF FF FF 00 00 00 00 02 00 02 01"));
 }
 
 TEST(LayerGroup, EndElementFollowsWhenItIsToBeFoundFromBehind)
 {
-  tav::Writer writer;
+  tav::Writer writer({.byteOrder = kLowFirst});
   writer.group(0x0102, {.eyeSize = true}).close();
   EXPECT_EQ(streamOf(writer), rows("20 00 00 00 00 00 00 00 00 00 40 00 02 00 02 01"
                                    "10 00 00 00 00 00 00 00 00 00 00 00 65 00 E9 FD"
@@ -44,7 +45,7 @@ TEST(LayerGroup, EndElementFollowsWhenItIsToBeFoundFromBehind)
 
 TEST(LayerGroup, ChildrenTakeTheHeaderThatTheirGroupAsksFor)
 {
-  tav::Writer writer;
+  tav::Writer writer({.byteOrder = kLowFirst});
   {
     tav::Group root = writer.group(0x0102, {.children = tav::Width::bits32});
     root.add(0x0304, uint8_t{7});
@@ -59,7 +60,7 @@ TEST(LayerGroup, ChildrenTakeTheHeaderThatTheirGroupAsksFor)
 
 TEST(LayerGroup, OuterGroupGoesOnWithItsOwnWidthAfterAnInnerOne)
 {
-  tav::Writer writer;
+  tav::Writer writer({.byteOrder = kLowFirst});
   {
     tav::Group root = writer.group(0x0102);
     root.group(0x0506, {.children = tav::Width::bits32}).close();
@@ -72,7 +73,7 @@ TEST(LayerGroup, OuterGroupGoesOnWithItsOwnWidthAfterAnInnerOne)
 
 TEST(LayerGroup, RootHasTheHeaderOfTheStreamsOptions)
 {
-  tav::Writer writer({.root = tav::Width::bits32});
+  tav::Writer writer({.byteOrder = kLowFirst, .root = tav::Width::bits32});
   {
     tav::Group root = writer.group(0x0102);
     root.add(0x0304, uint8_t{7});
@@ -82,7 +83,7 @@ TEST(LayerGroup, RootHasTheHeaderOfTheStreamsOptions)
 
 TEST(LayerGroup, AbandonedGroupLeavesNothing)
 {
-  tav::Writer writer;
+  tav::Writer writer({.byteOrder = kLowFirst});
   tav::Group root = writer.group(0x0102);
   {
     tav::Group inner = root.group(0x0506);
@@ -210,7 +211,7 @@ TEST(LayerGroup, LivesOnWhenItsWriterIsMoved)
 
 TEST(LayerGroup, ExceptionClosesWhatIsOpen)
 {
-  tav::Writer writer;
+  tav::Writer writer({.byteOrder = kLowFirst});
   EXPECT_THROW(
       {
         tav::Group root = writer.group(0x0102);
@@ -316,4 +317,51 @@ TEST(LayerGroup, FourThousandCanBeOpenAndTheNextOneLeavesNothing)
   writer.finish();
   tav::Reader reader(writer.bytes());
   reader.validate();
+}
+
+TEST(LayerGroup, TakesTheFormOfAGroupThatAPlainOperationPutInItsPlace)
+{
+  tav::Writer writer;
+  tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM);
+  tav::Group host = root.group(TAV_ELM_CMN_HOST);
+  EXPECT_EQ(host.add(TAV_ELM_CMN_HOST_NAME, "a").width(), tav::Width::bits64);
+  TAVHandle* const handle = writer.handle();
+  ASSERT_EQ(tavCloseHeader(0, handle), TAV_RC_OK);
+  TAVHeaderData other{};
+  other.header.hdr64 = {TAV_SIZE_UNKNOWN, 0, TAV_TYPE_HEADER32, TAV_ELM_CMN_HOST};
+  other.header.hdrType = TAV_HDR_64;
+  ASSERT_EQ(tavAddElement(0, handle, &other), TAV_RC_OK);
+  EXPECT_EQ(host.add(TAV_ELM_CMN_HOST_NAME, "b").width(), tav::Width::bits32);
+}
+
+TEST(LayerGroup, RefusesNodesAfterAPlainOperationHasClosedIt)
+{
+  std::array<std::byte, 256> block{};
+  tav::Writer writer(block);
+  tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM);
+  tav::Group host = root.group(TAV_ELM_CMN_HOST);
+  ASSERT_EQ(tavCloseHeader(0, writer.handle()), TAV_RC_OK);
+  EXPECT_EQ(thrownBy([&] { host.add(TAV_ELM_CMN_HOST_NAME, "a"); }), TAV_RC_BAD_PARAM);
+}
+
+TEST(LayerGroup, GoesOnAfterAGroupInsideOfEitherForm)
+{
+  std::array<std::byte, 512> block{};
+  tav::Writer writer(block);
+  {
+    tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM);
+    for (const tav::Width children : {tav::Width::bits32, tav::Width::bits64})
+    {
+      tav::Group host = root.group(TAV_ELM_CMN_HOST, {.children = children});
+      EXPECT_EQ(host.add(TAV_ELM_CMN_HOST_NAME, "a").width(), children);
+      EXPECT_EQ(thrownBy([&] { root.add(TAV_ELM_CMN_HOST_NAME, "b"); }), TAV_RC_BAD_PARAM);
+      host.close();
+      EXPECT_EQ(root.add(TAV_ELM_CMN_HOST_NAME, "b").width(), tav::Width::bits64);
+      EXPECT_EQ(thrownBy([&] { host.add(TAV_ELM_CMN_HOST_NAME, "c"); }), TAV_RC_BAD_PARAM);
+    }
+  }
+  writer.finish();
+  const tav::Reader reader(writer.bytes());
+  EXPECT_EQ(reader.root().all("hostName").size(), 2U);
+  EXPECT_EQ(reader.root().all("host/hostName").size(), 2U);
 }

@@ -84,6 +84,9 @@ void visitBothWays(const Bytes& stream)
   visitAll(buffered, stream.size());
 }
 
+/// Of the first element's header, behind the root's.
+constexpr size_t kHighByteOfSize = 16 + (kBigEndianHost ? 0 : 7);
+
 } // namespace
 
 TEST(LayerHostile, SoundStreamIsVisitedWhole)
@@ -157,7 +160,7 @@ TEST(LayerHostile, OpenGroupsThatLeadBackEndTheWalk)
 TEST(LayerHostile, ErrorCodeTellsWhyAWalkEnded)
 {
   Bytes stream = sample();
-  stream[16 + 7] = 0x7F; // the first host's size leads far past the stream
+  stream[kHighByteOfSize] = 0x7F; // the first host's size leads far past the stream
   const tav::Reader reader(spanOf(stream));
   EXPECT_EQ(thrownBy([&] {
               for ([[maybe_unused]] const tav::Node& node : reader.root().children())
@@ -181,7 +184,7 @@ TEST(LayerHostile, ErrorCodeTellsWhyAWalkEnded)
 TEST(LayerHostile, ThrowingWalkIsOverAfterwards)
 {
   Bytes stream = sample();
-  stream[16 + 7] = 0x7F;
+  stream[kHighByteOfSize] = 0x7F;
   const tav::Reader reader(spanOf(stream));
   auto range = reader.root().descendants();
   uint64_t visits = 0;

@@ -3,20 +3,24 @@
 
 #define TAV_CHECK_PAYLOADS 1 // also where NDEBUG is defined
 
-#include <unistd.h>
-
 #include <filesystem>
 #include <string>
 #include <system_error>
 
 #include <gtest/gtest.h>
 
+#include "kor/host.h"
 #include "support/byteRows.h"
+#include "support/platform.h"
 #include "support/vectorStorage.h"
 #include "tav/tav.hpp"
 
 namespace test
 {
+
+/// The byte orders of streams that are written down in tests, whatever this machine's own is.
+constexpr tav::ByteOrder kLowFirst = kBigEndianHost ? tav::ByteOrder::swapped : tav::ByteOrder::native;
+constexpr tav::ByteOrder kHighFirst = kBigEndianHost ? tav::ByteOrder::native : tav::ByteOrder::swapped;
 
 /// The code that a throwing form gives, TAV_RC_OK when it does not throw.
 template<class Call>
@@ -76,7 +80,7 @@ private:
   static std::string nextName()
   {
     static int count = 0;
-    return "tav-layer-" + std::to_string(getpid()) + "-" + std::to_string(++count);
+    return "tav-layer-" + std::to_string(tav::kor::processId()) + "-" + std::to_string(++count);
   }
 };
 

@@ -150,3 +150,35 @@ TEST_F(LayerPath, DamageOnTheWayIsReportedButNotWhatLiesBehindTheMatch)
   EXPECT_EQ(givenBy([&](std::error_code& ec) { static_cast<void>(other.all("system/60105", ec)); }),
             TAV_RC_OUTSIDE_PARENT);
 }
+
+TEST_F(LayerPath, MatchKnowsItsGroup)
+{
+  const auto os = reader.root().path("host[2]/os");
+  ASSERT_TRUE(os);
+  EXPECT_EQ(os->next()->as<std::string>(), "c");
+  const auto name = reader.root().path("host/hostName");
+  ASSERT_TRUE(name);
+  EXPECT_FALSE(name->next()) << "the last of its group";
+}
+
+TEST_F(LayerPath, ElementThatEndsAGroupIsNoMatch)
+{
+  tav::Writer writer;
+  {
+    tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM, {.eyeSize = true});
+    root.add(TAV_ELM_CMN_HOST_NAME, "a");
+  }
+  writer.finish();
+  const tav::Reader other(writer.bytes());
+  EXPECT_TRUE(other.root().path("hostName"));
+  EXPECT_FALSE(other.root().path("65001"));
+  EXPECT_FALSE(other.root().path("65000"));
+}
+
+TEST_F(LayerPath, MatchIsTheSameAfterTheHandleWasGivenAway)
+{
+  const uint64_t before = reader.root().path("host/os/osName")->offset();
+  ASSERT_NE(reader.handle(), nullptr);
+  EXPECT_EQ(reader.root().path("host/os/osName")->offset(), before);
+  EXPECT_EQ(first("system/host/hostName"), "a");
+}

@@ -46,15 +46,11 @@ std::string tagsOf(auto&& range)
 
 std::string printed(const tav::Reader& reader, const tav::PrintOptions& options, const tav::Node& node)
 {
-  char* text = nullptr;
-  size_t size = 0;
-  FILE* const stream = open_memstream(&text, &size);
+  CaughtStream stream;
   std::error_code ec;
-  const uint64_t characters = reader.print(stream, node, options, ec);
+  const uint64_t characters = reader.print(stream.get(), node, options, ec);
   EXPECT_FALSE(ec) << ec.message();
-  std::fclose(stream);
-  const std::string result(text, size);
-  std::free(text);
+  const std::string result = stream.text();
   EXPECT_EQ(characters, result.size());
   return result;
 }

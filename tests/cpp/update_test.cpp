@@ -34,8 +34,7 @@ TEST_P(LayerUpdate, ChangesTheValueInPlaceAndNothingElse)
   const tav::Reader reader(spanOf(stream), options);
   tav::Updater updater(std::as_writable_bytes(std::span(stream)), options);
   Bytes expected = stream;
-  const bool swapped = GetParam() == tav::ByteOrder::swapped;
-  const Bytes value = swapped ? hex("0A 0B 0C 0D") : hex("0D 0C 0B 0A");
+  const Bytes value = GetParam() == kHighFirst ? hex("0A 0B 0C 0D") : hex("0D 0C 0B 0A");
   std::copy(value.begin(), value.end(), expected.begin() + 32);
 
   updater.update(*reader.path("system/cpuOnline"), uint32_t{0x0A0B0C0D});

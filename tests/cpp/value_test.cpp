@@ -11,6 +11,7 @@ namespace
 {
 
 constexpr uint16_t kElm = 0x1234;
+const tav::StreamOptions kLow{.byteOrder = kLowFirst};
 
 /// A stream of one element, and the element as a reader sees it.
 class OneElement
@@ -40,7 +41,7 @@ private:
 };
 
 template<class T>
-T valueOf(uint16_t type, std::string_view payload, tav::ByteOrder byteOrder = tav::ByteOrder::native)
+T valueOf(uint16_t type, std::string_view payload, tav::ByteOrder byteOrder = kLowFirst)
 {
   return OneElement({.byteOrder = byteOrder}, type, hex(payload)).node().as<T>();
 }
@@ -48,7 +49,7 @@ T valueOf(uint16_t type, std::string_view payload, tav::ByteOrder byteOrder = ta
 template<class T>
 uint32_t refusal(uint16_t type, std::string_view payload)
 {
-  const OneElement element({}, type, hex(payload));
+  const OneElement element(kLow, type, hex(payload));
   const uint32_t thrown = thrownBy([&] { static_cast<void>(element.node().as<T>()); });
   EXPECT_EQ(givenBy([&](std::error_code& ec) { static_cast<void>(element.node().as<T>(ec)); }), thrown);
   EXPECT_EQ(thrownBy([&] { static_cast<void>(element.node().copy().as<T>()); }), thrown);
@@ -59,13 +60,11 @@ uint32_t refusal(uint16_t type, std::string_view payload)
 template<class T>
 uint32_t numberRefusal(uint16_t type, std::string_view payload)
 {
-  const OneElement element({}, type, hex(payload));
+  const OneElement element(kLow, type, hex(payload));
   const uint32_t thrown = thrownBy([&] { static_cast<void>(element.node().asNumber<T>()); });
   EXPECT_EQ(givenBy([&](std::error_code& ec) { EXPECT_EQ(element.node().asNumber<T>(ec), T{}); }), thrown);
   return thrown;
 }
-
-constexpr auto kSwapped = tav::ByteOrder::swapped;
 
 } // namespace
 
@@ -74,10 +73,10 @@ TEST(LayerValue, IntegersInBothByteOrders)
   EXPECT_EQ(valueOf<uint8_t>(TAV_TYPE_UINT8, "FE"), 0xFE);
   EXPECT_EQ(valueOf<int8_t>(TAV_TYPE_SINT8, "FE"), -2);
   EXPECT_EQ(valueOf<uint16_t>(TAV_TYPE_UINT16, "B2 A1"), 0xA1B2);
-  EXPECT_EQ(valueOf<int16_t>(TAV_TYPE_SINT16, "FF FE", kSwapped), -2);
-  EXPECT_EQ(valueOf<uint32_t>(TAV_TYPE_UINT32, "A1 B2 C3 D4", kSwapped), 0xA1B2C3D4);
+  EXPECT_EQ(valueOf<int16_t>(TAV_TYPE_SINT16, "FF FE", kHighFirst), -2);
+  EXPECT_EQ(valueOf<uint32_t>(TAV_TYPE_UINT32, "A1 B2 C3 D4", kHighFirst), 0xA1B2C3D4);
   EXPECT_EQ(valueOf<int32_t>(TAV_TYPE_SINT32, "FE FF FF FF"), -2);
-  EXPECT_EQ(valueOf<uint64_t>(TAV_TYPE_UINT64, "01 02 03 04 05 06 07 08", kSwapped), 0x0102030405060708U);
+  EXPECT_EQ(valueOf<uint64_t>(TAV_TYPE_UINT64, "01 02 03 04 05 06 07 08", kHighFirst), 0x0102030405060708U);
   EXPECT_EQ(valueOf<long long>(TAV_TYPE_SINT64, "FE FF FF FF FF FF FF FF"), -2);
 }
 
@@ -90,13 +89,13 @@ TEST(LayerValue, ByteIsNoInteger)
 TEST(LayerValue, TextAsCopyAndAsView)
 {
   EXPECT_EQ(valueOf<std::string>(TAV_TYPE_ASCII_STRING, "61 00 62"), std::string("a\0b", 3));
-  const OneElement element({}, TAV_TYPE_ASCII_STRING, hex("61 62"));
+  const OneElement element(kLow, TAV_TYPE_ASCII_STRING, hex("61 62"));
   EXPECT_EQ(element.node().as<std::string_view>(), "ab");
 }
 
 TEST(LayerValue, Utf8InAllItsForms)
 {
-  const OneElement element({}, TAV_TYPE_UTF8_STRING, hex("B8 04 C3 A4"));
+  const OneElement element(kLow, TAV_TYPE_UTF8_STRING, hex("B8 04 C3 A4"));
   EXPECT_EQ(element.node().as<std::string>(), "\xC3\xA4");
   EXPECT_TRUE(element.node().as<std::u8string>() == u8"\u00E4");
   EXPECT_TRUE(element.node().as<std::u8string_view>() == u8"\u00E4");
@@ -106,7 +105,7 @@ TEST(LayerValue, Utf8InAllItsForms)
 
 TEST(LayerValue, CodePageIsReadInTheStreamsByteOrder)
 {
-  EXPECT_EQ(valueOf<tav::Utf8Text>(TAV_TYPE_UTF8_STRING, "01 02 41", kSwapped), (tav::Utf8Text{"A", 0x0102}));
+  EXPECT_EQ(valueOf<tav::Utf8Text>(TAV_TYPE_UTF8_STRING, "01 02 41", kHighFirst), (tav::Utf8Text{"A", 0x0102}));
 }
 
 TEST(LayerValue, TextOfAnotherCodePageIsNoUtf8ByTheLanguagesType)
@@ -122,7 +121,7 @@ TEST(LayerValue, Utf8WithoutRoomForItsCodePageIsRefused)
 
 TEST(LayerValue, BinaryAsCopyAndAsView)
 {
-  const OneElement element({}, TAV_TYPE_BINARY, hex("01 02"));
+  const OneElement element(kLow, TAV_TYPE_BINARY, hex("01 02"));
   EXPECT_EQ(element.node().as<std::vector<std::byte>>(), (std::vector{std::byte{1}, std::byte{2}}));
   EXPECT_EQ(bytesOf(element.node().as<std::span<const std::byte>>()), hex("01 02"));
 }
@@ -133,7 +132,7 @@ TEST(LayerValue, WordsInBothByteOrders)
   EXPECT_EQ(valueOf<std::vector<uint64_t>>(TAV_TYPE_UINT64_ARRAY, "01 00 00 00 00 00 00 00 08 07 06 05 04 03 02 01"),
             expected);
   EXPECT_EQ(valueOf<std::vector<uint64_t>>(TAV_TYPE_UINT64_ARRAY, "00 00 00 00 00 00 00 01 01 02 03 04 05 06 07 08",
-                                           kSwapped),
+                                           kHighFirst),
             expected);
   EXPECT_TRUE(valueOf<std::vector<uint64_t>>(TAV_TYPE_UINT64_ARRAY, "").empty());
   EXPECT_EQ(refusal<std::vector<uint64_t>>(TAV_TYPE_UINT64_ARRAY, "01 02 03"), TAV_RC_OUTSIDE_PARENT);
@@ -143,13 +142,13 @@ TEST(LayerValue, LongIntegersInBothByteOrders)
 {
   const tav::Uint128 expected{0x1112131415161718, 0x2122232425262728};
   EXPECT_EQ(valueOf<tav::Uint128>(TAV_TYPE_UINT128, "28 27 26 25 24 23 22 21 18 17 16 15 14 13 12 11"), expected);
-  EXPECT_EQ(valueOf<tav::Uint128>(TAV_TYPE_UINT128, "11 12 13 14 15 16 17 18 21 22 23 24 25 26 27 28", kSwapped),
+  EXPECT_EQ(valueOf<tav::Uint128>(TAV_TYPE_UINT128, "11 12 13 14 15 16 17 18 21 22 23 24 25 26 27 28", kHighFirst),
             expected);
   EXPECT_EQ(valueOf<tav::Sint128>(TAV_TYPE_SINT128, "FE FF FF FF FF FF FF FF FF FF FF FF FF FF FF FF"),
             (tav::Sint128{-1, ~uint64_t{1}}));
 #if defined(__SIZEOF_INT128__)
   EXPECT_TRUE(valueOf<tav::BuiltinUint128>(TAV_TYPE_UINT128, "11 12 13 14 15 16 17 18 21 22 23 24 25 26 27 28",
-                                           kSwapped) ==
+                                           kHighFirst) ==
               ((tav::BuiltinUint128{0x1112131415161718} << 64U) | 0x2122232425262728U));
   EXPECT_TRUE(valueOf<tav::BuiltinSint128>(TAV_TYPE_SINT128, "FE FF FF FF FF FF FF FF FF FF FF FF FF FF FF FF") == -2);
 #endif
@@ -166,7 +165,7 @@ TEST(LayerValue, TimestampAsItIsAndAsATime)
   EXPECT_EQ(valueOf<Micro>(TAV_TYPE_UTC_TIMESTAMP, bytes), Micro(0x10000s + 258ms + 3us)) << "the zone moves nothing";
   EXPECT_EQ(valueOf<std::chrono::sys_seconds>(TAV_TYPE_UTC_TIMESTAMP, bytes), std::chrono::sys_seconds(0x10000s));
   EXPECT_EQ(valueOf<std::chrono::sys_seconds>(TAV_TYPE_UTC_TIMESTAMP,
-                                              "00 00 00 00 00 01 00 00 01 02 00 03 00 09 00 3C", kSwapped),
+                                              "00 00 00 00 00 01 00 00 01 02 00 03 00 09 00 3C", kHighFirst),
             std::chrono::sys_seconds(0x10000s));
 }
 
@@ -213,20 +212,20 @@ TEST(LayerValue, GroupHasNoValue)
 
 TEST(LayerNumber, AnyIntegerTypeGivesItsNumber)
 {
-  EXPECT_EQ(OneElement({}, TAV_TYPE_UINT8, hex("FE")).node().asNumber<int64_t>(), 254);
-  EXPECT_EQ(OneElement({}, TAV_TYPE_SINT8, hex("FE")).node().asNumber<int64_t>(), -2);
-  EXPECT_EQ(OneElement({}, TAV_TYPE_UINT16, hex("B2 A1")).node().asNumber<int>(), 0xA1B2);
-  EXPECT_EQ(OneElement({}, TAV_TYPE_SINT16, hex("FE FF")).node().asNumber<int>(), -2);
-  EXPECT_EQ(OneElement({}, TAV_TYPE_UINT32, hex("FF FF FF FF")).node().asNumber<int64_t>(), 0xFFFFFFFF);
-  EXPECT_EQ(OneElement({}, TAV_TYPE_SINT32, hex("FE FF FF FF")).node().asNumber<int8_t>(), -2);
-  EXPECT_EQ(OneElement({}, TAV_TYPE_UINT64, hex("07 00 00 00 00 00 00 00")).node().asNumber<uint8_t>(), 7);
-  EXPECT_EQ(OneElement({}, TAV_TYPE_SINT64, hex("FE FF FF FF FF FF FF FF")).node().asNumber<int16_t>(), -2);
-  EXPECT_EQ(OneElement({}, TAV_TYPE_UINT128, hex("FF FF FF FF FF FF FF FF 00 00 00 00 00 00 00 00"))
+  EXPECT_EQ(OneElement(kLow, TAV_TYPE_UINT8, hex("FE")).node().asNumber<int64_t>(), 254);
+  EXPECT_EQ(OneElement(kLow, TAV_TYPE_SINT8, hex("FE")).node().asNumber<int64_t>(), -2);
+  EXPECT_EQ(OneElement(kLow, TAV_TYPE_UINT16, hex("B2 A1")).node().asNumber<int>(), 0xA1B2);
+  EXPECT_EQ(OneElement(kLow, TAV_TYPE_SINT16, hex("FE FF")).node().asNumber<int>(), -2);
+  EXPECT_EQ(OneElement(kLow, TAV_TYPE_UINT32, hex("FF FF FF FF")).node().asNumber<int64_t>(), 0xFFFFFFFF);
+  EXPECT_EQ(OneElement(kLow, TAV_TYPE_SINT32, hex("FE FF FF FF")).node().asNumber<int8_t>(), -2);
+  EXPECT_EQ(OneElement(kLow, TAV_TYPE_UINT64, hex("07 00 00 00 00 00 00 00")).node().asNumber<uint8_t>(), 7);
+  EXPECT_EQ(OneElement(kLow, TAV_TYPE_SINT64, hex("FE FF FF FF FF FF FF FF")).node().asNumber<int16_t>(), -2);
+  EXPECT_EQ(OneElement(kLow, TAV_TYPE_UINT128, hex("FF FF FF FF FF FF FF FF 00 00 00 00 00 00 00 00"))
                 .node()
                 .asNumber<uint64_t>(),
             std::numeric_limits<uint64_t>::max());
   EXPECT_EQ(
-      OneElement({}, TAV_TYPE_SINT128, hex("FE FF FF FF FF FF FF FF FF FF FF FF FF FF FF FF")).node().asNumber<int>(),
+      OneElement(kLow, TAV_TYPE_SINT128, hex("FE FF FF FF FF FF FF FF FF FF FF FF FF FF FF FF")).node().asNumber<int>(),
       -2);
 }
 

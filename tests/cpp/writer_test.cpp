@@ -180,7 +180,7 @@ TEST(LayerWriterFile, RefusesAnExistingFileUnlessItMayOverwrite)
   EXPECT_EQ(thrownBy([&] { tav::Writer second(file.path); }), KOR_RC_FILE_EXISTS);
   EXPECT_EQ(givenBy([&](std::error_code& ec) { tav::Writer second(file.path, {}, {}, ec); }), KOR_RC_FILE_EXISTS);
   EXPECT_TRUE(contentOf(file.path) == before);
-  tav::Writer third(file.path, {.overwrite = true});
+  tav::Writer third(file.path, {.overwrite = true}, {.byteOrder = kLowFirst});
   third.group(0x0102).close();
   third.finish();
   expectBegins(contentOf(file.path), hex("00 00 00 00 00 00 00 00 00 00 00 00 02 00 02 01"));

@@ -11,7 +11,9 @@ if [[ -z $exported || ! -s $list ]]; then
   echo "no symbols in $library or in $list"
   exit 1
 fi
-if ! difference=$(diff "$list" - <<<"$exported"); then
+# A DLL does not export the names that type information refers to.
+expected=$(if [[ $library == *.dll ]]; then grep -v '^typeinfo name for ' "$list"; else cat "$list"; fi)
+if ! difference=$(diff - <(echo "$exported") <<<"$expected"); then
   echo "$library does not export what $list says (< listed, > exported):"
   grep '^[<>]' <<<"$difference"
   echo "When the change is meant, run tests/exports/update.sh and review what it changes in the list."

@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <array>
 #include <cinttypes>
-#include <cwchar>
 #include <gtest/gtest.h>
 #include <string>
 
@@ -70,13 +69,5 @@ TEST(Print, NoRoomAtAllWritesNothing)
 TEST(Print, ANullBufferWithoutRoomIsAccepted)
 {
   EXPECT_EQ(korSnprintf(nullptr, 0, "%s", "12345"), 0u);
-}
-
-TEST(Print, AFormatThatFailsStoresAnEmptyText)
-{
-  Buffer buffer;
-  const wchar_t notACharacter[] = {static_cast<wchar_t>(0x110000), L'\0'};
-  EXPECT_EQ(korSnprintf(buffer.data(), 64, "before %ls", notACharacter), 0u);
-  EXPECT_EQ(buffer.text(), "");
 }
 } // namespace

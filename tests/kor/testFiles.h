@@ -1,20 +1,13 @@
 /// @file testFiles.h
-/// Folders, files and processes for the tests of files.
+/// Folders and files for the tests of files.
 #pragma once
 
-#include <array>
-#include <cerrno>
-#include <csignal>
 #include <cstdint>
 #include <cstdio>
-#include <cstdlib>
 #include <filesystem>
-#include <functional>
-#include <stdexcept>
 #include <string>
-#include <sys/wait.h>
-#include <unistd.h>
 
+#include "support/platform.h"
 #include "tav/kor.h"
 
 /// A folder of its own that goes with all it holds.
@@ -22,11 +15,7 @@ class TestFolder
 {
 public:
   TestFolder()
-  {
-    std::string pattern = (std::filesystem::temp_directory_path() / "kor-test-XXXXXX").string();
-    if (mkdtemp(pattern.data()) == nullptr) throw std::runtime_error("no folder " + pattern);
-    path_ = pattern;
-  }
+      : path_(test::makeFolder("kor-test-")) {}
   ~TestFolder()
   {
     std::error_code ignored;
@@ -107,55 +96,4 @@ inline uint32_t lockFile(KORHFile& file, uint32_t word1, uint32_t word2)
   param.word1 = word1;
   param.word2 = word2;
   return file.lock(&param);
-}
-
-/// A process that runs `work` and hands its code back. The work must not use the test framework.
-class Child
-{
-public:
-  explicit Child(const std::function<uint32_t()>& work)
-  {
-    if (pipe(pipe_.data()) != 0) throw std::runtime_error("no pipe");
-    std::fflush(nullptr); // or the process inherits what is not printed yet
-    process_ = fork();
-    if (process_ < 0) throw std::runtime_error("no process");
-    if (process_ > 0)
-    {
-      ::close(pipe_[1]);
-      return;
-    }
-    ::close(pipe_[0]);
-    const uint32_t code = work();
-    const bool told = ::write(pipe_[1], &code, sizeof code) == sizeof code;
-    _exit(told ? 0 : 1); // past the checks at exit, which are the parent's
-  }
-  ~Child()
-  {
-    if (process_ <= 0) return;
-    ::kill(process_, SIGKILL); // nobody waits for it, so the test has failed, and it may wait for the test
-    result();
-  }
-  Child(const Child&) = delete;
-  Child& operator=(const Child&) = delete;
-
-  /// Waits for the end; UINT32_MAX when the process died before.
-  uint32_t result()
-  {
-    uint32_t code = UINT32_MAX;
-    if (::read(pipe_[0], &code, sizeof code) != sizeof code) code = UINT32_MAX;
-    ::close(pipe_[0]);
-    while (waitpid(process_, nullptr, 0) < 0 && errno == EINTR)
-    {}
-    process_ = -1;
-    return code;
-  }
-
-private:
-  std::array<int, 2> pipe_ = {-1, -1};
-  pid_t process_ = -1;
-};
-
-inline uint32_t inChild(const std::function<uint32_t()>& work)
-{
-  return Child(work).result();
 }

@@ -2,7 +2,6 @@
 
 #include <gtest/gtest.h>
 #include <thread>
-#include <unistd.h>
 
 namespace
 {
@@ -18,11 +17,5 @@ TEST(ThreadId, DiffersBetweenThreadsThatLiveAtATime)
   const uint64_t own = korThreadID();
   thread.join();
   EXPECT_NE(own, other);
-}
-
-TEST(ThreadId, IsTheNumberOfTheOperatingSystem)
-{
-  // The first thread of a process carries the process's number; tests run in it.
-  EXPECT_EQ(korThreadID(), static_cast<uint64_t>(getpid()));
 }
 } // namespace

@@ -1,12 +1,12 @@
 /// A stream that goes through a ring is the stream that direct memory would hold, and reads the same. Random scripts
 /// over every kind of ring; a failure names the seed, and TAV_TEST_SEED=<seed> TAV_TEST_CASES=1 runs it alone.
 #include <array>
-#include <cstdlib>
 #include <gtest/gtest.h>
 #include <set>
 #include <tuple>
 #include <utility>
 
+#include "support/environment.h"
 #include "support/randomScript.h"
 #include "support/twinReader.h"
 
@@ -14,12 +14,6 @@ namespace
 {
 
 using namespace test;
-
-uint64_t numberFrom(const char* variable, uint64_t standard)
-{
-  const char* const text = std::getenv(variable);
-  return text != nullptr ? std::strtoull(text, nullptr, 0) : standard;
-}
 
 constexpr uint64_t kCases = 52'000; ///< over the four forms together
 constexpr uint64_t kForms = 4;
@@ -55,8 +49,8 @@ class RingEqualsDirect : public testing::TestWithParam<std::tuple<bool, bool>>
 TEST_P(RingEqualsDirect, ForRandomStreams)
 {
   const auto [swap, align] = GetParam();
-  const uint64_t seed = numberFrom("TAV_TEST_SEED", 1);
-  const uint64_t total = numberFrom("TAV_TEST_CASES", kCases);
+  const uint64_t seed = fromEnvironment("TAV_TEST_SEED", 1);
+  const uint64_t total = fromEnvironment("TAV_TEST_CASES", kCases);
   const uint64_t count = (total + kForms - 1) / kForms;
   std::set<std::pair<uint64_t, uint64_t>> rings;
   int failed = 0;

@@ -1,10 +1,10 @@
 /// Validation and a plain checker say the same of random streams, sound and damaged.
 #include <gtest/gtest.h>
 
-#include <cstdlib>
 #include <map>
 #include <random>
 
+#include "support/environment.h"
 #include "support/plainChecker.h"
 #include "support/reading.h"
 #include "support/streams.h"
@@ -13,12 +13,6 @@ namespace
 {
 
 using namespace test;
-
-uint64_t fromEnvironment(const char* name, uint64_t otherwise)
-{
-  const char* const text = std::getenv(name);
-  return text != nullptr ? std::strtoull(text, nullptr, 0) : otherwise;
-}
 
 /// A random tree in bytes, and where its headers are.
 class RandomStream
@@ -57,7 +51,7 @@ private:
   {
     for (uint64_t i = 0; i < length && at + i < bytes.size(); ++i)
     {
-      bytes[at + i] = static_cast<uint8_t>(value >> 8 * (form_.swap ? length - 1 - i : i));
+      bytes[at + i] = static_cast<uint8_t>(value >> 8 * (form_.swap != kBigEndianHost ? length - 1 - i : i));
     }
   }
 

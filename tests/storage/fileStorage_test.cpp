@@ -1,8 +1,6 @@
 /// The file storage over real files: opening, the cursor, reading.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
-#include <sys/stat.h>
-#include <unistd.h>
 
 #include "storage/fileFixture.h"
 #include "support/failingNew.h"
@@ -101,25 +99,10 @@ INSTANTIATE_TEST_SUITE_P(Rows, RefusedFile,
                          testing::Values(OpenRow{"MissingFile", "nothing", 0x1, KOR_RC_NO_SUCH_FILE},
                                          OpenRow{"MissingFolder", "no/where", kCreate, KOR_RC_NO_SUCH_FILE},
                                          OpenRow{"Folder", ".", 0x1, KOR_RC_IS_FOLDER},
-                                         OpenRow{"FileForAFolder", "stream.tav/x", 0x1, KOR_RC_NOT_A_FOLDER},
                                          OpenRow{"ExistingFile", "stream.tav", kCreate | KOR_FILE_EXCLUSIVE,
                                                  KOR_RC_FILE_EXISTS},
                                          OpenRow{"NoMode", "stream.tav", 0, TAV_RC_BAD_PARAM}),
                          [](const auto& row) { return std::string(row.param.name); });
-
-TEST_F(FileStorage, OfAReadOnlyFileOpensForReadingAlone)
-{
-  const std::string path = fileOf(10);
-  ASSERT_EQ(chmod(path.c_str(), 0444), 0);
-  ASSERT_EQ(chmod(folder_.path().c_str(), 0755), 0);
-  const uint32_t code = inChild([&] {
-    if (geteuid() == 0 && setuid(65534) != 0) return uint32_t{1}; // the superuser may write anything
-    const OpenFile reading(path, KOR_FILE_READ);
-    const OpenFile writing(path, KOR_FILE_UPDATE);
-    return reading.rc == TAV_RC_OK ? writing.rc : 2;
-  });
-  EXPECT_EQ(code, KOR_RC_NO_PERMISSION);
-}
 
 TEST_F(FileStorage, TracesConstructionAndEnd)
 {

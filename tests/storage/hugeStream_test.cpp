@@ -7,10 +7,10 @@
 #include <cstring>
 #include <gtest/gtest.h>
 #include <string>
-#include <sys/resource.h>
 #include <vector>
 
 #include "support/elements.h"
+#include "support/platform.h"
 #include "tav/tav.h"
 
 namespace
@@ -160,13 +160,6 @@ private:
   uint64_t position_ = 0;
   uint64_t size_ = 0;
 };
-
-uint64_t peakKibibytes()
-{
-  rusage usage{};
-  getrusage(RUSAGE_SELF, &usage);
-  return static_cast<uint64_t>(usage.ru_maxrss);
-}
 
 void writeStream(TAVSideStorage& storage, MadeStream& stream, uint64_t elements)
 {

@@ -15,13 +15,13 @@
 namespace test
 {
 
-/// The eye catcher as a machine of low byte first stores it, and the same from a machine of the other order.
+/// The eye catcher as this machine stores it, and the same from a machine of the other order.
 inline Bytes eyeBytes(bool swap)
 {
-  return swap ? hex("C0 DE D5 EE DD EC 0D ED") : hex("ED 0D EC DD EE D5 DE C0");
+  return swap != kBigEndianHost ? hex("C0 DE D5 EE DD EC 0D ED") : hex("ED 0D EC DD EE D5 DE C0");
 }
 
-/// A stream being laid out by hand in either byte order.
+/// A stream being laid out by hand, in this machine's byte order or in the other one.
 class ByteRows
 {
 public:
@@ -32,7 +32,7 @@ public:
   {
     for (unsigned i = 0; i < width; ++i)
     {
-      const unsigned place = swap_ ? width - 1 - i : i;
+      const unsigned place = swap_ != kBigEndianHost ? width - 1 - i : i;
       bytes.push_back(static_cast<uint8_t>(value >> (8 * place)));
     }
     return *this;

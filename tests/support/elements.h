@@ -1,6 +1,7 @@
 /// Nodes to be written: headers with their payloads, made in one line.
 #pragma once
 
+#include <bit>
 #include <cstdint>
 #include <cstring>
 #include <string_view>
@@ -12,6 +13,8 @@ namespace test
 {
 
 using Bytes = std::vector<uint8_t>;
+
+constexpr bool kBigEndianHost = std::endian::native == std::endian::big;
 
 /// A node and the bytes that its descriptor points to.
 struct Element

@@ -74,7 +74,7 @@ private:
     uint64_t value = 0;
     for (int i = 0; i < length; ++i)
     {
-      const int byte = swap ? i : length - 1 - i;
+      const int byte = swap != kBigEndianHost ? i : length - 1 - i;
       value = value << 8 | bytes_[at + static_cast<uint64_t>(byte)];
     }
     return value;
@@ -109,7 +109,9 @@ private:
   /// The next eye catcher within `length` bytes, 0 for any number.
   uint32_t findEye(uint64_t start, uint64_t length, Eye& eye) const
   {
-    static constexpr uint8_t native[] = {0xED, 0x0D, 0xEC, 0xDD, 0xEE, 0xD5, 0xDE, 0xC0};
+    static constexpr uint8_t low[] = {0xED, 0x0D, 0xEC, 0xDD, 0xEE, 0xD5, 0xDE, 0xC0};
+    static constexpr uint8_t high[] = {0xC0, 0xDE, 0xD5, 0xEE, 0xDD, 0xEC, 0x0D, 0xED};
+    const auto& native = kBigEndianHost ? high : low;
     if (start > bytes_.size())
     {
       return form_.buffered ? kEndOfStorage : kTooFewBytes;

@@ -3,54 +3,17 @@
 
 #include <cstdint>
 #include <cstdio>
-#include <cstdlib>
 #include <iomanip>
 #include <ostream>
 #include <sstream>
-#include <stdexcept>
 #include <string>
 
 #include "api/printer.h"
+#include "support/platform.h"
 #include "tav/tav.h"
 
 namespace test
 {
-
-/// A stream that keeps what is printed to it.
-class CaughtStream
-{
-public:
-  CaughtStream()
-      : stream_(open_memstream(&bytes_, &length_))
-  {
-    if (stream_ == nullptr)
-    {
-      throw std::runtime_error("open_memstream");
-    }
-  }
-  ~CaughtStream()
-  {
-    std::fclose(stream_);
-    std::free(bytes_);
-  }
-  CaughtStream(const CaughtStream&) = delete;
-  CaughtStream& operator=(const CaughtStream&) = delete;
-
-  FILE* get()
-  {
-    return stream_;
-  }
-  std::string text()
-  {
-    std::fflush(stream_);
-    return {bytes_, length_};
-  }
-
-private:
-  char* bytes_ = nullptr;
-  size_t length_ = 0;
-  FILE* stream_;
-};
 
 /// The outcome of one print call.
 struct Printed

@@ -3,12 +3,12 @@
 
 #include <algorithm>
 #include <cstdint>
-#include <cstdlib>
 #include <random>
 #include <stdexcept>
 #include <vector>
 
 #include "support/elements.h"
+#include "support/environment.h"
 #include "support/streams.h"
 #include "tav/tav.h"
 
@@ -22,12 +22,6 @@ struct Cases
   uint64_t first;
   uint64_t count;
 };
-
-inline uint64_t fromEnvironment(const char* name, uint64_t otherwise)
-{
-  const char* const text = std::getenv(name);
-  return text != nullptr && *text != '\0' ? std::strtoull(text, nullptr, 0) : otherwise;
-}
 
 inline Cases casesOf(uint64_t count, uint64_t seed = 1)
 {

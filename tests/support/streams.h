@@ -23,12 +23,20 @@ struct Form
   bool root32 = false;   ///< the first node has a 32-bit header
   uint64_t pageBytes = 64;
   uint64_t ringBytes = 10 * 64;
+  uint64_t longestTransfer = ~uint64_t{0}; ///< what a read of the storage under a ring gives at the most
 };
 
 inline std::ostream& operator<<(std::ostream& out, const Form& form)
 {
   return out << (form.buffered ? "buffered" : "direct") << (form.swap ? "Swapped" : "") << (form.align ? "Aligned" : "")
              << (form.root32 ? "Root32" : "");
+}
+
+/// The form with the low byte first on every machine, as streams are written down in tests.
+inline Form lowFirst(Form form = {})
+{
+  form.swap = kBigEndianHost;
+  return form;
 }
 
 /// Names for TEST_P instances over forms.
@@ -183,6 +191,7 @@ public:
     {
       storage_ = std::make_unique<VectorStorage>(form.pageBytes, Bytes(block_.get(), block_.get() + size_),
                                                  VectorStorage::kReadOnly);
+      vectorStorage().longestTransfer = form.longestTransfer;
     }
     else
     {

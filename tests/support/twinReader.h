@@ -4,6 +4,7 @@
 #include <cstdio>
 #include <cstdlib>
 
+#include "support/platform.h"
 #include "support/randomScript.h"
 #include "support/traceLog.h"
 
@@ -319,16 +320,12 @@ private:
                                 TAV_PRINT_DATA | TAV_PRINT_XML | TAV_PRINT_ATTRIBUTES});
     std::string text[2];
     const auto run = [&](TAVHandle* handle, TAVHeaderData&) {
-      char* pText = nullptr;
-      size_t length = 0;
-      FILE* const stream = open_memstream(&pText, &length);
-      TAVPrintParam param{0, nullptr, 0, stream};
+      CaughtStream stream;
+      TAVPrintParam param{0, nullptr, 0, stream.get()};
       uint64_t printed = 0;
       const uint32_t rc = tavPrintSubtree(options, handle, nullptr, &param, &printed);
-      std::fclose(stream);
       std::string& shown = text[handle == direct_->get() ? 0 : 1];
-      shown.assign(pText, length);
-      std::free(pText);
+      shown = stream.text();
       same(printed == shown.size(), "printed ", printed, " of ", shown.size());
       return rc;
     };

@@ -32,8 +32,6 @@ inline std::vector<Form> allForms()
   return forms;
 }
 
-constexpr bool kBigEndianHost = std::endian::native == std::endian::big;
-
 /// Whether a stream of this form holds its numbers with the high byte first.
 inline bool isBigEndian(const Form& form)
 {

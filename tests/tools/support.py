@@ -7,8 +7,13 @@ import subprocess
 import tempfile
 import unittest
 
-TAV = os.environ["TAV_TOOL"]
-GENERATE = os.environ["TAV_GENERATE"]
+# What runs a program of another machine here; empty when it is this machine's.
+EMULATOR = [word for word in os.environ.get("TAV_EMULATOR", "").split("|") if word]
+WINDOWS = os.environ["TAV_TOOL"].endswith(".exe")
+with open(os.environ["TAV_TOOL"], "rb") as program:
+    BIG_ENDIAN = program.read(6) == b"\x7fELF\x02\x02"
+TAV = [*EMULATOR, os.environ["TAV_TOOL"]]
+GENERATE = [*EMULATOR, os.environ["TAV_GENERATE"]]
 # A build with sanitizers needs terabytes of addresses and more time: limits of memory and of time say nothing there.
 SANITIZED = os.environ.get("TAV_SANITIZED", "") != ""
 
@@ -23,21 +28,21 @@ class Result:
 
 def tav(*arguments, stdin=None, **more):
     """Runs the program; it has to end within a minute."""
-    done = subprocess.run([TAV, *map(str, arguments)], input=stdin if stdin is not None else b"",
+    done = subprocess.run([*TAV, *map(str, arguments)], input=stdin if stdin is not None else b"",
                           capture_output=True, timeout=60, **more)
     return Result(done)
 
 
 def tav_in_little_memory(*arguments):
     """Runs the program where it gets 400 MiB of addresses, its own code included."""
-    if SANITIZED:
+    if SANITIZED or EMULATOR:  # an emulator takes all addresses that it can get
         return tav(*arguments)
     return tav(*arguments, preexec_fn=lambda: resource.setrlimit(resource.RLIMIT_AS, (400 << 20, 400 << 20)))
 
 
 def generate(path, *options):
     """Writes a random stream and returns what is in it."""
-    done = subprocess.run([GENERATE, str(path), *map(str, options)], capture_output=True, check=True, timeout=60)
+    done = subprocess.run([*GENERATE, str(path), *map(str, options)], capture_output=True, check=True, timeout=60)
     return json.loads(done.stdout)
 
 

@@ -1,16 +1,33 @@
-/// @file machine.h
-/// Everything that the program asks of the operating system beside the library and the standard library. The one file
-/// with system headers is machine.cpp.
+/// @file host.h
+/// What the project's own programs ask of the operating system beside files: the terminal, standard streams, signals,
+/// names of files, and what the machine tells about itself. Texts and paths are UTF-8. Linked into the programs;
+/// libkor neither has nor exports it.
 #pragma once
 
 #include <cstdint>
 #include <cstdio>
+#include <filesystem>
 #include <optional>
 #include <string>
 #include <vector>
 
-namespace tav::tool
+namespace tav::kor
 {
+/// The words behind the program's name, in UTF-8.
+std::vector<std::string> commandLine(int argc, char** argv);
+
+/// The path that a UTF-8 text names; from a plain text the standard library makes one by the machine's code page.
+inline std::filesystem::path pathOf(const std::string& utf8)
+{
+  return {std::u8string(utf8.begin(), utf8.end())};
+}
+
+/// A path's UTF-8 text.
+inline std::string textOf(const std::filesystem::path& path)
+{
+  const std::u8string utf8 = path.u8string();
+  return {utf8.begin(), utf8.end()};
+}
 
 /// Whether a standard stream is a terminal.
 bool isTerminal(FILE* stream);
@@ -18,7 +35,8 @@ bool isTerminal(FILE* stream);
 /// Columns of the terminal on standard output; nothing when there is none.
 std::optional<unsigned> terminalWidth();
 
-/// Switches standard input and output to bytes, and makes a closed pipe an error of the write.
+/// Makes all standard streams streams of bytes, where a line ends as it was written, and a closed pipe an error of the
+/// write. A program that is interrupted or told to end removes the file of `removeOnInterrupt` first.
 void prepareStandardStreams();
 
 /// Removes a file when the program is interrupted or told to end; one file at a time, an empty path stands for none.
@@ -27,6 +45,12 @@ void removeOnInterrupt(const std::string& path);
 
 /// The number of this process, for names of temporary files.
 uint64_t processId();
+
+/// Removes a file; false when that does not work, also because it is open where that is in the way.
+bool removeFile(const std::string& path);
+
+/// `std::fopen` for any path; `mode` is one of "rb", "wb".
+FILE* openStream(const std::string& path, const char* mode);
 
 /// Moves a file into place; without `replace` it never takes the place of another one, not even of one that appeared
 /// just now. Returns a code of codes.h.
@@ -59,5 +83,4 @@ struct MachineFacts
 };
 
 MachineFacts describeMachine();
-
-} // namespace tav::tool
+} // namespace tav::kor

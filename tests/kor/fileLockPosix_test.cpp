@@ -1,3 +1,4 @@
+#include "kor/childPosix.h"
 #include "kor/testFiles.h"
 #include "tav/kor.h"
 

@@ -1,0 +1,124 @@
+#include "kor/testFiles.h"
+#include "kor/windows.h"
+#include "tav/kor.h"
+
+#include <chrono>
+#include <cstdlib>
+#include <future>
+#include <gtest/gtest.h>
+#include <process.h>
+#include <string>
+
+namespace
+{
+constexpr uint32_t kShared = 0;
+constexpr uint32_t kExclusive = 1;
+constexpr uint32_t kWait = 0;
+constexpr uint32_t kDoNotWait = 2;
+
+/// What is locked belongs to the handle, in this process and in others.
+class FileLock : public testing::Test
+{
+protected:
+  void SetUp() override
+  {
+    ASSERT_EQ(openFile(file_, path_, KOR_FILE_UPDATE | KOR_FILE_CREATE), TAV_RC_OK);
+    ASSERT_EQ(openFile(other_, path_, KOR_FILE_UPDATE), TAV_RC_OK);
+  }
+
+  TestFolder folder_;
+  std::string path_ = folder_ / "locked";
+  KORHFile file_;
+  KORHFile other_;
+};
+
+TEST_F(FileLock, KeepsAnotherOpenFileOut)
+{
+  ASSERT_EQ(lockFile(file_, kExclusive, kDoNotWait), TAV_RC_OK);
+  EXPECT_EQ(lockFile(other_, kExclusive, kDoNotWait), KOR_RC_LOCKED);
+  EXPECT_EQ(lockFile(other_, kShared, kDoNotWait), KOR_RC_LOCKED);
+}
+
+TEST_F(FileLock, UnlockLetsAnotherOpenFileIn)
+{
+  ASSERT_EQ(lockFile(file_, kExclusive, kDoNotWait), TAV_RC_OK);
+  ASSERT_EQ(file_.unlock(), TAV_RC_OK);
+  EXPECT_EQ(lockFile(other_, kExclusive, kDoNotWait), TAV_RC_OK);
+}
+
+TEST_F(FileLock, CloseLetsAnotherOpenFileIn)
+{
+  ASSERT_EQ(lockFile(file_, kExclusive, kDoNotWait), TAV_RC_OK);
+  ASSERT_EQ(file_.close(), TAV_RC_OK);
+  EXPECT_EQ(lockFile(other_, kExclusive, kDoNotWait), TAV_RC_OK);
+}
+
+TEST_F(FileLock, SharedLocksStandBesideEachOther)
+{
+  ASSERT_EQ(lockFile(file_, kShared, kDoNotWait), TAV_RC_OK);
+  EXPECT_EQ(lockFile(other_, kShared, kDoNotWait), TAV_RC_OK);
+  EXPECT_EQ(lockFile(other_, kExclusive, kDoNotWait), KOR_RC_LOCKED);
+}
+
+TEST_F(FileLock, TheSecondLockReplacesTheFirst)
+{
+  ASSERT_EQ(lockFile(file_, kExclusive, kDoNotWait), TAV_RC_OK);
+  EXPECT_EQ(lockFile(file_, kShared, kDoNotWait), TAV_RC_OK);
+  EXPECT_EQ(lockFile(other_, kShared, kDoNotWait), TAV_RC_OK);
+  EXPECT_EQ(file_.unlock(), TAV_RC_OK);
+  EXPECT_EQ(file_.unlock(), KOR_RC_NOT_LOCKED);
+}
+
+TEST_F(FileLock, ARefusedReplacementLeavesNone)
+{
+  ASSERT_EQ(lockFile(other_, kShared, kDoNotWait), TAV_RC_OK);
+  ASSERT_EQ(lockFile(file_, kShared, kDoNotWait), TAV_RC_OK);
+  EXPECT_EQ(lockFile(file_, kExclusive, kDoNotWait), KOR_RC_LOCKED);
+  EXPECT_EQ(file_.unlock(), KOR_RC_NOT_LOCKED);
+  EXPECT_EQ(lockFile(other_, kExclusive, kDoNotWait), TAV_RC_OK);
+}
+
+TEST_F(FileLock, UnlockWithoutALockIsRefused)
+{
+  EXPECT_EQ(file_.unlock(), KOR_RC_NOT_LOCKED);
+}
+
+TEST_F(FileLock, AWaitingLockComesWhenTheOtherIsGone)
+{
+  ASSERT_EQ(lockFile(other_, kExclusive, kDoNotWait), TAV_RC_OK);
+  auto waiting = std::async(std::launch::async, [this] { return lockFile(file_, kExclusive, kWait); });
+  EXPECT_EQ(waiting.wait_for(std::chrono::milliseconds(50)), std::future_status::timeout);
+  ASSERT_EQ(other_.unlock(), TAV_RC_OK);
+  EXPECT_EQ(waiting.get(), TAV_RC_OK);
+}
+
+constexpr const char* kPathVariable = "TAV_TEST_LOCKED_FILE";
+
+/// Not a test of its own: what the other process of KeepsAnotherProcessOut does.
+TEST(FileLockOfTheOtherProcess, DISABLED_IsTried)
+{
+  const char* const path = std::getenv(kPathVariable);
+  ASSERT_NE(path, nullptr);
+  KORHFile file;
+  ASSERT_EQ(openFile(file, path, KOR_FILE_UPDATE), TAV_RC_OK);
+  std::exit(static_cast<int>(lockFile(file, kExclusive, kDoNotWait) & 0xFF));
+}
+
+int tryInAnotherProcess(const std::string& path)
+{
+  _putenv_s(kPathVariable, path.c_str());
+  wchar_t program[MAX_PATH];
+  GetModuleFileNameW(nullptr, program, MAX_PATH);
+  return static_cast<int>(_wspawnl(_P_WAIT, program, L"kor_tests", L"--gtest_also_run_disabled_tests",
+                                   L"--gtest_filter=FileLockOfTheOtherProcess.DISABLED_IsTried", nullptr));
+}
+
+TEST_F(FileLock, KeepsAnotherProcessOut)
+{
+  other_.close();
+  ASSERT_EQ(lockFile(file_, kExclusive, kDoNotWait), TAV_RC_OK);
+  EXPECT_EQ(tryInAnotherProcess(path_), static_cast<int>(KOR_RC_LOCKED & 0xFF));
+  ASSERT_EQ(file_.unlock(), TAV_RC_OK);
+  EXPECT_EQ(tryInAnotherProcess(path_), 0);
+}
+} // namespace
