@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # Installs what is missing, builds and runs every test.
 #   ./test.sh          with g++, optimised
-#   ./test.sh --full   what CI runs: the checks of the sources, both compilers, the sanitizers, static libraries
+#   ./test.sh --full   what CI runs: the checks of the sources, both compilers, the sanitizers, fuzzing, other platforms
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")"
 
@@ -85,14 +85,56 @@ check_documents()
 
 check_thread()
 {
-  build tsan --target kor_tests
-  run_tests tsan --label-regex '^kor$'
+  build tsan --target kor_tests threads_tests
+  run_tests tsan --label-regex '^(kor|threads)$'
 }
 
-# Tests that compile programs say nothing new under a sanitizer; the longest ones of the program run once, with g++ and
-# without sanitizers.
-compiles='cpp\.misuse|install\..*'
-slow='tools\.(json|check|recover|build|forms)_test'
+# run_rooms PRESET FOLDER ENDING ROOM...: the programs of whole rooms, each in one go, which spares an emulator thousands
+# of starts; adds to the totals what they count themselves.
+run_rooms()
+{
+  local preset=$1 folder=$PWD/build/$1/$2 ending=$3 room status
+  shift 3
+  for room in "$@"; do
+    status=0
+    (cd tests && $emulator "$folder/${room}_tests$ending" --gtest_brief=1) >"$work/tests.log" 2>&1 || status=$?
+    count_room "$preset" "$room" "$status" || return 1
+  done
+}
+
+# gtest_count WHAT: a number of the last lines that the test framework prints.
+gtest_count()
+{
+  tr -d '\r' <"$work/tests.log" | grep -oE "^\[  $1 *\] [0-9]+ test" | grep -m 1 -oE '[0-9]+' || echo 0
+}
+
+count_room()
+{
+  local good bad out
+  good=$(gtest_count PASSED)
+  bad=$(gtest_count FAILED)
+  out=$(gtest_count SKIPPED)
+  passed=$((passed + good))
+  failed=$((failed + bad))
+  skipped=$((skipped + out))
+  echo "$1, $2: $good passed, $bad failed, $out skipped"
+  if (($3 != 0 || bad > 0 || good == 0)); then
+    tail -n 60 "$work/tests.log"
+    totals
+    return 1
+  fi
+}
+
+# The rooms that every platform runs; the properties over fewer streams, as emulated machines are slow.
+rooms=(kor format storage dictionary api golden cpp)
+check_platform()
+{
+  local preset=$1 folder=$2 ending=$3 emulator=$4
+  build "$preset"
+  run_rooms "$preset" "$folder" "$ending" "${rooms[@]}"
+  TAV_TEST_CASES=2000 run_rooms "$preset" "$folder" "$ending" property
+  [[ -z $emulator ]] || run_tests "$preset" --label-regex '^platform$'
+}
 
 # The tests link the library's objects statically everywhere; here the installed static libraries are what is new.
 check_static()
@@ -112,10 +154,14 @@ full()
   stage "clang++" build_and_test clang --exclude-regex "^($slow)$"
   stage "static libraries" check_static
   stage "g++, address and undefined behaviour" build_and_test asan --exclude-regex "^($compiles|$slow)$"
-  stage "clang++, address and undefined behaviour" build_and_test asan-clang --exclude-regex "^($compiles|$slow)$"
+  stage "fuzzing with clang++, address and undefined behaviour" fuzz/run.sh 60
   stage "g++, threads" check_thread
+  stage "libc++" check_platform libcxx tests "" ""
+  stage "s390x, big-endian" check_platform s390x tests "" "qemu-s390x-static -L /usr/s390x-linux-gnu"
+  stage "Windows" check_platform windows bin .exe "$PWD/cmake/run-windows.sh"
   stage "Debian packages" cmake/check-packages.sh
   stage "binary interface" tests/abi/check.sh
+  stage "benchmarks, once" ./bench.sh --quick
 }
 
 work=$(mktemp -d)
@@ -127,7 +173,7 @@ case ${1:-} in
     stage "g++" build_and_test release
     ;;
   --full)
-    stage "packages" cmake/install-packages.sh build test full
+    stage "packages" cmake/install-packages.sh build test full platforms bench
     # The same sources are compiled again and again, at every place where the project is checked out.
     export CMAKE_CXX_COMPILER_LAUNCHER=ccache CCACHE_BASEDIR=$PWD CCACHE_NOHASHDIR=1
     export CCACHE_SLOPPINESS=pch_defines,time_macros,include_file_mtime,include_file_ctime

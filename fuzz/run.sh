@@ -6,6 +6,7 @@
 # runs as a test from then on.
 #   FUZZ_BUILD=FOLDER    another build folder
 #   FUZZ_WORK=FOLDER     another place for what is made
+#   FUZZ_JOBS=N          how many targets at a time; as many as there are processors
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")/.."
 
@@ -20,34 +21,47 @@ targets=("$@")
 
 build=${FUZZ_BUILD:-build/fuzz}
 work=${FUZZ_WORK:-build/fuzz-work}
+jobs=${FUZZ_JOBS:-$(nproc)}
 mkdir -p "$work"
 cmake --preset fuzz -B "$build" >"$work/configure.log" || { cat "$work/configure.log"; exit 1; }
 cmake --build "$build" --parallel "$(nproc)" --target "${targets[@]/#/fuzz_}" tav_tool >"$work/build.log" || { cat "$work/build.log"; exit 1; }
 fuzz/seeds.py "$build/tools/tav" "$work/seeds" >"$work/seeds.log"
 
 export ASAN_OPTIONS=detect_stack_use_after_return=1:allocator_may_return_null=1 UBSAN_OPTIONS=print_stacktrace=1
-status=0
-for target in "${targets[@]}"; do
-  made=$work/corpus/$target
-  found=$work/findings/$target
+
+# fuzz TARGET: runs it from everything that is known for it.
+fuzz()
+{
+  local target=$1 log=$work/$1.log made=$work/corpus/$1 found=$work/findings/$1 kind runs reached
   mkdir -p "$made" "$found"
-  folders=("$made" "$work/seeds/$target")
+  local folders=("$made" "$work/seeds/$target")
   for kind in corpus findings; do
     [[ -d fuzz/$kind/$target ]] && folders+=("fuzz/$kind/$target")
   done
-  log=$work/$target.log
   # Texts are long and hold words; streams are short.
-  more=()
+  local more=()
   [[ -f fuzz/$target.dict ]] && more+=("-dict=fuzz/$target.dict")
   if "$build/fuzz/fuzz_$target" -max_total_time="$seconds" -timeout=20 -rss_limit_mb=2048 -max_len=1024 -close_fd_mask=2 \
     -print_final_stats=1 -artifact_prefix="$found/" "${more[@]}" "${folders[@]}" 2>"$log"; then
     runs=$(sed -n 's/^stat::number_of_executed_units: //p' "$log")
     reached=$(grep -oE 'cov: [0-9]+ ft: [0-9]+ corp: [0-9]+/[0-9a-zA-Z]+' "$log" | tail -n 1)
     echo "$target: ${runs:-?} executions, $reached, no finding"
-  else
-    echo "$target: FOUND, see $log and $found"
-    tail -n 40 "$log"
-    status=1
+    return 0
   fi
+  echo "$target: FOUND, see $log and $found"
+  tail -n 40 "$log"
+  return 1
+}
+
+status=0
+running=0
+for target in "${targets[@]}"; do
+  if ((running == jobs)); then
+    wait -n || status=1
+    running=$((running - 1))
+  fi
+  fuzz "$target" &
+  running=$((running + 1))
 done
+for ((; running > 0; --running)); do wait -n || status=1; done
 exit "$status"
