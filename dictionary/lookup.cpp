@@ -106,16 +106,16 @@ const TAVElementEntry* findElement(uint16_t id)
   return findInRange(elementDirectory()[rangeFor(id)], id);
 }
 
-const char* elementEnumName(uint16_t id)
+EnumName elementEnumName(uint16_t id)
 {
   const TAVElementEntry* entry = findElement(id);
-  return entry != nullptr ? entry->enumName : kUnknownElement;
+  return entry != nullptr ? enumNameOf(*entry) : EnumName(kUnknownElement);
 }
 
 const char* elementTagName(uint16_t id)
 {
   const TAVElementEntry* entry = findElement(id);
-  return entry != nullptr ? entry->tagName : kUnknownElement;
+  return entry != nullptr ? tagNameOf(*entry) : kUnknownElement;
 }
 
 } // namespace tav

@@ -1,20 +1,102 @@
 /// @file table.cpp
 /// The entries and the range directory, made from elements.def at compile time.
 #include "dictionary/dictionary.h"
+#include "dictionary/namingRule.h"
 
+#include <algorithm>
 #include <array>
 #include <iterator>
+#include <string_view>
 
 namespace tav
 {
 namespace
 {
 
-constexpr TAVElementEntry kEntries[] = {
+/// A line of elements.def, for the compiler only.
+struct Listed
+{
+  uint16_t id;
+  std::string_view enumName;
+  std::string_view tagName;
+};
+
+constexpr Listed kListed[] = {
 #define TAV_ELEMENT(id, constant, enumName, tagName) {id, enumName, tagName},
-#define TAV_ELEMENT_PLACEHOLDER(id) {id, "INVALID_ELEMENT", "invalid_element"},
+#define TAV_ELEMENT_PLACEHOLDER(id) {id, {}, {}},
 #include "tav/elements.def"
 };
+
+constexpr std::string_view kPlaceholderEnumName = "INVALID_ELEMENT";
+constexpr std::string_view kPlaceholderTagName = "invalid_element";
+
+constexpr size_t kEntryCount = std::size(kListed);
+
+/// Which enum names follow from the tag names. A constant of its own, as are the next two: a compiler takes only so
+/// many steps to find the value of one.
+constexpr std::array<bool, kEntryCount> kFollows = [] {
+  std::array<bool, kEntryCount> follows{};
+  for (size_t i = 0; i < kEntryCount; ++i)
+  {
+    follows[i] = followsFromTag(kListed[i].enumName, kListed[i].tagName);
+  }
+  return follows;
+}();
+
+constexpr size_t kStringBytes = [] {
+  size_t bytes = kPlaceholderEnumName.size() + kPlaceholderTagName.size() + 2;
+  for (size_t i = 0; i < kEntryCount; ++i)
+  {
+    const Listed& element = kListed[i];
+    bytes += element.tagName.empty() ? 0 : element.tagName.size() + 1;
+    bytes += element.tagName.empty() || kFollows[i] ? 0 : element.enumName.size() + 1;
+  }
+  return bytes;
+}();
+
+/// The strings behind each other, each with its NUL, and the entries that point out their places.
+struct Table
+{
+  std::array<char, kStringBytes> strings;
+  std::array<TAVElementEntry, kEntryCount> entries;
+  size_t used;
+
+  constexpr size_t add(std::string_view text)
+  {
+    const size_t place = used;
+    for (const char character : text)
+    {
+      strings[used++] = character;
+    }
+    ++used; // the NUL is there
+    return place;
+  }
+};
+
+constexpr Table makeTable()
+{
+  Table table{};
+  const size_t placeholderEnumName = table.add(kPlaceholderEnumName);
+  const size_t placeholderTagName = table.add(kPlaceholderTagName);
+  for (size_t i = 0; i < kEntryCount; ++i)
+  {
+    const Listed& element = kListed[i];
+    const bool placeholder = element.tagName.empty();
+    const size_t tagName = placeholder ? placeholderTagName : table.add(element.tagName);
+    const size_t enumName = placeholder ? placeholderEnumName : kFollows[i] ? tagName
+                                                                            : table.add(element.enumName);
+    table.entries[i].id = element.id;
+    table.entries[i].enumNamePlace = enumName & 0xFFFFFF;
+    table.entries[i].tagNamePlace = tagName & 0xFFFFFF;
+  }
+  return table;
+}
+
+constexpr Table kTable = makeTable();
+
+static_assert(kTable.used == kStringBytes && kStringBytes <= 0xFFFFFF);
+static_assert(std::all_of(std::begin(kListed), std::end(kListed),
+                          [](const Listed& element) { return element.enumName.size() < EnumName::kRoom; }));
 
 struct Bounds
 {
@@ -35,7 +117,7 @@ constexpr std::array<TAVElementRange, kElementRangeCount + 1> makeDirectory()
   uint64_t start = 0;
   for (size_t i = 0; i < kElementRangeCount; ++i)
   {
-    directory[i] = {1, kBounds[i].firstId, kBounds[i].count, kEntries + start};
+    directory[i] = {1, kBounds[i].firstId, kBounds[i].count, kTable.entries.data() + start};
     start += kBounds[i].count;
   }
   return directory;
@@ -58,7 +140,7 @@ constexpr bool everyRangeIsDense()
     }
     total += kDirectory[i].count;
   }
-  return total == std::size(kEntries);
+  return total == kEntryCount;
 }
 
 static_assert(everyRangeIsDense());
@@ -68,6 +150,17 @@ static_assert(everyRangeIsDense());
 const TAVElementRange* elementDirectory()
 {
   return kDirectory.data();
+}
+
+EnumName enumNameOf(const TAVElementEntry& entry)
+{
+  const char* const text = kTable.strings.data() + entry.enumNamePlace;
+  return entry.enumNamePlace == entry.tagNamePlace ? EnumName::fromTag(text) : EnumName(text);
+}
+
+const char* tagNameOf(const TAVElementEntry& entry)
+{
+  return kTable.strings.data() + entry.tagNamePlace;
 }
 
 } // namespace tav

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <optional>
 #include <set>
+#include <string>
 #include <string_view>
 
 #include <gtest/gtest.h>
@@ -38,8 +39,8 @@ TEST(ElementNames, AreThoseOfTheLibraryForAllIds)
   {
     const auto wanted = static_cast<uint16_t>(id);
     const TAVElementEntry* entry = findElement(wanted);
-    ASSERT_EQ(dictionary::nameOf(wanted), entry != nullptr ? entry->enumName : "") << id;
-    ASSERT_EQ(dictionary::tagOf(wanted), entry != nullptr ? entry->tagName : "") << id;
+    ASSERT_EQ(dictionary::nameOf(wanted), entry != nullptr ? std::string(enumNameOf(*entry)) : "") << id;
+    ASSERT_EQ(dictionary::tagOf(wanted), entry != nullptr ? tagNameOf(*entry) : "") << id;
   }
 }
 
@@ -53,8 +54,8 @@ TEST(ElementNames, ListTheEntriesOfTheLibraryInItsOrder)
     {
       ASSERT_NE(next, dictionary::entries().end());
       EXPECT_EQ(next->id, range.pEntries[k].id);
-      EXPECT_EQ(next->name, range.pEntries[k].enumName);
-      EXPECT_EQ(next->tag, range.pEntries[k].tagName);
+      EXPECT_EQ(next->name, std::string_view(enumNameOf(range.pEntries[k])));
+      EXPECT_EQ(next->tag, tagNameOf(range.pEntries[k]));
     }
   }
   EXPECT_EQ(next, dictionary::entries().end());

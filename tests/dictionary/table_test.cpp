@@ -38,7 +38,7 @@ uint64_t fingerprint(const TAVElementRange& range)
   uint64_t hash = 0xcbf29ce484222325;
   for (const TAVElementEntry& entry : entriesOf(range))
   {
-    const std::string line = std::to_string(entry.id) + '|' + entry.enumName + '|' + entry.tagName + '\n';
+    const std::string line = std::to_string(entry.id) + '|' + enumNameOf(entry).c_str() + '|' + tagNameOf(entry) + '\n';
     for (const char character : line)
     {
       hash = (hash ^ static_cast<unsigned char>(character)) * 0x100000001b3;
@@ -101,8 +101,8 @@ TEST_P(DirectoryRange, HoldsConsecutiveIdsToItsLast)
 
 TEST_P(DirectoryRange, BeginsAndEndsWithItsNames)
 {
-  EXPECT_THAT(entriesOf(range()).front().enumName, StrEq(expected().firstName));
-  EXPECT_THAT(entriesOf(range()).back().enumName, StrEq(expected().lastName));
+  EXPECT_THAT(enumNameOf(entriesOf(range()).front()).c_str(), StrEq(expected().firstName));
+  EXPECT_THAT(enumNameOf(entriesOf(range()).back()).c_str(), StrEq(expected().lastName));
 }
 
 TEST_P(DirectoryRange, HoldsTheNamesThatItAlwaysHeld)
@@ -126,7 +126,7 @@ class CommonElement : public ::testing::TestWithParam<ExpectedNames>
 
 TEST_P(CommonElement, HasItsTwoNames)
 {
-  EXPECT_THAT(elementEnumName(GetParam().id), StrEq(GetParam().enumName));
+  EXPECT_THAT(elementEnumName(GetParam().id).c_str(), StrEq(GetParam().enumName));
   EXPECT_THAT(elementTagName(GetParam().id), StrEq(GetParam().tagName));
 }
 
@@ -143,7 +143,7 @@ class ExceptionToTheNamingRule : public ::testing::TestWithParam<ExpectedNames>
 
 TEST_P(ExceptionToTheNamingRule, KeepsItsTwoNames)
 {
-  std::string_view enumName = elementEnumName(GetParam().id);
+  std::string enumName(elementEnumName(GetParam().id));
   if (GetParam().id == kTrackedNameId)
   {
     enumName = enumName.substr(0, enumName.find(' '));
@@ -174,8 +174,8 @@ TEST(ElementTable, HoldsTheListInItsOrder)
     {
       ASSERT_NE(listed, std::end(kListedElements));
       EXPECT_EQ(entry.id, listed->id);
-      EXPECT_EQ(entry.enumName, listed->enumName);
-      EXPECT_EQ(entry.tagName, listed->tagName);
+      EXPECT_EQ(std::string_view(enumNameOf(entry)), listed->enumName);
+      EXPECT_EQ(tagNameOf(entry), listed->tagName);
       ++listed;
     }
   }
@@ -198,9 +198,9 @@ TEST(ElementTable, HasPlaceholdersAtTheUnusedIdsOnly)
   {
     for (const TAVElementEntry& entry : entriesOf(range))
     {
-      const bool placeholder = std::string_view(entry.enumName) == "INVALID_ELEMENT";
+      const bool placeholder = std::string_view(enumNameOf(entry)) == "INVALID_ELEMENT";
       EXPECT_EQ(placeholder, isPlaceholderId(entry.id)) << entry.id;
-      EXPECT_EQ(placeholder, std::string_view(entry.tagName) == "invalid_element") << entry.id;
+      EXPECT_EQ(placeholder, std::string_view(tagNameOf(entry)) == "invalid_element") << entry.id;
       placeholders += placeholder ? 1 : 0;
     }
   }
@@ -219,9 +219,9 @@ TEST(ElementTable, DerivesEveryOtherMonitorTagFromTheEnumName)
       {
         continue;
       }
-      const std::string_view name = entry.enumName;
+      const std::string name(enumNameOf(entry));
       ASSERT_TRUE(name.starts_with(kPrefix)) << entry.id;
-      EXPECT_EQ(entry.tagName, lowerCase(name.substr(kPrefix.size()))) << entry.id;
+      EXPECT_EQ(tagNameOf(entry), lowerCase(name.substr(kPrefix.size()))) << entry.id;
       ++derived;
     }
   }
@@ -238,17 +238,17 @@ TEST(ElementTable, HasNoExceptionThatFollowsTheNamingRule)
 
 TEST(ElementTable, HasEveryEnumNameOnceButThePlaceholders)
 {
-  std::multiset<std::string_view> names;
+  std::multiset<std::string> names;
   for (const TAVElementRange& range : directory())
   {
     for (const TAVElementEntry& entry : entriesOf(range))
     {
-      names.insert(entry.enumName);
+      names.emplace(enumNameOf(entry));
     }
   }
   EXPECT_EQ(names.count("INVALID_ELEMENT"), 154U);
   names.erase("INVALID_ELEMENT");
-  for (const std::string_view name : names)
+  for (const std::string& name : names)
   {
     EXPECT_EQ(names.count(name), 1U) << name;
   }
@@ -265,7 +265,8 @@ TEST(ElementTable, KeepsTheBlankBeforeTheScanSharingNames)
 
 TEST(ElementTable, KeepsTheBlanksAndTheCommentBehindOneName)
 {
-  const std::string_view name = elementEnumName(kTrackedNameId);
+  const std::string held(elementEnumName(kTrackedNameId));
+  const std::string_view name = held;
   const std::string start = "SQLM_ELM_MAX_PARTITION" + std::string(35, ' ');
   ASSERT_TRUE(name.starts_with(start));
   const std::string_view comment = name.substr(start.size());
@@ -277,8 +278,8 @@ TEST(ElementTable, KeepsTheBlanksAndTheCommentBehindOneName)
 
 TEST(ElementTable, KeepsTwoNamesWithAMisspelledPrefix)
 {
-  EXPECT_THAT(elementEnumName(46145), StrEq("SQLM_EML_FMP_EXEC_HIST_ROUTINE_ID"));
-  EXPECT_THAT(elementEnumName(46146), StrEq("SQLM_EML_FMP_EXEC_HIST_TIMESTAMP"));
+  EXPECT_THAT(elementEnumName(46145).c_str(), StrEq("SQLM_EML_FMP_EXEC_HIST_ROUTINE_ID"));
+  EXPECT_THAT(elementEnumName(46146).c_str(), StrEq("SQLM_EML_FMP_EXEC_HIST_TIMESTAMP"));
 }
 
 TEST(ElementTable, KeepsTheBlankBehindOneTag)
