@@ -100,7 +100,8 @@ KOR_API const char* korCodeName(uint32_t code);
 /// @{
 
 /// The trace control block. Tracing is on while `g_pWTCB` is not null and `enable` is not 0; both may be
-/// switched at any time, the library reads them before every record.
+/// switched at any time, the library reads them before every record. A step that began while tracing was off and that
+/// calls nothing outside the library ends without records.
 struct KORTraceCB
 {
   uint32_t reserved[3];
