@@ -55,6 +55,20 @@ uint32_t fixedValue(const RawValue& raw, uint16_t type, Value& out) noexcept
   return TAV_RC_OK;
 }
 
+/// The type of an integer or a timestamp.
+template<class T>
+constexpr uint16_t fixedType() noexcept
+{
+  if constexpr (std::same_as<T, TAVTimeStamp>)
+  {
+    return TAV_TYPE_UTC_TIMESTAMP;
+  }
+  else
+  {
+    return integerType<T>();
+  }
+}
+
 template<StreamInteger T>
 uint32_t decode(const RawValue& raw, T& out) noexcept
 {

@@ -37,7 +37,7 @@ public:
   template<class T>
   HeaderView add(uint16_t elm, const T& value, const NodeOptions& options = {})
   {
-    TAVHeaderData node{};
+    TAVHeaderData node;
     detail::demand(append(node, elm, value, options), "adding an element");
     return HeaderView(node.header);
   }
@@ -59,7 +59,7 @@ public:
   template<uint16_t Type, class T>
   HeaderView add(uint16_t elm, T value, const NodeOptions& options = {})
   {
-    TAVHeaderData node{};
+    TAVHeaderData node;
     detail::demand(appendAs<Type>(node, elm, value, options), "adding an element");
     return HeaderView(node.header);
   }
@@ -154,8 +154,6 @@ public:
 private:
   friend class Writer;
 
-  static constexpr uint32_t kNoLevel = ~uint32_t{0};
-
   Group(detail::WriterRef state, uint32_t level, uint32_t outer) noexcept
       : state_(std::move(state)), level_(level), outer_(outer)
   {
@@ -164,7 +162,9 @@ private:
   static Group open(const detail::WriterRef& state, uint32_t outer, uint16_t elm, const GroupOptions& options,
                     uint32_t& rc) noexcept
   {
-    rc = state ? state->enter(outer) : TAV_RC_BAD_PARAM;
+    const bool quick = state && state->quick == outer;
+    rc = quick ? TAV_RC_OK : state ? state->enter(outer)
+                                   : TAV_RC_BAD_PARAM;
     if (rc == TAV_RC_OK)
     {
       rc = state->openGroup(elm, options);
@@ -174,13 +174,21 @@ private:
       return Group(detail::WriterRef(nullptr), 0, 0);
     }
     state->innermost = state->depth();
+    if (quick && options.children == Width::bits64)
+    {
+      state->quick = state->innermost;
+    }
+    else
+    {
+      state->settle();
+    }
     return Group(state, state->innermost, outer);
   }
 
   /// The level for the shared checks: one that no group has when this one is closed.
   [[nodiscard]] uint32_t own() const noexcept
   {
-    return level_ != 0 ? level_ : kNoLevel;
+    return level_ != 0 ? level_ : detail::WriterState::kNoLevel;
   }
 
   [[nodiscard]] uint32_t enter(uint64_t how = 0) const noexcept
@@ -196,12 +204,35 @@ private:
                   "text, tav::Utf8, bytes, 64-bit words, tav::Uint128, a timestamp or a system time");
     if constexpr (detail::Addable<T>)
     {
-      const uint32_t rc = enter();
       const auto write = [&](uint16_t type, const uint8_t* bytes, uint64_t size) {
-        return state_->append(node, type, elm, options, bytes, size);
+        return state_->appendQuickly(node, type, elm, options, bytes, size);
       };
-      return rc == TAV_RC_OK ? detail::withPayload(value, write) : rc;
+      if (isQuick(options)) [[likely]]
+      {
+        return detail::withPayload(value, write);
+      }
+      const NodeOptions kept(options); // so that the quick way needs none in memory
+      return appendSlowly(node, elm, kept, [&value](auto& slow) { return detail::withPayload(value, slow); });
     }
+  }
+
+  /// Whether a data element can be added without a look at anything else.
+  [[gnu::always_inline]] bool isQuick(const NodeOptions& options) const noexcept
+  {
+    return state_ && state_->quick == level_ && options.infoKey <= TAV_INFO_KEY_MASK;
+  }
+
+  /// When there is something to look at before. `give(write)` calls `write` with the payload.
+  template<class Give>
+  [[gnu::noinline]] uint32_t appendSlowly(TAVHeaderData& node, uint16_t elm, const NodeOptions& options,
+                                          const Give& give) noexcept
+  {
+    node = {};
+    const uint32_t rc = enter();
+    const auto write = [&](uint16_t type, const uint8_t* bytes, uint64_t size) {
+      return state_->append(node, type, elm, options, bytes, size);
+    };
+    return rc == TAV_RC_OK ? give(write) : rc;
   }
 
   template<uint16_t Type, class T>
@@ -212,11 +243,15 @@ private:
     static_assert(StreamInteger<T>, "only an integer can be added as an integer type");
     if constexpr (detail::isIntegerTypeCode<Type> && StreamInteger<T>)
     {
-      const uint32_t rc = enter();
       const auto write = [&](uint16_t type, const uint8_t* bytes, uint64_t size) {
-        return state_->append(node, type, elm, options, bytes, size);
+        return state_->appendQuickly(node, type, elm, options, bytes, size);
       };
-      return rc == TAV_RC_OK ? detail::withPayloadAs<Type>(value, write) : rc;
+      if (isQuick(options)) [[likely]]
+      {
+        return detail::withPayloadAs<Type>(value, write);
+      }
+      const NodeOptions kept(options); // so that the quick way needs none in memory
+      return appendSlowly(node, elm, kept, [&value](auto& slow) { return detail::withPayloadAs<Type>(value, slow); });
     }
   }
 
@@ -250,7 +285,8 @@ private:
 
   uint32_t end(uint64_t how) noexcept
   {
-    uint32_t rc = enter(how);
+    const bool quick = state_ && state_->quick == level_;
+    uint32_t rc = quick ? TAV_RC_OK : enter(how);
     if (rc == TAV_RC_OK)
     {
       rc = state_->endInnermost(how);
@@ -259,6 +295,14 @@ private:
     {
       level_ = 0;
       state_->innermost = outer_;
+      if (quick && outer_ != 0)
+      {
+        state_->quick = outer_; // a group of 64-bit headers stands in one
+      }
+      else
+      {
+        state_->settle();
+      }
     }
     return rc;
   }
@@ -279,6 +323,7 @@ private:
       ++state.orphans;
       state.innermost = outer_;
     }
+    state.settle();
   }
 
   detail::WriterRef state_;

@@ -77,7 +77,14 @@ public:
   }
 
 protected:
-  TAVHeaderData data_{}; ///< whole, so that a walk can read its next node right into the present one
+  explicit HeaderView(const TAVHeaderData& data) noexcept
+      : data_(data)
+  {
+  }
+
+  /// Whole, so that a walk can read its next node right into the present one. Mutable for the payload's place, which a
+  /// node renews when it is asked for a payload that a ring no longer holds.
+  mutable TAVHeaderData data_{};
 };
 
 } // namespace tav

@@ -4,6 +4,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <cstring>
 #include <optional>
 #include <span>
 #include <string_view>
@@ -119,6 +120,13 @@ public:
   /// A node of no stream, to be assigned to.
   Node() = default;
 
+  /// As HeaderView::isGroup; what comes with a payload is told from a group by that.
+  [[nodiscard]] bool isGroup() const noexcept
+  {
+    const bool hasPayload = layout::is64(data_.header) && data_.pDataBuf != nullptr;
+    return !hasPayload && HeaderView::isGroup();
+  }
+
   /// The children of a group, in order: `for (const tav::Node& child : node.children())`. Damage on the way throws, or
   /// ends the walk and sets `ec`, which outlives the range. A data element has none.
   [[nodiscard]] ChildRange children(EndElements endElements = EndElements::skip) const;
@@ -186,13 +194,26 @@ public:
   template<Readable T>
   [[nodiscard]] T as() const
   {
-    T value{};
-    detail::demand(read(value), "reading a value");
-    return value;
+    if constexpr (kIsUsual<T>)
+    {
+      if (isQuick<T>()) [[likely]]
+      {
+        return readQuickly<T>();
+      }
+    }
+    return readWhole<T>();
   }
   template<Readable T>
   [[nodiscard]] T as(std::error_code& ec) const
   {
+    if constexpr (kIsUsual<T>)
+    {
+      if (isQuick<T>()) [[likely]]
+      {
+        ec.clear();
+        return readQuickly<T>();
+      }
+    }
     T value{};
     detail::report(read(value), ec);
     return value;
@@ -231,24 +252,33 @@ private:
   friend class Reader;
   friend class ChildRange;
   friend class DescendantRange;
+  friend class Path;
 
   /// A node of no known group.
   Node(detail::ReaderState& state, const TAVHeaderData& data) noexcept
-      : HeaderView(data.header), state_(&state), bytes_(data.pDataBuf), fetch_(state.fetches)
+      : HeaderView(data), state_(&state), fetch_(state.fetches), isQuick_(state.isQuick)
   {
   }
   /// A node that a walk stands on: the walk moves it on.
   explicit Node(detail::ReaderState* state) noexcept
-      : state_(state)
+      : state_(state), isQuick_(state != nullptr && state->isQuick)
   {
   }
   /// Reads the node behind `reference`, which may be this one's own header, or the first one below the parent.
-  uint32_t readNext(TAVHeader* parent, TAVHeader* reference) noexcept
+  [[gnu::always_inline]] uint32_t readNext(TAVHeader* parent, TAVHeader* reference) noexcept
   {
-    fetch_ = ++state_->fetches;
-    const uint32_t rc = tavGetNextChild(0, state_->handle, parent, reference, &data_);
-    bytes_ = data_.pDataBuf;
-    return rc;
+    detail::ReaderState& state = *state_;
+    if (!isQuick_) [[unlikely]]
+    {
+      fetch_ = ++state.fetches;
+    }
+    return tavGetNextChild(0, state.handle, parent, reference, &data_);
+  }
+
+  /// Surely no end element. A quick look: those have the largest ids.
+  [[nodiscard]] bool isUsual() const noexcept
+  {
+    return layout::is64(data_.header) && data_.header.hdr64.elm < TAV_ELM_CMN_END_HDR_MARKER;
   }
 
   [[nodiscard]] bool hasParent() const noexcept
@@ -258,7 +288,7 @@ private:
 
   [[nodiscard]] PayloadView view() const noexcept
   {
-    return isGroup() ? PayloadView() : PayloadView(bytes_, size(), state_);
+    return isGroup() ? PayloadView() : PayloadView(data_.pDataBuf, size(), state_);
   }
 
   /// Reads the payload again when the ring may have moved on since. The stream may have changed, too: then
@@ -282,7 +312,7 @@ private:
     }
     if (rc == TAV_RC_OK)
     {
-      bytes_ = again.pDataBuf;
+      data_.pDataBuf = again.pDataBuf;
       fetch_ = state_->fetches;
     }
     return rc;
@@ -293,7 +323,49 @@ private:
   uint32_t withRaw(Decode&& decode) const
   {
     const uint32_t rc = refresh();
-    return rc == TAV_RC_OK ? decode(detail::RawValue{type(), bytes_, size(), state_->isSwapped()}) : rc;
+    return rc == TAV_RC_OK ? decode(detail::RawValue{type(), data_.pDataBuf, size(), state_->isSwapped()}) : rc;
+  }
+  /// Types that are read without a look at anything else, from a quick stream and a 64-bit header.
+  template<class T>
+  static constexpr bool kIsUsual =
+      StreamInteger<T> || std::same_as<T, TAVTimeStamp> || std::same_as<T, std::string_view>;
+
+  /// Whether a value can be taken as it stands.
+  template<class T>
+  [[gnu::always_inline]] bool isQuick() const noexcept
+  {
+    const TAVHeader64& header = data_.header.hdr64;
+    if constexpr (std::same_as<T, std::string_view>)
+    {
+      return layout::is64(data_.header) && header.type == TAV_TYPE_ASCII_STRING && isQuick_;
+    }
+    else
+    {
+      return layout::is64(data_.header) && header.type == detail::fixedType<T>() && header.size == sizeof(T) &&
+             isQuick_;
+    }
+  }
+  template<class T>
+  [[gnu::always_inline]] T readQuickly() const noexcept
+  {
+    if constexpr (std::same_as<T, std::string_view>)
+    {
+      return {reinterpret_cast<const char*>(data_.pDataBuf), static_cast<size_t>(data_.header.hdr64.size)};
+    }
+    else
+    {
+      T value;
+      std::memcpy(&value, data_.pDataBuf, sizeof value);
+      return value;
+    }
+  }
+  /// Out of line for the usual types, which rarely come here.
+  template<class T>
+  [[gnu::noinline]] T readWhole() const
+  {
+    T value{};
+    detail::demand(read(value), "reading a value");
+    return value;
   }
   template<class T>
   uint32_t read(T& value) const
@@ -331,10 +403,10 @@ private:
   }
 
   detail::ReaderState* state_ = nullptr;
-  mutable const uint8_t* bytes_ = nullptr;
   mutable uint64_t fetch_ = 0;
   TAVHeader parent_{}; ///< header type 0: not known, or none
   bool isRoot_ = false;
+  bool isQuick_ = false; ///< of a stream that was quick when the node was read
 };
 
 } // namespace tav

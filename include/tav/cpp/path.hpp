@@ -41,6 +41,43 @@ public:
     }
   }
 
+  /// The first match below `start`, when the first match of every step leads there; else null, which tells nothing.
+  /// Over memory the library looks through a level without handing out what it passes.
+  [[nodiscard]] std::optional<Node> findStraight(const Node& start) const noexcept
+  {
+    std::optional<Node> found;
+    if (!isStraight_ || start.state_ == nullptr || !start.state_->isQuick)
+    {
+      return found;
+    }
+    TAVHeaderData nodes[2];
+    nodes[0].header = start.data_.header;
+    size_t current = 0;
+    for (const Step& step : steps_)
+    {
+      TAVHeaderData& parent = nodes[current];
+      current ^= 1U;
+      if (!layout::isGroup(parent.header) || tavFindElmInt(start.state_->handle, &parent.header, 0, 0, 0, step.only,
+                                                           nullptr, nullptr, &nodes[current]) != TAV_RC_OK)
+      {
+        return found;
+      }
+    }
+    found = Node(*start.state_, nodes[current]);
+    found->parent_ = nodes[current ^ 1U].header;
+    return found;
+  }
+
+  /// The first match below `start`, whatever leads there.
+  void walkToFirst(const Node& start, std::optional<Node>& found, std::error_code& ec) const
+  {
+    const auto keep = [&found](const Node& node) {
+      found = node;
+      return false;
+    };
+    visitBelow(start, keep, ec);
+  }
+
   /// Whether a node is what the path's first step asks for, so that the rest can be searched below it.
   [[nodiscard]] bool beginsWith(const Node& node) const noexcept
   {
@@ -52,6 +89,7 @@ public:
   {
     Path path;
     path.steps_.assign(steps_.begin() + (steps_.empty() ? 0 : 1), steps_.end());
+    path.isStraight_ = path.areStraight();
     return path;
   }
 
@@ -66,6 +104,7 @@ private:
   {
     std::vector<uint16_t> ids; ///< empty: any
     uint64_t nth = 0;          ///< 0: every match
+    uint16_t only = 0;         ///< the id, when there is one
 
     [[nodiscard]] bool matches(uint16_t elm) const noexcept
     {
@@ -74,6 +113,14 @@ private:
   };
 
   Path() = default;
+
+  /// Whether each step asks for the first child with one id. Elements that end a group are no children of it here.
+  [[nodiscard]] bool areStraight() const noexcept
+  {
+    return !steps_.empty() && std::all_of(steps_.begin(), steps_.end(), [](const Step& step) {
+      return step.ids.size() == 1 && step.nth <= 1 && !layout::isEndElement(step.only);
+    });
+  }
 
   /// One recursion a step: the path is the caller's, the stream's depth does not matter. False: enough.
   template<class Visit>
@@ -113,9 +160,11 @@ private:
         steps_.clear();
         return TAV_RC_BAD_PARAM;
       }
+      step.only = step.ids.size() == 1 ? step.ids.front() : uint16_t{0};
       steps_.push_back(std::move(step));
       text.remove_prefix(more ? slash + 1 : text.size());
     }
+    isStraight_ = areStraight();
     return TAV_RC_OK;
   }
 
@@ -168,6 +217,7 @@ private:
   }
 
   std::vector<Step> steps_;
+  bool isStraight_ = false; ///< findStraight can find it
 };
 
 inline std::vector<Node> Node::all(const Path& path, std::error_code& ec) const
@@ -202,19 +252,25 @@ inline std::vector<Node> Node::all(std::string_view path) const
 
 inline std::optional<Node> Node::path(const Path& path, std::error_code& ec) const
 {
-  std::optional<Node> found;
-  const auto keep = [&found](const Node& node) {
-    found = node;
-    return false;
-  };
-  path.visitBelow(*this, keep, ec);
+  std::optional<Node> found = path.findStraight(*this);
+  if (found)
+  {
+    ec.clear();
+    return found;
+  }
+  path.walkToFirst(*this, found, ec);
   return found;
 }
 
 inline std::optional<Node> Node::path(const Path& path) const
 {
+  std::optional<Node> found = path.findStraight(*this);
+  if (found)
+  {
+    return found;
+  }
   std::error_code ec;
-  std::optional<Node> found = this->path(path, ec);
+  path.walkToFirst(*this, found, ec);
   detail::demand(codeOf(ec), "searching a path");
   return found;
 }

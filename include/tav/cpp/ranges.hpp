@@ -7,6 +7,7 @@
 #include <iterator>
 #include <optional>
 #include <ranges>
+#include <utility>
 #include <vector>
 
 #include "tav/cpp/node.hpp"
@@ -17,7 +18,8 @@ namespace tav
 namespace detail
 {
 
-/// An iterator over a walk that lives in its range. `Walk` has `isDone()`, `current()` and `advance()`.
+/// An iterator over a walk that lives in its range. `Walk` has `current()` and `advance()`, which tells whether there
+/// is a node. The end is kept in the iterator, where a loop has it in a register.
 template<class Walk>
 class WalkIterator
 {
@@ -27,8 +29,9 @@ public:
   using difference_type = std::ptrdiff_t;
 
   WalkIterator() = default;
-  explicit WalkIterator(Walk& walk) noexcept
-      : walk_(&walk)
+  /// Null: at the end.
+  explicit WalkIterator(Walk* walk) noexcept
+      : walk_(walk)
   {
   }
 
@@ -42,12 +45,16 @@ public:
   }
   WalkIterator& operator++()
   {
-    walk_->advance();
+    Walk* const walk = std::exchange(walk_, nullptr); // at the end, too, when the step throws
+    if (walk->advance())
+    {
+      walk_ = walk;
+    }
     return *this;
   }
   void operator++(int)
   {
-    walk_->advance();
+    ++*this;
   }
   friend bool operator==(const WalkIterator& iterator, std::default_sentinel_t) noexcept
   {
@@ -57,14 +64,14 @@ public:
 private:
   [[nodiscard]] bool isAtEnd() const noexcept
   {
-    return walk_->isDone();
+    return walk_ == nullptr;
   }
 
   Walk* walk_ = nullptr;
 };
 
 /// The end of a walk: kept for who asks, or thrown.
-inline void endWalk(uint32_t rc, std::error_code* ec, const char* what)
+[[gnu::noinline, gnu::cold]] inline void endWalk(uint32_t rc, std::error_code* ec, const char* what)
 {
   const uint32_t failure = rc == TAV_RC_NO_MORE_CHILDREN ? TAV_RC_OK : rc;
   if (ec == nullptr)
@@ -89,9 +96,10 @@ public:
     if (!begun_)
     {
       begun_ = true;
-      first_ == TAV_RC_OK ? advance() : finish(first_);
+      TAVHeader* const reference = hasReference_ ? &current_.data_.header : nullptr;
+      arriveElsewhere(first_ == TAV_RC_OK ? current_.readNext(&current_.parent_, reference) : first_);
     }
-    return detail::WalkIterator<ChildRange>(*this);
+    return detail::WalkIterator<ChildRange>(done_ ? nullptr : this);
   }
   static std::default_sentinel_t end() noexcept
   {
@@ -134,42 +142,26 @@ private:
   {
     return current_;
   }
-  [[nodiscard]] bool isDone() const noexcept
+  /// Siblings lie ahead, whatever the bytes are: behind a node's end, or behind an eye catcher that is.
+  [[gnu::always_inline]] bool advance()
   {
-    return done_;
+    const uint32_t rc = current_.readNext(&current_.parent_, &current_.data_.header);
+    return (rc == TAV_RC_OK && current_.isUsual()) || arriveElsewhere(rc);
   }
 
-  void advance()
+  /// After a step that led to no node, or perhaps to an end element.
+  [[gnu::noinline]] bool arriveElsewhere(uint32_t rc)
   {
-    uint32_t rc = TAV_RC_OK;
-    do
+    while (rc == TAV_RC_OK && endElements_ == EndElements::skip && layout::isEndElement(current_.elm()))
     {
-      rc = step();
-    } while (rc == TAV_RC_OK && endElements_ == EndElements::skip && layout::isEndElement(current_.elm()));
+      rc = current_.readNext(&current_.parent_, &current_.data_.header);
+    }
     if (rc != TAV_RC_OK)
     {
-      finish(rc);
+      done_ = true;
+      detail::endWalk(rc, ec_, "walking the nodes of a group");
     }
-  }
-
-  void finish(uint32_t rc)
-  {
-    done_ = true;
-    detail::endWalk(rc, ec_, "walking the nodes of a group");
-  }
-
-  uint32_t step() noexcept
-  {
-    const uint64_t last = current_.offset();
-    TAVHeader* const reference = hasReference_ ? &current_.data_.header : nullptr;
-    const uint32_t rc = current_.readNext(&current_.parent_, reference);
-    // A sibling behind a group that was never closed is found by its eye catcher, which damage can place anywhere.
-    if (rc == TAV_RC_OK && hasReference_ && current_.offset() <= last)
-    {
-      return TAV_RC_OUTSIDE_PARENT;
-    }
-    hasReference_ = true;
-    return rc;
+    return rc == TAV_RC_OK;
   }
 
   Node current_; ///< knows the group that is walked
@@ -193,13 +185,10 @@ public:
     if (!begun_)
     {
       begun_ = true;
-      done_ = open_.empty();
-      if (!done_)
-      {
-        advance();
-      }
+      const uint32_t rc = current_.isGroup() ? descend() : TAV_RC_NO_MORE_CHILDREN;
+      arriveElsewhere(rc);
     }
-    return detail::WalkIterator<DescendantRange>(*this);
+    return detail::WalkIterator<DescendantRange>(done_ ? nullptr : this);
   }
   static std::default_sentinel_t end() noexcept
   {
@@ -219,78 +208,82 @@ private:
   DescendantRange(const Node& start, EndElements endElements, std::error_code* ec)
       : current_(start), ec_(ec), endElements_(endElements)
   {
-    if (start.isGroup())
-    {
-      open_.push_back(start.data_.header);
-    }
   }
 
   [[nodiscard]] const Node& current() const noexcept
   {
     return current_;
   }
-  [[nodiscard]] bool isDone() const noexcept
+  [[gnu::always_inline]] bool advance()
   {
-    return done_;
+    const uint32_t rc = step();
+    return (rc == TAV_RC_OK && current_.isUsual()) || arriveElsewhere(rc);
   }
 
-  void advance()
+  /// Down into a group, else on to the sibling. Both lie ahead, whatever the bytes are.
+  [[gnu::always_inline]] uint32_t step()
   {
-    uint32_t rc = TAV_RC_OK;
-    do
+    if (current_.isGroup()) [[unlikely]]
     {
+      return descend();
+    }
+    return current_.readNext(&current_.parent_, &current_.data_.header);
+  }
+
+  /// To the first child of the present node.
+  [[gnu::noinline]] uint32_t descend()
+  {
+    if (depth_ != 0)
+    {
+      outer_.push_back(current_.parent_);
+    }
+    ++depth_;
+    current_.parent_ = current_.data_.header;
+    return current_.readNext(&current_.parent_, nullptr);
+  }
+
+  /// After a step that led to no node, or perhaps to an end element.
+  [[gnu::noinline]] bool arriveElsewhere(uint32_t rc)
+  {
+    while (true)
+    {
+      if (rc == TAV_RC_NO_MORE_CHILDREN)
+      {
+        rc = climb();
+      }
+      if (rc != TAV_RC_OK)
+      {
+        done_ = true;
+        detail::endWalk(rc, ec_, "walking below a group");
+        return false;
+      }
+      if (endElements_ == EndElements::show || !layout::isEndElement(current_.elm()))
+      {
+        return true;
+      }
       rc = step();
-    } while (rc == TAV_RC_OK && endElements_ == EndElements::skip && layout::isEndElement(current_.elm()));
-    done_ = rc != TAV_RC_OK;
-    if (done_)
-    {
-      detail::endWalk(rc, ec_, "walking below a group");
     }
   }
 
-  /// Down into a group, on to the sibling, or up until there is one.
-  uint32_t step()
+  /// Up, until there is a sibling. It can lie before the present node, where only damage leads.
+  uint32_t climb() noexcept
   {
     const uint64_t last = current_.offset();
-    TAVHeader ended;
-    TAVHeader* reference = depth_ != 0 ? &current_.data_.header : nullptr;
-    if (reference != nullptr && current_.isGroup())
+    uint32_t rc = TAV_RC_NO_MORE_CHILDREN;
+    while (rc == TAV_RC_NO_MORE_CHILDREN && !outer_.empty())
     {
-      open_.push_back(*reference);
-      reference = nullptr;
+      TAVHeader ended = current_.parent_;
+      current_.parent_ = outer_.back();
+      outer_.pop_back();
+      --depth_;
+      rc = current_.readNext(&current_.parent_, &ended);
     }
-    while (!open_.empty())
-    {
-      const uint32_t rc = current_.readNext(&open_.back(), reference);
-      if (rc != TAV_RC_NO_MORE_CHILDREN)
-      {
-        return rc == TAV_RC_OK ? arrive(last) : rc;
-      }
-      ended = open_.back();
-      open_.pop_back();
-      reference = &ended;
-    }
-    return TAV_RC_NO_MORE_CHILDREN;
+    return rc == TAV_RC_OK && current_.offset() <= last ? TAV_RC_OUTSIDE_PARENT : rc;
   }
 
-  /// Backwards is where only damage leads.
-  uint32_t arrive(uint64_t last) noexcept
-  {
-    if (current_.offset() <= last)
-    {
-      return TAV_RC_OUTSIDE_PARENT;
-    }
-    if (current_.parent_.nodeOffset != open_.back().nodeOffset || depth_ == 0)
-    {
-      current_.parent_ = open_.back();
-    }
-    depth_ = open_.size();
-    return TAV_RC_OK;
-  }
-
-  Node current_;
-  std::vector<TAVHeader> open_;
-  size_t depth_ = 0;
+  Node current_;                 ///< knows the group that is walked
+  std::vector<TAVHeader> outer_; ///< the groups around that one
+  size_t depth_ = 0;             ///< 0: still at the start
   std::error_code* ec_;
   EndElements endElements_;
   bool begun_ = false;

@@ -225,8 +225,8 @@ public:
     {
       return nullptr;
     }
-    ++state_->fetches;
-    return state_->handle;
+    state_->isQuick = false; // a plain operation can give the handle another storage
+    return use();
   }
 
 private:
@@ -237,7 +237,20 @@ private:
 
   uint32_t open(TAVSideStorage* storage, const StreamOptions& options) noexcept
   {
-    return detail::openHandle(storage, TAV_OPT_READ, options, state_->handle);
+    const uint32_t rc = detail::openHandle(storage, TAV_OPT_READ, options, state_->handle);
+    state_->settle();
+    return rc;
+  }
+
+  /// The handle for an operation of this reader; null without one.
+  [[nodiscard]] TAVHandle* use() const noexcept
+  {
+    if (state_ == nullptr)
+    {
+      return nullptr;
+    }
+    ++state_->fetches;
+    return state_->handle;
   }
 
   uint32_t openBytes(std::span<const std::byte> bytes, const StreamOptions& options)
@@ -258,7 +271,7 @@ private:
   template<class Operation>
   uint32_t read(Node& node, Operation&& operation) const noexcept
   {
-    TAVHandle* const used = handle();
+    TAVHandle* const used = use();
     if (used == nullptr)
     {
       return TAV_RC_BAD_PARAM;
@@ -322,7 +335,7 @@ private:
 
   uint32_t printNode(FILE* stream, const Node& node, const PrintOptions& options, uint64_t& characters) const noexcept
   {
-    TAVHandle* const used = handle();
+    TAVHandle* const used = use();
     if (used == nullptr || node.state_ != state_.get())
     {
       return TAV_RC_BAD_PARAM;
@@ -338,7 +351,7 @@ private:
     Node first;
     const uint32_t rc = readRoot(first);
     TAVHeader header = first.header();
-    return rc == TAV_RC_OK ? tavValidateHierarchy(0, handle(), &header) : rc;
+    return rc == TAV_RC_OK ? tavValidateHierarchy(0, use(), &header) : rc;
   }
 
   std::unique_ptr<detail::ReaderState> state_;

@@ -112,12 +112,12 @@ public:
   template<class T>
   void update(const HeaderView& node, const T& value)
   {
-    detail::demand(detail::updateValue(handle(), node, value), "updating an element");
+    detail::demand(detail::updateValue(state_ ? state_->handle : nullptr, node, value), "updating an element");
   }
   template<class T>
   void update(const HeaderView& node, const T& value, std::error_code& ec) noexcept
   {
-    detail::report(detail::updateValue(handle(), node, value), ec);
+    detail::report(detail::updateValue(state_ ? state_->handle : nullptr, node, value), ec);
   }
 
   /// Ends the stream: reports what a destructor could not, writes what a ring still holds, and lets the storage go;
@@ -152,7 +152,13 @@ public:
   /// The handle, for the plain operations; null after finish(). Not owned.
   [[nodiscard]] TAVHandle* handle() const noexcept
   {
-    return state_ ? state_->handle : nullptr;
+    if (!state_)
+    {
+      return nullptr;
+    }
+    state_->isShared = true;
+    state_->settle();
+    return state_->handle;
   }
 
 private:

@@ -42,17 +42,21 @@ uint32_t infoOf(const Options& options) noexcept
 /// Kept by a plain count: a writer and its groups belong to one thread.
 struct WriterState
 {
+  static constexpr uint32_t kNoLevel = ~uint32_t{0}; ///< that no group has
+
   uint32_t users = 1;
   TAVHandle* handle = nullptr;
   std::unique_ptr<TAVSideStorage> owned;
   std::unique_ptr<GrowingBlock> block;
   Width root = Width::bits64;
+  uint32_t quick = kNoLevel;           ///< level of a group that takes 64-bit nodes without a further look
   uint32_t innermost = 0;              ///< level of the innermost Group that is there and open; 1 for the root
   uint32_t orphans = 0;                ///< groups inside it that are still open, their Group objects gone
   uint32_t deferred = TAV_RC_OK;       ///< the first failure that a destructor could not report
   std::span<const std::byte> finished; ///< the stream, when it was in memory, after its end
   uint64_t finishedSize = 0;
   bool isFinished = false;
+  bool isShared = false; ///< the handle was given away: plain operations can open and close groups
 
   WriterState() = default;
   WriterState(const WriterState&) = delete;
@@ -68,6 +72,14 @@ struct WriterState
     {
       tavTermHandle(&handle);
     }
+    settle();
+  }
+
+  /// After whatever `enter` and `width` look at has changed: nodes are added by the dozen in between.
+  void settle() noexcept
+  {
+    const bool plain = handle != nullptr && !isShared && deferred == TAV_RC_OK && orphans == 0 && innermost != 0;
+    quick = plain && block == nullptr && depth() == innermost && width() == Width::bits64 ? innermost : kNoLevel;
   }
 
   /// Groups that are open in the stream.
@@ -102,7 +114,9 @@ struct WriterState
     }
     if (deferred != TAV_RC_OK) [[unlikely]]
     {
-      return std::exchange(deferred, TAV_RC_OK);
+      const uint32_t rc = std::exchange(deferred, TAV_RC_OK);
+      settle();
+      return rc;
     }
     if (innermost != level || depth() != level + orphans) [[unlikely]]
     {
@@ -115,6 +129,7 @@ struct WriterState
           return rc;
         }
         --orphans;
+        settle();
       }
     return TAV_RC_OK;
   }
@@ -127,6 +142,18 @@ struct WriterState
       return TAV_RC_OK;
     }
     return layout::addChecked(bytes, around) ? block->reserve(handle, handle->streamBytes, bytes) : TAV_RC_NO_MEMORY;
+  }
+
+  /// Appends a data element to the quick group.
+  [[gnu::always_inline]] uint32_t appendQuickly(TAVHeaderData& node, uint16_t type, uint16_t elm,
+                                                const NodeOptions& options, const uint8_t* bytes,
+                                                uint64_t size) noexcept
+  {
+    static constexpr uint8_t nothing = 0;
+    fillHeader(node, true, type, elm, infoOf(options), size);
+    node.pDataBuf = const_cast<uint8_t*>(bytes != nullptr ? bytes : &nothing); // only read
+    node.dataBufSize = size;
+    return tavAddElement(0, handle, &node);
   }
 
   /// Appends a data element with the header form that the open group prescribes.
@@ -160,7 +187,7 @@ struct WriterState
     {
       return rc;
     }
-    const bool wide = width() == Width::bits64;
+    const bool wide = quick != kNoLevel || width() == Width::bits64;
     const auto type = static_cast<uint16_t>(wide ? options.children : Width::bits32);
     TAVHeaderData node{};
     fillHeader(node, wide, type, elm, infoOf(options), wide ? TAV_SIZE_UNKNOWN : layout::kSizeUnknown32);
