@@ -51,6 +51,7 @@ public:
   static EnumName fromTag(const char* tagName);
 
   /// Valid as long as this is.
+  // NOLINTNEXTLINE(google-explicit-constructor): a name is a text, wherever one is wanted
   operator std::string_view() const { return {text_.data(), length_}; }
   const char* c_str() const { return text_.data(); }
 
