@@ -1,13 +1,29 @@
 #include <array>
+#include <memory>
 #include <stdexcept>
+#include <utility>
 
 #include "support/platform.h"
 
 namespace test
 {
 
+namespace
+{
+
+using Stream = std::unique_ptr<FILE, int (*)(FILE*)>;
+
+/// The stream that was used last: a new file for each of thousands would cost more than the tests.
+Stream& spare()
+{
+  thread_local Stream stream(nullptr, &std::fclose);
+  return stream;
+}
+
+} // namespace
+
 CaughtStream::CaughtStream()
-    : stream_(temporaryStream())
+    : stream_(spare() != nullptr ? spare().release() : temporaryStream())
 {
   if (stream_ == nullptr)
   {
@@ -17,7 +33,11 @@ CaughtStream::CaughtStream()
 
 CaughtStream::~CaughtStream()
 {
-  std::fclose(stream_);
+  Stream stream(stream_, &std::fclose);
+  if (spare() == nullptr && emptyStream(stream_))
+  {
+    spare() = std::move(stream);
+  }
 }
 
 std::string CaughtStream::text()

@@ -17,6 +17,9 @@ const char* nullDevice();
 /// A new stream of bytes for writing and reading, in a file that goes with it.
 FILE* temporaryStream();
 
+/// Removes all that was written to such a stream; false when that does not work.
+bool emptyStream(FILE* stream);
+
 /// Sends standard output to `stream`; returns what `restoreOutput` takes.
 int redirectOutput(FILE* stream);
 void restoreOutput(int before);

@@ -29,6 +29,12 @@ FILE* temporaryStream()
   return std::tmpfile();
 }
 
+bool emptyStream(FILE* stream)
+{
+  std::rewind(stream);
+  return ftruncate(fileno(stream), 0) == 0;
+}
+
 int redirectOutput(FILE* stream)
 {
   std::fflush(stdout);

@@ -43,6 +43,12 @@ FILE* temporaryStream()
   return stream;
 }
 
+bool emptyStream(FILE* stream)
+{
+  std::rewind(stream);
+  return _chsize_s(_fileno(stream), 0) == 0;
+}
+
 int redirectOutput(FILE* stream)
 {
   std::fflush(stdout);
