@@ -141,6 +141,9 @@ check_platform()
   [[ -z $emulator ]] || run_tests "$preset" --tests-regex '^platform\.cross$'
 }
 
+# The longest tests of the program run once, with g++ and without sanitizers.
+slow='tools\.(json|check|recover|build|forms)_test'
+
 # Sanitizers keep a process busy at its start and its end, so rooms run as a whole; the program's tests as ever.
 check_sanitizers()
 {
