@@ -29,10 +29,10 @@ FILE* temporaryStream()
   return std::tmpfile();
 }
 
-bool emptyStream(FILE* stream)
+/// Not here: a stream that was read may keep what it read, and a new file costs little.
+bool emptyStream(FILE* /*stream*/)
 {
-  std::rewind(stream);
-  return ftruncate(fileno(stream), 0) == 0;
+  return false;
 }
 
 int redirectOutput(FILE* stream)

@@ -46,6 +46,7 @@ FILE* temporaryStream()
 bool emptyStream(FILE* stream)
 {
   std::rewind(stream);
+  std::fflush(stream); // or what was read stays in its buffer
   return _chsize_s(_fileno(stream), 0) == 0;
 }
 
