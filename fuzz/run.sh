@@ -42,7 +42,7 @@ fuzz()
   # Texts are long and hold words; streams are short.
   local more=()
   [[ -f fuzz/$target.dict ]] && more+=("-dict=fuzz/$target.dict")
-  if "$build/fuzz/fuzz_$target" -max_total_time="$seconds" -seed="${FUZZ_SEED:-0}" -timeout=20 -rss_limit_mb=2048 -max_len=1024 -close_fd_mask=2 \
+  if "$build/fuzz/fuzz_$target" -max_total_time="$seconds" -seed="${FUZZ_SEED:-0}" -timeout=20 -rss_limit_mb=2048 -max_len=1024 -close_fd_mask=3 \
     -print_final_stats=1 -artifact_prefix="$found/" "${more[@]}" "${folders[@]}" 2>"$log"; then
     runs=$(sed -n 's/^stat::number_of_executed_units: //p' "$log")
     reached=$(grep -oE 'cov: [0-9]+ ft: [0-9]+ corp: [0-9]+/[0-9a-zA-Z]+' "$log" | tail -n 1)
