@@ -65,6 +65,11 @@ uint32_t tav::growStack(TAVHdrStack& stack)
   return frame.code();
 }
 
+uint32_t TAVHdrStack::grow()
+{
+  return growStack(*this);
+}
+
 uint32_t TAVHdrStack::push(const TAVHeader* header)
 {
   return pushEntry<TraceFrame>(*this, header);

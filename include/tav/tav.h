@@ -378,6 +378,9 @@ public:
   TAVHeader* pEntries; ///< entry 0 is the outermost group
   uint32_t capacity;
   uint32_t count;
+
+private:
+  uint32_t grow(); ///< kept for the binary interface
 };
 
 /// How to open a handle.
