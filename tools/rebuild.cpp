@@ -37,6 +37,12 @@ void Rebuilder::open(TAVHeader header)
   groups_.push_back(header);
 }
 
+bool Rebuilder::isEmpty() const
+{
+  const TAVHeader& group = groups_.back();
+  return !hasEyeSize(group) && out_.length() == group.nodeOffset + headerLength(group.hdrType);
+}
+
 void Rebuilder::copy(uint64_t offset, uint64_t count)
 {
   while (count != 0)

@@ -35,6 +35,8 @@ public:
   void close();
 
   uint64_t depth() const { return groups_.size(); }
+  /// Whether the innermost group would have size 0 if it were closed now.
+  bool isEmpty() const;
   /// Whether children of the innermost group have 64-bit headers; of the file: its roots.
   bool wideChildren() const { return groups_.empty() ? form_.root64 : layout::hasChildren64(groups_.back()); }
 

@@ -93,10 +93,28 @@ Ending* Recovery::nextEnding()
 
 void Recovery::closeFinished()
 {
-  while (frames_.size() > 1 && frames_.back().limit <= position_)
+  while (frames_.size() > 1 && frames_.back().limit <= position_ && !keepsOpen())
   {
     closeGroup();
   }
+}
+
+/// A root of size 0 that something follows reads as one that was never closed: one that has lost all it held takes what
+/// comes behind it.
+bool Recovery::keepsOpen()
+{
+  Frame& top = frames_.back();
+  if (frames_.size() != 2 || top.hidden || top.wide != form_.root64 || position_ >= source_.size() ||
+      !rebuilder_.isEmpty())
+  {
+    return false;
+  }
+  totals_.closed += top.open ? 0 : 1;
+  top.limit = source_.size();
+  top.open = true;
+  top.sure = false;
+  top.sureAt = 0;
+  return true;
 }
 
 void Recovery::closeGroup()
@@ -208,7 +226,7 @@ bool Recovery::takeEnding()
   {
     lose(position_ + pair, "a damaged pair of an end element");
   }
-  if (top.open)
+  if (top.open && !keepsOpen())
   {
     closeGroup();
     ++totals_.closed;

@@ -118,6 +118,7 @@ private:
   bool leadsTo(uint64_t from, bool wide, uint64_t end);
 
   void closeFinished();
+  bool keepsOpen();
   bool takeEnding();
   bool takeEnd(uint64_t offset, bool wide);
   bool enterEnding();
