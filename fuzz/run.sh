@@ -1,22 +1,25 @@
 #!/usr/bin/env bash
-# Fuzzes for a time: builds the preset `fuzz`, runs each target from its corpus and all findings of the past, and fails
-# on a new finding. What is new in a corpus and what was found stays in build/fuzz-work.
+# Fuzzes for a time or a number of times: builds the preset `fuzz`, runs each target from its corpus and all findings
+# of the past, and fails on a new finding. What is new in a corpus and what was found stays in build/fuzz-work.
 #   fuzz/run.sh SECONDS [TARGET...]      targets: read write layer tool recover build; all unless some are named
+#   fuzz/run.sh fixed [TARGET...]        the same inputs in every run, as many as take about a minute: what fails fails
+#                                        everywhere, and a fast machine finds nothing that a slow one has passed
 # To reproduce: build/fuzz/fuzz/fuzz_TARGET FILE. A finding becomes a file in fuzz/findings/TARGET, which every build
 # runs as a test from then on.
 #   FUZZ_BUILD=FOLDER    another build folder
 #   FUZZ_WORK=FOLDER     another place for what is made
-#   FUZZ_SEED=N          the same choices in every run; others each time when unset
+#   FUZZ_SEED=N          which choices; 1 when their number is fixed, else others each time
 #   FUZZ_JOBS=N          how many targets at a time; as many as there are processors
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")/.."
 
-if (($# == 0)) || [[ ! $1 =~ ^[0-9]+$ ]]; then
-  echo "usage: $0 SECONDS [TARGET...]" >&2
+if (($# == 0)) || [[ ! $1 =~ ^([0-9]+|fixed)$ ]]; then
+  echo "usage: $0 SECONDS|fixed [TARGET...]" >&2
   exit 2
 fi
 seconds=$1
 shift
+declare -A executions=([read]=70000 [write]=20000 [layer]=140000 [tool]=20000 [recover]=90000 [build]=17000)
 targets=("$@")
 ((${#targets[@]} > 0)) || targets=(read write layer tool recover build)
 
@@ -34,15 +37,17 @@ export ASAN_OPTIONS=detect_stack_use_after_return=1:allocator_may_return_null=1 
 fuzz()
 {
   local target=$1 log=$work/$1.log made=$work/corpus/$1 found=$work/findings/$1 kind runs reached
+  [[ $seconds != fixed ]] || rm -rf "$made"
   mkdir -p "$made" "$found"
   local folders=("$made" "$work/seeds/$target")
   for kind in corpus findings; do
     [[ -d fuzz/$kind/$target ]] && folders+=("fuzz/$kind/$target")
   done
   # Texts are long and hold words; streams are short.
-  local more=()
+  local more=("-max_total_time=$seconds" "-seed=${FUZZ_SEED:-0}")
+  [[ $seconds != fixed ]] || more=("-runs=${executions[$target]}" "-seed=${FUZZ_SEED:-1}")
   [[ -f fuzz/$target.dict ]] && more+=("-dict=fuzz/$target.dict")
-  if "$build/fuzz/fuzz_$target" -max_total_time="$seconds" -seed="${FUZZ_SEED:-0}" -timeout=20 -rss_limit_mb=2048 -max_len=1024 -close_fd_mask=3 \
+  if "$build/fuzz/fuzz_$target" -timeout=20 -rss_limit_mb=2048 -max_len=1024 -close_fd_mask=3 \
     -print_final_stats=1 -artifact_prefix="$found/" "${more[@]}" "${folders[@]}" 2>"$log"; then
     runs=$(sed -n 's/^stat::number_of_executed_units: //p' "$log")
     reached=$(grep -oE 'cov: [0-9]+ ft: [0-9]+ corp: [0-9]+/[0-9a-zA-Z]+' "$log" | tail -n 1)
