@@ -165,7 +165,7 @@ int run(const Invocation& invocation)
       stream.bytes(), stream.form(), [&](RuleId rule) { return choice.wants(rule); },
       [&](const Finding& finding) { findings.put(finding); });
   {
-    Progress progress("check", stream.bytes().size());
+    Progress progress("check", stream.bytes());
     while (checker.step())
     {
       progress.at(checker.position());

@@ -53,7 +53,7 @@ public:
   Status run(const Invocation& invocation)
   {
     Walker walker(stream_.bytes(), stream_.form());
-    Progress progress("get", stream_.bytes().size());
+    Progress progress("get", stream_.bytes());
     Event event;
     while (!isDone() && walker.next(event))
     {

@@ -31,7 +31,7 @@ public:
   /// Dumps from `event` on, one node with all below it or everything.
   void dump(Walker& walker, Event& event, bool oneNode)
   {
-    Progress progress("hex", stream_.bytes().size());
+    Progress progress("hex", stream_.bytes());
     const uint64_t base = event.depth;
     do
     {

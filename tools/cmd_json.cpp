@@ -29,7 +29,7 @@ int run(const Invocation& invocation)
   // Also what is no stream at all is handed out: as damaged bytes.
   Stream stream = openStream(invocation, invocation.arguments().at(0), true);
   Walker walker(stream.bytes(), stream.form());
-  Progress progress("json", stream.bytes().size());
+  Progress progress("json", stream.bytes());
   JsonWriter writer(stream.bytes(), stream.form(), out, style, invocation.has("--safe"));
   writer.begin();
   Event event;

@@ -68,7 +68,7 @@ public:
   /// Prints what `walker` hands out from `event` on; `base` is the depth that is not indented.
   void print(Walker& walker, Event& event, uint64_t base, bool oneNode)
   {
-    Progress progress("tree", stream_.bytes().size());
+    Progress progress("tree", stream_.bytes());
     do
     {
       progress.at(event.offset);

@@ -340,7 +340,7 @@ int run(const Invocation& invocation)
   Output out(invocation.text("--output", "-"), invocation.has("--force"));
   Stream stream = openStream(invocation);
   Walker walker(stream.bytes(), stream.form());
-  Progress progress("xml", stream.bytes().size());
+  Progress progress("xml", stream.bytes());
   XmlWriter writer(stream, out);
   writer.begin();
   Event event;

@@ -52,7 +52,7 @@ DiffIndex::DiffIndex(Stream& stream, const std::vector<Path>& ignored)
     matchers.emplace_back(path);
   }
   Walker walker(stream.bytes(), stream.form());
-  Progress progress("diff " + name(), stream.bytes().size());
+  Progress progress("diff " + name(), stream.bytes());
   Event event;
   while (walker.next(event))
   {

@@ -16,8 +16,22 @@ Progress::Progress(std::string what, uint64_t totalBytes)
 {
 }
 
+Progress::Progress(std::string what, ByteSource& source)
+    : Progress(std::move(what), source.size())
+{
+  if (active_)
+  {
+    source_ = &source;
+    source.tellOfPieces([this](uint64_t offset) { show(offset); });
+  }
+}
+
 Progress::~Progress()
 {
+  if (source_ != nullptr)
+  {
+    source_->tellOfPieces({});
+  }
   if (shown_)
   {
     std::fputs("\r\033[K", stderr);

@@ -5,6 +5,8 @@
 #include <cstdint>
 #include <string>
 
+#include "tools/source.h"
+
 namespace tav::tool
 {
 
@@ -14,6 +16,8 @@ class Progress
 {
 public:
   Progress(std::string what, uint64_t totalBytes);
+  /// Also shows how far a source has come inside one long payload. The source outlives this object.
+  Progress(std::string what, ByteSource& source);
   ~Progress(); ///< wipes the line
   Progress(const Progress&) = delete;
   Progress& operator=(const Progress&) = delete;
@@ -31,6 +35,7 @@ private:
 
   using Clock = std::chrono::steady_clock;
   std::string what_;
+  ByteSource* source_ = nullptr;
   uint64_t total_;
   Clock::time_point start_ = Clock::now();
   Clock::time_point last_ = start_;

@@ -241,6 +241,10 @@ const ByteSource::Page& ByteSource::page(uint64_t number)
     const uint64_t ahead = std::min({run_ + 1, kLongRead / kPage, uint64_t{maxPages_} / 4 + 1});
     fetch(number, ahead);
     expected_ = number + ahead;
+    if (run_ != 0 && told_)
+    {
+      told_(number * kPage);
+    }
     found = places_.find(number);
   }
   Page& result = pages_[found->second];

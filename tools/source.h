@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <span>
 #include <string>
@@ -47,6 +48,9 @@ public:
   /// Valid until the next call of any function of this object.
   std::span<const uint8_t> view(uint64_t offset);
 
+  /// Names who is told, by offset, of each piece that is fetched while reading goes straight on; nobody when empty.
+  void tellOfPieces(std::function<void(uint64_t)> told) { told_ = std::move(told); }
+
   /// Bytes fetched from the file so far.
   uint64_t bytesRead() const { return bytesRead_; }
   /// Calls of the file's `read` so far.
@@ -82,6 +86,7 @@ private:
   std::vector<Page> pages_{};
   std::unordered_map<uint64_t, size_t> places_{};
   std::vector<uint8_t> buffer_{};
+  std::function<void(uint64_t)> told_{};
 };
 
 } // namespace tav::tool

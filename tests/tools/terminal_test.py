@@ -34,13 +34,13 @@ class TerminalTest(ToolTest):
             file.truncate(LONG)
         return path
 
-    def start(self, *arguments, width=80, terminal=("stdout", "stderr"), **more):
-        """Starts the program with some of its streams on a new terminal; the others go to a file."""
+    def start(self, *arguments, width=80, terminal=("stdout", "stderr"), other=None, **more):
+        """Starts the program with some of its streams on a new terminal; the others go to another file."""
         ours, theirs = pty.openpty()
         self.addCleanup(os.close, ours)
         fcntl.ioctl(theirs, termios.TIOCSWINSZ, struct.pack("HHHH", 24, width, 0, 0))
-        with open(self.folder / "elsewhere", "wb") as other:
-            streams = {name: theirs if name in terminal else other for name in ("stdout", "stderr")}
+        with open(other or self.folder / "elsewhere", "wb") as file:
+            streams = {name: theirs if name in terminal else file for name in ("stdout", "stderr")}
             run = subprocess.Popen([*TAV, *map(str, arguments)], stdin=subprocess.DEVNULL, **streams,
                                    env={**os.environ, "TERM": "xterm", **more})
         os.close(theirs)
@@ -122,6 +122,16 @@ class Progress(TerminalTest):
         self.assertRegex(text, r"recover: [\d.]+ \w+ of 16(\.0)? GiB \(\d+ %\), [\d.]+ \w+/s, \d+ s left")
         run.send_signal(signal.SIGINT)
         self.assertEqual(run.wait(timeout=60), -signal.SIGINT)
+
+    def test_it_is_shown_inside_one_long_payload(self):
+        path = self.long_stream()
+        form = ("--byte-order", "little", "--root", "64", "--no-align")
+        for command in (["json", path], ["xml", path], ["hex", path], ["get", path, "/**", "--raw", "--all"]):
+            with self.subTest(command[0]):
+                run, ours = self.start(*command, *form, terminal=("stderr",), other=os.devnull)
+                self.assertRegex(self.read(ours, until=r"s left"), command[0] + r": [\d.]+ \w+ of 16(\.0)? GiB")
+                run.send_signal(signal.SIGINT)
+                self.assertEqual(run.wait(timeout=60), -signal.SIGINT)
 
     def test_nothing_is_shown_when_standard_error_is_no_terminal(self):
         path = self.long_stream()
