@@ -208,9 +208,16 @@ bool Walker::looksUnfinished(const Node& node, const Frame& parent)
   const Node& around = parent.node;
   const bool unfinished =
       frames_.size() == 1 || (around.has(kOpen) && (around.size() == 0 || !hasEyeSize(around.header)));
-  return node.size() == 0 && (unfinished || (hasEyeSize(node.header) && parent.open)) &&
-         (prober_.judge(node.payloadOffset(), hasChildren64(node.header), parent.limit) >= Belief::typed ||
-          prober_.isChain(node.payloadOffset(), hasChildren64(node.header), parent.limit));
+  if (node.size() != 0 || !(unfinished || (hasEyeSize(node.header) && parent.open)))
+  {
+    return false;
+  }
+  // Children that nobody knows count unless what stands there is surely a sibling, with a header of the other width.
+  const uint64_t start = node.payloadOffset();
+  const bool wide = hasChildren64(node.header);
+  return prober_.judge(start, wide, parent.limit) >= Belief::typed ||
+         (prober_.judge(start, is64(node.header), parent.limit) < Belief::followed &&
+          prober_.isChain(start, wide, parent.limit));
 }
 
 void Walker::beginGroup(Node& node)
