@@ -121,9 +121,12 @@ uint32_t nextChildSilently(TAVHandle& handle, const TAVHeader& parent, const TAV
   return readSilently(handle, node, out) ? TAV_RC_OK : kUnusual;
 }
 
-/// Everything but the plain step.
-[[gnu::noinline]] uint32_t nextChildOther(uint64_t options, TAVHandle* handle, TAVHeader* parent, TAVHeader* refChild,
-                                          TAVHeaderData* out)
+using NextChild = uint32_t(uint64_t options, TAVHandle* handle, TAVHeader* parent, TAVHeader* refChild,
+                           TAVHeaderData* out);
+
+/// Everything but the plain steps.
+[[gnu::noinline]] uint32_t nextChildNotPlain(uint64_t options, TAVHandle* handle, TAVHeader* parent,
+                                             TAVHeader* refChild, TAVHeaderData* out)
 {
   // Without a parent the storage is asked for its size: a call that leaves the library.
   const bool silent =
@@ -141,34 +144,106 @@ uint32_t nextChildSilently(TAVHandle& handle, const TAVHeader& parent, const TAV
   return rc != kUnusual ? rc : nextChildTraced(options, handle, parent, refChild, out);
 }
 
-/// The plain step's end through a circular buffer: the child is known to start at `offset`.
-[[gnu::noinline]] uint32_t nextChildInRing(TAVHandle* handle, TAVHeader* parent, TAVHeader* refChild,
-                                           TAVHeaderData* out, uint64_t offset)
+/// A node with a 64-bit header in host order, as its two words, and its place in the block.
+struct PlainNode
 {
-  Node node{offset, {}, true};
-  DataPlace data{};
-  if (handle->pCircularBuf == nullptr || !readCachedHeader(*handle, node, data)) [[unlikely]]
+  uint64_t offset;
+  uint64_t size;
+  uint64_t rest; ///< the header's other fields
+  uint8_t* data;
+  uint64_t room; ///< bytes of the block from there on
+};
+
+[[gnu::always_inline]] inline void handOutPlain(const PlainNode& node, TAVHeaderData& out)
+{
+  std::memcpy(&out.header.hdr64, &node.size, sizeof node.size);
+  std::memcpy(&out.header.hdr64.info, &node.rest, sizeof node.rest);
+  out.header.hdrType = TAV_HDR_64;
+  out.header.nodeOffset = node.offset;
+  out.pDataBuf = node.data;
+  out.dataBufSize = node.room;
+  out.dataBufOffset = 0;
+}
+
+/// Where the level below a closed group ends; false where that passes 64 bits.
+[[gnu::always_inline]] inline bool findEnd(const TAVHeader& parent, uint64_t& end)
+{
+  return addFits(parent.hdr64.size, kHeaderSize64, end) && addFits(end, parent.nodeOffset, end);
+}
+
+/// Finds the place behind a node, or the first one below it. False if the block, which has to be the whole stream, has
+/// no header there, or the node is padded or has a pair. Otherwise no sum passes 64 bits: what it tells lies in the
+/// block.
+template<bool First>
+[[gnu::always_inline]] inline bool findPlainPlace(const TAVHandle& handle, const TAVHeader& before, PlainNode& node)
+{
+  const uint64_t size = First ? 0 : before.hdr64.size;
+  node.offset = before.nodeOffset + size + kHeaderSize64;
+  node.room = handle.directDataSize;
+  // Two checks in one: branches limit this, too.
+  const uint64_t flags = First ? 0 : before.hdr64.info & (TAV_INFO_ALIGNED8 | TAV_INFO_EYE_SIZE);
+  return (flags | handle.curOffset) == 0 &&
+         (First || (is64(before) && before.hdr64.elm < TAV_ELM_CMN_END_HDR_MARKER)) &&
+         takeRoom(node.room, before.nodeOffset) && takeRoom(node.room, size) && takeRoom(node.room, 2 * kHeaderSize64);
+}
+
+/// The end of the plain step where the child seems to be a group: apart, or the compiler would join it with the end for
+/// elements. `used` keeps its arguments where they are.
+[[gnu::noinline, gnu::used]] uint32_t nextGroup(uint64_t options, TAVHandle* handle, TAVHeader* parent,
+                                                TAVHeader* refChild, TAVHeaderData* out, uint64_t offset)
+{
+  const uint8_t* const header = handle->pDirectData + offset;
+  if (!isGroupType(typeAt(header))) [[unlikely]]
   {
-    return nextChildOther(0, handle, parent, refChild, out);
+    return nextChildNotPlain(options, handle, parent, refChild, out); // of a type that is none
   }
-  const bool hasData = !node.group();
-  handOut(node, data, hasData, false, *out);
-  if (hasData)
-  {
-    setArea(*handle, {offset + kHeaderSize64, data.start, data.room});
-  }
+  handOutPlain({offset, loadWord(header), loadWord(header + offsetof(TAVHeader64, info)), nullptr, 0}, *out);
   return TAV_RC_OK;
 }
 
-/// Where the sibling after a plain node starts; false for what is not plain.
-[[gnu::always_inline]] inline bool findPlainSibling(const TAVHeader& reference, uint64_t end, uint64_t& start)
+/// The step over closed groups of 64-bit headers in a block of memory, which most walks are over. Every other way out
+/// ends in one call with the same arguments, so that the step saves and moves no register.
+template<bool First, NextChild& Other>
+[[gnu::always_inline]] inline uint32_t nextChildPlain(uint64_t options, TAVHandle* handle, TAVHeader* parent,
+                                                      TAVHeader* refChild, TAVHeaderData* out)
 {
-  const uint64_t left = end - reference.nodeOffset;
-  const uint64_t size = reference.hdr64.size;
-  start = reference.nodeOffset + size + kHeaderSize64;
-  // A size below what is left passes no sum.
-  return is64(reference) && reference.nodeOffset < end && size < left && !isEndElement(reference.hdr64.elm) &&
-         (reference.hdr64.info & (TAV_INFO_ALIGNED8 | TAV_INFO_EYE_SIZE)) == 0;
+  PlainNode node{};
+  uint64_t end = 0;
+  if (!isUsualCall(options)) [[unlikely]]
+  {
+    return Other(options, handle, parent, refChild, out);
+  }
+  if (handle == nullptr || !isPlainBlock(*handle) || !isReadOnly(*handle) || handle->pDirectData == nullptr ||
+      parent == nullptr || !hasChildren64(*parent) || out == nullptr ||
+      !findPlainPlace<First>(*handle, First ? *parent : *refChild, node) || !findEnd(*parent, end)) [[unlikely]]
+  {
+    return Other(0, handle, parent, refChild, out);
+  }
+  if (node.offset >= end) [[unlikely]]
+  {
+    return node.offset == end ? TAV_RC_NO_MORE_CHILDREN : Other(0, handle, parent, refChild, out);
+  }
+  node.data = handle->pDirectData + node.offset + kHeaderSize64;
+  node.size = loadWord(node.data - kHeaderSize64);
+  node.rest = loadWord(node.data - kHeaderSize64 + offsetof(TAVHeader64, info));
+  if (typeAt(node.data - kHeaderSize64) <= TAV_TYPE_HEADER64) [[unlikely]]
+  {
+    return nextGroup(0, handle, parent, refChild, out, node.offset);
+  }
+  if (node.size > node.room) [[unlikely]]
+  {
+    return Other(0, handle, parent, refChild, out);
+  }
+  handOutPlain(node, *out);
+  return okAnew();
+}
+
+/// Everything but the plain step behind a node.
+[[gnu::noinline]] uint32_t nextChildOther(uint64_t options, TAVHandle* handle, TAVHeader* parent, TAVHeader* refChild,
+                                          TAVHeaderData* out)
+{
+  return refChild == nullptr ? nextChildPlain<true, nextChildNotPlain>(options, handle, parent, refChild, out)
+                             : nextChildNotPlain(options, handle, parent, refChild, out);
 }
 
 } // namespace
@@ -176,42 +251,6 @@ uint32_t nextChildSilently(TAVHandle& handle, const TAVHeader& parent, const TAV
 uint32_t tavGetNextChild(uint64_t options, TAVHandle* handle, TAVHeader* parent, TAVHeader* refChild,
                          TAVHeaderData* out)
 {
-  // Closed groups of 64-bit headers are what most walks are over. Every other way out ends in one call.
-  if (tracing() || handle == nullptr || parent == nullptr || out == nullptr || options != 0 ||
-      !isReadOnly(*handle) || !isPlain(*handle) || !hasChildren64(*parent)) [[unlikely]]
-  {
-    return nextChildOther(options, handle, parent, refChild, out);
-  }
-  Node node{0, {}, true};
-  uint64_t end = 0;
-  if (!addFits(parent->nodeOffset, kHeaderSize64, node.offset) || !addFits(node.offset, parent->hdr64.size, end) ||
-      (refChild != nullptr && !findPlainSibling(*refChild, end, node.offset))) [[unlikely]]
-  {
-    return nextChildOther(options, handle, parent, refChild, out);
-  }
-  if (node.offset >= end) [[unlikely]]
-  {
-    return node.offset == end ? TAV_RC_NO_MORE_CHILDREN : nextChildOther(options, handle, parent, refChild, out);
-  }
-  if (!isDirect(*handle))
-  {
-    return nextChildInRing(handle, parent, refChild, out, node.offset);
-  }
-  const Block block{handle->pDirectData, handle->directDataSize, false, false};
-  DataPlace data{};
-  if (handle->pDirectData == nullptr || handle->curOffset != 0 || !readHeader(block, node, data)) [[unlikely]]
-  {
-    return nextChildOther(options, handle, parent, refChild, out);
-  }
-  if (node.group()) [[unlikely]]
-  {
-    handOut(node, data, false, false, *out);
-    return TAV_RC_OK;
-  }
-  if (node.fields.size > data.room) [[unlikely]]
-  {
-    return nextChildOther(options, handle, parent, refChild, out);
-  }
-  handOut(node, data, true, false, *out);
-  return TAV_RC_OK;
+  return refChild != nullptr ? nextChildPlain<false, nextChildOther>(options, handle, parent, refChild, out)
+                             : nextChildOther(options, handle, parent, refChild, out);
 }

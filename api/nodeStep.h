@@ -16,6 +16,7 @@
 #include "api/rawWrite.h"
 #include "format/hdrStack.h"
 #include "format/layout.h"
+#include "kor/shared.h"
 #include "kor/traceFrame.h"
 #include "storage/cachedRun.h"
 #include "tav/probes.h"
@@ -26,6 +27,25 @@ namespace tav
 
 /// Never leaves the library: a silent step met something unusual.
 inline constexpr uint32_t kUnusual = ~uint32_t{0};
+
+/// Whether an exported step may be a silent one, in one look: it has no options, and tracing was never on. Where it was
+/// once, the other steps tell whether it is.
+[[gnu::always_inline]] inline bool isUsualCall(uint64_t options)
+{
+  return (reinterpret_cast<uintptr_t>(kor::loadRelaxed(g_pWTCB)) | options) == 0;
+}
+
+/// TAV_RC_OK as a value of its own. The compiler would return some field that was found to be 0 instead, and keep it in
+/// a register that has to be saved before.
+[[gnu::always_inline]] inline uint32_t okAnew()
+{
+  uint32_t rc = TAV_RC_OK;
+#if defined(__GNUC__)
+  __asm__(""
+          : "+r"(rc));
+#endif
+  return rc;
+}
 
 /// What a walk knows of a node, in registers where a TAVHeader would live in memory.
 struct Node

@@ -6,6 +6,7 @@
 #include <cstring>
 
 #include "storage/cachedRun.h"
+#include "tav/byteOrder.h"
 #include "tav/tav.h"
 
 namespace tav
@@ -31,6 +32,19 @@ uint32_t checkRoom(const TAVHandle& handle, uint64_t position, uint64_t length);
   uint16_t both = 0;
   std::memcpy(&both, &handle.alignMode, sizeof both);
   return both == 0;
+}
+
+/// Whether the stream is plain and stands in directly addressed memory: both flags and most of the options, which stand
+/// before them, in one look. What is not told apart here is no option that is known.
+[[gnu::always_inline]] inline bool isPlainBlock(const TAVHandle& handle)
+{
+  static_assert(offsetof(TAVHandle, alignMode) == offsetof(TAVHandle, options) + sizeof handle.options);
+  constexpr size_t mode = 2; // bytes of the options that tell how the handle was opened
+  constexpr uint64_t looked = kor::isLittleEndian ? ~uint64_t{0} : ~(uint64_t{0xFFFF} << (8 * mode));
+  constexpr uint64_t direct = kor::isLittleEndian ? TAV_OPT_DIRECT >> (8 * mode) : TAV_OPT_DIRECT << (8 * mode);
+  uint64_t word = 0;
+  std::memcpy(&word, reinterpret_cast<const uint8_t*>(&handle) + offsetof(TAVHandle, options) + mode, sizeof word);
+  return (word & looked) == direct;
 }
 
 /// Where `length` bytes at `position` can be written in place: in the block, or in bytes that the ring caches next to

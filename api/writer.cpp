@@ -120,11 +120,16 @@ template<bool Wide>
 [[gnu::always_inline]] inline bool isUsualChild(const TAVHandle& handle)
 {
   const TAVHdrStack* const stack = handle.pHdrStack;
-  if (stack == nullptr || stack->count == 0 || isReadOnly(handle)) [[unlikely]]
+  if (isReadOnly(handle) || stack == nullptr) [[unlikely]]
   {
     return false;
   }
-  const TAVHeader& parent = stack->pEntries[stack->count - 1];
+  const uint64_t open = stack->count;
+  if (open == 0) [[unlikely]]
+  {
+    return false;
+  }
+  const TAVHeader& parent = stack->pEntries[open - 1];
   return Wide ? is64(parent) && parent.hdr64.type != TAV_TYPE_HEADER32 : typeOf(parent) == TAV_TYPE_HEADER32;
 }
 
@@ -192,7 +197,48 @@ template<bool Wide>
   return TAV_RC_OK;
 }
 
-/// Appends a node in place, other than by addPlain; else `kUnusual`, with nothing done.
+/// Copies what copySmall would call for: as a function of its own that ends the caller, which then saves no registers.
+[[gnu::noinline]] uint32_t copyLong(uint8_t* to, const uint8_t* from, uint64_t length)
+{
+  std::memmove(to, from, length);
+  return TAV_RC_OK;
+}
+
+/// Copies a payload, most of which are one 32-bit or 64-bit value.
+[[gnu::always_inline]] inline uint32_t copyPayload(uint8_t* to, const uint8_t* from, uint64_t size)
+{
+  if (size == sizeof(uint32_t))
+  {
+    std::memcpy(to, from, sizeof(uint32_t));
+    return TAV_RC_OK;
+  }
+  if (size == sizeof(uint64_t))
+  {
+    std::memcpy(to, from, sizeof(uint64_t));
+    return TAV_RC_OK;
+  }
+  if (size > kLongestSmall)
+  {
+    return copyLong(to, from, size);
+  }
+  copySmall(to, from, size);
+  return TAV_RC_OK;
+}
+
+/// Puts a data element with a 64-bit header in host order, neither padded nor with a pair, behind the stream's last
+/// node. `to` is where its payload goes.
+[[gnu::always_inline]] inline uint32_t putPlain(TAVHandle& handle, TAVHeaderData& node, uint64_t size, uint64_t rest,
+                                                const uint8_t* payload, uint64_t position, uint8_t* to)
+{
+  node.header.nodeOffset = position;
+  handle.streamBytes = position + size + kHeaderSize64;
+  std::memcpy(to - kHeaderSize64, &size, sizeof size);
+  keepStoresApart();
+  std::memcpy(to - sizeof rest, &rest, sizeof rest);
+  return copyPayload(to, payload, size);
+}
+
+/// Appends a node in place, other than by putPlain; else `kUnusual`, with nothing done.
 template<bool Wide>
 uint32_t addSilently(TAVHandle& handle, TAVHeaderData& node)
 {
@@ -220,13 +266,6 @@ uint32_t addSilently(TAVHandle& handle, TAVHeaderData& node)
   default:
     return kUnusual;
   }
-}
-
-/// Copies what copySmall would call for: as a function of its own that ends the caller, which then saves no registers.
-[[gnu::noinline]] uint32_t copyLong(uint8_t* to, const uint8_t* from, uint64_t length)
-{
-  std::memmove(to, from, length);
-  return TAV_RC_OK;
 }
 
 } // namespace
@@ -288,46 +327,79 @@ namespace
   return frame.code();
 }
 
+/// Whether a node is a data element with its whole payload and without a pair.
+[[gnu::always_inline]] inline bool isPlainElement(const HeaderFields& fields, const uint8_t* payload, uint64_t length)
+{
+  return fields.type > TAV_TYPE_HEADER64 && length >= fields.size && (fields.info & TAV_INFO_EYE_SIZE) == 0 &&
+         payload != nullptr;
+}
+
+/// Whether a data element with a 64-bit header and so much payload fits into the block, the last byte of which is never
+/// used.
+[[gnu::always_inline]] inline bool fitsBlock(const TAVHandle& handle, uint64_t size)
+{
+  uint64_t room = handle.directDataSize;
+  return takeRoom(room, size) && takeRoom(room, kHeaderSize64) && room > handle.streamBytes &&
+         handle.pDirectData != nullptr;
+}
+
 /// Everything but the plain element.
-[[gnu::noinline]] uint32_t addOther(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
+[[gnu::noinline]] uint32_t addNotPlain(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
 {
   const bool silent = !tracing() && options == 0 && handle != nullptr && headerData != nullptr;
   const uint32_t rc = silent ? addSilently(*handle, *headerData) : kUnusual;
   return rc != kUnusual ? rc : addTraced(options, handle, headerData);
 }
 
+/// Everything but the plain element in a block of memory.
+[[gnu::noinline]] uint32_t addOther(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
+{
+  if (!isUsualCall(options) || handle == nullptr || headerData == nullptr || !isPlain(*handle) || isDirect(*handle) ||
+      !is64(headerData->header) || !isUsualChild<true>(*handle)) [[unlikely]]
+  {
+    return addNotPlain(options, handle, headerData);
+  }
+  const HeaderFields fields = fieldsOf<true>(headerData->header);
+  const uint8_t* const payload = headerData->pDataBuf;
+  const uint64_t position = handle->streamBytes;
+  uint8_t* const to = isPlainElement(fields, payload, headerData->dataBufSize) && fields.size <= kUsualSize
+                          ? takePlace(*handle, position, kHeaderSize64 + fields.size)
+                          : nullptr;
+  if (to == nullptr) [[unlikely]]
+  {
+    return addNotPlain(0, handle, headerData);
+  }
+  return putPlain(*handle, *headerData, fields.size, joinRest(fields), payload, position, to + kHeaderSize64);
+}
+
 } // namespace
 
 uint32_t tavAddElement(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
 {
-  // The data element with a 64-bit header in host order is what streams are made of. Every other way out ends in one
-  // call.
-  if (tracing() || options != 0 || handle == nullptr || headerData == nullptr || !is64(headerData->header) ||
-      !isPlain(*handle) || !isUsualChild<true>(*handle)) [[unlikely]]
+  // The data element with a 64-bit header in host order, added to a block of memory, is what streams are made of. Every
+  // other way out ends in one call. Accesses to memory are what limits it: no field is loaded twice, no register saved.
+  if (!isUsualCall(options)) [[unlikely]]
   {
     return addOther(options, handle, headerData);
+  }
+  if (handle == nullptr || headerData == nullptr || !isPlainBlock(*handle) || !is64(headerData->header) ||
+      !isUsualChild<true>(*handle)) [[unlikely]]
+  {
+    return addOther(0, handle, headerData);
   }
   const HeaderFields fields = fieldsOf<true>(headerData->header);
-  const uint64_t size = fields.size;
   const uint8_t* const payload = headerData->pDataBuf;
-  if (isGroupType(fields.type) || (fields.info & TAV_INFO_EYE_SIZE) != 0 || payload == nullptr ||
-      headerData->dataBufSize < size || size > kUsualSize) [[unlikely]]
+  if (!isPlainElement(fields, payload, headerData->dataBufSize)) [[unlikely]]
   {
-    return addOther(options, handle, headerData);
+    return addOther(0, handle, headerData);
+  }
+  const uint64_t size = fields.size;
+  const uint64_t rest = joinRest(fields);
+  if (!fitsBlock(*handle, size)) [[unlikely]]
+  {
+    return addOther(0, handle, headerData);
   }
   const uint64_t position = handle->streamBytes;
-  uint8_t* const to = takePlace(*handle, position, kHeaderSize64 + size);
-  if (to == nullptr) [[unlikely]]
-  {
-    return addOther(options, handle, headerData);
-  }
-  headerData->header.nodeOffset = position;
-  handle->streamBytes = position + kHeaderSize64 + size;
-  encodeFields(fields, true, false, to);
-  if (size > kLongestSmall)
-  {
-    return copyLong(to + kHeaderSize64, payload, size);
-  }
-  copySmall(to + kHeaderSize64, payload, size);
-  return TAV_RC_OK;
+  uint8_t* const to = handle->pDirectData + position + kHeaderSize64;
+  return putPlain(*handle, *headerData, size, rest, payload, position, to);
 }

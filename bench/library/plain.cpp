@@ -55,17 +55,17 @@ uint64_t valueOf(const TAVHeaderData& leaf)
                             reinterpret_cast<const char*>(leaf.pDataBuf));
 }
 
-/// Two descriptors in turn, so that the child returned last is the next call's reference without a copy.
+/// One descriptor: the child returned last is the next call's reference, and is read before the next one takes its
+/// place.
 uint64_t sumBelow(TAVHandle* handle, TAVHeader* parent)
 {
   uint64_t sum = 0;
-  TAVHeaderData nodes[2];
+  TAVHeaderData node;
   TAVHeader* previous = nullptr;
-  for (size_t current = 0; tavGetNextChild(0, handle, parent, previous, &nodes[current]) == TAV_RC_OK; current ^= 1U)
+  while (tavGetNextChild(0, handle, parent, previous, &node) == TAV_RC_OK)
   {
-    TAVHeaderData& node = nodes[current];
     previous = &node.header;
-    sum += previous->hdr64.type == TAV_TYPE_HEADER64 ? sumBelow(handle, previous) : valueOf(node);
+    sum += node.header.hdr64.type == TAV_TYPE_HEADER64 ? sumBelow(handle, previous) : valueOf(node);
   }
   return sum;
 }

@@ -37,6 +37,12 @@ inline bool addFits(uint64_t a, uint64_t b, uint64_t& sum)
   return !__builtin_add_overflow(a, b, &sum);
 }
 
+/// Takes off `room`; false when it has not so much.
+inline bool takeRoom(uint64_t& room, uint64_t amount)
+{
+  return !__builtin_sub_overflow(room, amount, &room);
+}
+
 /// The sum, or the largest offset when it would pass 64 bits.
 constexpr uint64_t addSaturated(uint64_t a, uint64_t b)
 {
@@ -200,19 +206,35 @@ inline void setHeader(const HeaderFields& fields, bool wide, TAVHeader& header)
   header.hdr32 = {static_cast<uint32_t>(fields.size), fields.type, fields.elm};
 }
 
-/// Copies words one by one. Who reads a header's fields straight afterwards would wait for a wider store.
+/// The type in the stream form of a 64-bit header in this machine's order.
+inline uint16_t typeAt(const uint8_t* bytes)
+{
+  uint16_t type = 0;
+  std::memcpy(&type, bytes + offsetof(TAVHeader64, type), sizeof type);
+  return type;
+}
+
+/// Loads a word of a header. It is stored as it was loaded, by itself: who reads a header's fields straight afterwards
+/// would wait for a wider store.
+inline uint64_t loadWord(const uint8_t* from)
+{
+  uint64_t word = 0;
+  std::memcpy(&word, from, sizeof word);
+#if defined(__GNUC__)
+  __asm__(""
+          : "+r"(word)); // keeps the compiler from joining the words
+#endif
+  return word;
+}
+
+/// Copies words one by one.
 template<size_t Words>
 inline void copyWords(void* to, const uint8_t* from)
 {
-  for (size_t word = 0; word < Words; ++word)
+  for (size_t at = 0; at < Words * sizeof(uint64_t); at += sizeof(uint64_t))
   {
-    uint64_t value = 0;
-    std::memcpy(&value, from + word * sizeof value, sizeof value);
-#if defined(__GNUC__)
-    __asm__(""
-            : "+r"(value)); // keeps the compiler from joining the words
-#endif
-    std::memcpy(static_cast<uint8_t*>(to) + word * sizeof value, &value, sizeof value);
+    const uint64_t word = loadWord(from + at);
+    std::memcpy(static_cast<uint8_t*>(to) + at, &word, sizeof word);
   }
 }
 
@@ -253,6 +275,28 @@ inline HeaderFields fieldsOf(const TAVHeader& header)
     const volatile TAVHeader32& from = header.hdr32;
     return {from.size, 0, from.type, from.elm};
   }
+}
+
+/// The second word of a 64-bit header in this machine's order. The compiler joins the fields here, not where the word
+/// is stored: that would take three registers until then.
+inline uint64_t joinRest(const HeaderFields& fields)
+{
+  uint64_t word = kor::isLittleEndian ? fields.info | uint64_t{fields.type} << 32 | uint64_t{fields.elm} << 48
+                                      : uint64_t{fields.info} << 32 | uint64_t{fields.type} << 16 | fields.elm;
+#if defined(__GNUC__)
+  __asm__(""
+          : "+r"(word));
+#endif
+  return word;
+}
+
+/// Keeps the compiler from joining a store before with one behind, where it takes longer to join the values.
+inline void keepStoresApart()
+{
+#if defined(__GNUC__)
+  __asm__("" ::
+              : "memory");
+#endif
 }
 
 /// Writes a header's stream form to `out` and returns its length.
