@@ -224,8 +224,8 @@ private:
 
   /// When there is something to look at before. `give(write)` calls `write` with the payload.
   template<class Give>
-  [[gnu::noinline]] uint32_t appendSlowly(TAVHeaderData& node, uint16_t elm, const NodeOptions& options,
-                                          const Give& give) noexcept
+  [[gnu::noinline, gnu::cold]] uint32_t appendSlowly(TAVHeaderData& node, uint16_t elm, const NodeOptions& options,
+                                                     const Give& give) noexcept
   {
     node = {};
     const uint32_t rc = enter();
