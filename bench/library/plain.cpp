@@ -16,11 +16,12 @@ uint32_t openGroup(TAVHandle* handle, unsigned id)
   return tavAddElement(0, handle, &node);
 }
 
-uint32_t addLeaf(TAVHandle* handle, const Model& model, const Leaf& leaf)
+/// The descriptor's other fields are the same for every leaf.
+uint32_t addLeaf(TAVHandle* handle, const Model& model, const Leaf& leaf, TAVHeaderData& node)
 {
-  TAVHeaderData node;
-  node.header.hdr64 = {leaf.size, 0, floor0::typeOf(leaf.type), leaf.id};
-  node.header.hdrType = TAV_HDR_64;
+  node.header.hdr64.size = leaf.size;
+  node.header.hdr64.type = floor0::typeOf(leaf.type);
+  node.header.hdr64.elm = leaf.id;
   node.pDataBuf = static_cast<uint8_t*>(const_cast<void*>(model.payload(leaf))); // only read
   node.dataBufSize = leaf.size;
   return tavAddElement(0, handle, &node);
@@ -30,6 +31,9 @@ uint32_t addLeaf(TAVHandle* handle, const Model& model, const Leaf& leaf)
 uint32_t writeHost(TAVHandle* handle, const Model& model)
 {
   uint32_t rc = openGroup(handle, kHostId);
+  TAVHeaderData node;
+  node.header.hdr64.info = 0;
+  node.header.hdrType = TAV_HDR_64;
   for (unsigned k = 0; k < kDatabases; ++k)
   {
     rc |= openGroup(handle, kDatabaseId + k);
@@ -39,7 +43,7 @@ uint32_t writeHost(TAVHandle* handle, const Model& model)
       const Leaf* leaf = model.application(k, j);
       for (unsigned m = 0; m < kMetrics; ++m, ++leaf)
       {
-        rc |= addLeaf(handle, model, *leaf);
+        rc |= addLeaf(handle, model, *leaf, node);
       }
       rc |= tavCloseHeader(0, handle);
     }
