@@ -127,6 +127,7 @@ void* allocateReserved(uint64_t size, const void* ownerBytes)
   void* const room = ::operator new(kReservedSize, std::nothrow);
   if (room == nullptr) return nullptr;
 
+  // cppcheck-suppress legacyUninitvar ; its members have initial values
   Reserved* const block = ::new (room) Reserved;
   const std::lock_guard<Lock> guard(registry.lock);
   Reserved* const owner = find(ownerBytes);

@@ -142,7 +142,7 @@ int run(const Invocation& invocation)
     }
     file.finish();
   }
-  const std::string name = stream.source->name();
+  const std::string& name = stream.source->name();
   putReport(invocation, output,
             invocation.has("--json") ? asJson(name, stream, account) : asText(name, stream, account));
   tellStatistics(invocation, stream.bytes());

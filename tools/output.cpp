@@ -3,6 +3,7 @@
 #include <cerrno>
 #include <cstdio>
 #include <filesystem>
+#include <utility>
 
 #include "kor/host.h"
 #include "tools/report.h"
@@ -147,8 +148,7 @@ void Output::write(std::span<const uint8_t> bytes)
 void Output::flush()
 {
   // Taken out first: what failed once is not written again when the object goes.
-  const std::string pending = std::move(buffer_);
-  buffer_.clear();
+  const std::string pending = std::exchange(buffer_, {});
   writeOut(pending.data(), pending.size());
 }
 

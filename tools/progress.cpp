@@ -9,7 +9,9 @@
 namespace tav::tool
 {
 
-using namespace std::chrono_literals;
+// How long nothing is shown, and then how often.
+constexpr std::chrono::milliseconds kPatience{500};
+constexpr std::chrono::milliseconds kPause{100};
 
 Progress::Progress(std::string what, uint64_t totalBytes)
     : what_(std::move(what)), total_(totalBytes), active_(kor::isTerminal(stderr))
@@ -41,7 +43,7 @@ Progress::~Progress()
 void Progress::show(uint64_t bytes)
 {
   const Clock::time_point now = Clock::now();
-  if (now - start_ < 500ms || now - last_ < 100ms)
+  if (now - start_ < kPatience || now - last_ < kPause)
   {
     return;
   }

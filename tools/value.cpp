@@ -4,6 +4,7 @@
 #include <chrono>
 #include <cstdio>
 #include <cstring>
+#include <iterator>
 
 #include "tools/report.h"
 
@@ -288,10 +289,10 @@ std::string int128Text(std::span<const uint8_t> bytes, bool isSigned)
   }
   const bool negative = isSigned && (words[0] & 0x80000000u) != 0;
   uint64_t carry = 1;
-  for (size_t i = 4; negative && i-- > 0;)
+  for (auto word = std::rbegin(words); negative && word != std::rend(words); ++word)
   {
-    carry += static_cast<uint32_t>(~words[i]);
-    words[i] = static_cast<uint32_t>(carry);
+    carry += static_cast<uint32_t>(~*word);
+    *word = static_cast<uint32_t>(carry);
     carry >>= 32;
   }
   std::string text;

@@ -34,6 +34,7 @@ enum class EndElements : uint8_t
 class OwnedNode : public HeaderView
 {
 public:
+  // cppcheck-suppress passedByValue ; it is moved from
   OwnedNode(const TAVHeader& header, std::vector<std::byte> bytes, bool swapped) noexcept
       : HeaderView(header), bytes_(std::move(bytes)), swapped_(swapped)
   {

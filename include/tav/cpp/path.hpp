@@ -88,7 +88,10 @@ public:
   [[nodiscard]] Path rest() const
   {
     Path path;
-    path.steps_.assign(steps_.begin() + (steps_.empty() ? 0 : 1), steps_.end());
+    if (!steps_.empty())
+    {
+      path.steps_.assign(steps_.begin() + 1, steps_.end());
+    }
     path.isStraight_ = path.areStraight();
     return path;
   }
