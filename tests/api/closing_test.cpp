@@ -1,6 +1,8 @@
 #include <cstdint>
+#include <cstring>
 #include <ostream>
 #include <string>
+#include <vector>
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -361,6 +363,22 @@ TEST(CloseHeaderTrace, WritesTheSizeBeforeTheEndElementAndPopsLast)
   EXPECT_THAT(entries,
               ElementsAre(probe::closeHeader, probe::rawWrite, probe::addElement, probe::validateChild,
                           probe::writeNode, probe::rawWrite, probe::rawWrite, probe::hdrStackPop));
+}
+
+TEST(CloseHeaderTrace, ShowsTheEndElementWithTheLengthOfItsPair)
+{
+  StreamWriter writer;
+  writer.add(group64(kRoot, TAV_TYPE_HEADER64, TAV_INFO_EYE_SIZE));
+  TraceLog trace;
+  writer.close();
+  const std::vector<std::string> items = trace.dump(probe::addElement, 0).items;
+  ASSERT_EQ(items.size(), 4U);
+  ASSERT_EQ(items[3].size(), sizeof(TAVHeaderData));
+  TAVHeaderData element;
+  std::memcpy(&element, items[3].data(), sizeof element);
+  EXPECT_EQ(element.header.hdr64.elm, TAV_ELM_CMN_END_HDR_EYE_SIZE);
+  EXPECT_EQ(element.header.hdr64.size, 16U);
+  EXPECT_EQ(element.dataBufSize, 16U);
 }
 
 TEST(CloseHeaderTrace, CarriesItsProbe)

@@ -243,6 +243,43 @@ TEST(AddElementAfterAFailure, ContinuesWhereTheStreamEnded)
   EXPECT_EQ(writer.add(binary(kBlob, {9})).nodeOffset, 16U);
 }
 
+/// A stream in cached bytes that may not be written any more.
+class RingThatIsNotWritable : public ::testing::Test
+{
+protected:
+  void SetUp() override
+  {
+    writer_.add(group64(kRoot, TAV_TYPE_HEADER64, 0, 0));
+    ring().storageWritable = 0;
+    content_.assign(ring().pRing, ring().pRing + ring().ringSize);
+  }
+  void TearDown() override
+  {
+    EXPECT_EQ(Bytes(ring().pRing, ring().pRing + ring().ringSize), content_) << "no byte was changed";
+  }
+  TAVCircularBuf& ring() { return *writer_.handle()->pCircularBuf; }
+
+  StreamWriter writer_{Form{.buffered = true}};
+  Bytes content_;
+};
+
+TEST_F(RingThatIsNotWritable, RefusesAnElementBehindCachedBytes)
+{
+  uint8_t bytes[4] = {1, 2, 3, 4};
+  EXPECT_EQ(failToAdd(writer_, header64(4, TAV_TYPE_BINARY, kBlob), bytes, 4), TAV_RC_NOT_SUPPORTED);
+}
+
+TEST_F(RingThatIsNotWritable, RefusesAGroupBehindCachedBytes)
+{
+  EXPECT_EQ(failToAdd(writer_, header64(0, TAV_TYPE_HEADER64, kBlob), nullptr, 0), TAV_RC_NOT_SUPPORTED);
+}
+
+TEST_F(RingThatIsNotWritable, RefusesToCloseAGroupInCachedBytes)
+{
+  EXPECT_EQ(tavCloseHeader(0, writer_.handle()), TAV_RC_NOT_SUPPORTED);
+  EXPECT_EQ(writer_.handle()->pHdrStack->count, 1U);
+}
+
 TEST(AddElementNesting, KeepsAGroupThatCannotBeOpenedInTheStream)
 {
   StreamWriter writer({}, 0x20000);
