@@ -30,6 +30,15 @@ TEST(FetchBytes, EndsWhereTheStorageEnds)
   EXPECT_EQ(tav::fetchBytes(small.ring, 5, to.data(), to.size()), TAV_RC_END_OF_STORAGE);
 }
 
+TEST(FetchBytes, EndsWhereOffsetsEnd)
+{
+  constexpr uint64_t last = ~uint64_t{0};
+  SmallRing small(0, 3, VectorStorage::kReadOnly);
+  small.cache(0, last - 7, 8);
+  std::vector<uint8_t> to(16);
+  EXPECT_EQ(tav::fetchBytes(small.ring, last - 7, to.data(), to.size()), TAV_RC_END_OF_STORAGE);
+}
+
 TEST(FetchBytes, OfNoBytesAsksForNothing)
 {
   SmallRing small(10);

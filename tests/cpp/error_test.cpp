@@ -53,6 +53,12 @@ TEST(LayerErrors, CompareWithPortableConditions)
   EXPECT_EQ(tav::makeError(KOR_RC_NO_SUCH_FILE), std::errc::no_such_file_or_directory);
   EXPECT_EQ(tav::makeError(KOR_RC_NO_SPACE), std::errc::no_space_on_device);
   EXPECT_EQ(tav::makeError(TAV_RC_NO_MEMORY), std::errc::not_enough_memory);
+  EXPECT_EQ(tav::makeError(TAV_RC_NOT_SUPPORTED), std::errc::not_supported);
+  EXPECT_EQ(tav::makeError(TAV_RC_BAD_PARAM), std::errc::invalid_argument);
+  EXPECT_EQ(tav::makeError(KOR_RC_NO_PERMISSION), std::errc::permission_denied);
+  EXPECT_EQ(tav::makeError(KOR_RC_IS_FOLDER), std::errc::is_a_directory);
+  EXPECT_EQ(tav::makeError(KOR_RC_IO_ERROR), std::errc::io_error);
+  EXPECT_EQ(tav::makeError(KOR_RC_FILE_EXISTS), std::errc::file_exists);
   EXPECT_NE(tav::makeError(TAV_RC_NOT_FOUND), std::errc::no_such_file_or_directory);
 }
 

@@ -35,6 +35,7 @@ constexpr Fault kFaults[] = {
     {"NoMemory", Kind::malloc, ENOMEM, TAV_RC_NO_MEMORY},
     {"OpenRefused", Kind::open, EACCES, KOR_RC_NO_PERMISSION},
     {"OpenWithoutDescriptors", Kind::open, EMFILE, KOR_RC_TOO_MANY_FILES},
+    {"OpenFailsInNoKnownWay", Kind::open, EPROTO, KOR_RC_OS_ERROR},
     {"OpenInterrupted", Kind::open, EINTR, kUnseen},
     {"StatFails", Kind::stat, EIO, KOR_RC_IO_ERROR},
     {"ReadFails", Kind::read, EIO, KOR_RC_IO_ERROR},

@@ -17,6 +17,8 @@ namespace
 using testing::Each;
 using testing::SizeIs;
 
+using testing::HasSubstr;
+
 /// A file that a sink writes to and that can be read back.
 class TextFile
 {
@@ -221,5 +223,12 @@ TEST(TraceText, LinesOfThreadsDoNotMix)
   for (std::string line; std::getline(text, line);) lines.push_back(line);
   EXPECT_THAT(lines, SizeIs(1000));
   EXPECT_THAT(lines, Each("var   thread 4711 probe 0x088A0012 point 0 \"" + std::string(200, 'y') + "\""));
+}
+TEST(TraceText, ShowsARecordOfNoKnownKindAllTheSame)
+{
+  TextFile file;
+  const KORTraceRecord record{static_cast<KORTraceKind>(9), 1, 0x088A0007, 10, 0, nullptr, 0};
+  korTraceTextSink(file.stream(), &record);
+  EXPECT_THAT(file.text(), testing::AllOf(HasSubstr("?"), testing::EndsWith("\n")));
 }
 } // namespace

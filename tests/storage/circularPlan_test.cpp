@@ -56,7 +56,9 @@ INSTANTIATE_TEST_SUITE_P(
                     Cached{"NoneIntoAFullRing", 0, 32, 36, 17, {}},
                     Cached{"NoneWhereEnoughPagesFollow", 0, 9, 23, 3, {}},
                     Cached{"NoneWhereTheRangeGoesOnAtTheRingsStart", 24, 20, 20, 10, {}},
-                    Cached{"OneWhereTheNextPageIsNeeded", 0, 9, 23, 9, {"read 25+7", "read 32+8"}}),
+                    Cached{"NoneWhereTheEndsOfTheRangeNearlyMeet", 28, 26, 16, 10, {}},
+                    Cached{"TwoBehindTheLastCachedByte", 0, 8, 23, 9, {"read 24+8", "read 32+8"}},
+                    Cached{"TwoWhereTheNextPageIsNeeded", 0, 9, 23, 9, {"read 25+7", "read 32+8"}}),
     [](const auto& row) { return std::string(row.param.name); });
 
 // --- a page before the cached range, of which the storage has lost a part ---

@@ -388,4 +388,17 @@ INSTANTIATE_TEST_SUITE_P(
                     ClosedRow{"Unlock", tav::probe::ssFileUnlock, 10, [](TAVSSFile& file) { return file.unlock(); }}),
     [](const auto& row) { return std::string(row.param.name); });
 
+TEST_F(FileStorage, LeavesItsCursorWhereItWasWhenALookBackCannotSeek)
+{
+  OpenFile storage(fileOf(20), KOR_FILE_READ);
+  ASSERT_EQ(storage->seek(10, 0), TAV_RC_OK);
+  ASSERT_EQ(storage->pFile->close(), TAV_RC_OK);
+  std::vector<uint8_t> bytes(4);
+  void* buffer = bytes.data();
+  uint64_t got = 77;
+  EXPECT_EQ(storage->read(4, &buffer, 4, &got, false, true), KOR_RC_NOT_OPEN);
+  EXPECT_EQ(got, 0U);
+  EXPECT_EQ(storage->position, 10U);
+}
+
 } // namespace
