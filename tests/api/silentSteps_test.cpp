@@ -155,7 +155,7 @@ TEST(SilentPrint, IndentsDeepNodesAsTheTracedOne)
     writer.add(u32(TAV_ELM_CMN_CPU_SPEED, 1));
   }
   for (int i = 0; i < deep; ++i) writer.close();
-  for (const uint64_t options : {0x7U, 0x47U, 0xC7U})
+  for (const uint64_t options : {0x7U, 0x45U, 0x47U, 0xC7U})
   {
     const std::string silent = printed(writer.bytes(), options);
     const TraceLog trace;
