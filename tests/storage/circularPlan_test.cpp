@@ -61,7 +61,19 @@ INSTANTIATE_TEST_SUITE_P(
                     Cached{"TwoWhereTheNextPageIsNeeded", 0, 9, 23, 9, {"read 25+7", "read 32+8"}}),
     [](const auto& row) { return std::string(row.param.name); });
 
-// --- a page before the cached range, of which the storage has lost a part ---
+// --- a page before the cached range that lies across the ring's end ---
+
+TEST(Fill, BackwardReadsAPageAcrossTheEndOfTheRing)
+{
+  SmallRing small(100, 4);
+  small.cache(3, 40, 8);
+  std::fill_n(small.ring.pRing, 3, uint8_t{0xFF});
+  ASSERT_EQ(small.chunk(39, 1, true), TAV_RC_OK);
+  EXPECT_EQ(small.bytes(), pattern(39, 1));
+  EXPECT_EQ(small.ring.headOffset, 24U) << "the gap and the page that was wanted";
+  EXPECT_EQ(std::vector<uint8_t>(small.ring.pRing + 27, small.ring.pRing + 32), pattern(32, 5));
+  EXPECT_EQ(std::vector<uint8_t>(small.ring.pRing, small.ring.pRing + 3), pattern(37, 3));
+}
 
 TEST(FillAtTheEnd, BackwardZeroesFromTheRingsStartWhenTheStorageEndsAtTheRingsEnd)
 {
