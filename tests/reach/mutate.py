@@ -390,7 +390,7 @@ def report(verdicts, reasons):
 def main():
     parser = argparse.ArgumentParser(description=__doc__, formatter_class=argparse.RawDescriptionHelpFormatter)
     parser.add_argument("--seed", type=int, default=1)
-    parser.add_argument("--count", type=int, default=120, help="mutants that count, for each group")
+    parser.add_argument("--count", type=int, default=70, help="mutants that count, for each group")
     parser.add_argument("--group", choices=GROUPS, action="append")
     parser.add_argument("--only", metavar="SOURCE:LINE", action="append", help="the changes of these lines alone")
     parser.add_argument("--jobs", type=int, default=os.cpu_count())
