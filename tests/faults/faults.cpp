@@ -158,9 +158,10 @@ protected:
     const uint32_t code = silent ? kUnseen : life.failures.front().code;
     EXPECT_TRUE(silent || life.failures.front().step == life.faultIn) << "told by another step";
     if (code == fault.code) return;
-    const auto* const row = std::find_if(std::begin(kOtherAnswers), std::end(kOtherAnswers), [&](const OtherAnswer& one) {
+    const auto answers = [&](const OtherAnswer& one) {
       return one.step == life.faultIn && one.kind == fault.kind && one.code == code;
-    });
+    };
+    const auto* const row = std::find_if(std::begin(kOtherAnswers), std::end(kOtherAnswers), answers);
     ASSERT_TRUE(fault.code != kUnseen && row != std::end(kOtherAnswers)) << "answered with " << korCodeName(code);
     met_.insert(row);
   }
