@@ -1,6 +1,6 @@
 #include "support/platform.h"
 
-#include <cstdlib>
+#include <atomic>
 #include <filesystem>
 #include <io.h>
 #include <stdexcept>
@@ -36,11 +36,13 @@ const char* nullDevice()
 
 FILE* temporaryStream()
 {
-  // tmpfile puts its files at the root of the drive, where not everybody may write.
-  wchar_t* const name = _wtempnam(nullptr, L"tav");
-  FILE* const stream = name != nullptr ? _wfopen(name, L"w+bD") : nullptr;
-  std::free(name);
-  return stream;
+  // tmpfile puts its files at the root of the drive, where not everybody may write, and two processes that ask for a
+  // temporary name at the same time may get the same one.
+  static std::atomic<unsigned> count{0};
+  const std::filesystem::path path =
+      std::filesystem::temp_directory_path() /
+      ("tav-stream-" + std::to_string(tav::kor::processId()) + "-" + std::to_string(count++));
+  return _wfopen(path.c_str(), L"w+bD"); // D: it goes when it is closed
 }
 
 bool emptyStream(FILE* stream)
