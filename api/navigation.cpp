@@ -61,6 +61,7 @@ uint32_t readAfterOpenGroup(TAVHandle& handle, const TAVHeader& parent, const TA
              out);
   if (!frame.require(10, handle != nullptr, TAV_RC_BAD_PARAM) || !frame.require(20, out != nullptr, TAV_RC_BAD_PARAM) ||
       !frame.require(30, options == 0, TAV_RC_BAD_OPTIONS) ||
+      // NOLINTNEXTLINE(clang-analyzer-core.NonNullParamChecker): it does not follow the checks of the frame so deep
       !frame.require(40, isReadOnly(*handle), TAV_RC_WRONG_MODE))
   {
     return frame.code();
@@ -70,6 +71,7 @@ uint32_t readAfterOpenGroup(TAVHandle& handle, const TAVHeader& parent, const TA
   if (sibling && isSizeUnknown(*refChild))
   {
     found = frame.require(50, isGroup(*refChild), TAV_RC_NOT_SUPPORTED) &&
+            // NOLINTNEXTLINE(clang-analyzer-core.NonNullParamChecker): likewise
             frame.step(60, readAfterOpenGroup(*handle, *parent, *refChild, *out));
   }
   else

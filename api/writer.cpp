@@ -282,10 +282,12 @@ uint32_t tavWriteNodeInt(uint64_t options, TAVHandle* handle, TAVHeader* header,
   {
     return frame.code();
   }
+  // NOLINTNEXTLINE(clang-analyzer-core.NullDereference): the analyser does not follow the frame's checks so deep
   if (handle->alignMode == 1 && is64(*header))
   {
     header->hdr64.info |= TAV_INFO_ALIGNED8;
   }
+  // NOLINTNEXTLINE(clang-analyzer-core.NullDereference): likewise
   if (frame.step(50, checkNodeRoom(*handle, *header, *position)) &&
       frame.require(60, isKnownHdrType(header->hdrType), TAV_RC_BAD_HDR_TYPE) &&
       frame.step(70, writeNode(*handle, *header, *position, payload)))
