@@ -33,8 +33,12 @@ uint64_t formatAlone(TAVPrintCtx& ctx, const char* format, va_list arguments)
   {
     return ctx.bufferSize != 0 ? formatToBuffer(ctx, format, arguments) : 0;
   }
-  const int length = vfprintf(tav::print::streamOf(ctx), format, arguments);
-  return length < 0 ? 0 : static_cast<uint64_t>(length);
+  FILE* const stream = tav::print::streamOf(ctx);
+  const bool sound = std::ferror(stream) == 0;
+  const int length = vfprintf(stream, format, arguments);
+  // Not every C library counts nothing when the stream refuses.
+  const bool refused = length < 0 || (sound && std::ferror(stream) != 0);
+  return refused ? 0 : static_cast<uint64_t>(length);
 }
 
 /// Formats a piece of at most a line's length, cutting what is longer.

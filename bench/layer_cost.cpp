@@ -129,17 +129,13 @@ inline bool isEnd(const TAVHeader& header)
   demand(tavGetNextChild(0, handle, nullptr, nullptr, &root) == TAV_RC_OK);
   uint64_t sum = 0;
   TAVHeaderData group{};
-  TAVHeader lastGroup{};
   for (TAVHeader* before = nullptr; tavGetNextChild(0, handle, &root.header, before, &group) == TAV_RC_OK;)
   {
-    lastGroup = group.header;
-    before = &lastGroup;
+    before = &group.header;
     TAVHeaderData leaf{};
-    TAVHeader lastLeaf{};
     for (TAVHeader* last = nullptr; tavGetNextChild(0, handle, &group.header, last, &leaf) == TAV_RC_OK;)
     {
-      lastLeaf = leaf.header;
-      last = &lastLeaf;
+      last = &leaf.header;
       sum += isEnd(leaf.header) ? 0 : plainValue(*handle, leaf);
     }
   }
@@ -157,20 +153,18 @@ inline bool isEnd(const TAVHeader& header)
   demand(tavGetNextChild(0, handle, nullptr, nullptr, &node) == TAV_RC_OK);
   uint64_t sum = 0;
   std::vector<TAVHeader> open{node.header};
-  TAVHeader last{};
   bool first = true;
   while (!open.empty())
   {
-    const uint32_t rc = tavGetNextChild(0, handle, &open.back(), first ? nullptr : &last, &node);
+    const uint32_t rc = tavGetNextChild(0, handle, &open.back(), first ? nullptr : &node.header, &node);
     if (rc == TAV_RC_NO_MORE_CHILDREN)
     {
-      last = open.back();
+      node.header = open.back();
       open.pop_back();
       first = false;
       continue;
     }
     demand(rc == TAV_RC_OK);
-    last = node.header;
     first = isGroup(node.header);
     if (first)
     {

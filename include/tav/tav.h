@@ -562,7 +562,7 @@ TAV_API uint32_t tavFindNodeFromIndex(uint64_t options, TAVHandle* handle, uint6
 /// @param handle    opened with TAV_OPT_READ
 /// @param parent    group to walk; null: the node at offset 0
 /// @param refChild  child returned last; null: the first child
-/// @param[out] out  the child
+/// @param[out] out  the child; `refChild` may be its own header, so that a walk needs one descriptor
 /// @retval TAV_RC_NO_MORE_CHILDREN  the level has ended (not a failure)
 /// @retval TAV_RC_OUTSIDE_PARENT    the next child would start past its parent's end: damaged stream
 /// @retval TAV_RC_NOT_SUPPORTED     `refChild` is a data element of unknown size
