@@ -166,7 +166,9 @@ TEST(TraceText, LongerHexIsCutAndItsLengthTold)
 TEST(TraceText, ALongTextIsCutAndItsLengthTold)
 {
   const std::string text(257, 'x');
-  EXPECT_EQ(shown(text.data(), text.size()), '"' + std::string(256, 'x') + "\"... (257 bytes)");
+  std::string cut = "\"";
+  cut.append(256, 'x').append("\"... (257 bytes)");
+  EXPECT_EQ(shown(text.data(), text.size()), cut);
 }
 
 TEST(TraceText, OneByteThatIsNotPrintableMakesALongItemHex)
