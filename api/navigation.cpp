@@ -123,9 +123,6 @@ uint32_t nextChildSilently(TAVHandle& handle, const TAVHeader& parent, const TAV
   return readSilently(handle, node, out) ? TAV_RC_OK : kUnusual;
 }
 
-using NextChild = uint32_t(uint64_t options, TAVHandle* handle, TAVHeader* parent, TAVHeader* refChild,
-                           TAVHeaderData* out);
-
 /// Everything but the plain steps.
 [[gnu::noinline]] uint32_t nextChildNotPlain(uint64_t options, TAVHandle* handle, TAVHeader* parent,
                                              TAVHeader* refChild, TAVHeaderData* out)
@@ -205,25 +202,21 @@ template<bool First>
 
 /// The step over closed groups of 64-bit headers in a block of memory, which most walks are over. Every other way out
 /// ends in one call with the same arguments, so that the step saves and moves no register.
-template<bool First, NextChild& Other>
-[[gnu::always_inline]] inline uint32_t nextChildPlain(uint64_t options, TAVHandle* handle, TAVHeader* parent,
-                                                      TAVHeader* refChild, TAVHeaderData* out)
+template<bool First>
+[[gnu::always_inline]] inline uint32_t nextChildPlain(TAVHandle* handle, TAVHeader* parent, TAVHeader* refChild,
+                                                      TAVHeaderData* out)
 {
   PlainNode node{};
   uint64_t end = 0;
-  if (!isUsualCall(options)) [[unlikely]]
-  {
-    return Other(options, handle, parent, refChild, out);
-  }
   if (handle == nullptr || !isPlainBlock(*handle) || !isReadOnly(*handle) || handle->pDirectData == nullptr ||
       parent == nullptr || !hasChildren64(*parent) || out == nullptr ||
       !findPlainPlace<First>(*handle, First ? *parent : *refChild, node) || !findEnd(*parent, end)) [[unlikely]]
   {
-    return Other(0, handle, parent, refChild, out);
+    return nextChildNotPlain(0, handle, parent, refChild, out);
   }
   if (node.offset >= end) [[unlikely]]
   {
-    return node.offset == end ? TAV_RC_NO_MORE_CHILDREN : Other(0, handle, parent, refChild, out);
+    return node.offset == end ? TAV_RC_NO_MORE_CHILDREN : nextChildNotPlain(0, handle, parent, refChild, out);
   }
   node.data = handle->pDirectData + node.offset + kHeaderSize64;
   node.size = loadWord(node.data - kHeaderSize64);
@@ -234,18 +227,29 @@ template<bool First, NextChild& Other>
   }
   if (node.size > node.room) [[unlikely]]
   {
-    return Other(0, handle, parent, refChild, out);
+    return nextChildNotPlain(0, handle, parent, refChild, out);
   }
   handOutPlain(node, *out);
   return okAnew();
 }
 
-/// Everything but the plain step behind a node.
-[[gnu::noinline]] uint32_t nextChildOther(uint64_t options, TAVHandle* handle, TAVHeader* parent, TAVHeader* refChild,
-                                          TAVHeaderData* out)
+/// `used` as for nextGroup.
+[[gnu::noinline, gnu::used]] uint32_t nextChildFirst(uint64_t /*options*/, TAVHandle* handle, TAVHeader* parent,
+                                                     TAVHeader* refChild, TAVHeaderData* out)
 {
-  return refChild == nullptr ? nextChildPlain<true, nextChildNotPlain>(options, handle, parent, refChild, out)
-                             : nextChildNotPlain(options, handle, parent, refChild, out);
+  return nextChildPlain<true>(handle, parent, refChild, out);
+}
+
+/// The same where tracing was on once, and every step with options or with records.
+[[gnu::noinline]] uint32_t nextChildOnceTraced(uint64_t options, TAVHandle* handle, TAVHeader* parent,
+                                               TAVHeader* refChild, TAVHeaderData* out)
+{
+  if (!isSilentCall(options))
+  {
+    return nextChildNotPlain(options, handle, parent, refChild, out);
+  }
+  return refChild != nullptr ? nextChildPlain<false>(handle, parent, refChild, out)
+                             : nextChildFirst(0, handle, parent, refChild, out);
 }
 
 } // namespace
@@ -253,6 +257,10 @@ template<bool First, NextChild& Other>
 uint32_t tavGetNextChild(uint64_t options, TAVHandle* handle, TAVHeader* parent, TAVHeader* refChild,
                          TAVHeaderData* out)
 {
-  return refChild != nullptr ? nextChildPlain<false, nextChildOther>(options, handle, parent, refChild, out)
-                             : nextChildOther(options, handle, parent, refChild, out);
+  if (!isUsualCall(options)) [[unlikely]]
+  {
+    return nextChildOnceTraced(options, handle, parent, refChild, out);
+  }
+  return refChild != nullptr ? nextChildPlain<false>(handle, parent, refChild, out)
+                             : nextChildFirst(0, handle, parent, refChild, out);
 }

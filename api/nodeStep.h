@@ -29,10 +29,15 @@ namespace tav
 inline constexpr uint32_t kUnusual = ~uint32_t{0};
 
 /// Whether an exported step may be a silent one, in one look: it has no options, and tracing was never on. Where it was
-/// once, the other steps tell whether it is.
+/// once, isSilentCall tells.
 [[gnu::always_inline]] inline bool isUsualCall(uint64_t options)
 {
   return (reinterpret_cast<uintptr_t>(kor::loadRelaxed(g_pWTCB)) | options) == 0;
+}
+
+inline bool isSilentCall(uint64_t options)
+{
+  return options == 0 && !tracing();
 }
 
 /// TAV_RC_OK as a value of its own. The compiler would return some field that was found to be 0 instead, and keep it in

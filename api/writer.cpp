@@ -348,15 +348,15 @@ namespace
 /// Everything but the plain element.
 [[gnu::noinline]] uint32_t addNotPlain(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
 {
-  const bool silent = !tracing() && options == 0 && handle != nullptr && headerData != nullptr;
+  const bool silent = isSilentCall(options) && handle != nullptr && headerData != nullptr;
   const uint32_t rc = silent ? addSilently(*handle, *headerData) : kUnusual;
   return rc != kUnusual ? rc : addTraced(options, handle, headerData);
 }
 
-/// Everything but the plain element in a block of memory.
-[[gnu::noinline]] uint32_t addOther(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
+/// Everything but the plain element in a block of memory, without a record. `used` keeps its arguments where they are.
+[[gnu::noinline, gnu::used]] uint32_t addOther(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
 {
-  if (!isUsualCall(options) || handle == nullptr || headerData == nullptr || !isPlain(*handle) || isDirect(*handle) ||
+  if (handle == nullptr || headerData == nullptr || !isPlain(*handle) || isDirect(*handle) ||
       !is64(headerData->header) || !isUsualChild<true>(*handle)) [[unlikely]]
   {
     return addNotPlain(options, handle, headerData);
@@ -374,16 +374,10 @@ namespace
   return putPlain(*handle, *headerData, fields.size, joinRest(fields), payload, position, to + kHeaderSize64);
 }
 
-} // namespace
-
-uint32_t tavAddElement(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
+/// The data element with a 64-bit header in host order, added to a block of memory, is what streams are made of. Every
+/// other way out ends in one call. Accesses to memory are what limits it: no field is loaded twice, no register saved.
+[[gnu::always_inline]] inline uint32_t addPlain(TAVHandle* handle, TAVHeaderData* headerData)
 {
-  // The data element with a 64-bit header in host order, added to a block of memory, is what streams are made of. Every
-  // other way out ends in one call. Accesses to memory are what limits it: no field is loaded twice, no register saved.
-  if (!isUsualCall(options)) [[unlikely]]
-  {
-    return addOther(options, handle, headerData);
-  }
   if (handle == nullptr || headerData == nullptr || !isPlainBlock(*handle) || !is64(headerData->header) ||
       !isUsualChild<true>(*handle)) [[unlikely]]
   {
@@ -404,4 +398,17 @@ uint32_t tavAddElement(uint64_t options, TAVHandle* handle, TAVHeaderData* heade
   const uint64_t position = handle->streamBytes;
   uint8_t* const to = handle->pDirectData + position + kHeaderSize64;
   return putPlain(*handle, *headerData, size, rest, payload, position, to);
+}
+
+/// The same where tracing was on once, and every call with options or with records.
+[[gnu::noinline]] uint32_t addOnceTraced(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
+{
+  return isSilentCall(options) ? addPlain(handle, headerData) : addNotPlain(options, handle, headerData);
+}
+
+} // namespace
+
+uint32_t tavAddElement(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
+{
+  return isUsualCall(options) ? addPlain(handle, headerData) : addOnceTraced(options, handle, headerData);
 }
