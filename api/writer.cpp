@@ -306,6 +306,7 @@ namespace
   frame.dump(0, options, handle, "Element to be appended", trace::record(headerData));
   if (!frame.require(10, handle != nullptr, TAV_RC_BAD_PARAM) ||
       !frame.require(20, headerData != nullptr, TAV_RC_BAD_PARAM) ||
+      // NOLINTNEXTLINE(clang-analyzer-core.NonNullParamChecker): likewise
       !frame.require(30, !isReadOnly(*handle), TAV_RC_WRONG_MODE) ||
       !frame.require(40, options == 0, TAV_RC_BAD_OPTIONS))
   {
