@@ -2,8 +2,8 @@
 # Fuzzes for a time or a number of times: builds the preset `fuzz`, runs each target from its corpus and all findings
 # of the past, and fails on a new finding. What is new in a corpus and what was found stays in build/fuzz-work.
 #   fuzz/run.sh SECONDS [TARGET...]      targets: read write layer tool recover build; all unless some are named
-#   fuzz/run.sh fixed [TARGET...]        the same inputs in every run, as many as take about a minute: what fails fails
-#                                        everywhere, and a fast machine finds nothing that a slow one has passed
+#   fuzz/run.sh fixed [TARGET...]        the same inputs in every run, as many as take some 15 seconds: a fast machine
+#                                        finds nothing that a slow one has passed
 # To reproduce: build/fuzz/fuzz/fuzz_TARGET FILE. A finding becomes a file in fuzz/findings/TARGET, which every build
 # runs as a test from then on.
 #   FUZZ_BUILD=FOLDER    another build folder
@@ -19,7 +19,7 @@ if (($# == 0)) || [[ ! $1 =~ ^([0-9]+|fixed)$ ]]; then
 fi
 seconds=$1
 shift
-declare -A executions=([read]=70000 [write]=20000 [layer]=140000 [tool]=20000 [recover]=90000 [build]=17000)
+declare -A executions=([read]=20000 [write]=5000 [layer]=40000 [tool]=5000 [recover]=25000 [build]=4500)
 targets=("$@")
 ((${#targets[@]} > 0)) || targets=(read write layer tool recover build)
 
@@ -31,7 +31,12 @@ cmake --preset fuzz -B "$build" >"$work/configure.log" || { cat "$work/configure
 cmake --build "$build" --parallel "$(nproc)" --target "${targets[@]/#/fuzz_}" tav_tool >"$work/build.log" || { cat "$work/build.log"; exit 1; }
 fuzz/seeds.py "$build/tools/tav" "$work/seeds" >"$work/seeds.log"
 
-export ASAN_OPTIONS=detect_stack_use_after_return=1:allocator_may_return_null=1 UBSAN_OPTIONS=print_stacktrace=1
+# What is compared steers the choices, addresses, too: with all variables and addresses the same, the choices are.
+surroundings=(env ASAN_OPTIONS=detect_stack_use_after_return=1:allocator_may_return_null=1 UBSAN_OPTIONS=print_stacktrace=1)
+if [[ $seconds == fixed ]]; then
+  surroundings=(env -i PATH=/usr/bin:/bin "${surroundings[@]:1}")
+  if setarch -R true 2>/dev/null; then surroundings+=(setarch -R); fi
+fi
 
 # fuzz TARGET: runs it from everything that is known for it.
 fuzz()
@@ -45,9 +50,9 @@ fuzz()
   done
   # Texts are long and hold words; streams are short.
   local more=("-max_total_time=$seconds" "-seed=${FUZZ_SEED:-0}")
-  [[ $seconds != fixed ]] || more=("-runs=${executions[$target]}" "-seed=${FUZZ_SEED:-1}")
+  [[ $seconds != fixed ]] || more=("-runs=${executions[$target]}" "-seed=${FUZZ_SEED:-1}" -reload=0)
   [[ -f fuzz/$target.dict ]] && more+=("-dict=fuzz/$target.dict")
-  if "$build/fuzz/fuzz_$target" -timeout=20 -rss_limit_mb=2048 -max_len=1024 -close_fd_mask=3 \
+  if "${surroundings[@]}" "$build/fuzz/fuzz_$target" -timeout=20 -rss_limit_mb=2048 -max_len=1024 -close_fd_mask=3 \
     -print_final_stats=1 -artifact_prefix="$found/" "${more[@]}" "${folders[@]}" 2>"$log"; then
     runs=$(sed -n 's/^stat::number_of_executed_units: //p' "$log")
     reached=$(grep -oE 'cov: [0-9]+ ft: [0-9]+ corp: [0-9]+/[0-9a-zA-Z]+' "$log" | tail -n 1)
