@@ -94,6 +94,14 @@ TEST(SilentStep, NeedsTheRingOfAHandleThatIsNotDirect)
   EXPECT_EQ(codeOf([&] { return tavGetNextChild(0, reader.handle(), &root, nullptr, &out); }), TAV_RC_NO_CIRCULAR_BUF);
 }
 
+TEST(SilentAdd, IsRefusedByAReader)
+{
+  StreamReader reader(smallStream());
+  Element node = u32(kOther, 1);
+  TAVHeaderData data = node.data();
+  EXPECT_EQ(codeOf([&] { return tavAddElement(0, reader.handle(), &data); }), TAV_RC_WRONG_MODE);
+}
+
 TEST(SilentAdd, RefusesAHeaderOfNoKnownForm)
 {
   StreamWriter writer;
