@@ -31,10 +31,9 @@ if [[ $(uname -m) == x86_64 ]]; then
 fi
 
 # The layer of include/ is templates and inline functions, so its counts are in the objects of its tests. Windows'
-# sources are not compiled here. For the compiler every call can throw, which makes a branch of it. Threads
-# count without locks, so that a count can come out below 0, which gcovr does not read.
+# sources are not compiled here. For the compiler every call can throw, which makes a branch of it.
 gcovr --root . -j "$(nproc)" --json "$work/coverage.json" \
   --filter 'api/' --filter 'format/' --filter 'storage/' --filter 'dictionary/' --filter 'kor/' --filter 'include/' \
-  --exclude-throw-branches --exclude-unreachable-branches --gcov-ignore-parse-errors \
+  --exclude-throw-branches --exclude-unreachable-branches \
   "$folder"/{api,format,storage,dictionary,kor} "$folder/tests/CMakeFiles/cpp_tests.dir"
 tests/reach/coverage.py "$work/coverage.json" docs/coverage.md
