@@ -4,17 +4,11 @@
 #include <array>
 #include <cstring>
 
-#include "format/layout.h"
 #include "kor/traceFrame.h"
 #include "tav/probes.h"
 
 namespace tav
 {
-
-uint32_t checkRoom(const TAVHandle& handle, uint64_t position, uint64_t length)
-{
-  return addChecked(position, length) && position < handle.directDataSize ? TAV_RC_OK : TAV_RC_END_OF_STORAGE;
-}
 
 uint32_t rawWrite(TAVHandle& handle, uint64_t& position, const void* bytes, uint64_t length)
 {
@@ -23,7 +17,7 @@ uint32_t rawWrite(TAVHandle& handle, uint64_t& position, const void* bytes, uint
   if (isDirect(handle))
   {
     if (frame.require(20, handle.pDirectData != nullptr, TAV_RC_NO_MEMORY) &&
-        frame.step(30, checkRoom(handle, position, length)) && length != 0)
+        frame.require(30, hasRoom(handle, position, length), TAV_RC_END_OF_STORAGE) && length != 0)
     {
       std::memmove(handle.pDirectData + position, bytes, length); // the bytes may lie in the block themselves
       position += length;

@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <cstring>
 
+#include "format/layout.h"
 #include "storage/cachedRun.h"
 #include "tav/byteOrder.h"
 #include "tav/tav.h"
@@ -22,8 +23,14 @@ inline bool isReadOnly(const TAVHandle& handle)
   return (handle.options & TAV_OPT_READ) != 0;
 }
 
-/// Whether a run of bytes fits into the direct block: TAV_RC_END_OF_STORAGE when it would reach the block's last byte.
-uint32_t checkRoom(const TAVHandle& handle, uint64_t position, uint64_t length);
+/// Whether the direct block has room for `length` bytes at `position`, and for `more` behind them. Its last byte is
+/// never used.
+[[gnu::always_inline]] inline bool hasRoom(const TAVHandle& handle, uint64_t position, uint64_t length,
+                                           uint64_t more = 0)
+{
+  uint64_t room = handle.directDataSize;
+  return takeRoom(room, length) && takeRoom(room, more) && room > position;
+}
 
 /// Whether the stream is in host order and unpadded: both flags in one look.
 [[gnu::always_inline]] inline bool isPlain(const TAVHandle& handle)
@@ -53,8 +60,7 @@ inline uint8_t* takePlace(TAVHandle& handle, uint64_t position, uint64_t length)
 {
   if (isDirect(handle)) [[likely]]
   {
-    const uint64_t size = handle.directDataSize;
-    const bool fits = handle.pDirectData != nullptr && length < size && position < size - length;
+    const bool fits = handle.pDirectData != nullptr && hasRoom(handle, position, length);
     return fits ? handle.pDirectData + position : nullptr;
   }
   TAVCircularBuf* const ring = handle.pCircularBuf;

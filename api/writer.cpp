@@ -33,9 +33,8 @@ uint32_t checkNodeRoom(const TAVHandle& handle, const TAVHeader& header, uint64_
   {
     return TAV_RC_NO_MEMORY;
   }
-  uint64_t length = headerLength(header.hdrType);
-  const bool fits = addChecked(length, isGroup(header) ? 0 : sizeOf(header));
-  return fits ? checkRoom(handle, position, length) : TAV_RC_END_OF_STORAGE;
+  const bool fits = hasRoom(handle, position, headerLength(header.hdrType), isGroup(header) ? 0 : sizeOf(header));
+  return fits ? TAV_RC_OK : TAV_RC_END_OF_STORAGE;
 }
 
 uint32_t writeHeader(TAVHandle& handle, const TAVHeader& header, uint64_t& position)
@@ -337,15 +336,6 @@ namespace
          payload != nullptr;
 }
 
-/// Whether a data element with a 64-bit header and so much payload fits into the block, the last byte of which is never
-/// used.
-[[gnu::always_inline]] inline bool fitsBlock(const TAVHandle& handle, uint64_t size)
-{
-  uint64_t room = handle.directDataSize;
-  return takeRoom(room, size) && takeRoom(room, kHeaderSize64) && room > handle.streamBytes &&
-         handle.pDirectData != nullptr;
-}
-
 /// Everything but the plain element.
 [[gnu::noinline]] uint32_t addNotPlain(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
 {
@@ -392,7 +382,7 @@ namespace
   }
   const uint64_t size = fields.size;
   const uint64_t rest = joinRest(fields);
-  if (!fitsBlock(*handle, size)) [[unlikely]]
+  if (!hasRoom(*handle, handle->streamBytes, kHeaderSize64, size) || handle->pDirectData == nullptr) [[unlikely]]
   {
     return addOther(0, handle, headerData);
   }
