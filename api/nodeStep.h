@@ -135,12 +135,7 @@ inline bool hasDirectData(const Node& node)
 {
   const TAVCircularBuf& ring = *handle.pCircularBuf;
   const uint64_t length = node.length();
-  uint64_t index = 0;
-  if (!cachedIndex(ring, node.offset, index)) [[unlikely]]
-  {
-    return false;
-  }
-  const uint64_t run = contiguousFrom(ring, index);
+  const auto [index, run] = runAt(ring, node.offset);
   if (run < length) [[unlikely]]
   {
     return false;

@@ -347,22 +347,27 @@ namespace
 /// Everything but the plain element in a block of memory, without a record. `used` keeps its arguments where they are.
 [[gnu::noinline, gnu::used]] uint32_t addOther(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
 {
-  if (handle == nullptr || headerData == nullptr || !isPlain(*handle) || isDirect(*handle) ||
-      !is64(headerData->header) || !isUsualChild<true>(*handle)) [[unlikely]]
+  if (handle == nullptr || headerData == nullptr || !isPlainRing(*handle) || !is64(headerData->header) ||
+      !isUsualChild<true>(*handle)) [[unlikely]]
   {
     return addNotPlain(options, handle, headerData);
   }
   const HeaderFields fields = fieldsOf<true>(headerData->header);
   const uint8_t* const payload = headerData->pDataBuf;
   const uint64_t position = handle->streamBytes;
-  uint8_t* const to = isPlainElement(fields, payload, headerData->dataBufSize) && fields.size <= kUsualSize
-                          ? takePlace(*handle, position, kHeaderSize64 + fields.size)
-                          : nullptr;
+  TAVCircularBuf& ring = *handle->pCircularBuf;
+  if (!isPlainElement(fields, payload, headerData->dataBufSize) || fields.size > kUsualSize ||
+      ring.storageWritable == 0) [[unlikely]]
+  {
+    return addNotPlain(0, handle, headerData);
+  }
+  const uint64_t rest = joinRest(fields);
+  uint8_t* const to = takeInPage(ring, position, kHeaderSize64 + fields.size);
   if (to == nullptr) [[unlikely]]
   {
     return addNotPlain(0, handle, headerData);
   }
-  return putPlain(*handle, *headerData, fields.size, joinRest(fields), payload, position, to + kHeaderSize64);
+  return putPlain(*handle, *headerData, fields.size, rest, payload, position, to + kHeaderSize64);
 }
 
 /// The data element with a 64-bit header in host order, added to a block of memory, is what streams are made of. Every

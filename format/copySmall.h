@@ -25,7 +25,7 @@ void copyEnds(uint8_t* to, const uint8_t* from, uint64_t length)
 inline constexpr uint64_t kLongestSmall = 32;
 
 /// Copies like memmove: everything is loaded before anything is stored. Few branches, as lengths alternate.
-inline void copySmall(uint8_t* to, const void* bytes, uint64_t length)
+[[gnu::always_inline]] inline void copySmall(uint8_t* to, const void* bytes, uint64_t length)
 {
   const auto* const from = static_cast<const uint8_t*>(bytes);
   if (length > kLongestSmall)

@@ -20,30 +20,30 @@ inline uint64_t cachedBytes(const TAVCircularBuf& ring)
   return ring.head <= ring.tail ? ring.tail - ring.head + 1 : ring.tail + (ring.ringSize - ring.head) + 1;
 }
 
-/// The ring index of a stream offset; false when it is not cached.
-inline bool cachedIndex(const TAVCircularBuf& ring, uint64_t offset, uint64_t& index)
+/// Bytes that are cached next to each other.
+struct CachedRun
 {
-  if (ring.empty != 0 || offset < ring.headOffset || offset - ring.headOffset >= cachedBytes(ring))
-  {
-    return false;
-  }
+  uint64_t index; ///< of the first in the ring
+  uint64_t length;
+};
+
+/// The run that begins at a stream offset, of length 0 when that is not cached.
+[[gnu::always_inline]] inline CachedRun runAt(const TAVCircularBuf& ring, uint64_t offset)
+{
   const uint64_t distance = offset - ring.headOffset;
-  const uint64_t beforeWrap = ring.ringSize - ring.head;
-  index = distance < beforeWrap ? ring.head + distance : distance - beforeWrap;
-  return true;
-}
-
-/// The cached bytes from an index on that stand next to each other.
-inline uint64_t contiguousFrom(const TAVCircularBuf& ring, uint64_t index)
-{
-  return index > ring.tail ? ring.ringSize - index : ring.tail - index + 1;
-}
-
-/// The place of `length` bytes that are cached next to each other; null when they are not.
-inline uint8_t* cachedRun(const TAVCircularBuf& ring, uint64_t offset, uint64_t length)
-{
-  uint64_t index = 0;
-  return cachedIndex(ring, offset, index) && length <= contiguousFrom(ring, index) ? ring.pRing + index : nullptr;
+  if (ring.empty != 0 || offset < ring.headOffset || distance >= ring.ringSize) [[unlikely]]
+  {
+    return {0, 0};
+  }
+  uint64_t index = ring.head + distance;
+  uint64_t end = ring.tail + 1;
+  if (ring.head > ring.tail) // what is cached goes around the ring's end
+  {
+    const bool wraps = index >= ring.ringSize;
+    index = wraps ? index - ring.ringSize : index;
+    end = wraps ? end : ring.ringSize;
+  }
+  return {index, index < end ? end - index : 0};
 }
 
 /// Whether pages begin at multiples of a power of two. std::has_single_bit counts bits, by a call where the processor's
@@ -61,36 +61,25 @@ inline uint64_t pageOfIndex(const TAVCircularBuf& ring, uint64_t index)
 }
 
 /// Marks a page and those behind it, around the ring's end, up to another as pending.
-inline void markPending(TAVCircularBuf& ring, uint64_t page, uint64_t last)
-{
-  ring.pPageFlags[2 * page] = 1;
-  while (page != last && last < ring.pageCount)
-  {
-    page = page + 1 < ring.pageCount ? page + 1 : 0;
-    ring.pPageFlags[2 * page] = 1;
-  }
-}
+void markPending(TAVCircularBuf& ring, uint64_t page, uint64_t last);
 
-/// The place of `length` bytes that are cached next to each other, for writing: marks their pages and the one of the
-/// byte behind them, as a write and a mark through the ring's operations would. Null when they are not so cached.
-inline uint8_t* takeCachedRun(TAVCircularBuf& ring, uint64_t offset, uint64_t length)
+/// takeCachedRun where the byte behind lies in the same page, or is not cached, and pages are of a usual size; else
+/// null, with nothing done.
+[[gnu::always_inline]] inline uint8_t* takeInPage(TAVCircularBuf& ring, uint64_t offset, uint64_t length)
 {
-  uint64_t index = 0;
-  if (!cachedIndex(ring, offset, index) || length > contiguousFrom(ring, index)) [[unlikely]]
+  const auto [index, cached] = runAt(ring, offset);
+  const uint64_t last = ring.pageSize - 1;
+  if (length > cached || !hasRoundPages(ring) || (index & last) + length > last) [[unlikely]]
   {
     return nullptr;
   }
-  const uint64_t page = pageOfIndex(ring, index);
-  const uint64_t last = ring.pageSize - 1;
-  if (hasRoundPages(ring) && length <= last && (index & last) + length <= last) [[likely]]
-  {
-    ring.pPageFlags[2 * page] = 1; // the byte behind lies in the same page, or is not cached
-    return ring.pRing + index;
-  }
-  uint64_t end = ring.tail;
-  cachedIndex(ring, offset + length, end);
-  markPending(ring, page, pageOfIndex(ring, end));
+  ring.pPageFlags[2 * pageOfIndex(ring, index)] = 1;
   return ring.pRing + index;
 }
+
+/// The place of `length` bytes, at least one, that are cached next to each other, for writing: marks their pages and
+/// the one of the byte behind them, as a write and a mark through the ring's operations would. Null when they are not
+/// so cached.
+uint8_t* takeCachedRun(TAVCircularBuf& ring, uint64_t offset, uint64_t length);
 
 } // namespace tav

@@ -141,7 +141,7 @@ uint32_t TAVCircularBuf::getChunk(uint64_t offset, uint64_t length, TAVCBUserAre
   }
   else
   {
-    area->chunkLength = std::min(length, contiguousFrom(*this, index));
+    area->chunkLength = std::min(length, runAt(*this, offset).length);
     area->chunkOffset = offset;
   }
   deliver(*area, first, copy);
@@ -193,7 +193,7 @@ uint32_t TAVCircularBuf::write(uint64_t offset, const void* data, uint64_t size,
   const bool large = size >= ringSize - pageSize;
   uint64_t index = 0;
   bool cached = indexOf(offset, index);
-  const uint64_t contiguous = cached ? contiguousFrom(*this, index) : 0;
+  const uint64_t contiguous = runAt(*this, offset).length;
   if (!direct && !large && size > contiguous)
   {
     static_cast<void>(fill(offset, unitsFor(size, pageSize), false, Purpose::write));
@@ -344,7 +344,8 @@ bool TAVCircularBuf::indexOf(uint64_t offset, uint64_t& index) const
   {
     return false;
   }
-  return cachedIndex(*this, offset, index);
+  index = runAt(*this, offset).index;
+  return true;
 }
 
 /// The mapping behind the chunkOffset of a backward chunk. It is given a stream offset where an index is meant, and
