@@ -171,7 +171,7 @@ template<bool Wide>
   const uint64_t size = fields.size;
   const uint64_t padded = paddedSize(handle, size);
   const bool pair = (fields.info & TAV_INFO_EYE_SIZE) != 0;
-  const uint64_t length = headerSize + padded + (pair ? kEyeSizeLength : 0);
+  const uint64_t length = headerSize + (pair ? padded + kEyeSizeLength : size); // last padding is not written
   const uint64_t position = handle.streamBytes;
   const bool swap = handle.swapBytes != 0;
   uint8_t* const to = takePlace(handle, position, length);
@@ -192,7 +192,7 @@ template<bool Wide>
     std::memcpy(to + headerSize + padded, bytes.data(), bytes.size());
   }
   node.header.nodeOffset = position;
-  handle.streamBytes = position + length;
+  handle.streamBytes = position + (pair ? length : headerSize + padded);
   return TAV_RC_OK;
 }
 

@@ -156,10 +156,11 @@ public:
     return (*handle_)->streamBytes;
   }
 
-  /// The stream's bytes so far. Over a ring, pending pages are written first.
+  /// The stream's bytes so far. Over a ring, pending pages are written first. Of padding that would reach past the
+  /// block's end, which the writer counts all the same, there is none.
   Bytes bytes()
   {
-    const uint64_t count = length();
+    const uint64_t count = form_.buffered ? length() : std::min<uint64_t>(length(), block_.size());
     if (!form_.buffered)
     {
       return {block_.begin(), block_.begin() + static_cast<ptrdiff_t>(count)};
