@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "support/damage.h"
+#include "support/platform.h"
 #include "support/randomScript.h"
 #include "support/randomTree.h"
 #include "support/traceLog.h"
@@ -16,7 +17,7 @@ namespace
 
 using namespace test;
 
-constexpr uint64_t kDefaultCases = 1500;
+constexpr uint64_t kDefaultCases = 600;
 constexpr size_t kTraced = 1;
 
 /// Where a handle's addresses count from.
@@ -128,11 +129,16 @@ public:
   {
     TAVHeaderData out{};
     out.header = pick();
-    switch (random_.below(8))
+    switch (random_.below(16))
     {
-    case 0: readNode(out); break;
-    case 1: stepBack(out); break;
-    case 2: search(out); break;
+    case 0:
+    case 1: readNode(out); break;
+    case 2:
+    case 3: stepBack(out); break;
+    case 4:
+    case 5: search(out); break;
+    case 6: validate(out); break;
+    case 7: print(out); break;
     default: nextChild(out); break;
     }
   }
@@ -213,6 +219,36 @@ private:
                      }),
          out);
     same(counts[0] == counts[1], "stacks after a search hold ", counts[0], " and ", counts[1]);
+  }
+
+  void validate(TAVHeaderData& node)
+  {
+    const bool whole = random_.oneIn(2);
+    const uint64_t options = whole ? 0 : random_.below(2);
+    twins_.take("validation", node, [&](TAVHandle* handle, TAVHeaderData& one) {
+      return whole ? tavValidateHierarchy(options, handle, &one.header)
+                   : tavValidateSubtreeInt(options, handle, &one.header);
+    });
+  }
+
+  void print(TAVHeaderData& node)
+  {
+    // Without the descriptors: they show addresses.
+    const uint64_t options =
+        TAV_PRINT_SUBTREE |
+        random_.pick<uint64_t>({TAV_PRINT_HEADERS | TAV_PRINT_DATA, TAV_PRINT_DATA, TAV_PRINT_DATA | TAV_PRINT_XML,
+                                TAV_PRINT_DATA | TAV_PRINT_XML | TAV_PRINT_ATTRIBUTES});
+    const bool whole = random_.oneIn(2);
+    std::string texts[2];
+    twins_.take("tavPrintSubtree", node, [&](TAVHandle* handle, TAVHeaderData& one) {
+      CaughtStream stream;
+      TAVPrintParam param{0, nullptr, 0, stream.get()};
+      uint64_t printed = 0;
+      const uint32_t rc = tavPrintSubtree(options, handle, whole ? nullptr : &one, &param, &printed);
+      texts[handle == twins_.silent() ? 0 : 1] = stream.text() + std::to_string(printed);
+      return rc;
+    });
+    same(texts[0] == texts[1], "printed texts differ");
   }
 
   Twins& twins_;
