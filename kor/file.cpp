@@ -82,7 +82,12 @@ uint32_t KORHFile::read(const KORFileReadParam* pParam, void* pBuffer, uint64_t*
   {
     std::size_t done = 0;
     const uint32_t code = readSome(native_, bytes + *pDone, nextTransfer(pParam->length, *pDone), done);
-    if (code != TAV_RC_OK) return code;
+    if (code != TAV_RC_OK)
+    {
+      // What came before the failure is read again by a second attempt.
+      if (*pDone != 0 && moveBack(native_, static_cast<int64_t>(*pDone))) *pDone = 0;
+      return code;
+    }
     if (done == 0) return TAV_RC_END_OF_STORAGE;
     *pDone += done;
   }

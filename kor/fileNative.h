@@ -37,6 +37,9 @@ uint32_t writeSome(intptr_t file, const void* bytes, std::size_t length, std::si
 
 uint32_t seekNative(intptr_t file, int64_t offset, uint64_t& position);
 
+/// Moves the position back by a distance; false where the file has none, or refuses.
+bool moveBack(intptr_t file, int64_t distance);
+
 /// `held`: the file holds a lock already, which the new one replaces; a refusal leaves it without any.
 uint32_t lockNative(intptr_t file, bool exclusive, bool wait, bool held);
 uint32_t unlockNative(intptr_t file);

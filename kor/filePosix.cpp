@@ -96,6 +96,11 @@ uint32_t seekNative(intptr_t file, int64_t offset, uint64_t& position)
   return TAV_RC_OK;
 }
 
+bool moveBack(intptr_t file, int64_t distance)
+{
+  return ::lseek(descriptor(file), -distance, SEEK_CUR) >= 0;
+}
+
 uint32_t lockNative(intptr_t file, bool exclusive, bool wait, bool /*held*/)
 {
   // flock belongs to the open file: it holds against other opens of this process too, and it is not lost

@@ -107,6 +107,14 @@ uint32_t seekNative(intptr_t file, int64_t offset, uint64_t& position)
   return TAV_RC_OK;
 }
 
+bool moveBack(intptr_t file, int64_t distance)
+{
+  LARGE_INTEGER by{};
+  by.QuadPart = -distance;
+  return GetFileType(handleOf(file)) == FILE_TYPE_DISK &&
+         SetFilePointerEx(handleOf(file), by, nullptr, FILE_CURRENT) != 0;
+}
+
 uint32_t lockNative(intptr_t file, bool exclusive, bool wait, bool held)
 {
   // Locks of one handle add up here and would wait for each other.

@@ -232,6 +232,7 @@ public:
   /// Closes the file; a failure of the last delayed write comes up here. @retval KOR_RC_NOT_OPEN
   uint32_t close();
   /// Reads up to `length` bytes. At the end of the file: TAV_RC_END_OF_STORAGE with the bytes read so far in `*pDone`.
+  /// After a failure the file stands where it stood; one that cannot seek has lost the `*pDone` bytes read before it.
   uint32_t read(const KORFileReadParam* pParam, void* pBuffer, uint64_t* pDone);
   /// Writes all bytes, or fails with the number that got there in `*pDone`.
   uint32_t write(const KORFileWriteParam* pParam, uint64_t* pDone);

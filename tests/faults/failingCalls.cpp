@@ -47,8 +47,14 @@ Function next(const char* name)
 size_t lengthOf(Kind kind, size_t length, bool& failed)
 {
   const bool turn = isTurn(kind);
-  failed = turn && calls.error != faults::kShort;
+  failed = turn && calls.error >= 0;
   if (failed) errno = calls.error;
+  if (turn && calls.error == faults::kHalfway)
+  {
+    ++calls.nth;
+    calls.error = EIO;
+    calls.happened = false; // not before the next one
+  }
   return turn && !failed && length > 1 ? 1 : length;
 }
 

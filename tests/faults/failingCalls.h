@@ -22,6 +22,8 @@ inline constexpr unsigned kKinds = 8;
 
 /// An error that is none: the call transfers one byte only.
 inline constexpr int kShort = -1;
+/// An error in two steps: the call transfers one byte only, and the next one of its kind fails with EIO.
+inline constexpr int kHalfway = -2;
 
 /// Of one thread. Nothing counts or fails while `watching` is false, so that a test can go on with its own business.
 struct Calls

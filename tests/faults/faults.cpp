@@ -39,9 +39,11 @@ constexpr Fault kFaults[] = {
     {"OpenInterrupted", Kind::open, EINTR, kUnseen},
     {"StatFails", Kind::stat, EIO, KOR_RC_IO_ERROR},
     {"ReadFails", Kind::read, EIO, KOR_RC_IO_ERROR},
+    {"ReadFailsHalfway", Kind::read, kHalfway, KOR_RC_IO_ERROR},
     {"ReadInterrupted", Kind::read, EINTR, kUnseen},
     {"ReadShort", Kind::read, kShort, kUnseen},
     {"WriteFails", Kind::write, EIO, KOR_RC_IO_ERROR},
+    {"WriteFailsHalfway", Kind::write, kHalfway, KOR_RC_IO_ERROR},
     {"WriteWithoutSpace", Kind::write, ENOSPC, KOR_RC_NO_SPACE},
     {"WriteBeyondQuota", Kind::write, EDQUOT, KOR_RC_NO_SPACE},
     {"WriteTooLarge", Kind::write, EFBIG, KOR_RC_FILE_TOO_LARGE},
@@ -191,7 +193,8 @@ TEST_P(EveryCallFailsOnce, AndTheSecondAttemptWorks)
     live(scenario, path); // what the system keeps after a first time is not counted
     const Life healthy = live(scenario, path);
     ASSERT_TRUE(healthy.failures.empty()) << scenario << ": " << healthy.failures.front().step;
-    const uint64_t count = healthy.calls.counts[static_cast<unsigned>(fault.kind)];
+    uint64_t count = healthy.calls.counts[static_cast<unsigned>(fault.kind)];
+    if (fault.error == kHalfway && count != 0) --count; // the one behind fails
     for (uint64_t nth = 1; nth <= count && !HasFailure(); ++nth)
     {
       const Life life = live(scenario, path, fault.kind, nth, fault.error);
