@@ -9,6 +9,18 @@
 
 using namespace tav;
 
+namespace
+{
+
+/// Whether a storage has no byte at an offset or behind.
+bool endsBefore(TAVSideStorage& storage, uint64_t offset)
+{
+  uint64_t size = 0;
+  return storage.getTotalSize(&size) == TAV_RC_OK && offset >= size;
+}
+
+} // namespace
+
 /// How many pages to read, and on which side of the cached range.
 struct TAVCircularBuf::Plan
 {
@@ -163,10 +175,16 @@ uint32_t TAVCircularBuf::readPageForward(uint64_t offset, Purpose purpose, bool&
   const uint64_t room = pageSize - index % pageSize;
   uint64_t got = 0;
   bool ended = false;
-  rc = seekStorage(headOffset + cachedCount());
+  const uint64_t start = headOffset + cachedCount();
+  rc = seekStorage(start);
   if (rc == TAV_RC_OK)
   {
     rc = readStorage(index, room, got, ended);
+  }
+  else if (purpose == Purpose::read && endsBefore(*pStorage, start))
+  {
+    ended = true; // a storage may refuse to seek to its end, and a file has a highest offset
+    rc = TAV_RC_OK;
   }
   full = got == room;
   if (rc != TAV_RC_OK)

@@ -130,7 +130,7 @@ uint32_t TAVSSMemory::write(const void* pData, uint64_t size, uint64_t* pWritten
       frame.require(110, position < bufferSize, TAV_RC_END_OF_STORAGE) &&
       frame.require(50, size <= bufferSize - position, TAV_RC_END_OF_STORAGE))
   {
-    std::memcpy(pBuffer + position, pData, size);
+    std::memmove(pBuffer + position, pData, size); // the bytes may lie in the block themselves
     position += size;
     *pWritten = size;
     frame.dump(100, size, position);

@@ -200,6 +200,59 @@ TEST(FillAtTheEnd, KeepsWhatWasCachedWhenABackwardReadFails)
   EXPECT_EQ(small.bytes(), pattern(43, 16));
 }
 
+/// As memory storage does: a place behind the last byte is none.
+class EndRefused : public VectorStorage
+{
+public:
+  explicit EndRefused(uint64_t count, uint64_t attributeBits = kReadOnly)
+      : VectorStorage(8, pattern(0, count), attributeBits) {}
+  uint32_t seek(uint64_t offset, uint64_t hint) override
+  {
+    return offset >= bytes.size() ? TAV_RC_BAD_PARAM : VectorStorage::seek(offset, hint);
+  }
+};
+
+TEST(FillAtTheEnd, ServesWhatIsCachedOverAStorageThatRefusesToSeekToItsEnd)
+{
+  EndRefused storage(32);
+  TAVCircularBuf ring(&storage, 16, nullptr);
+  for (const uint64_t offset : {uint64_t{0}, uint64_t{27}, uint64_t{24}, uint64_t{31}})
+  {
+    TAVCBUserArea area{};
+    ASSERT_EQ(ring.getChunk(offset, 16, &area, false, false), TAV_RC_OK) << offset;
+    EXPECT_EQ(*area.pChunk, byteAt(offset));
+  }
+}
+
+TEST(FillAtTheEnd, IsTheAnswerWhereTheStorageRefusesToSeek)
+{
+  EndRefused storage(32);
+  TAVCircularBuf ring(&storage, 16, nullptr);
+  TAVCBUserArea area{};
+  for (const uint64_t offset : {uint64_t{32}, uint64_t{1000}, kMax - 100})
+  {
+    EXPECT_EQ(ring.getChunk(offset, 1, &area, false, false), TAV_RC_END_OF_STORAGE) << offset;
+  }
+}
+
+TEST(FillAtTheEnd, KeepsTheCodeOfASeekThatFailsBeforeTheEnd)
+{
+  EndRefused storage(32);
+  TAVCircularBuf ring(&storage, 16, nullptr);
+  storage.failAt(1, KOR_RC_IO_ERROR);
+  TAVCBUserArea area{};
+  EXPECT_EQ(ring.getChunk(20, 1, &area, false, false), KOR_RC_IO_ERROR);
+}
+
+TEST(FillAtTheEnd, MakesNoPageForAWriteWhereTheStorageRefusesToSeek)
+{
+  EndRefused storage(32, VectorStorage::kReadWrite);
+  TAVCircularBuf ring(&storage, 32, nullptr);
+  EXPECT_EQ(ring.write(40, "x", 1, false), TAV_RC_BAD_PARAM);
+  EXPECT_EQ(ring.reset(), TAV_RC_OK);
+  EXPECT_EQ(storage.bytes, pattern(0, 32));
+}
+
 TEST(FillAtTheEnd, DoesNotTrustAStorageThatTellsMoreThanWasAsked)
 {
   class Boaster : public VectorStorage
