@@ -1,5 +1,6 @@
 /// Following a path of groups.
 #include "api/rawWrite.h"
+#include "api/walkGuard.h"
 #include "format/layout.h"
 #include "kor/traceFrame.h"
 #include "tav/probes.h"
@@ -14,7 +15,7 @@ class PathSearch
 {
 public:
   PathSearch(TAVHandle& handle, TAVHeader& parent, const TAVFindLogicalGroupParam& param)
-      : handle_(handle), parent_(parent), param_(param)
+      : handle_(handle), parent_(parent), param_(param), guard_(parent)
   {
   }
 
@@ -66,6 +67,10 @@ private:
 
   uint32_t descend(const TAVHeader& group)
   {
+    if (!guard_.visit(group.nodeOffset))
+    {
+      return TAV_RC_OUTSIDE_PARENT;
+    }
     ++level_;
     anyGroup_ = true;
     resuming_ = false;
@@ -91,6 +96,7 @@ private:
   TAVHeader& parent_;
   const TAVFindLogicalGroupParam& param_;
   TAVHdrStack chain_; ///< the groups matched, one a level
+  WalkGuard guard_;   ///< of the groups entered
   TAVHdrStack place_; ///< of the present level's search: its parent
   TAVHeader resume_{};
   uint32_t level_ = 0;

@@ -471,7 +471,8 @@ TAV_API uint32_t tavGetSideStorage(TAVHandle* handle, TAVSideStorage** outStorag
 /// @param options     must be 0
 /// @param handle      opened for writing or updating
 /// @param headerData  header and payload; `nodeOffset` receives the node's offset, and under alignment `info`
-///                    of a 64-bit header receives TAV_INFO_ALIGNED8. A group needs no payload.
+///                    of a 64-bit header receives TAV_INFO_ALIGNED8. A group needs no payload. The payload may be
+///                    anywhere, in the descriptor or the handle, too; the descriptor must not lie in the block.
 /// @retval TAV_RC_BAD_PARAM       null argument, null payload of a data element, unknown hdrType
 /// @retval TAV_RC_WRONG_MODE      the handle is for reading
 /// @retval TAV_RC_BAD_OPTIONS     options not 0
@@ -605,6 +606,7 @@ TAV_API uint32_t tavFindElmInt(TAVHandle* handle, TAVHeader* parent, uint32_t mi
 /// always ends.
 /// @retval TAV_RC_NOT_FOUND      the path is empty
 /// @retval TAV_RC_NO_MEMORY      the first entry matches, the whole path does not
+/// @retval TAV_RC_OUTSIDE_PARENT damage leads to groups that were searched before
 /// @retval TAV_RC_NOT_SUPPORTED  the second list is set, even if the path was found
 TAV_API uint32_t tavFindLogicalGroup(uint64_t options, TAVHandle* handle, TAVHeader* parent,
                                      TAVFindLogicalGroupParam* param, TAVHeaderData* out);

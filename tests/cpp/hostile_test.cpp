@@ -157,6 +157,25 @@ TEST(LayerHostile, OpenGroupsThatLeadBackEndTheWalk)
   visitBothWays(rows.bytes);
 }
 
+TEST(LayerHostile, PathThroughOpenGroupsThatOverlapIsNotSearchedOverAndOver)
+{
+  // What follows each group is its second child and its sibling: there are 2^40 ways.
+  ByteRows rows;
+  std::string path;
+  for (int i = 0; i < 80; ++i)
+  {
+    rows.h64(TAV_SIZE_UNKNOWN, TAV_INFO_EYE_SIZE, TAV_TYPE_HEADER64, TAV_ELM_CMN_HOST)
+        .h64(16, 0, TAV_TYPE_BINARY, 7)
+        .pair(32);
+    path += i % 2 == 0 ? "/#" + std::to_string(TAV_ELM_CMN_HOST) : "";
+  }
+  rows.h64(0, 0, TAV_TYPE_BINARY, TAV_ELM_CMN_END_HDR_MARKER);
+  const tav::Reader reader(spanOf(rows.bytes));
+  std::error_code ec;
+  EXPECT_TRUE(reader.root().all(path + "/8", ec).empty());
+  EXPECT_EQ(tav::codeOf(ec), TAV_RC_OUTSIDE_PARENT);
+}
+
 TEST(LayerHostile, ErrorCodeTellsWhyAWalkEnded)
 {
   Bytes stream = sample();

@@ -146,11 +146,11 @@ private:
 };
 
 /// Each open group holds an element whose payload is the pair that ends the group, so that what follows it is both its
-/// second child and its sibling. 12 groups, 592 bytes.
-Bytes overlappingOpenGroups()
+/// second child and its sibling. 12 groups have 592 bytes.
+Bytes overlappingOpenGroups(int count = 12)
 {
   ByteRows rows;
-  for (int i = 0; i < 12; ++i)
+  for (int i = 0; i < count; ++i)
   {
     rows.h64(TAV_SIZE_UNKNOWN, TAV_INFO_EYE_SIZE, TAV_TYPE_HEADER64, 9).h64(16, 0, TAV_TYPE_BINARY, 7).pair(32);
   }
@@ -166,6 +166,20 @@ TEST(HostileStream, OfOpenGroupsThatOverlapIsNotValidatedOverAndOver)
   const StepCounter counter;
   tavValidateSubtreeInt(0, reader.handle(), &root);
   EXPECT_LE(counter.steps, mostSteps(bytes.size())) << "twice as many for every further group";
+}
+
+TEST(HostileStream, OfOpenGroupsThatOverlapIsNotSearchedOverAndOver)
+{
+  const Bytes bytes = overlappingOpenGroups(24);
+  StreamReader reader(bytes);
+  TAVHeader root = header64(TAV_SIZE_UNKNOWN, TAV_TYPE_HEADER64, 9, TAV_INFO_EYE_SIZE);
+  std::vector<TAVPathEntry> path(12, {0, 9});
+  path.push_back({0, 8}); // which no group has
+  TAVFindLogicalGroupParam param{0, path.data(), static_cast<uint32_t>(path.size()), nullptr, 0};
+  TAVHeaderData found{};
+  const StepCounter counter;
+  EXPECT_EQ(tavFindLogicalGroup(0, reader.handle(), &root, &param, &found), TAV_RC_OUTSIDE_PARENT);
+  EXPECT_LE(counter.steps, bytes.size() / 8 * bytes.size() / 8) << "four times as many for every two groups";
 }
 
 TEST(HostileStream, OfOpenGroupsThatOverlapIsNotPrintedOverAndOver)

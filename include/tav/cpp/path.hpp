@@ -37,7 +37,8 @@ public:
     ec.clear();
     if (!steps_.empty())
     {
-      search(start, 0, visit, ec);
+      uint64_t farthest = start.offset();
+      search(start, 0, visit, farthest, ec);
     }
   }
 
@@ -125,20 +126,27 @@ private:
     });
   }
 
-  /// One recursion a step: the path is the caller's, the stream's depth does not matter. False: enough.
+  /// One recursion a step: the path is the caller's, the stream's depth does not matter. False: enough. Only damage
+  /// leads to a node that does not stand behind the `last` one, and from there over the same nodes again.
   template<class Visit>
-  bool search(const Node& parent, size_t level, Visit& visit, std::error_code& ec) const
+  bool search(const Node& parent, size_t level, Visit& visit, uint64_t& farthest, std::error_code& ec) const
   {
     const Step& step = steps_[level];
     uint64_t count = 0;
     for (const Node& child : parent.children(ec))
     {
+      if (child.offset() <= farthest)
+      {
+        detail::report(TAV_RC_OUTSIDE_PARENT, ec);
+        return false;
+      }
+      farthest = child.offset();
       if (!step.matches(child.elm()) || (step.nth != 0 && ++count != step.nth))
       {
         continue;
       }
       const bool last = level + 1 == steps_.size();
-      if (!(last ? visit(child) : search(child, level + 1, visit, ec)))
+      if (!(last ? visit(child) : search(child, level + 1, visit, farthest, ec)))
       {
         return false;
       }
