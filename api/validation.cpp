@@ -186,9 +186,10 @@ uint32_t tavValidateSubtreeInt(uint64_t options, TAVHandle* handle, TAVHeader* h
   {
     return frame.code();
   }
-  const std::unique_ptr<TAVHdrStack> stack(new (std::nothrow) TAVHdrStack);
+  std::unique_ptr<TAVHdrStack> stack(new (std::nothrow) TAVHdrStack);
   static_cast<void>(frame.require(30, stack != nullptr, TAV_RC_NO_HDR_STACK) && frame.step(40, stack->push(header)) &&
                     frame.step(50, walkBelow(options, *handle, *stack)));
+  stack.reset();
   const uint32_t result = frame.code();
   frame.dump(100, result);
   return frame.code();

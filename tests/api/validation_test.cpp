@@ -134,6 +134,21 @@ TEST_P(Validation, TracesTheWalkOverItsStack)
                                    0x88A001B));
 }
 
+TEST_P(Validation, FreesItsStackBeforeItTracesTheResult)
+{
+  writer.add(group64(2));
+  writer.close();
+  read();
+  const TraceLog trace;
+  ASSERT_EQ(tavValidateSubtreeInt(kContainment - 1, reader->handle(), &start), TAV_RC_OK);
+  const std::vector<Step> steps = trace.steps();
+  ASSERT_GE(steps.size(), 3U);
+  EXPECT_THAT(std::vector<Step>(steps.end() - 3, steps.end()),
+              ElementsAre(Step{KOR_TRACE_EXIT, probe::hdrStackEnd, 0},
+                          Step{KOR_TRACE_VAR, probe::validateSubtree, 100},
+                          Step{KOR_TRACE_EXIT, probe::validateSubtree, 0}));
+}
+
 TEST_P(Validation, TracesArgumentsAndResult)
 {
   read();
