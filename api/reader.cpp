@@ -35,11 +35,14 @@ uint32_t readBuffered(TAVHandle& handle, uint64_t offset, bool wide, TAVHeaderDa
 /// always been so over direct memory.
 uint32_t readDirect(const TAVHandle& handle, uint64_t offset, bool wide, TAVHeaderData& out)
 {
+  uint64_t relative = 0;
+  if (!isInDirectData(handle, offset, relative))
+  {
+    return TAV_RC_NO_MEMORY;
+  }
   out.header.hdrType = wide ? TAV_HDR_64 : TAV_HDR_32;
   const uint64_t length = headerLength(out.header.hdrType);
-  uint64_t relative = 0;
-  if (!isInDirectData(handle, offset, relative) || offset > handle.directDataSize ||
-      handle.directDataSize - offset < length)
+  if (offset > handle.directDataSize || handle.directDataSize - offset < length)
   {
     return TAV_RC_NO_MEMORY;
   }

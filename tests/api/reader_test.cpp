@@ -394,6 +394,17 @@ TEST(ReadNodeOverMemory, FailsForRoomAtAnOffsetEqualToTheSize)
   EXPECT_THAT(trace.failures(), ElementsAre(Failure{probe::readNode, 60, TAV_RC_NO_MEMORY}));
 }
 
+TEST(ReadNodeOverMemory, SetsTheFormOnceTheOffsetLiesInTheBlock)
+{
+  StreamReader reader(Bytes(16));
+  TAVHeaderData out = untouched();
+  const uint16_t before = out.header.hdrType;
+  EXPECT_EQ(tavReadNodeInt(0, reader.handle(), 17, true, &out), TAV_RC_NO_MEMORY);
+  EXPECT_EQ(out.header.hdrType, before);
+  EXPECT_EQ(tavReadNodeInt(0, reader.handle(), 16, true, &out), TAV_RC_NO_MEMORY);
+  EXPECT_EQ(out.header.hdrType, TAV_HDR_64);
+}
+
 TEST(ReadNodeOverMemory, DoesNotChangeTheHandle)
 {
   StreamReader reader(ByteRows().h64(4, 0, TAV_TYPE_BINARY, kElm).fill(3).bytes);
