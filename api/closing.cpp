@@ -29,6 +29,16 @@ uint64_t encodeGroupSize(uint64_t size, bool wide, bool swap, uint8_t* to)
   return sizeof word;
 }
 
+void setSize(TAVHeader& group, uint64_t size)
+{
+  if (is64(group))
+  {
+    group.hdr64.size = size;
+    return;
+  }
+  group.hdr32.size = static_cast<uint32_t>(size);
+}
+
 /// Writes the size of a group over the one in the stream.
 uint32_t patchSize(TAVHandle& handle, const TAVHeader& group)
 {
@@ -54,7 +64,7 @@ uint32_t abandonGroup(TAVHandle& handle, const TAVHeader& group)
 
 uint32_t closeGroup32(TAVHandle& handle, TAVHeader& group)
 {
-  group.hdr32.size = static_cast<uint32_t>(handle.streamBytes - group.nodeOffset - kHeaderSize32);
+  setSize(group, handle.streamBytes - group.nodeOffset - kHeaderSize32);
   return patchSize(handle, group);
 }
 
@@ -83,7 +93,7 @@ uint32_t closeGroup64(TAVHandle& handle, TAVHeader& group)
   const bool wasUnknown = isSizeUnknown(group);
   const bool wide = hasChildren64(group);
   const uint64_t payload = handle.streamBytes - group.nodeOffset - kHeaderSize64;
-  group.hdr64.size = payload + (hasEyeSize(group) ? endElementLength(wide) : 0);
+  setSize(group, payload + (hasEyeSize(group) ? endElementLength(wide) : 0));
   const uint32_t rc = patchSize(handle, group);
   // A group of unknown size whose size could not be written is still given an end that a reader can find.
   const bool needsEnd = hasEyeSize(group) || (rc != TAV_RC_OK && wasUnknown);
@@ -132,7 +142,7 @@ bool closeSilently(TAVHandle& handle)
   {
     return false;
   }
-  const TAVHeader& group = stack->pEntries[stack->count - 1];
+  TAVHeader& group = stack->pEntries[stack->count - 1];
   if (!isKnownHdrType(group.hdrType) || hasEyeSize(group)) [[unlikely]]
   {
     return false;
@@ -144,6 +154,7 @@ bool closeSilently(TAVHandle& handle)
   {
     return false;
   }
+  setSize(group, payload);
   encodeGroupSize(payload, wide, handle.swapBytes != 0, to);
   --stack->count;
   return true;

@@ -1,4 +1,5 @@
 /// The handle's life: open, close, reset, and what it sits on.
+#include <cstring>
 #include <new>
 
 #include "kor/traceFrame.h"
@@ -103,7 +104,8 @@ uint32_t allocateHandle(TAVHandle** out)
 {
   void* block = nullptr;
   const uint32_t rc = korMemAlloc(&block, 0, sizeof(TAVHandle), KOR_MEM_PLAIN, kUnit, 465);
-  *out = rc == TAV_RC_OK ? new (block) TAVHandle : nullptr;
+  // All of it is set: a trace shows the bytes between the fields, too.
+  *out = rc == TAV_RC_OK ? new (std::memset(block, 0, sizeof(TAVHandle))) TAVHandle : nullptr;
   return rc;
 }
 

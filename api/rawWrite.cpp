@@ -40,6 +40,10 @@ uint32_t writePayload(TAVHandle& handle, uint64_t& position, uint16_t type, cons
 {
   const SwapRule rule = typeInfo(type).swapRule;
   const uint64_t prefix = handle.swapBytes != 0 ? swappedPrefix(rule, size) : 0;
+  if (prefix != 0 && isDirect(handle) && !hasRoom(handle, position, prefix))
+  {
+    return rawWrite(handle, position, payload, prefix); // which refuses all of it
+  }
   // In pieces, so that an array of any length needs no memory of its size.
   std::array<uint8_t, 1024> piece;
   for (uint64_t done = 0; done < prefix;)

@@ -163,6 +163,16 @@ uint32_t openSilently(TAVHandle& handle, TAVHeader& header, HeaderFields fields)
   return pushEntry<SilentFrame>(*handle.pHdrStack, &header);
 }
 
+/// What ends an append: the node stands where the write offset was. The payload was read before, as it may be one of
+/// these numbers.
+[[gnu::always_inline]] inline uint32_t moveBehind(TAVHandle& handle, TAVHeaderData& node, uint64_t position,
+                                                  uint64_t length)
+{
+  node.header.nodeOffset = position;
+  handle.streamBytes = position + length;
+  return TAV_RC_OK;
+}
+
 /// Appends a data element in place, whether or not it is in the other byte order, padded, or followed by a pair.
 template<bool Wide>
 [[gnu::noinline]] uint32_t addInPlace(TAVHandle& handle, TAVHeaderData& node, HeaderFields fields)
@@ -175,7 +185,8 @@ template<bool Wide>
   const uint64_t position = handle.streamBytes;
   const bool swap = handle.swapBytes != 0;
   uint8_t* const to = takePlace(handle, position, length);
-  if (to == nullptr || (swap && !isApart(node.pDataBuf, size, to, length))) [[unlikely]]
+  const uint8_t* const payload = node.pDataBuf;
+  if (to == nullptr || (swap && !isApart(payload, size, to, length))) [[unlikely]]
   {
     return kUnusual;
   }
@@ -185,56 +196,48 @@ template<bool Wide>
     node.header.hdr64.info = fields.info;
   }
   encodeFields(fields, Wide, swap, to);
-  encodePayload(fields.type, swap, node.pDataBuf, size, to + headerSize);
+  encodePayload(fields.type, swap, payload, size, to + headerSize);
   if (pair)
   {
     const EyeSizeBytes bytes = encodeEyeSize(dataDistance(size), swap);
     std::memcpy(to + headerSize + padded, bytes.data(), bytes.size());
   }
-  node.header.nodeOffset = position;
-  handle.streamBytes = position + (pair ? length : headerSize + padded);
-  return TAV_RC_OK;
+  return moveBehind(handle, node, position, pair ? length : headerSize + padded);
 }
 
-/// Copies what copySmall would call for: as a function of its own that ends the caller, which then saves no registers.
-[[gnu::noinline]] uint32_t copyLong(uint8_t* to, const uint8_t* from, uint64_t length)
+/// Copies a payload that copySmall would call for: as a function of its own that ends the caller, which then saves no
+/// registers.
+[[gnu::noinline, gnu::used]] uint32_t putLong(uint64_t /*options*/, TAVHandle* handle, TAVHeaderData* node,
+                                              const uint8_t* payload, uint64_t size, uint8_t* to)
 {
-  std::memmove(to, from, length);
-  return TAV_RC_OK;
-}
-
-/// Copies a payload, most of which are one 32-bit or 64-bit value.
-[[gnu::always_inline]] inline uint32_t copyPayload(uint8_t* to, const uint8_t* from, uint64_t size)
-{
-  if (size == sizeof(uint32_t))
-  {
-    std::memcpy(to, from, sizeof(uint32_t));
-    return TAV_RC_OK;
-  }
-  if (size == sizeof(uint64_t))
-  {
-    std::memcpy(to, from, sizeof(uint64_t));
-    return TAV_RC_OK;
-  }
-  if (size > kLongestSmall)
-  {
-    return copyLong(to, from, size);
-  }
-  copySmall(to, from, size);
-  return TAV_RC_OK;
+  std::memmove(to, payload, size);
+  return moveBehind(*handle, *node, handle->streamBytes, kHeaderSize64 + size);
 }
 
 /// Puts a data element with a 64-bit header in host order, neither padded nor with a pair, behind the stream's last
-/// node. `to` is where its payload goes.
+/// node. `to` is where its payload goes; most are one 32-bit or 64-bit value.
 [[gnu::always_inline]] inline uint32_t putPlain(TAVHandle& handle, TAVHeaderData& node, uint64_t size, uint64_t rest,
                                                 const uint8_t* payload, uint64_t position, uint8_t* to)
 {
-  node.header.nodeOffset = position;
-  handle.streamBytes = position + size + kHeaderSize64;
   std::memcpy(to - kHeaderSize64, &size, sizeof size);
   keepStoresApart();
   std::memcpy(to - sizeof rest, &rest, sizeof rest);
-  return copyPayload(to, payload, size);
+  if (size == sizeof(uint32_t))
+  {
+    std::memcpy(to, payload, sizeof(uint32_t));
+    return moveBehind(handle, node, position, kHeaderSize64 + size);
+  }
+  if (size == sizeof(uint64_t))
+  {
+    std::memcpy(to, payload, sizeof(uint64_t));
+    return moveBehind(handle, node, position, kHeaderSize64 + size);
+  }
+  if (size > kLongestSmall)
+  {
+    return putLong(0, &handle, &node, payload, size, to);
+  }
+  copySmall(to, payload, size);
+  return moveBehind(handle, node, position, kHeaderSize64 + size);
 }
 
 /// Appends a node in place, other than by putPlain; else `kUnusual`, with nothing done.

@@ -1,5 +1,6 @@
 #include <cstdint>
 #include <cstring>
+#include <optional>
 #include <ostream>
 #include <string>
 #include <vector>
@@ -257,6 +258,22 @@ TEST(CloseHeaderSize, Of64BitsIsNotCut)
   EXPECT_EQ(tavCloseHeader(0, writer.handle()), TAV_RC_OK);
   EXPECT_EQ(toHex(Bytes(writer.handle()->pDirectData, writer.handle()->pDirectData + 8)),
             rows("07 00 00 00 05 00 00 00"));
+}
+
+TEST(CloseHeaderSize, StaysInTheEntryThatWasTakenOffTheStack)
+{
+  for (const bool traced : {false, true})
+  {
+    StreamWriter writer;
+    writer.add(group64(kRoot));
+    writer.add(u32(kRoot, 1));
+    std::optional<TraceLog> trace;
+    if (traced) trace.emplace();
+    ASSERT_EQ(tavCloseHeader(0, writer.handle()), TAV_RC_OK);
+    const TAVHdrStack& stack = *writer.handle()->pHdrStack;
+    EXPECT_EQ(stack.count, 0U);
+    EXPECT_EQ(stack.pEntries[0].hdr64.size, 20U) << "traced: " << traced;
+  }
 }
 
 TEST(CloseHeaderChecks, RefuseANullHandleFirst)

@@ -1,4 +1,5 @@
-/// Payloads that lie in the stream's own block, where the node is going to be written.
+/// Payloads that change while their node is written: they lie in the stream's own block, in the node's descriptor or in
+/// the handle.
 #include <cstdint>
 #include <string>
 
@@ -59,5 +60,72 @@ INSTANTIATE_TEST_SUITE_P(Forms, OverlappingPayload,
                                            Overlap{"SwappedAlignedWide", {.swap = true, .align = true}, true},
                                            Overlap{"AlignedWide", {.align = true}, true}),
                          [](const auto& one) { return std::string(one.param.name); });
+
+struct OwnNumber
+{
+  const char* name;
+  Form form;
+  uint32_t info;
+};
+
+/// Elements whose payload is a number that the append itself moves.
+class OwnNumberAsPayload : public ::testing::TestWithParam<OwnNumber>
+{
+protected:
+  OwnNumberAsPayload()
+      : writer_(GetParam().form)
+  {
+    writer_.add(group64(TAV_ELM_CMN_SYSTEM));
+    node_.header = header64(sizeof(uint64_t), TAV_TYPE_BINARY, 60001, GetParam().info);
+    node_.header.nodeOffset = kBefore;
+    node_.dataBufSize = sizeof(uint64_t);
+  }
+
+  /// The payload that an append wrote.
+  Bytes appended(void* payload)
+  {
+    node_.pDataBuf = static_cast<uint8_t*>(payload);
+    const uint64_t at = writer_.length() + 16;
+    EXPECT_EQ(tavAddElement(0, writer_.handle(), &node_), TAV_RC_OK);
+    const Bytes all = writer_.bytes();
+    return {all.begin() + static_cast<ptrdiff_t>(at), all.begin() + static_cast<ptrdiff_t>(at + 8)};
+  }
+
+  static constexpr uint64_t kBefore = 0x1122334455667788;
+  StreamWriter writer_;
+  TAVHeaderData node_{};
+};
+
+TEST_P(OwnNumberAsPayload, IsTheNodesOffsetAsTheCallerLeftIt)
+{
+  EXPECT_EQ(appended(&node_.header.nodeOffset), bytesOfValue(kBefore));
+  EXPECT_EQ(node_.header.nodeOffset, 16U);
+}
+
+TEST_P(OwnNumberAsPayload, IsTheWriteOffsetBeforeTheNode)
+{
+  EXPECT_EQ(appended(&writer_.handle()->streamBytes), bytesOfValue(uint64_t{16}));
+}
+
+TEST_P(OwnNumberAsPayload, OfManyBytesIsTheWholeDescriptorAsTheCallerLeftIt)
+{
+  node_.header.hdr64.size = sizeof node_;
+  node_.dataBufSize = sizeof node_;
+  node_.pDataBuf = reinterpret_cast<uint8_t*>(&node_);
+  if (GetParam().form.align) node_.header.hdr64.info |= TAV_INFO_ALIGNED8; // the one change that is made before
+  const Bytes before(node_.pDataBuf, node_.pDataBuf + sizeof node_);
+  ASSERT_EQ(tavAddElement(0, writer_.handle(), &node_), TAV_RC_OK);
+  const Bytes all = writer_.bytes();
+  EXPECT_EQ(Bytes(all.begin() + 32, all.begin() + 32 + sizeof node_), before);
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Forms, OwnNumberAsPayload,
+    ::testing::Values(
+        OwnNumber{"Block", {}, 0}, OwnNumber{"BlockWithAPair", {}, TAV_INFO_EYE_SIZE},
+        OwnNumber{"AlignedBlock", {.align = true}, 0},
+        OwnNumber{"Ring", {.buffered = true, .pageBytes = 4096, .ringBytes = 8192}, 0},
+        OwnNumber{"RingWithAPair", {.buffered = true, .pageBytes = 4096, .ringBytes = 8192}, TAV_INFO_EYE_SIZE}),
+    [](const auto& one) { return std::string(one.param.name); });
 
 } // namespace

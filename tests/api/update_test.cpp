@@ -5,6 +5,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include "format/layout.h"
 #include "support/traceLog.h"
 #include "support/writing.h"
 #include "tav/probes.h"
@@ -416,6 +417,24 @@ TEST(UpdateElementRoom, EndsBeforeTheLastByteOfTheBlock)
   TAVHeaderData first{header32(2, TAV_TYPE_UINT16, kCpu, 0), payload.data(), 2, 0};
   EXPECT_EQ(tavUpdateElement(0, handle.get(), &first), TAV_RC_OK);
   EXPECT_EQ(toHex(block), rows("02 00 00 00 35 00 CE EA 09 09 02 00 00 00 35 00 CE EA 03 04"));
+}
+
+TEST(UpdateElementRoom, IsAskedForAWholeArrayBeforeAnyOfItIsReversed)
+{
+  constexpr uint64_t size = 4096;
+  constexpr bool swap = true;
+  Bytes block(16 + size, 0xAA); // ends with the array
+  tav::encodeHeader(header64(size, TAV_TYPE_UINT64_ARRAY, kBlob), swap, block.data());
+  const Bytes before = block;
+  TAVSSMemory storage(block.data(), block.size());
+  Handle handle(storage, TAV_OPT_UPDATE, {.swap = swap});
+  Bytes payload(size, 0x55);
+  TAVHeaderData data{header64(size, TAV_TYPE_UINT64_ARRAY, kBlob), payload.data(), size, 0};
+  const TraceLog trace;
+  EXPECT_EQ(tavUpdateElement(0, handle.get(), &data), TAV_RC_END_OF_STORAGE);
+  EXPECT_EQ(block, before);
+  EXPECT_THAT(trace.failures(), ElementsAre(Failure{probe::rawWrite, 30, TAV_RC_END_OF_STORAGE},
+                                            Failure{probe::updateElement, 90, TAV_RC_END_OF_STORAGE}));
 }
 
 TEST(UpdateElementRoom, IsNeededByANodeOfNoBytesToo)
