@@ -131,8 +131,9 @@ inline std::optional<uint16_t> idOf(std::string_view enumNameOrTag)
 {
   // Sorted when first asked: sorted at compile time it would cost every source file that includes this header.
   static const detail::Keys keys = detail::sortedKeys();
-  const auto found = std::lower_bound(keys.begin(), keys.end(), enumNameOrTag,
-                                      [](detail::Key key, std::string_view text) { return key.text() < text; });
+  const detail::Keys::const_iterator found =
+      std::lower_bound(keys.begin(), keys.end(), enumNameOrTag,
+                       [](detail::Key key, std::string_view text) { return key.text() < text; });
   if (found == keys.end() || found->text() != enumNameOrTag)
   {
     return std::nullopt;
