@@ -93,28 +93,30 @@ Ending* Recovery::nextEnding()
 
 void Recovery::closeFinished()
 {
-  while (frames_.size() > 1 && frames_.back().limit <= position_ && !keepsOpen())
+  while (frames_.size() > 1 && frames_.back().limit <= position_)
   {
-    closeGroup();
+    wouldReadAsOpen() ? keepOpen() : closeGroup();
   }
 }
 
-/// A root of size 0 that something follows reads as one that was never closed: one that has lost all it held takes what
-/// comes behind it.
-bool Recovery::keepsOpen()
+/// Whether the innermost group, if it were closed now, would read as one that was never closed: a root of size 0 that
+/// something follows.
+bool Recovery::wouldReadAsOpen() const
+{
+  const Frame& top = frames_.back();
+  return frames_.size() == 2 && !top.hidden && top.wide == form_.root64 && position_ < source_.size() &&
+         rebuilder_.isEmpty();
+}
+
+/// Lets the innermost group take what comes behind it, up to the end of the file.
+void Recovery::keepOpen()
 {
   Frame& top = frames_.back();
-  if (frames_.size() != 2 || top.hidden || top.wide != form_.root64 || position_ >= source_.size() ||
-      !rebuilder_.isEmpty())
-  {
-    return false;
-  }
   totals_.closed += top.open ? 0 : 1;
   top.limit = source_.size();
   top.open = true;
   top.sure = false;
   top.sureAt = 0;
-  return true;
 }
 
 void Recovery::closeGroup()
@@ -226,7 +228,11 @@ bool Recovery::takeEnding()
   {
     lose(position_ + pair, "a damaged pair of an end element");
   }
-  if (top.open && !keepsOpen())
+  if (top.open && wouldReadAsOpen())
+  {
+    keepOpen();
+  }
+  else if (top.open)
   {
     closeGroup();
     ++totals_.closed;

@@ -118,7 +118,8 @@ private:
   bool leadsTo(uint64_t from, bool wide, uint64_t end);
 
   void closeFinished();
-  bool keepsOpen();
+  bool wouldReadAsOpen() const;
+  void keepOpen();
   bool takeEnding();
   bool takeEnd(uint64_t offset, bool wide);
   bool enterEnding();

@@ -19,6 +19,7 @@ PROCESSES = min(2, os.cpu_count() or 1)
 KILOBYTE = 1024
 PAGE = 512
 KINDS = (1, 2, *SIZES, *FREE)
+FORMS = [Form(big, wide, align) for big in (False, True) for wide in (False, True) for align in (False, True)]
 ELEMENTS = {int(line.split()[0]) for line in tav("elements").out.splitlines() if line.split()[0].isdigit()}
 
 
@@ -344,6 +345,51 @@ class Unfinished(ToolTest):
         report, saved = self.saved(path, *form.options())
         self.assertEqual((report["groupsMade"], report["lost"], report["nodes"]), (1, 16, 2))
         self.assertEqual(saved[12:16], bytes([2, 0, 20, 0]))
+
+
+class EmptyRoot(ToolTest):
+    """A root of size 0 is closed, or was never closed: what follows it tells."""
+
+    def saved(self, made, form):
+        report, saved = recovered(self.folder, made, form)
+        result = tav("check", self.folder / "saved.tav", *form.options())
+        self.assertEqual(result.status, 0, result.out)
+        return report, saved
+
+    def test_a_root_that_lost_all_it_held_takes_what_follows(self):
+        for form in FORMS:
+            root = Node(NAMED[0], 2 if form.wide else 1, children=[Node(NAMED[1], 57, bytes(range(8)))])
+            next_root = Node(NAMED[2], root.kind, children=[Node(NAMED[3], 57, bytes(range(8, 16)))])
+            made, behind = encode(form, root), encode(form, next_root)
+            made[root.payload_offset:] = b"\xff" * (root.end - root.payload_offset)
+            with self.subTest(form=form.options()):
+                report, saved = self.saved(made + behind, form)
+                self.assertEqual((report["lost"], report["groupsClosed"]), (root.end - root.payload_offset, 1))
+                width = 8 if form.wide else 4
+                size = len(behind).to_bytes(width, form.order)
+                self.assertEqual(saved, size + made[width:root.payload_offset] + behind)
+
+    def test_a_root_with_a_damaged_end_element_takes_what_follows_when_it_lost_all_it_held(self):
+        for form in FORMS:
+            root = Node(NAMED[0], 2 if form.wide else 1, children=[Node(END, BINARY, b"\xff" * 16)])
+            root.force_size = -1
+            node = Node(NAMED[1], 57, bytes(range(8)))
+            made, behind = encode(form, root), encode(form, node)
+            with self.subTest(form=form.options()):
+                report, saved = self.saved(made + behind, form)
+                self.assertEqual((report["lost"], report["groupsMade"]), (16, 0))
+                width = 8 if form.wide else 4
+                size = len(behind).to_bytes(width, form.order)
+                self.assertEqual(saved, size + made[width:root.payload_offset] + behind)
+
+    def test_an_empty_root_is_closed_where_a_surer_root_of_another_width_follows(self):
+        """Read with 32-bit headers, what follows are nodes, too, of a kind: their sizes lead to the end."""
+        form = Form(align=True)
+        group_of_nothing = bytes.fromhex("0000000001000000")
+        holder = Node(NAMED[0], 1, children=[Node(NAMED[4], 51, b"Z"), Node(NAMED[5], 57, group_of_nothing)])
+        made = encode(form, Node(NAMED[3], 1, children=[])) + encode(form, holder)
+        report, saved = self.saved(made, form)
+        self.assertEqual((saved, report["lost"], report["groupsClosed"]), (made, 0, 0))
 
 
 class Cost(ToolTest):
