@@ -161,7 +161,7 @@ bool Prober::isChain(uint64_t offset, bool wide, uint64_t limit, bool toTheEnd)
     const uint64_t start = offset + headerLength(node.hdrType);
     if (isGroup(node) && isSizeUnknown(node))
     {
-      return i > 2;
+      return i > 2 || (!toTheEnd && judge(offset, wide, limit) == Belief::followed);
     }
     offset = start + (isGroup(node) ? sizeOf(node) : std::min(paddedSize(node), limit - start));
     uint64_t distance = 0;

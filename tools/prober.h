@@ -66,8 +66,8 @@ public:
   /// Whether what stands behind a node is another node, or the bounds end there.
   bool isFollowed(const TAVHeader& node, uint64_t limit);
 
-  /// Whether nodes of any kind follow one another from `offset` on, by their sizes alone, up to the limit or many of
-  /// them. Says something of nodes with types and elements that nobody knows.
+  /// Whether nodes of any kind follow one another from `offset` on, by their sizes alone, up to the limit, to an open
+  /// group that a node follows, or many of them. Says something of nodes with types and elements that nobody knows.
   /// With `toTheEnd`, only up to the limit will do.
   bool isChain(uint64_t offset, bool wide, uint64_t limit, bool toTheEnd = false);
 

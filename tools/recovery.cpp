@@ -66,7 +66,7 @@ bool Recovery::step()
     take(found);
     return true;
   }
-  if (!endByZeros())
+  if (!endByZeros() && !loseStranger(found.header()))
   {
     gap();
   }
@@ -455,6 +455,20 @@ bool Recovery::findNext(uint64_t from, uint64_t to, Candidate& found)
     }
   }
   return false;
+}
+
+/// A node that no reader takes but that is no damage goes alone: what follows it can have a name that nobody knows, and
+/// no search finds that.
+bool Recovery::loseStranger(const TAVHeader& header)
+{
+  uint64_t end = 0;
+  if (damaged_ || !isStranger(header, end))
+  {
+    return false;
+  }
+  lose(end, isKnown(header) ? "a node of a size that its type does not have" : "a node of an unknown type");
+  damaged_ = false;
+  return true;
 }
 
 void Recovery::gap()

@@ -113,6 +113,8 @@ private:
   bool isContradicted(const Candidate& found);
   bool isRun(uint64_t offset, bool wide);
   bool believe(Candidate& found, bool onWay);
+  bool endOfStranger(const TAVHeader& header, uint64_t limit, uint64_t& end);
+  bool isStranger(const TAVHeader& header, uint64_t& end);
   bool isDamagedEnd(const Candidate& found, uint64_t limit);
   uint64_t firstSure(uint64_t from, uint64_t to, bool wide);
   bool leadsTo(uint64_t from, bool wide, uint64_t end);
@@ -126,6 +128,7 @@ private:
   void trimPair(Candidate& found);
   void take(Candidate found);
   void takeGroup(const Candidate& found);
+  bool loseStranger(const TAVHeader& header);
   void gap();
   bool findNext(uint64_t from, uint64_t to, Candidate& found);
   bool tryAt(const uint8_t* bytes, uint64_t offset, bool wide, Candidate& found);

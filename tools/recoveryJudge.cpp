@@ -344,6 +344,56 @@ uint64_t Recovery::firstSure(uint64_t from, uint64_t to, bool wide)
   return at;
 }
 
+/// Where a data element ends that no reader takes, for its type or for a size that its type does not have. Type 0 is
+/// what bytes of zeros have.
+bool Recovery::endOfStranger(const TAVHeader& header, uint64_t limit, uint64_t& end)
+{
+  if (prober_.judgeHeader(header, limit) != Belief::fits || typeOf(header) == 0 || isGroup(header) ||
+      isEndElement(elmOf(header)))
+  {
+    return false;
+  }
+  end = addSaturated(header.nodeOffset + headerLength(header.hdrType), prober_.paddedSize(header));
+  uint64_t distance = 0;
+  if (hasEyeSize(header) && (!prober_.pairAt(end, limit, distance) || distance != dataDistance(sizeOf(header))))
+  {
+    return false;
+  }
+  end += hasEyeSize(header) ? kEyeSizeLength : 0;
+  return end <= limit;
+}
+
+/// Whether all but a node's own header speaks for it: nodes go on behind it, perhaps behind others like it, and none
+/// begins in its bytes, as in a group whose type is damaged.
+bool Recovery::isStranger(const TAVHeader& header, uint64_t& end)
+{
+  constexpr int kMost = 16;
+  const uint64_t limit = std::min(sureLimit(), frames_.back().limit);
+  const bool wide = is64(header);
+  if (!endOfStranger(header, limit, end))
+  {
+    return false;
+  }
+  uint64_t at = end;
+  TAVHeader next{};
+  for (int i = 0; i < kMost && at != limit && !isBoundary(at) && !goesOn(at, wide); ++i)
+  {
+    if (!prober_.header(at, wide, limit, next))
+    {
+      return false;
+    }
+    if (prober_.judgeHeader(next, limit) >= Belief::typed)
+    {
+      return prober_.isChain(at, wide, limit) && firstSure(header.nodeOffset + 1, end, wide) == end;
+    }
+    if (!endOfStranger(next, limit, at))
+    {
+      return false;
+    }
+  }
+  return firstSure(header.nodeOffset + 1, end, wide) == end;
+}
+
 /// Whether nodes follow one another from a place exactly to another one, into groups that end behind it.
 bool Recovery::leadsTo(uint64_t from, bool wide, uint64_t end)
 {

@@ -198,7 +198,11 @@ std::string Walker::whyNot(const TAVHeader& header, uint64_t limit) const
   {
     return isGroup(header) ? "no node: a group without an end and without a child" : "no node: its size is all ones";
   }
-  return "no node: type " + std::to_string(typeOf(header)) + " is unknown, and no node follows";
+  const std::string type = std::to_string(typeOf(header));
+  return "no node: " +
+         (typeInfo(typeOf(header)).known ? "a size of " + std::to_string(sizeOf(header)) + " does not suit type " + type
+                                         : "type " + type + " is unknown") +
+         ", and no node follows";
 }
 
 bool Walker::looksUnfinished(const Node& node, const Frame& parent)

@@ -87,6 +87,17 @@ class Hostile(ToolTest):
         nodes, damaged = tree_rows(tav("tree", self.file(content), "--paths", "--width", "0").out)
         self.assertEqual(([node[0] for node in nodes], damaged), ([0, 64], [16]))
 
+    def test_strange_nodes_before_an_open_group_that_a_node_follows_are_no_damage(self):
+        strange = struct.pack("<QIHH", 7, 0, 58, 60102) + b"1234567" + struct.pack("<QIHH", 9, 0, 2353, 30000) + b"123456789"
+        content = group(OPEN, 30000) + number(1) + strange + group(OPEN) + number(2)
+        nodes, damaged = tree_rows(tav("tree", self.file(content), "--paths", "--width", "0").out)
+        self.assertEqual(([node[0] for node in nodes], damaged), ([0, 16, 36, 59, 84, 100], []))
+
+    def test_a_size_that_does_not_suit_the_type_is_told_of_damage(self):
+        content = group(OPEN) + number(1) + struct.pack("<QIHH", 7, 0, 58, 60102) + b"\xff" * 40 + number(2)
+        shown = tav("tree", self.file(content), "--width", "0").out
+        self.assertIn("no node: a size of 7 does not suit type 58, and no node follows", shown)
+
     def test_claims_of_4_GiB_in_small_files(self):
         for content in (group(2**32) + struct.pack("<QIHH", 2**32, 0, 101, 60102) + b"x" * 8,
                         group(OPEN) + struct.pack("<QIHH", OPEN - 40, 0, 101, 60102) + b"x" * 8,

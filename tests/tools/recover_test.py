@@ -392,6 +392,52 @@ class EmptyRoot(ToolTest):
         self.assertEqual((saved, report["lost"], report["groupsClosed"]), (made, 0, 0))
 
 
+class Strangers(ToolTest):
+    """Nodes that no reader takes, for their type or for a size that their type does not have, in a stream without damage."""
+
+    UNKNOWN_TYPE, UNNAMED = 2353, next(elm for elm in range(30000, 60000) if elm not in ELEMENTS)
+
+    def tree(self, form, info, strangers):
+        def unnamed(kind, payload):
+            return Node(self.UNNAMED, kind, payload, info=info)
+
+        children = [Node(NAMED[1], 57, bytes(range(8))), *strangers, unnamed(51, b"Z"), unnamed(55, b"abcd"), *strangers[:1],
+                    unnamed(BINARY, b"0123456789"), Node(NAMED[2], 55, b"last")]
+        return Node(NAMED[0], 2 if form.wide else 1, children=children)
+
+    def check(self, reason, kind, payload):
+        for form in FORMS:
+            for info in (0, EYE_SIZE) if form.wide else (0,):
+                one, two = (Node(elm, kind, payload, info=info) for elm in (NAMED[3], self.UNNAMED))
+                with self.subTest(form=form.options(), info=info):
+                    report, saved = recovered(self.folder, encode(form, self.tree(form, info, [one, two])), form)
+                    self.assertEqual(saved, encode(form, self.tree(form, info, [])))
+                    self.assertEqual({loss["length"] for loss in report["list"]}, {one.end - one.offset})
+                    self.assertEqual([loss["reason"] for loss in report["list"]], [reason] * 3)
+
+    def test_one_of_an_unknown_type_goes_alone_whatever_the_names_behind_it(self):
+        self.check("a node of an unknown type", self.UNKNOWN_TYPE, b"0123456789abc")
+
+    def test_one_of_a_size_that_its_type_does_not_have_goes_alone(self):
+        self.check("a node of a size that its type does not have", 58, b"1234567")
+
+    def test_the_second_half_of_a_pair_is_not_one_that_holds_a_whole_node(self):
+        self.assertEqual(judged(1, 699)[2], "")
+
+    def test_what_is_in_a_group_whose_type_is_damaged_comes_back(self):
+        for form in FORMS:
+            inside = [Node(NAMED[4], 57, bytes(range(8))), Node(NAMED[5], 55, b"abcd")]
+            group = Node(NAMED[3], 2 if form.wide else 1, children=inside)
+            root = Node(NAMED[0], group.kind, children=[Node(NAMED[1], 57, bytes(8)), group, Node(NAMED[2], 55, b"last")])
+            made = encode(form, root)
+            kind_at = group.offset + (12 if form.wide else 4)
+            made[kind_at:kind_at + 2] = self.UNKNOWN_TYPE.to_bytes(2, form.order)
+            with self.subTest(form=form.options()):
+                report, saved = recovered(self.folder, made, form)
+                self.assertEqual(missing(inside, read_back(saved, form)), [])
+                self.assertEqual(report["lost"], group.payload_offset - group.offset)
+
+
 class Cost(ToolTest):
     def bytes_read(self, *arguments):
         result = tav(*arguments, "--stats", "--ring", "64K")
