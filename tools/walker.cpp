@@ -216,11 +216,11 @@ bool Walker::looksUnfinished(const Node& node, const Frame& parent)
   {
     return false;
   }
-  // Children that nobody knows count unless what stands there is surely a sibling, with a header of the other width.
+  // Children that nobody knows count unless what stands there is surer as a sibling, with a header of the other width.
   const uint64_t start = node.payloadOffset();
   const bool wide = hasChildren64(node.header);
   return prober_.judge(start, wide, parent.limit) >= Belief::typed ||
-         (prober_.judge(start, is64(node.header), parent.limit) < Belief::followed &&
+         (prober_.judge(start, is64(node.header), parent.limit) < Belief::typed &&
           prober_.isChain(start, wide, parent.limit));
 }
 

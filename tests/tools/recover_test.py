@@ -21,6 +21,7 @@ PAGE = 512
 KINDS = (1, 2, *SIZES, *FREE)
 FORMS = [Form(big, wide, align) for big in (False, True) for wide in (False, True) for align in (False, True)]
 ELEMENTS = {int(line.split()[0]) for line in tav("elements").out.splitlines() if line.split()[0].isdigit()}
+UNNAMED = next(elm for elm in range(30000, 60000) if elm not in ELEMENTS)
 
 
 def zeroed(rng, made):
@@ -382,24 +383,26 @@ class EmptyRoot(ToolTest):
                 size = len(behind).to_bytes(width, form.order)
                 self.assertEqual(saved, size + made[width:root.payload_offset] + behind)
 
-    def test_an_empty_root_is_closed_where_a_surer_root_of_another_width_follows(self):
+    def test_an_empty_root_is_closed_where_a_surer_root_of_another_width_follows_whatever_its_name(self):
         """Read with 32-bit headers, what follows are nodes, too, of a kind: their sizes lead to the end."""
         form = Form(align=True)
         group_of_nothing = bytes.fromhex("0000000001000000")
-        holder = Node(NAMED[0], 1, children=[Node(NAMED[4], 51, b"Z"), Node(NAMED[5], 57, group_of_nothing)])
-        made = encode(form, Node(NAMED[3], 1, children=[])) + encode(form, holder)
-        report, saved = self.saved(made, form)
-        self.assertEqual((saved, report["lost"], report["groupsClosed"]), (made, 0, 0))
+        for elm in (NAMED[0], UNNAMED):
+            holder = Node(elm, 1, children=[Node(NAMED[4], 51, b"Z"), Node(NAMED[5], 57, group_of_nothing)])
+            made = encode(form, Node(NAMED[3], 1, children=[])) + encode(form, holder)
+            with self.subTest(elm=elm):
+                report, saved = self.saved(made, form)
+                self.assertEqual((saved, report["lost"], report["groupsClosed"]), (made, 0, 0))
 
 
 class Strangers(ToolTest):
     """Nodes that no reader takes, for their type or for a size that their type does not have, in a stream without damage."""
 
-    UNKNOWN_TYPE, UNNAMED = 2353, next(elm for elm in range(30000, 60000) if elm not in ELEMENTS)
+    UNKNOWN_TYPE = 2353
 
     def tree(self, form, info, strangers):
         def unnamed(kind, payload):
-            return Node(self.UNNAMED, kind, payload, info=info)
+            return Node(UNNAMED, kind, payload, info=info)
 
         children = [Node(NAMED[1], 57, bytes(range(8))), *strangers, unnamed(51, b"Z"), unnamed(55, b"abcd"), *strangers[:1],
                     unnamed(BINARY, b"0123456789"), Node(NAMED[2], 55, b"last")]
@@ -408,7 +411,7 @@ class Strangers(ToolTest):
     def check(self, reason, kind, payload):
         for form in FORMS:
             for info in (0, EYE_SIZE) if form.wide else (0,):
-                one, two = (Node(elm, kind, payload, info=info) for elm in (NAMED[3], self.UNNAMED))
+                one, two = (Node(elm, kind, payload, info=info) for elm in (NAMED[3], UNNAMED))
                 with self.subTest(form=form.options(), info=info):
                     report, saved = recovered(self.folder, encode(form, self.tree(form, info, [one, two])), form)
                     self.assertEqual(saved, encode(form, self.tree(form, info, [])))
