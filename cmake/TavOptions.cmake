@@ -8,7 +8,7 @@ option(TAV_BUILD_BENCH "Build the benchmarks" OFF)
 option(TAV_INSTALL "Add the libraries to what is installed" ${PROJECT_IS_TOP_LEVEL})
 option(TAV_WERROR "Treat warnings as errors" ${PROJECT_IS_TOP_LEVEL})
 option(TAV_FUZZ "Drive the programs of fuzz/ by libFuzzer; needs clang and fuzzer-no-link in TAV_SANITIZE" OFF)
-set(TAV_TEST_OPTIMIZATION "-O1" CACHE STRING "How far a release build optimises the tests themselves")
+set(TAV_TEST_OPTIMIZATION "-O0" CACHE STRING "How far the tests themselves are optimised")
 set(TAV_SANITIZE "" CACHE STRING "Sanitizers, as -fsanitize takes them: address,undefined or thread")
 
 # Shared unless BUILD_SHARED_LIBS says otherwise; the variable itself is the surrounding project's.
