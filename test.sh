@@ -2,8 +2,9 @@
 # Installs what is missing, builds and runs every test.
 #   ./test.sh          with g++, optimised
 #   TAV_STAGES=REGEX   only the stages whose titles match
-#   ./test.sh --full   what CI runs: the checks of the sources, both compilers, the sanitizers, fuzzing, packages
-#   ./test.sh --platforms   libc++, s390x under qemu, Windows under wine
+#   ./test.sh --full   what CI runs: the checks of the sources, both compilers, the sanitizers, fuzzing, packages,
+#                      the other platforms
+#   ./test.sh --platforms   of these the platforms alone: libc++, s390x under qemu, Windows under wine
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")"
 
@@ -173,6 +174,7 @@ check_platform()
     programs+=(tav_load)
     local shards=1 # of two programs that start wine together one may wait for ever
   fi
+  build release --target tav_tool tav_streams # with which streams cross
   build "$preset" --target "${@/%/_tests}" property_tests "${programs[@]}"
   run_rooms "$preset" "$folder" "$ending" "$@"
   run_properties "$preset" "$folder" "$ending"
@@ -208,6 +210,13 @@ check_static()
   run_tests static --tests-regex '^(install|examples)\.'
 }
 
+platforms()
+{
+  stage "libc++" check_platform libcxx tests "" "" "${rooms[@]}"
+  stage "s390x, big-endian" check_platform s390x tests "" "qemu-s390x-static -L /usr/s390x-linux-gnu" "${rooms[@]}"
+  stage "Windows" check_platform windows bin .exe "$PWD/cmake/run-windows.sh" "${rooms[@]}"
+}
+
 full()
 {
   stage "format" cmake/format.sh --check
@@ -219,18 +228,12 @@ full()
   stage "g++" build_and_test release
   stage "clang++" check_clang
   stage "static libraries" check_static
+  platforms
   stage "address and undefined behaviour" check_sanitizers
   stage "fuzzing" fuzz/run.sh fixed
   stage "threads" check_thread
   stage "Debian packages" cmake/check-packages.sh
   stage "binary interface" tests/abi/check.sh
-}
-
-platforms()
-{
-  stage "libc++" check_platform libcxx tests "" "" "${rooms[@]}"
-  stage "s390x, big-endian" check_platform s390x tests "" "qemu-s390x-static -L /usr/s390x-linux-gnu" "${rooms[@]}"
-  stage "Windows" check_platform windows bin .exe "$PWD/cmake/run-windows.sh" kor format storage golden cpp
 }
 
 work=$(mktemp -d)
@@ -242,7 +245,7 @@ case ${1:-} in
     stage "g++" build_and_test release
     ;;
   --full)
-    stage "packages" cmake/install-packages.sh build test full
+    stage "packages" cmake/install-packages.sh build test full platforms
     # The same sources are compiled again and again, at every place where the project is checked out.
     export CMAKE_CXX_COMPILER_LAUNCHER=ccache CCACHE_BASEDIR=$PWD CCACHE_NOHASHDIR=1
     export CCACHE_SLOPPINESS=pch_defines,time_macros,include_file_mtime,include_file_ctime
@@ -250,7 +253,6 @@ case ${1:-} in
     ;;
   --platforms)
     stage "packages" cmake/install-packages.sh build test platforms
-    stage "g++" build release --target tav_tool tav_streams
     platforms
     ;;
   *)
