@@ -2,7 +2,7 @@
 # Fuzzes for a time or a number of times: builds the preset `fuzz`, runs each target from its corpus and all findings
 # of the past, and fails on a new finding. What is new in a corpus and what was found stays in build/fuzz-work.
 #   fuzz/run.sh SECONDS [TARGET...]      targets: read write layer tool recover build; all unless some are named
-#   fuzz/run.sh fixed [TARGET...]        the same inputs in every run, as many as take some 15 seconds: a fast machine
+#   fuzz/run.sh fixed [TARGET...]        the same inputs in every run, as many as take about a minute: a fast machine
 #                                        finds nothing that a slow one has passed
 # To reproduce: build/fuzz/fuzz/fuzz_TARGET FILE. A finding becomes a file in fuzz/findings/TARGET, which every build
 # runs as a test from then on.
@@ -19,7 +19,7 @@ if (($# == 0)) || [[ ! $1 =~ ^([0-9]+|fixed)$ ]]; then
 fi
 seconds=$1
 shift
-declare -A executions=([read]=20000 [write]=5000 [layer]=40000 [tool]=5000 [recover]=25000 [build]=4500)
+declare -A executions=([read]=70000 [write]=20000 [layer]=140000 [tool]=20000 [recover]=90000 [build]=17000)
 targets=("$@")
 ((${#targets[@]} > 0)) || targets=(read write layer tool recover build)
 
