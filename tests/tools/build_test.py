@@ -75,7 +75,7 @@ class ByHand(Folder):
                             (-2 ** 31 - 1, 58), (2 ** 64, 103), (-2 ** 63 - 1, 104), (True, 51)]:
             data = build({"system": {"hostName": value}}).raw
             with self.subTest(value=value):
-                self.assertEqual(int.from_bytes(data[28:30], "big" if BIG_ENDIAN else "little"), kind)
+                self.assertEqual(int.from_bytes(data[28:30], encode.HOST), kind)
 
     def test_the_order_of_keys_does_not_matter_where_it_need_not(self):
         document = {"nodes": [{"children": [{"value": "ada", "type": "ASCII String", "element": "hostName"}],

@@ -141,7 +141,7 @@ class Diff(Folder):
         writer = encode.Writer(encode.Form())
         writer.open(60100)
         for i in range(30000):
-            writer.data(60103, encode.UINT32, i.to_bytes(4, "little"))
+            writer.data(60103, encode.UINT32, encode.words(i, size=4))
         for _ in range(20000):
             writer.open(60102)
         while writer.groups:

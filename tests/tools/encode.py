@@ -15,6 +15,14 @@ INTEGERS = {51: "B", 52: "b", 53: "H", 54: "h", 55: "I", 56: "i", 57: "Q", 58: "
 NAMES = [60100, 60102, 60103, 60101, 60104, 60105, 60109, 60111, 60117, 60118, 307, 321, 20, 1003, 1004, 45307]
 
 
+HOST = "big" if BIG_ENDIAN else "little"
+
+
+def words(*numbers, size=8):
+    """Numbers as a stream in the order of the program's machine has them."""
+    return b"".join(number.to_bytes(size, HOST) for number in numbers)
+
+
 class Form:
     def __init__(self, big=BIG_ENDIAN, root32=False, aligned=False):
         self.big, self.root32, self.aligned = big, root32, aligned

@@ -127,11 +127,11 @@ class Document(Folder):
 
     def test_values_are_written_in_their_natural_form(self):
         for kind, payload, value in [
-                (encode.UINT32, b"\x07\0\0\0", 7), (encode.UINT64, b"\xff" * 8, 2 ** 64 - 1), (52, b"\xff", -1),
-                (encode.ASCII, b"a\0\"\n\x1b", "a\0\"\n\x1b"), (encode.UTF8, b"\xb8\x04\xc3\xa4", "\u00e4"),
+                (encode.UINT32, encode.words(7, size=4), 7), (encode.UINT64, b"\xff" * 8, 2 ** 64 - 1), (52, b"\xff", -1),
+                (encode.ASCII, b"a\0\"\n\x1b", "a\0\"\n\x1b"), (encode.UTF8, encode.words(1208, size=2) + b"\xc3\xa4", "\u00e4"),
                 (103, b"\xff" * 16, str(2 ** 128 - 1)), (104, b"\xff" * 16, "-1"), (105, b"\x2a", 42),
-                (encode.ARRAY, b"\1" + bytes(7) + b"\2" + bytes(7), [1, 2]),
-                (encode.STAMP, (1709202600).to_bytes(8, "little") + bytes(8), "2024-02-29T10:30:00.000000+00:00")]:
+                (encode.ARRAY, encode.words(1, 2), [1, 2]),
+                (encode.STAMP, encode.words(1709202600) + bytes(8), "2024-02-29T10:30:00.000000+00:00")]:
             with self.subTest(kind=kind):
                 self.assertEqual(self.only_child(kind, payload)["value"], value)
 
@@ -144,14 +144,14 @@ class Document(Folder):
                 self.assertNotIn("value", node)
 
     def test_a_date_that_the_calendar_does_not_hold_is_four_numbers(self):
-        node = self.only_child(encode.STAMP, (2 ** 63).to_bytes(8, "little") + b"\1\0\2\0\3\0\xff\xff")
+        node = self.only_child(encode.STAMP, encode.words(2 ** 63) + encode.words(1, 2, 3, 0xFFFF, size=2))
         self.assertEqual(node["value"], {"seconds": 2 ** 63, "fractionA": 1, "fractionB": 2, "further": 3,
                                          "offsetMinutes": -1})
 
     def test_safe_writes_large_numbers_as_texts(self):
-        self.assertEqual(self.only_child(encode.UINT64, (2 ** 53 + 1).to_bytes(8, "little"), "--safe")["value"],
+        self.assertEqual(self.only_child(encode.UINT64, encode.words(2 ** 53 + 1), "--safe")["value"],
                          str(2 ** 53 + 1))
-        self.assertEqual(self.only_child(encode.UINT64, (2 ** 53).to_bytes(8, "little"), "--safe")["value"], 2 ** 53)
+        self.assertEqual(self.only_child(encode.UINT64, encode.words(2 ** 53), "--safe")["value"], 2 ** 53)
 
     def test_damaged_bytes_have_a_reason_and_the_status_is_1(self):
         data = bytearray(self.stream(None, lambda w: [w.data(60103, encode.ASCII, b"x" * 8) for _ in range(4)]))

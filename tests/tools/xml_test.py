@@ -25,7 +25,7 @@ class Xml(Folder):
 
     def test_names_types_and_values(self):
         root = self.tree_of(lambda w: [w.open(60102), w.data(60103, encode.ASCII, b"ada"), w.close()])
-        self.assertEqual(root.attrib, {"byteOrder": "little", "root": "64", "aligned": "false"})
+        self.assertEqual(root.attrib, {"byteOrder": encode.HOST, "root": "64", "aligned": "false"})
         self.assertEqual(root.find("system").attrib, {"type": "group64", "header": "64"})
         self.assertEqual(root.find("system/host/hostName").text, "ada")
         self.assertEqual(root.find("system/host/hostName").get("type"), "ASCII String")
@@ -34,7 +34,7 @@ class Xml(Folder):
         for text in ("a<b>&\"c'", "]]>", "<!-- -->", "&amp;", "  blanks ", "line\nend\r\ttab", "\u00e4\u20ac\U0001f600", ""):
             with self.subTest(text=text):
                 self.assertEqual(self.value_of(encode.ASCII, text.encode()).text or "", text)
-                self.assertEqual(self.value_of(encode.UTF8, b"\xb8\x04" + text.encode()).text or "", text)
+                self.assertEqual(self.value_of(encode.UTF8, encode.words(1208, size=2) + text.encode()).text or "", text)
 
     def test_what_xml_cannot_hold_is_hexadecimal(self):
         for payload in (b"a\0b", b"\x1b[31m", b"\xff", b"\xed\xa0\x80", "\ufffe".encode(), "x\uffff".encode()):
@@ -43,8 +43,8 @@ class Xml(Folder):
                 self.assertEqual((node.get("encoding"), node.text), ("hex", payload.hex()))
 
     def test_numbers(self):
-        for kind, payload, text in [(encode.UINT32, b"\x07\0\0\0", "7"), (52, b"\xff", "-1"), (104, b"\xff" * 16, "-1"),
-                                    (encode.ARRAY, b"\1" + bytes(7) + b"\2" + bytes(7), "1 2")]:
+        for kind, payload, text in [(encode.UINT32, encode.words(7, size=4), "7"), (52, b"\xff", "-1"), (104, b"\xff" * 16, "-1"),
+                                    (encode.ARRAY, encode.words(1, 2), "1 2")]:
             with self.subTest(kind=kind):
                 self.assertEqual(self.value_of(kind, payload).text, text)
 
@@ -52,12 +52,12 @@ class Xml(Folder):
         for seconds, text in [(0, "1970-01-01T00:00:00"), (68169600, "1972-02-29T00:00:00"), (1703980800, "2023-12-31T00:00:00"),
                               (1709164800, "2024-02-29T00:00:00"), (1735603200, "2024-12-31T00:00:00"),
                               (4107542400, "2100-03-01T00:00:00")]:
-            node = self.value_of(encode.STAMP, seconds.to_bytes(8, "little") + bytes(8))
+            node = self.value_of(encode.STAMP, encode.words(seconds) + bytes(8))
             with self.subTest(seconds=seconds):
                 self.assertEqual(node.text, text + ".000000+00:00")
 
     def test_a_date_that_its_text_does_not_tell_has_its_fields(self):
-        node = self.value_of(encode.STAMP, (2 ** 63).to_bytes(8, "little") + b"\1\0\2\0\3\0\xff\xff")
+        node = self.value_of(encode.STAMP, encode.words(2 ** 63) + encode.words(1, 2, 3, 0xFFFF, size=2))
         self.assertEqual((node.get("seconds"), node.get("further"), node.get("offsetMinutes")), (str(2 ** 63), "3", "-1"))
 
     def test_an_unknown_element_is_told_by_its_id(self):
