@@ -139,7 +139,8 @@ namespace
 
 uint32_t readForward(TraceFrame& frame, TAVSSFile& storage, uint64_t wanted, void* buffer, uint64_t& done)
 {
-  if (storage.needSeek != 0 && seekToCursor(frame, 100, *storage.pFile, storage.position) != TAV_RC_OK)
+  if (!frame.require(20, buffer != nullptr || wanted == 0, TAV_RC_BAD_PARAM) ||
+      (storage.needSeek != 0 && seekToCursor(frame, 100, *storage.pFile, storage.position) != TAV_RC_OK))
   {
     return frame.code();
   }
@@ -165,12 +166,14 @@ uint32_t readBackward(TraceFrame& frame, TAVSSFile& storage, uint64_t wanted, ui
   KORFileReadParam param;
   param.length = std::min({storage.position, wanted, bufSize});
   const uint64_t start = storage.position - param.length;
-  if (seekToCursor(frame, 40, *storage.pFile, start) != TAV_RC_OK)
+  if (!frame.require(20, buffer != nullptr || param.length == 0, TAV_RC_BAD_PARAM) ||
+      seekToCursor(frame, 40, *storage.pFile, start) != TAV_RC_OK)
   {
     return frame.code();
   }
   uint64_t got = 0;
-  static_cast<void>(frame.step(50, storage.pFile->read(&param, buffer + (bufSize - param.length), &got)));
+  uint8_t* const to = buffer != nullptr ? buffer + (bufSize - param.length) : nullptr;
+  static_cast<void>(frame.step(50, storage.pFile->read(&param, to, &got)));
   storage.position = start;
   storage.needSeek = 1; // the file now stands behind the bytes, the cursor before them
   if (bytesCount(frame.code()))
@@ -198,8 +201,7 @@ uint32_t TAVSSFile::read(uint64_t wanted, void** ppData, uint64_t bufSize, uint6
     static_cast<void>(wanted != 0 ? frame.fail(230, TAV_RC_NOT_SUPPORTED) : frame.fail(220, TAV_RC_BAD_PARAM));
     return frame.code();
   }
-  if (!frame.require(10, pFile != nullptr, KOR_RC_NOT_OPEN) ||
-      !frame.require(20, *ppData != nullptr, TAV_RC_BAD_PARAM))
+  if (!frame.require(10, pFile != nullptr, KOR_RC_NOT_OPEN))
   {
     return frame.code();
   }

@@ -225,6 +225,21 @@ TEST_F(FileStorage, NeedsPlacesForBytesAndCount)
                                             at(tav::probe::ssFileRead, 20, TAV_RC_BAD_PARAM)));
 }
 
+TEST_F(FileStorage, NeedsNoBufferForNoBytes)
+{
+  OpenFile file(fileOf(20), KOR_FILE_READ);
+  uint64_t got = 99;
+  void* pData = nullptr;
+  EXPECT_EQ(file->read(0, &pData, 5, &got, false, false), TAV_RC_OK);
+  EXPECT_EQ(file->read(5, &pData, 0, &got, false, false), TAV_RC_OK);
+  EXPECT_EQ(file->read(5, &pData, 5, &got, false, true), TAV_RC_END_OF_STORAGE) << "nothing stands before";
+  ASSERT_EQ(file->seek(4, 1), TAV_RC_OK);
+  EXPECT_EQ(file->read(0, &pData, 5, &got, false, true), TAV_RC_OK);
+  EXPECT_EQ(got, 0U);
+  EXPECT_EQ(file->read(5, &pData, 5, &got, false, true), TAV_RC_BAD_PARAM);
+  EXPECT_EQ(file->position, 4U);
+}
+
 struct UnservedRow
 {
   const char* name;
