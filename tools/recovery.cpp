@@ -197,6 +197,11 @@ bool Recovery::takeEnd(uint64_t offset, bool wide)
   while (frames_.size() > at)
   {
     const Frame& top = frames_.back();
+    if (wouldReadAsOpen()) // of a root that asks for no end element none is kept
+    {
+      keepOpen();
+      break;
+    }
     totals_.closed += top.open || top.limit != ending.end ? 1 : 0;
     closeGroup();
   }

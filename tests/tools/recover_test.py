@@ -383,6 +383,17 @@ class EmptyRoot(ToolTest):
                 size = len(behind).to_bytes(width, form.order)
                 self.assertEqual(saved, size + made[width:root.payload_offset] + behind)
 
+    def test_a_root_that_asks_for_no_end_element_takes_what_follows_the_one_it_has(self):
+        for form in (form for form in FORMS if form.wide):
+            pair = EYE.to_bytes(8, form.order) + (32).to_bytes(8, form.order)
+            root = Node(NAMED[0], 2, children=[Node(END, BINARY, pair)])
+            node = Node(NAMED[1], 57, bytes(range(8)))
+            made, behind = encode(form, root), encode(form, node)
+            with self.subTest(form=form.options()):
+                report, saved = self.saved(made + behind, form)
+                self.assertEqual((report["lost"], report["groupsMade"]), (0, 0))
+                self.assertEqual(saved, len(behind).to_bytes(8, form.order) + made[8:root.payload_offset] + behind)
+
     def test_an_empty_root_is_closed_where_a_surer_root_of_another_width_follows_whatever_its_name(self):
         """Read with 32-bit headers, what follows are nodes, too, of a kind: their sizes lead to the end."""
         form = Form(align=True)
