@@ -35,7 +35,8 @@ GROUPS = {
         "api/dataBuffer.cpp", "api/validation.cpp", "api/walkGuard.h",
     ],
     "ring": [
-        "storage/circularBuf.cpp", "storage/circularFill.cpp", "storage/circularRelease.cpp", "storage/cachedRun.h",
+        "storage/circularBuf.cpp", "storage/circularFill.cpp", "storage/circularRelease.cpp", "storage/cachedRun.cpp",
+        "storage/cachedRun.h",
     ],
     "writer": [
         "api/writer.cpp", "api/writerStrings.cpp", "api/rawWrite.cpp", "api/rawWrite.h", "api/closing.cpp",
