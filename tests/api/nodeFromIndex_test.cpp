@@ -350,6 +350,20 @@ TEST_P(NodeFromIndex, LimitsTheEyeCatcherAndNotTheNodeAfterIt)
   EXPECT_EQ(find(kAfter, 0, 32), TAV_RC_OK);
 }
 
+TEST_P(NodeFromIndex, ReadsNodesWithoutOptions)
+{
+  addGroup(32, 16, TAV_ELM_CMN_END_HDR_EYE_SIZE, 32);
+  ASSERT_EQ(find(0, 0), TAV_RC_OK);
+  uint64_t reads = 0;
+  for (const Record& record : trace.recordsOf(probe::readNode))
+  {
+    if (record.kind != KOR_TRACE_VAR || record.point != 0) continue;
+    ++reads;
+    EXPECT_EQ(record.items.at(0), bytesOf(uint64_t{0}));
+  }
+  EXPECT_GE(reads, 2U) << "the group, and the element that holds its pair";
+}
+
 TEST_P(NodeFromIndex, TracesEntryArgumentsResultAndExit)
 {
   addElement(1);

@@ -94,6 +94,24 @@ TEST(SilentStep, NeedsTheRingOfAHandleThatIsNotDirect)
   EXPECT_EQ(codeOf([&] { return tavGetNextChild(0, reader.handle(), &root, nullptr, &out); }), TAV_RC_NO_CIRCULAR_BUF);
 }
 
+TEST(SilentAdd, NeedsHandleAndDescriptor)
+{
+  for (const bool buffered : {false, true})
+  {
+    StreamWriter writer({.buffered = buffered});
+    writer.add(group64(kRoot));
+    EXPECT_EQ(codeOf([&] { return tavAddElement(0, writer.handle(), nullptr); }), TAV_RC_BAD_PARAM);
+  }
+  Element node = u32(kOther, 1);
+  TAVHeaderData data = node.data();
+  EXPECT_EQ(codeOf([&] { return tavAddElement(0, nullptr, &data); }), TAV_RC_BAD_PARAM);
+}
+
+TEST(SilentClose, NeedsAHandle)
+{
+  EXPECT_EQ(codeOf([] { return tavCloseHeader(0, nullptr); }), TAV_RC_BAD_PARAM);
+}
+
 TEST(SilentAdd, IsRefusedByAReader)
 {
   StreamReader reader(smallStream());

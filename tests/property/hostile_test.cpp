@@ -168,6 +168,19 @@ TEST(HostileStream, OfOpenGroupsThatOverlapIsNotValidatedOverAndOver)
   EXPECT_LE(counter.steps, mostSteps(bytes.size())) << "twice as many for every further group";
 }
 
+TEST(HostileStream, OfOpenGroupsThatOverlapFarBehindIsNotValidatedOverAndOver)
+{
+  constexpr uint64_t before = 0x10000;
+  const Bytes groups = overlappingOpenGroups(20);
+  Bytes bytes(before);
+  bytes.insert(bytes.end(), groups.begin(), groups.end());
+  StreamReader reader(bytes);
+  TAVHeader root = header64(TAV_SIZE_UNKNOWN, TAV_TYPE_HEADER64, 9, TAV_INFO_EYE_SIZE, before);
+  const StepCounter counter;
+  tavValidateSubtreeInt(0, reader.handle(), &root);
+  EXPECT_LE(counter.steps, mostSteps(groups.size())) << "what stands before gives it no more";
+}
+
 TEST(HostileStream, OfOpenGroupsThatOverlapIsNotSearchedOverAndOver)
 {
   const Bytes bytes = overlappingOpenGroups(24);

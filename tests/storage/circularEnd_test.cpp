@@ -200,6 +200,21 @@ TEST(FillAtTheEnd, KeepsWhatWasCachedWhenABackwardReadFails)
   EXPECT_EQ(small.bytes(), pattern(43, 16));
 }
 
+TEST(FillAtTheEnd, CountsNothingWhereTheStorageTellsNoNumber)
+{
+  class Mute : public VectorStorage
+  {
+  public:
+    using VectorStorage::VectorStorage;
+    uint32_t read(uint64_t, void**, uint64_t, uint64_t*, bool, bool) override { return TAV_RC_END_OF_STORAGE; }
+  };
+  Mute storage(8, {}, VectorStorage::kReadOnly);
+  TAVCircularBuf ring(&storage, 16, nullptr);
+  TAVCBUserArea area{};
+  EXPECT_EQ(ring.getChunk(0, 1, &area, false, false), TAV_RC_END_OF_STORAGE);
+  EXPECT_EQ(ring.empty, 1);
+}
+
 /// As memory storage does: a place behind the last byte is none.
 class EndRefused : public VectorStorage
 {

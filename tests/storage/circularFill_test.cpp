@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include "storage/ringFixture.h"
+#include "tav/probes.h"
 
 namespace
 {
@@ -301,6 +302,28 @@ TEST(Fill, JumpsBackSoThatTheOffsetIsTheLastByte)
   ASSERT_EQ(small.chunk(100, 8, true), TAV_RC_OK);
   EXPECT_EQ(small.ring.headOffset, 77U);
   EXPECT_EQ(small.bytes(), pattern(93, 8));
+}
+
+TEST(Fill, JumpsBackByARingThatBeginsBehindTheFirstByte)
+{
+  SmallRing small(400);
+  small.cache(0, 300, 8);
+  ASSERT_EQ(small.chunk(24, 8, true), TAV_RC_OK);
+  EXPECT_EQ(small.ring.headOffset, 1U);
+  EXPECT_EQ(small.bytes(), pattern(17, 8));
+}
+
+TEST(Fill, ReportsAFailureBehindThePlan)
+{
+  SmallRing small(100);
+  small.storage.longestTransfer = 3;
+  ASSERT_EQ(small.chunk(0, 1), TAV_RC_OK);
+  small.storage.failAt(2, KOR_RC_IO_ERROR);
+  const TraceLog trace;
+  EXPECT_EQ(small.chunk(9, 1), KOR_RC_IO_ERROR);
+  const std::vector<Failure> failures = trace.failuresOf(tav::probe::cbFill);
+  ASSERT_EQ(failures.size(), 1U);
+  EXPECT_EQ(failures.front(), (Failure{tav::probe::cbFill, 20, KOR_RC_IO_ERROR}));
 }
 
 TEST(Fill, JumpsBackToTheFirstByteNearTheFront)

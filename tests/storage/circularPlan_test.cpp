@@ -88,6 +88,19 @@ TEST(FillAtTheEnd, BackwardZeroesFromTheRingsStartWhenTheStorageEndsAtTheRingsEn
   EXPECT_THAT(small.flags(), ElementsAre(1, 0, 0, 0)) << "the page that was cleared is pending";
 }
 
+TEST(FillAtTheEnd, BackwardZeroesWhatAWritableStorageLostOfAPageThatLiesInTwo)
+{
+  SmallRing small(33, 4);
+  small.cache(19, 40, 8);
+  std::fill_n(small.ring.pRing, 19, uint8_t{0xFF});
+  ASSERT_EQ(small.chunk(36, 1, true), TAV_RC_OK);
+  EXPECT_EQ(small.ring.headOffset, 32U);
+  EXPECT_EQ(std::vector<uint8_t>(small.ring.pRing, small.ring.pRing + 11), std::vector<uint8_t>(11, 0xFF));
+  EXPECT_THAT(std::vector<uint8_t>(small.ring.pRing + 11, small.ring.pRing + 19),
+              ElementsAre(byteAt(32), 0, 0, 0, 0, 0, 0, 0));
+  EXPECT_THAT(small.flags(), ElementsAre(0, 1, 1, 0));
+}
+
 // --- which steps are taken ---
 
 TEST(CachedOffset, BeforeTheCachedRangeIsRefusedWithoutCounting)
