@@ -9,6 +9,6 @@ if [[ ! -e $WINEPREFIX/system.reg ]]; then
   # Made once, by one of the tests that start together; the 32-bit half of wine is missed here and nowhere else.
   flock "$WINEPREFIX" sh -c '[ -e "$WINEPREFIX/system.reg" ] || { wineboot --init && wineserver --wait; }' >/dev/null 2>&1 || true
 fi
-# Debian's wine starts its server anew for each program, which takes two seconds; one that waits for the next is there.
+# A server that waits for the next program spares that one a start of its own.
 wineserver --persistent=20 >/dev/null 2>&1 </dev/null || true
 exec wine "$@"
