@@ -14,6 +14,7 @@
 #include <benchmark/benchmark.h>
 
 #include "bench/file.hpp"
+#include "bench/floorApi.hpp"
 
 using namespace file;
 
@@ -177,6 +178,115 @@ void pwritePieces(benchmark::State& state)
   });
 }
 
+/// Each page read before it is written: the least that a stream costs that does not know that a page will be full.
+void preadPwritePages(benchmark::State& state)
+{
+  std::vector<char> page(kPageBytes);
+  perFile(state, [&](int fd) -> uint64_t {
+    for (size_t at = 0; at < kFileBytes; at += kPageBytes)
+    {
+      const auto offset = static_cast<off_t>(at);
+      if (::pread(fd, page.data(), kPageBytes, offset) < 0 || ::pwrite(fd, page.data(), kPageBytes, offset) < 0)
+      {
+        std::abort();
+      }
+    }
+    return 0;
+  });
+}
+
+constexpr uint64_t kPagePieces = kPageBytes / kPieceBytes; // the last bytes of each page are unused
+constexpr uint64_t kPieceData = kPieceBytes - sizeof(floor0::Header);
+constexpr uint64_t kPieceWords = kPieceData / sizeof(uint64_t);
+
+/// What the pieces' payloads add up to: the first word of piece i is i.
+constexpr uint64_t kPiecesSum = [] {
+  const uint64_t pieces = kFileBytes / kPageBytes * kPagePieces;
+  return pieces * (pieces - 1) / 2;
+}();
+
+/// Fills a page by a call a piece, and writes it; the first piece's number comes in and the next one's goes out.
+void writePageByCalls(int fd, size_t at, std::vector<char>& page, uint64_t& number)
+{
+  floorApi::Handle handle;
+  floorApi::init(&handle, page.data(), kPageBytes);
+  handle.depth = 1; // below some group
+  uint64_t words[kPieceWords] = {};
+  for (uint64_t i = 0; i < kPagePieces; ++i)
+  {
+    words[0] = number++;
+    floorApi::Node node;
+    node.header = {kPieceData, 0, floor0::kString, 1000};
+    node.data = words;
+    if (floorApi::addTuned(0, &handle, &node) != 0)
+    {
+      std::abort();
+    }
+  }
+  if (::pwrite(fd, page.data(), kPageBytes, static_cast<off_t>(at)) < 0)
+  {
+    std::abort();
+  }
+}
+
+uint64_t writeByCalls(int fd)
+{
+  std::vector<char> page(kPageBytes);
+  uint64_t number = 0;
+  for (size_t at = 0; at < kFileBytes; at += kPageBytes)
+  {
+    writePageByCalls(fd, at, page, number);
+  }
+  return number;
+}
+
+uint64_t sumPageByCalls(std::vector<char>& page)
+{
+  floorApi::Handle handle;
+  floorApi::init(&handle, page.data(), kPagePieces * kPieceBytes);
+  floorApi::Node nodes[2];
+  const floorApi::Node* previous = nullptr;
+  uint64_t sum = 0;
+  for (size_t i = 0; floorApi::nextChild(0, &handle, nullptr, previous, &nodes[i]) == 0; i ^= 1U)
+  {
+    previous = &nodes[i];
+    sum += sumWords(static_cast<const char*>(nodes[i].data), kPieceData);
+  }
+  return sum;
+}
+
+/// The own page behind a library boundary: one call for each piece, as floorApi.hpp says.
+void pwriteCalls(benchmark::State& state)
+{
+  perFile(state, [](int fd) { return writeByCalls(fd); });
+}
+
+void preadCalls(benchmark::State& state)
+{
+  const int made = ::open(path().c_str(), O_RDWR);
+  writeByCalls(made);
+  ::close(made);
+  std::vector<char> page(kPageBytes);
+  uint64_t wrong = 0;
+  perFile(state, [&](int fd) {
+    uint64_t sum = 0;
+    for (size_t at = 0; at < kFileBytes; at += kPageBytes)
+    {
+      if (::pread(fd, page.data(), kPageBytes, static_cast<off_t>(at)) < 0)
+      {
+        std::abort();
+      }
+      sum += sumPageByCalls(page);
+    }
+    wrong += sum != kPiecesSum;
+    return sum;
+  });
+  if (wrong != 0)
+  {
+    state.SkipWithError("what was written reads back otherwise");
+  }
+}
+
 void stdioRead(benchmark::State& state, size_t buffer, bool unlocked)
 {
   path();
@@ -275,6 +385,7 @@ BENCHMARK_CAPTURE(preadPages, c, 256 * kKiB)->Name("W7read/pread_256KiB")->UseRe
 BENCHMARK_CAPTURE(preadPages, d, kPageBytes)->Name("W7read/pread_1MiB")->UseRealTime();
 BENCHMARK_CAPTURE(preadPages, e, 4 * kPageBytes)->Name("W7read/pread_4MiB")->UseRealTime();
 BENCHMARK(preadPieces)->Name("W7read/pread_1MiB_40B_pieces")->UseRealTime();
+BENCHMARK(preadCalls)->Name("W7read/pread_1MiB_40B_floor_api")->UseRealTime();
 BENCHMARK_CAPTURE(stdioRead, a, 0, false)->Name("W7read/fread_40B_default_buffer")->UseRealTime();
 BENCHMARK_CAPTURE(stdioRead, b, kPageBytes, false)->Name("W7read/fread_40B_1MiB_buffer")->UseRealTime();
 BENCHMARK_CAPTURE(stdioRead, c, kPageBytes, true)->Name("W7read/fread_unlocked_40B_1MiB_buffer")->UseRealTime();
@@ -288,6 +399,8 @@ BENCHMARK_CAPTURE(pwritePages, c, 256 * kKiB)->Name("W7write/pwrite_256KiB")->Us
 BENCHMARK_CAPTURE(pwritePages, d, kPageBytes)->Name("W7write/pwrite_1MiB")->UseRealTime();
 BENCHMARK_CAPTURE(pwritePages, e, 4 * kPageBytes)->Name("W7write/pwrite_4MiB")->UseRealTime();
 BENCHMARK(pwritePieces)->Name("W7write/pwrite_1MiB_40B_pieces")->UseRealTime();
+BENCHMARK(pwriteCalls)->Name("W7write/pwrite_1MiB_40B_floor_api_tuned")->UseRealTime();
+BENCHMARK(preadPwritePages)->Name("W7write/pread_pwrite_1MiB")->UseRealTime();
 BENCHMARK_CAPTURE(stdioWrite, a, 0, false)->Name("W7write/fwrite_40B_default_buffer")->UseRealTime();
 BENCHMARK_CAPTURE(stdioWrite, b, kPageBytes, false)->Name("W7write/fwrite_40B_1MiB_buffer")->UseRealTime();
 BENCHMARK_CAPTURE(stdioWrite, c, kPageBytes, true)->Name("W7write/fwrite_unlocked_40B_1MiB_buffer")->UseRealTime();

@@ -66,7 +66,8 @@ def kind(entry):
     """Whether an entry is the library's, a floor, or a peer."""
     if entry.startswith(LIBRARY):
         return "library"
-    return "floor" if entry.startswith(FLOORS) and "_40B_" not in entry else "peer"
+    own_page = "_40B_" in entry and "_floor_api" not in entry
+    return "floor" if entry.startswith(FLOORS) and not own_page else "peer"
 
 
 @dataclass(frozen=True)

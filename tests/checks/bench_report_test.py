@@ -57,6 +57,7 @@ class Tables(unittest.TestCase):
     def test_tell_the_own_page_of_a_peer_from_the_floor(self):
         self.assertEqual(report.kind("pread_1MiB"), "floor")
         self.assertEqual(report.kind("pread_1MiB_40B_pieces"), "peer")
+        self.assertEqual(report.kind("pread_1MiB_40B_floor_api"), "floor")
 
     def test_relate_goals_to_the_floor_of_the_same_run(self):
         must, aim = W1.goal
