@@ -4,6 +4,7 @@
 #include <functional>
 #include <memory>
 #include <string>
+#include <utility>
 
 #include <gtest/gtest.h>
 
@@ -129,6 +130,21 @@ TEST(SilentAdd, RefusesAHeaderOfNoKnownForm)
   TAVHeaderData data = node.data();
   EXPECT_EQ(codeOf([&] { return tavAddElement(0, writer.handle(), &data); }), TAV_RC_BAD_PARAM);
   EXPECT_EQ(writer.length(), 16U);
+}
+
+TEST(SilentAdd, TakesNothingBeforeAnEmptyStackForTheOpenGroup)
+{
+  for (const bool buffered : {false, true})
+  {
+    StreamWriter writer({.buffered = buffered});
+    TAVHdrStack& stack = *writer.handle()->pHdrStack;
+    TAVHeader entries[2] = {group64(kRoot).header, {}};
+    TAVHeader* const own = std::exchange(stack.pEntries, &entries[1]);
+    Element node = u32(kOther, 1);
+    TAVHeaderData data = node.data();
+    EXPECT_EQ(codeOf([&] { return tavAddElement(0, writer.handle(), &data); }), TAV_RC_BAD_CHILD_HDR);
+    stack.pEntries = own;
+  }
 }
 
 /// A payload that is turned in pieces, of which the ring is smaller than one.
