@@ -50,6 +50,14 @@ TEST_P(AfterOpenGroup, TheSiblingIsFoundFromTheEyeCatcherOn)
   EXPECT_EQ(trace.dump(probe::findNodeFromIndex, 0).items.at(3), bytesOf(uint64_t{0}));
 }
 
+TEST_P(AfterOpenGroup, TheScanBeginsAtTheGroup)
+{
+  ASSERT_EQ(next(&root, &group), TAV_RC_OK);
+  const Record scan = trace.dump(probe::findEyeSizeCombo, 0);
+  EXPECT_EQ(scan.items.at(1), bytesOf(uint64_t{16}));
+  EXPECT_EQ(scan.items.at(3), bytesOf(true));
+}
+
 TEST_P(AfterOpenGroup, TheScanIsLimitedByTheParentsSizeAndNotByItsEnd)
 {
   struct Limit

@@ -108,6 +108,18 @@ TEST(SilentAdd, NeedsHandleAndDescriptor)
   EXPECT_EQ(codeOf([&] { return tavAddElement(0, nullptr, &data); }), TAV_RC_BAD_PARAM);
 }
 
+TEST(SilentAdd, NeedsTheRingOfAHandleThatIsNotDirect)
+{
+  StreamWriter writer({.buffered = true});
+  writer.add(group64(kRoot));
+  const WithoutRing without(writer.handle());
+  for (Element node : {group64(kOther), u32(kOther, 1)})
+  {
+    TAVHeaderData data = node.data();
+    EXPECT_EQ(codeOf([&] { return tavAddElement(0, writer.handle(), &data); }), TAV_RC_NO_CIRCULAR_BUF);
+  }
+}
+
 TEST(SilentClose, NeedsAHandle)
 {
   EXPECT_EQ(codeOf([] { return tavCloseHeader(0, nullptr); }), TAV_RC_BAD_PARAM);

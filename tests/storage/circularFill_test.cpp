@@ -181,6 +181,17 @@ TEST(Fill, OverARingOfOnePageReadsOnePageAtATime)
   EXPECT_EQ(small.ring.headOffset, 24U);
 }
 
+TEST(Fill, OverARingOfOnePageReadsBackwardOnce)
+{
+  SmallRing small(100, 1, VectorStorage::kReadOnly);
+  small.cache(0, 16, 8);
+  ASSERT_EQ(small.chunk(15, 1, true), TAV_RC_OK);
+  EXPECT_THAT(small.storage.takeLog(), ElementsAre("seek 8", "read 8+8"));
+  EXPECT_EQ(small.ring.headOffset, 8U);
+  EXPECT_EQ(small.count(), 8U);
+  EXPECT_EQ(small.bytes(), pattern(15, 1));
+}
+
 TEST(Fill, MakesRoomAtTheHeadForPagesAtTheTail)
 {
   SmallRing small(100, 3, VectorStorage::kReadOnly);

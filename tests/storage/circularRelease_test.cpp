@@ -170,6 +170,16 @@ TEST(Release, AtTheTailWritesThePieceWhereItBelongs)
   EXPECT_EQ(small.storage.bytes, pattern(0, 100));
 }
 
+TEST(Release, AtTheTailSeeksAlsoWhereTheStorageStandsAtTheHead)
+{
+  SmallRing small(100);
+  ASSERT_EQ(small.chunk(43, 17), TAV_RC_OK);
+  small.storage.takeLog();
+  small.storage.position = 43;
+  ASSERT_EQ(small.chunk(42, 0, true), TAV_RC_OK);
+  EXPECT_THAT(small.storage.takeLog(), ElementsAre("seek 59", "write 59+8", "seek 35", "read 35+8"));
+}
+
 TEST(Release, AtTheTailTakesAPartOfAPageFirst)
 {
   SmallRing small(62, 3, VectorStorage::kReadOnly);
