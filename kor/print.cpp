@@ -1,14 +1,13 @@
-#include <algorithm>
 #include <cstdarg>
 #include <cstdio>
 
 #include "tav/kor.h"
 
-uint64_t korSnprintf(char* pBuffer, uint64_t bufferSize, const char* pFormat, ...)
+uint32_t korSnprintf(char* pBuffer, uint64_t bufferSize, const char* pFormat, ...)
 {
-  if (pBuffer == nullptr || bufferSize == 0) return 0;
-  pBuffer[0] = '\0';
-  if (pFormat == nullptr) return 0;
+  if (pBuffer == nullptr) return TAV_RC_BAD_PARAM;
+  if (bufferSize != 0) pBuffer[0] = '\0';
+  if (pFormat == nullptr) return TAV_RC_BAD_PARAM;
 
   va_list arguments;
   va_start(arguments, pFormat);
@@ -17,8 +16,8 @@ uint64_t korSnprintf(char* pBuffer, uint64_t bufferSize, const char* pFormat, ..
 
   if (wanted < 0)
   {
-    pBuffer[0] = '\0'; // a format that fails half-way has stored its first half
-    return 0;
+    if (bufferSize != 0) pBuffer[0] = '\0'; // a format that fails half-way has stored its first half
+    return TAV_RC_BAD_PARAM;
   }
-  return std::min(static_cast<uint64_t>(wanted), bufferSize - 1);
+  return static_cast<uint64_t>(wanted) < bufferSize ? TAV_RC_OK : TAV_RC_NO_MEMORY;
 }

@@ -87,9 +87,9 @@ KOR_API uint32_t korOneTimeOnly(void);
 KOR_API uint64_t korThreadID(void);
 
 /// Formats into `pBuffer`, never past `bufferSize` bytes, and ends the text with NUL when bufferSize is not 0.
-/// @return the characters stored without the NUL (not a code); a text that does not fit is cut, and a format
-///         that fails stores an empty text
-KOR_API uint64_t korSnprintf(char* pBuffer, uint64_t bufferSize, const char* pFormat, ...) KOR_PRINTF_FORMAT(3, 4);
+/// @retval TAV_RC_NO_MEMORY  the text does not fit: what fits is stored
+/// @retval TAV_RC_BAD_PARAM  no buffer, no format, or one that fails: an empty text is stored where there is room
+KOR_API uint32_t korSnprintf(char* pBuffer, uint64_t bufferSize, const char* pFormat, ...) KOR_PRINTF_FORMAT(3, 4);
 
 /// The name of a code, such as "TAV_RC_BAD_PARAM" for 0x9000000C; "unknown code" for others. Never null.
 KOR_API const char* korCodeName(uint32_t code);

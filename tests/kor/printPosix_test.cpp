@@ -11,7 +11,7 @@ TEST(Print, AFormatThatFailsStoresAnEmptyText)
 {
   std::array<char, 64> buffer{'#'};
   const wchar_t notACharacter[] = {static_cast<wchar_t>(0x110000), L'\0'};
-  EXPECT_EQ(korSnprintf(buffer.data(), buffer.size(), "before %ls", notACharacter), 0u);
+  EXPECT_EQ(korSnprintf(buffer.data(), buffer.size(), "before %ls", notACharacter), TAV_RC_BAD_PARAM);
   EXPECT_EQ(std::string(buffer.data()), "");
 }
 } // namespace

@@ -27,10 +27,10 @@ private:
   std::array<char, 64> bytes_{};
 };
 
-TEST(Print, FormatsAndTellsTheCharactersStored)
+TEST(Print, FormatsWhatFits)
 {
   Buffer buffer;
-  EXPECT_EQ(korSnprintf(buffer.data(), 64, "%s %" PRIu64 " 0x%04X", "node", UINT64_MAX, 0xABu), 32u);
+  EXPECT_EQ(korSnprintf(buffer.data(), 64, "%s %" PRIu64 " 0x%04X", "node", UINT64_MAX, 0xABu), TAV_RC_OK);
   EXPECT_EQ(buffer.text(), "node 18446744073709551615 0x00AB");
   EXPECT_TRUE(buffer.isUntouchedFrom(33));
 }
@@ -38,7 +38,7 @@ TEST(Print, FormatsAndTellsTheCharactersStored)
 TEST(Print, ATextThatFitsExactlyIsWhole)
 {
   Buffer buffer;
-  EXPECT_EQ(korSnprintf(buffer.data(), 6, "%s", "12345"), 5u);
+  EXPECT_EQ(korSnprintf(buffer.data(), 6, "%s", "12345"), TAV_RC_OK);
   EXPECT_EQ(buffer.text(), "12345");
   EXPECT_TRUE(buffer.isUntouchedFrom(6));
 }
@@ -46,7 +46,7 @@ TEST(Print, ATextThatFitsExactlyIsWhole)
 TEST(Print, ATextThatDoesNotFitIsCut)
 {
   Buffer buffer;
-  EXPECT_EQ(korSnprintf(buffer.data(), 5, "%s", "12345"), 4u);
+  EXPECT_EQ(korSnprintf(buffer.data(), 5, "%s", "12345"), TAV_RC_NO_MEMORY);
   EXPECT_EQ(buffer.text(), "1234");
   EXPECT_TRUE(buffer.isUntouchedFrom(5));
 }
@@ -54,7 +54,7 @@ TEST(Print, ATextThatDoesNotFitIsCut)
 TEST(Print, RoomForTheEndAloneGivesAnEmptyText)
 {
   Buffer buffer;
-  EXPECT_EQ(korSnprintf(buffer.data(), 1, "%s", "12345"), 0u);
+  EXPECT_EQ(korSnprintf(buffer.data(), 1, "%s", "12345"), TAV_RC_NO_MEMORY);
   EXPECT_EQ(buffer.text(), "");
   EXPECT_TRUE(buffer.isUntouchedFrom(1));
 }
@@ -62,12 +62,22 @@ TEST(Print, RoomForTheEndAloneGivesAnEmptyText)
 TEST(Print, NoRoomAtAllWritesNothing)
 {
   Buffer buffer;
-  EXPECT_EQ(korSnprintf(buffer.data(), 0, "%s", "12345"), 0u);
+  EXPECT_EQ(korSnprintf(buffer.data(), 0, "%s", "12345"), TAV_RC_NO_MEMORY);
   EXPECT_TRUE(buffer.isUntouchedFrom(0));
 }
 
-TEST(Print, ANullBufferWithoutRoomIsAccepted)
+TEST(Print, NeedsABuffer)
 {
-  EXPECT_EQ(korSnprintf(nullptr, 0, "%s", "12345"), 0u);
+  EXPECT_EQ(korSnprintf(nullptr, 0, "%s", "12345"), TAV_RC_BAD_PARAM);
+  EXPECT_EQ(korSnprintf(nullptr, 64, "%s", "12345"), TAV_RC_BAD_PARAM);
+}
+
+TEST(Print, NeedsAFormat)
+{
+  Buffer buffer;
+  const char* const none = nullptr;
+  EXPECT_EQ(korSnprintf(buffer.data(), 64, none), TAV_RC_BAD_PARAM);
+  EXPECT_EQ(buffer.text(), "");
+  EXPECT_TRUE(buffer.isUntouchedFrom(1));
 }
 } // namespace
