@@ -48,24 +48,15 @@ uint32_t patchSize(TAVHandle& handle, const TAVHeader& group)
   return rawWrite(handle, position, bytes.data(), length);
 }
 
-uint32_t abandonGroup(TAVHandle& handle, const TAVHeader& group)
+bool abandonGroup(TraceFrame& frame, TAVHandle& handle, const TAVHeader& group)
 {
-  if (!isKnownHdrType(group.hdrType))
+  if (!frame.require(50, isKnownHdrType(group.hdrType), TAV_RC_BAD_HDR_TYPE) ||
+      !frame.step(50, patchSize(handle, group)))
   {
-    return TAV_RC_BAD_HDR_TYPE;
+    return false;
   }
-  const uint32_t rc = patchSize(handle, group);
-  if (rc == TAV_RC_OK)
-  {
-    handle.streamBytes = group.nodeOffset;
-  }
-  return rc;
-}
-
-uint32_t closeGroup32(TAVHandle& handle, TAVHeader& group)
-{
-  setSize(group, handle.streamBytes - group.nodeOffset - kHeaderSize32);
-  return patchSize(handle, group);
+  handle.streamBytes = group.nodeOffset;
+  return true;
 }
 
 /// Appends the element that ends a group and leads back to it.
@@ -88,28 +79,43 @@ uint32_t appendEndElement(TAVHandle& handle, uint64_t payloadBefore, bool wide)
   return tavAddElement(0, &handle, &element);
 }
 
-uint32_t closeGroup64(TAVHandle& handle, TAVHeader& group)
+bool closeGroup32(TraceFrame& frame, TAVHandle& handle, TAVHeader& group)
+{
+  setSize(group, handle.streamBytes - group.nodeOffset - kHeaderSize32);
+  return frame.step(50, patchSize(handle, group));
+}
+
+/// A group of unknown size whose size could not be written is still given an end that a reader can find. The close
+/// succeeds then, and the failure is told by its record alone.
+bool closeGroup64(TraceFrame& frame, TAVHandle& handle, TAVHeader& group)
 {
   const bool wasUnknown = isSizeUnknown(group);
   const bool wide = hasChildren64(group);
   const uint64_t payload = handle.streamBytes - group.nodeOffset - kHeaderSize64;
   setSize(group, payload + (hasEyeSize(group) ? endElementLength(wide) : 0));
   const uint32_t rc = patchSize(handle, group);
-  // A group of unknown size whose size could not be written is still given an end that a reader can find.
   const bool needsEnd = hasEyeSize(group) || (rc != TAV_RC_OK && wasUnknown);
-  return needsEnd ? appendEndElement(handle, payload, wide) : rc;
+  if (!needsEnd)
+  {
+    return frame.step(50, rc);
+  }
+  if (rc != TAV_RC_OK)
+  {
+    frame.report(50, rc);
+  }
+  return frame.step(60, appendEndElement(handle, payload, wide));
 }
 
-uint32_t closeGroup(TAVHandle& handle, TAVHeader& group)
+bool closeGroup(TraceFrame& frame, TAVHandle& handle, TAVHeader& group)
 {
   switch (group.hdrType)
   {
   case TAV_HDR_32:
-    return closeGroup32(handle, group);
+    return closeGroup32(frame, handle, group);
   case TAV_HDR_64:
-    return closeGroup64(handle, group);
+    return closeGroup64(frame, handle, group);
   default:
-    return TAV_RC_BAD_HDR_TYPE;
+    return frame.fail(50, TAV_RC_BAD_HDR_TYPE);
   }
 }
 
@@ -125,8 +131,8 @@ uint32_t closeGroup(TAVHandle& handle, TAVHeader& group)
   }
   TAVHeader* const group = openGroup(*handle);
   if (frame.require(40, group != nullptr, TAV_RC_NOT_FOUND) &&
-      frame.step(50, options == kAbandon ? abandonGroup(*handle, *group) : closeGroup(*handle, *group)) &&
-      frame.step(60, handle->pHdrStack->pop()))
+      (options == kAbandon ? abandonGroup(frame, *handle, *group) : closeGroup(frame, *handle, *group)) &&
+      frame.step(70, handle->pHdrStack->pop()))
   {
     frame.dump(100, handle->streamBytes);
   }
