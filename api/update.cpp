@@ -15,6 +15,13 @@ bool isSameNode(const TAVHeader& a, const TAVHeader& b)
   return a.hdrType == b.hdrType && sizeOf(a) == sizeOf(b) && typeOf(a) == typeOf(b) && elmOf(a) == elmOf(b);
 }
 
+uint32_t overwrite(TAVHandle& handle, uint64_t& position, const TAVHeaderData& node)
+{
+  const uint64_t size = sizeOf(node.header);
+  const bool given = node.pDataBuf != nullptr || size == 0;
+  return given ? writePayload(handle, position, typeOf(node.header), node.pDataBuf, size) : TAV_RC_BAD_PARAM;
+}
+
 } // namespace
 
 uint32_t tavUpdateElement(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
@@ -30,13 +37,11 @@ uint32_t tavUpdateElement(uint64_t options, TAVHandle* handle, TAVHeaderData* he
     return frame.code();
   }
   const TAVHeader& header = headerData->header;
-  const uint64_t size = sizeOf(header);
   TAVHeaderData stored{};
   uint64_t position = header.nodeOffset + headerLength(header.hdrType);
   if (frame.step(60, tavReadNodeInt(0, handle, header.nodeOffset, is64(header), &stored)) &&
       frame.require(70, isSameNode(header, stored.header), TAV_RC_BAD_PARAM) &&
-      frame.require(80, headerData->pDataBuf != nullptr || size == 0, TAV_RC_BAD_PARAM) &&
-      frame.step(90, writePayload(*handle, position, typeOf(header), headerData->pDataBuf, size)))
+      frame.step(80, overwrite(*handle, position, *headerData)))
   {
     frame.dump(100, position);
   }

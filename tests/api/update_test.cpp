@@ -413,7 +413,7 @@ TEST(UpdateElementRoom, EndsBeforeTheLastByteOfTheBlock)
   TraceLog trace;
   EXPECT_EQ(tavUpdateElement(0, handle.get(), &last), TAV_RC_END_OF_STORAGE);
   EXPECT_THAT(trace.failures(), ElementsAre(Failure{probe::rawWrite, 30, TAV_RC_END_OF_STORAGE},
-                                            Failure{probe::updateElement, 90, TAV_RC_END_OF_STORAGE}));
+                                            Failure{probe::updateElement, 80, TAV_RC_END_OF_STORAGE}));
   TAVHeaderData first{header32(2, TAV_TYPE_UINT16, kCpu, 0), payload.data(), 2, 0};
   EXPECT_EQ(tavUpdateElement(0, handle.get(), &first), TAV_RC_OK);
   EXPECT_EQ(toHex(block), rows("02 00 00 00 35 00 CE EA 09 09 02 00 00 00 35 00 CE EA 03 04"));
@@ -434,7 +434,7 @@ TEST(UpdateElementRoom, IsAskedForAWholeArrayBeforeAnyOfItIsReversed)
   EXPECT_EQ(tavUpdateElement(0, handle.get(), &data), TAV_RC_END_OF_STORAGE);
   EXPECT_EQ(block, before);
   EXPECT_THAT(trace.failures(), ElementsAre(Failure{probe::rawWrite, 30, TAV_RC_END_OF_STORAGE},
-                                            Failure{probe::updateElement, 90, TAV_RC_END_OF_STORAGE}));
+                                            Failure{probe::updateElement, 80, TAV_RC_END_OF_STORAGE}));
 }
 
 TEST(UpdateElementRoom, IsNeededByANodeOfNoBytesToo)
