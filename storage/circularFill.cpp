@@ -126,7 +126,8 @@ uint32_t TAVCircularBuf::readUntilCached(uint64_t offset, Purpose purpose)
 }
 
 /// Reads up to `pages` pages and adds them on one side; a page that the storage could not fill is the last. Pages on
-/// the other side make room, but never the one that holds `offset`.
+/// the other side make room, but never the one that holds `offset`. That the storage has nothing behind what was asked
+/// for is no failure.
 uint32_t TAVCircularBuf::readPages(uint64_t pages, bool backward, uint64_t offset, Purpose purpose)
 {
   TraceFrame frame(probe::cbReadPages);
@@ -135,7 +136,8 @@ uint32_t TAVCircularBuf::readPages(uint64_t pages, bool backward, uint64_t offse
   for (uint64_t done = 0; full && done < pages; ++done)
   {
     const uint32_t rc = backward ? readPageBackward(offset, full) : readPageForward(offset, purpose, full);
-    if (!frame.step(10, rc))
+    const bool enough = rc == TAV_RC_END_OF_STORAGE && isCached(offset);
+    if (enough || !frame.step(10, rc))
     {
       break;
     }

@@ -261,6 +261,18 @@ TEST(Reposition, StopsWhereThePagesCannotBeWritten)
               ElementsAre(Failure{tav::probe::cbReposition, 10, TAV_RC_NO_MEMORY}));
 }
 
+TEST(Reposition, SucceedsWhereTheStorageEndsWithAPage)
+{
+  for (const uint64_t attributes : {VectorStorage::kReadOnly, VectorStorage::kReadWrite})
+  {
+    SmallRing small(32, 4, attributes);
+    EXPECT_EQ(small.ring.reposition(24, 0, 1), TAV_RC_OK) << "of two pages the storage has one";
+    EXPECT_EQ(small.count(), 8U);
+    EXPECT_EQ(small.ring.reposition(8, 0, 3), TAV_RC_OK);
+    EXPECT_EQ(small.count(), 24U);
+  }
+}
+
 TEST(Reposition, BehindTheEndGivesTheEnd)
 {
   SmallRing small(100);
