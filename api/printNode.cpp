@@ -115,8 +115,11 @@ const ReadyTag* readyTag(const TAVPrintCtx& ctx, const TAVHeaderData& node, cons
 
 void openXml(TAVPrintCtx& ctx, const TAVHeaderData& node, const Parts& parts)
 {
-  const bool oneLine = parts.close && !has(ctx, TAV_PRINT_HEADERS);
-  lineOf(ctx, {"<", elementTagName(elmOf(node.header)), oneLine ? ">" : ">\n"});
+  lineOf(ctx, {"<", elementTagName(elmOf(node.header)), ">"});
+  if (!parts.close || has(ctx, TAV_PRINT_HEADERS))
+  {
+    piece(ctx, "\n");
+  }
 }
 
 void closeXml(TAVPrintCtx& ctx, const TAVHeaderData& node, const Parts& parts)

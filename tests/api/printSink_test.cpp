@@ -4,6 +4,7 @@
 #include <memory>
 #include <string>
 #include <tuple>
+#include <utility>
 #include <vector>
 
 #include <gmock/gmock.h>
@@ -252,6 +253,21 @@ TEST(SubtreeToABuffer, EndsWithTheLineEndInTheTextForm)
 {
   std::vector<char> buffer(100, '#');
   EXPECT_EQ(printSevenTo(buffer, 0x4), std::tuple(TAV_RC_OK, uint64_t{9}, "\n"s)); // "  0|", "   ", "7", "\n"
+}
+
+TEST(SubtreeToABuffer, TakesAnOpeningTagAndItsLineEndAsTwoPieces)
+{
+  Element number = u32(SQLM_ELM_NODE_NUMBER, 7);
+  TAVHeaderData node = number.data();
+  for (const auto& [size, counted] : {std::pair<size_t, uint64_t>{64, 40 + 13 + 1}, {8, 7 + 7 + 1}})
+  {
+    std::vector<char> buffer(size, '#');
+    TAVPrintParam param{0, buffer.data(), buffer.size(), nullptr};
+    uint64_t count = 0;
+    EXPECT_EQ(tavPrintSubtree(0x41, nullptr, &node, &param, &count), TAV_RC_BAD_PARAM) << "walks need a handle";
+    EXPECT_EQ(count, counted); // of the first line, "<node_number>" and "\n"
+    EXPECT_STREQ(buffer.data(), "\n");
+  }
 }
 
 TEST(SubtreeToABuffer, CountsOnlyWhatFitted)
