@@ -106,6 +106,13 @@ namespace detail
   throw std::system_error(makeError(code), what);
 }
 
+/// The same where more can be said: `about` tells what it was done with.
+template<class About>
+[[noreturn, gnu::noinline, gnu::cold]] void raiseAbout(uint32_t code, const char* what, const About& about)
+{
+  throw std::system_error(makeError(code), std::string(what) + ' ' + about());
+}
+
 /// The form with an error code of an operation.
 inline void report(uint32_t code, std::error_code& ec) noexcept
 {
@@ -118,6 +125,16 @@ inline void demand(uint32_t code, const char* what)
   if (code != TAV_RC_OK) [[unlikely]]
   {
     raise(code, what);
+  }
+}
+
+/// The same, where `about()` makes a text of what it was done with; it is called after a failure alone.
+template<class About>
+void demand(uint32_t code, const char* what, const About& about)
+{
+  if (code != TAV_RC_OK) [[unlikely]]
+  {
+    raiseAbout(code, what, about);
   }
 }
 

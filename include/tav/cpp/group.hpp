@@ -38,7 +38,7 @@ public:
   HeaderView add(uint16_t elm, const T& value, const NodeOptions& options = {})
   {
     TAVHeaderData node;
-    detail::demand(append(node, elm, value, options), "adding an element");
+    detail::demand(append(node, elm, value, options), "adding", [elm] { return detail::elementText(elm); });
     return HeaderView(node.header);
   }
   template<class T>
@@ -60,7 +60,7 @@ public:
   HeaderView add(uint16_t elm, T value, const NodeOptions& options = {})
   {
     TAVHeaderData node;
-    detail::demand(appendAs<Type>(node, elm, value, options), "adding an element");
+    detail::demand(appendAs<Type>(node, elm, value, options), "adding", [elm] { return detail::elementText(elm); });
     return HeaderView(node.header);
   }
   template<uint16_t Type, class T>
@@ -80,7 +80,7 @@ public:
   HeaderView addRaw(uint16_t type, uint16_t elm, std::span<const std::byte> payload, const NodeOptions& options = {})
   {
     TAVHeaderData node{};
-    detail::demand(appendRaw(node, type, elm, payload, options), "adding an element");
+    detail::demand(appendRaw(node, type, elm, payload, options), "adding", [elm] { return detail::elementText(elm); });
     return HeaderView(node.header);
   }
   HeaderView addRaw(uint16_t type, uint16_t elm, std::span<const std::byte> payload, const NodeOptions& options,
@@ -107,7 +107,7 @@ public:
   {
     uint32_t rc = TAV_RC_OK;
     Group inner = open(state_, own(), elm, options, rc);
-    detail::demand(rc, "opening a group");
+    detail::demand(rc, "opening the group", [elm] { return detail::elementText(elm); });
     return inner;
   }
   Group group(uint16_t elm, const GroupOptions& options, std::error_code& ec) & noexcept

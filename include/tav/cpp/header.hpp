@@ -2,7 +2,9 @@
 /// What a node's header says.
 #pragma once
 
+#include <charconv>
 #include <cstdint>
+#include <string>
 #include <string_view>
 
 #include "tav/cpp/values.hpp"
@@ -86,5 +88,28 @@ protected:
   /// node renews when it is asked for a payload that a ring no longer holds.
   mutable TAVHeaderData data_{};
 };
+
+namespace detail
+{
+
+/// "hostName (60104)", or "element 7" for an unknown id: what messages call an element.
+inline std::string elementText(uint16_t elm)
+{
+  const std::string_view tag = dictionary::tagOf(elm);
+  const std::string number = std::to_string(elm);
+  return tag.empty() ? "element " + number : std::string(tag) + " (" + number + ')';
+}
+
+/// "hostName (60104) at 0x28, type 50, 3 bytes"
+inline std::string nodeText(const HeaderView& node)
+{
+  char digits[16];
+  const std::to_chars_result end = std::to_chars(digits, digits + sizeof digits, node.offset(), 16);
+  const std::string size = node.isOpen() ? "open" : std::to_string(node.size()) + " bytes";
+  return elementText(node.elm()) + " at 0x" + std::string(digits, end.ptr) + ", type " + std::to_string(node.type()) +
+         ", " + size;
+}
+
+} // namespace detail
 
 } // namespace tav

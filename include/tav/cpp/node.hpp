@@ -51,7 +51,7 @@ public:
   [[nodiscard]] T as() const&
   {
     T value{};
-    detail::demand(read(value), "reading a value");
+    detail::demand(read(value), "reading", [this] { return detail::nodeText(*this); });
     return value;
   }
   template<Readable T>
@@ -83,7 +83,7 @@ public:
   [[nodiscard]] T asNumber() const
   {
     T value{};
-    detail::demand(readNumber(value), "reading a number");
+    detail::demand(readNumber(value), "reading", [this] { return detail::nodeText(*this); });
     return value;
   }
   template<StreamInteger T>
@@ -176,7 +176,7 @@ public:
   /// The payload as it stands in the stream; empty for a group.
   [[nodiscard]] PayloadView payload() const
   {
-    detail::demand(refresh(), "reading a payload");
+    detail::demand(refresh(), "reading", [this] { return detail::nodeText(*this); });
     return view();
   }
   [[nodiscard]] PayloadView payload(std::error_code& ec) const noexcept
@@ -225,7 +225,7 @@ public:
   [[nodiscard]] T asNumber() const
   {
     T value{};
-    detail::demand(readNumber(value), "reading a number");
+    detail::demand(readNumber(value), "reading", [this] { return detail::nodeText(*this); });
     return value;
   }
   template<StreamInteger T>
@@ -365,7 +365,7 @@ private:
   [[gnu::noinline]] T readWhole() const
   {
     T value{};
-    detail::demand(read(value), "reading a value");
+    detail::demand(read(value), "reading", [this] { return detail::nodeText(*this); });
     return value;
   }
   template<class T>

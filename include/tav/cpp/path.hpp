@@ -23,7 +23,7 @@ public:
   /// TAV_RC_BAD_PARAM for a text that is no path, a name that no element has among them.
   explicit Path(std::string_view text)
   {
-    detail::demand(parse(text), "reading a path");
+    detail::demand(parse(text), "understanding the path", [text] { return std::string(text); });
   }
   Path(std::string_view text, std::error_code& ec)
   {

@@ -72,7 +72,7 @@ public:
   explicit Reader(const std::filesystem::path& path, const StreamOptions& options = {})
       : Reader()
   {
-    detail::demand(openPath(path, options), "opening a file for reading");
+    detail::demand(openPath(path, options), "opening for reading", [&path] { return detail::fileText(path); });
   }
   Reader(const std::filesystem::path& path, const StreamOptions& options, std::error_code& ec)
       : Reader()
@@ -146,7 +146,7 @@ public:
   {
     std::error_code ec;
     std::optional<Node> node = this->path(path, ec);
-    detail::demand(codeOf(ec), "searching a path");
+    detail::demand(codeOf(ec), "searching", [path] { return std::string(path); });
     return node;
   }
   [[nodiscard]] std::optional<Node> path(std::string_view path, std::error_code& ec) const&
@@ -167,7 +167,7 @@ public:
   {
     std::error_code ec;
     std::vector<Node> nodes = all(path, ec);
-    detail::demand(codeOf(ec), "searching a path");
+    detail::demand(codeOf(ec), "searching", [path] { return std::string(path); });
     return nodes;
   }
   [[nodiscard]] std::vector<Node> all(std::string_view path, std::error_code& ec) const&

@@ -9,6 +9,7 @@
 #include <filesystem>
 #include <memory>
 #include <new>
+#include <string>
 #include <utility>
 
 #include "tav/cpp/error.hpp"
@@ -34,6 +35,13 @@ struct FileOptions
 
 namespace detail
 {
+
+/// What messages call a file.
+inline std::string fileText(const std::filesystem::path& path)
+{
+  const std::u8string name = path.u8string(); // string() throws where a locale lacks a letter
+  return std::string(name.begin(), name.end());
+}
 
 /// Opens a handle over a storage.
 inline uint32_t openHandle(TAVSideStorage* storage, uint64_t mode, const StreamOptions& options,

@@ -63,7 +63,7 @@ public:
   /// show the old value until it is opened again. An element larger than the ring gives TAV_RC_DATA_TOO_LARGE.
   explicit Updater(const std::filesystem::path& path, const StreamOptions& options = {})
   {
-    detail::demand(openPath(path, options), "opening a file for updating");
+    detail::demand(openPath(path, options), "opening for updating", [&path] { return detail::fileText(path); });
   }
   Updater(const std::filesystem::path& path, const StreamOptions& options, std::error_code& ec)
   {
@@ -104,7 +104,7 @@ public:
   template<class T>
   void update(const HeaderView& node, const T& value)
   {
-    detail::demand(detail::updateValue(handle_, node, value), "updating an element");
+    detail::demand(detail::updateValue(handle_, node, value), "updating", [&node] { return detail::nodeText(node); });
   }
   template<class T>
   void update(const HeaderView& node, const T& value, std::error_code& ec) noexcept

@@ -48,7 +48,7 @@ public:
   explicit Writer(const std::filesystem::path& path, const FileOptions& file = {}, const StreamOptions& options = {})
       : Writer(Unopened::state)
   {
-    detail::demand(openPath(path, file, options), "opening a file for writing");
+    detail::demand(openPath(path, file, options), "opening for writing", [&path] { return detail::fileText(path); });
   }
   Writer(const std::filesystem::path& path, const FileOptions& file, const StreamOptions& options, std::error_code& ec)
       : Writer(Unopened::state)
@@ -90,7 +90,7 @@ public:
   {
     uint32_t rc = TAV_RC_OK;
     Group root = Group::open(state_, 0, elm, options, rc);
-    detail::demand(rc, "opening a group");
+    detail::demand(rc, "opening the group", [elm] { return detail::elementText(elm); });
     return root;
   }
   Group group(uint16_t elm, const GroupOptions& options, std::error_code& ec) & noexcept
@@ -112,7 +112,8 @@ public:
   template<class T>
   void update(const HeaderView& node, const T& value)
   {
-    detail::demand(detail::updateValue(state_ ? state_->handle : nullptr, node, value), "updating an element");
+    TAVHandle* const handle = state_ ? state_->handle : nullptr;
+    detail::demand(detail::updateValue(handle, node, value), "updating", [&node] { return detail::nodeText(node); });
   }
   template<class T>
   void update(const HeaderView& node, const T& value, std::error_code& ec) noexcept
