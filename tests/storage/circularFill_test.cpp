@@ -306,23 +306,30 @@ TEST(Fill, ReadsThroughWhereTheStorageDoesNotOfferJumps)
   EXPECT_EQ(small.storage.seeks, 0U);
 }
 
-TEST(Fill, JumpsBackSoThatTheOffsetIsTheLastByte)
+struct JumpBack
 {
+  const char* name;
+  uint64_t offset;
+  uint64_t headOffset;
+};
+
+class FillJumpsBack : public testing::TestWithParam<JumpBack>
+{};
+
+TEST_P(FillJumpsBack, SoThatTheOffsetIsTheLastByteWhereARingFitsBefore)
+{
+  const JumpBack& row = GetParam();
   SmallRing small(400);
   small.cache(0, 300, 8);
-  ASSERT_EQ(small.chunk(100, 8, true), TAV_RC_OK);
-  EXPECT_EQ(small.ring.headOffset, 77U);
-  EXPECT_EQ(small.bytes(), pattern(93, 8));
+  ASSERT_EQ(small.chunk(row.offset, 8, true), TAV_RC_OK);
+  EXPECT_EQ(small.ring.headOffset, row.headOffset);
+  EXPECT_EQ(small.bytes(), pattern(row.offset - 7, 8));
 }
 
-TEST(Fill, JumpsBackByARingThatBeginsBehindTheFirstByte)
-{
-  SmallRing small(400);
-  small.cache(0, 300, 8);
-  ASSERT_EQ(small.chunk(24, 8, true), TAV_RC_OK);
-  EXPECT_EQ(small.ring.headOffset, 1U);
-  EXPECT_EQ(small.bytes(), pattern(17, 8));
-}
+INSTANTIATE_TEST_SUITE_P(Rows, FillJumpsBack,
+                         testing::Values(JumpBack{"FarFromTheFront", 100, 77}, JumpBack{"ToTheSecondByte", 24, 1},
+                                         JumpBack{"ToTheFirstByte", 23, 0}, JumpBack{"NearTheFront", 10, 0}),
+                         [](const auto& row) { return std::string(row.param.name); });
 
 TEST(Fill, ReportsAFailureBehindThePlan)
 {
@@ -335,15 +342,6 @@ TEST(Fill, ReportsAFailureBehindThePlan)
   const std::vector<Failure> failures = trace.failuresOf(tav::probe::cbFill);
   ASSERT_EQ(failures.size(), 1U);
   EXPECT_EQ(failures.front(), (Failure{tav::probe::cbFill, 20, KOR_RC_IO_ERROR}));
-}
-
-TEST(Fill, JumpsBackToTheFirstByteNearTheFront)
-{
-  SmallRing small(400);
-  small.cache(0, 300, 8);
-  ASSERT_EQ(small.chunk(10, 8, true), TAV_RC_OK);
-  EXPECT_EQ(small.ring.headOffset, 0U);
-  EXPECT_EQ(small.bytes(), pattern(3, 8));
 }
 
 TEST(Fill, DoesNotJumpWhenThePagesCannotBeWritten)
