@@ -166,8 +166,8 @@ void Recovery::fit(bool wide, bool isRoot)
 {
   while (wide && !frames_.back().wide)
   {
+    totals_.closed += frames_.back().hidden ? 0 : 1;
     closeGroup();
-    ++totals_.closed;
   }
   if (frames_.back().wide != wide || (frames_.size() == 1 && (!isRoot || damaged_)))
   {
@@ -191,8 +191,15 @@ bool Recovery::takeEnd(uint64_t offset, bool wide)
     lose(ending.end, "an end element whose group is lost");
     return true;
   }
-  totals_.kept += ending.end - offset;
-  position_ = ending.end;
+  if (frames_[at].hidden)
+  {
+    loseNested(ending.end);
+  }
+  else
+  {
+    totals_.kept += ending.end - offset;
+    position_ = ending.end;
+  }
   damaged_ = false;
   while (frames_.size() > at)
   {
@@ -202,7 +209,7 @@ bool Recovery::takeEnd(uint64_t offset, bool wide)
       keepOpen();
       break;
     }
-    totals_.closed += top.open || top.limit != ending.end ? 1 : 0;
+    totals_.closed += !top.hidden && (top.open || top.limit != ending.end) ? 1 : 0;
     closeGroup();
   }
   return true;
@@ -226,12 +233,20 @@ bool Recovery::takeEnding()
   const uint64_t length = headerLength(header.hdrType);
   const uint64_t end = std::min(source_.size(), position_ + length + sizeOf(header));
   const uint64_t pair = firstSure(position_ + length, end, top.wide) - position_ - length;
-  totals_.kept += length;
-  totals_.pairs += 1;
-  position_ += length;
+  const std::string before = reasonOfEnd(position_, top.wide);
+  if (top.hidden)
+  {
+    loseNested(position_ + length);
+  }
+  else
+  {
+    totals_.kept += length;
+    totals_.pairs += 1;
+    position_ += length;
+  }
   if (pair != 0)
   {
-    lose(position_ + pair, "a damaged pair of an end element");
+    lose(position_ + pair, before.empty() ? "a damaged pair of an end element" : before);
   }
   if (top.open && wouldReadAsOpen())
   {
@@ -239,8 +254,8 @@ bool Recovery::takeEnding()
   }
   else if (top.open)
   {
+    totals_.closed += top.hidden ? 0 : 1;
     closeGroup();
-    ++totals_.closed;
   }
   damaged_ = false;
   return true;
@@ -278,14 +293,12 @@ bool Recovery::enterEnding()
   damaged_ = !whole;
   if (whole)
   {
-    ++totals_.closed;
-    ++totals_.nodes;
-    totals_.kept += kHeaderSize64;
-    position_ += kHeaderSize64;
+    totals_.closed += frames_.back().hidden ? 0 : 1;
+    keepHeader(header);
   }
   else
   {
-    ++totals_.made;
+    totals_.made += frames_.back().hidden ? 0 : 1;
     // Its first bytes are searched, too: the distance can be the damaged part.
     gap();
   }
@@ -314,13 +327,13 @@ void Recovery::take(Candidate found)
     trimPair(found);
   }
   fit(is64(found.header()), found.isGroup());
-  ++totals_.nodes;
   if (found.isGroup())
   {
     takeGroup(found);
     damaged_ = false;
     return;
   }
+  ++totals_.nodes;
   damaged_ = false;
   // A node that goes on beyond a size that nothing confirms contradicts it.
   const bool beyond = frames_.back().limit < found.end;
@@ -328,7 +341,7 @@ void Recovery::take(Candidate found)
   {
     if (frames_[i].limit < found.end)
     {
-      totals_.closed += frames_[i].open ? 0 : 1;
+      totals_.closed += frames_[i].open || frames_[i].hidden ? 0 : 1;
       frames_[i].limit = frames_[i - 1].limit;
       frames_[i].open = true;
     }
@@ -352,7 +365,6 @@ void Recovery::takeGroup(const Candidate& found)
     index(position_);
     if (enterEnding()) // its size is damaged; its end element knows
     {
-      --totals_.nodes;
       return;
     }
   }
@@ -364,7 +376,7 @@ void Recovery::takeGroup(const Candidate& found)
   const uint64_t around = frames_.back().limit;
   frame.open = found.open || found.end > around || (frames_.size() == 1 && !frame.sure && endsTooSoon(found.end));
   frame.limit = frame.open ? around : found.end;
-  totals_.closed += frame.open ? 1 : 0;
+  const bool repaired = frame.open;
   if (frame.sure && found.end > around)
   {
     for (size_t i = frames_.size(); i-- > 1 && frames_[i].limit < found.end;)
@@ -374,10 +386,36 @@ void Recovery::takeGroup(const Candidate& found)
     frame.limit = found.end;
     frame.open = false;
   }
+  if (rebuilder_.depth() >= kMostNested && frame.wide != rebuilder_.wideChildren())
+  {
+    loseNested(frame.limit); // the group around cannot hold its nodes
+    return;
+  }
   openGroup(frame, header);
+  totals_.closed += repaired && !frames_.back().hidden ? 1 : 0;
+  keepHeader(header);
+}
+
+/// Accounts for the header of the group that was opened last.
+void Recovery::keepHeader(const TAVHeader& header)
+{
   const uint64_t length = headerLength(header.hdrType);
+  if (frames_.back().hidden)
+  {
+    loseNested(position_ + length);
+    return;
+  }
+  ++totals_.nodes;
   totals_.kept += length;
   position_ += length;
+}
+
+/// Of a group that is too deep, nothing is written but the nodes in it.
+void Recovery::loseNested(uint64_t to)
+{
+  lose(to, "of a group nested more than " + std::to_string(kMostNested) +
+               " deep; nodes in it go to the group around it");
+  damaged_ = false;
 }
 
 /// Whether more than zeros stands where a root ends by its size, and no other root begins.
@@ -413,109 +451,6 @@ void Recovery::lose(uint64_t to, std::string reason)
   sink_({position_, to - position_, std::move(reason)});
   position_ = to;
   damaged_ = true;
-}
-
-/// Whether it is an end element that leads nowhere.
-bool Recovery::isDamagedEnd(const Candidate& found, uint64_t limit)
-{
-  Ending ending;
-  const TAVHeader& header = found.header();
-  return isEndElement(elmOf(header)) && !readEnding(source_, form_, header.nodeOffset, is64(header), limit, ending);
-}
-
-/// The first place from `from` on where a node can begin; false when there is none before `to`.
-bool Recovery::findNext(uint64_t from, uint64_t to, Candidate& found)
-{
-  constexpr uint64_t kWindow = uint64_t{16} * 1024;
-  std::vector<uint8_t> window(kWindow + kHeaderSize64);
-  const bool own = frames_.back().wide;
-  for (uint64_t at = from; at < to;)
-  {
-    std::fill(window.begin(), window.end(), uint8_t{0});
-    source_.read(at, window);
-    const uint64_t tests = std::min(kWindow, to - at);
-    for (uint64_t i = 0; i < tests; ++i)
-    {
-      const uint64_t offset = at + i;
-      if (tryAt(window.data() + i, offset, own, found))
-      {
-        const bool strange = found.isGroup() && found.trust == Trust::alone &&
-                             (isStrange(found) || found.open || (!own && sizeOf(found.header()) == 0));
-        if (!strange && !isDamagedEnd(found, to) && believe(found, false))
-        {
-          return true;
-        }
-      }
-      if (canHold(!own) && form_.root64 && tryAt(window.data() + i, offset, !own, found) &&
-          found.trust >= Trust::followed && !isDamagedEnd(found, to) && isRun(offset, !own) && believe(found, false))
-      {
-        return true;
-      }
-    }
-    at += tests;
-    spent_ += tests;
-    if (spent_ > search_)
-    {
-      return false;
-    }
-  }
-  return false;
-}
-
-/// A node that no reader takes but that is no damage goes alone: what follows it can have a name that nobody knows, and
-/// no search finds that.
-bool Recovery::loseStranger(const TAVHeader& header)
-{
-  uint64_t end = 0;
-  if (damaged_ || !isStranger(header, end))
-  {
-    return false;
-  }
-  lose(end, isKnown(header) ? "a node of a size that its type does not have" : "a node of an unknown type");
-  damaged_ = false;
-  return true;
-}
-
-void Recovery::gap()
-{
-  index(position_);
-  if (enterEnding())
-  {
-    return;
-  }
-  const Ending* const next = nextEnding();
-  const uint64_t limit = frames_.back().limit;
-  const uint64_t sure = sureLimit();
-  uint64_t to = std::min(sure, frames_.back().sure || frames_.back().open ? limit : sure);
-  const bool byEnding = next != nullptr && next->start > position_ && next->start < to && next->end <= sure;
-  to = byEnding ? next->start : to;
-  Candidate found;
-  const uint64_t from = position_;
-  if (!findNext(from, to, found))
-  {
-    if (spent_ > search_)
-    {
-      totals_.unread = source_.size() - position_;
-      position_ = source_.size();
-      return;
-    }
-    if (to == source_.size() && mayEndInZeros())
-    {
-      to = std::max(from, prober_.zerosStart(from));
-    }
-    lose(std::max(to, from + (to == from && !byEnding ? 1 : 0)), "no node is whole");
-    return;
-  }
-  const uint64_t place = found.header().nodeOffset;
-  if (place > from)
-  {
-    lose(place, "no node is whole");
-  }
-  closeFinished();
-  if (!takeEnd(place, is64(found.header())))
-  {
-    take(found);
-  }
 }
 
 } // namespace tav::tool

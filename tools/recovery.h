@@ -128,7 +128,11 @@ private:
   void trimPair(Candidate& found);
   void take(Candidate found);
   void takeGroup(const Candidate& found);
+  void keepHeader(const TAVHeader& header);
+  void loseNested(uint64_t to);
   bool loseStranger(const TAVHeader& header);
+  std::string reasonOfEnd(uint64_t offset, bool wide);
+  std::string reasonAt(uint64_t offset);
   void gap();
   bool findNext(uint64_t from, uint64_t to, Candidate& found);
   bool tryAt(const uint8_t* bytes, uint64_t offset, bool wide, Candidate& found);
