@@ -35,8 +35,9 @@ bool isTerminal(FILE* stream);
 /// Columns of the terminal on standard output; nothing when there is none.
 std::optional<unsigned> terminalWidth();
 
-/// Makes all standard streams streams of bytes, where a line ends as it was written, and a closed pipe an error of the
-/// write. A program that is interrupted or told to end removes the file of `removeOnInterrupt` first.
+/// Makes all standard streams streams of bytes, where a line ends as it was written, and a closed pipe or a file that
+/// must not grow further an error of the write. A program that is interrupted or told to end removes the file of
+/// `removeOnInterrupt` first.
 void prepareStandardStreams();
 
 /// Removes a file when the program is interrupted or told to end; one file at a time, an empty path stands for none.

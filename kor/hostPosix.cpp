@@ -111,6 +111,7 @@ std::optional<unsigned> terminalWidth()
 void prepareStandardStreams()
 {
   std::signal(SIGPIPE, SIG_IGN);
+  std::signal(SIGXFSZ, SIG_IGN);
   for (const int number : {SIGINT, SIGTERM, SIGHUP})
   {
     // Who was told to ignore a signal (nohup) goes on ignoring it.
