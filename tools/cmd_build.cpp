@@ -65,7 +65,6 @@ const Registration registration{{
                  .kind = ValueKind::file,
                  .value = "FILE",
                  .help = "where to; standard output unless given"},
-                {.names = "--force", .help = "replace an existing file"},
                 {.names = "--eye-size", .help = "end every node with an eye/size pair"}},
     .examples = {{"tav json x.tav | tav build -o y.tav", "the same bytes again"},
                  {"tav json x.tav | tav build --byte-order big --align -o y.tav", "convert a stream"},

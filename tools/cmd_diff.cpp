@@ -4,7 +4,6 @@
 #include <cstdlib>
 #include <cstring>
 
-#include "kor/host.h"
 #include "tools/diff_align.h"
 #include "tools/diff_index.h"
 #include "tools/json_text.h"
@@ -57,13 +56,8 @@ class Comparer
 public:
   Comparer(const Invocation& invocation, DiffIndex& a, DiffIndex& b)
       : a_(a), b_(b), out_("-"), tolerance_(Tolerance::parse(invocation.text("--tolerance", "0"))),
-        json_(invocation.has("--json"))
+        json_(invocation.has("--json")), colour_(!json_ && wantsColour(invocation))
   {
-    const std::string when = invocation.text("--color", "auto");
-    const char* const noColour = std::getenv("NO_COLOR");
-    colour_ = !json_ &&
-              (when == "always" ||
-               (when != "never" && kor::isTerminal(stdout) && (noColour == nullptr || *noColour == 0)));
   }
 
   /// Compares everything; true when there is a difference.
@@ -137,7 +131,7 @@ private:
   Output out_;
   Tolerance tolerance_;
   bool json_;
-  bool colour_ = false;
+  bool colour_;
   bool found_ = false;
   std::vector<Level> levels_{};
 };
@@ -273,7 +267,11 @@ int run(const Invocation& invocation)
   std::vector<Path> ignored;
   for (const std::string& path : invocation.all("--ignore"))
   {
-    ignored.emplace_back(path);
+    if (path == "/")
+    {
+      throw Failure("diff: --ignore / leaves nothing to compare");
+    }
+    ignored.emplace_back(path).requireNames();
   }
   Tolerance::parse(invocation.text("--tolerance", "0")); // told before the work begins
   Stream a = openStream(invocation, nameA);
@@ -290,6 +288,7 @@ const Registration registration{{
     .place = 120,
     .name = "diff",
     .arguments = "A B",
+    .inputs = 2,
     .summary = "what two streams do not have in common, by path",
     .description =
         "Lists what B lacks (-), has in addition (+) or has with another value (~). Byte order, header widths,\n"

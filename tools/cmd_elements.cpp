@@ -103,6 +103,7 @@ const Registration registration{{
     .place = 130,
     .name = "elements",
     .arguments = "[PATTERN]",
+    .inputs = 0,
     .summary = "the dictionary: id, name, tag",
     .description =
         "Lists the elements whose tag, enum name or constant holds PATTERN, or matches it when it has * or ?;\n"

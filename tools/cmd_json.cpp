@@ -65,7 +65,6 @@ const Registration registration{{
                  .kind = ValueKind::file,
                  .value = "FILE",
                  .help = "where to; standard output unless given"},
-                {.names = "--force", .help = "replace an existing file"},
                 {.names = "--lines", .help = "one object a node, each in its own line"},
                 {.names = "--compact", .help = "no blanks and line breaks"},
                 {.names = "--safe", .help = "whole numbers beyond 2^53 as texts, for readers that keep doubles"}},

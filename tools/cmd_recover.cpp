@@ -1,5 +1,8 @@
 // tav recover: a sound stream of what is whole in a damaged one.
 #include <deque>
+#include <optional>
+#include <utility>
+#include <vector>
 
 #include <nlohmann/json.hpp>
 
@@ -18,22 +21,51 @@ namespace
 
 constexpr size_t kMostListed = 1000; ///< losses that are listed; the totals have all
 
+/// What came of one way of reading.
 struct Account
 {
+  Form form{};
   RecoveryTotals totals{};
   std::deque<Loss> losses{};
   uint64_t bytes = 0;
   uint64_t written = 0;
+
+  bool lostNothing() const { return totals.lost + totals.unread == 0; }
+  /// Nodes come first. Bytes say nothing of padding: with it, damaged ones are taken for some.
+  bool keepsMoreThan(const Account& other) const
+  {
+    const bool likePadding = form.swapped == other.form.swapped && form.root64 == other.form.root64;
+    return totals.nodes != other.totals.nodes ? totals.nodes > other.totals.nodes
+                                              : !likePadding && totals.kept > other.totals.kept;
+  }
 };
 
-std::string asJson(const std::string& name, const Stream& stream, const Account& account)
+/// The way that was taken, and the other one that was tried where it was in doubt.
+struct Outcome
 {
+  Account taken{};
+  std::optional<Account> other{};
+  std::vector<Form> alternatives{}; ///< that were about as likely at the first look
+};
+
+nlohmann::ordered_json formJson(const Form& form)
+{
+  return {{"byteOrder", orderText(form)}, {"root", form.root64 ? 64 : 32}, {"aligned", form.aligned}};
+}
+
+std::string asJson(const std::string& name, const Outcome& outcome)
+{
+  const Account& account = outcome.taken;
   const RecoveryTotals& totals = account.totals;
   nlohmann::ordered_json object;
   object["file"] = name;
-  object["form"] = {{"byteOrder", orderText(stream.form())},
-                    {"root", stream.form().root64 ? 64 : 32},
-                    {"aligned", stream.form().aligned}};
+  object["form"] = formJson(account.form);
+  if (outcome.other)
+  {
+    object["otherForm"] = formJson(outcome.other->form);
+    object["otherForm"]["nodes"] = outcome.other->totals.nodes;
+    object["otherForm"]["kept"] = outcome.other->totals.kept;
+  }
   object["bytes"] = account.bytes;
   object["kept"] = totals.kept;
   object["lost"] = totals.lost;
@@ -53,10 +85,31 @@ std::string asJson(const std::string& name, const Stream& stream, const Account&
   return object.dump(1, ' ', false, nlohmann::json::error_handler_t::replace) + "\n";
 }
 
-std::string asText(const std::string& name, const Stream& stream, const Account& account)
+/// What was guessed, where something spoke for another way.
+std::string doubtText(const std::string& name, const Outcome& outcome)
 {
+  std::string text;
+  if (outcome.other)
+  {
+    const Account& other = *outcome.other;
+    text = "tav: " + name + ": the form is a guess: read as " + formText(other.form) + ", " +
+           counted(other.totals.nodes, "node") + " and " + counted(other.totals.kept, "byte") + " would be kept\n";
+  }
+  for (const Form& form : outcome.alternatives)
+  {
+    if (form != outcome.taken.form && !(outcome.other && form == outcome.other->form))
+    {
+      text += "tav: " + name + ": the form is a guess: " + formText(form) + " is about as likely\n";
+    }
+  }
+  return text;
+}
+
+std::string asText(const std::string& name, const Outcome& outcome)
+{
+  const Account& account = outcome.taken;
   const RecoveryTotals& totals = account.totals;
-  std::string text = "tav: " + name + ": " + formText(stream.form()) + "\n";
+  std::string text = "tav: " + name + ": " + formText(account.form) + "\n" + doubtText(name, outcome);
   for (const Loss& loss : account.losses)
   {
     text += "tav: " + name + ": " + hexOffset(loss.offset) + ": " + counted(loss.length, "byte") +
@@ -95,11 +148,13 @@ void putReport(const Invocation& invocation, const std::string& output, const st
   out.commit();
 }
 
-void recoverInto(const Invocation& invocation, Stream& stream, PatchFile& file, Account& account)
+Account recoverInto(const Invocation& invocation, ByteSource& source, const Form& form, PatchFile& file)
 {
-  Progress progress("recover", stream.bytes().size());
-  Rebuilder rebuilder(stream.bytes(), stream.form(), file, [&](uint64_t offset) { progress.at(offset); });
-  Recovery recovery(stream.bytes(), stream.form(), rebuilder, invocation.number("--search").value_or(kNoOffset),
+  Account account;
+  account.form = form;
+  Progress progress("recover", source.size());
+  Rebuilder rebuilder(source, form, file, [&](uint64_t offset) { progress.at(offset); });
+  Recovery recovery(source, form, rebuilder, invocation.number("--search").value_or(kNoOffset),
                     [&](const Loss& loss) {
                       if (account.losses.size() < kMostListed)
                       {
@@ -111,8 +166,49 @@ void recoverInto(const Invocation& invocation, Stream& stream, PatchFile& file, 
     progress.at(recovery.position());
   }
   account.totals = recovery.totals();
-  account.bytes = stream.bytes().size();
+  account.bytes = source.size();
   account.written = file.length();
+  return account;
+}
+
+void copy(PatchFile& from, PatchFile& to)
+{
+  std::vector<uint8_t> piece(size_t{64} * 1024);
+  for (uint64_t at = 0; at < from.length();)
+  {
+    const size_t count = from.read(at, piece);
+    to.append(std::span<const uint8_t>(piece).first(count));
+    at += count;
+  }
+}
+
+/// Where another way of reading is not far off, both are gone, and the one that keeps more is taken; of equals the
+/// likelier one.
+Outcome recoverBest(const Invocation& invocation, Stream& stream, PatchFile& file)
+{
+  const Recognition& found = stream.recognition;
+  Outcome outcome{.alternatives = found.alternatives};
+  if (!found.runnerUp)
+  {
+    outcome.taken = recoverInto(invocation, stream.bytes(), found.form, file);
+    return outcome;
+  }
+  PatchFile first;
+  outcome.taken = recoverInto(invocation, stream.bytes(), found.form, first);
+  if (outcome.taken.lostNothing())
+  {
+    copy(first, file);
+    return outcome;
+  }
+  PatchFile second;
+  outcome.other = recoverInto(invocation, stream.bytes(), *found.runnerUp, second);
+  const bool swap = outcome.other->keepsMoreThan(outcome.taken);
+  if (swap)
+  {
+    std::swap(outcome.taken, *outcome.other);
+  }
+  copy(swap ? second : first, file);
+  return outcome;
 }
 
 int run(const Invocation& invocation)
@@ -122,18 +218,13 @@ int run(const Invocation& invocation)
   {
     throw Failure("recover: -o OUT is missing", "- is standard output");
   }
-  checkWritable(output, invocation.has("--force"));
-  if (invocation.has("--report"))
-  {
-    checkWritable(invocation.text("--report"), invocation.has("--force"));
-  }
   Stream stream = openStream(invocation, invocation.arguments().front(), true);
-  Account account;
+  Outcome outcome;
   {
     Output out(output, invocation.has("--force"));
     PatchFile file(out);
-    recoverInto(invocation, stream, file, account);
-    if (account.totals.nodes == 0)
+    outcome = recoverBest(invocation, stream, file);
+    if (outcome.taken.totals.nodes == 0)
     {
       Problem problem{stream.source->name()};
       problem.sentence = "nothing in it is whole";
@@ -143,10 +234,9 @@ int run(const Invocation& invocation)
     file.finish();
   }
   const std::string& name = stream.source->name();
-  putReport(invocation, output,
-            invocation.has("--json") ? asJson(name, stream, account) : asText(name, stream, account));
+  putReport(invocation, output, invocation.has("--json") ? asJson(name, outcome) : asText(name, outcome));
   tellStatistics(invocation, stream.bytes());
-  const RecoveryTotals& totals = account.totals;
+  const RecoveryTotals& totals = outcome.taken.totals;
   return totals.lost + totals.unread + totals.closed + totals.made + totals.pairs == 0 ? kFine : kFindings;
 }
 
@@ -165,8 +255,8 @@ const Registration registration{{
     .options = {{.names = "-o,--output",
                  .kind = ValueKind::file,
                  .value = "OUT",
-                 .help = "where the sound stream goes; - is standard output"},
-                {.names = "--force", .help = "replace existing files"},
+                 .help = "where the sound stream goes; - is standard output",
+                 .required = true},
                 {.names = "--json", .help = "the report as JSON"},
                 {.names = "--report", .kind = ValueKind::file, .value = "FILE", .help = "write the report to FILE"},
                 {.names = "--search",

@@ -64,6 +64,7 @@ const std::vector<OptionSpec>& globalOptions()
        .value = "PROBE",
        .help = "only records of this function, by name or id",
        .many = true},
+      {.names = "--force", .help = "replace existing files"},
       {.names = "--stats", .help = "tell on standard error how much was read"},
       {.names = "-h,--help", .help = "show help and exit"},
   };
@@ -74,6 +75,19 @@ std::string longName(const OptionSpec& option)
 {
   const size_t dashes = option.names.find("--");
   return option.names.substr(dashes == std::string::npos ? 0 : dashes);
+}
+
+std::string argumentsOf(const Command& command)
+{
+  std::string text = command.arguments;
+  for (const OptionSpec& option : command.options)
+  {
+    if (option.required)
+    {
+      text += (text.empty() ? "" : " ") + option.names.substr(0, option.names.find(',')) + " " + option.value;
+    }
+  }
+  return text;
 }
 
 std::optional<uint64_t> parseNumber(std::string_view text)

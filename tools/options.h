@@ -24,8 +24,8 @@ enum class ValueKind : uint8_t
   flag, ///< the option has no value
   text,
   number, ///< 10, 0x1a40, 64K, 10M
-  file,
-  choice ///< one of `choices`
+  file,   ///< a file that is written
+  choice  ///< one of `choices`
 };
 
 struct OptionSpec
@@ -35,7 +35,8 @@ struct OptionSpec
   std::string value{}; ///< how the value is called in help: "FILE"
   std::string help{};
   std::vector<std::string> choices{};
-  bool many = false; ///< may be given several times
+  bool many = false;     ///< may be given several times
+  bool required = false; ///< shown in the command's usage; the command itself tells that it is missing
 };
 
 struct Example
@@ -51,6 +52,7 @@ struct Command
   int place = 0; ///< order in lists
   std::string name;
   std::string arguments{};   ///< "FILE PATH..."; "[X]" is not required, "..." takes all that are left
+  size_t inputs = 1;         ///< how many of the first arguments are files that are read
   std::string summary{};     ///< one line, lower case, no full stop
   std::string description{}; ///< paragraphs, separated by an empty line
   std::vector<OptionSpec> options{};
@@ -101,6 +103,9 @@ std::optional<uint64_t> parseNumber(std::string_view text);
 
 /// The long name of an option: "--output" of "-o,--output".
 std::string longName(const OptionSpec& option);
+
+/// "FILE -o OUT": the arguments of a command and what else must be given.
+std::string argumentsOf(const Command& command);
 
 /// Runs the program: reads the command line, runs the command, and returns the exit status.
 int runProgram(int argc, char** argv);

@@ -1,7 +1,9 @@
 #include "tools/output.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <cstdio>
+#include <cstdlib>
 #include <filesystem>
 #include <utility>
 
@@ -24,8 +26,7 @@ bool isSpecial(const std::string& path)
   return !error && std::filesystem::exists(status) && !std::filesystem::is_regular_file(status);
 }
 
-} // namespace
-
+/// Throws Failure when a file of this name is there and `force` is not given.
 void checkWritable(const std::string& path, bool force)
 {
   std::error_code error;
@@ -41,6 +42,120 @@ void checkWritable(const std::string& path, bool force)
   {
     failAt(path, KOR_RC_FILE_EXISTS, "--force replaces it");
   }
+}
+
+struct NamedOutput
+{
+  std::string option;
+  std::string path;
+};
+
+/// Where a path leads to, also when nothing is there yet: links are followed, even those that lead to nothing.
+std::filesystem::path targetOf(const std::string& text)
+{
+  constexpr int mostLinks = 40;
+  std::error_code error;
+  std::filesystem::path path = std::filesystem::absolute(kor::pathOf(text), error);
+  for (int i = 0; i < mostLinks && std::filesystem::is_symlink(path, error); ++i)
+  {
+    path = path.parent_path() / std::filesystem::read_symlink(path, error);
+  }
+  const std::filesystem::path whole = std::filesystem::weakly_canonical(path, error);
+  return error ? path : whole;
+}
+
+bool isSameFile(const std::string& first, const std::string& second)
+{
+  std::error_code error;
+  if (first == "-" || second == "-")
+  {
+    return first == second;
+  }
+  if (std::filesystem::is_character_file(kor::pathOf(first), error))
+  {
+    return false; // a terminal and /dev/null serve any number of ends
+  }
+  return std::filesystem::equivalent(kor::pathOf(first), kor::pathOf(second), error) ||
+         targetOf(first) == targetOf(second);
+}
+
+std::vector<NamedOutput> outputsOf(const Invocation& invocation)
+{
+  std::vector<NamedOutput> outputs;
+  for (const auto* list : {&invocation.command().options, &globalOptions()})
+  {
+    for (const OptionSpec& option : *list)
+    {
+      const std::string name = longName(option);
+      const std::string path = option.kind == ValueKind::file ? invocation.text(name) : std::string();
+      const bool standardError = name == "--trace" && path == "-";
+      if (!path.empty() && !standardError)
+      {
+        outputs.push_back({name, path});
+      }
+    }
+  }
+  return outputs;
+}
+
+/// The files that a command reads. Standard input has a name on most systems, which tells when it comes from a file.
+std::vector<std::string> inputsOf(const Invocation& invocation)
+{
+  std::vector<std::string> inputs = invocation.arguments();
+  inputs.resize(std::min(invocation.command().inputs, std::max<size_t>(inputs.size(), 1)), "-");
+  std::replace(inputs.begin(), inputs.end(), std::string("-"), std::string("/dev/stdin"));
+  return inputs;
+}
+
+} // namespace
+
+void checkOutputs(const Invocation& invocation)
+{
+  const std::string& command = invocation.command().name;
+  const std::vector<NamedOutput> outputs = outputsOf(invocation);
+  const std::vector<std::string> inputs = inputsOf(invocation);
+  for (auto output = outputs.begin(); output != outputs.end(); ++output)
+  {
+    const auto isSame = [&](const std::string& other) { return isSameFile(output->path, other); };
+    const auto taken = std::find_if(outputs.begin(), output, [&](const auto& other) { return isSame(other.path); });
+    if (taken != output)
+    {
+      throw Failure(command + ": " + taken->option + " and " + output->option + " lead to the same place, " +
+                        (output->path == "-" ? "standard output" : "'" + output->path + "'"),
+                    "each of them needs a file of its own, also with --force");
+    }
+    if (std::any_of(inputs.begin(), inputs.end(), isSame))
+    {
+      throw Failure(command + ": " + output->option + " '" + output->path + "' is a file that is read",
+                    "write to another one; --force does not replace what is being read");
+    }
+    checkWritable(output->path, invocation.has("--force"));
+  }
+}
+
+void failAtStandardOutput(int error)
+{
+  if (error == EPIPE)
+  {
+    throw ClosedPipe{};
+  }
+  failAt("standard output", error == ENOSPC  ? KOR_RC_NO_SPACE
+                            : error == EFBIG ? KOR_RC_FILE_TOO_LARGE
+                                             : KOR_RC_IO_ERROR);
+}
+
+bool wantsColour(const Invocation& invocation)
+{
+  const std::string when = invocation.text("--color", "auto");
+  if (when != "auto")
+  {
+    return when == "always";
+  }
+  const auto variable = [](const char* name) {
+    const char* const value = std::getenv(name);
+    return std::string(value == nullptr ? "" : value);
+  };
+  return kor::isTerminal(stdout) && variable("NO_COLOR").empty() && variable("TERM") != "dumb";
 }
 
 Output::Output(std::string path, bool force)
@@ -117,11 +232,7 @@ void Output::writeOut(const char* bytes, size_t count)
   {
     const int error = errno;
     buffer_.clear();
-    if (error == EPIPE)
-    {
-      throw ClosedPipe{};
-    }
-    failAt("standard output", error == ENOSPC ? KOR_RC_NO_SPACE : KOR_RC_IO_ERROR);
+    failAtStandardOutput(error);
   }
 }
 

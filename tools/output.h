@@ -8,6 +8,7 @@
 #include <string_view>
 
 #include "tav/kor.h"
+#include "tools/options.h"
 
 namespace tav::tool
 {
@@ -53,7 +54,15 @@ private:
   uint64_t written_ = 0;
 };
 
-/// Throws Failure when a file of this name is there and `force` is not given, before work is done for nothing.
-void checkWritable(const std::string& path, bool force);
+/// Throws what a failed write to standard output stands for, by its errno: ClosedPipe or Failure.
+[[noreturn]] void failAtStandardOutput(int error);
+
+/// Throws Failure when an output that the command line names must not be written: a file of this name is there and
+/// --force is not given, or it is also a file that the command reads, or another output, by whatever names and links.
+/// Called once, before anything is opened for writing.
+void checkOutputs(const Invocation& invocation);
+
+/// Whether standard output is to be coloured: --color, else on a terminal that knows colours unless NO_COLOR is set.
+bool wantsColour(const Invocation& invocation);
 
 } // namespace tav::tool

@@ -96,8 +96,9 @@ void checkArguments(const Command& command, const std::vector<std::string>& argu
   const Arity arity = arityOf(command.arguments);
   if (arguments.size() < arity.least)
   {
-    throw Failure(command.name + ": an argument is missing: tav " + command.name + " " + command.arguments,
-                  "'tav " + command.name + " --help' tells more; - is standard input");
+    throw Failure(command.name + ": an argument is missing: tav " + command.name + " " + argumentsOf(command),
+                  "'tav " + command.name + " --help' tells more" +
+                      (command.inputs == 0 ? "" : "; - is standard input"));
   }
   if (arguments.size() > arity.most)
   {
@@ -139,6 +140,7 @@ int runCommand(const Command& command, std::vector<std::string> words)
   }
   checkArguments(command, arguments);
   invocation.giveArguments(std::move(arguments));
+  checkOutputs(invocation);
   const TraceFile trace(invocation);
   return command.run(invocation);
 }

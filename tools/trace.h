@@ -10,7 +10,8 @@
 namespace tav::tool
 {
 
-/// The library's trace as text in a file, from now until the object goes: --trace and --trace-probe.
+/// The library's trace as text in a file, from now until the object goes: --trace and --trace-probe. It is written
+/// under its own name at once, so that it is there when the program does not come to its end.
 class TraceFile
 {
 public:
