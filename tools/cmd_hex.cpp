@@ -21,6 +21,7 @@ namespace
 {
 
 constexpr size_t kRow = 16;
+constexpr uint64_t kMostOfPiece = 32 * kRow; ///< bytes that are shown where no node begins
 
 class Dumper
 {
@@ -48,6 +49,20 @@ public:
       heading(walker, event);
       rows(event.offset, event.length);
     } while (walker.next(event));
+    out_.commit();
+  }
+
+  /// Dumps from an offset on what is left of the piece that `event` stands for, for it is no node's first byte.
+  void dumpWithin(const Walker& walker, const Event& event, uint64_t offset)
+  {
+    out_.write("; no node begins at " + hexOffset(offset) + ", which lies in " + walker.path(event) + "\n");
+    heading(walker, event);
+    const uint64_t left = event.length - (offset - event.offset);
+    rows(offset, std::min(left, kMostOfPiece));
+    if (left > kMostOfPiece)
+    {
+      out_.write("; and " + counted(left - kMostOfPiece, "byte") + " more of it\n");
+    }
     out_.commit();
   }
 
@@ -163,7 +178,12 @@ int run(const Invocation& invocation)
   }
   if (const auto at = invocation.number("--at"))
   {
-    goToOffset(stream.bytes(), walker, event, *at);
+    if (findOffset(stream.bytes(), walker, event, *at))
+    {
+      Dumper(stream).dumpWithin(walker, event, *at);
+      tellStatistics(invocation, stream.bytes());
+      return kFindings;
+    }
   }
   else if (invocation.has("--path"))
   {
@@ -171,7 +191,7 @@ int run(const Invocation& invocation)
     PathMatcher matcher(path);
     if (!goToMatch(walker, matcher, event))
     {
-      throw Failure(kFindings, Problem{.file = stream.bytes().name(), .path = path.text(), .sentence = "no match"});
+      throw Failure(kFindings, path.noMatch(stream.bytes().name()));
     }
   }
   else
@@ -196,7 +216,8 @@ const Registration registration{{
     .description =
         "Rows are as those of xxd, so that 'xxd -r' makes the bytes again; lines that begin with ; tell what\n"
         "the rows below them are. Rows of zeros are told once, with a * below them. Bytes that\n"
-        "are no part of a node are dumped as damaged, and the exit status is then 1.",
+        "are no part of a node are dumped as damaged, and the exit status is then 1. It is also 1 when no node\n"
+        "begins at the OFFSET of --at: then the bytes from there on are dumped, up to the next piece, at most 512.",
     .options =
         {{.names = "--at", .kind = ValueKind::number, .value = "OFFSET", .help = "the node at OFFSET and all below it"},
          {.names = "--path", .kind = ValueKind::text, .value = "PATH", .help = "the first node that PATH leads to"}},

@@ -37,6 +37,8 @@ struct Counts
   uint64_t wide = 0;
   uint64_t open = 0;     ///< groups of unknown size that an end element ended
   uint64_t unclosed = 0; ///< groups that nothing ended
+  uint64_t begun = 0;    ///< groups of unknown size that were come across, whether or not their end was
+  bool openRoot = false; ///< one of them is a root
   uint64_t cut = 0;      ///< groups that claim more than there is
   uint64_t pairs = 0;
   uint64_t extras = 0;
@@ -57,6 +59,8 @@ void countNode(const Node& node, Counts& counts)
   counts.groups += node.isGroup() ? 1 : 0;
   counts.wide += node.is64() ? 1 : 0;
   counts.roots += node.depth == 0 ? 1 : 0;
+  counts.begun += node.has(kOpen) ? 1 : 0;
+  counts.openRoot = counts.openRoot || (node.has(kOpen) && node.depth == 0);
   counts.cut += node.has(kOverrun) ? 1 : 0;
   counts.extras += node.has(kExtra) ? 1 : 0;
   counts.depth = std::max(counts.depth, node.depth + 1);
@@ -175,6 +179,20 @@ void printForm(Printer& print, const Stream& stream)
   print.line("alignment", (differs(&Form::aligned) ? doubt : "") + (found.form.aligned ? "padded to 8" : "none"));
 }
 
+std::string openText(const Counts& counts)
+{
+  if (!counts.complete)
+  {
+    // What ends a group may lie behind the part that was counted, and so may most of the groups.
+    return counts.begun == 0 ? "not counted; --full counts them"
+                             : "at least " + std::to_string(counts.begun) +
+                                   (counts.openRoot ? ", the root among them" : "") + "; --full counts them";
+  }
+  return counts.open + counts.unclosed == 0 ? "none"
+                                            : std::to_string(counts.open + counts.unclosed) + ", of them " +
+                                                  std::to_string(counts.unclosed) + " without an end element";
+}
+
 void printCounts(Printer& print, const Counts& counts, uint64_t fileBytes)
 {
   const uint64_t narrow = counts.nodes - counts.wide;
@@ -189,10 +207,7 @@ void printCounts(Printer& print, const Counts& counts, uint64_t fileBytes)
   print.line("nodes", std::to_string(counts.nodes) + ", of them " + counted(counts.groups, "group"));
   print.line("roots", std::to_string(counts.roots));
   print.line("depth", std::to_string(counts.depth));
-  print.line("open groups", counts.open + counts.unclosed == 0
-                                ? "none"
-                                : std::to_string(counts.open + counts.unclosed) + ", of them " +
-                                      std::to_string(counts.unclosed) + " without an end element");
+  print.line("open groups", openText(counts));
   if (counts.cut != 0)
   {
     print.line("cut groups", std::to_string(counts.cut) + " that claim more bytes than there are");

@@ -60,18 +60,10 @@ void checkOutput()
   errno = 0;
   const bool failed = std::fflush(stdout) != 0;
   const int error = errno;
-  if (!failed && std::ferror(stdout) == 0)
+  if (failed || std::ferror(stdout) != 0)
   {
-    return;
+    failAtStandardOutput(error);
   }
-  if (error == EPIPE)
-  {
-    throw ClosedPipe{};
-  }
-  Problem problem{"standard output"};
-  problem.code = error == ENOSPC ? KOR_RC_NO_SPACE : KOR_RC_IO_ERROR;
-  problem.sentence = codeSentence(problem.code);
-  throw Failure(kTrouble, problem);
 }
 
 int run(const Invocation& invocation)
@@ -80,14 +72,23 @@ int run(const Invocation& invocation)
   TAVHeaderData start{};
   bool hasStart = false;
   bool group = true;
+  Walker walker(stream.bytes(), stream.form());
+  Event event;
   if (const auto at = invocation.number("--at"))
   {
-    Walker walker(stream.bytes(), stream.form());
-    Event event;
     goToOffset(stream.bytes(), walker, event, *at);
     start.header = event.node.header;
     group = event.node.isGroup();
     hasStart = true;
+  }
+  else
+  {
+    walker.next(event);
+  }
+  if (invocation.has("--bare") && event.node.isGroup())
+  {
+    throw Failure("print: " + walker.path(event) + " is a group, which has no value of its own for --bare",
+                  "--at OFFSET leads to a node with a value: 'tav tree' lists offsets; 'tav get' finds it by path");
   }
   const Handle handle = openHandle(invocation, stream);
   if (hasStart)
@@ -131,7 +132,7 @@ const Registration registration{{
     .options = {{.names = "--xml", .help = "XML instead of text"},
                 {.names = "--headers", .help = "each node's header"},
                 {.names = "--descriptors", .help = "the lines of the node descriptor"},
-                {.names = "--bare", .help = "a node's body is its value alone"},
+                {.names = "--bare", .help = "the value alone, of the node that --at names; not of a group"},
                 {.names = "--attributes", .help = "XML with key elements as attributes"},
                 {.names = "--at",
                  .kind = ValueKind::number,

@@ -1,7 +1,6 @@
 // tav tree: one line a node.
 #include <algorithm>
 #include <cstdio>
-#include <cstdlib>
 
 #include "kor/host.h"
 #include "tools/locate.h"
@@ -32,25 +31,20 @@ struct Colours
   const char* plain = "";
 };
 
-Colours coloursFor(const std::string& when)
-{
-  const char* const noColour = std::getenv("NO_COLOR");
-  const bool wanted =
-      when == "always" || (when != "never" && kor::isTerminal(stdout) && (noColour == nullptr || *noColour == 0));
-  return wanted ? Colours{"\033[2m", "\033[1m", "\033[36m", "\033[31m", "\033[0m"} : Colours{};
-}
+constexpr Colours kOnTerminal{"\033[2m", "\033[1m", "\033[36m", "\033[31m", "\033[0m"};
 
 class TreePrinter
 {
 public:
   TreePrinter(const Invocation& invocation, Stream& stream)
-      : stream_(stream), out_("-"), colours_(coloursFor(invocation.text("--color", "auto"))),
+      : stream_(stream), out_("-"), colours_(wantsColour(invocation) ? kOnTerminal : Colours{}),
         width_(static_cast<size_t>(kor::terminalWidth().value_or(0))), paths_(invocation.has("--paths")),
         maxDepth_(invocation.number("--depth").value_or(kNoOffset))
   {
     if (const auto width = invocation.number("--width"))
     {
       width_ = static_cast<size_t>(std::min<uint64_t>(*width, 100000));
+      strict_ = true;
     }
     for (const std::string& name : invocation.all("--only"))
     {
@@ -99,6 +93,7 @@ private:
   Output out_;
   Colours colours_;
   size_t width_;
+  bool strict_ = false; ///< also offsets, names and paths are cut, not only values
   bool paths_;
   uint64_t maxDepth_;
   std::vector<uint16_t> only_{};
@@ -185,19 +180,25 @@ void TreePrinter::put(uint64_t offset, const std::string& size, const std::strin
   char columns[64];
   std::snprintf(columns, sizeof columns, "%10s %8s  ", hexOffset(offset).c_str(), size.c_str());
   const bool gap = !bad.empty() && !text.empty() && text.back() != ' ';
-  const std::string middle = text + (gap ? " " : "") + bad;
-  std::string rest = type;
-  rest += type.empty() || value.empty() ? "" : "  ";
-  rest += value;
+  std::string line = columns;
+  const size_t nameBegin = line.size();
+  line += text + (gap ? " " : "") + bad;
+  const size_t nameEnd = line.size();
+  line += type.empty() && value.empty() ? "" : "  ";
+  const size_t typeBegin = line.size();
+  line += type;
+  const size_t typeEnd = line.size();
+  line += (type.empty() || value.empty() ? "" : "  ") + value;
   if (width_ != 0)
   {
-    const size_t used = std::char_traits<char>::length(columns) + middle.size() + 2;
-    rest = cutToWidth(rest, width_ > used ? width_ - used : 0);
+    line = strict_ || width_ >= typeBegin + 3 ? cutToWidth(line, width_) : line.substr(0, nameEnd);
   }
-  const size_t typeLength = std::min(type.size(), rest.size());
-  out_.write(colours_.offset + std::string(columns) + colours_.plain + (bad.empty() ? colours_.name : colours_.bad) +
-             middle + colours_.plain + (rest.empty() ? "" : "  ") + colours_.type + rest.substr(0, typeLength) +
-             colours_.plain + rest.substr(typeLength) + "\n");
+  const auto part = [&](size_t begin, size_t end) {
+    return line.substr(std::min(begin, line.size()), std::min(end, line.size()) - std::min(begin, line.size()));
+  };
+  out_.write(colours_.offset + part(0, nameBegin) + colours_.plain + (bad.empty() ? colours_.name : colours_.bad) +
+             part(nameBegin, nameEnd) + colours_.plain + part(nameEnd, typeBegin) + colours_.type +
+             part(typeBegin, typeEnd) + colours_.plain + part(typeEnd, line.size()) + "\n");
   ++lines_;
 }
 
@@ -227,8 +228,8 @@ const Registration registration{{
     .arguments = "FILE",
     .summary = "one line a node: offset, size, name, type, value",
     .description = "Lists every node in the order of the stream, indented by its level. Bytes that are no node are\n"
-                   "listed as damaged, with the reason; then the exit status is 1. On a terminal lines are cut to\n"
-                   "its width and coloured, unless NO_COLOR is set.",
+                   "listed as damaged, with the reason; then the exit status is 1. On a terminal values are cut to\n"
+                   "its width, and lines are coloured unless NO_COLOR is set or TERM is dumb.",
     .options =
         {{.names = "--depth", .kind = ValueKind::number, .value = "N", .help = "no node deeper than N levels"},
          {.names = "--at", .kind = ValueKind::number, .value = "OFFSET", .help = "the node at OFFSET and all below it"},

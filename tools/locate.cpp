@@ -5,30 +5,48 @@
 namespace tav::tool
 {
 
-void goToOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offset)
+std::optional<std::string> findOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offset)
 {
-  std::string around;
+  std::string before;
   while (walker.next(event) && event.offset <= offset)
   {
-    if (event.what != What::nodeBegin)
+    const bool begins = event.what == What::nodeBegin;
+    if (begins && event.offset == offset)
     {
-      continue;
+      return std::nullopt;
     }
-    if (event.offset == offset)
+    if (begins)
     {
-      return;
+      before = "the node before it begins at " + hexOffset(event.offset) + ": " + walker.path(event);
     }
-    around = "the node before it begins at " + hexOffset(event.offset) + ": " + walker.path(event);
-    if (event.node.isGroup() && event.node.limit <= offset)
+    if (offset - event.offset < event.length)
+    {
+      return before;
+    }
+    if (begins && event.node.isGroup() && event.node.limit <= offset)
     {
       walker.skip();
     }
   }
   Problem problem{source.name(), offset};
-  problem.sentence = offset < source.size() ? "no node begins there" : "lies behind the end of the file";
+  problem.sentence = "lies behind the end of the file";
   problem.code = TAV_RC_NOT_FOUND;
-  problem.hint = around;
+  problem.hint = before;
   throw Failure(kFindings, problem);
+}
+
+void goToOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offset)
+{
+  const auto before = findOffset(source, walker, event, offset);
+  if (before)
+  {
+    Problem problem{source.name(), offset};
+    problem.sentence = "no node begins there";
+    problem.code = TAV_RC_NOT_FOUND;
+    problem.hint = (before->empty() ? "" : *before + "\n     ") + "'tav hex --at " + hexOffset(offset) +
+                   "' shows the bytes there";
+    throw Failure(kFindings, problem);
+  }
 }
 
 bool goToMatch(Walker& walker, PathMatcher& matcher, Event& event)

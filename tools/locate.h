@@ -3,12 +3,19 @@
 #pragma once
 
 #include <cstdint>
+#include <optional>
+#include <string>
 
 #include "tools/path.h"
 #include "tools/walker.h"
 
 namespace tav::tool
 {
+
+/// Walks on to the piece of the file that the byte at `offset` belongs to. When a node begins there, `event` is its
+/// nodeBegin, and nothing is returned; else `event` is the piece, and what is returned names the node before it, for a
+/// hint. Throws Failure when the offset lies behind the end.
+std::optional<std::string> findOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offset);
 
 /// Walks on to the node whose header begins at `offset`; `event` is then its nodeBegin. Throws Failure, with the nodes
 /// that lie around the offset as a hint, when no node begins there.

@@ -1,0 +1,139 @@
+"""What the commands that look into a stream tell where there is less to see than was asked for."""
+import struct
+import unittest
+
+from support import ToolTest, bytes_of_hex, tav
+
+UNKNOWN = 2**64 - 1
+
+
+def header(size, kind, elm):
+    return struct.pack("<QIHH", size, 0, kind, elm)
+
+
+class Info(ToolTest):
+    def open_groups(self, path, *options):
+        lines = tav("info", path, *options).out.splitlines()
+        return next(line[len("open groups"):].strip() for line in lines if line.startswith("open groups"))
+
+    def write(self, root, groups):
+        """A root of so many groups with a number each, more than are counted unless all are asked for."""
+        path = self.folder / "many.tav"
+        with path.open("wb") as file:
+            file.write(header(root, 2, 60100) + (header(20, 2, 60102) + header(4, 55, 307) + bytes(4)) * groups)
+        return path
+
+    def test_an_open_root_of_a_large_file_is_told(self):
+        for root in (UNKNOWN, 0):
+            path = self.write(root, 60000)
+            self.assertEqual(self.open_groups(path), "at least 1, the root among them; --full counts them")
+            self.assertEqual(self.open_groups(path, "--full"), "1, of them 1 without an end element")
+
+    def test_open_groups_that_were_not_counted_are_not_told_to_be_none(self):
+        path = self.write(36 * 60000, 60000)
+        self.assertEqual(self.open_groups(path), "not counted; --full counts them")
+        self.assertEqual(self.open_groups(path, "--full"), "none")
+
+    def test_open_groups_of_a_small_file_are_counted(self):
+        self.assertEqual(self.open_groups(self.write(UNKNOWN, 3)), "1, of them 1 without an end element")
+        self.assertEqual(self.open_groups(self.write(36 * 3, 3)), "none")
+
+
+class Hex(ToolTest):
+    def setUp(self):
+        super().setUp()
+        self.path = self.folder / "x.tav"
+        nodes = header(4, 55, 307) + b"\1\2\3\4", b"\xee" * 700, header(4, 55, 308) + b"\5\6\7\x08"
+        self.content = header(sum(map(len, nodes)), 2, 60100) + b"".join(nodes)
+        self.path.write_bytes(self.content)
+
+    def shown(self, offset):
+        """The bytes that are shown from an offset on, where no node begins."""
+        result = tav("hex", self.path, "--at", offset)
+        self.assertEqual((result.status, result.err), (1, ""))
+        self.assertTrue(result.out.startswith(f"; no node begins at {offset:#x}, "), result.out)
+        return bytes_of_hex(result.out)[offset:], result.out
+
+    def test_damaged_bytes_are_shown_by_their_offset(self):
+        damaged = int(tav("check", self.path, "--rule", "damaged").out.split(": ")[2].split()[0], 16)
+        self.assertEqual(damaged, 36)
+        bytes_there, text = self.shown(damaged)
+        self.assertEqual(bytes_there, b"\xee" * 512)
+        self.assertIn("; damaged: ", text)
+        self.assertIn("; and 188 bytes more of it\n", text)
+
+    def test_the_bytes_end_where_the_next_piece_begins(self):
+        bytes_there, text = self.shown(36 + 690)
+        self.assertEqual(bytes_there, b"\xee" * 10)
+        self.assertNotIn("more of it", text)
+
+    def test_a_place_inside_a_node_is_shown_with_what_it_is(self):
+        bytes_there, text = self.shown(33)
+        self.assertEqual(bytes_there, b"\2\3\4")
+        self.assertIn("payload: ", text)
+        bytes_there, text = self.shown(20)
+        self.assertEqual(bytes_there, self.content[20:32])
+        self.assertIn("64-bit header: ", text)
+
+    def test_a_node_is_shown_as_ever(self):
+        result = tav("hex", self.path, "--at", 16)
+        self.assertEqual((result.status, bytes_of_hex(result.out)[16:]), (0, self.content[16:36]))
+
+    def test_a_place_behind_the_end_is_told(self):
+        result = tav("hex", self.path, "--at", len(self.content))
+        self.assertEqual((result.status, result.out), (1, ""))
+        self.assertIn("lies behind the end of the file", result.err)
+
+    def test_tree_and_print_name_the_command_that_shows_the_bytes(self):
+        for command in ("tree", "print"):
+            result = tav(command, self.path, "--at", 36)
+            self.assertEqual((result.status, result.out), (1, ""))
+            self.assertIn("no node begins there", result.err)
+            self.assertIn("'tav hex --at 0x24'", result.err)
+
+
+class Print(ToolTest):
+    def test_a_bare_group_is_explained(self):
+        path = self.snapshot()
+        for arguments in ((path,), ("--at", 0, path), ("--at", 16, path), ("--xml", path)):
+            with self.subTest(arguments=arguments):
+                result = tav("print", "--bare", *arguments)
+                self.assertEqual((result.status, result.out), (2, ""))
+                self.assertIn("is a group, which has no value of its own", result.err)
+                self.assertIn("--at OFFSET", result.err)
+
+    def test_a_bare_value_is_the_value_alone(self):
+        path = self.snapshot()
+        self.assertEqual(tav("print", "--bare", "--at", 32, path).out, tav("get", path, "/system/host/hostName").out)
+
+
+class Tree(ToolTest):
+    def test_lines_are_never_wider_than_asked_for(self):
+        path = self.snapshot()
+        for width in (1, 2, 5, 20, 21, 23, 30, 45):
+            for options in ((), ("--paths",)):
+                with self.subTest(width=width, options=options):
+                    lines = tav("tree", path, "--width", width, *options).out.splitlines()
+                    self.assertEqual(len(lines), 16)
+                    self.assertLessEqual(max(map(len, lines)), width)
+                    self.assertTrue(any(line.endswith("..."[:width]) for line in lines))
+
+
+class Snapshot(ToolTest):
+    def test_a_32_bit_root_is_that_of_32_bit_headers(self):
+        narrow = self.snapshot("--root", "32").read_bytes()
+        self.assertEqual(narrow[:4], self.snapshot("--hdr32").read_bytes()[:4])
+        info = tav("info", self.snapshot("--root", "32")).out
+        self.assertIn("root header       32-bit\n", info)
+        self.assertIn("headers           32-bit\n", info)
+        self.assertIn("root header       64-bit\n", tav("info", self.snapshot("--root", "64")).out)
+
+    def test_widths_that_exclude_each_other_are_wrong_usage(self):
+        for options in (("--root", "64", "--hdr32"), ("--root", "32", "--eye-size")):
+            result = tav("snapshot", *options)
+            self.assertEqual((result.status, result.out), (2, ""))
+            self.assertIn("exclude each other", result.err)
+
+
+if __name__ == "__main__":
+    unittest.main()
