@@ -4,6 +4,8 @@
 
 #include <nlohmann/json.hpp>
 
+#include "kor/host.h"
+#include "tools/json_text.h"
 #include "tools/locate.h"
 #include "tools/options.h"
 #include "tools/output.h"
@@ -38,8 +40,12 @@ class Getter
 public:
   explicit Getter(const Invocation& invocation)
       : stream_(openStream(invocation)), out_("-"), raw_(invocation.has("--raw")), json_(invocation.has("--json")),
-        all_(invocation.has("--all")), paths_(invocation.has("--paths"))
+        all_(invocation.has("--all")), paths_(invocation.has("--paths")), terminal_(kor::isTerminal(stdout))
   {
+    if (raw_ && terminal_)
+    {
+      throw Failure("get: the bytes of --raw are no text for a terminal", "'> FILE' writes them to a file");
+    }
     if (raw_ && json_)
     {
       throw Failure("get: --raw and --json exclude each other");
@@ -71,7 +77,7 @@ public:
       if (wanted->found == 0)
       {
         status = kFindings;
-        report(Problem{.file = stream_.bytes().name(), .path = wanted->path.text(), .sentence = "no match"});
+        report(wanted->path.noMatch(stream_.bytes().name()));
       }
     }
     return status;
@@ -128,11 +134,11 @@ private:
     }
     else if (const auto text = plainText(stream_.bytes(), stream_.form(), node, kMostText))
     {
-      out_.write(*text);
+      out_.write(terminal_ ? forTerminal(*text) : *text);
     }
     else
     {
-      copyPayload(node);
+      terminal_ ? showPayload(node) : copyPayload(node);
     }
     out_.write("\n");
   }
@@ -149,7 +155,12 @@ private:
     {
       object["value"] = jsonValue(node);
     }
-    out_.write(object.dump() + "\n");
+    std::string text = object.dump();
+    if (terminal_ && forTerminal(text) != text)
+    {
+      text = object.dump(-1, ' ', true);
+    }
+    out_.write(text + "\n");
   }
 
   nlohmann::ordered_json jsonValue(const Node& node)
@@ -186,12 +197,33 @@ private:
     }
   }
 
+  void showPayload(const Node& node)
+  {
+    constexpr size_t most = size_t{64} * 1024;
+    const uint64_t end = node.payloadOffset() + node.size();
+    std::vector<uint8_t> bytes;
+    for (uint64_t at = node.payloadOffset(); at < end;)
+    {
+      bytes.resize(static_cast<size_t>(std::min<uint64_t>(most + 4, end - at)));
+      bytes.resize(stream_.bytes().read(at, bytes));
+      const std::string_view text(reinterpret_cast<const char*>(bytes.data()), bytes.size());
+      const size_t count = cutAtCharacter(text, most);
+      if (count == 0)
+      {
+        return; // the file became shorter
+      }
+      out_.write(forTerminal(text.substr(0, count)));
+      at += count;
+    }
+  }
+
   Stream stream_;
   Output out_;
   bool raw_;
   bool json_;
   bool all_;
   bool paths_;
+  bool terminal_; ///< of which nothing that a stream holds may take hold
   std::vector<std::unique_ptr<Wanted>> wanted_{};
 };
 
@@ -209,7 +241,9 @@ const Registration registration{{
         "Prints the value of the first node that each path leads to, in the order of the stream, one a line:\n"
         "texts as they are, numbers in decimal, bytes in hexadecimal. A path is made of tags, enum names or\n"
         "ids (#12345); [2] is the second of its name among its siblings, * any one node, ** any number of\n"
-        "levels. Every path that any command prints is understood. Exit status 1: a path leads nowhere.",
+        "levels; / alone leads to the roots. Every path that any command prints is understood. On a terminal\n"
+        "control characters of texts are written as \\x1b, as 'tav tree' does. Exit status 1: a path leads nowhere,\n"
+        "also by a name that no element has; the values of the others are printed. 2: a path is malformed.",
     .options = {{.names = "-a,--all", .help = "every node that a path leads to, not only the first"},
                 {.names = "--raw", .help = "the payload's bytes as they stand in the file, without line ends"},
                 {.names = "--json", .help = "one JSON object a match: path, offset, size, type, value"},

@@ -6,7 +6,6 @@
 #include <unordered_map>
 
 #include "tav/dictionary.hpp"
-#include "tools/report.h"
 
 namespace tav::tool
 {
@@ -174,6 +173,11 @@ void Path::fail(const std::string& sentence, std::string hint) const
 Path::Path(std::string_view text)
     : text_(text)
 {
+  if (text == "/")
+  {
+    steps_.push_back({.kind = Step::Kind::any});
+    return;
+  }
   if (text.starts_with('/'))
   {
     text.remove_prefix(1);
@@ -194,6 +198,22 @@ Path::Path(std::string_view text)
   }
 }
 
+void Path::requireNames() const
+{
+  if (!unknown_.empty())
+  {
+    fail(unknown_, hint_);
+  }
+}
+
+Problem Path::noMatch(const std::string& file) const
+{
+  return {.file = file,
+          .path = text_,
+          .sentence = unknown_.empty() ? "no match" : "no match: " + unknown_,
+          .hint = hint_};
+}
+
 void Path::addStep(std::string_view text)
 {
   const std::string number = "step " + std::to_string(steps_.size() + 1);
@@ -211,12 +231,20 @@ void Path::addStep(std::string_view text)
   else
   {
     step.ids = idsOf(name);
-    if (step.ids.empty())
+    if (step.ids.empty() && (name.front() == '#' || (name.front() >= '0' && name.front() <= '9')))
+    {
+      fail(number + ": '" + std::string(name) + "' is no id", "ids go from 0 to 65535");
+    }
+    if (step.ids.empty() && name.find(']') != std::string_view::npos)
+    {
+      fail(number + " has a ] without a [");
+    }
+    if (step.ids.empty() && unknown_.empty())
     {
       const std::string similar = similarNames(name);
-      fail(number + ": no element has the name '" + std::string(name) + "'",
-           similar.empty() ? "'tav elements' lists the names; #12345 stands for an id"
-                           : "did you mean " + similar + "?");
+      unknown_ = "no element has the name '" + std::string(name) + "'";
+      hint_ =
+          similar.empty() ? "'tav elements' lists the names; #12345 stands for an id" : "did you mean " + similar + "?";
     }
   }
   if (bracket != std::string_view::npos)

@@ -4,9 +4,9 @@
 ///   step   = name | #id | * | **           name: an element's tag, enum name or constant
 ///   index  = [n]                           the how-manieth of its id among its siblings, from 1
 ///          | [@offset]                     the one at this offset; 0x for hexadecimal
-///   path   = / { step [index] / }
+///   path   = / | / { step [index] / }
 ///
-/// `*` is any one node, `**` any number of levels. The leading slash may be left out.
+/// `*` is any one node, `**` any number of levels. The leading slash may be left out. A slash alone leads to the roots.
 #pragma once
 
 #include <cstdint>
@@ -14,6 +14,7 @@
 #include <string_view>
 #include <vector>
 
+#include "tools/report.h"
 #include "tools/walker.h"
 
 namespace tav::tool
@@ -35,7 +36,8 @@ std::string similarNames(std::string_view name);
 class Path
 {
 public:
-  /// Throws Failure, with the place of the error, when the text is no path.
+  /// Throws Failure, with the place of the error, when the text is no path. A name that no element has is none of
+  /// that: such a path leads to no node of any stream.
   explicit Path(std::string_view text);
 
   struct Step
@@ -55,6 +57,12 @@ public:
   const std::string& text() const { return text_; }
   const std::vector<Step>& steps() const { return steps_; }
 
+  /// Throws Failure when a step has a name that no element has.
+  void requireNames() const;
+
+  /// What to report when the path has led to no node of a file.
+  Problem noMatch(const std::string& file) const;
+
 private:
   void addStep(std::string_view text);
   void addIndex(std::string_view index, Step& step) const;
@@ -62,6 +70,8 @@ private:
 
   std::string text_;
   std::vector<Step> steps_{};
+  std::string unknown_{}; ///< the first name that no element has, as a sentence; empty: none
+  std::string hint_{};    ///< what may have been meant by it
 };
 
 /// Follows a walk and tells which nodes a path leads to. Give it the nodeBegin of every node of the walk whose parent

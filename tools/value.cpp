@@ -71,6 +71,47 @@ void appendEscape(std::string& out, uint8_t byte)
   out += text;
 }
 
+/// Whether a character, with its length, steers a terminal: the control characters below the blank, U+007F to U+009F,
+/// and those that turn the direction of writing, so that another order of letters is seen than is there.
+bool steers(std::string_view character)
+{
+  const auto byteAt = [&](size_t i) { return static_cast<uint8_t>(character[i]); };
+  const uint8_t first = byteAt(0);
+  if (character.size() == 2)
+  {
+    return first == 0xC2 && byteAt(1) < 0xA0;
+  }
+  if (character.size() == 3 && first == 0xE2)
+  {
+    return (byteAt(1) == 0x80 && byteAt(2) >= 0xAA && byteAt(2) <= 0xAE) || // U+202A to U+202E
+           (byteAt(1) == 0x81 && byteAt(2) >= 0xA6 && byteAt(2) <= 0xA9);   // U+2066 to U+2069
+  }
+  return first < 0x20 || first == 0x7F;
+}
+
+/// Text without what steers terminals or is no UTF-8, and without the characters of `more`: written as \n, \x1b and so
+/// on.
+std::string escaped(std::string_view text, std::string_view more)
+{
+  std::string out;
+  while (!text.empty())
+  {
+    const size_t length = characterLength(text);
+    const size_t count = std::max<size_t>(length, 1);
+    const std::string_view character = text.substr(0, count);
+    if (length == 0 || steers(character) || more.find(character) != std::string_view::npos)
+    {
+      std::for_each(character.begin(), character.end(), [&](char c) { appendEscape(out, static_cast<uint8_t>(c)); });
+    }
+    else
+    {
+      out += character;
+    }
+    text.remove_prefix(count);
+  }
+  return out;
+}
+
 bool sizeSuits(uint16_t type, uint64_t size)
 {
   const TypeInfo& info = typeInfo(type);
@@ -219,28 +260,12 @@ bool isUtf8(std::string_view text)
 
 std::string quoted(std::string_view text)
 {
-  std::string out = "\"";
-  while (!text.empty())
-  {
-    const size_t length = characterLength(text);
-    const auto first = static_cast<uint8_t>(text.front());
-    // U+0080 to U+009F steer terminals like the control characters below the blank.
-    const bool control =
-        first < 0x20 || first == 0x7F || (first == 0xC2 && length == 2 && static_cast<uint8_t>(text[1]) < 0xA0);
-    if (length == 0 || control || first == '"' || first == '\\')
-    {
-      const size_t count = std::max<size_t>(length, 1);
-      for (size_t i = 0; i < count; ++i)
-      {
-        appendEscape(out, static_cast<uint8_t>(text[i]));
-      }
-      text.remove_prefix(count);
-      continue;
-    }
-    out += text.substr(0, length);
-    text.remove_prefix(length);
-  }
-  return out + '"';
+  return '"' + escaped(text, "\"\\") + '"';
+}
+
+std::string forTerminal(std::string_view text)
+{
+  return escaped(text, {});
 }
 
 std::string hexText(std::span<const uint8_t> bytes)

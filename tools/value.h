@@ -31,8 +31,11 @@ std::optional<std::string> plainText(ByteSource& source, const Form& form, const
 /// The name of a type for people: "Uint32"; "group" for both kinds of groups; "type 12345".
 std::string typeText(uint16_t type);
 
-/// Text in quotation marks: control characters and what is no UTF-8 are written as \n, \t, \x1b and so on.
+/// Text in quotation marks: what steers a terminal and what is no UTF-8 is written as \n, \t, \x1b and so on.
 std::string quoted(std::string_view text);
+
+/// Text for a terminal, without quotation marks: as `quoted`, but quotation marks and backslashes stay as they are.
+std::string forTerminal(std::string_view text);
 
 /// Whether bytes are well-formed UTF-8.
 bool isUtf8(std::string_view text);

@@ -39,12 +39,37 @@ class Paths(ToolTest):
 
     def test_bad_paths_are_wrong_usage(self):
         path = self.snapshot()
-        for bad in ("", "/", "//host", "/system/", "/system/hots", "/system[0]", "/system[", "/system[x]",
+        for bad in ("", "//host", "/system/", "/system[0]", "/system[", "/system[x]",
                     "/system[@]", "/**[2]", "/#70000", "/system]"):
             with self.subTest(path=bad):
                 result = tav("get", path, bad)
                 self.assertEqual((result.status, result.out), (2, ""))
                 self.assertTrue(result.err.startswith("tav: path '"), result.err)
+
+    def test_a_path_that_leads_nowhere_does_not_keep_the_others_back(self):
+        path = self.snapshot()
+        name = tav("get", path, "/system/host/os/osName").out
+        for nowhere in ("/nope", "/system/hots", "/system/host/node", "/system/host[2]"):
+            with self.subTest(path=nowhere):
+                result = tav("get", path, nowhere, "/system/host/os/osName", nowhere)
+                self.assertEqual((result.status, result.out), (1, name))
+                self.assertIn(f"tav: {path}: {nowhere}: no match", result.err)
+                self.assertEqual(tav("hex", path, "--path", nowhere).status, 1)
+
+    def test_a_difference_is_not_sought_with_a_name_that_no_element_has(self):
+        path = self.snapshot()
+        for ignored in ("/nope", "/"):
+            result = tav("diff", path, path, "--ignore", ignored)
+            self.assertEqual((result.status, result.out), (2, ""))
+
+    def test_a_slash_alone_leads_to_the_roots(self):
+        path = self.folder / "roots.tav"
+        root = struct.pack("<QIHHQIHHI", 20, 0, 2, 60100, 4, 0, 55, 307, 7)
+        path.write_bytes(root * 2)
+        found = [json.loads(line) for line in tav("get", path, "--all", "--json", "/").out.splitlines()]
+        self.assertEqual([(one["path"], one["offset"]) for one in found], [("/system", 0), ("/system[2]", 36)])
+        self.assertEqual(tav("get", path, "/").out, "/system: group of 20 bytes\n")
+        self.assertEqual(tav("hex", path, "--path", "/").raw, tav("hex", path, "--at", 0).raw)
 
     def test_a_misspelt_name_gets_a_hint(self):
         self.assertIn("did you mean host?", tav("get", self.snapshot(), "/system/hostt").err)

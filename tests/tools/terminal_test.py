@@ -1,5 +1,6 @@
 """What the program does on a real terminal: progress, colours, its width; completion in the shells themselves; and what an
 interrupt leaves."""
+import json
 import os
 import re
 import select
@@ -92,6 +93,50 @@ class Terminal(TerminalTest):
                      tav("tree", path).out):
             self.assertNotRegex(text, ESCAPE)
         self.assertRegex(self.on_terminal("tree", path, NO_COLOR=""), ESCAPE)
+
+    def test_nothing_is_coloured_on_a_terminal_that_knows_no_colours(self):
+        path = self.snapshot()
+        self.assertNotRegex(self.on_terminal("tree", path, TERM="dumb"), ESCAPE)
+        self.assertRegex(self.on_terminal("tree", path, "--color", "always", TERM="dumb"), ESCAPE)
+
+    def hostile_text(self, text):
+        path = self.folder / "hostile.tav"
+        payload = struct.pack("<H", 1208) + text.encode()
+        node = struct.pack("<QIHH", len(payload), 0, 102, 60103) + payload
+        path.write_bytes(struct.pack("<QIHH", len(node), 0, 2, 60100) + node)
+        return path
+
+    def test_no_text_of_a_stream_steers_the_terminal(self):
+        steering = "\x1b]0;owned\x07\x7f\x9b31m\r\n\t" + "".join(map(chr, [*range(0x202A, 0x202F), *range(0x2066, 0x206A)]))
+        harmless = "\"\u00e9\u2029\u202f\u2065\u206a\U0001f600\\"
+        path = self.hostile_text(steering + harmless)
+        for arguments in (["get", path, "/system/hostName"], ["get", path, "--paths", "/system/hostName"],
+                          ["get", path, "--json", "/system/hostName"], ["tree", path, "--color", "never", "--width", "0"]):
+            with self.subTest(arguments=arguments):
+                shown = self.on_terminal(*arguments).replace("\r\n", "\n")
+                self.assertEqual([c for c in shown if c in steering and not c.isprintable() and c not in "\n\t"], [])
+                self.assertIn("owned", shown)
+        self.assertEqual(self.on_terminal("get", path, "/system/hostName"),
+                         "\\x1b]0;owned\\a\\x7f\\xc2\\x9b31m\\r\\n\\t" +
+                         "".join(f"\\xe2\\x80\\x{byte:02x}" for byte in range(0xAA, 0xAF)) +
+                         "".join(f"\\xe2\\x81\\x{byte:02x}" for byte in range(0xA6, 0xAA)) + harmless + "\r\n")
+
+    def test_a_long_text_does_not_steer_the_terminal_either(self):
+        path = self.hostile_text("\u00e9\x1b" * 400000)
+        shown = self.on_terminal("get", path, "/system/hostName")
+        self.assertNotIn("\x1b", shown)
+        self.assertEqual(shown.count("\u00e9\\x1b"), 400000)
+
+    def test_texts_stay_exact_where_no_terminal_is(self):
+        text = "\x1b]0;owned\x07\u202e\u2066"
+        path = self.hostile_text(text)
+        self.assertEqual(tav("get", path, "/system/hostName").out, text + "\n")
+        self.assertEqual(json.loads(tav("get", path, "--json", "/system/hostName").out)["value"], text)
+
+    def test_raw_bytes_do_not_go_to_a_terminal(self):
+        run, ours = self.start("get", self.hostile_text("\x1b"), "--raw", "/system/hostName")
+        self.assertNotIn("\x1b", self.read(ours))
+        self.assertEqual(run.wait(timeout=60), 2)
 
     def test_a_difference_is_coloured_unless_the_user_wants_none(self):
         one, other = self.snapshot(), self.folder / "other.tav"
