@@ -55,6 +55,7 @@ const Registration helpRegistration{{
     .place = 200,
     .name = "help",
     .arguments = "[COMMAND]",
+    .inputs = 0,
     .summary = "this list, or help on one command",
     .options = {{.names = "--man", .help = "the manual page, for man -l -"}},
     .run = help,
@@ -63,7 +64,8 @@ const Registration helpRegistration{{
 const Registration completionRegistration{{
     .place = 210,
     .name = "completion",
-    .arguments = "SHELL",
+    .arguments = "bash|zsh|fish",
+    .inputs = 0,
     .summary = "completion for bash, zsh or fish",
     .examples = {{"source <(tav completion bash)", "complete commands and options in this shell"}},
     .run = complete,

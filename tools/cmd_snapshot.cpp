@@ -123,10 +123,16 @@ bool isSwapped(const Invocation& invocation)
 int run(const Invocation& invocation)
 {
   constexpr uint64_t room = uint64_t{256} * 1024;
-  const bool narrow = invocation.has("--hdr32");
+  const std::string root = invocation.text("--root");
+  if (root == "64" && invocation.has("--hdr32"))
+  {
+    throw Failure("snapshot: --hdr32 and --root 64 exclude each other");
+  }
+  const bool narrow = invocation.has("--hdr32") || root == "32";
   if (narrow && invocation.has("--eye-size"))
   {
-    throw Failure("snapshot: --hdr32 and --eye-size exclude each other",
+    throw Failure("snapshot: " + std::string(root == "32" ? "--root 32" : "--hdr32") +
+                      " and --eye-size exclude each other",
                   "only 64-bit headers can announce an eye/size pair");
   }
   Output out(invocation.text("--output", "-"), invocation.has("--force"));
@@ -161,9 +167,8 @@ const Registration registration{{
                  .kind = ValueKind::file,
                  .value = "FILE",
                  .help = "where to; standard output unless given"},
-                {.names = "--force", .help = "replace an existing file"},
                 {.names = "--eye-size", .help = "end every node with an eye/size pair"},
-                {.names = "--hdr32", .help = "32-bit headers"}},
+                {.names = "--hdr32", .help = "32-bit headers, as with --root 32"}},
     .examples = {{"tav snapshot -o x.tav", "write one"},
                  {"tav snapshot --byte-order big --align -o y.tav", "in another form"},
                  {"tav snapshot | tav tree -", "look at this machine"}},

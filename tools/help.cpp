@@ -71,7 +71,7 @@ std::string helpText()
 
 std::string helpText(const Command& command)
 {
-  std::string text = "usage: tav " + command.name + " [options] " + command.arguments + "\n\n";
+  std::string text = "usage: tav " + command.name + " [options] " + argumentsOf(command) + "\n\n";
   text += command.description.empty() ? command.summary + "\n" : command.description + "\n";
   if (!command.options.empty())
   {

@@ -25,6 +25,10 @@ std::string roff(const std::string& text)
     {
       out += "\\(aq";
     }
+    else if (c == '"')
+    {
+      out += "\\(dq"; // a plain one would hold the arguments of a macro together, and vanish
+    }
     else if (c == '.' && (out.empty() || out.back() == '\n'))
     {
       out += "\\&.";
@@ -69,22 +73,15 @@ std::string optionsText(const std::vector<OptionSpec>& options)
 
 std::string manualPage()
 {
-  std::string text = ".TH TAV 1\n.SH NAME\ntav \\- look into tav streams, whole or damaged\n.SH EXAMPLES\n";
-  for (const Command* command : commands())
-  {
-    for (const Example& example : command->examples)
-    {
-      text += ".TP\n.B " + roff(example.line) + "\n" + roff(example.text) + "\n";
-    }
-  }
-  text +=
+  std::string text =
+      ".TH TAV 1\n.SH NAME\ntav \\- look into tav streams, whole or damaged\n"
       ".SH SYNOPSIS\n.B tav\n.I command\n[options] \\fIFILE\\fR ...\n"
       ".SH DESCRIPTION\nA stream is a tree of nodes in binary form. Nothing in it says how to read it: byte order,\n"
       "header width and padding are recognised, and options override what is recognised.\n"
       "\\- is standard input or output everywhere.\n.SH COMMANDS\n";
   for (const Command* command : commands())
   {
-    text += ".SS tav " + roff(command->name) + " " + roff(command->arguments) + "\n";
+    text += ".SS tav " + roff(command->name) + " " + roff(argumentsOf(*command)) + "\n";
     text += paragraphs(command->description.empty() ? command->summary + "." : command->description);
     text += optionsText(command->options);
   }
@@ -99,7 +96,16 @@ std::string manualPage()
       ".TP\n0\nfine\n.TP\n1\nfindings, differences, or no match\n.TP\n2\nwrong usage, or the system refused something\n"
       ".TP\n3\nthe stream is too damaged to go on\n"
       ".SH ENVIRONMENT\n.TP\nNO_COLOR\nno colours, also on a terminal\n"
-      ".TP\nTMPDIR\nwhere standard input is copied to, so that everything works on it\n";
+      ".TP\nTERM\nno colours when it is dumb\n"
+      ".TP\nTMPDIR\nwhere standard input is copied to, so that everything works on it\n"
+      ".SH EXAMPLES\n";
+  for (const Command* command : commands())
+  {
+    for (const Example& example : command->examples)
+    {
+      text += ".TP\n.B " + roff(example.line) + "\n" + roff(example.text) + "\n";
+    }
+  }
   return text;
 }
 

@@ -1,5 +1,6 @@
 """Exit statuses, standard error, pipes, devices, output files and interrupts."""
 import os
+import shutil
 import signal
 import struct
 import subprocess
@@ -131,7 +132,7 @@ class Behaviour(ToolTest):
         self.assertEqual(tav("print", path, "--trace", trace).status, 0)
         everything = trace.read_text()
         self.assertIn("tavGetNextChild", everything)
-        self.assertEqual(tav("print", path, "--trace", trace, "--trace-probe", "tavReadNodeInt").status, 0)
+        self.assertEqual(tav("print", path, "--trace", trace, "--force", "--trace-probe", "tavReadNodeInt").status, 0)
         filtered = trace.read_text().splitlines()
         self.assertGreater(len(filtered), 0)
         self.assertLess(len(filtered), len(everything.splitlines()))
@@ -153,6 +154,34 @@ class Behaviour(ToolTest):
                 self.assertIn(word, text)
         self.assertEqual(subprocess.run(["bash", "-n"], input=texts[1].encode(), timeout=60).returncode, 0)
         self.assertEqual(tav("completion", "csh").status, 2)
+
+    def test_usage_shows_the_option_that_must_be_given(self):
+        self.assertIn("usage: tav recover [options] FILE -o OUT\n", tav("recover", "--help").out)
+        self.assertIn("tav recover FILE \\-o OUT\n", tav("help", "--man").out)
+        self.assertIn("tav recover FILE -o OUT\n", tav("recover").err)
+
+    def test_a_missing_shell_is_told_with_the_shells_that_there_are(self):
+        result = tav("completion")
+        self.assertEqual((result.status, result.out), (2, ""))
+        for shell in ("bash", "zsh", "fish"):
+            self.assertIn(shell, result.err)
+        self.assertNotIn("standard input", result.err)
+
+    def test_examples_stand_behind_what_they_use_in_the_manual_page(self):
+        titles = [line[4:] for line in tav("help", "--man").out.splitlines() if line.startswith(".SH ")]
+        self.assertEqual(titles[0], "NAME")
+        self.assertGreater(titles.index("EXAMPLES"), titles.index("EXIT STATUS"))
+        self.assertGreater(titles.index("EXAMPLES"), titles.index("OPTIONS OF ALL COMMANDS"))
+
+    @unittest.skipUnless(shutil.which("groff"), "groff is not installed")
+    def test_the_manual_page_keeps_the_quotes_of_examples(self):
+        done = subprocess.run(["groff", "-man", "-Tascii", "-P-cbou", "-rLL=200n"], input=tav("help", "--man").raw,
+                              capture_output=True, timeout=60)
+        self.assertEqual(done.stderr, b"")
+        page = done.stdout.decode()
+        for example in ("""echo '{"system": {"host": {"hostName": "ada"}}}' | tav build -o x.tav""",
+                        """tav json x.tav | jq '.. | objects | select(.element == "hostName") | .value'"""):
+            self.assertIn(example, page)
 
 
 if __name__ == "__main__":
