@@ -251,6 +251,8 @@ const Registration registration{{
         "that\n"
         "have lost all groups around them. The report accounts for every byte: kept + lost + unread is the file's "
         "size.\n"
+        "Where the form is in doubt and something is lost, a second one is tried; the one that keeps more nodes is\n"
+        "taken, and the report says that it is a guess. --byte-order, --root and --align tell the form.\n"
         "Exit status 1: something was lost or repaired; 3: nothing is whole, and no file is written.",
     .options = {{.names = "-o,--output",
                  .kind = ValueKind::file,
