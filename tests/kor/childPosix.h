@@ -45,7 +45,12 @@ public:
   uint32_t result()
   {
     uint32_t code = UINT32_MAX;
-    if (::read(pipe_[0], &code, sizeof code) != sizeof code) code = UINT32_MAX;
+    ssize_t got = 0;
+    do
+    {
+      got = ::read(pipe_[0], &code, sizeof code);
+    } while (got < 0 && errno == EINTR); // some tests interrupt themselves
+    if (got != sizeof code) code = UINT32_MAX;
     ::close(pipe_[0]);
     while (waitpid(process_, nullptr, 0) < 0 && errno == EINTR)
     {}
