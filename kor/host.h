@@ -44,6 +44,16 @@ void prepareStandardStreams();
 /// The program then ends as by the signal itself.
 void removeOnInterrupt(const std::string& path);
 
+/// While one lives an interrupt waits, so that no file is made and not yet known to `removeOnInterrupt`. One at a time.
+class HeldInterrupts
+{
+public:
+  HeldInterrupts();
+  ~HeldInterrupts();
+  HeldInterrupts(const HeldInterrupts&) = delete;
+  HeldInterrupts& operator=(const HeldInterrupts&) = delete;
+};
+
 /// The number of this process, for names of temporary files.
 uint64_t processId();
 

@@ -21,9 +21,16 @@ namespace
 // What a signal's handler may look at. The flag is set last when there is a path and cleared first when there is none.
 char pathToRemove[4096];
 volatile std::sig_atomic_t hasPath = 0;
+volatile std::sig_atomic_t held = 0;
+volatile std::sig_atomic_t waiting = 0; ///< the number of a signal that came while it was held
 
 extern "C" void endBySignal(int number)
 {
+  if (held != 0)
+  {
+    waiting = number;
+    return;
+  }
   if (hasPath != 0) ::unlink(pathToRemove);
   std::signal(number, SIG_DFL);
   std::raise(number);
@@ -127,6 +134,17 @@ void removeOnInterrupt(const std::string& path)
     std::memcpy(pathToRemove, path.c_str(), path.size() + 1);
     hasPath = 1;
   }
+}
+
+HeldInterrupts::HeldInterrupts()
+{
+  held = 1;
+}
+
+HeldInterrupts::~HeldInterrupts()
+{
+  held = 0;
+  if (waiting != 0) endBySignal(waiting);
 }
 
 uint64_t processId()

@@ -51,6 +51,7 @@ PatchFile::PatchFile(Output& out)
 void PatchFile::openOwn()
 {
   own_ = true;
+  const kor::HeldInterrupts held;
   temporary_ = openTemporary(file_);
   // Where an open file can be removed it is gone from now on, however the program ends.
   if (kor::removeFile(temporary_))

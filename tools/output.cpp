@@ -5,6 +5,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <filesystem>
+#include <optional>
 #include <utility>
 
 #include "kor/host.h"
@@ -178,6 +179,11 @@ void Output::openFile(bool)
     KORFileOpenParam param;
     param.pPath = name.c_str();
     param.options = special ? KOR_FILE_WRITE : KOR_FILE_WRITE | KOR_FILE_CREATE | KOR_FILE_EXCLUSIVE;
+    std::optional<kor::HeldInterrupts> held;
+    if (!special) // a pipe may let an open wait for ever
+    {
+      held.emplace();
+    }
     const uint32_t code = file_.open(&param);
     if (code == TAV_RC_OK)
     {

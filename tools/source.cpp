@@ -67,8 +67,12 @@ std::string spool(const std::string& name, const std::string& path)
 {
   PipeReader reader(name, path);
   KORHFile file;
-  std::string temporary = openTemporary(file);
-  kor::removeOnInterrupt(temporary);
+  std::string temporary;
+  {
+    const kor::HeldInterrupts held;
+    temporary = openTemporary(file);
+    kor::removeOnInterrupt(temporary);
+  }
   std::vector<uint8_t> buffer(ByteSource::kLongRead);
   try
   {
