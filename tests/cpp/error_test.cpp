@@ -115,7 +115,8 @@ TEST(LayerErrors, NameTheElementThatCannotBeAdded)
             "adding hostName (60103)" + why);
   EXPECT_EQ(messageOf([&] { root.add<TAV_TYPE_UINT64>(59999, 5); }), "adding element 59999" + why);
   root.add(TAV_ELM_CMN_HOST_NAME, "a");
-  EXPECT_EQ(messageOf([&] { static_cast<void>(root.group(TAV_ELM_CMN_HOST)); }), "opening the group host (60102)" + why);
+  EXPECT_EQ(messageOf([&] { static_cast<void>(root.group(TAV_ELM_CMN_HOST)); }),
+            "opening the group host (60102)" + why);
 }
 
 TEST(LayerErrors, NameThePathThatIsNone)
