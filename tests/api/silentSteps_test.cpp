@@ -120,6 +120,20 @@ TEST(SilentAdd, NeedsTheRingOfAHandleThatIsNotDirect)
   }
 }
 
+TEST(SilentAdd, NeedsTheBlockOfADirectHandle)
+{
+  StreamWriter writer;
+  writer.add(group64(kRoot));
+  uint8_t* const block = std::exchange(writer.handle()->pDirectData, nullptr);
+  for (Element node : {group64(kOther), u32(kOther, 1)})
+  {
+    TAVHeaderData data = node.data();
+    EXPECT_EQ(codeOf([&] { return tavAddElement(0, writer.handle(), &data); }), TAV_RC_NO_MEMORY);
+  }
+  EXPECT_EQ(codeOf([&] { return tavCloseHeader(0, writer.handle()); }), TAV_RC_NO_MEMORY);
+  writer.handle()->pDirectData = block;
+}
+
 TEST(SilentClose, NeedsAHandle)
 {
   EXPECT_EQ(codeOf([] { return tavCloseHeader(0, nullptr); }), TAV_RC_BAD_PARAM);
