@@ -50,8 +50,7 @@ uint32_t patchSize(TAVHandle& handle, const TAVHeader& group)
 
 bool abandonGroup(TraceFrame& frame, TAVHandle& handle, const TAVHeader& group)
 {
-  if (!frame.require(50, isKnownHdrType(group.hdrType), TAV_RC_BAD_HDR_TYPE) ||
-      !frame.step(50, patchSize(handle, group)))
+  if (!frame.step(50, patchSize(handle, group)))
   {
     return false;
   }
@@ -106,17 +105,13 @@ bool closeGroup64(TraceFrame& frame, TAVHandle& handle, TAVHeader& group)
   return frame.step(60, appendEndElement(handle, payload, wide));
 }
 
-bool closeGroup(TraceFrame& frame, TAVHandle& handle, TAVHeader& group)
+bool endGroup(uint64_t options, TraceFrame& frame, TAVHandle& handle, TAVHeader& group)
 {
-  switch (group.hdrType)
+  if (options == kAbandon)
   {
-  case TAV_HDR_32:
-    return closeGroup32(frame, handle, group);
-  case TAV_HDR_64:
-    return closeGroup64(frame, handle, group);
-  default:
-    return frame.fail(50, TAV_RC_BAD_HDR_TYPE);
+    return abandonGroup(frame, handle, group);
   }
+  return is64(group) ? closeGroup64(frame, handle, group) : closeGroup32(frame, handle, group);
 }
 
 [[gnu::noinline]] uint32_t closeTraced(uint64_t options, TAVHandle* handle)
@@ -131,7 +126,8 @@ bool closeGroup(TraceFrame& frame, TAVHandle& handle, TAVHeader& group)
   }
   TAVHeader* const group = openGroup(*handle);
   if (frame.require(40, group != nullptr, TAV_RC_NOT_FOUND) &&
-      (options == kAbandon ? abandonGroup(frame, *handle, *group) : closeGroup(frame, *handle, *group)) &&
+      frame.require(50, isKnownHdrType(group->hdrType), TAV_RC_BAD_HDR_TYPE) &&
+      endGroup(options, frame, *handle, *group) &&
       frame.step(70, handle->pHdrStack->pop()))
   {
     frame.dump(100, handle->streamBytes);
