@@ -36,7 +36,7 @@ struct FileOptions
 namespace detail
 {
 
-/// What messages call a file.
+/// A file's name in UTF-8, as it is opened and as messages show it.
 inline std::string fileText(const std::filesystem::path& path)
 {
   const std::u8string name = path.u8string(); // string() throws where a locale lacks a letter
@@ -56,8 +56,7 @@ inline uint32_t openHandle(TAVSideStorage* storage, uint64_t mode, const StreamO
 
 inline uint32_t openFile(const std::filesystem::path& path, uint64_t options, std::unique_ptr<TAVSideStorage>& storage)
 {
-  const std::u8string utf8 = path.u8string();
-  const std::string name(utf8.begin(), utf8.end());
+  const std::string name = fileText(path);
   KORFileOpenParam param;
   param.pPath = name.c_str();
   param.options = options;
