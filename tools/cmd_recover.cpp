@@ -182,7 +182,7 @@ void copy(PatchFile& from, PatchFile& to)
   }
 }
 
-/// Where another way of reading is not far off, both are gone, and the one that keeps more is taken; of equals the
+/// Where another way of reading is not far off, both are tried, and the one that keeps more is taken; of equals the
 /// likelier one.
 Outcome recoverBest(const Invocation& invocation, Stream& stream, PatchFile& file)
 {
