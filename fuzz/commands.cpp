@@ -8,8 +8,8 @@
 #include <iterator>
 #include <stdexcept>
 
-#include "tools/options.h"
-#include "tools/report.h"
+#include "tools/shell/options.h"
+#include "tools/shell/report.h"
 
 namespace fuzz
 {

@@ -1,8 +1,8 @@
 #include <cstdio>
 #include <exception>
 
-#include "tools/options.h"
-#include "tools/report.h"
+#include "tools/shell/options.h"
+#include "tools/shell/report.h"
 
 int main(int argc, char** argv)
 {

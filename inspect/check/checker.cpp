@@ -1,0 +1,509 @@
+#include "inspect/check/checker.h"
+
+#include <algorithm>
+#include <array>
+#include <utility>
+
+#include "inspect/text/scan.h"
+#include "inspect/text/value.h"
+#include "tools/shell/report.h"
+
+namespace tav::tool
+{
+
+using namespace tav::layout;
+
+namespace
+{
+
+constexpr uint64_t kMostZeros = uint64_t{2} * 1024 * 1024; ///< two of the largest pages that a file is written in
+constexpr uint64_t kMostNested = 4000;                     ///< groups that the library can have open at a time
+
+bool sizeSuits(const TAVHeader& header)
+{
+  const uint64_t size = sizeOf(header);
+  switch (typeOf(header))
+  {
+  case TAV_TYPE_UTF8_STRING: return size >= 2;
+  case TAV_TYPE_UINT64_ARRAY: return size % 8 == 0;
+  case TAV_TYPE_UINT128:
+  case TAV_TYPE_SINT128: return size == 16;
+  default:
+    return typeInfo(typeOf(header)).valueSize == 0 || typeInfo(typeOf(header)).valueSize == size;
+  }
+}
+
+bool isDataType(const TAVHeader& header)
+{
+  return !isGroup(header) && typeInfo(typeOf(header)).known;
+}
+
+std::string sizeSentence(const TAVHeader& header)
+{
+  return "has " + counted(sizeOf(header), "byte") + ", which does not suit its type, " + typeText(typeOf(header));
+}
+
+std::string endsPast(uint64_t by, const char* what)
+{
+  return "ends " + counted(by, "byte") + " past " + what;
+}
+
+} // namespace
+
+Checker::Checker(ByteSource& source, const Form& form, std::function<bool(RuleId)> wanted, Sink sink)
+    : source_(source), form_(form), wanted_(std::move(wanted)), sink_(std::move(sink)), walker_(source, form)
+{
+  Group file;
+  file.wide = form.root64;
+  groups_.push_back(file);
+}
+
+void Checker::found(RuleId rule, uint64_t offset, uint64_t length, std::string sentence)
+{
+  if (wanted_(rule))
+  {
+    // So deep, a path is longer than anyone reads; the offset tells the place.
+    sink_(
+        {rule, offset, length, event_.depth > kMostNested ? std::string() : walker_.path(event_), std::move(sentence)});
+  }
+}
+
+bool Checker::step()
+{
+  if (!walker_.next(event_))
+  {
+    return false;
+  }
+  switch (event_.what)
+  {
+  case What::nodeBegin: beginNode(); break;
+  case What::payload: checkText(); break;
+  case What::extra:
+    found(RuleId::stringExtra, event_.offset, event_.length, "two bytes stand behind this string that no size counts");
+    break;
+  case What::padding: checkPadding(); break;
+  case What::pair:
+  {
+    const uint16_t type = event_.node.type();
+    const bool byString = type == TAV_TYPE_ASCII_STRING || event_.node.has(kExtra);
+    checkPair(event_.offset, dataDistance(event_.node.size()), byString);
+    break;
+  }
+  case What::nodeEnd: event_.node.isGroup() ? endGroup() : endNode(); break;
+  case What::damaged:
+    placeIsTaken(event_.offset);
+    checkDamage();
+    groups_.back().damagedTail = true;
+    break;
+  case What::zeros: checkZeros(); break;
+  default: break;
+  }
+  return true;
+}
+
+uint64_t Checker::paddedSize(const Node& node) const
+{
+  uint64_t size = node.size();
+  if (form_.aligned || (node.info() & TAV_INFO_ALIGNED8) != 0)
+  {
+    roundUp8Checked(size);
+  }
+  return size;
+}
+
+void Checker::placeIsTaken(uint64_t offset)
+{
+  Group& group = groups_.back();
+  if (group.ended && group.afterEnd == 0)
+  {
+    group.afterEnd = offset;
+    found(RuleId::afterEnd, offset, 0, "stands behind the end element of the group around it");
+  }
+}
+
+void Checker::beginNode()
+{
+  ++nodes_;
+  placeIsTaken(event_.offset);
+  groups_.back().damagedTail = false;
+  paddingCut_ = 0;
+  checkHeader();
+  if (event_.node.isGroup())
+  {
+    beginGroup();
+  }
+  else if (event_.node.elm() == TAV_ELM_CMN_END_HDR_EYE_SIZE)
+  {
+    checkEndElement();
+  }
+}
+
+void Checker::checkHeader()
+{
+  const Node& node = event_.node;
+  const uint64_t offset = node.offset();
+  const uint64_t length = node.headerLength();
+  if (node.has(kBadGroupType))
+  {
+    found(RuleId::groupType, offset, length, "a group with a 32-bit header announces children with 64-bit headers");
+  }
+  if (node.depth == 0 && !node.isGroup())
+  {
+    found(RuleId::rootNoGroup, offset, length, "a data element outside any group");
+  }
+  if (!Prober::isNamed(node.elm()))
+  {
+    found(RuleId::elementUnknown, offset, length,
+          "element " + std::to_string(node.elm()) + " is not in the dictionary");
+  }
+  if (!node.isGroup() && !isDataType(node.header))
+  {
+    found(RuleId::typeUnknown, offset, length, "type " + std::to_string(node.type()) + " is unknown");
+  }
+  else if (!node.isGroup() && !sizeSuits(node.header))
+  {
+    found(RuleId::sizeType, offset, length, sizeSentence(node.header));
+  }
+  if (node.is64() && ((node.info() & TAV_INFO_ALIGNED8) != 0) != form_.aligned)
+  {
+    found(RuleId::alignFlag, offset, length,
+          form_.aligned ? "does not announce padding, in a stream that is padded"
+                        : "announces padding, in a stream that is not padded");
+  }
+  if (node.isGroup() && node.depth >= kMostNested && !deepTold_)
+  {
+    deepTold_ = true;
+    found(RuleId::tooDeep, offset, length,
+          "lies in " + counted(node.depth, "group") + "; the library can follow 3,999");
+  }
+}
+
+void Checker::beginGroup()
+{
+  const Node& node = event_.node;
+  Group group;
+  group.node = node;
+  group.wide = hasChildren64(node.header);
+  group.cutClaim = groups_.back().cutClaim;
+  if (!node.has(kOpen))
+  {
+    group.claimedEnd = addSaturated(node.payloadOffset(), node.size());
+    if (node.has(kOverrun) && node.limit == source_.size())
+    {
+      group.cutClaim = group.claimedEnd;
+    }
+  }
+  groups_.push_back(std::move(group));
+}
+
+void Checker::checkEndElement()
+{
+  const Node& node = event_.node;
+  const bool infoFits = !node.is64() || (node.info() & ~TAV_INFO_ALIGNED8) == 0;
+  if (node.type() != TAV_TYPE_BINARY || node.size() != kEyeSizeLength || !infoFits)
+  {
+    found(RuleId::endForm, node.offset(), node.headerLength(),
+          "an end element of " + counted(node.size(), "byte") + ", type " + std::to_string(node.type()) + ", info " +
+              hexOffset(node.info()) + " instead of 16 bytes, type 101, info 0");
+    return;
+  }
+  if (groups_.size() > 1)
+  {
+    const uint64_t before = node.offset() - groups_.back().node.payloadOffset();
+    checkPair(node.payloadOffset(), groupDistance(before, node.is64()), false);
+  }
+}
+
+void Checker::checkPair(uint64_t offset, uint64_t expected, bool eitherOrder)
+{
+  EyeSizeBytes bytes{};
+  if (source_.read(offset, bytes) != bytes.size())
+  {
+    return;
+  }
+  EyeSize pair = decodeEyeSize(bytes, form_.swapped);
+  const EyeSize other = decodeEyeSize(bytes, !form_.swapped);
+  if (pair.eye != TAV_EYE_CATCHER && other.eye == TAV_EYE_CATCHER)
+  {
+    if (!eitherOrder)
+    {
+      found(RuleId::pairOrder, offset, kEyeSizeLength, "the eye/size pair is in the other byte order");
+      return;
+    }
+    pair = other;
+  }
+  if (pair.eye != TAV_EYE_CATCHER)
+  {
+    found(RuleId::eyeDamaged, offset, kEyeSizeLength, "the eye catcher is damaged: " + hexOffset(pair.eye));
+  }
+  else if (pair.distance != expected)
+  {
+    found(RuleId::pairDistance, offset, kEyeSizeLength,
+          "the distance of the eye/size pair is " + std::to_string(pair.distance) + " instead of " +
+              std::to_string(expected));
+  }
+}
+
+void Checker::checkText()
+{
+  const Node& node = event_.node;
+  const bool utf8 = node.type() == TAV_TYPE_UTF8_STRING;
+  const bool asked = wanted_(RuleId::utf8Invalid) || wanted_(RuleId::stringNul) || wanted_(RuleId::stringHigh);
+  if (!asked || (!utf8 && node.type() != TAV_TYPE_ASCII_STRING))
+  {
+    return;
+  }
+  const uint64_t end = event_.offset + event_.length;
+  TextScan scan(event_.offset + (utf8 ? std::min<uint64_t>(2, event_.length) : 0));
+  while (scan.position() < end)
+  {
+    const auto bytes = source_.view(scan.position());
+    if (bytes.empty())
+    {
+      return;
+    }
+    scan.take(bytes.first(static_cast<size_t>(std::min<uint64_t>(bytes.size(), end - scan.position()))));
+  }
+  scan.finish();
+  if (utf8 && scan.invalid() != TextScan::kNowhere)
+  {
+    found(RuleId::utf8Invalid, scan.invalid(), 0, "the string holds bytes that are no UTF-8");
+  }
+  if (scan.nul() != TextScan::kNowhere)
+  {
+    found(RuleId::stringNul, scan.nul(), 1, "the string holds a NUL");
+  }
+  if (!utf8 && scan.high() != TextScan::kNowhere)
+  {
+    found(RuleId::stringHigh, scan.high(), 1, "the ASCII string holds a character beyond 127");
+  }
+}
+
+void Checker::checkPadding()
+{
+  std::array<uint8_t, 8> bytes{};
+  const size_t got =
+      source_.read(event_.offset, std::span(bytes).first(static_cast<size_t>(std::min<uint64_t>(8, event_.length))));
+  if (std::any_of(bytes.begin(), bytes.begin() + static_cast<ptrdiff_t>(got), [](uint8_t byte) { return byte != 0; }))
+  {
+    found(RuleId::paddingDirty, event_.offset, event_.length, "the padding is not zero");
+  }
+}
+
+void Checker::endNode()
+{
+  const Node& node = event_.node;
+  checkDataEnd();
+  checkClaim(event_.offset, true);
+  if (groups_.size() > 1 && isEndElement(node.elm()))
+  {
+    groups_.back().ended = true;
+  }
+}
+
+void Checker::checkDataEnd()
+{
+  const Node& node = event_.node;
+  const bool announced = node.is64() && hasEyeSize(node.header);
+  const uint64_t end = event_.offset - (announced && !node.has(kNoPair) ? kEyeSizeLength : 0);
+  const uint64_t extra = node.has(kExtra) ? 2 : 0;
+  const uint64_t padded = addSaturated(node.payloadOffset() + extra, paddedSize(node));
+  if (end < padded)
+  {
+    paddingCut_ = end == source_.size() ? padded - end : 0;
+    found(RuleId::paddingMissing, node.payloadOffset() + node.size() + extra, 0,
+          counted(padded - end, "byte") + " of padding " + (padded - end == 1 ? "is" : "are") + " not there");
+  }
+  if (node.has(kNoPair))
+  {
+    found(RuleId::pairMissing, event_.offset, 0, "announces an eye/size pair, but none is there");
+  }
+}
+
+void Checker::checkClaim(uint64_t offset, bool boundary)
+{
+  Group& group = groups_.back();
+  if (group.lastClaim == 0 || (boundary && offset < group.lastClaim))
+  {
+    return;
+  }
+  const bool exact = offset == group.lastClaim;
+  const RuleId rule = exact ? RuleId::afterEnd : RuleId::groupSize;
+  if (wanted_(rule))
+  {
+    const std::string sentence = exact ? "stands behind the end element of this group, but inside its size"
+                                       : "says that it ends at " + hexOffset(group.lastClaim) +
+                                             ", but its end element ends at " + hexOffset(group.lastClaimEnd);
+    sink_({rule, exact ? group.lastClaimEnd : group.lastClaimer, 0, group.lastClaimPath, sentence});
+  }
+  group.lastClaim = 0;
+}
+
+void Checker::endGroup()
+{
+  checkClaim(event_.offset, false);
+  Group group = std::move(groups_.back());
+  groups_.pop_back();
+  const Node& node = event_.node;
+  if (node.has(kOverrun))
+  {
+    checkOverrun(group);
+  }
+  else if (node.has(kOpen) && event_.end != End::byEndElement)
+  {
+    const bool empty = node.size() == 0 && event_.offset == node.payloadOffset(); // sound when it was closed at once
+    if (!empty)
+    {
+      tellOpen();
+    }
+  }
+  else if (node.has(kOpen) && isSizeUnknown(node.header))
+  {
+    found(RuleId::sizeUnknown, node.offset(), node.headerLength(), "its size is all ones; its end element ends it");
+  }
+  else if (node.has(kOpen))
+  {
+    found(RuleId::groupSize, node.offset(), node.headerLength(),
+          "its size is 0, but its end element ends at " + hexOffset(event_.offset));
+  }
+  else if (hasEyeSize(node.header) && !group.ended && !group.damagedTail)
+  {
+    found(RuleId::endMissing, node.offset(), node.headerLength(), "announces an eye/size pair, but has no end element");
+  }
+  if (node.has(kWrongSize))
+  {
+    Group& parent = groups_.back();
+    parent.lastClaim = group.claimedEnd;
+    parent.lastClaimer = node.offset();
+    parent.lastClaimEnd = event_.offset;
+    parent.lastClaimPath = walker_.path(event_);
+  }
+  else
+  {
+    checkClaim(event_.offset, true);
+  }
+  if (groups_.size() == 1)
+  {
+    rootEnded_ = true;
+    deepTold_ = false;
+  }
+}
+
+void Checker::tellOpen()
+{
+  found(RuleId::groupOpen, event_.node.offset(), event_.node.headerLength(), "was never closed");
+}
+
+void Checker::checkOverrun(const Group& group)
+{
+  const Node& node = group.node;
+  const uint64_t around = groups_.back().cutClaim;
+  if (event_.end == End::byEndElement)
+  {
+    found(RuleId::groupSize, node.offset(), node.headerLength(),
+          "says that it ends at " + hexOffset(group.claimedEnd) + ", but its end element ends at " +
+              hexOffset(event_.offset));
+  }
+  else if (node.limit < source_.size())
+  {
+    found(RuleId::pastParent, node.offset(), node.headerLength(),
+          endsPast(group.claimedEnd - node.limit, "its parent"));
+  }
+  else if (around != kNoOffset)
+  {
+    if (group.claimedEnd > around)
+    {
+      found(RuleId::pastParent, node.offset(), node.headerLength(), endsPast(group.claimedEnd - around, "its parent"));
+    }
+  }
+  else if (group.claimedEnd - source_.size() != paddingCut_)
+  {
+    found(RuleId::pastFile, node.offset(), node.headerLength(),
+          endsPast(group.claimedEnd - source_.size(), "the end of the file"));
+  }
+}
+
+bool Checker::checkCutHeader()
+{
+  const Group& group = groups_.back();
+  const uint64_t end = event_.offset + event_.length;
+  const uint64_t needed = group.wide ? kHeaderSize64 : kHeaderSize32;
+  if (event_.code != TAV_RC_NO_MEMORY)
+  {
+    return false;
+  }
+  if (groups_.size() > 1 && end < source_.size())
+  {
+    const Event here = std::exchange(event_, Event{});
+    event_.node = group.node;
+    event_.depth = group.node.depth;
+    found(RuleId::groupSize, group.node.offset(), group.node.headerLength(),
+          "its children end " + counted(here.length, "byte") + " before it does");
+    event_ = here;
+    return true;
+  }
+  found(RuleId::headerCut, event_.offset, event_.length,
+        "the file ends after " + std::to_string(event_.length) + " of the " + std::to_string(needed) +
+            " bytes of a header");
+  return true;
+}
+
+void Checker::checkDamage()
+{
+  const Group& group = groups_.back();
+  if (groups_.size() == 1 && rootEnded_)
+  {
+    found(RuleId::behindStream, event_.offset, event_.length,
+          counted(event_.length, "byte") + " behind the stream that are not zeros");
+    return;
+  }
+  if (checkCutHeader())
+  {
+    return;
+  }
+  const uint64_t limit = groups_.size() > 1 ? group.node.limit : source_.size();
+  std::array<uint8_t, kHeaderSize64> bytes{};
+  const size_t length = group.wide ? kHeaderSize64 : kHeaderSize32;
+  TAVHeader header{};
+  if (source_.read(event_.offset, std::span(bytes).first(length)) == length)
+  {
+    decodeHeader(bytes.data(), group.wide, form_.swapped, header);
+  }
+  const uint64_t claim = addSaturated(event_.offset + length, sizeOf(header));
+  const bool named = sizeOf(header) + typeOf(header) != 0 && Prober::isNamed(elmOf(header));
+  const bool known = isGroup(header) || isDataType(header);
+  if (named && known && !isSizeUnknown(header) && claim > limit)
+  {
+    const bool cut =
+        event_.offset + event_.length == source_.size() && group.cutClaim != kNoOffset && claim <= group.cutClaim;
+    if (!cut)
+    {
+      const bool file = limit == source_.size();
+      found(file ? RuleId::pastFile : RuleId::pastParent, event_.offset, event_.length,
+            endsPast(claim - limit, file ? "the end of the file" : "its parent"));
+    }
+  }
+  else if (named && !known)
+  {
+    found(RuleId::typeUnknown, event_.offset, event_.length, "type " + std::to_string(typeOf(header)) + " is unknown");
+  }
+  else if (named && isDataType(header) && !sizeSuits(header))
+  {
+    found(RuleId::sizeType, event_.offset, event_.length, sizeSentence(header));
+  }
+  else
+  {
+    found(RuleId::damaged, event_.offset, event_.length, counted(event_.length, "byte") + " damaged: " + event_.reason);
+  }
+}
+
+void Checker::checkZeros()
+{
+  if (event_.length > kMostZeros)
+  {
+    found(RuleId::zerosLong, event_.offset, event_.length,
+          byteText(event_.length) + " of zeros behind the stream; a writer leaves 2 MiB at most");
+  }
+}
+
+} // namespace tav::tool

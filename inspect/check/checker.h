@@ -1,0 +1,90 @@
+/// @file checker.h
+/// Follows a walk and tells what is wrong.
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <string>
+#include <vector>
+
+#include "inspect/check/rules.h"
+#include "inspect/walk/walker.h"
+
+namespace tav::tool
+{
+
+struct Finding
+{
+  RuleId rule = RuleId::damaged;
+  uint64_t offset = 0;
+  uint64_t length = 0; ///< bytes concerned; 0: no run of bytes is meant
+  std::string path{};
+  std::string sentence{}; ///< starts with a lower-case letter, no full stop
+};
+
+/// Walks a stream once, in memory that grows with the depth alone. Findings come in the order in which they are
+/// certain: what is known of a group only at its end comes there.
+class Checker
+{
+public:
+  using Sink = std::function<void(const Finding&)>;
+
+  /// `wanted` tells which rules to look for: payloads are read only for rules about strings.
+  Checker(ByteSource& source, const Form& form, std::function<bool(RuleId)> wanted, Sink sink);
+
+  /// Goes on by one piece of the file; false at its end.
+  bool step();
+
+  uint64_t position() const { return event_.offset + event_.length; }
+  uint64_t nodes() const { return nodes_; }
+
+private:
+  struct Group
+  {
+    Node node{};
+    uint64_t claimedEnd = kNoOffset; ///< where it says that it ends; kNoOffset: it does not say
+    uint64_t cutClaim = kNoOffset;   ///< the claim of the innermost group from here up that the file's end cut
+    uint64_t afterEnd = 0;           ///< the first thing behind its end element
+    uint64_t lastClaim = 0;          ///< of a child that its end element ended before its size was used up
+    uint64_t lastClaimer = 0;        ///< where that child begins
+    uint64_t lastClaimEnd = 0;       ///< and where it ended
+    std::string lastClaimPath{};
+    bool wide = false;
+    bool ended = false;       ///< its end element was seen
+    bool damagedTail = false; ///< damage since the last child
+  };
+
+  void found(RuleId rule, uint64_t offset, uint64_t length, std::string sentence);
+  void beginNode();
+  void beginGroup();
+  void endNode();
+  void endGroup();
+  void checkHeader();
+  void tellOpen();
+  void checkOverrun(const Group& group);
+  void checkEndElement();
+  void checkDataEnd();
+  void checkPair(uint64_t offset, uint64_t expected, bool eitherOrder);
+  void checkText();
+  void checkClaim(uint64_t offset, bool boundary);
+  void checkPadding();
+  void checkDamage();
+  bool checkCutHeader();
+  void checkZeros();
+  void placeIsTaken(uint64_t offset);
+  uint64_t paddedSize(const Node& node) const;
+
+  ByteSource& source_;
+  Form form_;
+  std::function<bool(RuleId)> wanted_;
+  Sink sink_;
+  Walker walker_;
+  Event event_{};
+  std::vector<Group> groups_{}; ///< the first stands for the file
+  uint64_t nodes_ = 0;
+  uint64_t paddingCut_ = 0; ///< bytes of padding that the last data element lacks at the end of the file
+  bool rootEnded_ = false;
+  bool deepTold_ = false;
+};
+
+} // namespace tav::tool

@@ -1,0 +1,394 @@
+#include "inspect/json/reader.h"
+
+#include <algorithm>
+#include <utility>
+
+#include "inspect/path/path.h"
+#include "inspect/text/value.h"
+#include "tools/shell/report.h"
+
+namespace tav::tool
+{
+
+uint16_t elementNamed(std::string_view name)
+{
+  const std::vector<uint16_t> ids = idsOf(name);
+  if (ids.size() == 1)
+  {
+    return ids.front();
+  }
+  if (!ids.empty())
+  {
+    std::string list;
+    for (const uint16_t id : ids)
+    {
+      list += (list.empty() ? "#" : ", #") + std::to_string(id);
+    }
+    throw BuildError("several elements have the name " + tool::quoted(name) + ": " + list);
+  }
+  const std::string similar = similarNames(name);
+  throw BuildError("no element has the name " + tool::quoted(name) +
+                   (similar.empty() ? "" : "; did you mean " + similar + "?"));
+}
+
+void DocumentReader::fail(const std::string& sentence) const
+{
+  Problem problem;
+  problem.file = source_.name() + ": line " + std::to_string(source_.line()) + ", byte " +
+                 std::to_string(source_.position());
+  problem.path = pointer();
+  problem.sentence = sentence;
+  throw Failure(kTrouble, problem);
+}
+
+std::string DocumentReader::pointer() const
+{
+  std::string text;
+  for (const Level& level : levels_)
+  {
+    const bool array = level.where == Where::nodes || level.where == Where::repeated || level.where == Where::pieces ||
+                       level.where == Where::bytes;
+    if (!array && level.key.empty())
+    {
+      continue;
+    }
+    text += '/';
+    for (const char c : array ? std::to_string(level.index) : level.key)
+    {
+      text += c == '~' ? "~0" : c == '/' ? "~1"
+                                         : std::string(1, c);
+    }
+  }
+  // A key is any text; what steers terminals is written as escapes.
+  const std::string safe = tool::quoted(text);
+  return safe.substr(1, safe.size() - 2);
+}
+
+void DocumentReader::read()
+{
+  std::istream stream(&source_);
+  try
+  {
+    while (source_.skipBlanks())
+    {
+      if (started_ && !lines_)
+      {
+        fail("there is more behind the document");
+      }
+      started_ = true;
+      nlohmann::json::sax_parse(stream, this, nlohmann::json::input_format_t::json, false);
+    }
+    if (!started_)
+    {
+      fail("the document is empty");
+    }
+    beginNodes();
+    closeTo(0);
+  }
+  catch (const BuildError& error)
+  {
+    fail(error.what());
+  }
+}
+
+bool DocumentReader::parse_error(size_t, const std::string&, const nlohmann::detail::exception& error)
+{
+  std::string_view what = error.what();
+  const size_t colon = what.find(": ");
+  what.remove_prefix(colon == std::string_view::npos ? 0 : colon + 2);
+  fail("no JSON: " + std::string(what));
+}
+
+void DocumentReader::push(Where where)
+{
+  Level level;
+  level.where = where;
+  levels_.push_back(std::move(level));
+}
+
+void DocumentReader::beginNodes()
+{
+  if (!std::exchange(formSet_, true))
+  {
+    encoder_.setForm(form_);
+  }
+}
+
+bool DocumentReader::start_object(size_t)
+{
+  if (levels_.empty())
+  {
+    push(lines_ ? Where::node : Where::document);
+    draft_ = Draft();
+    return true;
+  }
+  Level& level = top();
+  switch (level.where)
+  {
+  case Where::document: startForm(); break;
+  case Where::nodes:
+    draft_ = Draft();
+    push(Where::node);
+    break;
+  case Where::node: startObjectProperty(level.key); break;
+  case Where::shortNode:
+    level.key.starts_with('$') ? startObjectProperty(level.key.substr(1)) : push(Where::shortNode);
+    break;
+  case Where::shortList: push(Where::shortNode); break;
+  case Where::repeated:
+    startChild(level.elm);
+    push(Where::shortNode);
+    break;
+  default: fail("an object cannot stand here");
+  }
+  return true;
+}
+
+void DocumentReader::startForm()
+{
+  const std::string name = top().key;
+  if (name == "nodes")
+  {
+    beginNodes();
+    top().given = true;
+    push(Where::shortList);
+    return;
+  }
+  if (name != "form")
+  {
+    fail("an object cannot stand here");
+  }
+  if (formSet_)
+  {
+    fail("the form must stand before the nodes");
+  }
+  push(Where::form);
+}
+
+bool DocumentReader::key(std::string& name)
+{
+  top().key = name;
+  switch (top().where)
+  {
+  case Where::document: documentKey(name); break;
+  case Where::shortNode:
+    if (!name.starts_with('$'))
+    {
+      if (!top().begun)
+      {
+        beginGroup(top());
+      }
+      startChild(elementNamed(name));
+    }
+    break;
+  case Where::shortList: startChild(elementNamed(name)); break;
+  default: break;
+  }
+  return true;
+}
+
+void DocumentReader::documentKey(const std::string& name)
+{
+  static constexpr std::string_view known[] = {"tav", "form", "lines", "nodes"};
+  if (std::find(std::begin(known), std::end(known), name) == std::end(known))
+  {
+    if (formSet_ || lines_ || top().given)
+    {
+      fail("the key " + tool::quoted(name) + " is not known here");
+    }
+    // Without an envelope, every key is an element.
+    beginNodes();
+    top().where = Where::shortList;
+    startChild(elementNamed(name));
+  }
+}
+
+void DocumentReader::startChild(uint16_t elm)
+{
+  draft_ = Draft();
+  draft_.properties.elm = elm;
+}
+
+bool DocumentReader::end_object()
+{
+  const Level level = top();
+  switch (level.where)
+  {
+  case Where::node:
+  case Where::shortNode:
+    top().key.clear();
+    endNode(level);
+    break;
+  case Where::date:
+    draft_.value.assign(reinterpret_cast<const char*>(&date_), sizeof date_);
+    break;
+  default: break;
+  }
+  close();
+  return true;
+}
+
+/// Leaves a level; what comes next in the one around it is its next item.
+void DocumentReader::close()
+{
+  levels_.pop_back();
+  if (!levels_.empty())
+  {
+    ++top().index;
+  }
+}
+
+void DocumentReader::beginGroup(Level& level)
+{
+  if (draft_.given != Given::nothing)
+  {
+    throw BuildError("a node has either a value or children");
+  }
+  if (draft_.properties.type && !layout::isGroupType(*draft_.properties.type))
+  {
+    throw BuildError(typeText(*draft_.properties.type) + " has no children");
+  }
+  encoder_.beginGroup(draft_.properties);
+  level.begun = true;
+}
+
+void DocumentReader::endNode(const Level& level)
+{
+  if (level.begun)
+  {
+    encoder_.endGroup();
+    return;
+  }
+  if (lines_ && levels_.size() == 1)
+  {
+    endLine();
+    return;
+  }
+  const bool group =
+      draft_.properties.type ? layout::isGroupType(*draft_.properties.type) : level.where == Where::shortNode;
+  if (group && draft_.given == Given::nothing)
+  {
+    beginGroup(top());
+    encoder_.endGroup();
+    return;
+  }
+  encoder_.finish(draft_);
+}
+
+void DocumentReader::endLine()
+{
+  if (!draft_.begun)
+  {
+    closeTo(draft_.depth.value_or(0));
+  }
+  if (draft_.properties.type && layout::isGroupType(*draft_.properties.type) && draft_.given == Given::nothing)
+  {
+    draft_.properties.endElement = false; // every node has a line of its own
+    encoder_.beginGroup(draft_.properties);
+    return;
+  }
+  encoder_.finish(draft_);
+}
+
+void DocumentReader::closeTo(uint64_t depth)
+{
+  if (depth > encoder_.depth())
+  {
+    throw BuildError("depth " + std::to_string(depth) + " is more than one below the line before");
+  }
+  while (encoder_.depth() > depth)
+  {
+    encoder_.endGroup();
+  }
+}
+
+bool DocumentReader::start_array(size_t)
+{
+  if (levels_.empty() && !lines_)
+  {
+    beginNodes();
+    push(Where::nodes);
+    return true;
+  }
+  if (levels_.empty())
+  {
+    fail("an array cannot stand here");
+  }
+  Level& level = top();
+  switch (level.where)
+  {
+  case Where::document:
+    if (level.key != "nodes" || level.given)
+    {
+      fail("an array cannot stand here");
+    }
+    beginNodes();
+    level.given = true;
+    push(Where::nodes);
+    break;
+  case Where::node: startArrayProperty(level.key); break;
+  case Where::shortNode:
+  case Where::shortList:
+    if (level.key.starts_with('$'))
+    {
+      startArrayProperty(level.key.substr(1));
+      break;
+    }
+    push(Where::repeated);
+    top().elm = *draft_.properties.elm;
+    break;
+  default: fail("an array cannot stand here");
+  }
+  return true;
+}
+
+bool DocumentReader::end_array()
+{
+  close();
+  return true;
+}
+
+void DocumentReader::startObjectProperty(const std::string& name)
+{
+  if (name == "children" && !top().begun)
+  {
+    beginGroup(top());
+    push(Where::shortList);
+    return;
+  }
+  if (name != "value")
+  {
+    fail("an object cannot stand here");
+  }
+  setGiven(Given::date);
+  date_ = {};
+  push(Where::date);
+}
+
+void DocumentReader::startArrayProperty(const std::string& name)
+{
+  if (name == "children" && !top().begun)
+  {
+    beginGroup(top());
+    push(Where::nodes);
+    return;
+  }
+  const bool bytes = name == "bytes" || name == "damaged" || name == "unread";
+  if (name != "value" && !bytes)
+  {
+    fail("an array cannot stand here");
+  }
+  if (name == "value")
+  {
+    const bool numbers = draft_.properties.type == TAV_TYPE_UINT64_ARRAY;
+    setGiven(numbers ? Given::array : Given::nothing);
+  }
+  else
+  {
+    setGiven(name == "bytes" ? Given::bytes : name == "damaged" ? Given::damaged
+                                                                : Given::unread);
+  }
+  push(bytes ? Where::bytes : Where::pieces);
+}
+
+} // namespace tav::tool

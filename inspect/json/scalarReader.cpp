@@ -1,0 +1,459 @@
+// The single values of a JSON document: properties, values, and the pieces of long ones.
+#include <algorithm>
+#include <cerrno>
+#include <charconv>
+#include <cstring>
+#include <utility>
+
+#include "inspect/json/reader.h"
+#include "inspect/json/text.h"
+#include "inspect/text/value.h"
+#include "kor/host.h"
+#include "tools/shell/report.h"
+
+namespace tav::tool
+{
+
+namespace
+{
+
+constexpr size_t kLong = size_t{1024} * 1024; ///< bytes of a value that are kept before they are written
+constexpr size_t kBuffer = size_t{64} * 1024;
+
+template<class Number>
+Number wholeNumber(const std::string& name, const Scalar& value)
+{
+  Number number{};
+  const char* const end = value.text.data() + value.text.size();
+  const bool given = value.kind == Scalar::Kind::integer || value.kind == Scalar::Kind::text;
+  const bool hex = value.text.starts_with("0x");
+  const auto result = std::from_chars(value.text.data() + (hex ? 2 : 0), end, number, hex ? 16 : 10);
+  if (!given || result.ec != std::errc() || result.ptr != end)
+  {
+    throw BuildError(name + ": " + (value.kind == Scalar::Kind::null ? "null" : tool::quoted(value.text)) +
+                     " is no number that fits");
+  }
+  return number;
+}
+
+bool truth(const std::string& name, const Scalar& value)
+{
+  if (value.kind != Scalar::Kind::truth)
+  {
+    throw BuildError(name + " is true or false");
+  }
+  return value.text == "1";
+}
+
+std::string hexBytes(const std::string& name, const Scalar& value)
+{
+  std::string bytes;
+  if (value.kind != Scalar::Kind::text || !appendHexBytes(bytes, value.text))
+  {
+    throw BuildError(name + ": bytes are given in hexadecimal, as \"00ff\"");
+  }
+  return bytes;
+}
+
+const std::string& textOf(const std::string& name, const Scalar& value)
+{
+  if (value.kind != Scalar::Kind::text)
+  {
+    throw BuildError(name + " is a text");
+  }
+  return value.text;
+}
+
+bool widthOf(const std::string& name, const Scalar& value)
+{
+  if (value.kind != Scalar::Kind::integer || (value.text != "32" && value.text != "64"))
+  {
+    throw BuildError(name + " is 32 or 64");
+  }
+  return value.text == "64";
+}
+
+} // namespace
+
+bool DocumentReader::null()
+{
+  scalar({});
+  return true;
+}
+
+bool DocumentReader::boolean(bool value)
+{
+  scalar({Scalar::Kind::truth, value ? "1" : "0"});
+  return true;
+}
+
+bool DocumentReader::number_integer(int64_t value)
+{
+  scalar({Scalar::Kind::integer, std::to_string(value)});
+  return true;
+}
+
+bool DocumentReader::number_unsigned(uint64_t value)
+{
+  scalar({Scalar::Kind::integer, std::to_string(value)});
+  return true;
+}
+
+bool DocumentReader::number_float(double, const std::string& text)
+{
+  // Whole numbers of more than 64 bits come here, too.
+  const bool whole = text.find_first_of(".eE") == std::string::npos;
+  scalar({whole ? Scalar::Kind::integer : Scalar::Kind::fraction, text});
+  return true;
+}
+
+bool DocumentReader::string(std::string& value)
+{
+  scalar({Scalar::Kind::text, std::move(value)});
+  return true;
+}
+
+bool DocumentReader::binary(binary_t&)
+{
+  return false; // no part of JSON texts
+}
+
+void DocumentReader::scalar(const Scalar& value)
+{
+  if (levels_.empty())
+  {
+    fail("the document is an object or an array");
+  }
+  scalarIn(top(), value);
+  ++top().index;
+}
+
+void DocumentReader::scalarIn(Level& level, const Scalar& value)
+{
+  switch (level.where)
+  {
+  case Where::document: documentValue(level.key, value); return;
+  case Where::form: formValue(level.key, value); return;
+  case Where::node: property(level.key, value); return;
+  case Where::shortNode:
+    level.key.starts_with('$') ? property(level.key.substr(1), value) : shortValue(value);
+    return;
+  case Where::shortList: shortValue(value); return;
+  case Where::repeated:
+    startChild(level.elm);
+    shortValue(value);
+    return;
+  case Where::pieces: givePiece(value); return;
+  case Where::bytes: giveBytes(value); return;
+  case Where::date: dateField(level.key, value); return;
+  case Where::nodes: fail("a node is an object");
+  }
+}
+
+void DocumentReader::shortValue(const Scalar& value)
+{
+  giveValue(value);
+  encoder_.finish(draft_);
+}
+
+void DocumentReader::documentValue(const std::string& name, const Scalar& value)
+{
+  if (name == "tav" && (value.kind != Scalar::Kind::integer || value.text != std::to_string(kJsonVersion)))
+  {
+    fail("this document is of another version: tav is " + tool::quoted(value.text) + ", not 1");
+  }
+  if (name == "lines")
+  {
+    lines_ = truth(name, value);
+    beginNodes();
+  }
+  else if (name != "tav")
+  {
+    fail(name + " is " + (name == "form" ? "an object" : "an array of nodes"));
+  }
+}
+
+void DocumentReader::formValue(const std::string& name, const Scalar& value)
+{
+  if (name == "byteOrder")
+  {
+    const std::string& order = textOf(name, value);
+    if (order != "little" && order != "big")
+    {
+      throw BuildError("byteOrder is little or big");
+    }
+    form_.swapped = (order == "little") != kor::isLittleEndian;
+  }
+  else if (name == "root")
+  {
+    form_.root64 = widthOf(name, value);
+  }
+  else if (name == "aligned")
+  {
+    form_.aligned = truth(name, value);
+  }
+  else
+  {
+    fail("the key " + tool::quoted(name) + " is not known here");
+  }
+}
+
+void DocumentReader::property(const std::string& name, const Scalar& value)
+{
+  const bool begun = top().begun;
+  Properties& properties = begun ? encoder_.group() : draft_.properties;
+  if (headerProperty(properties, name, value) || name == "path" || name == "offset" || name == "reason")
+  {
+    return;
+  }
+  if (name == "depth")
+  {
+    draft_.depth = wholeNumber<uint64_t>(name, value);
+    return;
+  }
+  if (begun)
+  {
+    throw BuildError("the key " + tool::quoted(name) + " has no place in a node with children");
+  }
+  valueProperty(name, value);
+}
+
+bool DocumentReader::headerProperty(Properties& properties, const std::string& name, const Scalar& value)
+{
+  if (name == "element" || name == "id")
+  {
+    const uint16_t elm = name == "id" ? wholeNumber<uint16_t>(name, value) : elementNamed(textOf(name, value));
+    if (properties.elm.value_or(elm) != elm)
+    {
+      throw BuildError("element and id do not agree: #" + std::to_string(*properties.elm) + " and #" +
+                       std::to_string(elm));
+    }
+    properties.elm = elm;
+  }
+  else if (name == "header")
+  {
+    const bool wide = widthOf(name, value);
+    if (top().begun && properties.wide != wide)
+    {
+      throw BuildError("the header of a group must stand before its children");
+    }
+    properties.wide = wide;
+  }
+  else if (name == "type")
+  {
+    const auto type = value.kind == Scalar::Kind::text ? jsonTypeOf(value.text) : wholeNumber<uint16_t>(name, value);
+    if (!type)
+    {
+      throw BuildError("there is no type " + tool::quoted(value.text));
+    }
+    properties.type = type;
+  }
+  else if (name == "info")
+  {
+    properties.info = wholeNumber<uint32_t>(name, value);
+  }
+  else if (name == "size")
+  {
+    const bool unknown = value.kind == Scalar::Kind::text && value.text == "unknown";
+    properties.size = unknown ? TAV_SIZE_UNKNOWN : wholeNumber<uint64_t>(name, value);
+  }
+  else if (name == "eyeSize")
+  {
+    properties.eyeSize = truth(name, value);
+  }
+  else if (name == "endElement")
+  {
+    properties.endElement = truth(name, value);
+  }
+  else
+  {
+    return false;
+  }
+  return true;
+}
+
+void DocumentReader::valueProperty(const std::string& name, const Scalar& value)
+{
+  if (name == "value")
+  {
+    giveValue(value);
+  }
+  else if (name == "codePage")
+  {
+    draft_.codePage = wholeNumber<uint16_t>(name, value);
+  }
+  else if (name == "extra" || name == "padding" || name == "pair")
+  {
+    (name == "extra" ? draft_.extra : name == "padding" ? draft_.padding
+                                                        : draft_.pair) = hexBytes(name, value);
+  }
+  else if (name == "zeros")
+  {
+    setGiven(Given::zeros);
+    draft_.count = wholeNumber<uint64_t>(name, value);
+  }
+  else if (name == "bytes" || name == "damaged" || name == "unread")
+  {
+    setGiven(name == "bytes" ? Given::bytes : name == "damaged" ? Given::damaged
+                                                                : Given::unread);
+    draft_.value = hexBytes(name, value);
+  }
+  else
+  {
+    throw BuildError("the key " + tool::quoted(name) + " is not known here");
+  }
+}
+
+void DocumentReader::setGiven(Given given)
+{
+  if (draft_.given != Given::nothing || top().begun)
+  {
+    throw BuildError("the node has a value already");
+  }
+  draft_.given = given;
+}
+
+void DocumentReader::giveValue(const Scalar& value)
+{
+  if (value.kind == Scalar::Kind::null || value.kind == Scalar::Kind::fraction)
+  {
+    throw BuildError(value.kind == Scalar::Kind::null ? "no type holds null"
+                                                      : "no type holds " + value.text + ", only whole numbers");
+  }
+  if (draft_.given != Given::nothing)
+  {
+    throw BuildError("the node has a value already");
+  }
+  draft_.given = value.kind == Scalar::Kind::text ? Given::text : Given::integer;
+  draft_.isTruth = value.kind == Scalar::Kind::truth;
+  draft_.value = value.text;
+}
+
+void DocumentReader::givePiece(const Scalar& value)
+{
+  const bool text = value.kind == Scalar::Kind::text && draft_.given != Given::array;
+  if (draft_.given == Given::nothing)
+  {
+    draft_.given = text ? Given::text : Given::array;
+  }
+  if (draft_.given == Given::text && text)
+  {
+    draft_.value += value.text;
+  }
+  else if (draft_.given == Given::array)
+  {
+    const auto number = wholeNumber<uint64_t>("value", value);
+    draft_.value.append(reinterpret_cast<const char*>(&number), sizeof number);
+  }
+  else
+  {
+    throw BuildError("texts and numbers do not go together in one value");
+  }
+  spill();
+}
+
+void DocumentReader::giveBytes(const Scalar& value)
+{
+  if (value.kind == Scalar::Kind::text)
+  {
+    if (!appendHexBytes(draft_.value, value.text))
+    {
+      throw BuildError("bytes are given in hexadecimal, as \"00ff\"");
+    }
+    spill();
+    return;
+  }
+  for (auto zeros = wholeNumber<uint64_t>("zeros", value); zeros != 0;)
+  {
+    const uint64_t now = std::min<uint64_t>(zeros, kLong);
+    draft_.value.append(static_cast<size_t>(now), '\0');
+    zeros -= now;
+    spill();
+  }
+}
+
+/// Hands over what there is of a long value.
+void DocumentReader::spill()
+{
+  if (draft_.value.size() < kLong)
+  {
+    return;
+  }
+  if (lines_ && !draft_.begun)
+  {
+    closeTo(draft_.depth.value_or(0));
+  }
+  encoder_.addValue(draft_);
+}
+
+void DocumentReader::dateField(const std::string& name, const Scalar& value)
+{
+  if (name == "seconds")
+  {
+    date_.seconds = wholeNumber<uint64_t>(name, value);
+  }
+  else if (name == "fractionA" || name == "fractionB" || name == "further")
+  {
+    (name == "fractionA" ? date_.fractionA : name == "fractionB" ? date_.fractionB
+                                                                 : date_.further) =
+        wholeNumber<uint16_t>(name, value);
+  }
+  else if (name == "offsetMinutes")
+  {
+    date_.offsetMinutes = wholeNumber<int16_t>(name, value);
+  }
+  else
+  {
+    throw BuildError("the key " + tool::quoted(name) + " is not known in a date");
+  }
+}
+
+TextSource::TextSource(const std::string& path)
+    : name_(path == "-" ? "standard input" : path), file_(path == "-" ? stdin : kor::openStream(path, "rb")),
+      standard_(path == "-"), buffer_(kBuffer)
+{
+  if (file_ == nullptr)
+  {
+    throw Failure(kTrouble, Problem{.file = name_, .sentence = std::strerror(errno)});
+  }
+  setg(buffer_.data(), buffer_.data(), buffer_.data());
+}
+
+TextSource::~TextSource()
+{
+  standard_ ? 0 : std::fclose(file_);
+}
+
+TextSource::int_type TextSource::underflow()
+{
+  if (gptr() < egptr())
+  {
+    return traits_type::to_int_type(*gptr());
+  }
+  base_ += static_cast<uint64_t>(egptr() - eback());
+  lines_ += static_cast<uint64_t>(std::count(eback(), egptr(), '\n'));
+  const size_t count = std::fread(buffer_.data(), 1, buffer_.size(), file_);
+  setg(buffer_.data(), buffer_.data(), buffer_.data() + count);
+  if (count == 0 && std::ferror(file_) != 0)
+  {
+    throw Failure(kTrouble, Problem{.file = name_, .sentence = std::strerror(errno)});
+  }
+  return count == 0 ? traits_type::eof() : traits_type::to_int_type(*gptr());
+}
+
+uint64_t TextSource::line() const
+{
+  return 1 + lines_ + static_cast<uint64_t>(std::count(eback(), gptr(), '\n'));
+}
+
+bool TextSource::skipBlanks()
+{
+  int_type c = sgetc();
+  while (c == ' ' || c == '\t' || c == '\r' || c == '\n')
+  {
+    c = snextc();
+  }
+  return c != traits_type::eof();
+}
+
+} // namespace tav::tool

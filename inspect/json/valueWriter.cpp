@@ -1,0 +1,213 @@
+// The values of the JSON form, in pieces where they are long.
+#include <algorithm>
+#include <cstring>
+#include <utility>
+
+#include "inspect/json/text.h"
+#include "inspect/json/writer.h"
+#include "inspect/text/value.h"
+
+namespace tav::tool
+{
+
+using namespace tav::layout;
+
+namespace
+{
+
+constexpr size_t kPiece = size_t{48} * 1024;   ///< bytes of a payload in one string
+constexpr size_t kBlock = size_t{4} * 1024;    ///< zeros are counted by blocks of this length
+constexpr uint64_t kExact = uint64_t{1} << 53; ///< whole numbers up to here are exact in a double
+
+std::string_view asText(std::span<const uint8_t> bytes)
+{
+  return {reinterpret_cast<const char*>(bytes.data()), bytes.size()};
+}
+
+bool isZero(std::span<const uint8_t> bytes)
+{
+  return std::all_of(bytes.begin(), bytes.end(), [](uint8_t byte) { return byte == 0; });
+}
+
+} // namespace
+
+void JsonWriter::putValue(const Node& node)
+{
+  const uint16_t type = node.type();
+  const uint64_t start = node.payloadOffset();
+  const uint64_t size = node.size();
+  const bool oneNumber = (type >= TAV_TYPE_UINT8 && type <= TAV_TYPE_SINT64) || type == TAV_TYPE_BYTE;
+  if (oneNumber && size == typeInfo(type).valueSize)
+  {
+    // A byte is a number, too, although it is shown in hexadecimal elsewhere.
+    putInteger(node, type == TAV_TYPE_BYTE ? std::to_string(source_.view(start).front())
+                                           : *plainText(source_, form_, node, kBlock));
+  }
+  else if ((type == TAV_TYPE_UINT128 || type == TAV_TYPE_SINT128) && size == 16)
+  {
+    putString("value", *plainText(source_, form_, node, kBlock));
+  }
+  else if (type == TAV_TYPE_UTC_TIMESTAMP && size == sizeof(TAVTimeStamp))
+  {
+    TAVTimeStamp stamp{};
+    std::memcpy(&stamp, payloadBytes(source_, form_, node, size).data(), sizeof stamp);
+    putDate(stamp);
+  }
+  else if (type == TAV_TYPE_ASCII_STRING && isText(start, start + size))
+  {
+    putText(start, start + size);
+  }
+  else if (type == TAV_TYPE_UTF8_STRING && size >= 2 && isText(start + 2, start + size))
+  {
+    uint16_t codePage = 0;
+    std::memcpy(&codePage, bytesAt(start, sizeof codePage).data(), sizeof codePage);
+    codePage = form_.swapped ? kor::byteswap16(codePage) : codePage;
+    if (codePage != kUsualCodePage)
+    {
+      putNumber("codePage", codePage);
+    }
+    putText(start + 2, start + size);
+  }
+  else if (type == TAV_TYPE_UINT64_ARRAY && size % 8 == 0)
+  {
+    putArray(node);
+  }
+  else
+  {
+    putBytes("bytes", start, size);
+  }
+}
+
+void JsonWriter::putInteger(const Node& node, std::string_view text)
+{
+  key("value");
+  const bool eightBytes = node.size() == 8;
+  const std::string_view digits = text.substr(text.starts_with('-') ? 1 : 0);
+  const bool quote = safe_ && eightBytes && std::stoull(std::string(digits)) > kExact;
+  put(quote ? '"' + std::string(text) + '"' : std::string(text));
+}
+
+void JsonWriter::putDate(const TAVTimeStamp& stamp)
+{
+  const std::string text = dateText(stamp);
+  const auto back = parseDate(text);
+  if (back && std::memcmp(&*back, &stamp, sizeof stamp) == 0)
+  {
+    putString("value", text);
+    return;
+  }
+  key("value");
+  put("{");
+  firstKey_ = true;
+  key("seconds");
+  put(safe_ && stamp.seconds > kExact ? '"' + std::to_string(stamp.seconds) + '"' : std::to_string(stamp.seconds));
+  putNumber("fractionA", stamp.fractionA);
+  putNumber("fractionB", stamp.fractionB);
+  putNumber("further", stamp.further);
+  key("offsetMinutes");
+  put(std::to_string(stamp.offsetMinutes) + "}");
+  firstKey_ = false;
+}
+
+void JsonWriter::putArray(const Node& node)
+{
+  key("value");
+  put("[");
+  piece_.resize(kPiece);
+  const uint64_t end = node.payloadOffset() + node.size();
+  bool first = true;
+  for (uint64_t at = node.payloadOffset(); at < end; at += piece_.size())
+  {
+    piece_.resize(static_cast<size_t>(std::min<uint64_t>(kPiece, end - at)));
+    source_.read(at, piece_);
+    for (size_t i = 0; i < piece_.size(); i += 8)
+    {
+      uint64_t number = 0;
+      std::memcpy(&number, piece_.data() + i, sizeof number);
+      const std::string text = std::to_string(form_.swapped ? kor::byteswap64(number) : number);
+      put(std::exchange(first, false) ? "" : style_ == JsonStyle::compact ? ","
+                                                                          : ", ");
+      put(safe_ && text.size() > 15 ? '"' + text + '"' : text);
+    }
+  }
+  put("]");
+}
+
+/// Whether bytes are UTF-8. They are looked at piece by piece, as they are written afterwards.
+bool JsonWriter::isText(uint64_t from, uint64_t end)
+{
+  while (from < end)
+  {
+    piece_.resize(static_cast<size_t>(std::min<uint64_t>(kPiece + 4, end - from)));
+    const std::string_view text = asText(std::span(piece_).first(source_.read(from, piece_)));
+    const size_t count = cutAtCharacter(text, kPiece);
+    if (count == 0 || !isUtf8(text.substr(0, count)))
+    {
+      return false;
+    }
+    from += count;
+  }
+  return true;
+}
+
+void JsonWriter::putText(uint64_t from, uint64_t end)
+{
+  key("value");
+  const bool pieces = end - from > kPiece;
+  put(pieces ? "[" : "");
+  std::string text;
+  for (bool first = true; from < end || first; first = false)
+  {
+    piece_.resize(static_cast<size_t>(std::min<uint64_t>(kPiece + 4, end - from)));
+    const std::string_view bytes = asText(std::span(piece_).first(source_.read(from, piece_)));
+    const size_t count = cutAtCharacter(bytes, kPiece);
+    text = first ? "" : ",";
+    appendJsonString(text, bytes.substr(0, count));
+    put(text);
+    if (count == 0)
+    {
+      break; // an empty text, or a file that became shorter
+    }
+    from += count;
+  }
+  put(pieces ? "]" : "");
+}
+
+void JsonWriter::putBytes(std::string_view name, uint64_t from, uint64_t length)
+{
+  if (length <= kBlock)
+  {
+    putHex(name, bytesAt(from, length));
+    return;
+  }
+  key(name);
+  put("[");
+  const uint64_t end = from + length;
+  uint64_t zeros = 0;
+  std::string hex;
+  bool first = true;
+  const auto flush = [&] {
+    if (zeros != 0 || !hex.empty())
+    {
+      put(std::exchange(first, false) ? "" : ",");
+      put(zeros != 0 ? std::to_string(zeros) : '"' + hex + '"');
+    }
+    zeros = 0;
+    hex.clear();
+  };
+  for (; from < end; from += piece_.size())
+  {
+    piece_.resize(static_cast<size_t>(std::min<uint64_t>(kBlock, end - from)));
+    source_.read(from, piece_);
+    const bool blank = isZero(piece_);
+    if (blank ? !hex.empty() : zeros != 0 || hex.size() >= 2 * kPiece)
+    {
+      flush();
+    }
+    blank ? void(zeros += piece_.size()) : void(hex += hexText(piece_));
+  }
+  flush();
+  put("]");
+}
+
+} // namespace tav::tool

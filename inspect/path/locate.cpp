@@ -1,0 +1,72 @@
+#include "inspect/path/locate.h"
+
+#include "tools/shell/report.h"
+
+namespace tav::tool
+{
+
+std::optional<std::string> findOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offset)
+{
+  std::string before;
+  while (walker.next(event) && event.offset <= offset)
+  {
+    const bool begins = event.what == What::nodeBegin;
+    if (begins && event.offset == offset)
+    {
+      return std::nullopt;
+    }
+    if (begins)
+    {
+      before = "the node before it begins at " + hexOffset(event.offset) + ": " + walker.path(event);
+    }
+    if (offset - event.offset < event.length)
+    {
+      return before;
+    }
+    if (begins && event.node.isGroup() && event.node.limit <= offset)
+    {
+      walker.skip();
+    }
+  }
+  Problem problem{source.name(), offset};
+  problem.sentence = "lies behind the end of the file";
+  problem.code = TAV_RC_NOT_FOUND;
+  problem.hint = before;
+  throw Failure(kFindings, problem);
+}
+
+void goToOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offset)
+{
+  const auto before = findOffset(source, walker, event, offset);
+  if (before)
+  {
+    Problem problem{source.name(), offset};
+    problem.sentence = "no node begins there";
+    problem.code = TAV_RC_NOT_FOUND;
+    problem.hint = (before->empty() ? "" : *before + "\n     ") + "'tav hex --at " + hexOffset(offset) +
+                   "' shows the bytes there";
+    throw Failure(kFindings, problem);
+  }
+}
+
+bool goToMatch(Walker& walker, PathMatcher& matcher, Event& event)
+{
+  while (walker.next(event))
+  {
+    if (event.what != What::nodeBegin)
+    {
+      continue;
+    }
+    if (matcher.matches(event.node))
+    {
+      return true;
+    }
+    if (event.node.isGroup() && !matcher.reachesBelow())
+    {
+      walker.skip();
+    }
+  }
+  return false;
+}
+
+} // namespace tav::tool

@@ -1,0 +1,361 @@
+#include "inspect/text/value.h"
+
+#include <algorithm>
+#include <chrono>
+#include <cstdio>
+#include <cstring>
+#include <iterator>
+
+#include "tools/shell/report.h"
+
+namespace tav::tool
+{
+
+using namespace tav::layout;
+
+namespace
+{
+
+template<class Number>
+Number load(std::span<const uint8_t> bytes)
+{
+  Number value{};
+  std::memcpy(&value, bytes.data(), sizeof value);
+  return value;
+}
+
+std::string_view textOf(std::span<const uint8_t> bytes)
+{
+  return {reinterpret_cast<const char*>(bytes.data()), bytes.size()};
+}
+
+/// Length of the well-formed UTF-8 character at the start of a text, 0 when there is none.
+size_t characterLength(std::string_view text)
+{
+  const auto byteAt = [&](size_t i) { return i < text.size() ? static_cast<uint8_t>(text[i]) : uint8_t{0}; };
+  const uint8_t first = byteAt(0);
+  if (first < 0x80)
+  {
+    return 1;
+  }
+  const size_t length = first >= 0xF0 && first <= 0xF4 ? 4 : first >= 0xE0 && first < 0xF0 ? 3
+                                                         : first >= 0xC2 && first < 0xE0   ? 2
+                                                                                           : 0;
+  for (size_t i = 1; i < length; ++i)
+  {
+    if ((byteAt(i) & 0xC0) != 0x80)
+    {
+      return 0;
+    }
+  }
+  const uint8_t second = byteAt(1);
+  const bool wrong = (first == 0xE0 && second < 0xA0) || (first == 0xED && second > 0x9F) ||
+                     (first == 0xF0 && second < 0x90) || (first == 0xF4 && second > 0x8F);
+  return wrong ? 0 : length;
+}
+
+void appendEscape(std::string& out, uint8_t byte)
+{
+  static constexpr std::string_view letters = "\aa\bb\tt\nn\vv\ff\rr\"\"\\\\";
+  for (size_t i = 0; i < letters.size(); i += 2)
+  {
+    if (static_cast<uint8_t>(letters[i]) == byte)
+    {
+      out += '\\';
+      out += letters[i + 1];
+      return;
+    }
+  }
+  char text[8];
+  std::snprintf(text, sizeof text, "\\x%02x", static_cast<unsigned>(byte));
+  out += text;
+}
+
+/// Whether a character, with its length, steers a terminal: the control characters below the blank, U+007F to U+009F,
+/// and those that turn the direction of writing, so that another order of letters is seen than is there.
+bool steers(std::string_view character)
+{
+  const auto byteAt = [&](size_t i) { return static_cast<uint8_t>(character[i]); };
+  const uint8_t first = byteAt(0);
+  if (character.size() == 2)
+  {
+    return first == 0xC2 && byteAt(1) < 0xA0;
+  }
+  if (character.size() == 3 && first == 0xE2)
+  {
+    return (byteAt(1) == 0x80 && byteAt(2) >= 0xAA && byteAt(2) <= 0xAE) || // U+202A to U+202E
+           (byteAt(1) == 0x81 && byteAt(2) >= 0xA6 && byteAt(2) <= 0xA9);   // U+2066 to U+2069
+  }
+  return first < 0x20 || first == 0x7F;
+}
+
+/// Text without what steers terminals or is no UTF-8, and without the characters of `more`: written as \n, \x1b and so
+/// on.
+std::string escaped(std::string_view text, std::string_view more)
+{
+  std::string out;
+  while (!text.empty())
+  {
+    const size_t length = characterLength(text);
+    const size_t count = std::max<size_t>(length, 1);
+    const std::string_view character = text.substr(0, count);
+    if (length == 0 || steers(character) || more.find(character) != std::string_view::npos)
+    {
+      std::for_each(character.begin(), character.end(), [&](char c) { appendEscape(out, static_cast<uint8_t>(c)); });
+    }
+    else
+    {
+      out += character;
+    }
+    text.remove_prefix(count);
+  }
+  return out;
+}
+
+bool sizeSuits(uint16_t type, uint64_t size)
+{
+  const TypeInfo& info = typeInfo(type);
+  switch (type)
+  {
+  case TAV_TYPE_UINT128:
+  case TAV_TYPE_SINT128:
+    return size == 16;
+  case TAV_TYPE_UTF8_STRING:
+    return size >= 2;
+  case TAV_TYPE_UINT64_ARRAY:
+    return size % 8 == 0;
+  default:
+    return info.valueSize == 0 || info.valueSize == size;
+  }
+}
+
+std::string arrayText(std::span<const uint8_t> bytes)
+{
+  std::string text = "[";
+  for (size_t at = 0; at + 8 <= bytes.size(); at += 8)
+  {
+    text += (at == 0 ? "" : " ") + std::to_string(load<uint64_t>(bytes.subspan(at)));
+  }
+  return text + "]";
+}
+
+std::string utf8Text(std::span<const uint8_t> bytes, bool quote)
+{
+  const std::string_view text = textOf(bytes.subspan(2));
+  return quote ? quoted(text) : std::string(text);
+}
+
+/// A value of the right size.
+std::string scalarText(uint16_t type, std::span<const uint8_t> bytes, bool quote)
+{
+  switch (type)
+  {
+  case TAV_TYPE_ASCII_STRING: return quote ? quoted(textOf(bytes)) : std::string(textOf(bytes));
+  case TAV_TYPE_UTF8_STRING: return utf8Text(bytes, quote);
+  case TAV_TYPE_UINT8: return std::to_string(bytes[0]);
+  case TAV_TYPE_SINT8: return std::to_string(static_cast<int8_t>(bytes[0]));
+  case TAV_TYPE_UINT16: return std::to_string(load<uint16_t>(bytes));
+  case TAV_TYPE_SINT16: return std::to_string(load<int16_t>(bytes));
+  case TAV_TYPE_UINT32: return std::to_string(load<uint32_t>(bytes));
+  case TAV_TYPE_SINT32: return std::to_string(load<int32_t>(bytes));
+  case TAV_TYPE_UINT64: return std::to_string(load<uint64_t>(bytes));
+  case TAV_TYPE_SINT64: return std::to_string(load<int64_t>(bytes));
+  case TAV_TYPE_UTC_TIMESTAMP: return dateText(load<TAVTimeStamp>(bytes));
+  case TAV_TYPE_UINT128: return int128Text(bytes, false);
+  case TAV_TYPE_SINT128: return int128Text(bytes, true);
+  case TAV_TYPE_UINT64_ARRAY: return arrayText(bytes);
+  default: return hexText(bytes);
+  }
+}
+
+std::vector<uint8_t> storedBytes(ByteSource& source, const Node& node, uint64_t most)
+{
+  const uint64_t size = std::min(node.size(), node.limit - std::min(node.limit, node.payloadOffset()));
+  // Never more than the file has, whatever a header claims.
+  std::vector<uint8_t> bytes(static_cast<size_t>(std::min({most, size, source.size()})));
+  bytes.resize(source.read(node.payloadOffset(), bytes));
+  return bytes;
+}
+
+/// Whether the bytes are shown as they are stored, so that they read the same on every machine.
+bool isNoValue(const Node& node)
+{
+  return !typeInfo(node.type()).known || !sizeSuits(node.type(), node.size());
+}
+
+} // namespace
+
+std::vector<uint8_t> payloadBytes(ByteSource& source, const Form& form, const Node& node, uint64_t most)
+{
+  std::vector<uint8_t> bytes = storedBytes(source, node, most);
+  const SwapRule rule = typeInfo(node.type()).swapRule;
+  uint64_t prefix = form.swapped ? swappedPrefix(rule, bytes.size()) : 0;
+  if (rule == SwapRule::one128 && node.size() != 16)
+  {
+    prefix = 0;
+  }
+  if (prefix != 0)
+  {
+    const std::vector<uint8_t> stored(bytes.begin(), bytes.begin() + static_cast<ptrdiff_t>(prefix));
+    swapPayload(rule, stored.data(), bytes.data(), prefix);
+  }
+  return bytes;
+}
+
+std::string valueText(ByteSource& source, const Form& form, const Node& node, uint64_t most)
+{
+  if (node.isGroup())
+  {
+    return {};
+  }
+  const uint64_t wanted = std::max<uint64_t>(most, 16);
+  if (isNoValue(node))
+  {
+    return hexText(storedBytes(source, node, wanted)) + (node.size() > most ? " ..." : "");
+  }
+  const std::vector<uint8_t> bytes = payloadBytes(source, form, node, wanted);
+  return scalarText(node.type(), bytes, true) + (node.size() > bytes.size() ? " ..." : "");
+}
+
+std::optional<std::string> plainText(ByteSource& source, const Form& form, const Node& node, uint64_t most)
+{
+  if (node.size() > most)
+  {
+    return std::nullopt;
+  }
+  if (isNoValue(node))
+  {
+    return hexText(storedBytes(source, node, most));
+  }
+  return scalarText(node.type(), payloadBytes(source, form, node, most), false);
+}
+
+std::string typeText(uint16_t type)
+{
+  if (isGroupType(type))
+  {
+    return "group";
+  }
+  switch (type)
+  {
+  case TAV_TYPE_BYTE: return "Byte";
+  case TAV_TYPE_UINT64_ARRAY: return "Uint64 array";
+  default: return typeInfo(type).known ? typePrintName(type) : "type " + std::to_string(type);
+  }
+}
+
+bool isUtf8(std::string_view text)
+{
+  while (!text.empty())
+  {
+    const size_t length = characterLength(text);
+    if (length == 0)
+    {
+      return false;
+    }
+    text.remove_prefix(length);
+  }
+  return true;
+}
+
+std::string quoted(std::string_view text)
+{
+  return '"' + escaped(text, "\"\\") + '"';
+}
+
+std::string forTerminal(std::string_view text)
+{
+  return escaped(text, {});
+}
+
+std::string hexText(std::span<const uint8_t> bytes)
+{
+  static constexpr char digits[] = "0123456789abcdef";
+  std::string text;
+  text.reserve(bytes.size() * 2);
+  for (const uint8_t byte : bytes)
+  {
+    text += digits[byte >> 4];
+    text += digits[byte & 15];
+  }
+  return text;
+}
+
+std::string dateText(const TAVTimeStamp& stamp)
+{
+  using namespace std::chrono;
+  constexpr uint64_t endOf9999 = 253402300800;
+  const int64_t zone = int64_t{stamp.offsetMinutes} * 60;
+  if (stamp.seconds >= endOf9999 || static_cast<int64_t>(stamp.seconds) + zone >= static_cast<int64_t>(endOf9999))
+  {
+    return std::to_string(stamp.seconds) + " s";
+  }
+  const sys_seconds time{seconds(static_cast<int64_t>(stamp.seconds) + zone)};
+  const sys_days day = floor<days>(time);
+  const year_month_day date{day};
+  const hh_mm_ss<seconds> clock{time - day};
+  const unsigned fraction = stamp.fractionA / 1000u + stamp.fractionB;
+  const unsigned minutesEast = static_cast<unsigned>(std::abs(int{stamp.offsetMinutes}));
+  char text[64];
+  std::snprintf(text, sizeof text, "%04d-%02u-%02uT%02d:%02d:%02d.%06u%c%02u:%02u", int{date.year()},
+                unsigned{date.month()}, unsigned{date.day()}, static_cast<int>(clock.hours().count()),
+                static_cast<int>(clock.minutes().count()), static_cast<int>(clock.seconds().count()), fraction,
+                stamp.offsetMinutes < 0 ? '-' : '+', minutesEast / 60, minutesEast % 60);
+  return text;
+}
+
+std::string int128Text(std::span<const uint8_t> bytes, bool isSigned)
+{
+  // Base 2^32, the highest digit first; divided by ten until nothing is left.
+  uint32_t words[4];
+  for (size_t i = 0; i < 4; ++i)
+  {
+    words[kor::isLittleEndian ? 3 - i : i] = load<uint32_t>(bytes.subspan(i * 4));
+  }
+  const bool negative = isSigned && (words[0] & 0x80000000u) != 0;
+  uint64_t carry = 1;
+  for (auto word = std::rbegin(words); negative && word != std::rend(words); ++word)
+  {
+    carry += static_cast<uint32_t>(~*word);
+    *word = static_cast<uint32_t>(carry);
+    carry >>= 32;
+  }
+  std::string text;
+  do
+  {
+    uint64_t rest = 0;
+    for (uint32_t& word : words)
+    {
+      rest = rest << 32 | word;
+      word = static_cast<uint32_t>(rest / 10);
+      rest %= 10;
+    }
+    text += static_cast<char>('0' + rest);
+  } while (std::any_of(std::begin(words), std::end(words), [](uint32_t word) { return word != 0; }));
+  text += negative ? "-" : "";
+  std::reverse(text.begin(), text.end());
+  return text;
+}
+
+std::string cutToWidth(std::string_view text, size_t columns)
+{
+  size_t at = 0;
+  size_t width = 0;
+  size_t cutAt = 0;
+  while (at < text.size())
+  {
+    if (width + 3 <= columns)
+    {
+      cutAt = at;
+    }
+    if (width == columns)
+    {
+      return std::string(text.substr(0, cutAt)) + std::string("...").substr(0, std::min<size_t>(3, columns));
+    }
+    at += std::max<size_t>(1, characterLength(text.substr(at)));
+    ++width;
+  }
+  return std::string(text);
+}
+
+} // namespace tav::tool

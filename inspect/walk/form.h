@@ -1,0 +1,53 @@
+/// @file form.h
+/// Recognises how a stream is to be read. Nothing in a stream says so; the ways are tried and compared.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "inspect/walk/node.h"
+#include "inspect/walk/source.h"
+
+namespace tav::tool
+{
+
+/// What is given instead of being recognised.
+struct FormChoice
+{
+  std::optional<bool> swapped{};
+  std::optional<bool> root64{};
+  std::optional<bool> aligned{};
+};
+
+struct Recognition
+{
+  Form form{};
+  bool isStream = false;              ///< at least one way finds a node
+  bool damagedStart = false;          ///< the first node is not where it should be
+  std::vector<Form> alternatives{};   ///< other ways that explain the bytes as well, and differ in what they find
+  std::optional<Form> runnerUp{};     ///< the next best way, where the best one leaves a doubt and it is not far off
+  std::vector<std::string> because{}; ///< why, one reason a line
+  uint64_t looked = 0;                ///< bytes that the judgement rests on
+
+  bool ambiguous() const { return !alternatives.empty(); }
+};
+
+/// Tries all ways that `choice` leaves open on the beginning of the file. Reads a bounded part of it.
+Recognition recognise(ByteSource& source, const FormChoice& choice = {});
+
+/// The form of a stream that seems to begin at an offset inside of another one, where it is not that one's. Padding
+/// cannot be told.
+std::optional<Form> otherStreamAt(ByteSource& source, const Form& form, uint64_t offset);
+
+/// What to say of it.
+std::string otherStreamText(const Form& form);
+
+/// "little-endian", "big-endian"
+std::string orderText(const Form& form);
+
+/// One line: "little-endian, 64-bit root header, padded to 8"
+std::string formText(const Form& form);
+
+} // namespace tav::tool

@@ -1,0 +1,364 @@
+#include "inspect/walk/prober.h"
+
+#include <algorithm>
+#include <array>
+#include <cstring>
+
+#include "tav/dictionary.hpp"
+
+namespace tav::tool
+{
+
+using namespace tav::layout;
+
+namespace
+{
+
+constexpr uint64_t kMargin = kHeaderSize64; ///< bytes that a test at one offset looks at
+constexpr uint64_t kWindow = uint64_t{64} * 1024;
+
+uint16_t load16(const uint8_t* bytes, bool swap)
+{
+  uint16_t value = 0;
+  std::memcpy(&value, bytes, sizeof value);
+  return swap ? kor::byteswap16(value) : value;
+}
+
+bool isKnownType(uint16_t type)
+{
+  return isGroupType(type) || typeInfo(type).known;
+}
+
+} // namespace
+
+Prober::Prober(ByteSource& source, const Form& form, uint64_t budget)
+    : source_(source), form_(form), budget_(budget)
+{
+}
+
+bool Prober::isNamed(uint16_t elm)
+{
+  // Asked for every byte of a damaged region, so the answers are kept.
+  static const auto named = [] {
+    std::array<bool, 65536> table{};
+    for (const dictionary::Entry& entry : dictionary::entries())
+    {
+      table[entry.id] = entry.constant != "INVALID_ELEMENT";
+    }
+    return table;
+  }();
+  return named[elm];
+}
+
+bool Prober::header(uint64_t offset, bool wide, uint64_t limit, TAVHeader& out)
+{
+  const uint64_t length = wide ? kHeaderSize64 : kHeaderSize32;
+  if (offset > limit || limit - offset < length)
+  {
+    return false;
+  }
+  std::array<uint8_t, kHeaderSize64> bytes{};
+  if (source_.read(offset, std::span(bytes).first(static_cast<size_t>(length))) != length)
+  {
+    return false;
+  }
+  decodeHeader(bytes.data(), wide, form_.swapped, out);
+  out.nodeOffset = offset;
+  return true;
+}
+
+uint64_t Prober::paddedSize(const TAVHeader& data) const
+{
+  uint64_t size = sizeOf(data);
+  if (form_.aligned || (infoOf(data) & TAV_INFO_ALIGNED8) != 0)
+  {
+    roundUp8Checked(size);
+  }
+  return size;
+}
+
+bool Prober::suits(const TAVHeader& header) const
+{
+  const uint16_t type = typeOf(header);
+  const uint64_t size = sizeOf(header);
+  switch (type)
+  {
+  case TAV_TYPE_HEADER32:
+    return true;
+  case TAV_TYPE_HEADER64:
+    return is64(header);
+  case TAV_TYPE_UTF8_STRING:
+    return size >= 2;
+  case TAV_TYPE_UINT64_ARRAY:
+    return size % 8 == 0;
+  case TAV_TYPE_UINT128:
+  case TAV_TYPE_SINT128:
+    return size == 16;
+  default:
+    return typeInfo(type).known && (typeInfo(type).valueSize == 0 || typeInfo(type).valueSize == size);
+  }
+}
+
+Belief Prober::judgeHeader(const TAVHeader& header, uint64_t limit) const
+{
+  const uint64_t start = header.nodeOffset + headerLength(header.hdrType);
+  const bool unknownSize = isGroup(header) && isSizeUnknown(header);
+  if (!unknownSize && (start > limit || sizeOf(header) > limit - start))
+  {
+    return Belief::none;
+  }
+  if (!suits(header))
+  {
+    return Belief::fits;
+  }
+  return isNamed(elmOf(header)) ? Belief::named : Belief::typed;
+}
+
+bool Prober::isFollowedAt(uint64_t offset, bool wide, uint64_t limit)
+{
+  TAVHeader next{};
+  return offset == limit || (header(offset, wide, limit, next) && judgeHeader(next, limit) >= Belief::named);
+}
+
+bool Prober::isFollowed(const TAVHeader& node, uint64_t limit)
+{
+  const bool wide = is64(node);
+  const uint64_t start = node.nodeOffset + headerLength(node.hdrType);
+  if (isGroup(node))
+  {
+    const uint64_t end = isSizeUnknown(node) ? limit : start + sizeOf(node);
+    return end == start ? isFollowedAt(start, wide, limit) : isFollowedAt(start, hasChildren64(node), end);
+  }
+  uint64_t end = addSaturated(start, paddedSize(node));
+  uint64_t distance = 0;
+  if (hasEyeSize(node))
+  {
+    return pairAt(end, limit, distance) || (typeOf(node) == TAV_TYPE_UTF8_STRING && pairAt(end + 2, limit, distance));
+  }
+  if (elmOf(node) == TAV_ELM_CMN_END_HDR_EYE_SIZE)
+  {
+    return pairAt(start, limit, distance);
+  }
+  if (end > limit)
+  {
+    return limit == source_.size(); // the last padding of a file was not written
+  }
+  return isFollowedAt(end, wide, limit) ||
+         (typeOf(node) == TAV_TYPE_UTF8_STRING && end < limit && isFollowedAt(end + 2, wide, limit));
+}
+
+bool Prober::isChain(uint64_t offset, bool wide, uint64_t limit, bool toTheEnd)
+{
+  constexpr int kEnough = 16;
+  for (int i = 0; i < kEnough && offset != limit; ++i)
+  {
+    TAVHeader node{};
+    if (!header(offset, wide, limit, node) || judgeHeader(node, limit) == Belief::none ||
+        (typeOf(node) == 0 && sizeOf(node) == 0))
+    {
+      return false;
+    }
+    const uint64_t start = offset + headerLength(node.hdrType);
+    if (isGroup(node) && isSizeUnknown(node))
+    {
+      return i > 2 || (!toTheEnd && judge(offset, wide, limit) == Belief::followed);
+    }
+    offset = start + (isGroup(node) ? sizeOf(node) : std::min(paddedSize(node), limit - start));
+    uint64_t distance = 0;
+    if (typeOf(node) == TAV_TYPE_UTF8_STRING && limit - offset >= 2 && !pairAt(offset, limit, distance) &&
+        (offset + 2 == limit || pairAt(offset + 2, limit, distance) ||
+         judge(offset + 2, wide, limit) > judge(offset, wide, limit)))
+    {
+      offset += 2;
+    }
+    offset += !isGroup(node) && pairAt(offset, limit, distance) ? kEyeSizeLength : 0;
+  }
+  return !toTheEnd || offset == limit;
+}
+
+Belief Prober::judge(uint64_t offset, bool wide, uint64_t limit)
+{
+  TAVHeader node{};
+  if (!header(offset, wide, limit, node))
+  {
+    return Belief::none;
+  }
+  const Belief belief = judgeHeader(node, limit);
+  return belief == Belief::named && isFollowed(node, limit) ? Belief::followed : belief;
+}
+
+bool Prober::pairAt(uint64_t offset, uint64_t limit, uint64_t& distance)
+{
+  EyeSizeBytes bytes{};
+  if (offset > limit || limit - offset < bytes.size() || source_.read(offset, bytes) != bytes.size())
+  {
+    return false;
+  }
+  for (const bool swap : {form_.swapped, !form_.swapped})
+  {
+    const EyeSize pair = decodeEyeSize(bytes, swap);
+    if (pair.eye == TAV_EYE_CATCHER)
+    {
+      distance = pair.distance;
+      return true;
+    }
+  }
+  return false;
+}
+
+bool Prober::pairEnds(uint64_t offset, uint64_t limit, const TAVHeader& group)
+{
+  uint64_t distance = 0;
+  // The distance of a 64-bit group of type 1 is 8 short, as the writer makes it.
+  const uint64_t missing = is64(group) && !hasChildren64(group) ? 8 : 0;
+  return pairAt(offset, limit, distance) && offset - group.nodeOffset == addSaturated(distance, missing);
+}
+
+bool Prober::restartAt(const uint8_t* bytes, uint64_t offset, bool wide, uint64_t limit)
+{
+  const uint8_t* const tail = bytes + (wide ? 12 : 4);
+  if (!isKnownType(load16(tail, form_.swapped)) || !isNamed(load16(tail + 2, form_.swapped)))
+  {
+    return false;
+  }
+  const Belief belief = judge(offset, wide, limit);
+  // A size that is exactly its type's says enough where what follows is damaged as well.
+  return belief == Belief::followed ||
+         (belief == Belief::named && typeInfo(load16(tail, form_.swapped)).valueSize != 0);
+}
+
+bool Prober::pairLeadsTo(uint64_t eye, uint64_t distance, uint64_t from, uint64_t limit, uint64_t& start)
+{
+  // What the distance leaves out: nothing, the 8 of a group of type 1, padding and the extra bytes of a string.
+  for (uint64_t missing = 0; missing <= 9; ++missing)
+  {
+    TAVHeader node{};
+    if (!nodeBefore(eye, addSaturated(distance, missing), start) || start < from || !header(start, true, limit, node))
+    {
+      continue;
+    }
+    const uint64_t behind = start + kHeaderSize64;
+    const bool group = isGroup(node) && (isSizeUnknown(node) || addSaturated(behind, sizeOf(node)) == eye + 16) &&
+                       (missing == 0 || missing == 8);
+    const bool data = !isGroup(node) && hasEyeSize(node) && dataDistance(sizeOf(node)) == distance &&
+                      (eye == behind + paddedSize(node) || eye == behind + paddedSize(node) + 2);
+    if (group || data)
+    {
+      return true;
+    }
+  }
+  return false;
+}
+
+bool Prober::restartByPair(const uint8_t* bytes, uint64_t offset, uint64_t from, uint64_t limit, Restart& restart)
+{
+  uint64_t word = 0;
+  std::memcpy(&word, bytes, sizeof word);
+  uint64_t distance = 0;
+  if ((word != TAV_EYE_CATCHER && word != kor::byteswap64(TAV_EYE_CATCHER)) || !pairAt(offset, limit, distance))
+  {
+    return false;
+  }
+  uint64_t start = 0;
+  if (pairLeadsTo(offset, distance, from, limit, start))
+  {
+    restart = {start, true};
+    return true;
+  }
+  // The node that it ends began before the damage, or its header is damaged; the next node begins behind it.
+  const uint64_t behind = offset + kEyeSizeLength;
+  if (behind == limit || judge(behind, true, limit) >= Belief::typed || judge(behind, false, limit) >= Belief::named)
+  {
+    restart = {behind, true};
+    return true;
+  }
+  return false;
+}
+
+Restart Prober::findRestart(uint64_t from, bool wide, bool eitherWidth, uint64_t limit)
+{
+  std::array<uint8_t, kWindow + kMargin> window{};
+  Restart restart{limit};
+  if (spent_ > budget_)
+  {
+    restart.gaveUp = true;
+    return restart;
+  }
+  for (uint64_t at = from; at < limit;)
+  {
+    const auto length = static_cast<size_t>(std::min<uint64_t>(window.size(), limit - at));
+    const size_t got = source_.read(at, std::span(window).first(length));
+    std::fill(window.begin() + static_cast<ptrdiff_t>(got), window.end(), uint8_t{0});
+    const uint64_t tests = std::min<uint64_t>(kWindow, limit - at);
+    for (uint64_t i = 0; i < tests; ++i)
+    {
+      const uint8_t* const bytes = window.data() + i;
+      const uint64_t offset = at + i;
+      if (offset > from && (restartAt(bytes, offset, wide, limit) ||
+                            (eitherWidth && restartAt(bytes, offset, !wide, limit))))
+      {
+        return {offset};
+      }
+      if (restartByPair(bytes, offset, from + 1, limit, restart))
+      {
+        return restart;
+      }
+    }
+    at += tests;
+    spent_ += tests;
+    if (spent_ > budget_)
+    {
+      restart.gaveUp = at < limit;
+      return restart;
+    }
+  }
+  return restart;
+}
+
+bool Prober::zerosToEnd(uint64_t offset, bool& gaveUp)
+{
+  gaveUp = false;
+  while (offset < source_.size())
+  {
+    if (offset < nonZeroAt_)
+    {
+      return false;
+    }
+    const auto bytes = source_.view(offset);
+    spent_ += bytes.size();
+    const auto found = std::find_if(bytes.begin(), bytes.end(), [](uint8_t byte) { return byte != 0; });
+    if (found != bytes.end())
+    {
+      nonZeroAt_ = offset + static_cast<uint64_t>(found - bytes.begin()) + 1;
+      return false;
+    }
+    offset += bytes.size();
+    if (spent_ > budget_)
+    {
+      gaveUp = offset < source_.size();
+      return !gaveUp;
+    }
+  }
+  return true;
+}
+
+uint64_t Prober::zerosStart(uint64_t from)
+{
+  constexpr uint64_t worthTelling = 8;
+  uint64_t end = source_.size();
+  while (end > from)
+  {
+    const uint64_t start = std::max(from, (end - 1) / ByteSource::kPage * ByteSource::kPage);
+    const auto bytes = source_.view(start).first(static_cast<size_t>(end - start));
+    const auto found = std::find_if(bytes.rbegin(), bytes.rend(), [](uint8_t byte) { return byte != 0; });
+    spent_ += bytes.size();
+    end -= static_cast<uint64_t>(found - bytes.rbegin());
+    if (found != bytes.rend() || spent_ > budget_)
+    {
+      break;
+    }
+  }
+  return source_.size() - end >= worthTelling ? end : source_.size();
+}
+
+} // namespace tav::tool

@@ -1,0 +1,94 @@
+/// @file prober.h
+/// Whether bytes look like a node: the judgement by which the walker decides where the format leaves a choice, and
+/// by which it finds its way again behind damaged bytes.
+#pragma once
+
+#include <cstdint>
+
+#include "inspect/walk/node.h"
+#include "inspect/walk/source.h"
+
+namespace tav::tool
+{
+
+/// How much speaks for a node at an offset, in rising order.
+enum class Belief : uint8_t
+{
+  none,    ///< cannot be a node there
+  fits,    ///< the size lies within the bounds
+  typed,   ///< a known type with a size that suits it
+  named,   ///< and an element of the dictionary
+  followed ///< and what comes behind it is a node, too, or the bounds end there
+};
+
+/// Where a node can start again behind damaged bytes.
+struct Restart
+{
+  uint64_t offset = 0; ///< the limit when there is no node any more
+  bool byPair = false; ///< an eye/size pair leads back to it
+  bool gaveUp = false; ///< the budget for looking was used up
+};
+
+class Prober
+{
+public:
+  /// `budget`: bytes that may be looked through in search of nodes and of zeros.
+  Prober(ByteSource& source, const Form& form, uint64_t budget);
+
+  /// Reads a header; false when it does not lie before `limit`.
+  bool header(uint64_t offset, bool wide, uint64_t limit, TAVHeader& out);
+
+  /// What speaks for a node at `offset` that ends at `limit` at the latest.
+  Belief judge(uint64_t offset, bool wide, uint64_t limit);
+
+  /// Whether a header is as a writer makes it: a known type, a size that suits it and lies before `limit`.
+  Belief judgeHeader(const TAVHeader& header, uint64_t limit) const;
+
+  /// Whether an eye catcher of either byte order stands at `offset`; then also its distance, in that order.
+  bool pairAt(uint64_t offset, uint64_t limit, uint64_t& distance);
+
+  /// Whether the eye/size pair at `offset` ends the group at `group`.
+  bool pairEnds(uint64_t offset, uint64_t limit, const TAVHeader& group);
+
+  /// Bytes from the end of a data element's header to the place behind its payload and padding.
+  uint64_t paddedSize(const TAVHeader& data) const;
+
+  /// The first place behind `from` where a node can start, before `limit`.
+  Restart findRestart(uint64_t from, bool wide, bool eitherWidth, uint64_t limit);
+
+  /// Whether all bytes from `offset` to the end of the file are zero. `gaveUp` is set when the budget did not
+  /// suffice to tell.
+  bool zerosToEnd(uint64_t offset, bool& gaveUp);
+
+  /// Where the zeros begin that the file ends in, `from` at the earliest; the file's end when there are fewer than 8.
+  uint64_t zerosStart(uint64_t from);
+
+  /// Whether what stands behind a node is another node, or the bounds end there.
+  bool isFollowed(const TAVHeader& node, uint64_t limit);
+
+  /// Whether nodes of any kind follow one another from `offset` on, by their sizes alone, up to the limit, to an open
+  /// group that a node follows, or many of them. Says something of nodes with types and elements that nobody knows.
+  /// With `toTheEnd`, only up to the limit will do.
+  bool isChain(uint64_t offset, bool wide, uint64_t limit, bool toTheEnd = false);
+
+  /// Whether the dictionary has an element.
+  static bool isNamed(uint16_t elm);
+
+  /// Bytes looked through so far.
+  uint64_t spent() const { return spent_; }
+
+private:
+  bool suits(const TAVHeader& header) const;
+  bool isFollowedAt(uint64_t offset, bool wide, uint64_t limit);
+  bool restartAt(const uint8_t* bytes, uint64_t offset, bool wide, uint64_t limit);
+  bool restartByPair(const uint8_t* bytes, uint64_t offset, uint64_t from, uint64_t limit, Restart& restart);
+  bool pairLeadsTo(uint64_t eye, uint64_t distance, uint64_t from, uint64_t limit, uint64_t& start);
+
+  ByteSource& source_;
+  Form form_;
+  uint64_t budget_;
+  uint64_t spent_ = 0;
+  uint64_t nonZeroAt_ = 0; ///< a byte that is not zero is known to be at this offset - 1 or behind it
+};
+
+} // namespace tav::tool

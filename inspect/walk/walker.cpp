@@ -1,0 +1,486 @@
+#include "inspect/walk/walker.h"
+
+#include <algorithm>
+#include <utility>
+
+#include "inspect/path/path.h"
+#include "tools/shell/report.h"
+
+namespace tav::tool
+{
+
+using namespace tav::layout;
+
+namespace
+{
+
+constexpr size_t kMaxCounts = 256; ///< different ids among siblings that are counted; others are named by offset
+
+} // namespace
+
+Walker::Walker(ByteSource& source, const Form& form, WalkStart start)
+    : source_(source), form_(form), prober_(source, form, start.budget),
+      position_(std::min(start.offset, source.size()))
+{
+  Frame file;
+  file.limit = source.size();
+  file.open = true;
+  file.wide = start.offset == 0 ? form.root64 : start.wide;
+  frames_.push_back(file);
+}
+
+Event& Walker::queue(What what, uint64_t offset, uint64_t length)
+{
+  Event& event = queue_[queueCount_++];
+  event.what = what;
+  event.offset = offset;
+  event.length = length;
+  event.end = End::closed;
+  event.depth = frames_.size() - 1;
+  event.code = TAV_RC_OK;
+  event.reason.clear();
+  return event;
+}
+
+bool Walker::next(Event& event)
+{
+  canSkip_ = false;
+  while (queueHead_ == queueCount_)
+  {
+    if (done_)
+    {
+      return false;
+    }
+    queueHead_ = queueCount_ = 0;
+    step();
+  }
+  std::swap(event, queue_[queueHead_++]);
+  canSkip_ = event.what == What::nodeBegin && event.node.isGroup();
+  return true;
+}
+
+bool Walker::skip()
+{
+  const Frame& top = frames_.back();
+  if (!canSkip_ || top.open || top.node.has(kOverrun) || queueHead_ != queueCount_)
+  {
+    return false;
+  }
+  canSkip_ = false;
+  if (position_ < top.limit)
+  {
+    Event& event = queue(What::skipped, position_, top.limit - position_);
+    event.node = top.node;
+    event.depth = top.node.depth;
+    position_ = top.limit;
+  }
+  return true;
+}
+
+void Walker::step()
+{
+  if (endPending_)
+  {
+    endPending_ = false;
+    endGroup(End::byEndElement);
+    return;
+  }
+  const Frame& top = frames_.back();
+  if (position_ >= top.limit)
+  {
+    frames_.size() > 1 ? endByLimit() : void(done_ = true);
+    return;
+  }
+  TAVHeader header{};
+  const bool fits = prober_.header(position_, top.wide, top.limit, header);
+  const bool blank = !fits || (sizeOf(header) == 0 && typeOf(header) == 0 && elmOf(header) == 0);
+  if (blank && top.open && top.limit == source_.size() && endByZeros())
+  {
+    return;
+  }
+  if (!fits)
+  {
+    damage(position_, TAV_RC_NO_MEMORY,
+           counted(top.limit - position_, "byte") + (top.limit - position_ == 1 ? " is" : " are") +
+               " too few for a node's header");
+    return;
+  }
+  begin(header);
+}
+
+void Walker::begin(TAVHeader& header)
+{
+  const Frame& top = frames_.back();
+  Belief belief = prober_.judgeHeader(header, top.limit);
+  if (frames_.size() == 1 && header.nodeOffset != 0 && belief < Belief::named)
+  {
+    // Nothing says which header a further root has. That of the first is given with the form.
+    TAVHeader other{};
+    const bool found = prober_.header(position_, !top.wide, top.limit, other) &&
+                       prober_.judge(position_, !top.wide, top.limit) == Belief::followed;
+    if (found)
+    {
+      header = other;
+      belief = Belief::followed;
+    }
+  }
+  Node node;
+  node.header = header;
+  node.depth = frames_.size() - 1;
+  node.parentOffset = frames_.size() > 1 ? top.node.offset() : kNoOffset;
+  node.flags = std::exchange(afterDamage_, false) ? uint32_t{kAfterDamage} : 0;
+  const uint64_t start = node.payloadOffset();
+  const bool overruns = node.size() > top.limit - start && !(node.isGroup() && isSizeUnknown(header));
+  const bool strange = belief == Belief::fits && !node.isGroup() && isStrange(header);
+  const bool blank = node.size() == 0 && node.type() == 0;
+  const bool wildGroup = node.isGroup() && overruns && !holdsNodes(header, top.limit) &&
+                         !prober_.isChain(start, hasChildren64(header), top.limit);
+  if (blank || strange || wildGroup || (overruns && !node.isGroup()))
+  {
+    damage(position_, overruns ? TAV_RC_OUTSIDE_PARENT : TAV_RC_BAD_HDR_TYPE, whyNot(header, top.limit));
+    return;
+  }
+  node.ordinal = countChild(node.elm());
+  node.isGroup() ? beginGroup(node) : takeData(node);
+}
+
+bool Walker::holdsNodes(TAVHeader group, uint64_t limit)
+{
+  // The end of a file cuts all groups around it, each the first child of the one before, perhaps.
+  constexpr int mostLevels = 64;
+  for (int level = 0; level < mostLevels; ++level)
+  {
+    const uint64_t start = group.nodeOffset + headerLength(group.hdrType);
+    const bool wide = hasChildren64(group);
+    if (prober_.judge(start, wide, limit) >= Belief::named)
+    {
+      return true;
+    }
+    TAVHeader child{};
+    if (!prober_.header(start, wide, limit, child))
+    {
+      return Prober::isNamed(elmOf(group));
+    }
+    const uint64_t inside = start + headerLength(child.hdrType);
+    if (!isGroup(child) || !Prober::isNamed(elmOf(child)) || sizeOf(child) <= limit - inside)
+    {
+      return false;
+    }
+    group = child;
+  }
+  return true;
+}
+
+bool Walker::isStrange(const TAVHeader& header)
+{
+  const Frame& top = frames_.back();
+  if (frames_.size() == 1)
+  {
+    return true;
+  }
+  return !prober_.isFollowed(header, top.limit) && !prober_.isChain(header.nodeOffset, top.wide, top.limit);
+}
+
+std::string Walker::whyNot(const TAVHeader& header, uint64_t limit) const
+{
+  const uint64_t start = header.nodeOffset + headerLength(header.hdrType);
+  if (sizeOf(header) == 0 && typeOf(header) == 0)
+  {
+    return "zeros where a node should begin";
+  }
+  if (sizeOf(header) > limit - start && !isSizeUnknown(header))
+  {
+    const bool file = limit == source_.size();
+    return "no node: it would end " + counted(sizeOf(header) - (limit - start), "byte") + " past " +
+           (file ? "the end of the file" : "its parent");
+  }
+  if (isSizeUnknown(header))
+  {
+    return isGroup(header) ? "no node: a group without an end and without a child" : "no node: its size is all ones";
+  }
+  const std::string type = std::to_string(typeOf(header));
+  return "no node: " +
+         (typeInfo(typeOf(header)).known ? "a size of " + std::to_string(sizeOf(header)) + " does not suit type " + type
+                                         : "type " + type + " is unknown") +
+         ", and no node follows";
+}
+
+bool Walker::looksUnfinished(const Node& node, const Frame& parent)
+{
+  // A group that was opened with size 0 and never closed. One that asks for a pair is never empty when closed. The
+  // others can only be open inside a group that was not closed either.
+  const Node& around = parent.node;
+  const bool unfinished =
+      frames_.size() == 1 || (around.has(kOpen) && (around.size() == 0 || !hasEyeSize(around.header)));
+  if (node.size() != 0 || !(unfinished || (hasEyeSize(node.header) && parent.open)))
+  {
+    return false;
+  }
+  // Children that nobody knows count unless what stands there is surer as a sibling, with a header of the other width.
+  const uint64_t start = node.payloadOffset();
+  const bool wide = hasChildren64(node.header);
+  return prober_.judge(start, wide, parent.limit) >= Belief::typed ||
+         (prober_.judge(start, is64(node.header), parent.limit) < Belief::typed &&
+          prober_.isChain(start, wide, parent.limit));
+}
+
+void Walker::beginGroup(Node& node)
+{
+  const Frame& parent = frames_.back();
+  const uint64_t start = node.payloadOffset();
+  Frame frame;
+  if (isSizeUnknown(node.header) || looksUnfinished(node, parent))
+  {
+    node.flags |= kOpen;
+    frame.open = true;
+    frame.limit = parent.limit;
+  }
+  else if (node.size() > parent.limit - start)
+  {
+    node.flags |= kOverrun;
+    frame.open = true;
+    frame.limit = parent.limit;
+  }
+  else
+  {
+    frame.limit = start + node.size();
+  }
+  if (!node.is64() && node.type() == TAV_TYPE_HEADER64)
+  {
+    node.flags |= kBadGroupType;
+  }
+  node.limit = frame.limit;
+  frame.node = node;
+  frame.wide = hasChildren64(node.header);
+  frame.counts = counts_.size();
+  Event& event = queue(What::nodeBegin, node.offset(), node.headerLength());
+  event.node = node;
+  position_ = start;
+  frames_.push_back(frame);
+}
+
+bool Walker::extraBehind(const Node& node, uint64_t base, uint64_t limit)
+{
+  const Frame& top = frames_.back();
+  if (node.type() != TAV_TYPE_UTF8_STRING || limit - base < 2)
+  {
+    return false;
+  }
+  uint64_t distance = 0;
+  bool without = false;
+  bool with = false;
+  if (hasEyeSize(node.header))
+  {
+    without = prober_.pairAt(base, limit, distance);
+    with = prober_.pairAt(base + 2, limit, distance);
+  }
+  if (without == with)
+  {
+    const Belief here = prober_.judge(base, top.wide, limit);
+    const Belief behind = base + 2 == limit ? Belief::followed : prober_.judge(base + 2, top.wide, limit);
+    without = here > behind;
+    with = behind > here;
+  }
+  if (without == with && node.is64() && hasEyeSize(node.header))
+  {
+    // Neither eye catcher is whole: what follows the pair tells where it stands.
+    const auto follows = [&](uint64_t at) {
+      return at == limit || prober_.judge(at, top.wide, limit) >= Belief::named;
+    };
+    without = follows(base + kEyeSizeLength);
+    with = follows(base + kEyeSizeLength + 2);
+  }
+  if (without == with)
+  {
+    without = prober_.isChain(base, top.wide, limit);
+    with = prober_.isChain(base + 2, top.wide, limit);
+  }
+  if (without == with)
+  {
+    return form_.extra;
+  }
+  (with ? withExtra_ : withoutExtra_) += 1;
+  return with;
+}
+
+void Walker::takeData(Node& node)
+{
+  const uint64_t limit = frames_.back().limit;
+  const uint64_t start = node.payloadOffset();
+  const uint64_t end = start + node.size();
+  const uint64_t padded = std::min(limit, addSaturated(start, prober_.paddedSize(node.header)));
+  node.limit = end;
+  if (extraBehind(node, padded, limit))
+  {
+    node.flags |= kExtra;
+  }
+  const uint64_t extra = node.has(kExtra) ? 2 : 0;
+  queue(What::nodeBegin, node.offset(), node.headerLength());
+  if (node.size() != 0)
+  {
+    queue(What::payload, start, node.size());
+  }
+  if (extra != 0)
+  {
+    queue(What::extra, end, extra);
+  }
+  if (padded != end)
+  {
+    queue(What::padding, end + extra, padded - end);
+  }
+  position_ = padded + extra;
+  if (node.is64() && hasEyeSize(node.header))
+  {
+    takePair(node, limit);
+  }
+  queue(What::nodeEnd, position_, 0);
+  for (size_t i = 0; i < queueCount_; ++i)
+  {
+    queue_[i].node = node;
+  }
+  if (isEndElement(node.elm()))
+  {
+    afterEndElement(node);
+  }
+}
+
+void Walker::takePair(Node& node, uint64_t limit)
+{
+  uint64_t distance = 0;
+  const uint64_t behind = position_ + kEyeSizeLength;
+  if (prober_.pairAt(position_, limit, distance))
+  {
+    queue(What::pair, position_, kEyeSizeLength);
+    position_ = behind;
+    return;
+  }
+  const bool wide = frames_.back().wide;
+  const bool room = limit - position_ >= kEyeSizeLength;
+  const bool nodeBehind = room && (behind == limit || prober_.judge(behind, wide, limit) >= Belief::named);
+  if (nodeBehind && prober_.judge(position_, wide, limit) < Belief::named)
+  {
+    node.flags |= kBadPair;
+    queue(What::pair, position_, kEyeSizeLength);
+    position_ = behind;
+    return;
+  }
+  node.flags |= kNoPair;
+}
+
+void Walker::afterEndElement(const Node& node)
+{
+  if (frames_.size() == 1)
+  {
+    return;
+  }
+  Frame& top = frames_.back();
+  const bool marker = node.elm() == TAV_ELM_CMN_END_HDR_MARKER;
+  const bool itsOwn = !marker && prober_.pairEnds(node.payloadOffset(), top.limit, top.node.header);
+  // Behind damaged bytes an end element can be that of a group whose header was among them.
+  const bool doubtful = !itsOwn && !marker && top.lastDamage != 0;
+  // Nodes up to the very end of the group are in it, although readers stop before them.
+  const bool more = top.open || position_ == top.limit || prober_.isChain(position_, top.wide, top.limit, true);
+  if (top.open ? !doubtful : itsOwn && !more)
+  {
+    if (!top.open)
+    {
+      top.node.flags |= kWrongSize;
+    }
+    endPending_ = true;
+  }
+}
+
+void Walker::endByLimit()
+{
+  const Frame& top = frames_.back();
+  if (!top.open)
+  {
+    endGroup(End::closed);
+    return;
+  }
+  endGroup(top.limit == source_.size() ? End::byFile : End::byParent);
+}
+
+void Walker::endGroup(End end)
+{
+  Event& event = queue(What::nodeEnd, position_, 0);
+  event.end = end;
+  event.node = frames_.back().node;
+  event.depth = event.node.depth;
+  counts_.resize(frames_.back().counts);
+  frames_.pop_back();
+}
+
+bool Walker::endByZeros()
+{
+  bool gaveUp = false;
+  if (!prober_.zerosToEnd(position_, gaveUp) && !gaveUp)
+  {
+    return false;
+  }
+  if (frames_.size() > 1)
+  {
+    endGroup(End::byFile);
+    return true;
+  }
+  queue(gaveUp ? What::unread : What::zeros, position_, source_.size() - position_).node = {};
+  position_ = source_.size();
+  return true;
+}
+
+void Walker::damage(uint64_t from, uint32_t code, std::string reason)
+{
+  Frame& top = frames_.back();
+  const Restart restart = prober_.findRestart(from, top.wide, frames_.size() == 1, top.limit);
+  uint64_t to = restart.offset;
+  if (!restart.gaveUp && to == top.limit && top.open && to == source_.size())
+  {
+    to = std::max(from + 1, prober_.zerosStart(from)); // zeros at the end belong to the file, not to the damage
+  }
+  Event& event = queue(What::damaged, from, to - from);
+  event.node = {};
+  event.code = code;
+  event.reason = std::move(reason);
+  if (restart.gaveUp)
+  {
+    event.what = What::unread;
+  }
+  position_ = to;
+  top.lastDamage = to;
+  afterDamage_ = true;
+}
+
+uint64_t Walker::countChild(uint16_t elm)
+{
+  Frame& top = frames_.back();
+  for (size_t i = top.counts; i < counts_.size(); ++i)
+  {
+    if (counts_[i].elm == elm)
+    {
+      return ++counts_[i].count;
+    }
+  }
+  if (counts_.size() - top.counts == kMaxCounts)
+  {
+    return 0;
+  }
+  counts_.push_back({elm, 1});
+  return 1;
+}
+
+std::string Walker::path(const Event& event) const
+{
+  std::string text;
+  const uint64_t depth = std::min<uint64_t>(event.depth, frames_.size() - 1);
+  for (uint64_t i = 1; i <= depth; ++i)
+  {
+    appendStep(text, frames_[static_cast<size_t>(i)].node);
+  }
+  if (event.node.header.hdrType != 0)
+  {
+    appendStep(text, event.node);
+  }
+  return text.empty() ? "/" : text;
+}
+
+} // namespace tav::tool

@@ -1,0 +1,144 @@
+/// @file walker.h
+/// A walk over any bytes as a stream: always forward, always to the end, every byte accounted for exactly once.
+#pragma once
+
+#include <array>
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "inspect/walk/node.h"
+#include "inspect/walk/prober.h"
+#include "inspect/walk/source.h"
+
+namespace tav::tool
+{
+
+/// What a piece of the file is. All but nodeEnd stand for bytes; the pieces of a file follow one another without gap or
+/// overlap.
+enum class What : uint8_t
+{
+  nodeBegin, ///< the header; the bytes are those of the header
+  payload,   ///< of a data element
+  extra,     ///< the two bytes behind a UTF-8 string that no size counts
+  padding,   ///< up to a multiple of 8
+  pair,      ///< a data element's eye/size pair, which has no header of its own
+  nodeEnd,   ///< no bytes; the node ends at `offset`
+  damaged,   ///< cannot be explained; see `reason`
+  zeros,     ///< to the end of the file, behind the last node: a file may be longer than its stream
+  skipped,   ///< the children of a group that were not asked for
+  unread     ///< to the end of the file; not looked at, because the budget was used up
+};
+
+/// How a node ended.
+enum class End : uint8_t
+{
+  closed,       ///< its size was used up
+  byEndElement, ///< a group of unknown size, by its end element
+  byParent,     ///< it goes on to the end of its parent
+  byFile        ///< it goes on to the end of the file
+};
+
+struct Event
+{
+  What what = What::unread;
+  uint64_t offset = 0;
+  uint64_t length = 0;
+  End end = End::closed;     ///< of nodeEnd
+  Node node{};               ///< that the piece belongs to; of damaged, zeros and unread: nothing
+  uint64_t depth = 0;        ///< of the node; of damaged: the depth that a node at this place would have
+  uint32_t code = TAV_RC_OK; ///< of damaged
+  std::string reason{};      ///< of damaged
+};
+
+inline constexpr uint64_t kNoBudget = ~uint64_t{0};
+
+/// Where a walk begins, and how much it may look for.
+struct WalkStart
+{
+  uint64_t offset = 0;
+  bool wide = true;            ///< header of the node there; only with an offset other than 0
+  uint64_t budget = kNoBudget; ///< bytes to look through in damaged regions and for zeros at the end
+};
+
+/// Walks a stream in pre-order and cuts it into events. Memory grows with the depth alone; every step moves forward,
+/// so that the walk ends whatever the bytes say.
+///
+/// Where bytes are no node, they are handed out as `damaged` up to the place where a node can start again: one that
+/// an eye/size pair leads back to, one behind a pair, one that looks as a writer makes it and is followed by another;
+/// at the latest the end of the group around them.
+class Walker
+{
+public:
+  Walker(ByteSource& source, const Form& form, WalkStart start = {});
+
+  /// The next event; false at the end of the file.
+  bool next(Event& event);
+
+  /// Directly after the nodeBegin of a group: hands out its children as one `skipped` piece. False, and no effect, for
+  /// a group whose end is not known without walking it.
+  bool skip();
+
+  /// The path of the event's node, which must be the event returned last (or one of the same node before). Every
+  /// command takes it as input: steps are tags, or ids where a tag is not unique, and the how-manieth of its name.
+  std::string path(const Event& event) const;
+
+  const Form& form() const { return form_; }
+  /// UTF-8 strings so far with and without the two extra bytes, where the bytes around told.
+  uint64_t stringsWithExtra() const { return withExtra_; }
+  uint64_t stringsWithoutExtra() const { return withoutExtra_; }
+  /// Bytes looked through in search of nodes.
+  uint64_t spent() const { return prober_.spent(); }
+
+private:
+  struct Count
+  {
+    uint16_t elm;
+    uint64_t count;
+  };
+  struct Frame
+  {
+    Node node{};
+    uint64_t limit = 0;
+    size_t counts = 0;       ///< where its children's counts begin
+    uint64_t lastDamage = 0; ///< end of the last damaged piece among its children
+    bool wide = false;       ///< children have 64-bit headers
+    bool open = false;       ///< an end element ends it
+  };
+
+  void step();
+  void endGroup(End end);
+  void endByLimit();
+  bool endByZeros();
+  void begin(TAVHeader& header);
+  void beginGroup(Node& node);
+  bool holdsNodes(TAVHeader group, uint64_t limit);
+  bool isStrange(const TAVHeader& header);
+  bool looksUnfinished(const Node& node, const Frame& parent);
+  void takeData(Node& node);
+  bool extraBehind(const Node& node, uint64_t base, uint64_t limit);
+  void takePair(Node& node, uint64_t limit);
+  void afterEndElement(const Node& node);
+  void damage(uint64_t from, uint32_t code, std::string reason);
+  std::string whyNot(const TAVHeader& header, uint64_t limit) const;
+  uint64_t countChild(uint16_t elm);
+  Event& queue(What what, uint64_t offset, uint64_t length);
+
+  ByteSource& source_;
+  Form form_;
+  Prober prober_;
+  std::vector<Frame> frames_{}; ///< the first stands for the file
+  std::vector<Count> counts_{};
+  uint64_t position_;
+  uint64_t withExtra_ = 0;
+  uint64_t withoutExtra_ = 0;
+  bool afterDamage_ = false;
+  bool endPending_ = false; ///< the group on top was ended by its end element
+  bool done_ = false;
+  bool canSkip_ = false;
+  std::array<Event, 8> queue_{};
+  size_t queueHead_ = 0;
+  size_t queueCount_ = 0;
+};
+
+} // namespace tav::tool

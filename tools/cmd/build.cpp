@@ -1,0 +1,77 @@
+// tav build: a stream from JSON.
+#include <cstdio>
+
+#include "inspect/json/encoder.h"
+#include "inspect/json/reader.h"
+#include "kor/host.h"
+#include "tools/shell/options.h"
+#include "tools/shell/output.h"
+#include "tools/shell/patchFile.h"
+#include "tools/shell/report.h"
+#include "tools/shell/session.h"
+
+namespace tav::tool
+{
+
+namespace
+{
+
+Conversion conversionOf(const Invocation& invocation)
+{
+  const FormChoice choice = formChoice(invocation);
+  return {choice.swapped, choice.root64, choice.aligned, invocation.has("--eye-size")};
+}
+
+int run(const Invocation& invocation)
+{
+  const std::string input = invocation.arguments().empty() ? "-" : invocation.arguments().front();
+  const std::string output = invocation.text("--output", "-");
+  if (output == "-" && kor::isTerminal(stdout))
+  {
+    throw Failure("build: a stream is no text for a terminal", "-o FILE writes it to a file");
+  }
+  const Conversion conversion = conversionOf(invocation);
+  TextSource text(input);
+  Output out(output, invocation.has("--force"));
+  PatchFile file(out);
+  StreamEncoder encoder(file, conversion);
+  DocumentReader(text, encoder).read();
+  file.finish();
+  if (encoder.leftOut() != 0)
+  {
+    report(Problem{.file = text.name(),
+                   .sentence = counted(encoder.leftOut(), "damaged place") + " of " + byteText(encoder.leftOutBytes()) +
+                               " left out: what is no node cannot be converted",
+                   .hint = "without --byte-order, --root, --align and --eye-size they are kept as they are"});
+    return kFindings;
+  }
+  return kFine;
+}
+
+const Registration registration{{
+    .place = 80,
+    .name = "build",
+    .arguments = "[JSON]",
+    .summary = "a stream from JSON",
+    .description =
+        "Makes the stream that a document of 'tav json' describes, byte for byte; standard input unless JSON is\n"
+        "given. Documents can be written by hand: names of elements with their values suffice, as in\n"
+        "{\"system\": {\"host\": {\"hostName\": \"ada\", \"cpuOnline\": 8}}}; an array stands for several elements\n"
+        "of the name; types are chosen from the values; keys with $ are properties ($type, $eyeSize).\n"
+        "docs/json.md describes every key.\n\n"
+        "--byte-order, --root, --align, --no-align and --eye-size convert: then sizes, pairs and paddings are\n"
+        "made anew, and what is no node is left out, with exit status 1.",
+    .options = {{.names = "-o,--output",
+                 .kind = ValueKind::file,
+                 .value = "FILE",
+                 .help = "where to; standard output unless given"},
+                {.names = "--eye-size", .help = "end every node with an eye/size pair"}},
+    .examples = {{"tav json x.tav | tav build -o y.tav", "the same bytes again"},
+                 {"tav json x.tav | tav build --byte-order big --align -o y.tav", "convert a stream"},
+                 {"echo '{\"system\": {\"host\": {\"hostName\": \"ada\"}}}' | tav build -o x.tav", "a stream by hand"}},
+    .run = run,
+}};
+
+} // namespace
+
+} // namespace tav::tool

@@ -1,0 +1,259 @@
+// tav get: values by path.
+#include <algorithm>
+#include <memory>
+
+#include <nlohmann/json.hpp>
+
+#include "inspect/json/text.h"
+#include "inspect/path/locate.h"
+#include "inspect/path/path.h"
+#include "inspect/text/value.h"
+#include "inspect/walk/walker.h"
+#include "kor/host.h"
+#include "tools/shell/options.h"
+#include "tools/shell/output.h"
+#include "tools/shell/progress.h"
+#include "tools/shell/report.h"
+#include "tools/shell/session.h"
+
+namespace tav::tool
+{
+
+namespace
+{
+
+constexpr uint64_t kMostText = uint64_t{1024} * 1024; ///< longer values are copied piece by piece
+
+/// A path with what was found so far.
+struct Wanted
+{
+  explicit Wanted(const std::string& text)
+      : path(text), matcher(path) {}
+
+  Path path;
+  PathMatcher matcher;
+  uint64_t found = 0;
+};
+
+class Getter
+{
+public:
+  explicit Getter(const Invocation& invocation)
+      : stream_(openStream(invocation)), out_("-"), raw_(invocation.has("--raw")), json_(invocation.has("--json")),
+        all_(invocation.has("--all")), paths_(invocation.has("--paths")), terminal_(kor::isTerminal(stdout))
+  {
+    if (raw_ && terminal_)
+    {
+      throw Failure("get: the bytes of --raw are no text for a terminal", "'> FILE' writes them to a file");
+    }
+    if (raw_ && json_)
+    {
+      throw Failure("get: --raw and --json exclude each other");
+    }
+    for (size_t i = 1; i < invocation.arguments().size(); ++i)
+    {
+      wanted_.push_back(std::make_unique<Wanted>(invocation.arguments()[i]));
+    }
+  }
+
+  Status run(const Invocation& invocation)
+  {
+    Walker walker(stream_.bytes(), stream_.form());
+    Progress progress("get", stream_.bytes());
+    Event event;
+    while (!isDone() && walker.next(event))
+    {
+      progress.at(event.offset);
+      if (event.what == What::nodeBegin)
+      {
+        visit(walker, event);
+      }
+    }
+    out_.commit();
+    tellStatistics(invocation, stream_.bytes());
+    Status status = kFine;
+    for (const auto& wanted : wanted_)
+    {
+      if (wanted->found == 0)
+      {
+        status = kFindings;
+        report(wanted->path.noMatch(stream_.bytes().name()));
+      }
+    }
+    return status;
+  }
+
+private:
+  bool isDone() const
+  {
+    return !all_ && std::all_of(wanted_.begin(), wanted_.end(), [](const auto& wanted) { return wanted->found != 0; });
+  }
+
+  void visit(Walker& walker, const Event& event)
+  {
+    bool reaches = false;
+    for (const auto& wanted : wanted_)
+    {
+      const bool matches = wanted->matcher.matches(event.node);
+      const bool open = all_ || wanted->found == 0;
+      if (matches && open)
+      {
+        ++wanted->found;
+        put(walker, event);
+      }
+      reaches = reaches || ((all_ || wanted->found == 0) && wanted->matcher.reachesBelow());
+    }
+    if (event.node.isGroup() && !reaches)
+    {
+      walker.skip();
+    }
+  }
+
+  void put(const Walker& walker, const Event& event)
+  {
+    const Node& node = event.node;
+    if (raw_)
+    {
+      copyPayload(node);
+      return;
+    }
+    if (json_)
+    {
+      putJson(walker, event);
+      return;
+    }
+    if (paths_)
+    {
+      out_.write(walker.path(event) + "\t");
+    }
+    if (node.isGroup())
+    {
+      // A group has no value; its path and size tell that it is there.
+      out_.write((paths_ ? "" : walker.path(event) + ": ") + "group of " +
+                 counted(node.limit - node.payloadOffset(), "byte"));
+    }
+    else if (const auto text = plainText(stream_.bytes(), stream_.form(), node, kMostText))
+    {
+      out_.write(terminal_ ? forTerminal(*text) : *text);
+    }
+    else
+    {
+      terminal_ ? showPayload(node) : copyPayload(node);
+    }
+    out_.write("\n");
+  }
+
+  void putJson(const Walker& walker, const Event& event)
+  {
+    const Node& node = event.node;
+    nlohmann::ordered_json object;
+    object["path"] = walker.path(event);
+    object["offset"] = node.offset();
+    object["size"] = node.size();
+    object["type"] = typeText(node.type());
+    if (!node.isGroup())
+    {
+      object["value"] = jsonValue(node);
+    }
+    std::string text = object.dump();
+    if (terminal_ && forTerminal(text) != text)
+    {
+      text = object.dump(-1, ' ', true);
+    }
+    out_.write(text + "\n");
+  }
+
+  nlohmann::ordered_json jsonValue(const Node& node)
+  {
+    const std::string text = plainText(stream_.bytes(), stream_.form(), node, ~uint64_t{0}).value_or("");
+    const uint16_t type = node.type();
+    const auto& info = layout::typeInfo(type);
+    const bool number = type >= TAV_TYPE_UINT8 && type <= TAV_TYPE_SINT64 && info.valueSize == node.size();
+    if (number)
+    {
+      return nlohmann::ordered_json::parse(text);
+    }
+    if (!isUtf8(text))
+    {
+      const std::string escaped = tool::quoted(text);
+      return escaped.substr(1, escaped.size() - 2);
+    }
+    return text;
+  }
+
+  void copyPayload(const Node& node)
+  {
+    const uint64_t end = node.isGroup() ? node.limit : node.payloadOffset() + node.size();
+    for (uint64_t at = node.payloadOffset(); at < end;)
+    {
+      const auto piece = stream_.bytes().view(at);
+      if (piece.empty())
+      {
+        return;
+      }
+      const auto count = static_cast<size_t>(std::min<uint64_t>(piece.size(), end - at));
+      out_.write(piece.first(count));
+      at += count;
+    }
+  }
+
+  void showPayload(const Node& node)
+  {
+    constexpr size_t most = size_t{64} * 1024;
+    const uint64_t end = node.payloadOffset() + node.size();
+    std::vector<uint8_t> bytes;
+    for (uint64_t at = node.payloadOffset(); at < end;)
+    {
+      bytes.resize(static_cast<size_t>(std::min<uint64_t>(most + 4, end - at)));
+      bytes.resize(stream_.bytes().read(at, bytes));
+      const std::string_view text(reinterpret_cast<const char*>(bytes.data()), bytes.size());
+      const size_t count = cutAtCharacter(text, most);
+      if (count == 0)
+      {
+        return; // the file became shorter
+      }
+      out_.write(forTerminal(text.substr(0, count)));
+      at += count;
+    }
+  }
+
+  Stream stream_;
+  Output out_;
+  bool raw_;
+  bool json_;
+  bool all_;
+  bool paths_;
+  bool terminal_; ///< of which nothing that a stream holds may take hold
+  std::vector<std::unique_ptr<Wanted>> wanted_{};
+};
+
+int run(const Invocation& invocation)
+{
+  return Getter(invocation).run(invocation);
+}
+
+const Registration registration{{
+    .place = 50,
+    .name = "get",
+    .arguments = "FILE PATH...",
+    .summary = "values by path",
+    .description =
+        "Prints the value of the first node that each path leads to, in the order of the stream, one a line:\n"
+        "texts as they are, numbers in decimal, bytes in hexadecimal. A path is made of tags, enum names or\n"
+        "ids (#12345); [2] is the second of its name among its siblings, * any one node, ** any number of\n"
+        "levels; / alone leads to the roots. Every path that any command prints is understood. On a terminal\n"
+        "control characters of texts are written as \\x1b, as 'tav tree' does. Exit status 1: a path leads nowhere,\n"
+        "also by a name that no element has; the values of the others are printed. 2: a path is malformed.",
+    .options = {{.names = "-a,--all", .help = "every node that a path leads to, not only the first"},
+                {.names = "--raw", .help = "the payload's bytes as they stand in the file, without line ends"},
+                {.names = "--json", .help = "one JSON object a match: path, offset, size, type, value"},
+                {.names = "--paths", .help = "each value behind its path and a tab"}},
+    .examples = {{"tav get x.tav /system/host/hostName", "one value"},
+                 {"tav get x.tav --all --paths '**/hostName'", "every host name in the file, with its path"},
+                 {"tav get x.tav --raw '/system/host[2]/#60123' > bytes", "the bytes of a value"}},
+    .run = run,
+}};
+
+} // namespace
+
+} // namespace tav::tool

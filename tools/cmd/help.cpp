@@ -1,0 +1,76 @@
+// tav help and tav completion: what the table of options says of the program.
+#include <algorithm>
+
+#include "tools/shell/options.h"
+#include "tools/shell/output.h"
+#include "tools/shell/report.h"
+
+namespace tav::tool
+{
+
+namespace
+{
+
+int print(const std::string& text)
+{
+  Output out("-");
+  out.write(text);
+  out.commit();
+  return kFine;
+}
+
+int help(const Invocation& invocation)
+{
+  if (invocation.has("--man"))
+  {
+    return print(manualPage());
+  }
+  if (invocation.arguments().empty())
+  {
+    return print(helpText());
+  }
+  const auto all = commands();
+  const auto found = std::find_if(all.begin(), all.end(), [&](const Command* command) {
+    return command->name == invocation.arguments().front();
+  });
+  if (found == all.end())
+  {
+    throw Failure("there is no command '" + invocation.arguments().front() + "'", "'tav --help' lists the commands");
+  }
+  return print(helpText(**found));
+}
+
+int complete(const Invocation& invocation)
+{
+  const std::string text = completion(invocation.arguments().front());
+  if (text.empty())
+  {
+    throw Failure("there is no completion for '" + invocation.arguments().front() + "'",
+                  "the shells are bash, zsh and fish");
+  }
+  return print(text);
+}
+
+const Registration helpRegistration{{
+    .place = 200,
+    .name = "help",
+    .arguments = "[COMMAND]",
+    .inputs = 0,
+    .summary = "this list, or help on one command",
+    .options = {{.names = "--man", .help = "the manual page, for man -l -"}},
+    .run = help,
+}};
+
+const Registration completionRegistration{{
+    .place = 210,
+    .name = "completion",
+    .arguments = "bash|zsh|fish",
+    .inputs = 0,
+    .summary = "completion for bash, zsh or fish",
+    .examples = {{"source <(tav completion bash)", "complete commands and options in this shell"}},
+    .run = complete,
+}};
+
+} // namespace
+
+} // namespace tav::tool

@@ -1,0 +1,275 @@
+// tav recover: a sound stream of what is whole in a damaged one.
+#include <deque>
+#include <optional>
+#include <utility>
+#include <vector>
+
+#include <nlohmann/json.hpp>
+
+#include "inspect/recover/recovery.h"
+#include "tools/shell/options.h"
+#include "tools/shell/output.h"
+#include "tools/shell/progress.h"
+#include "tools/shell/report.h"
+#include "tools/shell/session.h"
+
+namespace tav::tool
+{
+
+namespace
+{
+
+constexpr size_t kMostListed = 1000; ///< losses that are listed; the totals have all
+
+/// What came of one way of reading.
+struct Account
+{
+  Form form{};
+  RecoveryTotals totals{};
+  std::deque<Loss> losses{};
+  uint64_t bytes = 0;
+  uint64_t written = 0;
+
+  bool lostNothing() const { return totals.lost + totals.unread == 0; }
+  /// Nodes come first. Bytes say nothing of padding: with it, damaged ones are taken for some.
+  bool keepsMoreThan(const Account& other) const
+  {
+    const bool likePadding = form.swapped == other.form.swapped && form.root64 == other.form.root64;
+    return totals.nodes != other.totals.nodes ? totals.nodes > other.totals.nodes
+                                              : !likePadding && totals.kept > other.totals.kept;
+  }
+};
+
+/// The way that was taken, and the other one that was tried where it was in doubt.
+struct Outcome
+{
+  Account taken{};
+  std::optional<Account> other{};
+  std::vector<Form> alternatives{}; ///< that were about as likely at the first look
+};
+
+nlohmann::ordered_json formJson(const Form& form)
+{
+  return {{"byteOrder", orderText(form)}, {"root", form.root64 ? 64 : 32}, {"aligned", form.aligned}};
+}
+
+std::string asJson(const std::string& name, const Outcome& outcome)
+{
+  const Account& account = outcome.taken;
+  const RecoveryTotals& totals = account.totals;
+  nlohmann::ordered_json object;
+  object["file"] = name;
+  object["form"] = formJson(account.form);
+  if (outcome.other)
+  {
+    object["otherForm"] = formJson(outcome.other->form);
+    object["otherForm"]["nodes"] = outcome.other->totals.nodes;
+    object["otherForm"]["kept"] = outcome.other->totals.kept;
+  }
+  object["bytes"] = account.bytes;
+  object["kept"] = totals.kept;
+  object["lost"] = totals.lost;
+  object["unread"] = totals.unread;
+  object["zerosKept"] = totals.zeros;
+  object["written"] = account.written;
+  object["nodes"] = totals.nodes;
+  object["groupsClosed"] = totals.closed;
+  object["groupsMade"] = totals.made;
+  object["pairsMade"] = totals.pairs;
+  object["losses"] = totals.losses;
+  object["list"] = nlohmann::ordered_json::array();
+  for (const Loss& loss : account.losses)
+  {
+    object["list"].push_back({{"offset", loss.offset}, {"length", loss.length}, {"reason", loss.reason}});
+  }
+  return object.dump(1, ' ', false, nlohmann::json::error_handler_t::replace) + "\n";
+}
+
+/// What was guessed, where something spoke for another way.
+std::string doubtText(const std::string& name, const Outcome& outcome)
+{
+  std::string text;
+  if (outcome.other)
+  {
+    const Account& other = *outcome.other;
+    text = "tav: " + name + ": the form is a guess: read as " + formText(other.form) + ", " +
+           counted(other.totals.nodes, "node") + " and " + counted(other.totals.kept, "byte") + " would be kept\n";
+  }
+  for (const Form& form : outcome.alternatives)
+  {
+    if (form != outcome.taken.form && !(outcome.other && form == outcome.other->form))
+    {
+      text += "tav: " + name + ": the form is a guess: " + formText(form) + " is about as likely\n";
+    }
+  }
+  return text;
+}
+
+std::string asText(const std::string& name, const Outcome& outcome)
+{
+  const Account& account = outcome.taken;
+  const RecoveryTotals& totals = account.totals;
+  std::string text = "tav: " + name + ": " + formText(account.form) + "\n" + doubtText(name, outcome);
+  for (const Loss& loss : account.losses)
+  {
+    text += "tav: " + name + ": " + hexOffset(loss.offset) + ": " + counted(loss.length, "byte") +
+            " lost: " + loss.reason + "\n";
+  }
+  if (totals.losses > account.losses.size())
+  {
+    text += "tav: " + name + ": and " + std::to_string(totals.losses - account.losses.size()) + " more losses\n";
+  }
+  text += "nodes            " + std::to_string(totals.nodes) + "\n" +
+          "groups closed    " + std::to_string(totals.closed) + ", of open groups and such with a wrong size\n" +
+          "groups made      " + std::to_string(totals.made) + ", for nodes that have lost their own\n" +
+          "pairs made       " + std::to_string(totals.pairs) + "\n" +
+          "bytes            " + std::to_string(account.bytes) + " = " + std::to_string(totals.kept) + " kept + " +
+          std::to_string(totals.lost) + " lost + " + std::to_string(totals.unread) + " unread\n" +
+          "written          " + std::to_string(account.written) + "\n";
+  return text;
+}
+
+void putReport(const Invocation& invocation, const std::string& output, const std::string& text)
+{
+  if (invocation.has("--report"))
+  {
+    Output out(invocation.text("--report"), invocation.has("--force"));
+    out.write(text);
+    out.commit();
+    return;
+  }
+  if (output == "-")
+  {
+    std::fputs(text.c_str(), stderr);
+    return;
+  }
+  Output out("-");
+  out.write(text);
+  out.commit();
+}
+
+Account recoverInto(const Invocation& invocation, ByteSource& source, const Form& form, PatchFile& file)
+{
+  Account account;
+  account.form = form;
+  Progress progress("recover", source.size());
+  Rebuilder rebuilder(source, form, file, [&](uint64_t offset) { progress.at(offset); });
+  Recovery recovery(source, form, rebuilder, invocation.number("--search").value_or(kNoOffset),
+                    [&](const Loss& loss) {
+                      if (account.losses.size() < kMostListed)
+                      {
+                        account.losses.push_back(loss);
+                      }
+                    });
+  while (recovery.step())
+  {
+    progress.at(recovery.position());
+  }
+  account.totals = recovery.totals();
+  account.bytes = source.size();
+  account.written = file.length();
+  return account;
+}
+
+void copy(PatchFile& from, PatchFile& to)
+{
+  std::vector<uint8_t> piece(size_t{64} * 1024);
+  for (uint64_t at = 0; at < from.length();)
+  {
+    const size_t count = from.read(at, piece);
+    to.append(std::span<const uint8_t>(piece).first(count));
+    at += count;
+  }
+}
+
+/// Where another way of reading is not far off, both are tried, and the one that keeps more is taken; of equals the
+/// likelier one.
+Outcome recoverBest(const Invocation& invocation, Stream& stream, PatchFile& file)
+{
+  const Recognition& found = stream.recognition;
+  Outcome outcome{.alternatives = found.alternatives};
+  if (!found.runnerUp)
+  {
+    outcome.taken = recoverInto(invocation, stream.bytes(), found.form, file);
+    return outcome;
+  }
+  PatchFile first;
+  outcome.taken = recoverInto(invocation, stream.bytes(), found.form, first);
+  if (outcome.taken.lostNothing())
+  {
+    copy(first, file);
+    return outcome;
+  }
+  PatchFile second;
+  outcome.other = recoverInto(invocation, stream.bytes(), *found.runnerUp, second);
+  const bool swap = outcome.other->keepsMoreThan(outcome.taken);
+  if (swap)
+  {
+    std::swap(outcome.taken, *outcome.other);
+  }
+  copy(swap ? second : first, file);
+  return outcome;
+}
+
+int run(const Invocation& invocation)
+{
+  const std::string output = invocation.text("--output");
+  if (output.empty())
+  {
+    throw Failure("recover: -o OUT is missing", "- is standard output");
+  }
+  Stream stream = openStream(invocation, invocation.arguments().front(), true);
+  Outcome outcome;
+  {
+    Output out(output, invocation.has("--force"));
+    PatchFile file(out);
+    outcome = recoverBest(invocation, stream, file);
+    if (outcome.taken.totals.nodes == 0)
+    {
+      Problem problem{stream.source->name()};
+      problem.sentence = "nothing in it is whole";
+      problem.hint = "'tav info' tells what was tried; --byte-order, --root and --align say how to read it";
+      throw Failure(kTooDamaged, problem);
+    }
+    file.finish();
+  }
+  const std::string& name = stream.source->name();
+  putReport(invocation, output, invocation.has("--json") ? asJson(name, outcome) : asText(name, outcome));
+  tellStatistics(invocation, stream.bytes());
+  const RecoveryTotals& totals = outcome.taken.totals;
+  return totals.lost + totals.unread + totals.closed + totals.made + totals.pairs == 0 ? kFine : kFindings;
+}
+
+const Registration registration{{
+    .place = 100,
+    .name = "recover",
+    .arguments = "FILE",
+    .summary = "what can be saved of a damaged or unfinished stream",
+    .description =
+        "Writes a sound stream of all nodes that are whole: groups are closed, sizes, paddings and eye/size pairs\n"
+        "made anew. A group whose header is lost comes back by its end element, under the name docRoot; so do nodes "
+        "that\n"
+        "have lost all groups around them. The report accounts for every byte: kept + lost + unread is the file's "
+        "size.\n"
+        "Where the form is in doubt and something is lost, a second one is tried; the one that keeps more nodes is\n"
+        "taken, and the report says that it is a guess. --byte-order, --root and --align tell the form.\n"
+        "Exit status 1: something was lost or repaired; 3: nothing is whole, and no file is written.",
+    .options = {{.names = "-o,--output",
+                 .kind = ValueKind::file,
+                 .value = "OUT",
+                 .help = "where the sound stream goes; - is standard output",
+                 .required = true},
+                {.names = "--json", .help = "the report as JSON"},
+                {.names = "--report", .kind = ValueKind::file, .value = "FILE", .help = "write the report to FILE"},
+                {.names = "--search",
+                 .kind = ValueKind::number,
+                 .value = "BYTES",
+                 .help = "give up searching for nodes after so many bytes; the rest is unread"}},
+    .examples = {{"tav recover damaged.tav -o x.tav", "save what is whole"},
+                 {"tav recover damaged.tav -o x.tav --json --report lost.json", "with an account of every byte"}},
+    .run = run,
+}};
+
+} // namespace
+
+} // namespace tav::tool

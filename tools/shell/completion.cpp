@@ -1,0 +1,181 @@
+// The completions for shells that are made from the table of options.
+#include "tools/shell/options.h"
+
+namespace tav::tool
+{
+
+namespace
+{
+
+/// All names of an option: "-o", "--output".
+std::vector<std::string> namesOf(const OptionSpec& option)
+{
+  const size_t comma = option.names.find(',');
+  if (comma == std::string::npos)
+  {
+    return {option.names};
+  }
+  return {option.names.substr(0, comma), option.names.substr(comma + 1)};
+}
+
+std::string joined(const std::vector<std::string>& words, const std::string& between)
+{
+  std::string text;
+  for (const std::string& word : words)
+  {
+    text += (text.empty() ? "" : between) + word;
+  }
+  return text;
+}
+
+std::string commandNames()
+{
+  std::vector<std::string> names;
+  for (const Command* command : commands())
+  {
+    names.push_back(command->name);
+  }
+  return joined(names, " ");
+}
+
+std::vector<OptionSpec> optionsOf(const Command& command)
+{
+  std::vector<OptionSpec> options = command.options;
+  options.insert(options.end(), globalOptions().begin(), globalOptions().end());
+  return options;
+}
+
+/// Single quotes for a shell.
+std::string inQuotes(const std::string& text)
+{
+  std::string out = "'";
+  for (const char c : text)
+  {
+    out += c == '\'' ? std::string("'\\''") : std::string(1, c);
+  }
+  return out + "'";
+}
+
+std::string bashChoices(const Command& command)
+{
+  std::string text;
+  for (const OptionSpec& option : optionsOf(command))
+  {
+    if (option.kind == ValueKind::choice)
+    {
+      text += "    " + command.name + ":" + joined(namesOf(option), "|" + command.name + ":") +
+              ") COMPREPLY=($(compgen -W '" + joined(option.choices, " ") + "' -- \"$word\")); return ;;\n";
+    }
+  }
+  return text;
+}
+
+std::string bash()
+{
+  std::string text = "# bash completion for tav\n_tav()\n{\n  local word=${COMP_WORDS[COMP_CWORD]} "
+                     "before=${COMP_WORDS[COMP_CWORD-1]}\n"
+                     "  local command=${COMP_WORDS[1]}\n  COMPREPLY=()\n  if ((COMP_CWORD == 1)); then\n"
+                     "    COMPREPLY=($(compgen -W '" +
+                     commandNames() +
+                     " --help --version' -- \"$word\"))\n    return\n  fi\n  case $command:$before in\n";
+  for (const Command* command : commands())
+  {
+    text += bashChoices(*command);
+  }
+  text += "  esac\n  if [[ $word == -* ]]; then\n    case $command in\n";
+  for (const Command* command : commands())
+  {
+    std::vector<std::string> names;
+    for (const OptionSpec& option : optionsOf(*command))
+    {
+      names.push_back(joined(namesOf(option), " "));
+    }
+    text += "      " + command->name + ") COMPREPLY=($(compgen -W '" + joined(names, " ") + "' -- \"$word\")) ;;\n";
+  }
+  return text +
+         "    esac\n    return\n  fi\n  COMPREPLY=($(compgen -f -- \"$word\"))\n}\ncomplete -o filenames -F _tav tav\n";
+}
+
+std::string zshOption(const OptionSpec& option)
+{
+  std::string text;
+  std::string help;
+  for (const char c : option.help)
+  {
+    help += c == '[' || c == ']' || c == ':' ? std::string("\\") + c : std::string(1, c);
+  }
+  for (const std::string& name : namesOf(option))
+  {
+    std::string spec = option.many ? "*" : "";
+    spec.append(name).append("[").append(help).append("]");
+    if (option.kind != ValueKind::flag)
+    {
+      spec += ":" + option.value + ":";
+      spec += option.kind == ValueKind::file     ? "_files"
+              : option.kind == ValueKind::choice ? "(" + joined(option.choices, " ") + ")"
+                                                 : "";
+    }
+    text += " \\\n        " + inQuotes(spec);
+  }
+  return text;
+}
+
+std::string zsh()
+{
+  std::string text = "#compdef tav\n_tav()\n{\n  local -a commands\n  commands=(\n";
+  for (const Command* command : commands())
+  {
+    text += "    " + inQuotes(command->name + ":" + command->summary) + "\n";
+  }
+  text += "  )\n  if ((CURRENT == 2)); then\n    _describe command commands\n    return\n  fi\n  case $words[2] in\n";
+  for (const Command* command : commands())
+  {
+    text += "    " + command->name + ")\n      shift words; ((CURRENT--))\n      _arguments";
+    for (const OptionSpec& option : optionsOf(*command))
+    {
+      text += zshOption(option);
+    }
+    text += " \\\n        '*:file:_files'\n      ;;\n";
+  }
+  return text + "  esac\n}\n_tav \"$@\"\n";
+}
+
+std::string fishOption(const std::string& condition, const OptionSpec& option)
+{
+  std::string text = "complete -c tav -n " + inQuotes(condition);
+  for (const std::string& name : namesOf(option))
+  {
+    text += name.starts_with("--") ? " -l " + name.substr(2) : " -s " + name.substr(1);
+  }
+  if (option.kind != ValueKind::flag)
+  {
+    text += option.kind == ValueKind::file ? " -r -F" : " -x";
+    text += option.kind == ValueKind::choice ? " -a " + inQuotes(joined(option.choices, " ")) : "";
+  }
+  return text + " -d " + inQuotes(option.help) + "\n";
+}
+
+std::string fish()
+{
+  std::string text = "# fish completion for tav\n";
+  for (const Command* command : commands())
+  {
+    text += "complete -c tav -n __fish_use_subcommand -a " + command->name + " -d " + inQuotes(command->summary) + "\n";
+    for (const OptionSpec& option : optionsOf(*command))
+    {
+      text += fishOption("__fish_seen_subcommand_from " + command->name, option);
+    }
+  }
+  return text;
+}
+
+} // namespace
+
+std::string completion(std::string_view shell)
+{
+  return shell == "bash" ? bash() : shell == "zsh" ? zsh()
+                                : shell == "fish"  ? fish()
+                                                   : std::string();
+}
+
+} // namespace tav::tool

@@ -1,0 +1,68 @@
+#include "tools/shell/session.h"
+
+#include <cstdio>
+
+#include "tools/shell/report.h"
+
+namespace tav::tool
+{
+
+FormChoice formChoice(const Invocation& invocation)
+{
+  FormChoice choice;
+  if (const std::string order = invocation.text("--byte-order"); !order.empty())
+  {
+    choice.swapped = order == "swapped" || (order == "little" && !kor::isLittleEndian) ||
+                     (order == "big" && kor::isLittleEndian);
+  }
+  if (invocation.has("--root"))
+  {
+    choice.root64 = invocation.text("--root") == "64";
+  }
+  if (invocation.has("--align") && invocation.has("--no-align"))
+  {
+    throw Failure("--align and --no-align exclude each other");
+  }
+  if (invocation.has("--align") || invocation.has("--no-align"))
+  {
+    choice.aligned = invocation.has("--align");
+  }
+  return choice;
+}
+
+uint64_t ringBytes(const Invocation& invocation)
+{
+  return invocation.number("--ring").value_or(kDefaultRing);
+}
+
+Stream openStream(const Invocation& invocation, const std::string& path, bool lenient)
+{
+  Stream stream{ByteSource::open(path, ringBytes(invocation)), {}};
+  stream.recognition = recognise(*stream.source, formChoice(invocation));
+  if (!stream.recognition.isStream && !lenient)
+  {
+    Problem problem{stream.source->name()};
+    problem.sentence =
+        stream.source->size() == 0 ? "the file is empty" : "this is no stream, or nothing of it is whole";
+    problem.hint = "'tav info' tells what was tried; --byte-order, --root and --align say how to read it";
+    throw Failure(kTooDamaged, problem);
+  }
+  return stream;
+}
+
+Stream openStream(const Invocation& invocation)
+{
+  return openStream(invocation, invocation.arguments().at(0));
+}
+
+void tellStatistics(const Invocation& invocation, const ByteSource& source)
+{
+  if (invocation.has("--stats"))
+  {
+    std::fprintf(stderr, "tav: %s: %llu bytes read in %llu calls\n", source.name().c_str(),
+                 static_cast<unsigned long long>(source.bytesRead()),
+                 static_cast<unsigned long long>(source.readCalls()));
+  }
+}
+
+} // namespace tav::tool
