@@ -4,11 +4,11 @@
 #include <array>
 #include <utility>
 
+#include "inspect/text/phrases.h"
 #include "inspect/text/scan.h"
 #include "inspect/text/value.h"
-#include "tools/shell/report.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 using namespace tav::layout;
@@ -506,4 +506,4 @@ void Checker::checkZeros()
   }
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

@@ -10,7 +10,7 @@
 #include "inspect/check/rules.h"
 #include "inspect/walk/walker.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 struct Finding
@@ -87,4 +87,4 @@ private:
   bool deepTold_ = false;
 };
 
-} // namespace tav::tool
+} // namespace tav::inspect

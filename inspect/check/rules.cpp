@@ -4,10 +4,10 @@
 
 #include <nlohmann/json.hpp>
 
+#include "inspect/text/phrases.h"
 #include "tav/kor.h"
-#include "tools/shell/report.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 namespace
@@ -213,4 +213,4 @@ std::string rulesJson()
   return list.dump(1) + "\n";
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

@@ -9,7 +9,7 @@
 
 #include "tav/codes.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 enum class RuleId : uint8_t
@@ -74,4 +74,4 @@ std::string rulesMarkdown();
 /// The table as JSON, for scripts.
 std::string rulesJson();
 
-} // namespace tav::tool
+} // namespace tav::inspect

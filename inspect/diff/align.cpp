@@ -4,7 +4,7 @@
 #include <map>
 #include <unordered_map>
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 namespace
@@ -179,4 +179,4 @@ Pairs align(const std::vector<Child>& first, const std::vector<Child>& second)
   return Aligner(first, second).run();
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

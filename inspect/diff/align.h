@@ -8,7 +8,7 @@
 
 #include "inspect/diff/index.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 /// A child as the alignment sees it.
@@ -27,4 +27,4 @@ using Pairs = std::vector<std::pair<uint64_t, uint64_t>>;
 /// order, and between them one after the other. In the order of the first list, then what only the second has.
 Pairs align(const std::vector<Child>& first, const std::vector<Child>& second);
 
-} // namespace tav::tool
+} // namespace tav::inspect

@@ -3,11 +3,10 @@
 #include <algorithm>
 #include <cstring>
 
+#include "inspect/text/phrases.h"
 #include "inspect/text/value.h"
-#include "tools/shell/progress.h"
-#include "tools/shell/report.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 using namespace tav::layout;
@@ -42,8 +41,9 @@ Node nodeOf(const Row& row)
 
 } // namespace
 
-DiffIndex::DiffIndex(Stream& stream, const std::vector<Path>& ignored)
-    : stream_(stream)
+DiffIndex::DiffIndex(ByteSource& source, const Form& form, const std::vector<Path>& ignored,
+                     const ScratchMaker& makeFile, const std::function<void(uint64_t)>& progress)
+    : source_(source), form_(form), scratch_(makeFile()), file_(scratch_->file())
 {
   std::vector<PathMatcher> matchers;
   matchers.reserve(ignored.size());
@@ -51,12 +51,11 @@ DiffIndex::DiffIndex(Stream& stream, const std::vector<Path>& ignored)
   {
     matchers.emplace_back(path);
   }
-  Walker walker(stream.bytes(), stream.form());
-  Progress progress("diff " + name(), stream.bytes());
+  Walker walker(source, form);
   Event event;
   while (walker.next(event))
   {
-    progress.at(event.offset);
+    progress(event.offset);
     add(event, matchers);
   }
 }
@@ -186,10 +185,10 @@ uint64_t DiffIndex::payloadHash(const Row& row)
 
 std::vector<uint8_t> DiffIndex::piece(const Row& row, uint64_t at, uint64_t most)
 {
-  std::vector<uint8_t> bytes(static_cast<size_t>(std::min({most, row.size - at, stream_.bytes().size()})));
-  bytes.resize(stream_.bytes().read(row.payload + at, bytes));
+  std::vector<uint8_t> bytes(static_cast<size_t>(std::min({most, row.size - at, source_.size()})));
+  bytes.resize(source_.read(row.payload + at, bytes));
   const SwapRule rule = typeInfo(row.type).swapRule;
-  if (!stream_.form().swapped || row.isDamaged() || (at != 0 && rule != SwapRule::all64))
+  if (!form_.swapped || row.isDamaged() || (at != 0 && rule != SwapRule::all64))
   {
     return bytes;
   }
@@ -257,7 +256,7 @@ std::string DiffIndex::value(const Row& row, uint64_t most)
     const std::string bytes = hexText(piece(row, 0, std::min<uint64_t>(most, 32)));
     return bytes + (row.size > 32 ? " ..." : "");
   }
-  return valueText(stream_.bytes(), stream_.form(), nodeOf(row), most);
+  return valueText(source_, form_, nodeOf(row), most);
 }
 
 std::string DiffIndex::kindText(const Row& row)
@@ -276,4 +275,4 @@ std::string DiffIndex::text(uint64_t number)
   return kindText(at) + "  " + value(at, most);
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

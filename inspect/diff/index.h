@@ -8,11 +8,11 @@
 #include <string>
 #include <vector>
 
+#include "inspect/files/patchFile.h"
+#include "inspect/files/scratch.h"
 #include "inspect/path/path.h"
-#include "tools/shell/patchFile.h"
-#include "tools/shell/session.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 inline constexpr uint64_t kNoRow = ~uint64_t{0};
@@ -39,8 +39,10 @@ struct Row
 class DiffIndex
 {
 public:
-  /// Walks the stream. Nodes that a path of `ignored` leads to are left out, with all below them.
-  DiffIndex(Stream& stream, const std::vector<Path>& ignored);
+  /// Walks the stream. Nodes that a path of `ignored` leads to are left out, with all below them. Rows are kept in a
+  /// file of `makeFile`; `progress` is told how far the walk is, by offset.
+  DiffIndex(ByteSource& source, const Form& form, const std::vector<Path>& ignored, const ScratchMaker& makeFile,
+            const std::function<void(uint64_t)>& progress);
 
   uint64_t rows() const { return count_; }
   Row row(uint64_t number);
@@ -53,7 +55,7 @@ public:
   std::string text(uint64_t number);
   static std::string kindText(const Row& row);
   std::string value(const Row& row, uint64_t most);
-  std::string name() const { return stream_.source->name(); }
+  std::string name() const { return source_.name(); }
 
 private:
   struct Open
@@ -71,8 +73,10 @@ private:
   void append(const Row& row);
   void put(uint64_t number, const Row& row);
 
-  Stream& stream_;
-  PatchFile file_{};
+  ByteSource& source_;
+  Form form_;
+  std::unique_ptr<Scratch> scratch_;
+  PatchFile file_;
   uint64_t count_ = 0;
   uint64_t ignoredDepth_ = kNoRow; ///< of the node that is being left out
   std::vector<Open> open_{};
@@ -80,4 +84,4 @@ private:
   uint64_t windowStart_ = 0;
 };
 
-} // namespace tav::tool
+} // namespace tav::inspect

@@ -2,9 +2,10 @@
 
 #include <array>
 
-#include "tools/shell/report.h"
+#include "inspect/problem.h"
+#include "inspect/text/phrases.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 using namespace tav::layout;
@@ -17,7 +18,7 @@ void StreamEncoder::setForm(const Form& form)
   reorder_ = form_.swapped != form.swapped;
   if (conversion_.eyeSize && !form_.root64)
   {
-    throw Failure("build: eye/size pairs need 64-bit headers", "--root 64 makes them");
+    throw Error("build: eye/size pairs need 64-bit headers", "--root 64 makes them");
   }
 }
 
@@ -266,4 +267,4 @@ void StreamEncoder::putBehind(Draft& draft, uint64_t size)
   }
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

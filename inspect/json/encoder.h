@@ -9,10 +9,10 @@
 #include <string_view>
 #include <vector>
 
+#include "inspect/files/patchFile.h"
 #include "inspect/walk/node.h"
-#include "tools/shell/patchFile.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 /// Something that no stream can be made of; the place in the document is added by its reader.
@@ -137,4 +137,4 @@ uint16_t typeFor(const Draft& draft);
 /// The payload, in stream order, of a value that is complete. Throws BuildError when it is none of the type.
 std::string payloadFor(const Draft& draft, uint16_t type, bool swapped, bool reorder);
 
-} // namespace tav::tool
+} // namespace tav::inspect

@@ -4,10 +4,10 @@
 #include <utility>
 
 #include "inspect/path/path.h"
+#include "inspect/problem.h"
 #include "inspect/text/value.h"
-#include "tools/shell/report.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 uint16_t elementNamed(std::string_view name)
@@ -24,10 +24,10 @@ uint16_t elementNamed(std::string_view name)
     {
       list += (list.empty() ? "#" : ", #") + std::to_string(id);
     }
-    throw BuildError("several elements have the name " + tool::quoted(name) + ": " + list);
+    throw BuildError("several elements have the name " + inspect::quoted(name) + ": " + list);
   }
   const std::string similar = similarNames(name);
-  throw BuildError("no element has the name " + tool::quoted(name) +
+  throw BuildError("no element has the name " + inspect::quoted(name) +
                    (similar.empty() ? "" : "; did you mean " + similar + "?"));
 }
 
@@ -38,7 +38,7 @@ void DocumentReader::fail(const std::string& sentence) const
                  std::to_string(source_.position());
   problem.path = pointer();
   problem.sentence = sentence;
-  throw Failure(kTrouble, problem);
+  throw Error(problem);
 }
 
 std::string DocumentReader::pointer() const
@@ -60,7 +60,7 @@ std::string DocumentReader::pointer() const
     }
   }
   // A key is any text; what steers terminals is written as escapes.
-  const std::string safe = tool::quoted(text);
+  const std::string safe = inspect::quoted(text);
   return safe.substr(1, safe.size() - 2);
 }
 
@@ -194,7 +194,7 @@ void DocumentReader::documentKey(const std::string& name)
   {
     if (formSet_ || lines_ || top().given)
     {
-      fail("the key " + tool::quoted(name) + " is not known here");
+      fail("the key " + inspect::quoted(name) + " is not known here");
     }
     // Without an envelope, every key is an element.
     beginNodes();
@@ -391,4 +391,4 @@ void DocumentReader::startArrayProperty(const std::string& name)
   push(bytes ? Where::bytes : Where::pieces);
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

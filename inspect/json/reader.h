@@ -3,10 +3,8 @@
 /// longest single text.
 #pragma once
 
-#include <cstdio>
 #include <istream>
 #include <optional>
-#include <streambuf>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -14,37 +12,10 @@
 #include <nlohmann/json.hpp>
 
 #include "inspect/json/encoder.h"
+#include "inspect/json/textSource.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
-
-/// The text of a document, which knows where it is being read.
-class TextSource : public std::streambuf
-{
-public:
-  /// "-" is standard input. Throws Failure when the file cannot be read.
-  explicit TextSource(const std::string& path);
-  ~TextSource() override;
-  TextSource(const TextSource&) = delete;
-  TextSource& operator=(const TextSource&) = delete;
-
-  const std::string& name() const { return name_; }
-  uint64_t position() const { return base_ + static_cast<uint64_t>(gptr() - eback()); }
-  uint64_t line() const;
-  /// Skips blanks; false at the end of the text.
-  bool skipBlanks();
-
-protected:
-  int_type underflow() override;
-
-private:
-  std::string name_;
-  std::FILE* file_;
-  bool standard_;
-  uint64_t base_ = 0;
-  uint64_t lines_ = 0; ///< before the buffer
-  std::vector<char> buffer_;
-};
 
 /// The one element of a name. Throws BuildError when there is none, or more than one.
 uint16_t elementNamed(std::string_view name);
@@ -70,7 +41,7 @@ public:
   DocumentReader(TextSource& text, StreamEncoder& encoder)
       : source_(text), encoder_(encoder) {}
 
-  /// Reads everything. Throws Failure, with the place, when the text is no JSON or describes no stream.
+  /// Reads everything. Throws Error, with the place, when the text is no JSON or describes no stream.
   void read();
 
   bool null() override;
@@ -152,4 +123,4 @@ private:
   TAVTimeStamp date_{};
 };
 
-} // namespace tav::tool
+} // namespace tav::inspect

@@ -1,17 +1,15 @@
 // The single values of a JSON document: properties, values, and the pieces of long ones.
 #include <algorithm>
-#include <cerrno>
 #include <charconv>
 #include <cstring>
 #include <utility>
 
 #include "inspect/json/reader.h"
 #include "inspect/json/text.h"
+#include "inspect/problem.h"
 #include "inspect/text/value.h"
-#include "kor/host.h"
-#include "tools/shell/report.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 namespace
@@ -30,7 +28,7 @@ Number wholeNumber(const std::string& name, const Scalar& value)
   const auto result = std::from_chars(value.text.data() + (hex ? 2 : 0), end, number, hex ? 16 : 10);
   if (!given || result.ec != std::errc() || result.ptr != end)
   {
-    throw BuildError(name + ": " + (value.kind == Scalar::Kind::null ? "null" : tool::quoted(value.text)) +
+    throw BuildError(name + ": " + (value.kind == Scalar::Kind::null ? "null" : inspect::quoted(value.text)) +
                      " is no number that fits");
   }
   return number;
@@ -160,7 +158,7 @@ void DocumentReader::documentValue(const std::string& name, const Scalar& value)
 {
   if (name == "tav" && (value.kind != Scalar::Kind::integer || value.text != std::to_string(kJsonVersion)))
   {
-    fail("this document is of another version: tav is " + tool::quoted(value.text) + ", not 1");
+    fail("this document is of another version: tav is " + inspect::quoted(value.text) + ", not 1");
   }
   if (name == "lines")
   {
@@ -194,7 +192,7 @@ void DocumentReader::formValue(const std::string& name, const Scalar& value)
   }
   else
   {
-    fail("the key " + tool::quoted(name) + " is not known here");
+    fail("the key " + inspect::quoted(name) + " is not known here");
   }
 }
 
@@ -213,7 +211,7 @@ void DocumentReader::property(const std::string& name, const Scalar& value)
   }
   if (begun)
   {
-    throw BuildError("the key " + tool::quoted(name) + " has no place in a node with children");
+    throw BuildError("the key " + inspect::quoted(name) + " has no place in a node with children");
   }
   valueProperty(name, value);
 }
@@ -244,7 +242,7 @@ bool DocumentReader::headerProperty(Properties& properties, const std::string& n
     const auto type = value.kind == Scalar::Kind::text ? jsonTypeOf(value.text) : wholeNumber<uint16_t>(name, value);
     if (!type)
     {
-      throw BuildError("there is no type " + tool::quoted(value.text));
+      throw BuildError("there is no type " + inspect::quoted(value.text));
     }
     properties.type = type;
   }
@@ -300,7 +298,7 @@ void DocumentReader::valueProperty(const std::string& name, const Scalar& value)
   }
   else
   {
-    throw BuildError("the key " + tool::quoted(name) + " is not known here");
+    throw BuildError("the key " + inspect::quoted(name) + " is not known here");
   }
 }
 
@@ -404,56 +402,8 @@ void DocumentReader::dateField(const std::string& name, const Scalar& value)
   }
   else
   {
-    throw BuildError("the key " + tool::quoted(name) + " is not known in a date");
+    throw BuildError("the key " + inspect::quoted(name) + " is not known in a date");
   }
 }
 
-TextSource::TextSource(const std::string& path)
-    : name_(path == "-" ? "standard input" : path), file_(path == "-" ? stdin : kor::openStream(path, "rb")),
-      standard_(path == "-"), buffer_(kBuffer)
-{
-  if (file_ == nullptr)
-  {
-    throw Failure(kTrouble, Problem{.file = name_, .sentence = std::strerror(errno)});
-  }
-  setg(buffer_.data(), buffer_.data(), buffer_.data());
-}
-
-TextSource::~TextSource()
-{
-  standard_ ? 0 : std::fclose(file_);
-}
-
-TextSource::int_type TextSource::underflow()
-{
-  if (gptr() < egptr())
-  {
-    return traits_type::to_int_type(*gptr());
-  }
-  base_ += static_cast<uint64_t>(egptr() - eback());
-  lines_ += static_cast<uint64_t>(std::count(eback(), egptr(), '\n'));
-  const size_t count = std::fread(buffer_.data(), 1, buffer_.size(), file_);
-  setg(buffer_.data(), buffer_.data(), buffer_.data() + count);
-  if (count == 0 && std::ferror(file_) != 0)
-  {
-    throw Failure(kTrouble, Problem{.file = name_, .sentence = std::strerror(errno)});
-  }
-  return count == 0 ? traits_type::eof() : traits_type::to_int_type(*gptr());
-}
-
-uint64_t TextSource::line() const
-{
-  return 1 + lines_ + static_cast<uint64_t>(std::count(eback(), gptr(), '\n'));
-}
-
-bool TextSource::skipBlanks()
-{
-  int_type c = sgetc();
-  while (c == ' ' || c == '\t' || c == '\r' || c == '\n')
-  {
-    c = snextc();
-  }
-  return c != traits_type::eof();
-}
-
-} // namespace tav::tool
+} // namespace tav::inspect

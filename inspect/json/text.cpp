@@ -9,7 +9,7 @@
 #include "inspect/text/value.h"
 #include "tav/layout.hpp"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 namespace
@@ -280,4 +280,4 @@ size_t cutAtCharacter(std::string_view text, size_t most)
   return cut;
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

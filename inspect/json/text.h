@@ -12,7 +12,7 @@
 
 #include "tav/tav.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 inline constexpr uint64_t kJsonVersion = 1;
@@ -40,4 +40,4 @@ std::optional<std::array<uint8_t, 16>> parseInt128(std::string_view text, bool i
 /// Where a piece of text that ends at `most` at the latest is to be cut so that no character is divided.
 size_t cutAtCharacter(std::string_view text, size_t most);
 
-} // namespace tav::tool
+} // namespace tav::inspect

@@ -9,7 +9,7 @@
 #include "inspect/json/text.h"
 #include "inspect/text/value.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 using namespace tav::layout;
@@ -175,4 +175,4 @@ std::string payloadFor(const Draft& draft, uint16_t type, bool swapped, bool reo
   return bytes;
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

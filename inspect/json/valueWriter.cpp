@@ -7,7 +7,7 @@
 #include "inspect/json/writer.h"
 #include "inspect/text/value.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 using namespace tav::layout;
@@ -210,4 +210,4 @@ void JsonWriter::putBytes(std::string_view name, uint64_t from, uint64_t length)
   put("]");
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

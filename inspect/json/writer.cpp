@@ -7,7 +7,7 @@
 #include "inspect/path/path.h"
 #include "inspect/text/value.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 using namespace tav::layout;
@@ -25,7 +25,7 @@ std::string_view asText(std::span<const uint8_t> bytes)
 
 } // namespace
 
-JsonWriter::JsonWriter(ByteSource& source, const Form& form, Output& out, JsonStyle style, bool safe)
+JsonWriter::JsonWriter(ByteSource& source, const Form& form, Sink& out, JsonStyle style, bool safe)
     : source_(source), form_(form), out_(out), style_(style), safe_(safe)
 {
 }
@@ -347,4 +347,4 @@ std::string JsonWriter::bytesAt(uint64_t offset, uint64_t length)
   return bytes;
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

@@ -6,11 +6,11 @@
 #include <string>
 #include <vector>
 
+#include "inspect/sink.h"
 #include "inspect/walk/source.h"
 #include "inspect/walk/walker.h"
-#include "tools/shell/output.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 enum class JsonStyle : uint8_t
@@ -34,7 +34,7 @@ class JsonWriter
 {
 public:
   /// `safe`: whole numbers that a double cannot hold are written as texts.
-  JsonWriter(ByteSource& source, const Form& form, Output& out, JsonStyle style, bool safe);
+  JsonWriter(ByteSource& source, const Form& form, Sink& out, JsonStyle style, bool safe);
 
   /// What stands before the first node and behind the last one.
   void begin();
@@ -85,7 +85,7 @@ private:
 
   ByteSource& source_;
   Form form_;
-  Output& out_;
+  Sink& out_;
   JsonStyle style_;
   bool safe_;
   bool damaged_ = false;
@@ -96,4 +96,4 @@ private:
   std::vector<uint8_t> piece_{};
 };
 
-} // namespace tav::tool
+} // namespace tav::inspect

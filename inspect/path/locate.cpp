@@ -1,8 +1,9 @@
 #include "inspect/path/locate.h"
 
-#include "tools/shell/report.h"
+#include "inspect/problem.h"
+#include "inspect/text/phrases.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 std::optional<std::string> findOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offset)
@@ -32,7 +33,7 @@ std::optional<std::string> findOffset(ByteSource& source, Walker& walker, Event&
   problem.sentence = "lies behind the end of the file";
   problem.code = TAV_RC_NOT_FOUND;
   problem.hint = before;
-  throw Failure(kFindings, problem);
+  throw Error(problem, Trouble::notFound);
 }
 
 void goToOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offset)
@@ -45,7 +46,7 @@ void goToOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offse
     problem.code = TAV_RC_NOT_FOUND;
     problem.hint = (before->empty() ? "" : *before + "\n     ") + "'tav hex --at " + hexOffset(offset) +
                    "' shows the bytes there";
-    throw Failure(kFindings, problem);
+    throw Error(problem, Trouble::notFound);
   }
 }
 
@@ -69,4 +70,4 @@ bool goToMatch(Walker& walker, PathMatcher& matcher, Event& event)
   return false;
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

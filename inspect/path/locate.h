@@ -9,15 +9,15 @@
 #include "inspect/path/path.h"
 #include "inspect/walk/walker.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 /// Walks on to the piece of the file that the byte at `offset` belongs to. When a node begins there, `event` is its
 /// nodeBegin, and nothing is returned; else `event` is the piece, and what is returned names the node before it, for a
-/// hint. Throws Failure when the offset lies behind the end.
+/// hint. Throws Error when the offset lies behind the end.
 std::optional<std::string> findOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offset);
 
-/// Walks on to the node whose header begins at `offset`; `event` is then its nodeBegin. Throws Failure, with the nodes
+/// Walks on to the node whose header begins at `offset`; `event` is then its nodeBegin. Throws Error, with the nodes
 /// that lie around the offset as a hint, when no node begins there.
 void goToOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offset);
 
@@ -25,4 +25,4 @@ void goToOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offse
 /// given every node of the walk so far.
 bool goToMatch(Walker& walker, PathMatcher& matcher, Event& event);
 
-} // namespace tav::tool
+} // namespace tav::inspect

@@ -5,9 +5,11 @@
 #include <limits>
 #include <unordered_map>
 
+#include "inspect/problem.h"
+#include "inspect/text/phrases.h"
 #include "tav/dictionary.hpp"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 namespace
@@ -167,7 +169,7 @@ std::string similarNames(std::string_view name)
 
 void Path::fail(const std::string& sentence, std::string hint) const
 {
-  throw Failure("path '" + text_ + "': " + sentence, std::move(hint));
+  throw Error("path '" + text_ + "': " + sentence, std::move(hint));
 }
 
 Path::Path(std::string_view text)
@@ -342,4 +344,4 @@ bool PathMatcher::matches(const Node& node)
   return match;
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

@@ -14,10 +14,10 @@
 #include <string_view>
 #include <vector>
 
+#include "inspect/problem.h"
 #include "inspect/walk/walker.h"
-#include "tools/shell/report.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 /// The tag of an element when it stands for this id alone and can be written in a path, else "#id".
@@ -36,7 +36,7 @@ std::string similarNames(std::string_view name);
 class Path
 {
 public:
-  /// Throws Failure, with the place of the error, when the text is no path. A name that no element has is none of
+  /// Throws Error, with the place of the error, when the text is no path. A name that no element has is none of
   /// that: such a path leads to no node of any stream.
   explicit Path(std::string_view text);
 
@@ -57,7 +57,7 @@ public:
   const std::string& text() const { return text_; }
   const std::vector<Step>& steps() const { return steps_; }
 
-  /// Throws Failure when a step has a name that no element has.
+  /// Throws Error when a step has a name that no element has.
   void requireNames() const;
 
   /// What to report when the path has led to no node of a file.
@@ -95,4 +95,4 @@ private:
   std::vector<size_t> starts_{}; ///< where a level's positions begin
 };
 
-} // namespace tav::tool
+} // namespace tav::inspect

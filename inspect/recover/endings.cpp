@@ -4,7 +4,7 @@
 #include <array>
 #include <cstring>
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 using namespace tav::layout;
@@ -122,4 +122,4 @@ std::vector<Ending> findEndings(ByteSource& source, const Form& form, uint64_t f
   return form.root64 ? EyeSearch(source, form, from).run() : std::vector<Ending>{};
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

@@ -8,7 +8,7 @@
 #include "inspect/walk/node.h"
 #include "inspect/walk/source.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 /// A group as its end element tells it.
@@ -30,4 +30,4 @@ bool headerAgrees(ByteSource& source, const Form& form, const Ending& ending);
 /// number is kept.
 std::vector<Ending> findEndings(ByteSource& source, const Form& form, uint64_t from);
 
-} // namespace tav::tool
+} // namespace tav::inspect

@@ -4,7 +4,7 @@
 
 #include "inspect/recover/recovery.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 using namespace tav::layout;
@@ -492,4 +492,4 @@ bool Recovery::believe(Candidate& found, bool onWay)
   return sure >= end || (!found.isGroup() && mayHoldNodes(found) && leadsTo(sure, is64(header), end));
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

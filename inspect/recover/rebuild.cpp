@@ -3,9 +3,9 @@
 #include <algorithm>
 #include <array>
 
-#include "tools/shell/report.h"
+#include "inspect/problem.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 using namespace tav::layout;
@@ -52,7 +52,7 @@ void Rebuilder::copy(uint64_t offset, uint64_t count)
     const uint64_t now = std::min<uint64_t>(piece.size(), count);
     if (now == 0)
     {
-      throw Failure("the file became shorter while it was read");
+      throw Error("the file became shorter while it was read");
     }
     out_.append(piece.first(static_cast<size_t>(now)));
     offset += now;
@@ -100,8 +100,8 @@ void Rebuilder::close()
   const uint64_t size = out_.length() - start;
   if (!is64(group) && size >= kSizeUnknown32)
   {
-    throw Failure("a group with a 32-bit header would get more than 4 GiB",
-                  "the stream was no 32-bit one; --root 64 reads it otherwise");
+    throw Error("a group with a 32-bit header would get more than 4 GiB",
+                "the stream was no 32-bit one; --root 64 reads it otherwise");
   }
   is64(group) ? void(group.hdr64.size = size) : void(group.hdr32.size = static_cast<uint32_t>(size));
   std::array<uint8_t, kHeaderSize64> bytes{};
@@ -110,4 +110,4 @@ void Rebuilder::close()
   groups_.pop_back();
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

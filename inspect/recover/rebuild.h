@@ -6,11 +6,11 @@
 #include <functional>
 #include <vector>
 
+#include "inspect/files/patchFile.h"
 #include "inspect/walk/node.h"
 #include "inspect/walk/source.h"
-#include "tools/shell/patchFile.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 /// A data element as it stands in the damaged stream.
@@ -51,4 +51,4 @@ private:
   std::vector<TAVHeader> groups_{};
 };
 
-} // namespace tav::tool
+} // namespace tav::inspect

@@ -2,9 +2,9 @@
 
 #include <algorithm>
 
-#include "tools/shell/report.h"
+#include "inspect/problem.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 using namespace tav::layout;
@@ -453,4 +453,4 @@ void Recovery::lose(uint64_t to, std::string reason)
   damaged_ = true;
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

@@ -12,7 +12,7 @@
 #include "inspect/recover/rebuild.h"
 #include "inspect/walk/prober.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 /// Bytes of the file that did not come back.
@@ -169,4 +169,4 @@ private:
   bool sureWide_ = false; ///< as seen from nodes with these headers
 };
 
-} // namespace tav::tool
+} // namespace tav::inspect

@@ -2,10 +2,10 @@
 #include <algorithm>
 
 #include "inspect/recover/recovery.h"
+#include "inspect/text/phrases.h"
 #include "inspect/walk/form.h"
-#include "tools/shell/report.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 using namespace tav::layout;
@@ -147,4 +147,4 @@ void Recovery::gap()
   }
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

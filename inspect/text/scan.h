@@ -4,7 +4,7 @@
 #include <cstdint>
 #include <span>
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 /// Looks through a text that comes in pieces for what is unusual in it; remembers the first place of each kind.
@@ -104,4 +104,4 @@ private:
   uint64_t high_ = kNowhere;
 };
 
-} // namespace tav::tool
+} // namespace tav::inspect

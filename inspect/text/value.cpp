@@ -6,9 +6,9 @@
 #include <cstring>
 #include <iterator>
 
-#include "tools/shell/report.h"
+#include "inspect/problem.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 using namespace tav::layout;
@@ -358,4 +358,4 @@ std::string cutToWidth(std::string_view text, size_t columns)
   return std::string(text);
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

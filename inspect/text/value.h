@@ -12,7 +12,7 @@
 #include "inspect/walk/node.h"
 #include "inspect/walk/source.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 /// The first bytes of a node's payload, `most` at the most, in host order where the type has an order and the bytes
@@ -53,4 +53,4 @@ std::string int128Text(std::span<const uint8_t> bytes, bool isSigned);
 /// Cuts a text to a number of terminal columns, counting UTF-8 characters as one each; "..." shows the cut.
 std::string cutToWidth(std::string_view text, size_t columns);
 
-} // namespace tav::tool
+} // namespace tav::inspect

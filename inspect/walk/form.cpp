@@ -5,11 +5,11 @@
 #include <limits>
 
 #include "inspect/path/path.h"
+#include "inspect/text/phrases.h"
 #include "inspect/text/value.h"
 #include "inspect/walk/walker.h"
-#include "tools/shell/report.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 using namespace tav::layout;
@@ -483,4 +483,4 @@ std::string formText(const Form& form)
          (form.aligned ? "padded to 8" : "not padded");
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

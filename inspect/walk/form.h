@@ -10,7 +10,7 @@
 #include "inspect/walk/node.h"
 #include "inspect/walk/source.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 /// What is given instead of being recognised.
@@ -50,4 +50,4 @@ std::string orderText(const Form& form);
 /// One line: "little-endian, 64-bit root header, padded to 8"
 std::string formText(const Form& form);
 
-} // namespace tav::tool
+} // namespace tav::inspect

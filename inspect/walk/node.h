@@ -6,7 +6,7 @@
 
 #include "tav/layout.hpp"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 /// What nothing in a stream says and every reader has to know.
@@ -56,4 +56,4 @@ struct Node
   bool has(NodeFlag flag) const { return (flags & flag) != 0; }
 };
 
-} // namespace tav::tool
+} // namespace tav::inspect

@@ -6,7 +6,7 @@
 
 #include "tav/dictionary.hpp"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 using namespace tav::layout;
@@ -361,4 +361,4 @@ uint64_t Prober::zerosStart(uint64_t from)
   return source_.size() - end >= worthTelling ? end : source_.size();
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

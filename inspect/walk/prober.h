@@ -8,7 +8,7 @@
 #include "inspect/walk/node.h"
 #include "inspect/walk/source.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 /// How much speaks for a node at an offset, in rising order.
@@ -91,4 +91,4 @@ private:
   uint64_t nonZeroAt_ = 0; ///< a byte that is not zero is known to be at this offset - 1 or behind it
 };
 
-} // namespace tav::tool
+} // namespace tav::inspect

@@ -1,164 +1,22 @@
 #include "inspect/walk/source.h"
 
 #include <algorithm>
-#include <cstdio>
 #include <filesystem>
 
-#include "kor/host.h"
-#include "tools/shell/report.h"
+#include "inspect/problem.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
-namespace
+ByteSource::ByteSource(std::string name, std::unique_ptr<TAVSideStorage> storage, uint64_t ringBytes,
+                       std::shared_ptr<void> keep)
+    : name_(std::move(name)), keep_(std::move(keep)), storage_(std::move(storage)),
+      maxPages_(static_cast<size_t>(std::max<uint64_t>(2, ringBytes / kPage)))
 {
-
-/// Gives pieces of standard input, or of a pipe with a name.
-class PipeReader
-{
-public:
-  PipeReader(const std::string& name, const std::string& path)
-      : name_(name)
-  {
-    if (path == "-")
-    {
-      return;
-    }
-    KORFileOpenParam param;
-    param.pPath = path.c_str();
-    param.options = KOR_FILE_READ;
-    if (const uint32_t code = file_.open(&param); code != TAV_RC_OK)
-    {
-      failAt(name, code);
-    }
-    named_ = true;
-  }
-
-  size_t read(std::vector<uint8_t>& buffer)
-  {
-    if (!named_)
-    {
-      const size_t count = std::fread(buffer.data(), 1, buffer.size(), stdin);
-      if (count == 0 && std::ferror(stdin) != 0)
-      {
-        failAt(name_, KOR_RC_IO_ERROR);
-      }
-      return count;
-    }
-    KORFileReadParam param;
-    param.length = buffer.size();
-    uint64_t count = 0;
-    const uint32_t code = file_.read(&param, buffer.data(), &count);
-    if (code != TAV_RC_OK && code != TAV_RC_END_OF_STORAGE)
-    {
-      failAt(name_, code);
-    }
-    return static_cast<size_t>(count);
-  }
-
-private:
-  const std::string& name_;
-  KORHFile file_{};
-  bool named_ = false;
-};
-
-/// Copies a pipe to a temporary file and returns its path.
-std::string spool(const std::string& name, const std::string& path)
-{
-  PipeReader reader(name, path);
-  KORHFile file;
-  std::string temporary;
-  {
-    const kor::HeldInterrupts held;
-    temporary = openTemporary(file);
-    kor::removeOnInterrupt(temporary);
-  }
-  std::vector<uint8_t> buffer(ByteSource::kLongRead);
-  try
-  {
-    while (const size_t count = reader.read(buffer))
-    {
-      KORFileWriteParam param;
-      param.pData = buffer.data();
-      param.length = count;
-      uint64_t done = 0;
-      if (const uint32_t code = file.write(&param, &done); code != TAV_RC_OK)
-      {
-        failAt(temporary, code);
-      }
-    }
-  }
-  catch (...)
-  {
-    kor::removeFile(temporary);
-    kor::removeOnInterrupt({});
-    throw;
-  }
-  return temporary;
-}
-
-} // namespace
-
-std::string openTemporary(KORHFile& file)
-{
-  std::error_code error;
-  const auto folder = std::filesystem::temp_directory_path(error);
-  if (error)
-  {
-    throw Failure("there is no folder for temporary files", "set TMPDIR to a folder that can be written");
-  }
-  for (unsigned attempt = 0;; ++attempt)
-  {
-    std::string path =
-        kor::textOf(folder / ("tav-" + std::to_string(kor::processId()) + "-" + std::to_string(attempt)));
-    KORFileOpenParam param;
-    param.pPath = path.c_str();
-    param.options = KOR_FILE_UPDATE | KOR_FILE_CREATE | KOR_FILE_EXCLUSIVE;
-    param.permissions = 0600;
-    const uint32_t code = file.open(&param);
-    if (code == TAV_RC_OK)
-    {
-      return path;
-    }
-    if (code != KOR_RC_FILE_EXISTS || attempt == 1000)
-    {
-      failAt(path, code, "a temporary file is needed; set TMPDIR to a folder that can be written");
-    }
-  }
-}
-
-ByteSource::ByteSource(std::string name, std::string path, uint64_t ringBytes)
-    : name_(std::move(name)), maxPages_(static_cast<size_t>(std::max<uint64_t>(2, ringBytes / kPage)))
-{
-  std::error_code error;
-  const auto kind = std::filesystem::status(kor::pathOf(path), error).type();
-  if (kind == std::filesystem::file_type::directory)
-  {
-    failAt(name_, KOR_RC_IS_FOLDER);
-  }
-  const bool regular = path != "-" && (error || kind == std::filesystem::file_type::regular ||
-                                       kind == std::filesystem::file_type::not_found);
-  if (!regular)
-  {
-    path = temporary_ = spool(name_, path);
-  }
-  KORFileOpenParam param;
-  param.pPath = path.c_str();
-  param.options = KOR_FILE_READ;
-  uint32_t code = TAV_RC_OK;
-  file_ = std::make_unique<TAVSSFile>(&param, &code);
-  if (!temporary_.empty())
-  {
-    // Where an open file can be removed it is gone from now on, however the program ends.
-    if (kor::removeFile(temporary_))
-    {
-      temporary_.clear();
-      kor::removeOnInterrupt({});
-    }
-  }
+  uint32_t code = storage_->getStatus();
   if (code == TAV_RC_OK)
   {
-    code = file_->getTotalSize(&size_);
+    code = storage_->getTotalSize(&size_);
   }
   if (code != TAV_RC_OK)
   {
@@ -166,19 +24,32 @@ ByteSource::ByteSource(std::string name, std::string path, uint64_t ringBytes)
   }
 }
 
-ByteSource::~ByteSource()
+ByteSource::ByteSource(std::string name, std::span<const uint8_t> bytes)
+    : name_(std::move(name)), memory_(bytes), size_(bytes.size()), maxPages_(0)
 {
-  if (!temporary_.empty())
-  {
-    file_.reset();
-    kor::removeFile(temporary_);
-    kor::removeOnInterrupt({});
-  }
+  // A storage over memory takes bytes that can be written; a handle that reads leaves them alone.
+  storage_ = std::make_unique<TAVSSMemory>(const_cast<uint8_t*>(bytes.data()), bytes.size());
 }
+
+ByteSource::~ByteSource() = default;
 
 std::unique_ptr<ByteSource> ByteSource::open(const std::string& path, uint64_t ringBytes)
 {
-  return std::unique_ptr<ByteSource>(new ByteSource(path == "-" ? "standard input" : path, path, ringBytes));
+  std::error_code error;
+  if (std::filesystem::is_directory(std::filesystem::path(std::u8string(path.begin(), path.end())), error))
+  {
+    failAt(path, KOR_RC_IS_FOLDER);
+  }
+  KORFileOpenParam param;
+  param.pPath = path.c_str();
+  param.options = KOR_FILE_READ;
+  uint32_t code = TAV_RC_OK;
+  auto file = std::make_unique<TAVSSFile>(&param, &code);
+  if (code != TAV_RC_OK)
+  {
+    failAt(path, code);
+  }
+  return std::make_unique<ByteSource>(path, std::move(file), ringBytes);
 }
 
 ByteSource::Page& ByteSource::slotFor(uint64_t number)
@@ -207,10 +78,10 @@ void ByteSource::fetch(uint64_t number, uint64_t count)
   buffer_.resize(static_cast<size_t>(wanted));
   void* target = buffer_.data();
   uint64_t done = 0;
-  uint32_t code = file_->seek(offset, 1);
+  uint32_t code = storage_->seek(offset, 1);
   if (code == TAV_RC_OK)
   {
-    code = file_->read(wanted, &target, wanted, &done, false, false);
+    code = storage_->read(wanted, &target, wanted, &done, false, false);
   }
   ++readCalls_;
   bytesRead_ += done;
@@ -262,6 +133,10 @@ std::span<const uint8_t> ByteSource::view(uint64_t offset)
   {
     return {};
   }
+  if (!memory_.empty())
+  {
+    return memory_.subspan(static_cast<size_t>(offset));
+  }
   const Page& found = page(offset / kPage);
   return std::span<const uint8_t>(found.bytes).subspan(static_cast<size_t>(offset % kPage));
 }
@@ -283,4 +158,4 @@ size_t ByteSource::read(uint64_t offset, std::span<uint8_t> to)
   return done;
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

@@ -1,5 +1,5 @@
 /// @file source.h
-/// The bytes of a stream by offset, from a file or a pipe of any size, in bounded memory.
+/// The bytes of a stream by offset, from a file, a storage or memory of any size, in bounded memory.
 #pragma once
 
 #include <cstdint>
@@ -12,25 +12,31 @@
 
 #include "tav/tav.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 inline constexpr uint64_t kDefaultRing = uint64_t{10} * 1024 * 1024;
 
-/// Opens a new file in the folder for temporary files and returns its path. The name is tried until nobody else has it.
-std::string openTemporary(KORHFile& file);
-
-/// A file that is read at any offset, through pages that are kept while they are used. Standard input and pipes are
-/// copied to a temporary file first, so that everything works on them. Used by one thread.
+/// Bytes that are read at any offset, through pages that are kept while they are used; what lies in memory is read
+/// where it lies. Used by one thread.
 class ByteSource
 {
 public:
   static constexpr uint64_t kPage = uint64_t{16} * 1024;
   static constexpr uint64_t kLongRead = uint64_t{64} * kPage; ///< what is read at once when reading goes straight on
 
-  /// Opens a file, "-" for standard input. At most `ringBytes` (and at least two pages) are kept in memory.
-  /// Throws Failure when that does not work.
+  /// Opens a regular file by its path, UTF-8. At most `ringBytes` (and at least two pages) are kept in memory. Throws
+  /// Error when that does not work.
   static std::unique_ptr<ByteSource> open(const std::string& path, uint64_t ringBytes = kDefaultRing);
+
+  /// The same over an open storage. `name` is how messages call it; `keep` is let go of after the storage. Throws
+  /// Error.
+  ByteSource(std::string name, std::unique_ptr<TAVSideStorage> storage, uint64_t ringBytes = kDefaultRing,
+             std::shared_ptr<void> keep = {});
+
+  /// Over bytes in memory, which outlive this object.
+  ByteSource(std::string name, std::span<const uint8_t> bytes);
+
   ~ByteSource();
   ByteSource(const ByteSource&) = delete;
   ByteSource& operator=(const ByteSource&) = delete;
@@ -38,10 +44,10 @@ public:
   /// As it is called in messages.
   const std::string& name() const { return name_; }
 
-  /// Bytes in the file, as it was when it was opened.
+  /// Bytes, as many as there were when it was opened.
   uint64_t size() const { return size_; }
 
-  /// Copies bytes; fewer than asked only at the end of the file. Throws Failure when the file cannot be read.
+  /// Copies bytes; fewer than asked only at the end. Throws Error when they cannot be read.
   size_t read(uint64_t offset, std::span<uint8_t> to);
 
   /// The bytes from `offset` on as far as they are at hand, at least one unless `offset` is at or behind the end.
@@ -51,14 +57,14 @@ public:
   /// Names who is told, by offset, of each piece that is fetched while reading goes straight on; nobody when empty.
   void tellOfPieces(std::function<void(uint64_t)> told) { told_ = std::move(told); }
 
-  /// Bytes fetched from the file so far.
+  /// Bytes fetched from the storage so far.
   uint64_t bytesRead() const { return bytesRead_; }
-  /// Calls of the file's `read` so far.
+  /// Calls of the storage's `read` so far.
   uint64_t readCalls() const { return readCalls_; }
 
   /// The storage underneath, for a handle of the library. Its cursor is shared: this object may be used again when
   /// the handle is done.
-  TAVSideStorage& storage() { return *file_; }
+  TAVSideStorage& storage() { return *storage_; }
 
 private:
   struct Page
@@ -68,14 +74,14 @@ private:
     std::vector<uint8_t> bytes{};
   };
 
-  ByteSource(std::string name, std::string path, uint64_t ringBytes);
   const Page& page(uint64_t number);
   Page& slotFor(uint64_t number);
   void fetch(uint64_t number, uint64_t count);
 
   std::string name_;
-  std::string temporary_{}; ///< to be removed at the end
-  std::unique_ptr<TAVSSFile> file_{};
+  std::shared_ptr<void> keep_{};
+  std::unique_ptr<TAVSideStorage> storage_{};
+  std::span<const uint8_t> memory_{}; ///< all bytes, where they are at hand
   uint64_t size_ = 0;
   uint64_t bytesRead_ = 0;
   uint64_t readCalls_ = 0;
@@ -89,4 +95,4 @@ private:
   std::function<void(uint64_t)> told_{};
 };
 
-} // namespace tav::tool
+} // namespace tav::inspect

@@ -4,9 +4,9 @@
 #include <utility>
 
 #include "inspect/path/path.h"
-#include "tools/shell/report.h"
+#include "inspect/text/phrases.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 using namespace tav::layout;
@@ -483,4 +483,4 @@ std::string Walker::path(const Event& event) const
   return text.empty() ? "/" : text;
 }
 
-} // namespace tav::tool
+} // namespace tav::inspect

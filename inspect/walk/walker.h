@@ -11,7 +11,7 @@
 #include "inspect/walk/prober.h"
 #include "inspect/walk/source.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 /// What a piece of the file is. All but nodeEnd stand for bytes; the pieces of a file follow one another without gap or
@@ -141,4 +141,4 @@ private:
   size_t queueCount_ = 0;
 };
 
-} // namespace tav::tool
+} // namespace tav::inspect

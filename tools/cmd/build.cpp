@@ -4,11 +4,12 @@
 #include "inspect/json/encoder.h"
 #include "inspect/json/reader.h"
 #include "kor/host.h"
+#include "tools/shell/input.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
-#include "tools/shell/patchFile.h"
 #include "tools/shell/report.h"
 #include "tools/shell/session.h"
+#include "tools/shell/streamOutput.h"
 
 namespace tav::tool
 {
@@ -31,15 +32,15 @@ int run(const Invocation& invocation)
     throw Failure("build: a stream is no text for a terminal", "-o FILE writes it to a file");
   }
   const Conversion conversion = conversionOf(invocation);
-  TextSource text(input);
+  const std::unique_ptr<TextSource> text = openText(input);
   Output out(output, invocation.has("--force"));
-  PatchFile file(out);
-  StreamEncoder encoder(file, conversion);
-  DocumentReader(text, encoder).read();
+  StreamOutput file(out);
+  StreamEncoder encoder(file.bytes(), conversion);
+  DocumentReader(*text, encoder).read();
   file.finish();
   if (encoder.leftOut() != 0)
   {
-    report(Problem{.file = text.name(),
+    report(Problem{.file = text->name(),
                    .sentence = counted(encoder.leftOut(), "damaged place") + " of " + byteText(encoder.leftOutBytes()) +
                                " left out: what is no node cannot be converted",
                    .hint = "without --byte-order, --root, --align and --eye-size they are kept as they are"});

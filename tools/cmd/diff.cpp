@@ -10,7 +10,10 @@
 #include "inspect/text/value.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
+#include "tools/shell/progress.h"
 #include "tools/shell/report.h"
+#include "tools/shell/session.h"
+#include "tools/shell/temporary.h"
 
 namespace tav::tool
 {
@@ -256,6 +259,12 @@ void Comparer::tellJson(char sign, uint64_t first, uint64_t second)
   out_.write(text + "}\n");
 }
 
+DiffIndex indexOf(Stream& stream, const std::vector<Path>& ignored)
+{
+  Progress progress("diff " + stream.bytes().name(), stream.bytes());
+  return {stream.bytes(), stream.form(), ignored, Temporary::make, [&](uint64_t offset) { progress.at(offset); }};
+}
+
 int run(const Invocation& invocation)
 {
   const std::string& nameA = invocation.arguments().at(0);
@@ -276,8 +285,8 @@ int run(const Invocation& invocation)
   Tolerance::parse(invocation.text("--tolerance", "0")); // told before the work begins
   Stream a = openStream(invocation, nameA);
   Stream b = openStream(invocation, nameB);
-  DiffIndex indexA(a, ignored);
-  DiffIndex indexB(b, ignored);
+  DiffIndex indexA = indexOf(a, ignored);
+  DiffIndex indexB = indexOf(b, ignored);
   const bool different = Comparer(invocation, indexA, indexB).run();
   tellStatistics(invocation, a.bytes());
   tellStatistics(invocation, b.bytes());

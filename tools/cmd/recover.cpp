@@ -12,6 +12,7 @@
 #include "tools/shell/progress.h"
 #include "tools/shell/report.h"
 #include "tools/shell/session.h"
+#include "tools/shell/streamOutput.h"
 
 namespace tav::tool
 {
@@ -193,14 +194,16 @@ Outcome recoverBest(const Invocation& invocation, Stream& stream, PatchFile& fil
     outcome.taken = recoverInto(invocation, stream.bytes(), found.form, file);
     return outcome;
   }
-  PatchFile first;
+  Temporary firstFile;
+  PatchFile first(firstFile.file());
   outcome.taken = recoverInto(invocation, stream.bytes(), found.form, first);
   if (outcome.taken.lostNothing())
   {
     copy(first, file);
     return outcome;
   }
-  PatchFile second;
+  Temporary secondFile;
+  PatchFile second(secondFile.file());
   outcome.other = recoverInto(invocation, stream.bytes(), *found.runnerUp, second);
   const bool swap = outcome.other->keepsMoreThan(outcome.taken);
   if (swap)
@@ -222,8 +225,8 @@ int run(const Invocation& invocation)
   Outcome outcome;
   {
     Output out(output, invocation.has("--force"));
-    PatchFile file(out);
-    outcome = recoverBest(invocation, stream, file);
+    StreamOutput file(out);
+    outcome = recoverBest(invocation, stream, file.bytes());
     if (outcome.taken.totals.nodes == 0)
     {
       Problem problem{stream.source->name()};

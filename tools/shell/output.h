@@ -7,6 +7,7 @@
 #include <string>
 #include <string_view>
 
+#include "inspect/sink.h"
 #include "tav/kor.h"
 #include "tools/shell/options.h"
 
@@ -16,16 +17,16 @@ namespace tav::tool
 /// An output file is written beside its final name and moved into place by `commit`. Without that, it is removed: when
 /// the object goes, and when the program is interrupted. Throws Failure when the system refuses, and ClosedPipe when
 /// nobody reads standard output any more.
-class Output
+class Output final : public inspect::Sink
 {
 public:
   /// "-" is standard output. An existing file is replaced only with `force`; devices and pipes are written to directly.
   explicit Output(std::string path, bool force = false);
-  ~Output();
+  ~Output() override;
   Output(const Output&) = delete;
   Output& operator=(const Output&) = delete;
 
-  void write(std::string_view text);
+  void write(std::string_view text) override;
   void write(std::span<const uint8_t> bytes);
 
   /// Hands over what is buffered.

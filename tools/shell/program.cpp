@@ -208,6 +208,11 @@ int runProgram(int argc, char** argv)
     report(failure.problem);
     return failure.status;
   }
+  catch (const Error& error)
+  {
+    report(error.problem());
+    return error.trouble() == Trouble::notFound ? kFindings : kTrouble;
+  }
   catch (const ClosedPipe&)
   {
     return kFine;

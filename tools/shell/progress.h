@@ -6,6 +6,7 @@
 #include <string>
 
 #include "inspect/walk/source.h"
+#include "tools/shell/names.h"
 
 namespace tav::tool
 {

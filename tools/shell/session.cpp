@@ -2,6 +2,7 @@
 
 #include <cstdio>
 
+#include "tools/shell/input.h"
 #include "tools/shell/report.h"
 
 namespace tav::tool
@@ -37,7 +38,7 @@ uint64_t ringBytes(const Invocation& invocation)
 
 Stream openStream(const Invocation& invocation, const std::string& path, bool lenient)
 {
-  Stream stream{ByteSource::open(path, ringBytes(invocation)), {}};
+  Stream stream{openSource(path, ringBytes(invocation)), {}};
   stream.recognition = recognise(*stream.source, formChoice(invocation));
   if (!stream.recognition.isStream && !lenient)
   {

@@ -7,6 +7,7 @@
 
 #include "inspect/walk/form.h"
 #include "inspect/walk/source.h"
+#include "tools/shell/names.h"
 #include "tools/shell/options.h"
 
 namespace tav::tool

@@ -1,14 +1,12 @@
-#include "tools/shell/patchFile.h"
+#include "inspect/files/patchFile.h"
 
 #include <algorithm>
-#include <cstdio>
 #include <cstring>
 
-#include "inspect/walk/source.h"
-#include "kor/host.h"
-#include "tools/shell/report.h"
+#include "inspect/problem.h"
+#include "inspect/text/phrases.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
 namespace
@@ -20,57 +18,11 @@ void require(uint32_t code)
 {
   if (code != TAV_RC_OK)
   {
-    Problem problem;
-    problem.sentence = "the output cannot be written: " + std::string(codeSentence(code));
-    problem.code = code;
-    throw Failure(kTrouble, problem);
+    throw Error(Problem{.sentence = "the output cannot be written: " + std::string(codeSentence(code)), .code = code});
   }
 }
 
 } // namespace
-
-PatchFile::PatchFile()
-{
-  openOwn();
-}
-
-PatchFile::PatchFile(Output& out)
-    : out_(&out)
-{
-  if (out.temporaryPath().empty())
-  {
-    openOwn();
-    return;
-  }
-  KORFileOpenParam param;
-  param.pPath = out.temporaryPath().c_str();
-  param.options = KOR_FILE_UPDATE;
-  require(file_.open(&param));
-}
-
-void PatchFile::openOwn()
-{
-  own_ = true;
-  const kor::HeldInterrupts held;
-  temporary_ = openTemporary(file_);
-  // Where an open file can be removed it is gone from now on, however the program ends.
-  if (kor::removeFile(temporary_))
-  {
-    temporary_.clear();
-    return;
-  }
-  kor::removeOnInterrupt(temporary_);
-}
-
-PatchFile::~PatchFile()
-{
-  file_.close();
-  if (!temporary_.empty())
-  {
-    kor::removeFile(temporary_);
-    kor::removeOnInterrupt({});
-  }
-}
 
 void PatchFile::append(std::string_view bytes)
 {
@@ -121,9 +73,7 @@ void PatchFile::patch(uint64_t offset, std::span<const uint8_t> bytes)
 size_t PatchFile::read(uint64_t offset, std::span<uint8_t> to)
 {
   flush();
-  KORFileSeekParam seek;
-  seek.offset = offset;
-  require(file_.seek(&seek, nullptr));
+  seek(offset);
   KORFileReadParam param;
   param.length = to.size();
   uint64_t done = 0;
@@ -140,18 +90,24 @@ void PatchFile::flush()
   buffer_.clear();
 }
 
+void PatchFile::seek(uint64_t offset)
+{
+  if (offset != place_)
+  {
+    KORFileSeekParam seek;
+    seek.offset = offset;
+    require(file_.seek(&seek, nullptr));
+    place_ = offset;
+  }
+}
+
 void PatchFile::writeAt(uint64_t offset, const void* bytes, uint64_t count)
 {
   if (count == 0)
   {
     return;
   }
-  if (offset != place_)
-  {
-    KORFileSeekParam seek;
-    seek.offset = offset;
-    require(file_.seek(&seek, nullptr));
-  }
+  seek(offset);
   KORFileWriteParam param;
   param.pData = bytes;
   param.length = count;
@@ -160,31 +116,4 @@ void PatchFile::writeAt(uint64_t offset, const void* bytes, uint64_t count)
   place_ = offset + count;
 }
 
-void PatchFile::copyOut()
-{
-  KORFileSeekParam start;
-  require(file_.seek(&start, nullptr));
-  std::string block(kBuffer, '\0');
-  for (uint64_t left = flushed_; left != 0;)
-  {
-    KORFileReadParam param;
-    param.length = std::min<uint64_t>(left, block.size());
-    uint64_t done = 0;
-    require(file_.read(&param, block.data(), &done));
-    out_->write(std::string_view(block).substr(0, static_cast<size_t>(done)));
-    left -= done;
-  }
-}
-
-void PatchFile::finish()
-{
-  flush();
-  if (own_)
-  {
-    copyOut();
-  }
-  require(file_.close());
-  out_->commit();
-}
-
-} // namespace tav::tool
+} // namespace tav::inspect

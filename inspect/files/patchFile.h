@@ -1,4 +1,4 @@
-/// @file build_file.h
+/// @file patchFile.h
 /// A file that is written from front to back, while bytes that were written before can still be set right.
 #pragma once
 
@@ -8,20 +8,18 @@
 #include <string_view>
 
 #include "tav/kor.h"
-#include "tools/shell/output.h"
 
-namespace tav::tool
+namespace tav::inspect
 {
 
-/// What goes to a file is written into it directly; what goes to standard output, a device or a pipe is kept in a
-/// temporary file until it is complete.
+/// Bytes that are appended and, when more is known, replaced. In memory is what was appended last, 256 KiB at most.
+/// Throws Error when the system refuses. Used by one thread.
 class PatchFile
 {
 public:
-  /// A temporary file that is gone with the object.
-  PatchFile();
-  explicit PatchFile(Output& out);
-  ~PatchFile();
+  /// Over an empty file that is open for reading and writing, which outlives this object.
+  explicit PatchFile(KORHFile& file)
+      : file_(file) {}
   PatchFile(const PatchFile&) = delete;
   PatchFile& operator=(const PatchFile&) = delete;
 
@@ -38,22 +36,17 @@ public:
   /// Bytes appended so far.
   uint64_t length() const { return flushed_ + buffer_.size(); }
 
-  /// Hands everything over; commits the output.
-  void finish();
+  /// Hands everything to the system. Without it, bytes that were appended last are lost with the object.
+  void flush();
 
 private:
-  void flush();
+  void seek(uint64_t offset);
   void writeAt(uint64_t offset, const void* bytes, uint64_t count);
-  void copyOut();
-  void openOwn();
 
-  Output* out_ = nullptr;
-  bool own_ = false;        ///< the file is a temporary one, not that of the output
-  std::string temporary_{}; ///< to be removed
-  KORHFile file_{};
+  KORHFile& file_;
   std::string buffer_{};
   uint64_t flushed_ = 0; ///< bytes in the file
   uint64_t place_ = 0;   ///< where the file is positioned
 };
 
-} // namespace tav::tool
+} // namespace tav::inspect

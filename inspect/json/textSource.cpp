@@ -1,0 +1,59 @@
+#include "inspect/json/textSource.h"
+
+#include <algorithm>
+
+namespace tav::inspect
+{
+
+namespace
+{
+
+constexpr size_t kBuffer = size_t{64} * 1024;
+
+} // namespace
+
+TextSource::TextSource(std::string name)
+    : name_(std::move(name)), buffer_(kBuffer)
+{
+  setg(buffer_.data(), buffer_.data(), buffer_.data());
+}
+
+TextSource::~TextSource() = default;
+
+TextSource::int_type TextSource::underflow()
+{
+  if (gptr() < egptr())
+  {
+    return traits_type::to_int_type(*gptr());
+  }
+  base_ += static_cast<uint64_t>(egptr() - eback());
+  lines_ += static_cast<uint64_t>(std::count(eback(), egptr(), '\n'));
+  const size_t count = fetch(buffer_);
+  setg(buffer_.data(), buffer_.data(), buffer_.data() + count);
+  return count == 0 ? traits_type::eof() : traits_type::to_int_type(*gptr());
+}
+
+uint64_t TextSource::line() const
+{
+  return 1 + lines_ + static_cast<uint64_t>(std::count(eback(), gptr(), '\n'));
+}
+
+bool TextSource::skipBlanks()
+{
+  int_type c = sgetc();
+  while (c == ' ' || c == '\t' || c == '\r' || c == '\n')
+  {
+    c = snextc();
+  }
+  return c != traits_type::eof();
+}
+
+size_t MemoryText::fetch(std::span<char> to)
+{
+  const size_t count = std::min(to.size(), rest_.size());
+  std::copy_n(rest_.begin(), count, to.begin());
+  rest_.remove_prefix(count);
+  return count;
+}
+
+} // namespace tav::inspect

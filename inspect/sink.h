@@ -1,0 +1,18 @@
+/// @file sink.h
+/// Where results go.
+#pragma once
+
+#include <string_view>
+
+namespace tav::inspect
+{
+
+/// Takes a result piece after piece. What goes wrong it throws; the work then ends with that.
+class Sink
+{
+public:
+  virtual ~Sink() = default;
+  virtual void write(std::string_view bytes) = 0;
+};
+
+} // namespace tav::inspect
