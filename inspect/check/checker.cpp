@@ -1,12 +1,13 @@
-#include "inspect/check/checker.h"
+#include "tav/inspect/checker.hpp"
 
 #include <algorithm>
 #include <array>
 #include <utility>
 
-#include "inspect/text/phrases.h"
 #include "inspect/text/scan.h"
-#include "inspect/text/value.h"
+#include "inspect/walk/prober.h"
+#include "tav/inspect/phrases.hpp"
+#include "tav/inspect/value.hpp"
 
 namespace tav::inspect
 {

@@ -3,8 +3,8 @@
 #include <algorithm>
 #include <cstring>
 
-#include "inspect/text/phrases.h"
-#include "inspect/text/value.h"
+#include "tav/inspect/phrases.hpp"
+#include "tav/inspect/value.hpp"
 
 namespace tav::inspect
 {

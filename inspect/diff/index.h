@@ -8,9 +8,9 @@
 #include <string>
 #include <vector>
 
-#include "inspect/files/patchFile.h"
-#include "inspect/files/scratch.h"
-#include "inspect/path/path.h"
+#include "tav/inspect/patchFile.hpp"
+#include "tav/inspect/path.hpp"
+#include "tav/inspect/scratch.hpp"
 
 namespace tav::inspect
 {

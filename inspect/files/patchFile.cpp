@@ -1,10 +1,10 @@
-#include "inspect/files/patchFile.h"
+#include "tav/inspect/patchFile.hpp"
 
 #include <algorithm>
 #include <cstring>
 
-#include "inspect/problem.h"
-#include "inspect/text/phrases.h"
+#include "tav/inspect/phrases.hpp"
+#include "tav/inspect/problem.hpp"
 
 namespace tav::inspect
 {

@@ -1,10 +1,10 @@
-#include "inspect/files/scratch.h"
+#include "tav/inspect/scratch.hpp"
 
 #include <filesystem>
 #include <random>
 #include <utility>
 
-#include "inspect/problem.h"
+#include "tav/inspect/problem.hpp"
 
 namespace tav::inspect
 {

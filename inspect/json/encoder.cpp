@@ -2,8 +2,8 @@
 
 #include <array>
 
-#include "inspect/problem.h"
-#include "inspect/text/phrases.h"
+#include "tav/inspect/phrases.hpp"
+#include "tav/inspect/problem.hpp"
 
 namespace tav::inspect
 {

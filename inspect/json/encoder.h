@@ -9,8 +9,9 @@
 #include <string_view>
 #include <vector>
 
-#include "inspect/files/patchFile.h"
-#include "inspect/walk/node.h"
+#include "tav/inspect/json.hpp"
+#include "tav/inspect/node.hpp"
+#include "tav/inspect/patchFile.hpp"
 
 namespace tav::inspect
 {
@@ -63,17 +64,6 @@ struct Draft
   bool begun = false; ///< the header is written, and the value as far as it was read
 
   bool isRaw() const { return given == Given::damaged || given == Given::unread || given == Given::zeros; }
-};
-
-/// What is asked for instead of what the document says. Any of it makes sizes, pairs and paddings anew.
-struct Conversion
-{
-  std::optional<bool> swapped{};
-  std::optional<bool> root64{};
-  std::optional<bool> aligned{};
-  bool eyeSize = false;
-
-  bool isAsked() const { return swapped || root64 || aligned || eyeSize; }
 };
 
 class StreamEncoder

@@ -3,9 +3,9 @@
 #include <algorithm>
 #include <utility>
 
-#include "inspect/path/path.h"
-#include "inspect/problem.h"
-#include "inspect/text/value.h"
+#include "tav/inspect/path.hpp"
+#include "tav/inspect/problem.hpp"
+#include "tav/inspect/value.hpp"
 
 namespace tav::inspect
 {
@@ -66,7 +66,7 @@ std::string DocumentReader::pointer() const
 
 void DocumentReader::read()
 {
-  std::istream stream(&source_);
+  JsonParser parser(source_, *this);
   try
   {
     while (source_.skipBlanks())
@@ -76,7 +76,7 @@ void DocumentReader::read()
         fail("there is more behind the document");
       }
       started_ = true;
-      nlohmann::json::sax_parse(stream, this, nlohmann::json::input_format_t::json, false);
+      parser.parseValue();
     }
     if (!started_)
     {
@@ -85,18 +85,14 @@ void DocumentReader::read()
     beginNodes();
     closeTo(0);
   }
+  catch (const JsonSyntaxError& error)
+  {
+    fail("no JSON: " + std::string(error.what()));
+  }
   catch (const BuildError& error)
   {
     fail(error.what());
   }
-}
-
-bool DocumentReader::parse_error(size_t, const std::string&, const nlohmann::detail::exception& error)
-{
-  std::string_view what = error.what();
-  const size_t colon = what.find(": ");
-  what.remove_prefix(colon == std::string_view::npos ? 0 : colon + 2);
-  fail("no JSON: " + std::string(what));
 }
 
 void DocumentReader::push(Where where)
@@ -114,13 +110,13 @@ void DocumentReader::beginNodes()
   }
 }
 
-bool DocumentReader::start_object(size_t)
+void DocumentReader::startObject()
 {
   if (levels_.empty())
   {
     push(lines_ ? Where::node : Where::document);
     draft_ = Draft();
-    return true;
+    return;
   }
   Level& level = top();
   switch (level.where)
@@ -141,7 +137,6 @@ bool DocumentReader::start_object(size_t)
     break;
   default: fail("an object cannot stand here");
   }
-  return true;
 }
 
 void DocumentReader::startForm()
@@ -165,7 +160,7 @@ void DocumentReader::startForm()
   push(Where::form);
 }
 
-bool DocumentReader::key(std::string& name)
+void DocumentReader::key(std::string name)
 {
   top().key = name;
   switch (top().where)
@@ -184,7 +179,6 @@ bool DocumentReader::key(std::string& name)
   case Where::shortList: startChild(elementNamed(name)); break;
   default: break;
   }
-  return true;
 }
 
 void DocumentReader::documentKey(const std::string& name)
@@ -209,7 +203,7 @@ void DocumentReader::startChild(uint16_t elm)
   draft_.properties.elm = elm;
 }
 
-bool DocumentReader::end_object()
+void DocumentReader::endObject()
 {
   const Level level = top();
   switch (level.where)
@@ -225,7 +219,6 @@ bool DocumentReader::end_object()
   default: break;
   }
   close();
-  return true;
 }
 
 /// Leaves a level; what comes next in the one around it is its next item.
@@ -302,13 +295,13 @@ void DocumentReader::closeTo(uint64_t depth)
   }
 }
 
-bool DocumentReader::start_array(size_t)
+void DocumentReader::startArray()
 {
   if (levels_.empty() && !lines_)
   {
     beginNodes();
     push(Where::nodes);
-    return true;
+    return;
   }
   if (levels_.empty())
   {
@@ -339,13 +332,11 @@ bool DocumentReader::start_array(size_t)
     break;
   default: fail("an array cannot stand here");
   }
-  return true;
 }
 
-bool DocumentReader::end_array()
+void DocumentReader::endArray()
 {
   close();
-  return true;
 }
 
 void DocumentReader::startObjectProperty(const std::string& name)

@@ -3,16 +3,14 @@
 /// longest single text.
 #pragma once
 
-#include <istream>
 #include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
 
-#include <nlohmann/json.hpp>
-
 #include "inspect/json/encoder.h"
-#include "inspect/json/textSource.h"
+#include "inspect/json/parser.h"
+#include "tav/inspect/textSource.hpp"
 
 namespace tav::inspect
 {
@@ -35,7 +33,7 @@ struct Scalar
   std::string text{}; ///< of numbers: in decimal; of truth: 1 or 0
 };
 
-class DocumentReader final : public nlohmann::json_sax<nlohmann::json>
+class DocumentReader final : private JsonHandler
 {
 public:
   DocumentReader(TextSource& text, StreamEncoder& encoder)
@@ -44,21 +42,18 @@ public:
   /// Reads everything. Throws Error, with the place, when the text is no JSON or describes no stream.
   void read();
 
-  bool null() override;
-  bool boolean(bool value) override;
-  bool number_integer(int64_t value) override;
-  bool number_unsigned(uint64_t value) override;
-  bool number_float(double value, const std::string& text) override;
-  bool string(std::string& value) override;
-  bool binary(binary_t& value) override;
-  bool start_object(size_t count) override;
-  bool key(std::string& name) override;
-  bool end_object() override;
-  bool start_array(size_t count) override;
-  bool end_array() override;
-  bool parse_error(size_t position, const std::string& token, const nlohmann::detail::exception& error) override;
-
 private:
+  void null() override;
+  void boolean(bool value) override;
+  void integer(std::string digits) override;
+  void fraction(std::string text) override;
+  void string(std::string text) override;
+  void startObject() override;
+  void key(std::string name) override;
+  void endObject() override;
+  void startArray() override;
+  void endArray() override;
+
   enum class Where : uint8_t
   {
     document, ///< the object around everything, with form and nodes

@@ -5,9 +5,9 @@
 #include <utility>
 
 #include "inspect/json/reader.h"
-#include "inspect/json/text.h"
-#include "inspect/problem.h"
-#include "inspect/text/value.h"
+#include "tav/inspect/jsonText.hpp"
+#include "tav/inspect/problem.hpp"
+#include "tav/inspect/value.hpp"
 
 namespace tav::inspect
 {
@@ -73,47 +73,29 @@ bool widthOf(const std::string& name, const Scalar& value)
 
 } // namespace
 
-bool DocumentReader::null()
+void DocumentReader::null()
 {
   scalar({});
-  return true;
 }
 
-bool DocumentReader::boolean(bool value)
+void DocumentReader::boolean(bool value)
 {
   scalar({Scalar::Kind::truth, value ? "1" : "0"});
-  return true;
 }
 
-bool DocumentReader::number_integer(int64_t value)
+void DocumentReader::integer(std::string digits)
 {
-  scalar({Scalar::Kind::integer, std::to_string(value)});
-  return true;
+  scalar({Scalar::Kind::integer, std::move(digits)});
 }
 
-bool DocumentReader::number_unsigned(uint64_t value)
+void DocumentReader::fraction(std::string text)
 {
-  scalar({Scalar::Kind::integer, std::to_string(value)});
-  return true;
+  scalar({Scalar::Kind::fraction, std::move(text)});
 }
 
-bool DocumentReader::number_float(double, const std::string& text)
+void DocumentReader::string(std::string text)
 {
-  // Whole numbers of more than 64 bits come here, too.
-  const bool whole = text.find_first_of(".eE") == std::string::npos;
-  scalar({whole ? Scalar::Kind::integer : Scalar::Kind::fraction, text});
-  return true;
-}
-
-bool DocumentReader::string(std::string& value)
-{
-  scalar({Scalar::Kind::text, std::move(value)});
-  return true;
-}
-
-bool DocumentReader::binary(binary_t&)
-{
-  return false; // no part of JSON texts
+  scalar({Scalar::Kind::text, std::move(text)});
 }
 
 void DocumentReader::scalar(const Scalar& value)

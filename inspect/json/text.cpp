@@ -1,4 +1,4 @@
-#include "inspect/json/text.h"
+#include "tav/inspect/jsonText.hpp"
 
 #include <bit>
 #include <charconv>
@@ -6,7 +6,7 @@
 #include <cstdio>
 #include <cstring>
 
-#include "inspect/text/value.h"
+#include "tav/inspect/value.hpp"
 #include "tav/layout.hpp"
 
 namespace tav::inspect

@@ -1,4 +1,4 @@
-#include "inspect/json/textSource.h"
+#include "tav/inspect/textSource.hpp"
 
 #include <algorithm>
 

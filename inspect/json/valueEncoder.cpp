@@ -6,8 +6,8 @@
 #include <limits>
 
 #include "inspect/json/encoder.h"
-#include "inspect/json/text.h"
-#include "inspect/text/value.h"
+#include "tav/inspect/jsonText.hpp"
+#include "tav/inspect/value.hpp"
 
 namespace tav::inspect
 {

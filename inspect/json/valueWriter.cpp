@@ -3,9 +3,9 @@
 #include <cstring>
 #include <utility>
 
-#include "inspect/json/text.h"
-#include "inspect/json/writer.h"
-#include "inspect/text/value.h"
+#include "tav/inspect/jsonText.hpp"
+#include "tav/inspect/jsonWriter.hpp"
+#include "tav/inspect/value.hpp"
 
 namespace tav::inspect
 {

@@ -1,11 +1,11 @@
-#include "inspect/json/writer.h"
+#include "tav/inspect/jsonWriter.hpp"
 
 #include <algorithm>
 #include <utility>
 
-#include "inspect/json/text.h"
-#include "inspect/path/path.h"
-#include "inspect/text/value.h"
+#include "tav/inspect/jsonText.hpp"
+#include "tav/inspect/path.hpp"
+#include "tav/inspect/value.hpp"
 
 namespace tav::inspect
 {

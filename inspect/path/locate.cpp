@@ -1,7 +1,7 @@
-#include "inspect/path/locate.h"
+#include "tav/inspect/locate.hpp"
 
-#include "inspect/problem.h"
-#include "inspect/text/phrases.h"
+#include "tav/inspect/phrases.hpp"
+#include "tav/inspect/problem.hpp"
 
 namespace tav::inspect
 {

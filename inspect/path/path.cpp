@@ -1,13 +1,13 @@
-#include "inspect/path/path.h"
+#include "tav/inspect/path.hpp"
 
 #include <algorithm>
 #include <charconv>
 #include <limits>
 #include <unordered_map>
 
-#include "inspect/problem.h"
-#include "inspect/text/phrases.h"
 #include "tav/dictionary.hpp"
+#include "tav/inspect/phrases.hpp"
+#include "tav/inspect/problem.hpp"
 
 namespace tav::inspect
 {

@@ -5,8 +5,8 @@
 #include <cstdint>
 #include <vector>
 
-#include "inspect/walk/node.h"
-#include "inspect/walk/source.h"
+#include "tav/inspect/node.hpp"
+#include "tav/inspect/source.hpp"
 
 namespace tav::inspect
 {

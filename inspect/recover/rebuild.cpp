@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <array>
 
-#include "inspect/problem.h"
+#include "tav/inspect/problem.hpp"
 
 namespace tav::inspect
 {

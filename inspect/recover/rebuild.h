@@ -6,9 +6,9 @@
 #include <functional>
 #include <vector>
 
-#include "inspect/files/patchFile.h"
-#include "inspect/walk/node.h"
-#include "inspect/walk/source.h"
+#include "tav/inspect/node.hpp"
+#include "tav/inspect/patchFile.hpp"
+#include "tav/inspect/source.hpp"
 
 namespace tav::inspect
 {

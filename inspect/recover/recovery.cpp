@@ -2,7 +2,7 @@
 
 #include <algorithm>
 
-#include "inspect/problem.h"
+#include "tav/inspect/problem.hpp"
 
 namespace tav::inspect
 {

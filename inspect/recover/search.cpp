@@ -2,8 +2,8 @@
 #include <algorithm>
 
 #include "inspect/recover/recovery.h"
-#include "inspect/text/phrases.h"
-#include "inspect/walk/form.h"
+#include "tav/inspect/form.hpp"
+#include "tav/inspect/phrases.hpp"
 
 namespace tav::inspect
 {

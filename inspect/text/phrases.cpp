@@ -1,4 +1,4 @@
-#include "inspect/text/phrases.h"
+#include "tav/inspect/phrases.hpp"
 
 #include <cstdio>
 #include <iterator>

@@ -1,4 +1,4 @@
-#include "inspect/text/value.h"
+#include "tav/inspect/value.hpp"
 
 #include <algorithm>
 #include <chrono>
@@ -6,7 +6,8 @@
 #include <cstring>
 #include <iterator>
 
-#include "inspect/problem.h"
+#include "inspect/walk/prober.h"
+#include "tav/inspect/problem.hpp"
 
 namespace tav::inspect
 {
@@ -266,6 +267,16 @@ std::string quoted(std::string_view text)
 std::string forTerminal(std::string_view text)
 {
   return escaped(text, {});
+}
+
+std::optional<uint64_t> pairDistanceAt(ByteSource& source, const Form& form, uint64_t offset)
+{
+  uint64_t distance = 0;
+  if (!Prober(source, form, 0).pairAt(offset, source.size(), distance))
+  {
+    return std::nullopt;
+  }
+  return distance;
 }
 
 std::string hexText(std::span<const uint8_t> bytes)

@@ -1,13 +1,14 @@
-#include "inspect/walk/form.h"
+#include "tav/inspect/form.hpp"
 
 #include <algorithm>
 #include <bit>
 #include <limits>
 
-#include "inspect/path/path.h"
-#include "inspect/text/phrases.h"
-#include "inspect/text/value.h"
-#include "inspect/walk/walker.h"
+#include "inspect/walk/prober.h"
+#include "tav/inspect/path.hpp"
+#include "tav/inspect/phrases.hpp"
+#include "tav/inspect/value.hpp"
+#include "tav/inspect/walker.hpp"
 
 namespace tav::inspect
 {

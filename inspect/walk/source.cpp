@@ -1,9 +1,9 @@
-#include "inspect/walk/source.h"
+#include "tav/inspect/source.hpp"
 
 #include <algorithm>
 #include <filesystem>
 
-#include "inspect/problem.h"
+#include "tav/inspect/problem.hpp"
 
 namespace tav::inspect
 {

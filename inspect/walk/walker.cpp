@@ -1,10 +1,11 @@
-#include "inspect/walk/walker.h"
+#include "tav/inspect/walker.hpp"
 
 #include <algorithm>
 #include <utility>
 
-#include "inspect/path/path.h"
-#include "inspect/text/phrases.h"
+#include "inspect/walk/prober.h"
+#include "tav/inspect/path.hpp"
+#include "tav/inspect/phrases.hpp"
 
 namespace tav::inspect
 {
@@ -19,7 +20,7 @@ constexpr size_t kMaxCounts = 256; ///< different ids among siblings that are co
 } // namespace
 
 Walker::Walker(ByteSource& source, const Form& form, WalkStart start)
-    : source_(source), form_(form), prober_(source, form, start.budget),
+    : source_(source), form_(form), prober_(std::make_unique<Prober>(source, form, start.budget)),
       position_(std::min(start.offset, source.size()))
 {
   Frame file;
@@ -27,6 +28,15 @@ Walker::Walker(ByteSource& source, const Form& form, WalkStart start)
   file.open = true;
   file.wide = start.offset == 0 ? form.root64 : start.wide;
   frames_.push_back(file);
+}
+
+Walker::~Walker() = default;
+
+Walker::Walker(Walker&&) noexcept = default;
+
+uint64_t Walker::spent() const
+{
+  return prober_->spent();
 }
 
 Event& Walker::queue(What what, uint64_t offset, uint64_t length)
@@ -92,7 +102,7 @@ void Walker::step()
     return;
   }
   TAVHeader header{};
-  const bool fits = prober_.header(position_, top.wide, top.limit, header);
+  const bool fits = prober_->header(position_, top.wide, top.limit, header);
   const bool blank = !fits || (sizeOf(header) == 0 && typeOf(header) == 0 && elmOf(header) == 0);
   if (blank && top.open && top.limit == source_.size() && endByZeros())
   {
@@ -111,13 +121,13 @@ void Walker::step()
 void Walker::begin(TAVHeader& header)
 {
   const Frame& top = frames_.back();
-  Belief belief = prober_.judgeHeader(header, top.limit);
+  Belief belief = prober_->judgeHeader(header, top.limit);
   if (frames_.size() == 1 && header.nodeOffset != 0 && belief < Belief::named)
   {
     // Nothing says which header a further root has. That of the first is given with the form.
     TAVHeader other{};
-    const bool found = prober_.header(position_, !top.wide, top.limit, other) &&
-                       prober_.judge(position_, !top.wide, top.limit) == Belief::followed;
+    const bool found = prober_->header(position_, !top.wide, top.limit, other) &&
+                       prober_->judge(position_, !top.wide, top.limit) == Belief::followed;
     if (found)
     {
       header = other;
@@ -134,7 +144,7 @@ void Walker::begin(TAVHeader& header)
   const bool strange = belief == Belief::fits && !node.isGroup() && isStrange(header);
   const bool blank = node.size() == 0 && node.type() == 0;
   const bool wildGroup = node.isGroup() && overruns && !holdsNodes(header, top.limit) &&
-                         !prober_.isChain(start, hasChildren64(header), top.limit);
+                         !prober_->isChain(start, hasChildren64(header), top.limit);
   if (blank || strange || wildGroup || (overruns && !node.isGroup()))
   {
     damage(position_, overruns ? TAV_RC_OUTSIDE_PARENT : TAV_RC_BAD_HDR_TYPE, whyNot(header, top.limit));
@@ -152,12 +162,12 @@ bool Walker::holdsNodes(TAVHeader group, uint64_t limit)
   {
     const uint64_t start = group.nodeOffset + headerLength(group.hdrType);
     const bool wide = hasChildren64(group);
-    if (prober_.judge(start, wide, limit) >= Belief::named)
+    if (prober_->judge(start, wide, limit) >= Belief::named)
     {
       return true;
     }
     TAVHeader child{};
-    if (!prober_.header(start, wide, limit, child))
+    if (!prober_->header(start, wide, limit, child))
     {
       return Prober::isNamed(elmOf(group));
     }
@@ -178,7 +188,7 @@ bool Walker::isStrange(const TAVHeader& header)
   {
     return true;
   }
-  return !prober_.isFollowed(header, top.limit) && !prober_.isChain(header.nodeOffset, top.wide, top.limit);
+  return !prober_->isFollowed(header, top.limit) && !prober_->isChain(header.nodeOffset, top.wide, top.limit);
 }
 
 std::string Walker::whyNot(const TAVHeader& header, uint64_t limit) const
@@ -219,9 +229,9 @@ bool Walker::looksUnfinished(const Node& node, const Frame& parent)
   // Children that nobody knows count unless what stands there is surer as a sibling, with a header of the other width.
   const uint64_t start = node.payloadOffset();
   const bool wide = hasChildren64(node.header);
-  return prober_.judge(start, wide, parent.limit) >= Belief::typed ||
-         (prober_.judge(start, is64(node.header), parent.limit) < Belief::typed &&
-          prober_.isChain(start, wide, parent.limit));
+  return prober_->judge(start, wide, parent.limit) >= Belief::typed ||
+         (prober_->judge(start, is64(node.header), parent.limit) < Belief::typed &&
+          prober_->isChain(start, wide, parent.limit));
 }
 
 void Walker::beginGroup(Node& node)
@@ -271,13 +281,13 @@ bool Walker::extraBehind(const Node& node, uint64_t base, uint64_t limit)
   bool with = false;
   if (hasEyeSize(node.header))
   {
-    without = prober_.pairAt(base, limit, distance);
-    with = prober_.pairAt(base + 2, limit, distance);
+    without = prober_->pairAt(base, limit, distance);
+    with = prober_->pairAt(base + 2, limit, distance);
   }
   if (without == with)
   {
-    const Belief here = prober_.judge(base, top.wide, limit);
-    const Belief behind = base + 2 == limit ? Belief::followed : prober_.judge(base + 2, top.wide, limit);
+    const Belief here = prober_->judge(base, top.wide, limit);
+    const Belief behind = base + 2 == limit ? Belief::followed : prober_->judge(base + 2, top.wide, limit);
     without = here > behind;
     with = behind > here;
   }
@@ -285,15 +295,15 @@ bool Walker::extraBehind(const Node& node, uint64_t base, uint64_t limit)
   {
     // Neither eye catcher is whole: what follows the pair tells where it stands.
     const auto follows = [&](uint64_t at) {
-      return at == limit || prober_.judge(at, top.wide, limit) >= Belief::named;
+      return at == limit || prober_->judge(at, top.wide, limit) >= Belief::named;
     };
     without = follows(base + kEyeSizeLength);
     with = follows(base + kEyeSizeLength + 2);
   }
   if (without == with)
   {
-    without = prober_.isChain(base, top.wide, limit);
-    with = prober_.isChain(base + 2, top.wide, limit);
+    without = prober_->isChain(base, top.wide, limit);
+    with = prober_->isChain(base + 2, top.wide, limit);
   }
   if (without == with)
   {
@@ -308,7 +318,7 @@ void Walker::takeData(Node& node)
   const uint64_t limit = frames_.back().limit;
   const uint64_t start = node.payloadOffset();
   const uint64_t end = start + node.size();
-  const uint64_t padded = std::min(limit, addSaturated(start, prober_.paddedSize(node.header)));
+  const uint64_t padded = std::min(limit, addSaturated(start, prober_->paddedSize(node.header)));
   node.limit = end;
   if (extraBehind(node, padded, limit))
   {
@@ -348,7 +358,7 @@ void Walker::takePair(Node& node, uint64_t limit)
 {
   uint64_t distance = 0;
   const uint64_t behind = position_ + kEyeSizeLength;
-  if (prober_.pairAt(position_, limit, distance))
+  if (prober_->pairAt(position_, limit, distance))
   {
     queue(What::pair, position_, kEyeSizeLength);
     position_ = behind;
@@ -356,8 +366,8 @@ void Walker::takePair(Node& node, uint64_t limit)
   }
   const bool wide = frames_.back().wide;
   const bool room = limit - position_ >= kEyeSizeLength;
-  const bool nodeBehind = room && (behind == limit || prober_.judge(behind, wide, limit) >= Belief::named);
-  if (nodeBehind && prober_.judge(position_, wide, limit) < Belief::named)
+  const bool nodeBehind = room && (behind == limit || prober_->judge(behind, wide, limit) >= Belief::named);
+  if (nodeBehind && prober_->judge(position_, wide, limit) < Belief::named)
   {
     node.flags |= kBadPair;
     queue(What::pair, position_, kEyeSizeLength);
@@ -375,11 +385,11 @@ void Walker::afterEndElement(const Node& node)
   }
   Frame& top = frames_.back();
   const bool marker = node.elm() == TAV_ELM_CMN_END_HDR_MARKER;
-  const bool itsOwn = !marker && prober_.pairEnds(node.payloadOffset(), top.limit, top.node.header);
+  const bool itsOwn = !marker && prober_->pairEnds(node.payloadOffset(), top.limit, top.node.header);
   // Behind damaged bytes an end element can be that of a group whose header was among them.
   const bool doubtful = !itsOwn && !marker && top.lastDamage != 0;
   // Nodes up to the very end of the group are in it, although readers stop before them.
-  const bool more = top.open || position_ == top.limit || prober_.isChain(position_, top.wide, top.limit, true);
+  const bool more = top.open || position_ == top.limit || prober_->isChain(position_, top.wide, top.limit, true);
   if (top.open ? !doubtful : itsOwn && !more)
   {
     if (!top.open)
@@ -414,7 +424,7 @@ void Walker::endGroup(End end)
 bool Walker::endByZeros()
 {
   bool gaveUp = false;
-  if (!prober_.zerosToEnd(position_, gaveUp) && !gaveUp)
+  if (!prober_->zerosToEnd(position_, gaveUp) && !gaveUp)
   {
     return false;
   }
@@ -431,11 +441,11 @@ bool Walker::endByZeros()
 void Walker::damage(uint64_t from, uint32_t code, std::string reason)
 {
   Frame& top = frames_.back();
-  const Restart restart = prober_.findRestart(from, top.wide, frames_.size() == 1, top.limit);
+  const Restart restart = prober_->findRestart(from, top.wide, frames_.size() == 1, top.limit);
   uint64_t to = restart.offset;
   if (!restart.gaveUp && to == top.limit && top.open && to == source_.size())
   {
-    to = std::max(from + 1, prober_.zerosStart(from)); // zeros at the end belong to the file, not to the damage
+    to = std::max(from + 1, prober_->zerosStart(from)); // zeros at the end belong to the file, not to the damage
   }
   Event& event = queue(What::damaged, from, to - from);
   event.node = {};

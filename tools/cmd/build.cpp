@@ -1,9 +1,8 @@
 // tav build: a stream from JSON.
 #include <cstdio>
 
-#include "inspect/json/encoder.h"
-#include "inspect/json/reader.h"
 #include "kor/host.h"
+#include "tav/inspect.hpp"
 #include "tools/shell/input.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
@@ -35,13 +34,12 @@ int run(const Invocation& invocation)
   const std::unique_ptr<TextSource> text = openText(input);
   Output out(output, invocation.has("--force"));
   StreamOutput file(out);
-  StreamEncoder encoder(file.bytes(), conversion);
-  DocumentReader(*text, encoder).read();
+  const LeftOut leftOut = fromJson(*text, file.bytes(), conversion);
   file.finish();
-  if (encoder.leftOut() != 0)
+  if (leftOut.places != 0)
   {
     report(Problem{.file = text->name(),
-                   .sentence = counted(encoder.leftOut(), "damaged place") + " of " + byteText(encoder.leftOutBytes()) +
+                   .sentence = counted(leftOut.places, "damaged place") + " of " + byteText(leftOut.bytes) +
                                " left out: what is no node cannot be converted",
                    .hint = "without --byte-order, --root, --align and --eye-size they are kept as they are"});
     return kFindings;

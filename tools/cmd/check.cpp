@@ -3,8 +3,9 @@
 
 #include <nlohmann/json.hpp>
 
-#include "inspect/check/checker.h"
-#include "inspect/check/rules.h"
+#include "tav/inspect/checker.hpp"
+#include "tav/inspect/rules.hpp"
+#include "tools/cmd/ruleTexts.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/progress.h"

@@ -1,13 +1,8 @@
 // tav diff: what two streams have not in common.
-#include <algorithm>
-#include <cstdio>
 #include <cstdlib>
-#include <cstring>
+#include <optional>
 
-#include "inspect/diff/align.h"
-#include "inspect/diff/index.h"
-#include "inspect/json/text.h"
-#include "inspect/text/value.h"
+#include "tav/inspect.hpp"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/progress.h"
@@ -21,248 +16,83 @@ namespace tav::tool
 namespace
 {
 
-constexpr size_t kMaxChildren = 200'000; ///< of one group that are compared at once
-constexpr uint64_t kPiece = uint64_t{64} * 1024;
-constexpr uint64_t kMaxJsonValue = uint64_t{64} * 1024;
-
 /// How far apart two numbers may be: "10", "0.5%".
-struct Tolerance
+Tolerance parseTolerance(std::string text)
 {
-  double amount = 0;
-  bool percent = false;
-
-  static Tolerance parse(std::string text)
+  Tolerance tolerance;
+  tolerance.percent = text.ends_with('%');
+  text.resize(text.size() - (tolerance.percent ? 1 : 0));
+  // Not every standard library has from_chars for this type; strtod takes blanks, hexadecimal digits and words too.
+  const bool plain = !text.empty() && text.find_first_not_of("0123456789.e-") == std::string::npos;
+  char* end = nullptr;
+  tolerance.amount = std::strtod(text.c_str(), &end);
+  if (!plain || end != text.c_str() + text.size() || !(tolerance.amount >= 0))
   {
-    Tolerance tolerance;
-    tolerance.percent = text.ends_with('%');
-    text.resize(text.size() - (tolerance.percent ? 1 : 0));
-    // Not every standard library has from_chars for this type; strtod takes blanks, hexadecimal digits and words too.
-    const bool plain = !text.empty() && text.find_first_not_of("0123456789.e-") == std::string::npos;
-    char* end = nullptr;
-    tolerance.amount = std::strtod(text.c_str(), &end);
-    if (!plain || end != text.c_str() + text.size() || !(tolerance.amount >= 0))
-    {
-      throw Failure("diff: --tolerance: '" + text + "' is no number", "10 is, and 0.5%");
-    }
-    return tolerance;
+    throw Failure("diff: --tolerance: '" + text + "' is no number", "10 is, and 0.5%");
   }
-
-  bool holds(uint64_t difference, uint64_t larger) const
-  {
-    const double limit = percent ? static_cast<double>(larger) * amount / 100 : amount;
-    return static_cast<double>(difference) <= limit;
-  }
-};
-
-class Comparer
-{
-public:
-  Comparer(const Invocation& invocation, DiffIndex& a, DiffIndex& b)
-      : a_(a), b_(b), out_("-"), tolerance_(Tolerance::parse(invocation.text("--tolerance", "0"))),
-        json_(invocation.has("--json")), colour_(!json_ && wantsColour(invocation))
-  {
-  }
-
-  /// Compares everything; true when there is a difference.
-  bool run()
-  {
-    levels_.push_back({0, a_.rows(), 0, b_.rows()});
-    while (!levels_.empty())
-    {
-      Level& level = levels_.back();
-      if (level.at < level.pairs.size())
-      {
-        const auto [first, second] = level.pairs[level.at++];
-        compare(first, second);
-      }
-      else if (level.fromA < level.endA || level.fromB < level.endB)
-      {
-        fill(level);
-      }
-      else
-      {
-        levels_.pop_back();
-      }
-    }
-    out_.commit();
-    return found_;
-  }
-
-private:
-  struct Level
-  {
-    uint64_t fromA; ///< children that were not aligned so far
-    uint64_t endA;
-    uint64_t fromB;
-    uint64_t endB;
-    Pairs pairs{};
-    size_t at = 0;
-  };
-
-  static std::vector<Child> children(DiffIndex& index, uint64_t& from, uint64_t end)
-  {
-    std::vector<Child> list;
-    while (from < end && list.size() < kMaxChildren)
-    {
-      const Row row = index.row(from);
-      const uint32_t kind = row.elm | (row.isGroup() ? 0x10000u : row.isDamaged() ? 0x20000u
-                                                                                  : 0u);
-      list.push_back({from, row.hash, row.key, kind});
-      from = row.next;
-    }
-    return list;
-  }
-
-  void fill(Level& level)
-  {
-    level.at = 0;
-    const std::vector<Child> first = children(a_, level.fromA, level.endA);
-    const std::vector<Child> second = children(b_, level.fromB, level.endB);
-    level.pairs = align(first, second);
-  }
-
-  void compare(uint64_t first, uint64_t second);
-  bool samePayload(const Row& a, const Row& b);
-  bool near(const Row& a, const Row& b);
-  void tell(char sign, uint64_t first, uint64_t second, const std::string& what);
-  void tellText(char sign, uint64_t first, uint64_t second, const std::string& what);
-  void tellJson(char sign, uint64_t first, uint64_t second);
-  void putSide(std::string& text, DiffIndex& index, uint64_t number, const std::string& suffix);
-
-  DiffIndex& a_;
-  DiffIndex& b_;
-  Output out_;
-  Tolerance tolerance_;
-  bool json_;
-  bool colour_;
-  bool found_ = false;
-  std::vector<Level> levels_{};
-};
-
-void Comparer::compare(uint64_t first, uint64_t second)
-{
-  if (first == kNoRow || second == kNoRow)
-  {
-    const bool removed = second == kNoRow;
-    tell(removed ? '-' : '+', first, second, removed ? a_.text(first) : b_.text(second));
-    return;
-  }
-  const Row a = a_.row(first);
-  const Row b = b_.row(second);
-  if (a.info != b.info)
-  {
-    tell('~', first, second, "info  " + hexOffset(a.info) + " -> " + hexOffset(b.info));
-  }
-  if (a.isGroup())
-  {
-    levels_.push_back({first + 1, a.next, second + 1, b.next});
-    return;
-  }
-  if (a.type != b.type)
-  {
-    tell('~', first, second, a_.text(first) + " -> " + b_.text(second));
-  }
-  else if (!samePayload(a, b) && !near(a, b))
-  {
-    constexpr uint64_t most = 200;
-    tell('~', first, second, DiffIndex::kindText(a) + "  " + a_.value(a, most) + " -> " + b_.value(b, most));
-  }
+  return tolerance;
 }
 
-bool Comparer::samePayload(const Row& a, const Row& b)
+/// "- /system/host[2]  group of 3 nodes"
+std::string lineOf(const Difference& difference, bool colour)
 {
-  if (a.size != b.size)
-  {
-    return false;
-  }
-  for (uint64_t at = 0; at < a.size; at += kPiece)
-  {
-    if (a_.piece(a, at, kPiece) != b_.piece(b, at, kPiece))
-    {
-      return false;
-    }
-  }
-  return true;
+  const char sign = difference.change == Change::removed ? '-' : difference.change == Change::added ? '+'
+                                                                                                    : '~';
+  const std::string path = difference.before ? difference.before->path : difference.after->path;
+  const std::string other = difference.before && difference.after ? difference.after->path : path;
+  const char* const start = !colour ? "" : sign == '-' ? "\033[31m"
+                                       : sign == '+'   ? "\033[32m"
+                                                       : "\033[33m";
+  return std::string(start) + sign + " " + path + (other != path ? " (" + other + ")" : "") +
+         (colour ? "\033[0m" : "") + "  " + difference.sentence + "\n";
 }
 
-bool Comparer::near(const Row& a, const Row& b)
+void appendSide(std::string& text, const DiffSide& side, const std::string& suffix)
 {
-  const bool number = a.type >= TAV_TYPE_UINT8 && a.type <= TAV_TYPE_SINT64 && a.size == b.size &&
-                      a.size == layout::typeInfo(a.type).valueSize;
-  if (!number || tolerance_.amount == 0)
-  {
-    return false;
-  }
-  const std::string textA = a_.value(a, kPiece);
-  const std::string textB = b_.value(b, kPiece);
-  const auto magnitude = [](const std::string& text) {
-    return std::strtoull(text.c_str() + (text.starts_with('-') ? 1 : 0), nullptr, 10);
-  };
-  const uint64_t sizeA = magnitude(textA);
-  const uint64_t sizeB = magnitude(textB);
-  const uint64_t larger = std::max(sizeA, sizeB);
-  const bool sameSign = textA.starts_with('-') == textB.starts_with('-');
-  // Of numbers with different signs the sum is at most 2^63 + 2^63 - 1.
-  return tolerance_.holds(sameSign ? larger - std::min(sizeA, sizeB) : sizeA + sizeB, larger);
-}
-
-void Comparer::tell(char sign, uint64_t first, uint64_t second, const std::string& what)
-{
-  found_ = true;
-  json_ ? tellJson(sign, first, second) : tellText(sign, first, second, what);
-}
-
-void Comparer::tellText(char sign, uint64_t first, uint64_t second, const std::string& what)
-{
-  const std::string path = first != kNoRow ? a_.path(first) : b_.path(second);
-  const std::string other = first != kNoRow && second != kNoRow ? b_.path(second) : path;
-  const char* const start = !colour_ ? "" : sign == '-' ? "\033[31m"
-                                        : sign == '+'   ? "\033[32m"
-                                                        : "\033[33m";
-  out_.write(std::string(start) + sign + " " + path + (other != path ? " (" + other + ")" : "") +
-             (colour_ ? "\033[0m" : "") + "  " + what + "\n");
-}
-
-void Comparer::putSide(std::string& text, DiffIndex& index, uint64_t number, const std::string& suffix)
-{
-  const Row row = index.row(number);
   const auto put = [&](const std::string& name, const std::string& value) {
     text += ", \"" + name + suffix + "\": ";
     appendJsonString(text, value);
   };
-  put("path", index.path(number));
-  text += ", \"offset" + suffix + "\": " + std::to_string(row.offset);
-  put("type", row.isDamaged() ? "damaged" : typeText(row.type));
-  if (!row.isGroup())
+  put("path", side.path);
+  text += ", \"offset" + suffix + "\": " + std::to_string(side.offset);
+  put("type", side.type);
+  if (side.value)
   {
-    put("value", index.value(row, kMaxJsonValue));
+    put("value", *side.value);
   }
-  if (row.info != 0)
+  if (side.info != 0)
   {
-    text += ", \"info" + suffix + "\": " + std::to_string(row.info);
+    text += ", \"info" + suffix + "\": " + std::to_string(side.info);
   }
 }
 
-void Comparer::tellJson(char sign, uint64_t first, uint64_t second)
+std::string jsonOf(const Difference& difference)
 {
-  std::string text = std::string("{\"change\": \"") + (sign == '-' ? "removed" : sign == '+' ? "added"
-                                                                                             : "changed") +
-                     "\"";
-  if (first != kNoRow)
+  static constexpr const char* changes[] = {"removed", "added", "changed"};
+  std::string text = std::string("{\"change\": \"") + changes[static_cast<size_t>(difference.change)] + "\"";
+  if (difference.before)
   {
-    putSide(text, a_, first, "");
+    appendSide(text, *difference.before, "");
   }
-  if (second != kNoRow)
+  if (difference.after)
   {
-    putSide(text, b_, second, first != kNoRow ? "Now" : "");
+    appendSide(text, *difference.after, difference.before ? "Now" : "");
   }
-  out_.write(text + "}\n");
+  return text + "}\n";
 }
 
-DiffIndex indexOf(Stream& stream, const std::vector<Path>& ignored)
+std::vector<Path> ignoredPaths(const Invocation& invocation)
 {
-  Progress progress("diff " + stream.bytes().name(), stream.bytes());
-  return {stream.bytes(), stream.form(), ignored, Temporary::make, [&](uint64_t offset) { progress.at(offset); }};
+  std::vector<Path> ignored;
+  for (const std::string& path : invocation.all("--ignore"))
+  {
+    if (path == "/")
+    {
+      throw Failure("diff: --ignore / leaves nothing to compare");
+    }
+    ignored.emplace_back(path).requireNames();
+  }
+  return ignored;
 }
 
 int run(const Invocation& invocation)
@@ -273,21 +103,31 @@ int run(const Invocation& invocation)
   {
     throw Failure("diff: only one of the two can be standard input");
   }
-  std::vector<Path> ignored;
-  for (const std::string& path : invocation.all("--ignore"))
-  {
-    if (path == "/")
-    {
-      throw Failure("diff: --ignore / leaves nothing to compare");
-    }
-    ignored.emplace_back(path).requireNames();
-  }
-  Tolerance::parse(invocation.text("--tolerance", "0")); // told before the work begins
+  const bool json = invocation.has("--json");
+  DiffOptions options;
+  options.ignored = ignoredPaths(invocation);
+  options.tolerance = parseTolerance(invocation.text("--tolerance", "0"));
+  options.mostValue = json ? options.mostValue : 0;
+  options.makeFile = Temporary::make;
   Stream a = openStream(invocation, nameA);
   Stream b = openStream(invocation, nameB);
-  DiffIndex indexA = indexOf(a, ignored);
-  DiffIndex indexB = indexOf(b, ignored);
-  const bool different = Comparer(invocation, indexA, indexB).run();
+  std::optional<Progress> progress;
+  const ByteSource* shown = nullptr;
+  options.progress = [&](ByteSource& source, uint64_t offset) {
+    if (shown != &source)
+    {
+      progress.emplace("diff " + source.name(), source);
+      shown = &source;
+    }
+    progress->at(offset);
+  };
+  Output out("-");
+  const bool colour = !json && wantsColour(invocation);
+  const bool different = diff({a.bytes(), a.form()}, {b.bytes(), b.form()}, options, [&](const Difference& difference) {
+    progress.reset();
+    out.write(json ? jsonOf(difference) : lineOf(difference, colour));
+  });
+  out.commit();
   tellStatistics(invocation, a.bytes());
   tellStatistics(invocation, b.bytes());
   return different ? kFindings : kFine;

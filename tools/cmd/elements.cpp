@@ -3,8 +3,8 @@
 #include <cstdio>
 #include <string>
 
-#include "inspect/path/path.h"
 #include "tav/dictionary.hpp"
+#include "tav/inspect/path.hpp"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/report.h"

@@ -4,10 +4,10 @@
 #include <cstdio>
 #include <utility>
 
-#include "inspect/path/locate.h"
-#include "inspect/path/path.h"
-#include "inspect/text/value.h"
-#include "inspect/walk/walker.h"
+#include "tav/inspect/locate.hpp"
+#include "tav/inspect/path.hpp"
+#include "tav/inspect/value.hpp"
+#include "tav/inspect/walker.hpp"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/progress.h"
@@ -96,15 +96,14 @@ std::string Dumper::headerText(const Node& node) const
 
 std::string Dumper::pairText(const Node& node, uint64_t offset)
 {
-  Prober prober(stream_.bytes(), stream_.form(), 0);
-  uint64_t distance = 0;
-  if (!prober.pairAt(offset, stream_.bytes().size(), distance))
+  const std::optional<uint64_t> distance = pairDistanceAt(stream_.bytes(), stream_.form(), offset);
+  if (!distance)
   {
     return "eye/size pair, the eye catcher is damaged";
   }
   const uint64_t back = offset - node.offset();
-  std::string text = "eye/size pair: distance " + std::to_string(distance);
-  return back == distance ? text : text + ", of " + std::to_string(back) + " back to the node";
+  std::string text = "eye/size pair: distance " + std::to_string(*distance);
+  return back == *distance ? text : text + ", of " + std::to_string(back) + " back to the node";
 }
 
 void Dumper::heading(const Walker& walker, const Event& event)

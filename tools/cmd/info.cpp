@@ -4,9 +4,9 @@
 #include <cstdio>
 #include <map>
 
-#include "inspect/path/path.h"
-#include "inspect/text/value.h"
-#include "inspect/walk/walker.h"
+#include "tav/inspect/path.hpp"
+#include "tav/inspect/value.hpp"
+#include "tav/inspect/walker.hpp"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/progress.h"

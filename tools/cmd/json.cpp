@@ -1,5 +1,5 @@
 // tav json: the stream as JSON that loses nothing.
-#include "inspect/json/writer.h"
+#include "tav/inspect.hpp"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/progress.h"
@@ -28,17 +28,12 @@ int run(const Invocation& invocation)
   Output out(invocation.text("--output", "-"), invocation.has("--force"));
   // Also what is no stream at all is handed out: as damaged bytes.
   Stream stream = openStream(invocation, invocation.arguments().at(0), true);
-  Walker walker(stream.bytes(), stream.form());
-  Progress progress("json", stream.bytes());
-  JsonWriter writer(stream.bytes(), stream.form(), out, style, invocation.has("--safe"));
-  writer.begin();
-  Event event;
-  while (walker.next(event))
+  bool damaged = false;
   {
-    progress.at(event.offset);
-    writer.add(walker, event);
+    Progress progress("json", stream.bytes());
+    damaged = toJson(stream.bytes(), stream.form(), out,
+                     {style, invocation.has("--safe"), [&](uint64_t offset) { progress.at(offset); }});
   }
-  writer.end();
   out.commit();
   tellStatistics(invocation, stream.bytes());
   if (!stream.recognition.isStream && stream.bytes().size() != 0)
@@ -46,7 +41,7 @@ int run(const Invocation& invocation)
     report(Problem{.file = stream.bytes().name(), .sentence = "no node is found; all bytes are given as they are"});
     return kTooDamaged;
   }
-  return writer.foundDamage() ? kFindings : kFine;
+  return damaged ? kFindings : kFine;
 }
 
 const Registration registration{{

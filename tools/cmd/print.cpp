@@ -3,9 +3,9 @@
 #include <cstdio>
 #include <memory>
 
-#include "inspect/path/locate.h"
-#include "inspect/path/path.h"
-#include "inspect/walk/walker.h"
+#include "tav/inspect/locate.hpp"
+#include "tav/inspect/path.hpp"
+#include "tav/inspect/walker.hpp"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/report.h"

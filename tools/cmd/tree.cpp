@@ -2,11 +2,11 @@
 #include <algorithm>
 #include <cstdio>
 
-#include "inspect/path/locate.h"
-#include "inspect/path/path.h"
-#include "inspect/text/value.h"
-#include "inspect/walk/walker.h"
 #include "kor/host.h"
+#include "tav/inspect/locate.hpp"
+#include "tav/inspect/path.hpp"
+#include "tav/inspect/value.hpp"
+#include "tav/inspect/walker.hpp"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/progress.h"

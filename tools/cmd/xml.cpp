@@ -4,11 +4,11 @@
 #include <cstring>
 #include <utility>
 
-#include "inspect/json/text.h"
-#include "inspect/path/path.h"
-#include "inspect/text/value.h"
-#include "inspect/walk/walker.h"
 #include "tav/dictionary.hpp"
+#include "tav/inspect/jsonText.hpp"
+#include "tav/inspect/path.hpp"
+#include "tav/inspect/value.hpp"
+#include "tav/inspect/walker.hpp"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/progress.h"

@@ -6,8 +6,8 @@
 #include <memory>
 #include <string>
 
-#include "inspect/json/textSource.h"
-#include "inspect/walk/source.h"
+#include "tav/inspect/source.hpp"
+#include "tav/inspect/textSource.hpp"
 
 namespace tav::tool
 {

@@ -7,7 +7,7 @@
 #include <string>
 #include <string_view>
 
-#include "inspect/sink.h"
+#include "tav/inspect/sink.hpp"
 #include "tav/kor.h"
 #include "tools/shell/options.h"
 

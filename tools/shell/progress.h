@@ -5,7 +5,7 @@
 #include <cstdint>
 #include <string>
 
-#include "inspect/walk/source.h"
+#include "tav/inspect/source.hpp"
 #include "tools/shell/names.h"
 
 namespace tav::tool

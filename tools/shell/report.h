@@ -8,8 +8,8 @@
 #include <string>
 #include <string_view>
 
-#include "inspect/problem.h"
-#include "inspect/text/phrases.h"
+#include "tav/inspect/phrases.hpp"
+#include "tav/inspect/problem.hpp"
 #include "tav/kor.h"
 #include "tools/shell/names.h"
 

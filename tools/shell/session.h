@@ -5,8 +5,8 @@
 #include <memory>
 #include <string>
 
-#include "inspect/walk/form.h"
-#include "inspect/walk/source.h"
+#include "tav/inspect/form.hpp"
+#include "tav/inspect/source.hpp"
 #include "tools/shell/names.h"
 #include "tools/shell/options.h"
 

@@ -4,7 +4,7 @@
 
 #include <optional>
 
-#include "inspect/files/patchFile.h"
+#include "tav/inspect/patchFile.hpp"
 #include "tools/shell/output.h"
 #include "tools/shell/temporary.h"
 

@@ -5,7 +5,7 @@
 #include <memory>
 #include <string>
 
-#include "inspect/files/scratch.h"
+#include "tav/inspect/scratch.hpp"
 
 namespace tav::tool
 {

@@ -1,4 +1,4 @@
-/// @file source.h
+/// @file source.hpp
 /// The bytes of a stream by offset, from a file, a storage or memory of any size, in bounded memory.
 #pragma once
 
@@ -10,6 +10,7 @@
 #include <unordered_map>
 #include <vector>
 
+#include "tav/inspect/api.hpp"
 #include "tav/tav.h"
 
 namespace tav::inspect
@@ -19,7 +20,7 @@ inline constexpr uint64_t kDefaultRing = uint64_t{10} * 1024 * 1024;
 
 /// Bytes that are read at any offset, through pages that are kept while they are used; what lies in memory is read
 /// where it lies. Used by one thread.
-class ByteSource
+class TAV_INSPECT_API ByteSource
 {
 public:
   static constexpr uint64_t kPage = uint64_t{16} * 1024;

@@ -1,5 +1,5 @@
-/// @file rules.h
-/// What `tav check` looks for: the one table of rules, from which docs/check-rules.md is made as well.
+/// @file rules.hpp
+/// What `tav check` looks for: the one table of rules.
 #pragma once
 
 #include <cstdint>
@@ -8,6 +8,7 @@
 #include <string_view>
 
 #include "tav/codes.h"
+#include "tav/inspect/api.hpp"
 
 namespace tav::inspect
 {
@@ -61,17 +62,11 @@ struct Rule
 };
 
 /// In the order of RuleId.
-std::span<const Rule> rules();
+TAV_INSPECT_API std::span<const Rule> rules();
 
-const Rule& ruleOf(RuleId rule);
+TAV_INSPECT_API const Rule& ruleOf(RuleId rule);
 
 /// Null when no rule has this id.
-const Rule* findRule(std::string_view id);
-
-/// The document: every rule with its example, in Markdown.
-std::string rulesMarkdown();
-
-/// The table as JSON, for scripts.
-std::string rulesJson();
+TAV_INSPECT_API const Rule* findRule(std::string_view id);
 
 } // namespace tav::inspect

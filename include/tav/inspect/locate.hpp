@@ -1,4 +1,4 @@
-/// @file locate.h
+/// @file locate.hpp
 /// Finds a place in a stream, with the groups around it, without walking what lies beside the way.
 #pragma once
 
@@ -6,8 +6,9 @@
 #include <optional>
 #include <string>
 
-#include "inspect/path/path.h"
-#include "inspect/walk/walker.h"
+#include "tav/inspect/api.hpp"
+#include "tav/inspect/path.hpp"
+#include "tav/inspect/walker.hpp"
 
 namespace tav::inspect
 {
@@ -15,14 +16,15 @@ namespace tav::inspect
 /// Walks on to the piece of the file that the byte at `offset` belongs to. When a node begins there, `event` is its
 /// nodeBegin, and nothing is returned; else `event` is the piece, and what is returned names the node before it, for a
 /// hint. Throws Error when the offset lies behind the end.
-std::optional<std::string> findOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offset);
+TAV_INSPECT_API std::optional<std::string> findOffset(ByteSource& source, Walker& walker, Event& event,
+                                                      uint64_t offset);
 
 /// Walks on to the node whose header begins at `offset`; `event` is then its nodeBegin. Throws Error, with the nodes
 /// that lie around the offset as a hint, when no node begins there.
-void goToOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offset);
+TAV_INSPECT_API void goToOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offset);
 
 /// Walks on to the next node that the path leads to; false when there is none any more. The matcher must have been
 /// given every node of the walk so far.
-bool goToMatch(Walker& walker, PathMatcher& matcher, Event& event);
+TAV_INSPECT_API bool goToMatch(Walker& walker, PathMatcher& matcher, Event& event);
 
 } // namespace tav::inspect

@@ -1,15 +1,16 @@
-/// @file walker.h
+/// @file walker.hpp
 /// A walk over any bytes as a stream: always forward, always to the end, every byte accounted for exactly once.
 #pragma once
 
 #include <array>
 #include <cstdint>
+#include <memory>
 #include <string>
 #include <vector>
 
-#include "inspect/walk/node.h"
-#include "inspect/walk/prober.h"
-#include "inspect/walk/source.h"
+#include "tav/inspect/api.hpp"
+#include "tav/inspect/node.hpp"
+#include "tav/inspect/source.hpp"
 
 namespace tav::inspect
 {
@@ -61,16 +62,21 @@ struct WalkStart
   uint64_t budget = kNoBudget; ///< bytes to look through in damaged regions and for zeros at the end
 };
 
+class Prober;
+
 /// Walks a stream in pre-order and cuts it into events. Memory grows with the depth alone; every step moves forward,
 /// so that the walk ends whatever the bytes say.
 ///
 /// Where bytes are no node, they are handed out as `damaged` up to the place where a node can start again: one that
 /// an eye/size pair leads back to, one behind a pair, one that looks as a writer makes it and is followed by another;
 /// at the latest the end of the group around them.
-class Walker
+class TAV_INSPECT_API Walker
 {
 public:
+  /// `source` outlives the walk.
   Walker(ByteSource& source, const Form& form, WalkStart start = {});
+  ~Walker();
+  Walker(Walker&&) noexcept;
 
   /// The next event; false at the end of the file.
   bool next(Event& event);
@@ -88,7 +94,7 @@ public:
   uint64_t stringsWithExtra() const { return withExtra_; }
   uint64_t stringsWithoutExtra() const { return withoutExtra_; }
   /// Bytes looked through in search of nodes.
-  uint64_t spent() const { return prober_.spent(); }
+  uint64_t spent() const;
 
 private:
   struct Count
@@ -126,7 +132,7 @@ private:
 
   ByteSource& source_;
   Form form_;
-  Prober prober_;
+  std::unique_ptr<Prober> prober_;
   std::vector<Frame> frames_{}; ///< the first stands for the file
   std::vector<Count> counts_{};
   uint64_t position_;

@@ -1,4 +1,4 @@
-/// @file form.h
+/// @file form.hpp
 /// Recognises how a stream is to be read. Nothing in a stream says so; the ways are tried and compared.
 #pragma once
 
@@ -7,8 +7,9 @@
 #include <string>
 #include <vector>
 
-#include "inspect/walk/node.h"
-#include "inspect/walk/source.h"
+#include "tav/inspect/api.hpp"
+#include "tav/inspect/node.hpp"
+#include "tav/inspect/source.hpp"
 
 namespace tav::inspect
 {
@@ -35,19 +36,19 @@ struct Recognition
 };
 
 /// Tries all ways that `choice` leaves open on the beginning of the file. Reads a bounded part of it.
-Recognition recognise(ByteSource& source, const FormChoice& choice = {});
+TAV_INSPECT_API Recognition recognise(ByteSource& source, const FormChoice& choice = {});
 
 /// The form of a stream that seems to begin at an offset inside of another one, where it is not that one's. Padding
 /// cannot be told.
-std::optional<Form> otherStreamAt(ByteSource& source, const Form& form, uint64_t offset);
+TAV_INSPECT_API std::optional<Form> otherStreamAt(ByteSource& source, const Form& form, uint64_t offset);
 
 /// What to say of it.
-std::string otherStreamText(const Form& form);
+TAV_INSPECT_API std::string otherStreamText(const Form& form);
 
 /// "little-endian", "big-endian"
-std::string orderText(const Form& form);
+TAV_INSPECT_API std::string orderText(const Form& form);
 
 /// One line: "little-endian, 64-bit root header, padded to 8"
-std::string formText(const Form& form);
+TAV_INSPECT_API std::string formText(const Form& form);
 
 } // namespace tav::inspect

@@ -1,4 +1,4 @@
-/// @file checker.h
+/// @file checker.hpp
 /// Follows a walk and tells what is wrong.
 #pragma once
 
@@ -7,8 +7,9 @@
 #include <string>
 #include <vector>
 
-#include "inspect/check/rules.h"
-#include "inspect/walk/walker.h"
+#include "tav/inspect/api.hpp"
+#include "tav/inspect/rules.hpp"
+#include "tav/inspect/walker.hpp"
 
 namespace tav::inspect
 {
@@ -24,7 +25,7 @@ struct Finding
 
 /// Walks a stream once, in memory that grows with the depth alone. Findings come in the order in which they are
 /// certain: what is known of a group only at its end comes there.
-class Checker
+class TAV_INSPECT_API Checker
 {
 public:
   using Sink = std::function<void(const Finding&)>;

@@ -1,4 +1,4 @@
-/// @file json_writer.h
+/// @file jsonWriter.hpp
 /// Writes a walk as JSON from which the bytes can be made again. Nothing is kept but the groups around the place.
 #pragma once
 
@@ -6,9 +6,10 @@
 #include <string>
 #include <vector>
 
-#include "inspect/sink.h"
-#include "inspect/walk/source.h"
-#include "inspect/walk/walker.h"
+#include "tav/inspect/api.hpp"
+#include "tav/inspect/sink.hpp"
+#include "tav/inspect/source.hpp"
+#include "tav/inspect/walker.hpp"
 
 namespace tav::inspect
 {
@@ -30,7 +31,7 @@ struct DataPieces
   std::optional<Event> pair{};
 };
 
-class JsonWriter
+class TAV_INSPECT_API JsonWriter
 {
 public:
   /// `safe`: whole numbers that a double cannot hold are written as texts.

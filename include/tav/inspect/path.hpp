@@ -1,4 +1,4 @@
-/// @file path.h
+/// @file path.hpp
 /// Paths through a stream: `/system/host[2]/hostName`.
 ///
 ///   step   = name | #id | * | **           name: an element's tag, enum name or constant
@@ -14,26 +14,27 @@
 #include <string_view>
 #include <vector>
 
-#include "inspect/problem.h"
-#include "inspect/walk/walker.h"
+#include "tav/inspect/api.hpp"
+#include "tav/inspect/problem.hpp"
+#include "tav/inspect/walker.hpp"
 
 namespace tav::inspect
 {
 
 /// The tag of an element when it stands for this id alone and can be written in a path, else "#id".
-std::string elementText(uint16_t elm);
+TAV_INSPECT_API std::string elementText(uint16_t elm);
 
 /// Appends "/tag", "/tag[3]" or "/tag[@0x1a40]": the step that leads to `node` from its parent. The first of its id
 /// gets no index, as the first match is what every command takes.
-void appendStep(std::string& path, const Node& node);
+TAV_INSPECT_API void appendStep(std::string& path, const Node& node);
 
 /// The ids that a name means: a tag, an enum name, a constant, "#12" or "12". Empty when there is none.
-std::vector<uint16_t> idsOf(std::string_view name);
+TAV_INSPECT_API std::vector<uint16_t> idsOf(std::string_view name);
 
 /// Up to three elements whose names are close to a misspelt one, for a hint; empty when there is none.
-std::string similarNames(std::string_view name);
+TAV_INSPECT_API std::string similarNames(std::string_view name);
 
-class Path
+class TAV_INSPECT_API Path
 {
 public:
   /// Throws Error, with the place of the error, when the text is no path. A name that no element has is none of
@@ -76,7 +77,7 @@ private:
 
 /// Follows a walk and tells which nodes a path leads to. Give it the nodeBegin of every node of the walk whose parent
 /// was not skipped. Memory grows with the depth times the `**` of the path.
-class PathMatcher
+class TAV_INSPECT_API PathMatcher
 {
 public:
   explicit PathMatcher(const Path& path);

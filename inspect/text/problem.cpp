@@ -1,8 +1,8 @@
-#include "inspect/problem.h"
+#include "tav/inspect/problem.hpp"
 
 #include <utility>
 
-#include "inspect/text/phrases.h"
+#include "tav/inspect/phrases.hpp"
 
 namespace tav::inspect
 {

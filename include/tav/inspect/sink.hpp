@@ -1,14 +1,16 @@
-/// @file sink.h
+/// @file sink.hpp
 /// Where results go.
 #pragma once
 
 #include <string_view>
 
+#include "tav/inspect/api.hpp"
+
 namespace tav::inspect
 {
 
 /// Takes a result piece after piece. What goes wrong it throws; the work then ends with that.
-class Sink
+class TAV_INSPECT_API Sink
 {
 public:
   virtual ~Sink() = default;

@@ -1,4 +1,4 @@
-/// @file problem.h
+/// @file problem.hpp
 /// What is wrong, where, and what to do about it.
 #pragma once
 
@@ -7,6 +7,7 @@
 #include <string>
 
 #include "tav/cpp/error.hpp"
+#include "tav/inspect/api.hpp"
 
 namespace tav::inspect
 {
@@ -31,7 +32,7 @@ enum class Trouble : uint8_t
 };
 
 /// Thrown where work cannot go on. `code()` is the problem's, or TAV_RC_BAD_PARAM where no code says it.
-class Error : public std::system_error
+class TAV_INSPECT_API Error : public std::system_error
 {
 public:
   explicit Error(Problem what, Trouble kind = Trouble::refused);
@@ -47,6 +48,6 @@ private:
 };
 
 /// Throws an Error because the system refused something about a file.
-[[noreturn]] void failAt(const std::string& file, uint32_t code, std::string hint = {});
+[[noreturn]] TAV_INSPECT_API void failAt(const std::string& file, uint32_t code, std::string hint = {});
 
 } // namespace tav::inspect

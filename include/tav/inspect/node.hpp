@@ -1,4 +1,4 @@
-/// @file node.h
+/// @file node.hpp
 /// How a stream is to be read, and one node of it as the walker found it.
 #pragma once
 

@@ -1,4 +1,4 @@
-/// @file textSource.h
+/// @file textSource.hpp
 /// The text of a document, from front to back.
 #pragma once
 
@@ -10,11 +10,13 @@
 #include <utility>
 #include <vector>
 
+#include "tav/inspect/api.hpp"
+
 namespace tav::inspect
 {
 
 /// A text that knows where it is being read. Used by one thread.
-class TextSource : public std::streambuf
+class TAV_INSPECT_API TextSource : public std::streambuf
 {
 public:
   /// `name` is how messages call it.
@@ -43,7 +45,7 @@ private:
 };
 
 /// A text in memory, which outlives this object.
-class MemoryText final : public TextSource
+class TAV_INSPECT_API MemoryText final : public TextSource
 {
 public:
   MemoryText(std::string name, std::string_view text)

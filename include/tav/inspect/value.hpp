@@ -1,4 +1,4 @@
-/// @file value.h
+/// @file value.hpp
 /// A node's value: its bytes in host order, and as text for people.
 #pragma once
 
@@ -9,48 +9,54 @@
 #include <string_view>
 #include <vector>
 
-#include "inspect/walk/node.h"
-#include "inspect/walk/source.h"
+#include "tav/inspect/api.hpp"
+#include "tav/inspect/node.hpp"
+#include "tav/inspect/source.hpp"
 
 namespace tav::inspect
 {
 
 /// The first bytes of a node's payload, `most` at the most, in host order where the type has an order and the bytes
 /// hold the whole value.
-std::vector<uint8_t> payloadBytes(ByteSource& source, const Form& form, const Node& node, uint64_t most);
+TAV_INSPECT_API std::vector<uint8_t> payloadBytes(ByteSource& source, const Form& form, const Node& node,
+                                                  uint64_t most);
 
 /// The value as one line of text without line breaks: numbers in decimal, 128-bit ones too; strings in quotation marks
 /// with escapes; calendar dates; bytes in hexadecimal. A value of the wrong size is shown as its bytes. At most `most`
 /// bytes of the payload are read; " ..." tells that there are more. A group has no value: empty.
-std::string valueText(ByteSource& source, const Form& form, const Node& node, uint64_t most);
+TAV_INSPECT_API std::string valueText(ByteSource& source, const Form& form, const Node& node, uint64_t most);
 
 /// The value as `get` prints it: a string is its characters as they are, the rest as in valueText. Only for values that
 /// fit in memory; nothing for a value of more than `most` bytes, which is to be copied piece by piece.
-std::optional<std::string> plainText(ByteSource& source, const Form& form, const Node& node, uint64_t most);
+TAV_INSPECT_API std::optional<std::string> plainText(ByteSource& source, const Form& form, const Node& node,
+                                                     uint64_t most);
 
 /// The name of a type for people: "Uint32"; "group" for both kinds of groups; "type 12345".
-std::string typeText(uint16_t type);
+TAV_INSPECT_API std::string typeText(uint16_t type);
 
 /// Text in quotation marks: what steers a terminal and what is no UTF-8 is written as \n, \t, \x1b and so on.
-std::string quoted(std::string_view text);
+TAV_INSPECT_API std::string quoted(std::string_view text);
 
 /// Text for a terminal, without quotation marks: as `quoted`, but quotation marks and backslashes stay as they are.
-std::string forTerminal(std::string_view text);
+TAV_INSPECT_API std::string forTerminal(std::string_view text);
 
 /// Whether bytes are well-formed UTF-8.
-bool isUtf8(std::string_view text);
+TAV_INSPECT_API bool isUtf8(std::string_view text);
+
+/// The distance that the eye/size pair at `offset` tells; nothing where no eye catcher stands.
+TAV_INSPECT_API std::optional<uint64_t> pairDistanceAt(ByteSource& source, const Form& form, uint64_t offset);
 
 /// "0011aaff"
-std::string hexText(std::span<const uint8_t> bytes);
+TAV_INSPECT_API std::string hexText(std::span<const uint8_t> bytes);
 
 /// `2024-02-29T10:30:00.000000+01:00`, from the right calendar; "12345678901234567 s" when the year has more than four
 /// digits.
-std::string dateText(const TAVTimeStamp& stamp);
+TAV_INSPECT_API std::string dateText(const TAVTimeStamp& stamp);
 
 /// A 128-bit number in host order, in decimal.
-std::string int128Text(std::span<const uint8_t> bytes, bool isSigned);
+TAV_INSPECT_API std::string int128Text(std::span<const uint8_t> bytes, bool isSigned);
 
 /// Cuts a text to a number of terminal columns, counting UTF-8 characters as one each; "..." shows the cut.
-std::string cutToWidth(std::string_view text, size_t columns);
+TAV_INSPECT_API std::string cutToWidth(std::string_view text, size_t columns);
 
 } // namespace tav::inspect

@@ -1,4 +1,4 @@
-/// @file scratch.h
+/// @file scratch.hpp
 /// A file for bytes that are needed for a while.
 #pragma once
 
@@ -6,13 +6,14 @@
 #include <memory>
 #include <string>
 
+#include "tav/inspect/api.hpp"
 #include "tav/kor.h"
 
 namespace tav::inspect
 {
 
 /// An empty file that is open for reading and writing, and gone with the object.
-class Scratch
+class TAV_INSPECT_API Scratch
 {
 public:
   virtual ~Scratch() = default;
@@ -24,10 +25,10 @@ using ScratchMaker = std::function<std::unique_ptr<Scratch>()>;
 
 /// Makes a file in the folder for temporary files that only its owner can read. Where an open file can be removed it
 /// has no name any more when this returns.
-std::unique_ptr<Scratch> makeScratch();
+TAV_INSPECT_API std::unique_ptr<Scratch> makeScratch();
 
 /// Opens a new file in the folder for temporary files and returns its path, UTF-8. `number` begins its name: the names
 /// are tried until nobody else has one. Throws Error.
-std::string openTemporary(KORHFile& file, uint64_t number);
+TAV_INSPECT_API std::string openTemporary(KORHFile& file, uint64_t number);
 
 } // namespace tav::inspect

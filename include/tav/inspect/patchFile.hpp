@@ -1,4 +1,4 @@
-/// @file patchFile.h
+/// @file patchFile.hpp
 /// A file that is written from front to back, while bytes that were written before can still be set right.
 #pragma once
 
@@ -7,6 +7,7 @@
 #include <string>
 #include <string_view>
 
+#include "tav/inspect/api.hpp"
 #include "tav/kor.h"
 
 namespace tav::inspect
@@ -14,7 +15,7 @@ namespace tav::inspect
 
 /// Bytes that are appended and, when more is known, replaced. In memory is what was appended last, 256 KiB at most.
 /// Throws Error when the system refuses. Used by one thread.
-class PatchFile
+class TAV_INSPECT_API PatchFile
 {
 public:
   /// Over an empty file that is open for reading and writing, which outlives this object.

@@ -1,0 +1,27 @@
+/// @file inspect.hpp
+/// Inspection: looking into streams whose form is not known and whose bytes may be damaged. Library `libtav-inspect`.
+///
+/// Sources are files, storages and memory; results go to sinks that the caller gives; how far long work is comes as a
+/// callback. What cannot go on throws tav::inspect::Error. Nothing here prints, ends the program, keeps global state or
+/// starts threads. An object belongs to one thread at a time; different objects are independent of each other.
+#pragma once
+
+#include "tav/inspect/checker.hpp"
+#include "tav/inspect/diff.hpp"
+#include "tav/inspect/form.hpp"
+#include "tav/inspect/json.hpp"
+#include "tav/inspect/jsonText.hpp"
+#include "tav/inspect/jsonWriter.hpp"
+#include "tav/inspect/locate.hpp"
+#include "tav/inspect/node.hpp"
+#include "tav/inspect/patchFile.hpp"
+#include "tav/inspect/path.hpp"
+#include "tav/inspect/phrases.hpp"
+#include "tav/inspect/problem.hpp"
+#include "tav/inspect/rules.hpp"
+#include "tav/inspect/scratch.hpp"
+#include "tav/inspect/sink.hpp"
+#include "tav/inspect/source.hpp"
+#include "tav/inspect/textSource.hpp"
+#include "tav/inspect/value.hpp"
+#include "tav/inspect/walker.hpp"

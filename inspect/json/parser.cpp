@@ -1,0 +1,322 @@
+#include "inspect/json/parser.h"
+
+#include <utility>
+
+#include "tav/inspect/value.hpp"
+
+namespace tav::inspect
+{
+
+namespace
+{
+
+bool isDigit(int c)
+{
+  return c >= '0' && c <= '9';
+}
+
+void appendUtf8(std::string& text, uint32_t point)
+{
+  const auto put = [&text](uint32_t byte) { text += static_cast<char>(byte); };
+  if (point < 0x80)
+  {
+    put(point);
+    return;
+  }
+  if (point < 0x800)
+  {
+    put(0xC0 | point >> 6);
+  }
+  else if (point < 0x10000)
+  {
+    put(0xE0 | point >> 12);
+    put(0x80 | (point >> 6 & 0x3F));
+  }
+  else
+  {
+    put(0xF0 | point >> 18);
+    put(0x80 | (point >> 12 & 0x3F));
+    put(0x80 | (point >> 6 & 0x3F));
+  }
+  put(0x80 | (point & 0x3F));
+}
+
+} // namespace
+
+void JsonParser::fail(const std::string& expected)
+{
+  const int found = peek();
+  std::string text = "the text ends";
+  if (found != Traits::eof())
+  {
+    const char character = Traits::to_char_type(found);
+    text = quoted(std::string_view(&character, 1)) + " stands";
+  }
+  throw JsonSyntaxError(text + " where " + expected + " is expected");
+}
+
+int JsonParser::peekBehindBlanks()
+{
+  int c = peek();
+  while (c == ' ' || c == '\t' || c == '\r' || c == '\n')
+  {
+    c = text_.snextc();
+  }
+  return c;
+}
+
+void JsonParser::parseValue()
+{
+  while (startValue() || endContainers())
+  {
+  }
+}
+
+/// Reads what begins with a value's first character; true when a container began and its first value is to be read.
+bool JsonParser::startValue()
+{
+  switch (peekBehindBlanks())
+  {
+  case '{':
+    startContainer(true);
+    if (peekBehindBlanks() == '}')
+    {
+      endContainer();
+      return false;
+    }
+    readKey();
+    return true;
+  case '[':
+    startContainer(false);
+    if (peekBehindBlanks() == ']')
+    {
+      endContainer();
+      return false;
+    }
+    return true;
+  case '"': handler_.string(readString()); return false;
+  case 'n':
+    readWord("null");
+    handler_.null();
+    return false;
+  case 't':
+    readWord("true");
+    handler_.boolean(true);
+    return false;
+  case 'f':
+    readWord("false");
+    handler_.boolean(false);
+    return false;
+  default: readNumber(); return false;
+  }
+}
+
+/// Behind a value: ends the containers that end here; true when another value follows.
+bool JsonParser::endContainers()
+{
+  while (!objects_.empty())
+  {
+    const bool object = objects_.back();
+    const int c = peekBehindBlanks();
+    if (c == ',')
+    {
+      text_.sbumpc();
+      if (object)
+      {
+        readKey();
+      }
+      return true;
+    }
+    if (c != (object ? '}' : ']'))
+    {
+      fail(object ? "a comma or the end of the object" : "a comma or the end of the array");
+    }
+    endContainer();
+  }
+  return false;
+}
+
+void JsonParser::startContainer(bool object)
+{
+  text_.sbumpc();
+  objects_.push_back(object);
+  object ? handler_.startObject() : handler_.startArray();
+}
+
+void JsonParser::endContainer()
+{
+  text_.sbumpc();
+  const bool object = objects_.back();
+  objects_.pop_back();
+  object ? handler_.endObject() : handler_.endArray();
+}
+
+void JsonParser::readKey()
+{
+  if (peekBehindBlanks() != '"')
+  {
+    fail("a key");
+  }
+  handler_.key(readString()); // so that what is said of a key tells its place
+  if (peekBehindBlanks() != ':')
+  {
+    fail("a colon");
+  }
+  text_.sbumpc();
+}
+
+std::string JsonParser::readString()
+{
+  text_.sbumpc();
+  std::string text;
+  for (int c = peek(); c != '"'; c = peek())
+  {
+    if (c == Traits::eof() || c < 0x20)
+    {
+      fail(c == Traits::eof() ? "the end of a string"
+                              : "a character of a string; control characters are written as \\u00..");
+    }
+    text_.sbumpc();
+    if (c == '\\')
+    {
+      readEscape(text);
+    }
+    else
+    {
+      text += Traits::to_char_type(c);
+    }
+  }
+  text_.sbumpc();
+  if (!isUtf8(text))
+  {
+    throw JsonSyntaxError("a string is no UTF-8");
+  }
+  return text;
+}
+
+void JsonParser::readEscape(std::string& text)
+{
+  static constexpr std::string_view letters = "\"\\/bfnrt";
+  static constexpr std::string_view characters = "\"\\/\b\f\n\r\t";
+  const int c = peek();
+  if (const size_t at = c == Traits::eof() ? letters.npos : letters.find(Traits::to_char_type(c)); at != letters.npos)
+  {
+    text_.sbumpc();
+    text += characters[at];
+    return;
+  }
+  if (c != 'u')
+  {
+    fail("an escape");
+  }
+  text_.sbumpc();
+  uint32_t point = readHex4();
+  if (point >= 0xD800 && point < 0xDC00)
+  {
+    if (peek() != '\\' || text_.snextc() != 'u')
+    {
+      fail("the second half of a surrogate pair");
+    }
+    text_.sbumpc();
+    const uint32_t low = readHex4();
+    if (low < 0xDC00 || low >= 0xE000)
+    {
+      fail("the second half of a surrogate pair before this");
+    }
+    point = 0x10000 + ((point - 0xD800) << 10) + (low - 0xDC00);
+  }
+  else if (point >= 0xDC00 && point < 0xE000)
+  {
+    fail("the first half of a surrogate pair before this");
+  }
+  appendUtf8(text, point);
+}
+
+uint32_t JsonParser::readHex4()
+{
+  uint32_t value = 0;
+  for (int i = 0; i < 4; ++i)
+  {
+    const int c = peek();
+    const bool small = c >= 'a' && c <= 'f';
+    if (!isDigit(c) && !small && !(c >= 'A' && c <= 'F'))
+    {
+      fail("a hexadecimal digit");
+    }
+    const int digit = isDigit(c) ? c - '0' : c - (small ? 'a' : 'A') + 10;
+    value = value << 4 | static_cast<uint32_t>(digit);
+    text_.sbumpc();
+  }
+  return value;
+}
+
+void JsonParser::readDigits(std::string& digits)
+{
+  if (!isDigit(peek()))
+  {
+    fail("a digit");
+  }
+  for (int c = peek(); isDigit(c); c = text_.snextc())
+  {
+    digits += Traits::to_char_type(c);
+  }
+}
+
+void JsonParser::readNumber()
+{
+  std::string text;
+  const auto take = [&] { text += Traits::to_char_type(text_.sbumpc()); };
+  if (const int c = peek(); c != '-' && !isDigit(c))
+  {
+    fail("a value");
+  }
+  if (peek() == '-')
+  {
+    take();
+  }
+  if (peek() == '0')
+  {
+    take();
+  }
+  else
+  {
+    readDigits(text);
+  }
+  bool whole = true;
+  if (peek() == '.')
+  {
+    whole = false;
+    take();
+    readDigits(text);
+  }
+  if (peek() == 'e' || peek() == 'E')
+  {
+    whole = false;
+    take();
+    if (peek() == '+' || peek() == '-')
+    {
+      take();
+    }
+    readDigits(text);
+  }
+  if (!whole)
+  {
+    handler_.fraction(std::move(text));
+    return;
+  }
+  handler_.integer(text == "-0" ? std::string("0") : std::move(text));
+}
+
+void JsonParser::readWord(const char* word)
+{
+  for (const char* letter = word; *letter != '\0'; ++letter)
+  {
+    if (peek() != *letter)
+    {
+      fail(std::string("the word ") + word);
+    }
+    text_.sbumpc();
+  }
+}
+
+} // namespace tav::inspect
