@@ -6,7 +6,7 @@ endif()
 include(GNUInstallDirs)
 include(CMakePackageConfigHelpers)
 
-install(TARGETS kor tav
+install(TARGETS kor tav tav_inspect
   EXPORT tavTargets
   RUNTIME COMPONENT runtime
   LIBRARY COMPONENT runtime NAMELINK_COMPONENT development
@@ -42,7 +42,7 @@ function(tav_install_pkgconfig PC_NAME PC_DESCRIPTION PC_REQUIRES PC_LIBS_PRIVAT
     set(PC_INCLUDEDIR "\${prefix}/${CMAKE_INSTALL_INCLUDEDIR}")
   endif()
   set(PC_CFLAGS)
-  if(TAV_LIBRARY_TYPE STREQUAL "STATIC")
+  if(TAV_LIBRARY_TYPE STREQUAL "STATIC" AND NOT PC_NAME STREQUAL "tav-inspect") # which follows libtav
     string(TOUPPER ${PC_NAME} upper)
     set(PC_CFLAGS " -D${upper}_STATIC")
   endif()
@@ -53,3 +53,4 @@ endfunction()
 tav_install_pkgconfig(kor "Portability layer of libtav: memory, files, threads and the trace facility" ""
   "${CMAKE_THREAD_LIBS_INIT}")
 tav_install_pkgconfig(tav "${PROJECT_DESCRIPTION}" "kor = ${PROJECT_VERSION}" "")
+tav_install_pkgconfig(tav-inspect "Inspection of tav streams: recognise, walk, check, recover, compare, convert" "tav = ${PROJECT_VERSION}" "")

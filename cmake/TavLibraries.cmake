@@ -1,13 +1,13 @@
-# libkor and libtav from the rooms' objects, and tav_internal for the tests.
+# libkor, libtav and libtav-inspect from the rooms' objects, and tav_internal for the tests.
 
-# tav_add_library(NAME ROOM...): the library and its alias tav::NAME.
-function(tav_add_library name)
+# tav_add_library(NAME ALIAS ROOM...): the library and its name for users, tav::ALIAS.
+function(tav_add_library name alias)
   set(objects)
   foreach(room IN LISTS ARGN)
     list(APPEND objects $<TARGET_OBJECTS:${room}_objects>)
   endforeach()
   add_library(${name} ${TAV_LIBRARY_TYPE} ${objects})
-  add_library(tav::${name} ALIAS ${name})
+  add_library(tav::${alias} ALIAS ${name})
   target_compile_features(${name} PUBLIC cxx_std_20)
   target_include_directories(${name} PUBLIC
     $<BUILD_INTERFACE:${PROJECT_SOURCE_DIR}/include>
@@ -18,7 +18,9 @@ function(tav_add_library name)
     SOVERSION ${TAV_ABI_VERSION})
   if(TAV_LIBRARY_TYPE STREQUAL "STATIC")
     string(TOUPPER ${name} upper)
-    target_compile_definitions(${name} PUBLIC ${upper}_STATIC)
+    if(NOT name STREQUAL "tav_inspect") # which follows libtav
+      target_compile_definitions(${name} PUBLIC ${upper}_STATIC)
+    endif()
   elseif(WIN32)
     target_sources(${name} PRIVATE $<TARGET_OBJECTS:module_entry>)
     # The names on both platforms are those of the library alone: tav.dll, libtav.so.
@@ -34,18 +36,21 @@ function(tav_add_library name)
 endfunction()
 
 include(GNUInstallDirs)
-tav_add_library(kor kor)
+tav_add_library(kor kor kor)
 target_link_libraries(kor PRIVATE Threads::Threads)
-tav_add_library(tav format storage dictionary api)
+tav_add_library(tav tav format storage dictionary api)
 target_link_libraries(tav PUBLIC kor)
+tav_add_library(tav_inspect inspect inspect)
+target_link_libraries(tav_inspect PUBLIC tav)
+set_target_properties(tav_inspect PROPERTIES OUTPUT_NAME tav-inspect EXPORT_NAME inspect)
 # Where the pair is installed together, libtav finds libkor beside itself, wherever the prefix was moved to.
 if(UNIX AND NOT APPLE AND NOT DEFINED CMAKE_INSTALL_RPATH)
-  set_target_properties(tav PROPERTIES INSTALL_RPATH "$ORIGIN")
+  set_target_properties(tav tav_inspect PROPERTIES INSTALL_RPATH "$ORIGIN")
 endif()
 
 if(TAV_BUILD_TESTS OR TAV_BUILD_BENCH)
   set(objects)
-  foreach(room IN LISTS TAV_ROOMS)
+  foreach(room IN LISTS TAV_ROOMS ITEMS inspect)
     list(APPEND objects $<TARGET_OBJECTS:${room}_objects>)
   endforeach()
   add_library(tav_internal STATIC EXCLUDE_FROM_ALL ${objects})

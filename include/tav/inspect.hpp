@@ -18,6 +18,7 @@
 #include "tav/inspect/path.hpp"
 #include "tav/inspect/phrases.hpp"
 #include "tav/inspect/problem.hpp"
+#include "tav/inspect/recover.hpp"
 #include "tav/inspect/rules.hpp"
 #include "tav/inspect/scratch.hpp"
 #include "tav/inspect/sink.hpp"

@@ -11,31 +11,10 @@
 #include "inspect/recover/endings.h"
 #include "inspect/recover/rebuild.h"
 #include "inspect/walk/prober.h"
+#include "tav/inspect/recover.hpp"
 
 namespace tav::inspect
 {
-
-/// Bytes of the file that did not come back.
-struct Loss
-{
-  uint64_t offset = 0;
-  uint64_t length = 0;
-  std::string reason{};
-};
-
-/// Where every byte of the file went, and what was done.
-struct RecoveryTotals
-{
-  uint64_t kept = 0; ///< of nodes that came back, their paddings, pairs and end elements, and zeros behind the stream
-  uint64_t lost = 0;
-  uint64_t unread = 0; ///< behind the place where searching was given up
-  uint64_t zeros = 0;  ///< of the kept: behind the stream
-  uint64_t nodes = 0;  ///< that came back, end elements not counted
-  uint64_t losses = 0; ///< runs of lost bytes
-  uint64_t closed = 0; ///< groups that were open or whose size was wrong
-  uint64_t made = 0;   ///< groups made for what has lost its own
-  uint64_t pairs = 0;  ///< pairs and end elements that were missing or damaged
-};
 
 /// Goes through the file once; a second time, for eye catchers alone, from the first damage on. What is found goes to
 /// the rebuilder at once, so that memory grows with the depth, and with the groups whose headers are lost.

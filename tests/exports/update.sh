@@ -4,7 +4,7 @@
 set -euo pipefail
 here=$(cd "$(dirname "${BASH_SOURCE[0]}")" && pwd)
 build=${1:-$here/../../build/release}
-for library in kor tav; do
+for library in kor tav tav-inspect; do
   "$here/symbols.sh" "$build/lib$library.so" >"$here/lib$library.symbols"
 done
 wc -l "$here"/*.symbols

@@ -6,7 +6,7 @@
 
 #include <nlohmann/json.hpp>
 
-#include "inspect/recover/recovery.h"
+#include "tav/inspect.hpp"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/progress.h"
@@ -154,19 +154,16 @@ Account recoverInto(const Invocation& invocation, ByteSource& source, const Form
   Account account;
   account.form = form;
   Progress progress("recover", source.size());
-  Rebuilder rebuilder(source, form, file, [&](uint64_t offset) { progress.at(offset); });
-  Recovery recovery(source, form, rebuilder, invocation.number("--search").value_or(kNoOffset),
-                    [&](const Loss& loss) {
-                      if (account.losses.size() < kMostListed)
-                      {
-                        account.losses.push_back(loss);
-                      }
-                    });
-  while (recovery.step())
-  {
-    progress.at(recovery.position());
-  }
-  account.totals = recovery.totals();
+  const auto keepLoss = [&](const Loss& loss) {
+    if (account.losses.size() < kMostListed)
+    {
+      account.losses.push_back(loss);
+    }
+  };
+  account.totals = recover(source, form, file,
+                           {.search = invocation.number("--search").value_or(kNoOffset),
+                            .lost = keepLoss,
+                            .progress = [&](uint64_t offset) { progress.at(offset); }});
   account.bytes = source.size();
   account.written = file.length();
   return account;

@@ -25,16 +25,16 @@ struct Finding
 
 /// Walks a stream once, in memory that grows with the depth alone. Findings come in the order in which they are
 /// certain: what is known of a group only at its end comes there.
-class TAV_INSPECT_API Checker
+class Checker
 {
 public:
   using Sink = std::function<void(const Finding&)>;
 
   /// `wanted` tells which rules to look for: payloads are read only for rules about strings.
-  Checker(ByteSource& source, const Form& form, std::function<bool(RuleId)> wanted, Sink sink);
+  TAV_INSPECT_API Checker(ByteSource& source, const Form& form, std::function<bool(RuleId)> wanted, Sink sink);
 
   /// Goes on by one piece of the file; false at its end.
-  bool step();
+  TAV_INSPECT_API bool step();
 
   uint64_t position() const { return event_.offset + event_.length; }
   uint64_t nodes() const { return nodes_; }

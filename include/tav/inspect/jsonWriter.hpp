@@ -31,18 +31,18 @@ struct DataPieces
   std::optional<Event> pair{};
 };
 
-class TAV_INSPECT_API JsonWriter
+class JsonWriter
 {
 public:
   /// `safe`: whole numbers that a double cannot hold are written as texts.
-  JsonWriter(ByteSource& source, const Form& form, Sink& out, JsonStyle style, bool safe);
+  TAV_INSPECT_API JsonWriter(ByteSource& source, const Form& form, Sink& out, JsonStyle style, bool safe);
 
   /// What stands before the first node and behind the last one.
-  void begin();
-  void end();
+  TAV_INSPECT_API void begin();
+  TAV_INSPECT_API void end();
 
   /// The events of a walk, one after the other, from its beginning to its end.
-  void add(const Walker& walker, const Event& event);
+  TAV_INSPECT_API void add(const Walker& walker, const Event& event);
 
   bool foundDamage() const { return damaged_; }
 

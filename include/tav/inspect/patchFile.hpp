@@ -15,7 +15,7 @@ namespace tav::inspect
 
 /// Bytes that are appended and, when more is known, replaced. In memory is what was appended last, 256 KiB at most.
 /// Throws Error when the system refuses. Used by one thread.
-class TAV_INSPECT_API PatchFile
+class PatchFile
 {
 public:
   /// Over an empty file that is open for reading and writing, which outlives this object.
@@ -24,21 +24,21 @@ public:
   PatchFile(const PatchFile&) = delete;
   PatchFile& operator=(const PatchFile&) = delete;
 
-  void append(std::span<const uint8_t> bytes);
-  void append(std::string_view bytes);
-  void appendZeros(uint64_t count);
+  TAV_INSPECT_API void append(std::span<const uint8_t> bytes);
+  TAV_INSPECT_API void append(std::string_view bytes);
+  TAV_INSPECT_API void appendZeros(uint64_t count);
 
   /// Replaces bytes that were appended.
-  void patch(uint64_t offset, std::span<const uint8_t> bytes);
+  TAV_INSPECT_API void patch(uint64_t offset, std::span<const uint8_t> bytes);
 
   /// Copies bytes that were appended; fewer than asked only at the end.
-  size_t read(uint64_t offset, std::span<uint8_t> to);
+  TAV_INSPECT_API size_t read(uint64_t offset, std::span<uint8_t> to);
 
   /// Bytes appended so far.
   uint64_t length() const { return flushed_ + buffer_.size(); }
 
   /// Hands everything to the system. Without it, bytes that were appended last are lost with the object.
-  void flush();
+  TAV_INSPECT_API void flush();
 
 private:
   void seek(uint64_t offset);

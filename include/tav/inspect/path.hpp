@@ -34,12 +34,12 @@ TAV_INSPECT_API std::vector<uint16_t> idsOf(std::string_view name);
 /// Up to three elements whose names are close to a misspelt one, for a hint; empty when there is none.
 TAV_INSPECT_API std::string similarNames(std::string_view name);
 
-class TAV_INSPECT_API Path
+class Path
 {
 public:
   /// Throws Error, with the place of the error, when the text is no path. A name that no element has is none of
   /// that: such a path leads to no node of any stream.
-  explicit Path(std::string_view text);
+  TAV_INSPECT_API explicit Path(std::string_view text);
 
   struct Step
   {
@@ -59,10 +59,10 @@ public:
   const std::vector<Step>& steps() const { return steps_; }
 
   /// Throws Error when a step has a name that no element has.
-  void requireNames() const;
+  TAV_INSPECT_API void requireNames() const;
 
   /// What to report when the path has led to no node of a file.
-  Problem noMatch(const std::string& file) const;
+  TAV_INSPECT_API Problem noMatch(const std::string& file) const;
 
 private:
   void addStep(std::string_view text);
@@ -77,13 +77,13 @@ private:
 
 /// Follows a walk and tells which nodes a path leads to. Give it the nodeBegin of every node of the walk whose parent
 /// was not skipped. Memory grows with the depth times the `**` of the path.
-class TAV_INSPECT_API PathMatcher
+class PathMatcher
 {
 public:
-  explicit PathMatcher(const Path& path);
+  TAV_INSPECT_API explicit PathMatcher(const Path& path);
 
   /// Whether the path leads to this node.
-  bool matches(const Node& node);
+  TAV_INSPECT_API bool matches(const Node& node);
 
   /// Whether the path can lead to something below the node that was given last.
   bool reachesBelow() const { return starts_.back() < states_.size(); }

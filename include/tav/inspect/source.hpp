@@ -20,7 +20,7 @@ inline constexpr uint64_t kDefaultRing = uint64_t{10} * 1024 * 1024;
 
 /// Bytes that are read at any offset, through pages that are kept while they are used; what lies in memory is read
 /// where it lies. Used by one thread.
-class TAV_INSPECT_API ByteSource
+class ByteSource
 {
 public:
   static constexpr uint64_t kPage = uint64_t{16} * 1024;
@@ -28,17 +28,17 @@ public:
 
   /// Opens a regular file by its path, UTF-8. At most `ringBytes` (and at least two pages) are kept in memory. Throws
   /// Error when that does not work.
-  static std::unique_ptr<ByteSource> open(const std::string& path, uint64_t ringBytes = kDefaultRing);
+  TAV_INSPECT_API static std::unique_ptr<ByteSource> open(const std::string& path, uint64_t ringBytes = kDefaultRing);
 
   /// The same over an open storage. `name` is how messages call it; `keep` is let go of after the storage. Throws
   /// Error.
-  ByteSource(std::string name, std::unique_ptr<TAVSideStorage> storage, uint64_t ringBytes = kDefaultRing,
-             std::shared_ptr<void> keep = {});
+  TAV_INSPECT_API ByteSource(std::string name, std::unique_ptr<TAVSideStorage> storage,
+                             uint64_t ringBytes = kDefaultRing, std::shared_ptr<void> keep = {});
 
   /// Over bytes in memory, which outlive this object.
-  ByteSource(std::string name, std::span<const uint8_t> bytes);
+  TAV_INSPECT_API ByteSource(std::string name, std::span<const uint8_t> bytes);
 
-  ~ByteSource();
+  TAV_INSPECT_API ~ByteSource();
   ByteSource(const ByteSource&) = delete;
   ByteSource& operator=(const ByteSource&) = delete;
 
@@ -49,11 +49,11 @@ public:
   uint64_t size() const { return size_; }
 
   /// Copies bytes; fewer than asked only at the end. Throws Error when they cannot be read.
-  size_t read(uint64_t offset, std::span<uint8_t> to);
+  TAV_INSPECT_API size_t read(uint64_t offset, std::span<uint8_t> to);
 
   /// The bytes from `offset` on as far as they are at hand, at least one unless `offset` is at or behind the end.
   /// Valid until the next call of any function of this object.
-  std::span<const uint8_t> view(uint64_t offset);
+  TAV_INSPECT_API std::span<const uint8_t> view(uint64_t offset);
 
   /// Names who is told, by offset, of each piece that is fetched while reading goes straight on; nobody when empty.
   void tellOfPieces(std::function<void(uint64_t)> told) { told_ = std::move(told); }

@@ -70,31 +70,31 @@ class Prober;
 /// Where bytes are no node, they are handed out as `damaged` up to the place where a node can start again: one that
 /// an eye/size pair leads back to, one behind a pair, one that looks as a writer makes it and is followed by another;
 /// at the latest the end of the group around them.
-class TAV_INSPECT_API Walker
+class Walker
 {
 public:
   /// `source` outlives the walk.
-  Walker(ByteSource& source, const Form& form, WalkStart start = {});
-  ~Walker();
-  Walker(Walker&&) noexcept;
+  TAV_INSPECT_API Walker(ByteSource& source, const Form& form, WalkStart start = {});
+  TAV_INSPECT_API ~Walker();
+  TAV_INSPECT_API Walker(Walker&&) noexcept;
 
   /// The next event; false at the end of the file.
-  bool next(Event& event);
+  TAV_INSPECT_API bool next(Event& event);
 
   /// Directly after the nodeBegin of a group: hands out its children as one `skipped` piece. False, and no effect, for
   /// a group whose end is not known without walking it.
-  bool skip();
+  TAV_INSPECT_API bool skip();
 
   /// The path of the event's node, which must be the event returned last (or one of the same node before). Every
   /// command takes it as input: steps are tags, or ids where a tag is not unique, and the how-manieth of its name.
-  std::string path(const Event& event) const;
+  TAV_INSPECT_API std::string path(const Event& event) const;
 
   const Form& form() const { return form_; }
   /// UTF-8 strings so far with and without the two extra bytes, where the bytes around told.
   uint64_t stringsWithExtra() const { return withExtra_; }
   uint64_t stringsWithoutExtra() const { return withoutExtra_; }
   /// Bytes looked through in search of nodes.
-  uint64_t spent() const;
+  TAV_INSPECT_API uint64_t spent() const;
 
 private:
   struct Count

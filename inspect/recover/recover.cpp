@@ -1,0 +1,31 @@
+#include "tav/inspect/recover.hpp"
+
+#include "inspect/recover/rebuild.h"
+#include "inspect/recover/recovery.h"
+
+namespace tav::inspect
+{
+
+RecoveryTotals recover(ByteSource& source, const Form& form, PatchFile& out, const RecoverOptions& options)
+{
+  const auto at = [&](uint64_t offset) {
+    if (options.progress)
+    {
+      options.progress(offset);
+    }
+  };
+  Rebuilder rebuilder(source, form, out, at);
+  Recovery recovery(source, form, rebuilder, options.search, [&](const Loss& loss) {
+    if (options.lost)
+    {
+      options.lost(loss);
+    }
+  });
+  while (recovery.step())
+  {
+    at(recovery.position());
+  }
+  return recovery.totals();
+}
+
+} // namespace tav::inspect
