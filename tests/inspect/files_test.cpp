@@ -169,22 +169,29 @@ TEST(PatchFile, CanBeReadInBetween)
   EXPECT_EQ(file.read(6, bytes), 0U);
 }
 
-TEST(Scratch, IsGoneWithTheObject)
+TEST(Scratch, IsANewFileEachTime)
 {
-  const auto count = [] {
-    const auto folder = std::filesystem::directory_iterator(std::filesystem::temp_directory_path());
-    return std::count_if(begin(folder), end(folder), [](const auto& entry) {
-      return entry.path().filename().string().starts_with("tav-");
-    });
-  };
-  const auto before = count();
-  {
-    const auto scratch = makeScratch();
-    KORFileWriteParam param;
-    param.pData = "x";
-    param.length = 1;
-    uint64_t done = 0;
-    EXPECT_EQ(scratch->file().write(&param, &done), TAV_RC_OK);
-  }
-  EXPECT_EQ(count(), before);
+  const auto first = makeScratch();
+  const auto second = makeScratch();
+  PatchFile one(first->file());
+  one.append(std::string_view("first"));
+  one.flush();
+  PatchFile two(second->file());
+  EXPECT_EQ(two.length(), 0U);
+  two.append(std::string_view("second"));
+  EXPECT_EQ(all(one), std::vector<uint8_t>({'f', 'i', 'r', 's', 't'}));
+  EXPECT_EQ(all(two).size(), 6U);
+}
+
+TEST(Scratch, TakesTheNextNameWhenOneIsTaken)
+{
+  KORHFile first;
+  KORHFile second;
+  const std::string one = openTemporary(first, 20261122);
+  const std::string two = openTemporary(second, 20261122);
+  EXPECT_NE(one, two);
+  first.close();
+  second.close();
+  EXPECT_TRUE(std::filesystem::remove(one));
+  EXPECT_TRUE(std::filesystem::remove(two));
 }
