@@ -1,10 +1,12 @@
 /// @file path.hpp
 /// Paths through a stream: `/system/host[2]/hostName`.
 ///
+/// @code{.unparsed}
 ///   step   = name | #id | * | **           name: an element's tag, enum name or constant
 ///   index  = [n]                           the how-manieth of its id among its siblings, from 1
 ///          | [@offset]                     the one at this offset; 0x for hexadecimal
 ///   path   = / | / { step [index] / }
+/// @endcode
 ///
 /// `*` is any one node, `**` any number of levels. The leading slash may be left out. A slash alone leads to the roots.
 #pragma once

@@ -34,7 +34,7 @@ TAV_INSPECT_API std::optional<std::string> plainText(ByteSource& source, const F
 /// The name of a type for people: "Uint32"; "group" for both kinds of groups; "type 12345".
 TAV_INSPECT_API std::string typeText(uint16_t type);
 
-/// Text in quotation marks: what steers a terminal and what is no UTF-8 is written as \n, \t, \x1b and so on.
+/// Text in quotation marks: what steers a terminal and what is no UTF-8 is written as escapes, as in C.
 TAV_INSPECT_API std::string quoted(std::string_view text);
 
 /// Text for a terminal, without quotation marks: as `quoted`, but quotation marks and backslashes stay as they are.
