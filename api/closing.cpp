@@ -84,8 +84,9 @@ bool closeGroup32(TraceFrame& frame, TAVHandle& handle, TAVHeader& group)
   return frame.step(50, patchSize(handle, group));
 }
 
-/// A group of unknown size whose size could not be written is still given an end that a reader can find. The close
-/// succeeds then, and the failure is told by its record alone.
+/// A group that was pushed with an unknown size is given an end that a reader can find when its size cannot be written.
+/// The close succeeds then, and the failure is told by its record alone. Any other size stands for what is below the
+/// group, so that failing to write it fails the close.
 bool closeGroup64(TraceFrame& frame, TAVHandle& handle, TAVHeader& group)
 {
   const bool wasUnknown = isSizeUnknown(group);
@@ -93,8 +94,11 @@ bool closeGroup64(TraceFrame& frame, TAVHandle& handle, TAVHeader& group)
   const uint64_t payload = handle.streamBytes - group.nodeOffset - kHeaderSize64;
   setSize(group, payload + (hasEyeSize(group) ? endElementLength(wide) : 0));
   const uint32_t rc = patchSize(handle, group);
-  const bool needsEnd = hasEyeSize(group) || (rc != TAV_RC_OK && wasUnknown);
-  if (!needsEnd)
+  if (rc == TAV_RC_OK && !hasEyeSize(group))
+  {
+    return true;
+  }
+  if (rc != TAV_RC_OK && !wasUnknown)
   {
     return frame.step(50, rc);
   }

@@ -510,7 +510,10 @@ TAV_API uint32_t tavWriteNodeInt(uint64_t options, TAVHandle* handle, TAVHeader*
 /// @param options  0 to close; 1 to abandon the group: the write offset goes back to its first byte
 /// @retval TAV_RC_NOT_FOUND    no group is open
 /// @retval TAV_RC_WRONG_MODE, TAV_RC_BAD_OPTIONS, TAV_RC_BAD_PARAM  misuse
-/// A failure leaves the group open; its size may be written already.
+/// Codes of the storage come up unchanged, but for one: a 64-bit group that was opened with TAV_SIZE_UNKNOWN and whose
+/// size cannot be written stays of unknown size and gets its end element, whose code is the result.
+/// A failure leaves the group open; its size may be written already. The same call gives the stream that would have
+/// been when the cause is gone.
 TAV_API uint32_t tavCloseHeader(uint64_t options, TAVHandle* handle);
 
 /// Overwrites the payload of a data element in place. Size, type and element id must be those in the stream.
