@@ -77,8 +77,8 @@ uint32_t validateChild(TAVHandle& handle, const TAVHeader& child)
     static_cast<void>(frame.require(10, governing == TAV_TYPE_HEADER32, TAV_RC_BAD_CHILD_HDR));
     break;
   case TAV_HDR_64:
-    static_cast<void>(frame.require(
-        20, parent != nullptr ? governing != TAV_TYPE_HEADER32 : isGroupType(governing), TAV_RC_BAD_CHILD_HDR));
+    static_cast<void>(frame.require(20, parent != nullptr ? hasChildren64(*parent) : isGroupType(governing),
+                                    TAV_RC_BAD_CHILD_HDR));
     break;
   default:
     static_cast<void>(frame.fail(30, TAV_RC_BAD_PARAM));

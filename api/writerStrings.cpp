@@ -65,6 +65,12 @@ uint32_t writeText(TAVHandle& handle, const TAVHeader& header, uint64_t& positio
   return rc;
 }
 
+/// Whether the children of a group have headers of this kind. Below a 32-bit header there is no 64-bit one.
+bool takesKind(const TAVHeader& group, uint32_t hdrKind)
+{
+  return typeOf(group) == hdrKind && (hdrKind == TAV_HDR_32 || is64(group));
+}
+
 } // namespace
 
 uint32_t tavAddString(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData, uint16_t codePage)
@@ -112,7 +118,7 @@ uint32_t tavAddStream(uint64_t options, TAVHandle* handle, uint32_t hdrKind, uin
   }
   const TAVHeader* const group = openGroup(*handle);
   uint64_t position = handle->streamBytes;
-  if (frame.require(60, group != nullptr && typeOf(*group) == hdrKind, TAV_RC_BAD_CHILD_HDR) &&
+  if (frame.require(60, group != nullptr && takesKind(*group, hdrKind), TAV_RC_BAD_CHILD_HDR) &&
       frame.step(70, rawWrite(*handle, position, bytes, length)))
   {
     handle->streamBytes = position;

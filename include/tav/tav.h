@@ -476,7 +476,8 @@ TAV_API uint32_t tavGetSideStorage(TAVHandle* handle, TAVSideStorage** outStorag
 /// @retval TAV_RC_BAD_PARAM       null argument, null payload of a data element, unknown hdrType
 /// @retval TAV_RC_WRONG_MODE      the handle is for reading
 /// @retval TAV_RC_BAD_OPTIONS     options not 0
-/// @retval TAV_RC_BAD_CHILD_HDR   the open group takes the other header form, or a root is not a group
+/// @retval TAV_RC_BAD_CHILD_HDR   the open group takes the other header form (one with a 32-bit header takes no 64-bit
+///                                child, whatever its type), or a root is not a group
 /// @retval TAV_RC_BAD_PAYLOAD     `dataBufSize` is smaller than the header's size
 /// @retval TAV_RC_END_OF_STORAGE  the block is full
 /// @retval TAV_RC_NO_MEMORY       more than 4,000 open groups: the group's header is written, but it is not open

@@ -307,7 +307,7 @@ Element pickNode(Random& random, bool wide, Bytes payload)
   if (random.oneIn(8))
   {
     return wide ? group64(elm, random.oneIn(3) ? TAV_TYPE_HEADER32 : TAV_TYPE_HEADER64, info, TAV_SIZE_UNKNOWN)
-                : group32(elm, 0);
+                : Element{header32(0, random.oneIn(4) ? TAV_TYPE_HEADER64 : TAV_TYPE_HEADER32, elm), {}};
   }
   return element(wide,
                  random.pick<uint16_t>({TAV_TYPE_BINARY, TAV_TYPE_UINT32, TAV_TYPE_UINT64, TAV_TYPE_ASCII_STRING}), elm,
