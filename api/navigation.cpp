@@ -67,6 +67,8 @@ uint32_t readAfterOpenGroup(TAVHandle& handle, const TAVHeader& parent, const TA
     return frame.code();
   }
   const bool sibling = parent != nullptr && refChild != nullptr;
+  const bool inAnswer = parent == &out->header || refChild == &out->header;
+  const TAVHeader before = out->header;
   bool found = false;
   if (sibling && isSizeUnknown(*refChild))
   {
@@ -84,6 +86,10 @@ uint32_t readAfterOpenGroup(TAVHandle& handle, const TAVHeader& parent, const TA
   if (found)
   {
     frame.dump(100, trace::record(out));
+  }
+  else if (inAnswer)
+  {
+    out->header = before; // reading may have put parts of the child there
   }
   return frame.code();
 }

@@ -567,7 +567,7 @@ TAV_API uint32_t tavFindNodeFromIndex(uint64_t options, TAVHandle* handle, uint6
 /// @param handle    opened with TAV_OPT_READ
 /// @param parent    group to walk; null: the node at offset 0
 /// @param refChild  child returned last; null: the first child
-/// @param[out] out  the child; `refChild` may be its own header, so that a walk needs one descriptor
+/// @param[out] out  the child; `refChild` or `parent` may be its own header, so that a walk needs one descriptor
 /// @retval TAV_RC_NO_MORE_CHILDREN  the level has ended (not a failure)
 /// @retval TAV_RC_OUTSIDE_PARENT    the next child would start past its parent's end: damaged stream
 /// @retval TAV_RC_NOT_SUPPORTED     `refChild` is a data element of unknown size
@@ -579,7 +579,8 @@ TAV_API uint32_t tavGetNextChild(uint64_t options, TAVHandle* handle, TAVHeader*
 
 /// Steps back to the node whose eye/size pair ends where `ref` starts. Only nodes written with TAV_INFO_EYE_SIZE
 /// can be reached, and not those whose pair does not count all that lies before it (padding, the extra bytes of
-/// tavAddString, the header of a 64-bit group of type 1).
+/// tavAddString, the header of a 64-bit group of type 1). `out` may be `ref`. A failure leaves the header of `ref`
+/// untouched.
 /// @retval TAV_RC_NOT_FOUND  no eye catcher in the handle's byte order stands there
 /// @retval TAV_RC_NO_MEMORY  the pair or the node would lie outside the stream
 TAV_API uint32_t tavGetPrevNode(uint64_t options, TAVHandle* handle, TAVHeaderData* ref, TAVHeaderData* out);
@@ -598,6 +599,8 @@ TAV_API uint32_t tavGetPrevNode(uint64_t options, TAVHandle* handle, TAVHeaderDa
 /// @retval TAV_RC_OK         found, or, with maxDepth above the current level, a group that does not match was
 ///                           entered: then `out` is untouched and the group is on top of `stack`
 /// @retval TAV_RC_NOT_FOUND  no match, or the walk failed; the search never climbs out of a group it entered
+/// A failure leaves `parent`, `resume` and `out` untouched, and on `stack` what was pushed before it. `parent` or
+/// `resume` may be the header of `out`.
 TAV_API uint32_t tavFindElmInt(TAVHandle* handle, TAVHeader* parent, uint32_t minDepth, uint32_t maxDepth,
                                uint16_t infoKey, uint32_t elm, TAVHeader* resume, TAVHdrStack* stack,
                                TAVHeaderData* out);
@@ -612,6 +615,7 @@ TAV_API uint32_t tavFindElmInt(TAVHandle* handle, TAVHeader* parent, uint32_t mi
 /// @retval TAV_RC_NO_MEMORY      the first entry matches, the whole path does not
 /// @retval TAV_RC_OUTSIDE_PARENT damage leads to groups that were searched before
 /// @retval TAV_RC_NOT_SUPPORTED  the second list is set, even if the path was found
+/// A failure leaves `parent` and `out` untouched; `parent` may be the header of `out`.
 TAV_API uint32_t tavFindLogicalGroup(uint64_t options, TAVHandle* handle, TAVHeader* parent,
                                      TAVFindLogicalGroupParam* param, TAVHeaderData* out);
 
