@@ -29,16 +29,6 @@ uint64_t encodeGroupSize(uint64_t size, bool wide, bool swap, uint8_t* to)
   return sizeof word;
 }
 
-void setSize(TAVHeader& group, uint64_t size)
-{
-  if (is64(group))
-  {
-    group.hdr64.size = size;
-    return;
-  }
-  group.hdr32.size = static_cast<uint32_t>(size);
-}
-
 /// Writes the size of a group over the one in the stream.
 uint32_t patchSize(TAVHandle& handle, const TAVHeader& group)
 {

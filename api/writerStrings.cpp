@@ -16,16 +16,17 @@ bool isStringType(uint16_t type, uint16_t codePage)
   return (type == TAV_TYPE_ASCII_STRING && codePage == TAV_CODE_PAGE_ASCII) || type == TAV_TYPE_UTF8_STRING;
 }
 
-void countCodePage(TAVHeader& header)
+/// Counts the code page in a string's size; false, with the size as it is, where the size has no room for it.
+bool countCodePage(TAVHeader& header)
 {
-  if (is64(header))
+  const uint64_t most = is64(header) ? ~uint64_t{0} : ~uint32_t{0};
+  const uint64_t size = sizeOf(header);
+  if (size > most - kCodePageLength)
   {
-    header.hdr64.size += kCodePageLength;
+    return false;
   }
-  else
-  {
-    header.hdr32.size += static_cast<uint32_t>(kCodePageLength);
-  }
+  setSize(header, size + kCodePageLength);
+  return true;
 }
 
 uint32_t writeCodePage(TAVHandle& handle, uint64_t& position, uint16_t codePage)
@@ -90,9 +91,10 @@ uint32_t tavAddString(uint64_t options, TAVHandle* handle, TAVHeaderData* header
   {
     return frame.code();
   }
-  if (utf8)
+  const uint64_t size = sizeOf(header);
+  if (!frame.require(55, !utf8 || countCodePage(header), TAV_RC_BAD_PARAM))
   {
-    countCodePage(header);
+    return frame.code();
   }
   uint64_t position = handle->streamBytes;
   if (frame.step(60, tavWriteNodeInt(options, handle, &header, &position, nullptr, 0)) &&
@@ -100,6 +102,10 @@ uint32_t tavAddString(uint64_t options, TAVHandle* handle, TAVHeaderData* header
   {
     handle->streamBytes = position;
     frame.dump(100, position);
+  }
+  else
+  {
+    setSize(header, size); // which the same call counts again
   }
   return frame.code();
 }

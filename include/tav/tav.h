@@ -491,7 +491,8 @@ TAV_API uint32_t tavAddElement(uint64_t options, TAVHandle* handle, TAVHeaderDat
 /// that many bytes are taken from `pDataBuf`, so 2 bytes more than the text must be readable there; they follow the
 /// node in the stream without being counted, and a walk seeks the next node 2 bytes early. To write UTF-8 that walks
 /// well, give tavAddElement a payload that begins with the code page.
-/// `nodeOffset` is not set. Codes as tavAddElement; neither mode nor options are checked.
+/// `nodeOffset` is not set. Codes as tavAddElement, and TAV_RC_BAD_PARAM for a size to which 2 cannot be added; neither
+/// mode nor options are checked. A failure leaves the caller's `size` as it was.
 TAV_API uint32_t tavAddString(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData, uint16_t codePage);
 
 /// Appends nodes that are encoded already, byte for byte, under the open group.
