@@ -2,6 +2,7 @@
 #include <cstdarg>
 
 #include "api/printer.h"
+#include "kor/lineBuffered.h"
 
 namespace
 {
@@ -39,6 +40,15 @@ uint64_t formatAlone(TAVPrintCtx& ctx, const char* format, va_list arguments)
   // Not every C library counts nothing when the stream refuses.
   const bool refused = length < 0 || (sound && std::ferror(stream) != 0);
   return refused ? 0 : static_cast<uint64_t>(length);
+}
+
+/// Whether a stream takes a piece. Of one that ends a line fwrite counts all also when the line is refused, and such a
+/// piece has no NUL.
+bool writeWhole(FILE* stream, std::string_view text)
+{
+  return text.ends_with('\n') && tav::kor::isLineBuffered(stream)
+             ? std::fprintf(stream, "%.*s", static_cast<int>(text.size()), text.data()) >= 0
+             : std::fwrite(text.data(), 1, text.size(), stream) == text.size();
 }
 
 /// Formats a piece of at most a line's length, cutting what is longer.
@@ -109,7 +119,7 @@ uint64_t pieceAlone(TAVPrintCtx& ctx, std::string_view text)
   uint64_t count = 0;
   if (!isToBuffer(ctx))
   {
-    count = std::fwrite(text.data(), 1, text.size(), streamOf(ctx)) == text.size() ? text.size() : 0;
+    count = writeWhole(streamOf(ctx), text) ? text.size() : 0;
   }
   else if (ctx.bufferSize != 0)
   {

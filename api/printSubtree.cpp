@@ -7,6 +7,7 @@
 #include "api/printLeaves.h"
 #include "format/hdrStack.h"
 #include "format/layout.h"
+#include "kor/lineBuffered.h"
 #include "kor/traceFrame.h"
 #include "tav/probes.h"
 
@@ -210,7 +211,9 @@ uint32_t printBelow(TAVPrintCtx& ctx, TAVHandle* handle, const TAVHeader& start)
     return rc;
   }
   const bool toBuffer = ctx.pStream == nullptr && ctx.pBuffer != nullptr;
-  return toBuffer || tracing() ? walk(ctx, *handle, *stack) : walkInBlocks(ctx, *handle, *stack);
+  // Which lines a line-buffered stream refuses can only be told when they go out one by one.
+  const bool alone = toBuffer || tracing() || kor::isLineBuffered(print::streamOf(ctx));
+  return alone ? walk(ctx, *handle, *stack) : walkInBlocks(ctx, *handle, *stack);
 }
 
 uint32_t printAll(TAVPrintCtx& ctx, TAVHandle* handle, TAVHeaderData& start)

@@ -645,6 +645,7 @@ TAV_API uint32_t tavValidateSubtreeInt(uint64_t options, TAVHandle* handle, TAVH
 /// @retval TAV_RC_NOT_SUPPORTED   a UTF-8 string, a Sint128 or an unknown type
 /// @retval TAV_RC_OUTSIDE_PARENT  a value's size does not fit its type
 /// Codes of the walk come up unchanged; what was printed before stays printed. XML is not escaped.
+/// What a stream refuses does not count. A line-buffered stream gets every piece by itself, which is slower.
 TAV_API uint32_t tavPrintSubtree(uint64_t options, TAVHandle* handle, TAVHeaderData* start, TAVPrintParam* param,
                                  uint64_t* bytesPrinted);
 
