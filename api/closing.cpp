@@ -88,12 +88,12 @@ bool closeGroup64(TraceFrame& frame, TAVHandle& handle, TAVHeader& group)
   {
     return true;
   }
-  if (rc != TAV_RC_OK && !wasUnknown)
-  {
-    return frame.step(50, rc);
-  }
   if (rc != TAV_RC_OK)
   {
+    if (!wasUnknown)
+    {
+      return frame.fail(50, rc);
+    }
     frame.report(50, rc);
   }
   return frame.step(60, appendEndElement(handle, payload, wide));

@@ -38,7 +38,7 @@ enum class Fault : uint8_t
   lost       ///< the cursor cannot be told
 };
 
-constexpr Fault kFaults[] = {Fault::refused,  Fault::full,      Fault::cutOff,
+constexpr Fault kFaults[] = {Fault::refused, Fault::full, Fault::cutOff,
                              Fault::cutShort, Fault::elsewhere, Fault::lost};
 
 class FaultyStorage : public VectorStorage
@@ -116,8 +116,8 @@ std::string describe(const Closing& row)
 {
   std::ostringstream text;
   text << row.form << ", ring of " << row.form.ringBytes << ", group of size " << row.group.size() << ", type "
-       << row.group.type() << ", info " << layout::infoOf(row.group.header) << ", behind " << row.lead << " bytes, with "
-       << row.children << " children";
+       << row.group.type() << ", info " << layout::infoOf(row.group.header) << ", behind " << row.lead
+       << " bytes, with " << row.children << " children";
   return text.str();
 }
 
