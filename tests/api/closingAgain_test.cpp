@@ -38,8 +38,25 @@ enum class Fault : uint8_t
   lost       ///< the cursor cannot be told
 };
 
-constexpr Fault kFaults[] = {Fault::refused, Fault::full, Fault::cutOff,
-                             Fault::cutShort, Fault::elsewhere, Fault::lost};
+struct NamedFault
+{
+  const char* name;
+  Fault fault;
+};
+
+void PrintTo(const NamedFault& row, std::ostream* out)
+{
+  *out << row.name;
+}
+
+constexpr NamedFault kFaults[] = {
+    {"Refused", Fault::refused},
+    {"Full", Fault::full},
+    {"CutOff", Fault::cutOff},
+    {"CutShort", Fault::cutShort},
+    {"Elsewhere", Fault::elsewhere},
+    {"Lost", Fault::lost},
+};
 
 class FaultyStorage : public VectorStorage
 {
@@ -253,14 +270,14 @@ uint64_t closeWithEach(const Closing& row, Fault fault)
   return nth - 1;
 }
 
-class CloseOverAFaultyStorage : public ::testing::TestWithParam<Fault>
+class CloseOverAFaultyStorage : public ::testing::TestWithParam<NamedFault>
 {
 };
 
 TEST_P(CloseOverAFaultyStorage, IsWholeOrIsRefusedAndCanBeTakenAgain)
 {
   uint64_t met = 0;
-  for (const Element& group : groupsFor(GetParam()))
+  for (const Element& group : groupsFor(GetParam().fault))
   {
     for (const uint64_t pages : {1U, 2U, 4U})
     {
@@ -268,8 +285,8 @@ TEST_P(CloseOverAFaultyStorage, IsWholeOrIsRefusedAndCanBeTakenAgain)
       {
         for (const uint64_t children : {0U, 1U, 2U, 5U, 6U, 11U, 17U, 18U, 23U})
         {
-          met += closeWithEach({ringOf(pages), group, lead, children}, GetParam());
-          met += closeWithEach({ringOf(pages, true, true), group, lead, children}, GetParam());
+          met += closeWithEach({ringOf(pages), group, lead, children}, GetParam().fault);
+          met += closeWithEach({ringOf(pages, true, true), group, lead, children}, GetParam().fault);
           ASSERT_FALSE(HasFailure());
         }
       }
@@ -278,6 +295,7 @@ TEST_P(CloseOverAFaultyStorage, IsWholeOrIsRefusedAndCanBeTakenAgain)
   EXPECT_GT(met, 300U);
 }
 
-INSTANTIATE_TEST_SUITE_P(Faults, CloseOverAFaultyStorage, ::testing::ValuesIn(kFaults));
+INSTANTIATE_TEST_SUITE_P(Faults, CloseOverAFaultyStorage, ::testing::ValuesIn(kFaults),
+                         [](const auto& row) { return std::string(row.param.name); });
 
 } // namespace
