@@ -126,9 +126,9 @@ void flush(Steps& steps, TAVHandle* handle)
 /// `longest`: of an element that has to be read back, also through a ring for which memory was short.
 void writeNodes(Steps& steps, TAVHandle* handle, uint64_t longest)
 {
-  add(steps, handle, group64(TAV_ELM_CMN_SYSTEM, TAV_TYPE_HEADER64, TAV_INFO_EYE_SIZE, 0));
+  add(steps, handle, group64(TAV_ELM_CMN_SYSTEM, TAV_TYPE_HEADER64, 0, 0));
   add(steps, handle, u32(TAV_ELM_CMN_CPU_SPEED, 7, true, TAV_INFO_EYE_SIZE));
-  add(steps, handle, group64(TAV_ELM_CMN_HOST, TAV_TYPE_HEADER32, TAV_INFO_EYE_SIZE, 0));
+  add(steps, handle, group64(TAV_ELM_CMN_HOST, TAV_TYPE_HEADER32, 0, 0));
   add(steps, handle, ascii(TAV_ELM_CMN_HOST_NAME, "ada", false));
   add(steps, handle, binary(7, pattern(3, longest), false));
   close(steps, handle);
@@ -341,7 +341,7 @@ std::string resetHandle(Steps& steps, const std::string& path)
   {
     OpenedFile file(steps, path, KOR_FILE_UPDATE | KOR_FILE_CREATE | KOR_FILE_TRUNCATE);
     OpenedHandle handle(steps, file.storage(), TAV_OPT_WRITE);
-    add(steps, handle.get(), group64(TAV_ELM_CMN_SYSTEM, TAV_TYPE_HEADER64, TAV_INFO_EYE_SIZE, 0));
+    add(steps, handle.get(), group64(TAV_ELM_CMN_SYSTEM, TAV_TYPE_HEADER64, 0, 0));
     add(steps, handle.get(), binary(9, pattern(5, 100)));
     close(steps, handle.get());
     flush(steps, handle.get());
