@@ -7,6 +7,7 @@
 #include "tav/tav.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {

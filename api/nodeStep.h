@@ -22,7 +22,7 @@
 #include "tav/probes.h"
 #include "tav/tav.h"
 
-namespace tav
+namespace tav::inside
 {
 
 /// Never leaves the library: a silent step met something unusual.
@@ -322,4 +322,4 @@ inline uint32_t stepInBlock(const TAVHandle& handle, const Level& level, bool fi
 
 /// @}
 
-} // namespace tav
+} // namespace tav::inside

@@ -4,7 +4,7 @@
 
 #include "dictionary/dictionary.h"
 
-namespace tav::print
+namespace tav::inside::print
 {
 namespace
 {
@@ -101,4 +101,4 @@ uint64_t OutputBlock::addLong(size_t blanks, std::string_view text)
   return length;
 }
 
-} // namespace tav::print
+} // namespace tav::inside::print

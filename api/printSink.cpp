@@ -34,7 +34,7 @@ uint64_t formatAlone(TAVPrintCtx& ctx, const char* format, va_list arguments)
   {
     return ctx.bufferSize != 0 ? formatToBuffer(ctx, format, arguments) : 0;
   }
-  FILE* const stream = tav::print::streamOf(ctx);
+  FILE* const stream = tav::inside::print::streamOf(ctx);
   const bool sound = std::ferror(stream) == 0;
   const int length = vfprintf(stream, format, arguments);
   // Not every C library counts nothing when the stream refuses.
@@ -67,8 +67,8 @@ void depthPrefix(TAVPrintCtx& ctx)
     return;
   }
   constexpr size_t width = 3;
-  std::array<char, tav::digits::kLongest> text;
-  char* end = tav::digits::writeDecimal(text.data(), static_cast<uint64_t>(ctx.depth));
+  std::array<char, tav::inside::digits::kLongest> text;
+  char* end = tav::inside::digits::writeDecimal(text.data(), static_cast<uint64_t>(ctx.depth));
   *end++ = '|';
   const auto length = static_cast<size_t>(end - text.data());
   ctx.pBlock->add(width + 1 - std::min(length, width + 1), {text.data(), length});
@@ -79,7 +79,7 @@ void indented(TAVPrintCtx& ctx, std::string_view text)
 {
   if (ctx.pBlock != nullptr)
   {
-    ctx.pBlock->add(static_cast<size_t>(ctx.depth * tav::print::kBlanksPerLevel), text);
+    ctx.pBlock->add(static_cast<size_t>(ctx.depth * tav::inside::print::kBlanksPerLevel), text);
     return;
   }
   tavPrintf(&ctx, ctx.indentFormat.data(), "", text.data());
@@ -106,7 +106,7 @@ uint64_t tavPrintf(TAVPrintCtx* ctx, const char* format, ...)
   return count;
 }
 
-namespace tav::print
+namespace tav::inside::print
 {
 
 FILE* streamOf(const TAVPrintCtx& ctx)
@@ -166,11 +166,11 @@ void lineOf(TAVPrintCtx& ctx, std::initializer_list<std::string_view> parts)
     end = std::copy_n(part.data(), std::min(part.size(), room), end);
   }
   *end = '\0';
-  if (!tav::print::has(ctx, TAV_PRINT_XML))
+  if (!tav::inside::print::has(ctx, TAV_PRINT_XML))
   {
     depthPrefix(ctx);
   }
   indented(ctx, {text.data(), static_cast<size_t>(end - text.data())});
 }
 
-} // namespace tav::print
+} // namespace tav::inside::print

@@ -12,9 +12,10 @@
 #include "tav/probes.h"
 
 using namespace tav;
-using tav::print::has;
-using tav::print::OutputBlock;
-using tav::print::setDepth;
+using namespace tav::inside;
+using tav::inside::print::has;
+using tav::inside::print::OutputBlock;
+using tav::inside::print::setDepth;
 
 namespace
 {

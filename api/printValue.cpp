@@ -9,9 +9,10 @@
 #include "tav/probes.h"
 
 using namespace tav;
-using tav::print::kUnboundedText;
-using tav::print::shortPiece;
-using tav::print::Value;
+using namespace tav::inside;
+using tav::inside::print::kUnboundedText;
+using tav::inside::print::shortPiece;
+using tav::inside::print::Value;
 
 namespace
 {

@@ -7,7 +7,7 @@
 #include "kor/traceFrame.h"
 #include "tav/probes.h"
 
-namespace tav
+namespace tav::inside
 {
 
 uint32_t rawWrite(TAVHandle& handle, uint64_t& position, const void* bytes, uint64_t length)
@@ -86,4 +86,4 @@ uint32_t validateChild(TAVHandle& handle, const TAVHeader& child)
   return frame.code();
 }
 
-} // namespace tav
+} // namespace tav::inside

@@ -10,7 +10,7 @@
 #include "tav/byteOrder.h"
 #include "tav/tav.h"
 
-namespace tav
+namespace tav::inside
 {
 
 inline bool isDirect(const TAVHandle& handle)
@@ -85,4 +85,4 @@ TAVHeader* openGroup(TAVHandle& handle);
 /// no child with a 64-bit one, whatever its type says: no reader would find it.
 uint32_t validateChild(TAVHandle& handle, const TAVHeader& child);
 
-} // namespace tav
+} // namespace tav::inside

@@ -6,6 +6,7 @@
 #include "api/nodeStep.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {

@@ -7,6 +7,7 @@
 #include "api/walkGuard.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {

@@ -6,7 +6,7 @@
 
 #include "format/layout.h"
 
-namespace tav
+namespace tav::inside
 {
 
 /// Counts the nodes of a walk below a group. The sibling of a group that was never closed is found by an eye catcher,
@@ -34,4 +34,4 @@ private:
   uint64_t nodes_ = 0;
 };
 
-} // namespace tav
+} // namespace tav::inside

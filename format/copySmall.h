@@ -6,7 +6,7 @@
 #include <cstdint>
 #include <cstring>
 
-namespace tav
+namespace tav::inside
 {
 
 /// The leading and the last bytes of a run of `Size` to 2 * `Size` bytes, which overlap in the middle.
@@ -55,4 +55,4 @@ inline constexpr uint64_t kLongestSmall = 32;
   }
 }
 
-} // namespace tav
+} // namespace tav::inside

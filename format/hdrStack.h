@@ -8,7 +8,7 @@
 #include "tav/probes.h"
 #include "tav/tav.h"
 
-namespace tav
+namespace tav::inside
 {
 
 /// Raises the stack's capacity by one increment.
@@ -58,4 +58,4 @@ uint32_t popEntry(TAVHdrStack& stack, TAVHeader* out)
   return frame.code();
 }
 
-} // namespace tav
+} // namespace tav::inside

@@ -3,7 +3,7 @@
 
 #include "tav/layout.hpp"
 
-namespace tav
+namespace tav::inside
 {
 using namespace layout;
 
@@ -18,4 +18,4 @@ inline void setSize(TAVHeader& header, uint64_t size)
   header.hdr32.size = static_cast<uint32_t>(size);
 }
 
-} // namespace tav
+} // namespace tav::inside

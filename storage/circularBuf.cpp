@@ -10,6 +10,7 @@
 #include "tav/tav.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {

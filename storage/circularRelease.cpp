@@ -4,6 +4,7 @@
 #include "tav/probes.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 /// The piece at an end of the cached range: the bytes of one page. Head and tail may share a page without being
 /// neighbours, when the range wraps.

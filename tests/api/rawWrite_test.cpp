@@ -13,6 +13,7 @@ namespace
 {
 
 using namespace tav;
+using namespace tav::inside;
 using namespace test;
 
 using ::testing::ElementsAre;
