@@ -103,6 +103,7 @@ uint32_t tavPrintValue(TAVPrintCtx* ctx, TAVHeaderData* node)
       frame.require(70, print::isSizeOfType(type, value.size()), TAV_RC_OUTSIDE_PARENT))
   {
     printByType(*ctx, *node, value);
+    frame.dump(100, ctx->bytesWritten);
   }
   return frame.code();
 }

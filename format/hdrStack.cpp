@@ -28,6 +28,7 @@ TAVHdrStack::TAVHdrStack()
     pEntries = static_cast<TAVHeader*>(block);
     capacity = kFirstCapacity;
   }
+  frame.dump(100, capacity);
 }
 
 TAVHdrStack::~TAVHdrStack()
@@ -62,6 +63,7 @@ uint32_t tav::inside::growStack(TAVHdrStack& stack)
       std::memcpy(block, stack.pEntries, stack.capacity * sizeof(TAVHeader));
     }
     stack.capacity += kIncrement;
+    frame.dump(100, stack.capacity);
   }
   return frame.code();
 }
