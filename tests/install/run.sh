@@ -22,6 +22,14 @@ if [[ -e $prefix/include/tav && -z $(find "$prefix/include" -name '*.h') ]]; the
   exit 1
 fi
 
+if grep -q '^TAV_HARDEN:BOOL=ON' "$build/CMakeCache.txt"; then
+  echo "== hardened"
+  optimized=()
+  if grep -q '^CMAKE_BUILD_TYPE:STRING=Debug' "$build/CMakeCache.txt"; then optimized=(--not-optimized); fi
+  mapfile -t binaries < <(find "$prefix" -type f \( -name '*.so.*' -o -path '*/bin/tav' \))
+  if ((${#binaries[@]} > 0)); then "$here/hardening.py" "${optimized[@]}" "${binaries[@]}"; fi
+fi
+
 echo "== CMake package"
 cmake -S "$here/outside" -B "$work/outside" -DCMAKE_PREFIX_PATH="$prefix" -DCMAKE_CXX_COMPILER="$compiler" \
   -DCMAKE_FIND_USE_PACKAGE_REGISTRY=OFF >"$work/configure.log"
@@ -51,6 +59,7 @@ done
 if ((${#mode[@]} == 0)); then
   echo "== shared libraries find each other"
   unset LD_LIBRARY_PATH
+  if [[ -x $prefix/bin/tav ]]; then LD_LIBRARY_PATH=$(pkg-config --variable=libdir tav) "$prefix/bin/tav" --version; fi
   readelf -d "$work/main" | grep -q 'NEEDED.*libtav\.so\.1' || { echo "the program does not ask for libtav.so.1"; exit 1; }
 fi
 echo "the installed package works"
