@@ -10,8 +10,8 @@ namespace tav::inside
 {
 
 /// The leading and the last bytes of a run of `Size` to 2 * `Size` bytes, which overlap in the middle.
-/// By the compiler's own memcpy: the checked one of a hardened build has nothing to check here, where both sizes are one
-/// constant, but makes g++ 12 call for every copy: 15 instructions more for each element that is written.
+/// By the compiler's own memcpy: the checked one of a hardened build has nothing to check here, where both sizes are
+/// one constant, but makes g++ 12 call for every copy: 15 instructions more for each element that is written.
 template<size_t Size>
 void copyEnds(uint8_t* to, const uint8_t* from, uint64_t length)
 {
