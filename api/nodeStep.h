@@ -262,9 +262,6 @@ template<class Frame>
          frame.require(120, start != level.end, TAV_RC_NO_MORE_CHILDREN);
 }
 
-/// The sibling after a group that was never closed: the node behind the eye catcher that leads back to the group.
-uint32_t readAfterOpenGroup(TAVHandle& handle, const TAVHeader& parent, const TAVHeader& reference, TAVHeaderData& out);
-
 /// @}
 
 /// @name Walking the direct block
