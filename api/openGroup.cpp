@@ -6,10 +6,10 @@
 #include <bit>
 
 #include "api/nodeFromIndex.h"
+#include "api/nodeStep.h"
 #include "api/ownedHandle.h"
 #include "api/peek.h"
 #include "api/rawWrite.h"
-#include "api/nodeStep.h"
 
 namespace tav
 {
@@ -148,7 +148,8 @@ private:
     // The limit is the parent's size less an offset, not a distance: modulo 2^64, mostly no limit at all.
     const uint64_t limit = parentSize_ - position_;
     uint64_t border = 0;
-    const bool meetsBorder = isSkipping_ && pairs_->findCovered(position_, border) && border - position_ - 1 < limit - 1;
+    const bool isAhead = isSkipping_ && pairs_->findCovered(position_, border);
+    const bool meetsBorder = isAhead && border - position_ - 1 < limit - 1; // no limit is 0
     const uint64_t length = meetsBorder ? border - position_ : limit;
     uint64_t distance = 0;
     bool swapped = false;
@@ -228,7 +229,7 @@ private:
   void endInVain(uint32_t rc)
   {
     const TAVCircularBuf* const ring = handle_.pCircularBuf;
-    const uint64_t end = isDirect(handle_)  ? addSaturated(handle_.curOffset, handle_.directDataSize)
+    const uint64_t end = isDirect(handle_) ? addSaturated(handle_.curOffset, handle_.directDataSize)
                          : ring != nullptr ? ring->headOffset + cachedBytes(*ring)
                                            : 0;
     count(end > position_ ? end - position_ : 0);
@@ -244,9 +245,9 @@ private:
   uint64_t parentSize_;
   const TAVHeader reference_; // a copy: the caller's may be what is written to
   uint64_t position_;
-  uint64_t coveredEnd_ = 0;       ///< up to where all pairs were looked at and kept
-  PairMemory* pairs_ = nullptr;   ///< null where nothing is remembered
-  bool isSkipping_ = false;       ///< leaves out what others have covered
+  uint64_t coveredEnd_ = 0;     ///< up to where all pairs were looked at and kept
+  PairMemory* pairs_ = nullptr; ///< null where nothing is remembered
+  bool isSkipping_ = false;     ///< leaves out what others have covered
   bool isKeeping_ = false;
 };
 

@@ -24,17 +24,6 @@ bool hasKept(Keep keep)
   }
 }
 
-bool lookUp(const std::unordered_map<uint64_t, uint64_t>& entries, uint64_t key, uint64_t& value)
-{
-  const auto entry = entries.find(key);
-  if (entry == entries.end())
-  {
-    return false;
-  }
-  value = entry->second;
-  return true;
-}
-
 } // namespace
 
 bool PairMemory::isCovered(uint64_t place, uint64_t& end) const
@@ -129,6 +118,17 @@ void PairMemory::makeRoom()
   {
     clear();
   }
+}
+
+bool PairMemory::lookUp(const Entries& entries, uint64_t key, uint64_t& value)
+{
+  const auto entry = entries.find(key);
+  if (entry == entries.end())
+  {
+    return false;
+  }
+  value = entry->second;
+  return true;
 }
 
 bool PairMemory::isFull() const

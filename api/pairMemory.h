@@ -6,14 +6,50 @@
 /// of them has covered the others need not read.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <map>
+#include <new>
 #include <unordered_map>
+#include <utility>
 
 #include "tav/tav.h"
 
 namespace tav
 {
+
+/// Allocates as the rest of the library does, by the form of `new` that tells of a failure; containers want it thrown.
+template<class T>
+struct PairAllocator
+{
+  using value_type = T;
+
+  PairAllocator() = default;
+  template<class Other>
+  PairAllocator(const PairAllocator<Other>&) noexcept // NOLINT(google-explicit-constructor): as the standard's own
+  {
+  }
+
+  T* allocate(size_t count)
+  {
+    void* const block = ::operator new(count * sizeof(T), std::nothrow);
+    if (block == nullptr)
+    {
+      throw std::bad_alloc();
+    }
+    return static_cast<T*>(block);
+  }
+  void deallocate(T* block, size_t /*count*/) noexcept
+  {
+    ::operator delete(block, std::nothrow);
+  }
+  template<class Other>
+  bool operator==(const PairAllocator<Other>&) const noexcept
+  {
+    return true;
+  }
+};
 
 /// Which stretches of the chain were looked at, and where their pairs lead. Lives with the handle; what it cannot keep
 /// is sought again.
@@ -60,12 +96,15 @@ public:
   uint64_t farthest = 0; ///< where the farthest of them ended
 
 private:
-  using Entries = std::unordered_map<uint64_t, uint64_t>;
+  using Entry = std::pair<const uint64_t, uint64_t>;
+  using Entries = std::unordered_map<uint64_t, uint64_t, std::hash<uint64_t>, std::equal_to<>, PairAllocator<Entry>>;
+  using Stretches = std::map<uint64_t, uint64_t, std::less<>, PairAllocator<Entry>>;
 
+  static bool lookUp(const Entries& entries, uint64_t key, uint64_t& value);
   [[nodiscard]] bool isFull() const;
   bool keep(Entries& entries, uint64_t key, uint64_t value) const;
 
-  std::map<uint64_t, uint64_t> covered_; ///< start -> end; they neither overlap nor touch
+  Stretches covered_; ///< start -> end; they neither overlap nor touch
   Entries pairs_;
   Entries ends_;
   Entries successors_;

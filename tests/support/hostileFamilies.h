@@ -268,9 +268,18 @@ inline void pairsTo(HostileRows& rows, uint64_t groups, uint64_t filler, uint64_
   rows.repeatUpTo(rows.length(), 16, [&] { rows.pairTo(target); });
 }
 
-inline void pairsToTheStart(HostileRows& rows) { pairsTo(rows, 2, rows.length() / 2, 0); }
-inline void pairsToTheStartOfThree(HostileRows& rows) { pairsTo(rows, 3, 0, 0); }
-inline void pairsToTheSecond(HostileRows& rows) { pairsTo(rows, 4, 0, 16); }
+inline void pairsToTheStart(HostileRows& rows)
+{
+  pairsTo(rows, 2, rows.length() / 2, 0);
+}
+inline void pairsToTheStartOfThree(HostileRows& rows)
+{
+  pairsTo(rows, 3, 0, 0);
+}
+inline void pairsToTheSecond(HostileRows& rows)
+{
+  pairsTo(rows, 4, 0, 16);
+}
 
 inline void pairsToThemselves(HostileRows& rows)
 {

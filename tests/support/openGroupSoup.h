@@ -23,7 +23,7 @@ public:
     group(TAV_SIZE_UNKNOWN);
     for (uint64_t i = 0; i < nodes; ++i)
     {
-      wild_ && pick(4) == 0 ? wildNode() : node();
+      wild_&& pick(4) == 0 ? wildNode() : node();
     }
     closeAll();
     rows_.fill(16);

@@ -1,4 +1,5 @@
-/// Walks by the straightforward way, for comparison: every scan reads all bytes, and reads every node through the handle.
+/// Walks by the straightforward way, for comparison: every scan looks at all bytes, and reads every node through the
+/// handle.
 #pragma once
 
 #include <cstdint>
