@@ -415,7 +415,8 @@ public:
   uint64_t options; ///< not used
 };
 
-/// One stream bound to one storage. Made by tavInitHandle; used by one thread at a time.
+/// One stream bound to one storage. Made by tavInitHandle; used by one thread at a time. A copy of the record is no
+/// handle: what reading has found out lies behind it.
 struct TAVHandle
 {
   uint64_t initVersion;
@@ -549,6 +550,7 @@ TAV_API uint32_t tavReadNodeInt(uint64_t options, TAVHandle* handle, uint64_t of
 /// @param[out] eyeSize      the word behind it, in host order; 0 after a failure
 /// @param[out] swapped      whether the pair is in the other byte order
 /// @retval TAV_RC_NOT_FOUND  none there. A byte that breaks a match is not tried again as the first of another.
+/// Cost: the bytes up to the eye catcher, once.
 TAV_API uint32_t tavFindEyeSizeComboInt(TAVHandle* handle, uint64_t start, uint64_t length, bool unused,
                                         uint64_t* foundOffset, uint64_t* eyeSize, bool* swapped);
 
@@ -559,6 +561,7 @@ TAV_API uint32_t tavFindEyeSizeComboInt(TAVHandle* handle, uint64_t start, uint6
 /// @param length   bytes to scan; 0: to the end
 /// @retval TAV_RC_NOT_FOUND  no eye catcher, or no node that fits one
 /// @retval TAV_RC_BAD_PARAM, TAV_RC_BAD_OPTIONS, TAV_RC_WRONG_MODE  misuse
+/// Cost: the bytes up to the node's pair, and a header for each pair before that does not fit.
 TAV_API uint32_t tavFindNodeFromIndex(uint64_t options, TAVHandle* handle, uint64_t index, uint64_t length,
                                       TAVHeaderData* out);
 
@@ -574,7 +577,9 @@ TAV_API uint32_t tavFindNodeFromIndex(uint64_t options, TAVHandle* handle, uint6
 /// @retval TAV_RC_NOT_SUPPORTED     `refChild` is a data element of unknown size
 /// @retval TAV_RC_BAD_PARAM, TAV_RC_BAD_OPTIONS, TAV_RC_WRONG_MODE  misuse
 /// Codes of tavReadNodeInt come up unchanged. A failure leaves `parent` and `refChild` untouched.
-/// Cost: one header fetch; an open `refChild` is ended by a scan for its eye catcher.
+/// Cost: one header fetch; an open `refChild` is ended by a scan for its eye catcher. The handle remembers what scans
+/// have shown until a walk begins anew with `parent` null, so that over a whole walk each byte is scanned once: of a
+/// stream whose bytes change meanwhile, a pair that comes to stand before a known one is not seen until then.
 TAV_API uint32_t tavGetNextChild(uint64_t options, TAVHandle* handle, TAVHeader* parent, TAVHeader* refChild,
                                  TAVHeaderData* out);
 
@@ -584,6 +589,7 @@ TAV_API uint32_t tavGetNextChild(uint64_t options, TAVHandle* handle, TAVHeader*
 /// untouched.
 /// @retval TAV_RC_NOT_FOUND  no eye catcher in the handle's byte order stands there
 /// @retval TAV_RC_NO_MEMORY  the pair or the node would lie outside the stream
+/// Cost: two header fetches.
 TAV_API uint32_t tavGetPrevNode(uint64_t options, TAVHandle* handle, TAVHeaderData* ref, TAVHeaderData* out);
 /// @}
 
@@ -602,6 +608,7 @@ TAV_API uint32_t tavGetPrevNode(uint64_t options, TAVHandle* handle, TAVHeaderDa
 /// @retval TAV_RC_NOT_FOUND  no match, or the walk failed; the search never climbs out of a group it entered
 /// A failure leaves `parent`, `resume` and `out` untouched, and on `stack` what was pushed before it. `parent` or
 /// `resume` may be the header of `out`.
+/// Cost: a step of tavGetNextChild for each node of the level up to the match.
 TAV_API uint32_t tavFindElmInt(TAVHandle* handle, TAVHeader* parent, uint32_t minDepth, uint32_t maxDepth,
                                uint16_t infoKey, uint32_t elm, TAVHeader* resume, TAVHdrStack* stack,
                                TAVHeaderData* out);
@@ -614,9 +621,10 @@ TAV_API uint32_t tavFindElmInt(TAVHandle* handle, TAVHeader* parent, uint32_t mi
 /// always ends.
 /// @retval TAV_RC_NOT_FOUND      the path is empty
 /// @retval TAV_RC_NO_MEMORY      the first entry matches, the whole path does not
-/// @retval TAV_RC_OUTSIDE_PARENT damage leads to groups that were searched before
+/// @retval TAV_RC_OUTSIDE_PARENT damage leads to groups that were searched before, or gives many the same children
 /// @retval TAV_RC_NOT_SUPPORTED  the second list is set, even if the path was found
 /// A failure leaves `parent` and `out` untouched; `parent` may be the header of `out`.
+/// Cost: the levels searched; in all no more than 16 times the stream and twice for each entry of the path, or 1 MiB.
 TAV_API uint32_t tavFindLogicalGroup(uint64_t options, TAVHandle* handle, TAVHeader* parent,
                                      TAVFindLogicalGroupParam* param, TAVHeaderData* out);
 
@@ -624,6 +632,7 @@ TAV_API uint32_t tavFindLogicalGroup(uint64_t options, TAVHandle* handle, TAVHea
 /// @param options  bit 0 (containment) is refused here: see tavValidateSubtreeInt
 /// @retval TAV_RC_BAD_PARAM  null argument, or bit 0 set
 /// Codes of tavGetNextChild come up unchanged. 4,000 nested groups at the most: deeper gives TAV_RC_NO_MEMORY.
+/// Cost: each header once, and each byte of open groups once more.
 TAV_API uint32_t tavValidateHierarchy(uint64_t options, TAVHandle* handle, TAVHeader* header);
 
 /// The walk of tavValidateHierarchy. With bit 0 of `options` every child must lie inside its parent, else
@@ -646,6 +655,7 @@ TAV_API uint32_t tavValidateSubtreeInt(uint64_t options, TAVHandle* handle, TAVH
 /// @retval TAV_RC_OUTSIDE_PARENT  a value's size does not fit its type
 /// Codes of the walk come up unchanged; what was printed before stays printed. XML is not escaped.
 /// What a stream refuses does not count. A line-buffered stream gets every piece by itself, which is slower.
+/// Cost: that of validation, and of the output: three blanks a level make that grow with the square of the nesting.
 TAV_API uint32_t tavPrintSubtree(uint64_t options, TAVHandle* handle, TAVHeaderData* start, TAVPrintParam* param,
                                  uint64_t* bytesPrinted);
 
