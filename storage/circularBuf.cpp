@@ -2,6 +2,7 @@
 /// circularFill.cpp and circularRelease.cpp.
 #include <algorithm>
 #include <cstring>
+#include <utility>
 
 #include "format/layout.h"
 #include "kor/traceFrame.h"
@@ -65,6 +66,8 @@ uint64_t findPage(const TAVCircularBuf& ring, uint64_t index)
   frame.dump(100, page);
   return page;
 }
+/// What came to the class later stands where there was padding: programs that know the class without it fit.
+static_assert(sizeof(TAVCircularBuf) == 88);
 
 /// The next smaller ring to try: a quarter less, and 1 page after 2 or 3.
 uint64_t fewerPages(uint64_t pages)
@@ -76,7 +79,7 @@ uint64_t fewerPages(uint64_t pages)
 
 TAVCircularBuf::TAVCircularBuf(TAVSideStorage* storage, uint64_t size, uint32_t* rc)
     : status(TAV_RC_OK), pRing(nullptr), ringSize(0), head(0), tail(0), headOffset(0), pageSize(0), pageCount(0),
-      pPageFlags(nullptr), pStorage(storage), storageWritable(0), empty(1)
+      pPageFlags(nullptr), pStorage(storage), storageWritable(0), empty(1), writeFailure_(TAV_RC_OK)
 {
   TraceFrame frame(probe::circularBuf);
   frame.dump(0, storage, size, rc);
@@ -238,8 +241,9 @@ uint32_t TAVCircularBuf::write(uint64_t offset, const void* data, uint64_t size,
   const uint64_t contiguous = runAt(*this, offset).length;
   if (!direct && !large && size > contiguous)
   {
-    static_cast<void>(fill(offset, unitsFor(size, pageSize), false, Purpose::write));
+    const uint32_t filled = fill(offset, unitsFor(size, pageSize), false, Purpose::write);
     cached = indexOf(offset, index);
+    writeFailure_ = cached ? TAV_RC_OK : filled;
   }
   if (cached)
   {
@@ -319,6 +323,11 @@ uint32_t TAVCircularBuf::seekStorage(uint64_t offset)
     rc = pStorage->getPosition(&position);
   }
   return rc != TAV_RC_OK || position == offset ? rc : TAV_RC_NO_MEMORY;
+}
+
+uint32_t TAVCircularBuf::takeWriteFailure()
+{
+  return std::exchange(writeFailure_, TAV_RC_OK);
 }
 
 uint32_t TAVCircularBuf::reset()

@@ -285,7 +285,11 @@ public:
   TAVCircularBuf& operator=(const TAVCircularBuf&) = delete;
 
   /// Writes `size` bytes at a stream offset. `direct`: bytes that are not cached go straight to the storage.
+  /// TAV_RC_BAD_PARAM for a small one whose page could not be brought in: see takeWriteFailure.
   uint32_t write(uint64_t offset, const void* data, uint64_t size, bool direct);
+  /// Why the last small write was refused: the code with which its page could not be brought in, for want of space for
+  /// the page that has to make room, say. 0 when there is nothing to tell; asking forgets it. Leaves no trace record.
+  uint32_t takeWriteFailure();
 
   /// Hands out up to `length` bytes that start (`backward`: end) at a stream offset. A chunk can be shorter than
   /// asked. Without `copy` the pointer leads into the ring and is valid until the next call.
@@ -354,6 +358,8 @@ private:
   bool indexOf(uint64_t offset, uint64_t& index) const;
   uint32_t offsetOf(uint64_t value, uint64_t& offset) const;
   uint64_t pageOf(uint64_t index) const;
+
+  uint32_t writeFailure_; ///< for takeWriteFailure
 };
 /// @}
 
