@@ -14,6 +14,7 @@
 #include <sys/resource.h>
 #include <sys/stat.h>
 #include <sys/time.h>
+#include <unistd.h>
 #include <vector>
 
 namespace
@@ -444,4 +445,57 @@ TEST(FilePosix, ADeviceTellsItsSizeByItsEnd)
   EXPECT_EQ(file.getSize(&size), TAV_RC_OK);
   EXPECT_EQ(size, 0u);
 }
+/// Mode, owner and group of a file.
+struct Rights
+{
+  mode_t mode;
+  uid_t owner;
+  gid_t group;
+  bool operator==(const Rights&) const = default;
+};
+
+Rights rightsOf(const std::string& path)
+{
+  struct stat status = {};
+  ::stat(path.c_str(), &status);
+  return {static_cast<mode_t>(status.st_mode & 07777U), status.st_uid, status.st_gid};
+}
+
+TEST(FileRights, AreTakenFromAnotherFile)
+{
+  const TestFolder folder;
+  touch(folder / "old", 0640);
+  const bool mayGive = ::geteuid() == 0 && ::chown((folder / "old").c_str(), 12, 34) == 0;
+  ::chmod((folder / "old").c_str(), 04751);
+  KORHFile from;
+  KORHFile to;
+  ASSERT_EQ(openFile(from, folder / "old", KOR_FILE_READ), TAV_RC_OK);
+  ASSERT_EQ(openFile(to, folder / "new", KOR_FILE_UPDATE | KOR_FILE_CREATE, 0600), TAV_RC_OK);
+  EXPECT_EQ(rightsOf(folder / "new").mode, 0600U);
+  EXPECT_EQ(to.copyRights(from), TAV_RC_OK);
+  EXPECT_EQ(rightsOf(folder / "new"), rightsOf(folder / "old"));
+  EXPECT_EQ(rightsOf(folder / "new").owner, mayGive ? 12U : ::geteuid());
+}
+
+TEST(FileRights, WithoutTheOwnerDoNotLetAProgramRunAsHim)
+{
+  if (::geteuid() != 0) GTEST_SKIP() << "only root has files of others";
+  const TestFolder folder;
+  touch(folder / "old");
+  ASSERT_EQ(::chown((folder / "old").c_str(), 12, 34), 0);
+  ::chmod((folder / "old").c_str(), 06755);
+  ::chmod(folder.path().c_str(), 0777);
+  KORHFile from;
+  KORHFile to;
+  ASSERT_EQ(openFile(from, folder / "old", KOR_FILE_READ), TAV_RC_OK);
+  ASSERT_EQ(::seteuid(65534), 0);
+  const uint32_t opened = openFile(to, folder / "new", KOR_FILE_UPDATE | KOR_FILE_CREATE, 0600);
+  const uint32_t copied = to.copyRights(from);
+  ASSERT_EQ(::seteuid(0), 0);
+  EXPECT_EQ(opened, TAV_RC_OK);
+  EXPECT_EQ(copied, TAV_RC_OK);
+  EXPECT_EQ(rightsOf(folder / "new").mode, 0755U);
+  EXPECT_EQ(rightsOf(folder / "new").owner, 65534U);
+}
+
 } // namespace
