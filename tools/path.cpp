@@ -302,6 +302,7 @@ void PathMatcher::enter(size_t state, bool& match)
       return;
     }
     states_.push_back(state);
+    counts_.push_back(0);
     if (steps_[state].kind != Path::Step::Kind::anyLevels)
     {
       return;
@@ -316,6 +317,7 @@ bool PathMatcher::matches(const Node& node)
   if (level + 1 < starts_.size())
   {
     states_.resize(starts_[level + 1]);
+    counts_.resize(states_.size());
     starts_.resize(level + 1);
   }
   const size_t first = starts_.back();
@@ -333,7 +335,8 @@ bool PathMatcher::matches(const Node& node)
     }
     const bool named = step.kind == Path::Step::Kind::any ||
                        std::find(step.ids.begin(), step.ids.end(), node.elm()) != step.ids.end();
-    if (named && (step.ordinal == 0 || step.ordinal == node.ordinal) &&
+    counts_[i] += named ? 1 : 0;
+    if (named && (step.ordinal == 0 || step.ordinal == counts_[i]) &&
         (step.offset == kNoOffset || step.offset == node.offset()))
     {
       enter(state + 1, match);

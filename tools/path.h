@@ -2,7 +2,7 @@
 /// Paths through a stream: `/system/host[2]/hostName`.
 ///
 ///   step   = name | #id | * | **           name: an element's tag, enum name or constant
-///   index  = [n]                           the how-manieth of its id among its siblings, from 1
+///   index  = [n]                           the nth of those that the step finds under the same parent, from 1
 ///          | [@offset]                     the one at this offset; 0x for hexadecimal
 ///   path   = / | / { step [index] / }
 ///
@@ -91,8 +91,9 @@ private:
   void enter(size_t state, bool& match);
 
   const std::vector<Path::Step>& steps_;
-  std::vector<size_t> states_{}; ///< positions in the path, level by level
-  std::vector<size_t> starts_{}; ///< where a level's positions begin
+  std::vector<size_t> states_{};   ///< positions in the path, level by level
+  std::vector<uint64_t> counts_{}; ///< what the step at each of them has found under the present parent
+  std::vector<size_t> starts_{};   ///< where a level's positions begin
 };
 
 } // namespace tav::tool
