@@ -240,7 +240,7 @@ const Registration registration{{
     .description =
         "Prints the value of the first node that each path leads to, in the order of the stream, one a line:\n"
         "texts as they are, numbers in decimal, bytes in hexadecimal. A path is made of tags, enum names or\n"
-        "ids (#12345); [2] is the second of its name among its siblings, * any one node, ** any number of\n"
+        "ids (#12345); [2] is the second that a step finds in a group, * any one node, ** any number of\n"
         "levels; / alone leads to the roots. Every path that any command prints is understood. On a terminal\n"
         "control characters of texts are written as \\x1b, as 'tav tree' does. Exit status 1: a path leads nowhere,\n"
         "also by a name that no element has; the values of the others are printed. 2: a path is malformed.",

@@ -90,7 +90,7 @@ std::string manualPage()
       ".SH PATHS\n"
       "A path leads to nodes: \\fB/system/host[2]/hostName\\fR. A step is an element's tag, its enum name, its\n"
       "constant, or \\fB#\\fIid\\fR; \\fB*\\fR is any one node, \\fB**\\fR any number of levels. \\fB[2]\\fR is the\n"
-      "second of its element among its siblings, \\fB[@0x1a40]\\fR the one at this offset. Every path that a\n"
+      "second of those that the step finds in a group, \\fB[@0x1a40]\\fR the one at this offset. Every path that a\n"
       "command prints is understood by every command.\n"
       ".SH EXIT STATUS\n"
       ".TP\n0\nfine\n.TP\n1\nfindings, differences, or no match\n.TP\n2\nwrong usage, or the system refused something\n"

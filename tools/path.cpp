@@ -328,12 +328,13 @@ bool PathMatcher::matches(const Node& node)
   {
     const size_t state = states_[i];
     const Path::Step& step = steps_[state];
+    const bool isNode = !layout::isEndElement(node.elm()); // what only ends a group counts where it is named
     if (step.kind == Path::Step::Kind::anyLevels)
     {
-      enter(state, match);
+      isNode ? enter(state, match) : void();
       continue;
     }
-    const bool named = step.kind == Path::Step::Kind::any ||
+    const bool named = (step.kind == Path::Step::Kind::any && isNode) ||
                        std::find(step.ids.begin(), step.ids.end(), node.elm()) != step.ids.end();
     counts_[i] += named ? 1 : 0;
     if (named && (step.ordinal == 0 || step.ordinal == counts_[i]) &&

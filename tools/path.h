@@ -6,7 +6,8 @@
 ///          | [@offset]                     the one at this offset; 0x for hexadecimal
 ///   path   = / | / { step [index] / }
 ///
-/// `*` is any one node, `**` any number of levels. The leading slash may be left out. A slash alone leads to the roots.
+/// `*` is any one node, `**` any number of levels; elements that only end a group are meant where they are named. The
+/// leading slash may be left out. A slash alone leads to the roots.
 #pragma once
 
 #include <cstdint>

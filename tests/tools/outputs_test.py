@@ -25,6 +25,17 @@ class Outputs(ToolTest):
         self.assertEqual({entry.name: entry.read_bytes() for entry in self.folder.iterdir() if entry.exists()}, before)
         return result.err
 
+    @unittest.skipIf(resource is None or EMULATOR, "limits are of this system")
+    def test_what_keeps_an_output_from_growing_is_told(self):
+        document = self.folder / "x.json"
+        document.write_text(tav("json", self.path).out, encoding="utf-8")
+        limit = lambda: resource.setrlimit(resource.RLIMIT_FSIZE, (16, 16))  # noqa: E731
+        for arguments in (["snapshot"], ["build", document], ["recover", self.path]):
+            with self.subTest(arguments[0]):
+                error = self.refused(*arguments, "-o", self.folder / "y.tav", preexec_fn=limit)
+                self.assertIn("KOR_RC_FILE_TOO_LARGE", error)
+                self.assertIn("the file would grow beyond the size that is allowed", error)
+
     def test_an_existing_file_becomes_a_trace_only_by_force(self):
         trace = self.folder / "trace"
         trace.write_bytes(b"precious")
