@@ -66,6 +66,7 @@ const Registration registration{{
                  .value = "FILE",
                  .help = "where to; standard output unless given"},
                 {.names = "--eye-size", .help = "end every node with an eye/size pair"}},
+    .concerns = kForm,
     .examples = {{"tav json x.tav | tav build -o y.tav", "the same bytes again"},
                  {"tav json x.tav | tav build --byte-order big --align -o y.tav", "convert a stream"},
                  {"echo '{\"system\": {\"host\": {\"hostName\": \"ada\"}}}' | tav build -o x.tav", "a stream by hand"}},

@@ -69,6 +69,17 @@ std::string optionsText(const std::vector<OptionSpec>& options)
   return text;
 }
 
+/// Which of the common options a command takes.
+std::string commonNames(const Command& command)
+{
+  std::string text;
+  for (const OptionSpec& option : commonOptions(command))
+  {
+    text += (text.empty() ? "" : ", ") + longName(option);
+  }
+  return ".PP\nCommon options: " + roff(text) + ".\n";
+}
+
 } // namespace
 
 std::string manualPage()
@@ -84,8 +95,9 @@ std::string manualPage()
     text += ".SS tav " + roff(command->name) + " " + roff(argumentsOf(*command)) + "\n";
     text += paragraphs(command->description.empty() ? command->summary + "." : command->description);
     text += optionsText(command->options);
+    text += commonNames(*command);
   }
-  text += ".SH OPTIONS OF ALL COMMANDS\n" + optionsText(globalOptions());
+  text += ".SH COMMON OPTIONS\nEach command tells above which of them it takes.\n" + optionsText(globalOptions());
   text +=
       ".SH PATHS\n"
       "A path leads to nodes: \\fB/system/host[2]/hostName\\fR. A step is an element's tag, its enum name, its\n"

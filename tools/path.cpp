@@ -6,6 +6,7 @@
 #include <unordered_map>
 
 #include "tav/dictionary.hpp"
+#include "tools/similar.h"
 
 namespace tav::tool
 {
@@ -70,28 +71,6 @@ bool parseNumber(std::string_view text, Number& value, int base)
   return result.ec == std::errc() && result.ptr == end;
 }
 
-size_t editDistance(std::string_view a, std::string_view b)
-{
-  std::vector<size_t> row(b.size() + 1);
-  for (size_t j = 0; j <= b.size(); ++j)
-  {
-    row[j] = j;
-  }
-  for (size_t i = 1; i <= a.size(); ++i)
-  {
-    size_t diagonal = row[0];
-    row[0] = i;
-    for (size_t j = 1; j <= b.size(); ++j)
-    {
-      const auto lower = [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c + ('a' - 'A')) : c; };
-      const size_t changed = diagonal + (lower(a[i - 1]) == lower(b[j - 1]) ? 0 : 1);
-      diagonal = row[j];
-      row[j] = std::min({row[j] + 1, row[j - 1] + 1, changed});
-    }
-  }
-  return row.back();
-}
-
 } // namespace
 
 std::string elementText(uint16_t elm)
@@ -150,7 +129,7 @@ std::string similarNames(std::string_view name)
   for (const dictionary::Entry& entry : dictionary::entries())
   {
     const size_t distance = editDistance(name, entry.tag);
-    if (distance <= 1 + name.size() / 4)
+    if (distance <= mostSlips(name))
     {
       close.emplace_back(distance, entry.tag);
     }

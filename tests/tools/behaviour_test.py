@@ -171,7 +171,7 @@ class Behaviour(ToolTest):
         titles = [line[4:] for line in tav("help", "--man").out.splitlines() if line.startswith(".SH ")]
         self.assertEqual(titles[0], "NAME")
         self.assertGreater(titles.index("EXAMPLES"), titles.index("EXIT STATUS"))
-        self.assertGreater(titles.index("EXAMPLES"), titles.index("OPTIONS OF ALL COMMANDS"))
+        self.assertGreater(titles.index("EXAMPLES"), titles.index("COMMON OPTIONS"))
 
     @unittest.skipUnless(shutil.which("groff"), "groff is not installed")
     def test_the_manual_page_keeps_the_quotes_of_examples(self):
