@@ -26,7 +26,7 @@ int run(const Invocation& invocation)
 {
   const std::string input = invocation.arguments().empty() ? "-" : invocation.arguments().front();
   const std::string output = invocation.text("--output", "-");
-  if (output == "-" && kor::isTerminal(stdout))
+  if (isStandardOutput(output) && kor::isTerminal(stdout))
   {
     throw Failure("build: a stream is no text for a terminal", "-o FILE writes it to a file");
   }

@@ -138,7 +138,7 @@ void putReport(const Invocation& invocation, const std::string& output, const st
     out.commit();
     return;
   }
-  if (output == "-")
+  if (isStandardOutput(output))
   {
     std::fputs(text.c_str(), stderr);
     return;

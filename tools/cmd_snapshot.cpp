@@ -136,7 +136,7 @@ int run(const Invocation& invocation)
                   "only 64-bit headers can announce an eye/size pair");
   }
   Output out(invocation.text("--output", "-"), invocation.has("--force"));
-  if (invocation.text("--output", "-") == "-" && kor::isTerminal(stdout))
+  if (isStandardOutput(invocation.text("--output", "-")) && kor::isTerminal(stdout))
   {
     throw Failure("snapshot: a stream is no text for a terminal", "-o FILE writes it to a file");
   }

@@ -109,7 +109,7 @@ Failure::Failure(std::string sentence, std::string hint)
 
 void failAt(const std::string& file, uint32_t code, std::string hint)
 {
-  Problem problem{file};
+  Problem problem{file.empty() ? "''" : file};
   problem.sentence = codeSentence(code);
   problem.code = code;
   problem.hint = std::move(hint);

@@ -91,7 +91,7 @@ std::string spool(const std::string& name, const std::string& path)
   catch (...)
   {
     kor::removeFile(temporary);
-    kor::removeOnInterrupt({});
+    kor::keepOnInterrupt(temporary);
     throw;
   }
   return temporary;
@@ -152,8 +152,8 @@ ByteSource::ByteSource(std::string name, std::string path, uint64_t ringBytes)
     // Where an open file can be removed it is gone from now on, however the program ends.
     if (kor::removeFile(temporary_))
     {
+      kor::keepOnInterrupt(temporary_);
       temporary_.clear();
-      kor::removeOnInterrupt({});
     }
   }
   if (code == TAV_RC_OK)
@@ -172,7 +172,7 @@ ByteSource::~ByteSource()
   {
     file_.reset();
     kor::removeFile(temporary_);
-    kor::removeOnInterrupt({});
+    kor::keepOnInterrupt(temporary_);
   }
 }
 

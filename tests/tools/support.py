@@ -5,6 +5,7 @@ import pathlib
 import resource
 import subprocess
 import tempfile
+import time
 import unittest
 
 # What runs a program of another machine here; empty when it is this machine's.
@@ -38,6 +39,14 @@ def tav_in_little_memory(*arguments):
     if SANITIZED or EMULATOR:  # an emulator takes all addresses that it can get
         return tav(*arguments)
     return tav(*arguments, preexec_fn=lambda: resource.setrlimit(resource.RLIMIT_AS, (400 << 20, 400 << 20)))
+
+
+def until(condition, seconds=60):
+    """Waits until a condition holds, and returns what it gives; the time is for machines that do something else, too."""
+    deadline = time.monotonic() + seconds
+    while not (found := condition()) and time.monotonic() < deadline:
+        time.sleep(0.005)
+    return found
 
 
 def generate(path, *options):
