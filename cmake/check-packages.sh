@@ -37,6 +37,9 @@ tests/install/hardening.py "$root/usr/bin/tav" "$libraries"/lib{kor,tav}.so.1
 
 echo "== run"
 LD_LIBRARY_PATH=$libraries "$root/usr/bin/tav" --version
+for page in $(LD_LIBRARY_PATH=$libraries "$root/usr/bin/tav" help json | grep -oE '[[:alnum:]/._-]+\.md'); do
+  [[ -s $root/usr/$page ]] || { echo "the package has no $page"; exit 1; }
+done
 read -ra flags <<<"$(PKG_CONFIG_PATH=$libraries/pkgconfig pkg-config --cflags --libs tav)"
 g++ -std=c++20 tests/install/outside/main.cpp -o "$work/outside" "${flags[@]}"
 LD_LIBRARY_PATH=$libraries "$work/outside"

@@ -58,7 +58,7 @@ const Registration registration{{
         "given. Documents can be written by hand: names of elements with their values suffice, as in\n"
         "{\"system\": {\"host\": {\"hostName\": \"ada\", \"cpuOnline\": 8}}}; an array stands for several elements\n"
         "of the name; types are chosen from the values; keys with $ are properties ($type, $eyeSize).\n"
-        "docs/json.md describes every key.\n\n"
+        "share/doc/tav-tools/json.md describes every key.\n\n"
         "--byte-order, --root, --align, --no-align and --eye-size convert: then sizes, pairs and paddings are\n"
         "made anew, and what is no node is left out, with exit status 1.",
     .options = {{.names = "-o,--output",

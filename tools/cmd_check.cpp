@@ -100,7 +100,7 @@ public:
       const std::string result = !stream         ? "no stream, or nothing of it is whole"
                                  : defects_ == 0 ? "no defects"
                                                  : counted(defects_, "defect");
-      out_.write("tav: " + stream_.source->name() + ": " + result +
+      out_.write("tav: " + shown(stream_.source->name()) + ": " + result +
                  (notes_ == 0 ? "" : ", " + counted(notes_, "note")) + " in " + counted(nodes, "node") + "\n");
     }
     out_.commit();

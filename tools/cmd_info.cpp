@@ -230,7 +230,7 @@ int run(const Invocation& invocation)
   const Recognition& found = stream.recognition;
   Output out("-");
   Printer print(out);
-  print.line("file", stream.bytes().name() + ", " + byteText(stream.bytes().size()));
+  print.line("file", shown(stream.bytes().name()) + ", " + byteText(stream.bytes().size()));
   Status status = kFine;
   if (!found.isStream)
   {

@@ -57,8 +57,8 @@ const Registration registration{{
     .description =
         "Every byte of the file can be made again from the JSON: 'tav json X | tav build -o Y' gives the bytes\n"
         "of X, damaged parts included. Numbers, texts and dates are values where that is exactly\n"
-        "reversible; other bytes are hexadecimal. docs/json.md describes every key. Exit status 1: some\n"
-        "bytes are no node; 3: nothing in the file is one.\n\n"
+        "reversible; other bytes are hexadecimal. share/doc/tav-tools/json.md describes every key. Exit\n"
+        "status 1: some bytes are no node; 3: nothing in the file is one.\n\n"
         "With --lines the first line is the form, and every node, or damaged part, is an object in a line\n"
         "of its own with path, offset and depth, for jq and grep; 'tav build' reads that, too.",
     .options = {{.names = "-o,--output",

@@ -234,7 +234,8 @@ int run(const Invocation& invocation)
     file.finish();
   }
   const std::string& name = stream.source->name();
-  putReport(invocation, output, invocation.has("--json") ? asJson(name, outcome) : asText(name, outcome));
+  const std::string seen = invocation.has("--report") ? name : shown(name, isStandardOutput(output) ? stderr : stdout);
+  putReport(invocation, output, invocation.has("--json") ? asJson(name, outcome) : asText(seen, outcome));
   tellStatistics(invocation, stream.bytes());
   const RecoveryTotals& totals = outcome.taken.totals;
   return totals.lost + totals.unread + totals.closed + totals.made + totals.pairs == 0 ? kFine : kFindings;

@@ -109,7 +109,12 @@ std::string manualPage()
       ".TP\n3\nthe stream is too damaged to go on\n"
       ".SH ENVIRONMENT\n.TP\nNO_COLOR\nno colours, also on a terminal\n"
       ".TP\nTERM\nno colours when it is dumb\n"
-      ".TP\nTMPDIR\nwhere standard input is copied to, so that everything works on it\n"
+      ".TP\nTMPDIR\nwhere standard input and pipes are copied to, so that everything works on them; see "
+      "\\-\\-spool\\-limit\n"
+      ".SH FILES\n.TP\nshare/doc/tav\\-tools/tav.md\nwhen to use which command\n"
+      ".TP\nshare/doc/tav\\-tools/json.md\nthe keys of the JSON form\n"
+      ".TP\nshare/doc/tav\\-tools/check\\-rules.md\nwhat check looks for\n"
+      ".TP\nshare/doc/tav\\-tools/trace.md\nhow to read a trace\n"
       ".SH EXAMPLES\n";
   for (const Command* command : commands())
   {

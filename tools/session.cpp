@@ -1,7 +1,5 @@
 #include "tools/session.h"
 
-#include <cstdio>
-
 #include "tools/report.h"
 
 namespace tav::tool
@@ -37,7 +35,8 @@ uint64_t ringBytes(const Invocation& invocation)
 
 Stream openStream(const Invocation& invocation, const std::string& path, bool lenient)
 {
-  Stream stream{ByteSource::open(path, ringBytes(invocation)), {}};
+  const SourceLimits limits{ringBytes(invocation), invocation.number("--spool-limit").value_or(kDefaultSpool)};
+  Stream stream{ByteSource::open(path, limits), {}};
   stream.recognition = recognise(*stream.source, formChoice(invocation));
   if (!stream.recognition.isStream && !lenient)
   {
@@ -59,9 +58,9 @@ void tellStatistics(const Invocation& invocation, const ByteSource& source)
 {
   if (invocation.has("--stats"))
   {
-    std::fprintf(stderr, "tav: %s: %llu bytes read in %llu calls\n", source.name().c_str(),
-                 static_cast<unsigned long long>(source.bytesRead()),
-                 static_cast<unsigned long long>(source.readCalls()));
+    report(Problem{.file = source.name(),
+                   .sentence = std::to_string(source.bytesRead()) + " bytes read in " +
+                               std::to_string(source.readCalls()) + " calls"});
   }
 }
 

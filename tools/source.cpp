@@ -62,8 +62,29 @@ private:
   bool named_ = false;
 };
 
+/// Whether a file has other bytes than its size says. Files that the system makes while they are read, as those of
+/// /proc, have the size 0 or that of a page; larger ones are believed.
+bool tellsWrongSize(const std::string& name, const std::string& path, uint64_t size)
+{
+  constexpr uint64_t mostDoubted = uint64_t{64} * 1024;
+  if (size > mostDoubted)
+  {
+    return false;
+  }
+  std::vector<uint8_t> bytes(static_cast<size_t>(size) + 1);
+  return PipeReader(name, path).read(bytes) != size;
+}
+
+[[noreturn]] void failAtLimit(const std::string& name, uint64_t limit)
+{
+  Problem problem{name};
+  problem.sentence = "more than " + byteText(limit) + " come from it";
+  problem.hint = "--spool-limit sets how much is copied to a temporary file, 0 for no limit";
+  throw Failure(kTrouble, problem);
+}
+
 /// Copies a pipe to a temporary file and returns its path.
-std::string spool(const std::string& name, const std::string& path)
+std::string spool(const std::string& name, const std::string& path, uint64_t limit)
 {
   PipeReader reader(name, path);
   KORHFile file;
@@ -74,17 +95,23 @@ std::string spool(const std::string& name, const std::string& path)
     kor::removeOnInterrupt(temporary);
   }
   std::vector<uint8_t> buffer(ByteSource::kLongRead);
+  uint64_t total = 0;
   try
   {
     while (const size_t count = reader.read(buffer))
     {
+      total += count;
+      if (limit != 0 && total > limit)
+      {
+        failAtLimit(name, limit);
+      }
       KORFileWriteParam param;
       param.pData = buffer.data();
       param.length = count;
       uint64_t done = 0;
       if (const uint32_t code = file.write(&param, &done); code != TAV_RC_OK)
       {
-        failAt(temporary, code);
+        failAt(temporary, code, "it holds what " + name + " has given so far; set TMPDIR to a folder with more room");
       }
     }
   }
@@ -127,8 +154,8 @@ std::string openTemporary(KORHFile& file)
   }
 }
 
-ByteSource::ByteSource(std::string name, std::string path, uint64_t ringBytes)
-    : name_(std::move(name)), maxPages_(static_cast<size_t>(std::max<uint64_t>(2, ringBytes / kPage)))
+ByteSource::ByteSource(std::string name, std::string path, const SourceLimits& limits)
+    : name_(std::move(name)), maxPages_(static_cast<size_t>(std::max<uint64_t>(2, limits.ring / kPage)))
 {
   std::error_code error;
   const auto kind = std::filesystem::status(kor::pathOf(path), error).type();
@@ -138,9 +165,11 @@ ByteSource::ByteSource(std::string name, std::string path, uint64_t ringBytes)
   }
   const bool regular = path != "-" && (error || kind == std::filesystem::file_type::regular ||
                                        kind == std::filesystem::file_type::not_found);
-  if (!regular)
+  const bool known = regular && kind == std::filesystem::file_type::regular;
+  const uint64_t told = known ? std::filesystem::file_size(kor::pathOf(path), error) : 0;
+  if (!regular || (known && !error && tellsWrongSize(name_, path, told)))
   {
-    path = temporary_ = spool(name_, path);
+    path = temporary_ = spool(name_, path, limits.spool);
   }
   KORFileOpenParam param;
   param.pPath = path.c_str();
@@ -176,9 +205,9 @@ ByteSource::~ByteSource()
   }
 }
 
-std::unique_ptr<ByteSource> ByteSource::open(const std::string& path, uint64_t ringBytes)
+std::unique_ptr<ByteSource> ByteSource::open(const std::string& path, const SourceLimits& limits)
 {
-  return std::unique_ptr<ByteSource>(new ByteSource(path == "-" ? "standard input" : path, path, ringBytes));
+  return std::unique_ptr<ByteSource>(new ByteSource(path == "-" ? "standard input" : path, path, limits));
 }
 
 ByteSource::Page& ByteSource::slotFor(uint64_t number)

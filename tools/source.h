@@ -16,21 +16,29 @@ namespace tav::tool
 {
 
 inline constexpr uint64_t kDefaultRing = uint64_t{10} * 1024 * 1024;
+inline constexpr uint64_t kDefaultSpool = uint64_t{16} * 1024 * 1024 * 1024;
+
+/// How much may be taken for a file's bytes.
+struct SourceLimits
+{
+  uint64_t ring = kDefaultRing;   ///< of memory, at least two pages
+  uint64_t spool = kDefaultSpool; ///< of a temporary file for a pipe; 0 is no limit
+};
 
 /// Opens a new file in the folder for temporary files and returns its path. The name is tried until nobody else has it.
 std::string openTemporary(KORHFile& file);
 
-/// A file that is read at any offset, through pages that are kept while they are used. Standard input and pipes are
-/// copied to a temporary file first, so that everything works on them. Used by one thread.
+/// A file that is read at any offset, through pages that are kept while they are used. Standard input, pipes and files
+/// that tell a wrong size, as those of /proc do, are copied to a temporary file first, so that everything works on
+/// them. Used by one thread.
 class ByteSource
 {
 public:
   static constexpr uint64_t kPage = uint64_t{16} * 1024;
   static constexpr uint64_t kLongRead = uint64_t{64} * kPage; ///< what is read at once when reading goes straight on
 
-  /// Opens a file, "-" for standard input. At most `ringBytes` (and at least two pages) are kept in memory.
-  /// Throws Failure when that does not work.
-  static std::unique_ptr<ByteSource> open(const std::string& path, uint64_t ringBytes = kDefaultRing);
+  /// Opens a file, "-" for standard input. Throws Failure when that does not work, also because a limit is reached.
+  static std::unique_ptr<ByteSource> open(const std::string& path, const SourceLimits& limits = {});
   ~ByteSource();
   ByteSource(const ByteSource&) = delete;
   ByteSource& operator=(const ByteSource&) = delete;
@@ -68,7 +76,7 @@ private:
     std::vector<uint8_t> bytes{};
   };
 
-  ByteSource(std::string name, std::string path, uint64_t ringBytes);
+  ByteSource(std::string name, std::string path, const SourceLimits& limits);
   const Page& page(uint64_t number);
   Page& slotFor(uint64_t number);
   void fetch(uint64_t number, uint64_t count);

@@ -7,7 +7,7 @@ import stat
 import subprocess
 import unittest
 
-from support import EMULATOR, TAV, WINDOWS, ToolTest, tav, until
+from support import EMULATOR, PATIENCE, TAV, WINDOWS, ToolTest, tav, until
 
 try:
     import pty
@@ -92,7 +92,7 @@ class Rights(PlaceTest):
             self.assertEqual(self.out.exists() and self.out.read_bytes(), b"old" if exists else False)
             run.stdin.write(self.path.read_bytes())
             run.stdin.close()
-            self.assertEqual(run.wait(timeout=60), 0)
+            self.assertEqual(run.wait(timeout=PATIENCE), 0)
             self.assertEqual((self.mode(), self.beside()), (0o600 if exists else 0o644, []))
 
     @unittest.skipUnless(hasattr(os, "geteuid") and os.geteuid() == 0, "only root gives files away")
@@ -182,7 +182,7 @@ class OtherThanFiles(PlaceTest):
                     with self.out.open("wb") as file:
                         file.write(b"before ")
                         file.flush()
-                        done = subprocess.run([*TAV, "json", str(self.path), "-o", name, *force], stdout=file, timeout=60)
+                        done = subprocess.run([*TAV, "json", str(self.path), "-o", name, *force], stdout=file, timeout=PATIENCE)
                         file.write(b" behind")
                     self.assertEqual((done.returncode, self.out.read_bytes()), (0, b"before " + expected + b" behind"))
                     self.assertEqual((os.lstat(name).st_mode, self.beside()), (before, []))
@@ -224,7 +224,7 @@ class OtherThanFiles(PlaceTest):
             for force in ((), ("--force",)):
                 with subprocess.Popen(["cat", str(self.out)], stdout=subprocess.PIPE) as reader:
                     self.written(WRITERS[0], *force, to=name)
-                    self.assertEqual(reader.communicate(timeout=60)[0], tav("json", self.path).raw)
+                    self.assertEqual(reader.communicate(timeout=PATIENCE)[0], tav("json", self.path).raw)
                 self.assertTrue(stat.S_ISFIFO(self.out.lstat().st_mode) and link.is_symlink())
                 self.assertEqual(self.beside(), [])
 
@@ -288,7 +288,7 @@ class Signals(PlaceTest):
                     run = self.waiting("json", "-", "-o", self.out, "--force", cwd=self.folder)
                     self.assertTrue(until(self.beside))
                     run.send_signal(number)
-                    self.assertEqual(run.wait(timeout=60), -number)
+                    self.assertEqual(run.wait(timeout=PATIENCE), -number)
                     self.assertEqual(self.beside(), [])
                     self.assertEqual(self.out.exists() and self.out.read_bytes(), old or False)
 
