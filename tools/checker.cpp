@@ -50,8 +50,9 @@ std::string endsPast(uint64_t by, const char* what)
 
 } // namespace
 
-Checker::Checker(ByteSource& source, const Form& form, std::function<bool(RuleId)> wanted, Sink sink)
-    : source_(source), form_(form), wanted_(std::move(wanted)), sink_(std::move(sink)), walker_(source, form)
+Checker::Checker(ByteSource& source, const Form& form, std::function<bool(RuleId)> wanted, Sink sink, PathStyle style)
+    : source_(source), form_(form), wanted_(std::move(wanted)), sink_(std::move(sink)), style_(style),
+      walker_(source, form)
 {
   Group file;
   file.wide = form.root64;
@@ -62,10 +63,14 @@ void Checker::found(RuleId rule, uint64_t offset, uint64_t length, std::string s
 {
   if (wanted_(rule))
   {
-    // So deep, a path is longer than anyone reads; the offset tells the place.
-    sink_(
-        {rule, offset, length, event_.depth > kMostNested ? std::string() : walker_.path(event_), std::move(sentence)});
+    sink_({rule, offset, length, path(), std::move(sentence)});
   }
+}
+
+std::string Checker::path() const
+{
+  // So deep, a whole path is longer than anyone reads; the offset tells the place.
+  return style_ == PathStyle::whole && event_.depth > kMostNested ? std::string() : walker_.path(event_, style_);
 }
 
 bool Checker::step()
@@ -345,6 +350,7 @@ void Checker::endGroup()
   Group group = std::move(groups_.back());
   groups_.pop_back();
   const Node& node = event_.node;
+  bool open = false;
   if (node.has(kOverrun))
   {
     checkOverrun(group);
@@ -352,10 +358,7 @@ void Checker::endGroup()
   else if (node.has(kOpen) && event_.end != End::byEndElement)
   {
     const bool empty = node.size() == 0 && event_.offset == node.payloadOffset(); // sound when it was closed at once
-    if (!empty)
-    {
-      tellOpen();
-    }
+    open = !empty;
   }
   else if (node.has(kOpen) && isSizeUnknown(node.header))
   {
@@ -370,13 +373,14 @@ void Checker::endGroup()
   {
     found(RuleId::endMissing, node.offset(), node.headerLength(), "announces an eye/size pair, but has no end element");
   }
+  tellOpen(open);
   if (node.has(kWrongSize))
   {
     Group& parent = groups_.back();
     parent.lastClaim = group.claimedEnd;
     parent.lastClaimer = node.offset();
     parent.lastClaimEnd = event_.offset;
-    parent.lastClaimPath = walker_.path(event_);
+    parent.lastClaimPath = path();
   }
   else
   {
@@ -389,9 +393,22 @@ void Checker::endGroup()
   }
 }
 
-void Checker::tellOpen()
+void Checker::tellOpen(bool open)
 {
-  found(RuleId::groupOpen, event_.node.offset(), event_.node.headerLength(), "was never closed");
+  if (event_.node.depth > kMostNested)
+  {
+    deepOpen_ += open ? 1 : 0; // told together: a line for each says no more
+    return;
+  }
+  const uint64_t below = event_.node.depth == kMostNested ? std::exchange(deepOpen_, 0) : 0;
+  if (open || below != 0)
+  {
+    const std::string more = below == 0 ? "" : counted(below, "group") + " in it";
+    found(RuleId::groupOpen, event_.node.offset(), event_.node.headerLength(),
+          below == 0 ? "was never closed"
+          : open     ? "was never closed, nor " + std::string(below == 1 ? "was " : "were ") + more
+                     : more + (below == 1 ? " was" : " were") + " never closed");
+  }
 }
 
 void Checker::checkOverrun(const Group& group)

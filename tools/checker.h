@@ -30,7 +30,9 @@ public:
   using Sink = std::function<void(const Finding&)>;
 
   /// `wanted` tells which rules to look for: payloads are read only for rules about strings.
-  Checker(ByteSource& source, const Form& form, std::function<bool(RuleId)> wanted, Sink sink);
+  /// `style` is that of the findings' paths; whole ones are given down to 4,000 levels.
+  Checker(ByteSource& source, const Form& form, std::function<bool(RuleId)> wanted, Sink sink,
+          PathStyle style = PathStyle::whole);
 
   /// Goes on by one piece of the file; false at its end.
   bool step();
@@ -60,7 +62,8 @@ private:
   void endNode();
   void endGroup();
   void checkHeader();
-  void tellOpen();
+  std::string path() const;
+  void tellOpen(bool open);
   void checkOverrun(const Group& group);
   void checkEndElement();
   void checkDataEnd();
@@ -78,11 +81,13 @@ private:
   Form form_;
   std::function<bool(RuleId)> wanted_;
   Sink sink_;
+  PathStyle style_;
   Walker walker_;
   Event event_{};
   std::vector<Group> groups_{}; ///< the first stands for the file
   uint64_t nodes_ = 0;
   uint64_t paddingCut_ = 0; ///< bytes of padding that the last data element lacks at the end of the file
+  uint64_t deepOpen_ = 0;   ///< groups below the deepest level that is told of that were never closed
   bool rootEnded_ = false;
   bool deepTold_ = false;
 };

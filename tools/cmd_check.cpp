@@ -163,7 +163,8 @@ int run(const Invocation& invocation)
   Findings findings(invocation, stream, choice);
   Checker checker(
       stream.bytes(), stream.form(), [&](RuleId rule) { return choice.wants(rule); },
-      [&](const Finding& finding) { findings.put(finding); });
+      [&](const Finding& finding) { findings.put(finding); },
+      invocation.has("--json") ? PathStyle::whole : PathStyle::brief);
   {
     Progress progress("check", stream.bytes());
     while (checker.step())

@@ -23,6 +23,7 @@ namespace
 {
 
 constexpr uint64_t kMostText = uint64_t{1024} * 1024; ///< longer values are copied piece by piece
+constexpr uint64_t kMostSteps = 4000;                 ///< deeper nodes are named by their offset in JSON
 
 /// A path with what was found so far.
 struct Wanted
@@ -124,12 +125,12 @@ private:
     }
     if (paths_)
     {
-      out_.write(walker.path(event) + "\t");
+      out_.write(walker.path(event, PathStyle::brief) + "\t");
     }
     if (node.isGroup())
     {
       // A group has no value; its path and size tell that it is there.
-      out_.write((paths_ ? "" : walker.path(event) + ": ") + "group of " +
+      out_.write((paths_ ? "" : walker.path(event, PathStyle::brief) + ": ") + "group of " +
                  counted(node.limit - node.payloadOffset(), "byte"));
     }
     else if (const auto text = plainText(stream_.bytes(), stream_.form(), node, kMostText))
@@ -147,7 +148,7 @@ private:
   {
     const Node& node = event.node;
     nlohmann::ordered_json object;
-    object["path"] = walker.path(event);
+    object["path"] = event.depth <= kMostSteps ? walker.path(event) : offsetPath(node);
     object["offset"] = node.offset();
     object["size"] = node.size();
     object["type"] = typeText(node.type());
@@ -241,7 +242,7 @@ const Registration registration{{
         "Prints the value of the first node that each path leads to, in the order of the stream, one a line:\n"
         "texts as they are, numbers in decimal, bytes in hexadecimal. A path is made of tags, enum names or\n"
         "ids (#12345); [2] is the second that a step finds in a group, * any one node, ** any number of\n"
-        "levels; / alone leads to the roots. Every path that any command prints is understood. On a terminal\n"
+        "levels; / alone leads to the roots. Every path that a command prints whole is understood. On a terminal\n"
         "control characters of texts are written as \\x1b, as 'tav tree' does. Exit status 1: a path leads nowhere,\n"
         "also by a name that no element has; the values of the others are printed. 2: a path is malformed.",
     .options = {{.names = "-a,--all", .help = "every node that a path leads to, not only the first"},

@@ -55,7 +55,8 @@ public:
   /// Dumps from an offset on what is left of the piece that `event` stands for, for it is no node's first byte.
   void dumpWithin(const Walker& walker, const Event& event, uint64_t offset)
   {
-    out_.write("; no node begins at " + hexOffset(offset) + ", which lies in " + walker.path(event) + "\n");
+    out_.write("; no node begins at " + hexOffset(offset) + ", which lies in " +
+               walker.path(event, PathStyle::brief) + "\n");
     heading(walker, event);
     const uint64_t left = event.length - (offset - event.offset);
     rows(offset, std::min(left, kMostOfPiece));
@@ -112,7 +113,7 @@ void Dumper::heading(const Walker& walker, const Event& event)
   std::string text;
   switch (event.what)
   {
-  case What::nodeBegin: text = walker.path(event) + "\n;   " + headerText(event.node); break;
+  case What::nodeBegin: text = walker.path(event, PathStyle::brief) + "\n;   " + headerText(event.node); break;
   case What::payload:
     text = "  " + std::string(event.node.elm() == TAV_ELM_CMN_END_HDR_EYE_SIZE && event.length == layout::kEyeSizeLength
                                   ? "eye/size pair of the group"

@@ -87,7 +87,7 @@ int run(const Invocation& invocation)
   }
   if (invocation.has("--bare") && event.node.isGroup())
   {
-    throw Failure("print: " + walker.path(event) + " is a group, which has no value of its own for --bare",
+    throw Failure("print: " + walker.path(event, PathStyle::brief) + " is a group, which has no value of its own for --bare",
                   "--at OFFSET leads to a node with a value: 'tav tree' lists offsets; 'tav get' finds it by path");
   }
   const Handle handle = openHandle(invocation, stream);

@@ -105,7 +105,7 @@ std::string TreePrinter::label(const Walker& walker, const Event& event, uint64_
 {
   if (paths_ || !only_.empty())
   {
-    return walker.path(event);
+    return walker.path(event, PathStyle::brief);
   }
   std::string text;
   if (level > kMaxIndent)

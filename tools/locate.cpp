@@ -17,7 +17,7 @@ std::optional<std::string> findOffset(ByteSource& source, Walker& walker, Event&
     }
     if (begins)
     {
-      before = "the node before it begins at " + hexOffset(event.offset) + ": " + walker.path(event);
+      before = "the node before it begins at " + hexOffset(event.offset) + ": " + walker.path(event, PathStyle::brief);
     }
     if (offset - event.offset < event.length)
     {

@@ -107,6 +107,18 @@ void appendStep(std::string& path, const Node& node)
   }
 }
 
+std::string offsetPath(const Node& node)
+{
+  std::string path = "/**";
+  if (node.header.hdrType != 0)
+  {
+    Node unnumbered = node;
+    unnumbered.ordinal = 0;
+    appendStep(path, unnumbered);
+  }
+  return path;
+}
+
 std::vector<uint16_t> idsOf(std::string_view name)
 {
   const std::string_view digits = name.starts_with('#') ? name.substr(1) : name;

@@ -28,6 +28,9 @@ std::string elementText(uint16_t elm);
 /// gets no index, as the first match is what every command takes.
 void appendStep(std::string& path, const Node& node);
 
+/// "/**/tag[@0x1a40]": a path that leads to `node` alone and is short at any depth. Without a node: "/**".
+std::string offsetPath(const Node& node);
+
 /// The ids that a name means: a tag, an enum name, a constant, "#12" or "12". Empty when there is none.
 std::vector<uint16_t> idsOf(std::string_view name);
 

@@ -468,17 +468,20 @@ uint64_t Walker::countChild(uint16_t elm)
   return 1;
 }
 
-std::string Walker::path(const Event& event) const
+std::string Walker::path(const Event& event, PathStyle style) const
 {
+  const uint64_t groups = std::min<uint64_t>(event.depth, frames_.size() - 1);
+  const uint64_t steps = groups + (event.node.header.hdrType != 0 ? 1 : 0);
+  const bool cut = style == PathStyle::brief && steps > kWholeSteps;
   std::string text;
-  const uint64_t depth = std::min<uint64_t>(event.depth, frames_.size() - 1);
-  for (uint64_t i = 1; i <= depth; ++i)
+  for (uint64_t i = 1; i <= steps; ++i)
   {
-    appendStep(text, frames_[static_cast<size_t>(i)].node);
-  }
-  if (event.node.header.hdrType != 0)
-  {
-    appendStep(text, event.node);
+    if (cut && i == kFirstSteps + 1)
+    {
+      text += "/\xE2\x80\xA6";
+      i = steps - kLastSteps + 1;
+    }
+    appendStep(text, i <= groups ? frames_[static_cast<size_t>(i)].node : event.node);
   }
   return text.empty() ? "/" : text;
 }

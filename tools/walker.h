@@ -51,6 +51,17 @@ struct Event
   std::string reason{};      ///< of damaged
 };
 
+/// How a path is written. A text with a whole path for each node grows with the square of the depth.
+enum class PathStyle : uint8_t
+{
+  whole,
+  brief ///< of more than kWholeSteps steps the first and the last ones, with an ellipsis between them
+};
+
+inline constexpr uint64_t kWholeSteps = 24;
+inline constexpr uint64_t kFirstSteps = 4;
+inline constexpr uint64_t kLastSteps = 8;
+
 inline constexpr uint64_t kNoBudget = ~uint64_t{0};
 
 /// Where a walk begins, and how much it may look for.
@@ -80,8 +91,9 @@ public:
   bool skip();
 
   /// The path of the event's node, which must be the event returned last (or one of the same node before). Every
-  /// command takes it as input: steps are tags, or ids where a tag is not unique, and the how-manieth of its name.
-  std::string path(const Event& event) const;
+  /// command takes a whole one as input: steps are tags, or ids where a tag is not unique, and the place among the
+  /// siblings of that name.
+  std::string path(const Event& event, PathStyle style = PathStyle::whole) const;
 
   const Form& form() const { return form_; }
   /// UTF-8 strings so far with and without the two extra bytes, where the bytes around told.
