@@ -4,6 +4,7 @@
 #include <array>
 #include <utility>
 
+#include "tools/form.h"
 #include "tools/report.h"
 #include "tools/textScan.h"
 #include "tools/value.h"
@@ -104,16 +105,6 @@ bool Checker::step()
   default: break;
   }
   return true;
-}
-
-uint64_t Checker::paddedSize(const Node& node) const
-{
-  uint64_t size = node.size();
-  if (form_.aligned || (node.info() & TAV_INFO_ALIGNED8) != 0)
-  {
-    roundUp8Checked(size);
-  }
-  return size;
 }
 
 void Checker::placeIsTaken(uint64_t offset)
@@ -309,15 +300,11 @@ void Checker::endNode()
 void Checker::checkDataEnd()
 {
   const Node& node = event_.node;
-  const bool announced = node.is64() && hasEyeSize(node.header);
-  const uint64_t end = event_.offset - (announced && !node.has(kNoPair) ? kEyeSizeLength : 0);
-  const uint64_t extra = node.has(kExtra) ? 2 : 0;
-  const uint64_t padded = addSaturated(node.payloadOffset() + extra, paddedSize(node));
-  if (end < padded)
+  if (const uint64_t missing = missingPadding(event_, form_); missing != 0)
   {
-    paddingCut_ = end == source_.size() ? padded - end : 0;
-    found(RuleId::paddingMissing, node.payloadOffset() + node.size() + extra, 0,
-          counted(padded - end, "byte") + " of padding " + (padded - end == 1 ? "is" : "are") + " not there");
+    paddingCut_ = event_.offset == source_.size() ? missing : 0;
+    found(RuleId::paddingMissing, node.payloadOffset() + node.size() + (node.has(kExtra) ? 2 : 0), 0,
+          counted(missing, "byte") + " of padding " + (missing == 1 ? "is" : "are") + " not there");
   }
   if (node.has(kNoPair))
   {
@@ -470,8 +457,11 @@ void Checker::checkDamage()
   const Group& group = groups_.back();
   if (groups_.size() == 1 && rootEnded_)
   {
+    const auto other = otherStreamAt(source_, form_, event_.offset);
     found(RuleId::behindStream, event_.offset, event_.length,
-          counted(event_.length, "byte") + " behind the stream that are not zeros");
+          counted(event_.length, "byte") + " behind the stream" +
+              (other ? ": " + otherStreamText(*other) + "; " + fromText(source_, event_.offset) + " reads it"
+                     : " that are no node"));
     return;
   }
   if (checkCutHeader())
@@ -516,7 +506,12 @@ void Checker::checkDamage()
 
 void Checker::checkZeros()
 {
-  if (event_.length > kMostZeros)
+  if (event_.offset + event_.length < source_.size())
+  {
+    found(RuleId::zerosBetween, event_.offset, event_.length,
+          counted(event_.length, "byte") + " of zeros between streams");
+  }
+  else if (event_.length > kMostZeros)
   {
     found(RuleId::zerosLong, event_.offset, event_.length,
           byteText(event_.length) + " of zeros behind the stream; a writer leaves 2 MiB at most");

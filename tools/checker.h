@@ -75,7 +75,6 @@ private:
   bool checkCutHeader();
   void checkZeros();
   void placeIsTaken(uint64_t offset);
-  uint64_t paddedSize(const Node& node) const;
 
   ByteSource& source_;
   Form form_;

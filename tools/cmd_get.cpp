@@ -59,20 +59,11 @@ public:
 
   Status run(const Invocation& invocation)
   {
-    Walker walker(stream_.bytes(), stream_.form());
-    Progress progress("get", stream_.bytes());
-    Event event;
-    while (!isDone() && walker.next(event))
-    {
-      progress.at(event.offset);
-      if (event.what == What::nodeBegin)
-      {
-        visit(walker, event);
-      }
-    }
+    DamageNotices notices(stream_);
+    walk(notices);
     out_.commit();
     tellStatistics(invocation, stream_.bytes());
-    Status status = kFine;
+    Status status = notices.tell();
     for (const auto& wanted : wanted_)
     {
       if (wanted->found == 0)
@@ -85,6 +76,22 @@ public:
   }
 
 private:
+  void walk(DamageNotices& notices)
+  {
+    Walker walker(stream_.bytes(), stream_.form());
+    Progress progress("get", stream_.bytes());
+    Event event;
+    while (!isDone() && walker.next(event))
+    {
+      progress.at(event.offset);
+      notices.see(walker, event);
+      if (event.what == What::nodeBegin)
+      {
+        visit(walker, event);
+      }
+    }
+  }
+
   bool isDone() const
   {
     return !all_ && std::all_of(wanted_.begin(), wanted_.end(), [](const auto& wanted) { return wanted->found != 0; });

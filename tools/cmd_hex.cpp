@@ -26,17 +26,22 @@ constexpr uint64_t kMostOfPiece = 32 * kRow; ///< bytes that are shown where no 
 class Dumper
 {
 public:
-  explicit Dumper(Stream& stream)
-      : stream_(stream), out_("-") {}
+  Dumper(Stream& stream, DamageNotices& notices)
+      : stream_(stream), notices_(notices), out_("-") {}
 
   /// Dumps from `event` on, one node with all below it or everything.
   void dump(Walker& walker, Event& event, bool oneNode)
   {
     Progress progress("hex", stream_.bytes());
     const uint64_t base = event.depth;
+    bool seen = oneNode; // on the way to it
     do
     {
       progress.at(event.offset);
+      if (!std::exchange(seen, false))
+      {
+        notices_.see(walker, event);
+      }
       if (event.what == What::nodeEnd)
       {
         if (oneNode && event.depth <= base)
@@ -45,10 +50,20 @@ public:
         }
         continue;
       }
-      damaged_ = damaged_ || event.what == What::damaged;
       heading(walker, event);
       rows(event.offset, event.length);
     } while (walker.next(event));
+    out_.commit();
+  }
+
+  /// Dumps all bytes of what is no stream.
+  void dumpAll(const std::string& sentence)
+  {
+    if (stream_.bytes().size() != 0)
+    {
+      out_.write("; " + sentence + "\n");
+    }
+    rows(0, stream_.bytes().size());
     out_.commit();
   }
 
@@ -67,8 +82,6 @@ public:
     out_.commit();
   }
 
-  bool foundDamage() const { return damaged_; }
-
 private:
   void heading(const Walker& walker, const Event& event);
   std::string headerText(const Node& node) const;
@@ -76,8 +89,8 @@ private:
   void rows(uint64_t offset, uint64_t length);
 
   Stream& stream_;
+  DamageNotices& notices_;
   Output out_;
-  bool damaged_ = false;
 };
 
 std::string Dumper::headerText(const Node& node) const
@@ -123,7 +136,8 @@ void Dumper::heading(const Walker& walker, const Event& event)
   case What::padding: text = "  padding"; break;
   case What::pair: text = "  " + pairText(event.node, event.offset); break;
   case What::damaged: text = "damaged: " + event.reason; break;
-  case What::zeros: text = "zeros behind the stream, " + counted(event.length, "byte"); break;
+  case What::zeros: text = std::string(event.offset + event.length < stream_.bytes().size() ? "zeros between streams, "
+                                                                                               : "zeros behind the stream, ") + counted(event.length, "byte"); break;
   case What::unread: text = "not looked at"; break;
   default: break;
   }
@@ -169,20 +183,37 @@ void Dumper::rows(uint64_t offset, uint64_t length)
 
 int run(const Invocation& invocation)
 {
-  Stream stream = openStream(invocation, invocation.arguments().front(), true);
+  Stream stream = openStream(invocation, true);
   Walker walker(stream.bytes(), stream.form());
   Event event;
+  DamageNotices notices(stream);
+  Dumper dumper(stream, notices);
+  const Seen seen = [&](const Event& passed) { notices.see(walker, passed); };
   bool oneNode = true;
   if (invocation.has("--at") && invocation.has("--path"))
   {
     throw Failure("hex: --at and --path exclude each other");
   }
+  if (!stream.isStream() && (!invocation.has("--at") || stream.bytes().size() == 0))
+  {
+    if (!invocation.has("--path"))
+    {
+      dumper.dumpAll(noStream(stream).sentence);
+    }
+    throw Failure(kTooDamaged, noStream(stream));
+  }
   if (const auto at = invocation.number("--at"))
   {
-    if (findOffset(stream.bytes(), walker, event, *at))
+    if (findOffset(stream.bytes(), walker, event, *at, seen))
     {
-      Dumper(stream).dumpWithin(walker, event, *at);
+      event.reason = stream.isStream() ? event.reason : noStream(stream).sentence;
+      dumper.dumpWithin(walker, event, *at);
       tellStatistics(invocation, stream.bytes());
+      if (!stream.isStream())
+      {
+        throw Failure(kTooDamaged, noStream(stream));
+      }
+      notices.tell();
       return kFindings;
     }
   }
@@ -190,8 +221,9 @@ int run(const Invocation& invocation)
   {
     const Path path(invocation.text("--path"));
     PathMatcher matcher(path);
-    if (!goToMatch(walker, matcher, event))
+    if (!goToMatch(walker, matcher, event, seen))
     {
+      notices.tell();
       throw Failure(kFindings, path.noMatch(stream.bytes().name()));
     }
   }
@@ -203,10 +235,9 @@ int run(const Invocation& invocation)
       return kFine;
     }
   }
-  Dumper dumper(stream);
   dumper.dump(walker, event, oneNode);
   tellStatistics(invocation, stream.bytes());
-  return dumper.foundDamage() ? kFindings : kFine;
+  return notices.tell();
 }
 
 const Registration registration{{

@@ -218,7 +218,7 @@ int run(const Invocation& invocation)
   {
     throw Failure("recover: -o OUT is missing", "- is standard output");
   }
-  Stream stream = openStream(invocation, invocation.arguments().front(), true);
+  Stream stream = openStream(invocation, true);
   Outcome outcome;
   {
     Output out(output, invocation.has("--force"));

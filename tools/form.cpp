@@ -367,7 +367,7 @@ void explainPadding(const std::vector<Trial>& trials, std::vector<std::string>& 
                                            : "nodes are found on the way only when payloads are not padded");
 }
 
-std::vector<std::string> explain(const std::vector<Trial>& trials, const Recognition& result)
+std::vector<std::string> explain(const ByteSource& source, const std::vector<Trial>& trials, const Recognition& result)
 {
   const Trial& best = trials.front();
   std::vector<std::string> because;
@@ -393,7 +393,8 @@ std::vector<std::string> explain(const std::vector<Trial>& trials, const Recogni
   }
   if (best.otherAt != 0)
   {
-    because.push_back("at " + hexOffset(best.otherAt) + " " + otherStreamText(best.otherForm));
+    because.push_back("at " + hexOffset(best.otherAt) + " " + otherStreamText(best.otherForm) + "; " +
+                      fromText(source, best.otherAt) + " reads it");
   }
   explainPadding(trials, because);
   if (best.extras + best.plainStrings != 0)
@@ -433,6 +434,11 @@ std::string otherStreamText(const Form& form)
          "-bit root header";
 }
 
+std::string fromText(const ByteSource& source, uint64_t offset)
+{
+  return "--from " + hexOffset(source.from() + offset);
+}
+
 Recognition recognise(ByteSource& source, const FormChoice& choice)
 {
   Recognition result;
@@ -468,7 +474,7 @@ Recognition recognise(ByteSource& source, const FormChoice& choice)
       result.runnerUp->extra = other.extras > other.plainStrings;
     }
   }
-  result.because = explain(trials, result);
+  result.because = explain(source, trials, result);
   return result;
 }
 

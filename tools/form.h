@@ -44,6 +44,9 @@ std::optional<Form> otherStreamAt(ByteSource& source, const Form& form, uint64_t
 /// What to say of it.
 std::string otherStreamText(const Form& form);
 
+/// The option that reads a file from an offset of this source on: "--from 0x1a40".
+std::string fromText(const ByteSource& source, uint64_t offset);
+
 /// "little-endian", "big-endian"
 std::string orderText(const Form& form);
 

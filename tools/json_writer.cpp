@@ -202,7 +202,6 @@ void JsonWriter::addDamage(const Walker& walker, const Event& event)
   }
   else if (event.what == What::damaged)
   {
-    damaged_ = true;
     putBytes("damaged", event.offset, event.length);
     putString("reason", event.reason);
   }

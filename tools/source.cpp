@@ -83,6 +83,39 @@ bool tellsWrongSize(const std::string& name, const std::string& path, uint64_t s
   throw Failure(kTrouble, problem);
 }
 
+/// What stands in a storage from an offset on, for reading.
+class StorageWindow : public TAVSideStorage
+{
+public:
+  StorageWindow(TAVSideStorage& whole, uint64_t from)
+      : TAVSideStorage(0, whole.attributes & (TAV_ATTR_READ_FORWARD | TAV_ATTR_SEEK)), whole_(whole), from_(from)
+  {
+    ioUnit = whole.ioUnit;
+  }
+
+  uint32_t seek(uint64_t offset, uint64_t hint) override { return whole_.seek(from_ + offset, hint); }
+  uint32_t getPosition(uint64_t* position) override { return without(whole_.getPosition(position), position); }
+  uint32_t getTotalSize(uint64_t* size) override { return without(whole_.getTotalSize(size), size); }
+  uint32_t read(uint64_t wanted, void** data, uint64_t room, uint64_t* done, bool zeroCopy, bool backward) override
+  {
+    return backward ? TAV_RC_NOT_SUPPORTED : whole_.read(wanted, data, room, done, zeroCopy, false);
+  }
+  uint32_t write(const void*, uint64_t, uint64_t*) override { return TAV_RC_NOT_SUPPORTED; }
+  uint32_t getMemory(void**, uint64_t*) override { return TAV_RC_NOT_SUPPORTED; }
+  uint32_t lock(uint32_t mode) override { return whole_.lock(mode); }
+  uint32_t unlock() override { return whole_.unlock(); }
+
+private:
+  uint32_t without(uint32_t code, uint64_t* place) const
+  {
+    *place -= code == TAV_RC_OK ? from_ : 0;
+    return code;
+  }
+
+  TAVSideStorage& whole_;
+  uint64_t from_;
+};
+
 /// Copies a pipe to a temporary file and returns its path.
 std::string spool(const std::string& name, const std::string& path, uint64_t limit)
 {
@@ -154,8 +187,8 @@ std::string openTemporary(KORHFile& file)
   }
 }
 
-ByteSource::ByteSource(std::string name, std::string path, const SourceLimits& limits)
-    : name_(std::move(name)), maxPages_(static_cast<size_t>(std::max<uint64_t>(2, limits.ring / kPage)))
+ByteSource::ByteSource(std::string name, std::string path, const SourceLimits& limits, uint64_t from)
+    : name_(std::move(name)), from_(from), maxPages_(static_cast<size_t>(std::max<uint64_t>(2, limits.ring / kPage)))
 {
   std::error_code error;
   const auto kind = std::filesystem::status(kor::pathOf(path), error).type();
@@ -193,6 +226,23 @@ ByteSource::ByteSource(std::string name, std::string path, const SourceLimits& l
   {
     failAt(name_, code);
   }
+  if (from_ != 0)
+  {
+    startAt();
+  }
+}
+
+void ByteSource::startAt()
+{
+  if (from_ >= size_)
+  {
+    Problem problem{name_, from_};
+    problem.sentence = "--from: lies behind the end of the file";
+    throw Failure(kTrouble, problem);
+  }
+  name_ += " from " + hexOffset(from_);
+  size_ -= from_;
+  window_ = std::make_unique<StorageWindow>(*file_, from_);
 }
 
 ByteSource::~ByteSource()
@@ -205,9 +255,9 @@ ByteSource::~ByteSource()
   }
 }
 
-std::unique_ptr<ByteSource> ByteSource::open(const std::string& path, const SourceLimits& limits)
+std::unique_ptr<ByteSource> ByteSource::open(const std::string& path, const SourceLimits& limits, uint64_t from)
 {
-  return std::unique_ptr<ByteSource>(new ByteSource(path == "-" ? "standard input" : path, path, limits));
+  return std::unique_ptr<ByteSource>(new ByteSource(path == "-" ? "standard input" : path, path, limits, from));
 }
 
 ByteSource::Page& ByteSource::slotFor(uint64_t number)
@@ -236,7 +286,7 @@ void ByteSource::fetch(uint64_t number, uint64_t count)
   buffer_.resize(static_cast<size_t>(wanted));
   void* target = buffer_.data();
   uint64_t done = 0;
-  uint32_t code = file_->seek(offset, 1);
+  uint32_t code = file_->seek(from_ + offset, 1);
   if (code == TAV_RC_OK)
   {
     code = file_->read(wanted, &target, wanted, &done, false, false);

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <utility>
 
+#include "tools/form.h"
 #include "tools/path.h"
 #include "tools/report.h"
 
@@ -17,6 +18,20 @@ namespace
 constexpr size_t kMaxCounts = 256; ///< different ids among siblings that are counted; others are named by offset
 
 } // namespace
+
+uint64_t missingPadding(const Event& ended, const Form& form)
+{
+  const Node& node = ended.node;
+  const bool pair = node.is64() && hasEyeSize(node.header) && !node.has(kNoPair);
+  const uint64_t end = ended.offset - (pair ? kEyeSizeLength : 0);
+  uint64_t size = node.size();
+  if (form.aligned || (node.info() & TAV_INFO_ALIGNED8) != 0)
+  {
+    roundUp8Checked(size);
+  }
+  const uint64_t padded = addSaturated(node.payloadOffset() + (node.has(kExtra) ? 2 : 0), size);
+  return padded - std::min(end, padded);
+}
 
 Walker::Walker(ByteSource& source, const Form& form, WalkStart start)
     : source_(source), form_(form), prober_(source, form, start.budget),
@@ -95,6 +110,10 @@ void Walker::step()
   const bool fits = prober_.header(position_, top.wide, top.limit, header);
   const bool blank = !fits || (sizeOf(header) == 0 && typeOf(header) == 0 && elmOf(header) == 0);
   if (blank && top.open && top.limit == source_.size() && endByZeros())
+  {
+    return;
+  }
+  if (blank && passZeros())
   {
     return;
   }
@@ -428,6 +447,56 @@ bool Walker::endByZeros()
   return true;
 }
 
+bool Walker::passZeros()
+{
+  // Writers fill up to a page, and the next stream begins behind that. Fewer zeros can be a part of a damaged header.
+  constexpr uint64_t fewest = kHeaderSize64;
+  if (frames_.size() > 1 || position_ == 0)
+  {
+    return false;
+  }
+  uint64_t end = position_;
+  for (auto bytes = source_.view(end); !bytes.empty(); bytes = source_.view(end))
+  {
+    const auto other = std::find_if(bytes.begin(), bytes.end(), [](uint8_t byte) { return byte != 0; });
+    end += static_cast<uint64_t>(other - bytes.begin());
+    if (other != bytes.end())
+    {
+      break;
+    }
+  }
+  // A root's header can itself begin with zeros.
+  for (uint64_t back = 0; back < fewest && back <= end - position_; ++back)
+  {
+    if (rootBegins(end - back))
+    {
+      end -= back;
+      break;
+    }
+  }
+  if (end - position_ < fewest)
+  {
+    return false;
+  }
+  queue(What::zeros, position_, end - position_).node = {};
+  position_ = end;
+  return true;
+}
+
+bool Walker::rootBegins(uint64_t offset)
+{
+  for (const bool wide : {form_.root64, !form_.root64})
+  {
+    TAVHeader root{};
+    if (prober_.header(offset, wide, source_.size(), root) && isGroup(root) &&
+        prober_.judge(offset, wide, source_.size()) >= Belief::named)
+    {
+      return true;
+    }
+  }
+  return otherStreamAt(source_, form_, offset).has_value();
+}
+
 void Walker::damage(uint64_t from, uint32_t code, std::string reason)
 {
   Frame& top = frames_.back();
@@ -440,7 +509,8 @@ void Walker::damage(uint64_t from, uint32_t code, std::string reason)
   Event& event = queue(What::damaged, from, to - from);
   event.node = {};
   event.code = code;
-  event.reason = std::move(reason);
+  const auto other = frames_.size() == 1 ? otherStreamAt(source_, form_, from) : std::nullopt;
+  event.reason = other ? otherStreamText(*other) : std::move(reason);
   if (restart.gaveUp)
   {
     event.what = What::unread;

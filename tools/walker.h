@@ -25,7 +25,7 @@ enum class What : uint8_t
   pair,      ///< a data element's eye/size pair, which has no header of its own
   nodeEnd,   ///< no bytes; the node ends at `offset`
   damaged,   ///< cannot be explained; see `reason`
-  zeros,     ///< to the end of the file, behind the last node: a file may be longer than its stream
+  zeros,     ///< behind a root: to the end of the file, which may be longer than its stream, or to what stands there
   skipped,   ///< the children of a group that were not asked for
   unread     ///< to the end of the file; not looked at, because the budget was used up
 };
@@ -61,6 +61,9 @@ enum class PathStyle : uint8_t
 inline constexpr uint64_t kWholeSteps = 24;
 inline constexpr uint64_t kFirstSteps = 4;
 inline constexpr uint64_t kLastSteps = 8;
+
+/// Bytes of padding that are not there between a data element's payload and its pair or end. `ended` is its nodeEnd.
+uint64_t missingPadding(const Event& ended, const Form& form);
 
 inline constexpr uint64_t kNoBudget = ~uint64_t{0};
 
@@ -122,6 +125,8 @@ private:
   void endGroup(End end);
   void endByLimit();
   bool endByZeros();
+  bool passZeros();
+  bool rootBegins(uint64_t offset);
   void begin(TAVHeader& header);
   void beginGroup(Node& node);
   bool holdsNodes(TAVHeader group, uint64_t limit);
