@@ -231,7 +231,7 @@ class From(ToolTest):
         self.assertEqual(tav("diff", self.path, self.path, "--from", third).status, 0)
         result = tav("diff", self.path, self.path, "--from-a", second, "--from-b", third)
         self.assertEqual((result.status, result.err.count("\n")), (1, 1))  # of A, the third stream is passed over
-        self.assertIn(f"/system/host[{HOSTS}]/cpuOnline  Uint64  {HOSTS - 1} -> {HOSTS}\n", result.out)
+        self.assertIn("- /system/host  group of 1 node\n", result.out)
 
     def test_a_place_behind_the_end_is_told(self):
         for at in (self.path.stat().st_size, 1 << 40):
