@@ -302,7 +302,8 @@ const Registration registration{{
         "padding, pairs and end elements are no difference; types, values, info bits and damaged bytes are.\n"
         "Groups of one name are matched by their keys (node_number, db_name, hostName) where they have\n"
         "some; other elements of one name by what is equal in their order, and else one after the other.\n"
-        "The order of elements with different names is no difference. Exit status 1: there are some.\n\n"
+        "The order of elements with different names is no difference. Exit status 1: there are some,\n"
+        "or damage was passed over, which is told on standard error.\n\n"
         "Nodes are listed in a temporary file; in memory are only the children of the groups on the way\n"
         "to the place that is compared. Of a group with more than 200,000 children, 200,000 at a time\n"
         "are compared, so that what moved farther is told as removed and added.",

@@ -251,7 +251,8 @@ const Registration registration{{
         "ids (#12345); [2] is the second that a step finds in a group, * any one node, ** any number of\n"
         "levels; / alone leads to the roots. Every path that a command prints whole is understood. On a terminal\n"
         "control characters of texts are written as \\x1b, as 'tav tree' does. Exit status 1: a path leads nowhere,\n"
-        "also by a name that no element has; the values of the others are printed. 2: a path is malformed.",
+        "also by a name that no element has, or damage was passed over, which is told on standard error; the other\n"
+        "values are printed. 2: a path is malformed.",
     .options = {{.names = "-a,--all", .help = "every node that a path leads to, not only the first"},
                 {.names = "--raw", .help = "the payload's bytes as they stand in the file, without line ends"},
                 {.names = "--json", .help = "one JSON object a match: path, offset, size, type, value"},

@@ -136,8 +136,13 @@ void Dumper::heading(const Walker& walker, const Event& event)
   case What::padding: text = "  padding"; break;
   case What::pair: text = "  " + pairText(event.node, event.offset); break;
   case What::damaged: text = "damaged: " + event.reason; break;
-  case What::zeros: text = std::string(event.offset + event.length < stream_.bytes().size() ? "zeros between streams, "
-                                                                                               : "zeros behind the stream, ") + counted(event.length, "byte"); break;
+  case What::zeros:
+  {
+    const bool between = event.offset + event.length < stream_.bytes().size();
+    text = std::string("zeros ") + (between ? "between streams, " : "behind the stream, ") +
+           counted(event.length, "byte");
+    break;
+  }
   case What::unread: text = "not looked at"; break;
   default: break;
   }

@@ -51,7 +51,7 @@ struct Counts
   uint64_t damagedBytes = 0;
   uint64_t zeros = 0;        ///< at the end of the file
   uint64_t zerosBetween = 0; ///< between its streams
-  uint64_t end = 0; ///< where counting ended
+  uint64_t end = 0;          ///< where counting ended
   bool complete = true;
   std::map<uint16_t, Tally> types{};
   std::map<uint16_t, Tally> elements{};
@@ -312,7 +312,7 @@ void printText(const Stream& stream, const Counts* counts, bool full, Output& ou
     return;
   }
   print.line("stream", found.damagedStart ? "yes, with a damaged start" : counts->damages != 0 ? "yes, damaged"
-                                                                                             : "yes");
+                                                                                               : "yes");
   printForm(print, stream);
   printCounts(print, *counts, stream.source->size());
   print.tallies("type", counts->types, typeName, full ? ~size_t{0} : 20);
@@ -333,7 +333,8 @@ int run(const Invocation& invocation)
   Stream stream = openStream(invocation, true);
   const bool full = invocation.has("--full");
   DamageNotices notices(stream);
-  const std::optional<Counts> counts = stream.isStream() ? std::optional(countAll(stream, full, notices)) : std::nullopt;
+  const std::optional<Counts> counts =
+      stream.isStream() ? std::optional(countAll(stream, full, notices)) : std::nullopt;
   Output out("-");
   if (invocation.has("--json"))
   {
@@ -358,7 +359,8 @@ const Registration registration{{
     .description =
         "Nothing in a stream says how to read it: the ways are tried and compared, and the reasons are told.\n"
         "\"ambiguous\" means that two ways explain the bytes equally well and find different nodes. Large\n"
-        "files are counted in part unless --full is given. Exit status 1: damaged or ambiguous; 3: no stream.",
+        "files are counted in part unless --full is given. Exit status 1: damaged, each place with a line on\n"
+        "standard error, or ambiguous; 3: no stream.",
     .options = {{.names = "--full", .help = "count the whole file, and list all types and elements"},
                 {.names = "--json", .help = "one JSON object, with all types and elements that were counted"}},
     .examples = {{"tav info x.tav", "what x.tav is"},

@@ -100,7 +100,8 @@ int run(const Invocation& invocation)
   }
   if (invocation.has("--bare") && event.node.isGroup())
   {
-    throw Failure("print: " + walker.path(event, PathStyle::brief) + " is a group, which has no value of its own for --bare",
+    throw Failure("print: " + walker.path(event, PathStyle::brief) +
+                      " is a group, which has no value of its own for --bare",
                   "--at OFFSET leads to a node with a value: 'tav tree' lists offsets; 'tav get' finds it by path");
   }
   const Handle handle = openHandle(invocation, stream);
@@ -143,7 +144,8 @@ const Registration registration{{
     .description =
         "What tavPrintSubtree makes of the stream, to the letter: its XML is not escaped, its dates are off by\n"
         "a day in some places, and it stops at the first node that it cannot print, with exit status 3.\n"
-        "'tav tree', 'tav xml' and 'tav json' have none of these limits.",
+        "'tav tree', 'tav xml' and 'tav json' have none of these limits. Damage that it passes over, and streams\n"
+        "behind the first in another form, are told on standard error; the exit status is then 1.",
     .options = {{.names = "--xml", .help = "XML instead of text"},
                 {.names = "--headers", .help = "each node's header"},
                 {.names = "--descriptors", .help = "the lines of the node descriptor"},

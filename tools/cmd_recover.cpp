@@ -229,7 +229,7 @@ int run(const Invocation& invocation)
       Problem problem{stream.source->name()};
       problem.sentence = "nothing in it is whole";
       problem.hint = "'tav info' tells what was tried; --byte-order, --root and --align say how to read it";
-      throw Failure(kTooDamaged, problem);
+      throw Failure(kTooDamaged, stream.isStream() ? problem : noStream(stream));
     }
     file.finish();
   }

@@ -39,7 +39,8 @@ struct Row
 class DiffIndex
 {
 public:
-  /// Walks the stream; `notices` sees all of it. Nodes that a path of `ignored` leads to are left out, with all below them.
+  /// Walks the stream; `notices` sees all of it. Nodes that a path of `ignored` leads to are left out, with all below
+  /// them.
   DiffIndex(Stream& stream, const std::vector<Path>& ignored, DamageNotices& notices);
 
   uint64_t rows() const { return count_; }

@@ -84,7 +84,7 @@ const std::vector<OptionSpec>& globalOptions()
        .kind = ValueKind::number,
        .value = "OFFSET",
        .help = "read FILE as if it began at OFFSET; all offsets then count from there",
-       .concern = kForm},
+       .concern = kInput},
       {.names = "--ring",
        .kind = ValueKind::number,
        .value = "BYTES",

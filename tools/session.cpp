@@ -76,7 +76,8 @@ Problem noStream(const Stream& stream)
     problem.hint = stream.kind->hint;
     return problem;
   }
-  problem.sentence = stream.source->size() == 0 ? "the file is empty" : "this is no stream, or nothing of it is whole";
+  problem.sentence =
+      stream.source->size() == 0 ? "the file is empty, no stream" : "this is no stream, or nothing of it is whole";
   problem.hint = stream.source->size() == 0
                      ? ""
                      : "'tav info' tells what was tried; --byte-order, --root and --align say how to read it";

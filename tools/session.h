@@ -37,8 +37,8 @@ FormChoice formChoice(const Invocation& invocation);
 /// Bytes of memory for pages: --ring.
 uint64_t ringBytes(const Invocation& invocation);
 
-/// Opens a file, from an offset on, and recognises its form; options override. Throws Failure with kTooDamaged when it is
-/// no stream. With `lenient`, such a file is handed out all the same, with the most likely form.
+/// Opens a file, from an offset on, and recognises its form; options override. Throws Failure with kTooDamaged when it
+/// is no stream. With `lenient`, such a file is handed out all the same, with the most likely form.
 Stream openStream(const Invocation& invocation, const std::string& path, uint64_t from, bool lenient = false);
 
 /// The one FILE argument of most commands, from --from on.

@@ -270,6 +270,10 @@ class NoStream(ToolTest):
                 elif name != "hex --at":
                     self.assertIn(sentence, told)
                 self.assertNotIn("would end", result.out + result.err)
+        saved = self.folder / "saved.tav"
+        result = tav("recover", path, "-o", saved)
+        self.assertEqual((result.status, result.out, saved.exists()), (3, "", False))
+        self.assertIn(sentence, result.err)
         return path
 
     def test_an_empty_file_is_no_stream(self):
