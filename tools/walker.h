@@ -90,7 +90,8 @@ public:
   bool next(Event& event);
 
   /// Directly after the nodeBegin of a group: hands out its children as one `skipped` piece. False, and no effect, for
-  /// a group whose end is not known without walking it.
+  /// a group whose end is not known without walking it: it was never closed, or what stands at its end, or behind it,
+  /// is not what should.
   bool skip();
 
   /// The path of the event's node, which must be the event returned last (or one of the same node before). Every
@@ -121,6 +122,7 @@ private:
     bool open = false;       ///< an end element ends it
   };
 
+  bool endIsSure();
   void step();
   void endGroup(End end);
   void endByLimit();

@@ -149,6 +149,23 @@ class Damage(ToolTest):
         self.assertEqual((tav("get", path, "/system/host/cpuOnline").err, tav("get", path, "/system/host[9]/cpuOnline").status),
                          ("", 1))
 
+    def test_a_group_whose_end_is_not_there_is_walked_and_not_stepped_over(self):
+        def end(length):
+            return header(16, 101, 65001) + struct.pack("<QQ", 0xC0DED5EEDDEC0DED, length + 32)
+        for more in (1, HOST - 1, HOST + 7, 3 * HOST + 1):
+            head = struct.pack("<QIHH", 24 + 32 + more, 0x400000, 2, 60104)
+            content = head + number(7) + end(24) + STREAM[16:]
+            path = self.file(header(len(content), 2, 60100) + content)
+            with self.subTest(more=more, pair=True):
+                values = tav("get", path, "--all", "/system/host/cpuOnline").out.split()
+                self.assertEqual(values, [str(i) for i in range(HOSTS)])
+        head = header(24 + HOST + 5, 2, 60104)  # ends inside a node
+        content = head + number(7) + STREAM[16:]
+        path = self.file(header(len(content), 2, 60100) + content)
+        result = tav("get", path, "--all", "/system/host/cpuOnline")
+        self.assertEqual(result.status, 1)
+        self.assertIn("passed over", result.err)
+
     def test_places_on_the_way_to_a_node_are_told(self):
         path = self.file(overwritten(STREAM, host(3), HOST))
         for arguments in (("tree", "--at"), ("hex", "--at"), ("print", "--at")):
