@@ -104,7 +104,8 @@ TEST(LayerOnAFullDisk, NamesTheCauseInTheMessage)
   {
     said = error.what();
   }
-  EXPECT_EQ(said, "adding hostName (60103): KOR_RC_FILE_TOO_LARGE: the file would grow beyond the size that is allowed");
+  EXPECT_EQ(said,
+            "adding hostName (60103): KOR_RC_FILE_TOO_LARGE: the file would grow beyond the size that is allowed");
 }
 
 TEST(LayerOnAFullDisk, LeavesTheFileThatItWasToReplace)

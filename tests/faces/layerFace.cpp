@@ -75,7 +75,9 @@ int writeValues(const std::filesystem::path& path)
   {
     tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM);
     const auto add = [&root](const auto& value) { root.add(TAV_ELM_CMN_HOST_NAME, value); };
-    for (const char* const text : {"ada", "", "<&>\"'", "gr\xC3\xBC\xC3\x9F" "e", "]]>", "\x1B[31m", "\r\n\t", "\xEF\xBF\xBE"})
+    for (const char* const text : {"ada", "", "<&>\"'", "gr\xC3\xBC\xC3\x9F"
+                                                        "e",
+                                   "]]>", "\x1B[31m", "\r\n\t", "\xEF\xBF\xBE"})
     {
       add(text);
     }
@@ -86,7 +88,8 @@ int writeValues(const std::filesystem::path& path)
       add(static_cast<int8_t>(number));
       add(static_cast<std::byte>(number));
     }
-    add(uint8_t{255}), add(uint16_t{65535}), add(int16_t{-1}), add(uint32_t{7}), add(-7), add(~uint64_t{0}), add(INT64_MIN);
+    add(uint8_t{255}), add(uint16_t{65535}), add(int16_t{-1}), add(uint32_t{7}), add(-7), add(~uint64_t{0}),
+        add(INT64_MIN);
     add(tav::Uint128{1, 2}), add(tav::Sint128{-1, 2}), add(bytes), add(words);
     add(std::chrono::sys_seconds(1709164800s) + 123456us), add(TAVTimeStamp{1, 65535, 65535, 9, -720});
     root.addRaw(999, 40001, bytes);
