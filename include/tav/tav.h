@@ -180,7 +180,8 @@ static_assert(sizeof(TAVHeaderData) == 56 && sizeof(TAVTimeStamp) == 16 && sizeo
 /// @{
 
 /// A byte store with a cursor, under a handle. Derive from it to keep streams elsewhere: a handle and a circular
-/// buffer use nothing but this interface. Used by one thread at a time.
+/// buffer use nothing but this interface. Used by one thread at a time. What it does for a handle must not call that
+/// handle's operations: they are not made to be entered twice.
 class TAV_API TAVSideStorage
 {
 public:
@@ -249,7 +250,8 @@ public:
 
 /// A file. A handle over it works through a circular buffer of pages of 1 MiB. Open with KOR_FILE_READ to read and
 /// with KOR_FILE_UPDATE to write: a handle reads pages back while it writes, and a writable storage gets every page
-/// that was held written back, also when the handle only reads.
+/// that was held written back, also when the handle only reads. Of an existing file that is longer than the stream, the
+/// old bytes stay behind it unless it is opened with KOR_FILE_TRUNCATE.
 class TAV_API TAVSSFile : public TAVSideStorage
 {
 public:
@@ -259,7 +261,7 @@ public:
 
   uint32_t seek(uint64_t offset, uint64_t hint) override;
   uint32_t getPosition(uint64_t* pPosition) override;
-  uint32_t getTotalSize(uint64_t* pSize) override;
+  uint32_t getTotalSize(uint64_t* pSize) override; ///< a pipe has none, and files that the system makes up have 0
   uint32_t read(uint64_t wanted, void** ppData, uint64_t bufSize, uint64_t* pRead, bool zeroCopy,
                 bool backward) override; ///< a backward read fills the end of the buffer
   uint32_t write(const void* pData, uint64_t size, uint64_t* pWritten) override;
@@ -274,7 +276,7 @@ public:
 
 /// A ring of pages that caches a contiguous range of a storage's bytes, so that a stream larger than memory can be
 /// written and read. Belongs to one handle. A data element larger than `ringSize` can be written, but neither read
-/// back nor updated through it.
+/// back nor updated through it, and validation and printing end there.
 class TAV_API TAVCircularBuf
 {
 public:
@@ -402,7 +404,8 @@ public:
 
   uint32_t version;             ///< TAV_STRUCT_VERSION
   TAVSideStorage* pSideStorage; ///< not owned; must outlive the handle
-  uint64_t options;             ///< exactly one of TAV_OPT_READ, _WRITE, _UPDATE; TAV_OPT_ROOT32 beside it
+  uint64_t options;             ///< exactly one of TAV_OPT_READ, _WRITE, _UPDATE; TAV_OPT_ROOT32 beside it. Never
+                                ///< TAV_OPT_DIRECT: over a ring it is believed, and every call finds no block
   uint64_t circularBufSize;     ///< bytes of the ring over a storage without direct memory; 10 MiB
   uint64_t auxSize;             ///< carried, not used
   uint8_t byteOrder;            ///< TAV_BYTE_ORDER_SWAPPED: the stream is in the other byte order
@@ -421,8 +424,9 @@ public:
   uint64_t options; ///< not used
 };
 
-/// One stream bound to one storage. Made by tavInitHandle; used by one thread at a time. A copy of the record is no
-/// handle: what reading has found out lies behind it.
+/// One stream bound to one storage. Made by tavInitHandle; used by one thread at a time, and after a fork by one of the
+/// two processes: over a file they share its position, but not the ring. A copy of the record is no handle: what reading
+/// has found out lies behind it.
 struct TAVHandle
 {
   uint64_t initVersion;
@@ -478,8 +482,10 @@ TAV_API uint32_t tavGetSideStorage(TAVHandle* handle, TAVSideStorage** outStorag
 /// @param options     must be 0
 /// @param handle      opened for writing or updating
 /// @param headerData  header and payload; `nodeOffset` receives the node's offset, and under alignment `info`
-///                    of a 64-bit header receives TAV_INFO_ALIGNED8. A group needs no payload. The payload may be
-///                    anywhere, in the descriptor or the handle, too; the descriptor must not lie in the block.
+///                    of a 64-bit header receives TAV_INFO_ALIGNED8, which stays: clear it before the descriptor
+///                    goes to a handle without alignment, or readers skip padding that is not there. A group needs
+///                    no payload. The payload may be anywhere, in the descriptor or the handle, too; the descriptor
+///                    must not lie in the block.
 /// @retval TAV_RC_BAD_PARAM       null argument, null payload of a data element, unknown hdrType
 /// @retval TAV_RC_WRONG_MODE      the handle is for reading
 /// @retval TAV_RC_BAD_OPTIONS     options not 0
@@ -579,6 +585,8 @@ TAV_API uint32_t tavFindNodeFromIndex(uint64_t options, TAVHandle* handle, uint6
 /// @param refChild  child returned last; null: the first child
 /// @param[out] out  the child; `refChild` or `parent` may be its own header, so that a walk needs one descriptor
 /// @retval TAV_RC_NO_MORE_CHILDREN  the level has ended (not a failure)
+/// @retval TAV_RC_NO_MEMORY         the end of a block, in a group that was never closed; over a storage its own code,
+///                                  TAV_RC_END_OF_STORAGE
 /// @retval TAV_RC_OUTSIDE_PARENT    the next child would start past its parent's end: damaged stream
 /// @retval TAV_RC_NOT_SUPPORTED     `refChild` is a data element of unknown size
 /// @retval TAV_RC_BAD_PARAM, TAV_RC_BAD_OPTIONS, TAV_RC_WRONG_MODE  misuse
@@ -643,7 +651,8 @@ TAV_API uint32_t tavValidateHierarchy(uint64_t options, TAVHandle* handle, TAVHe
 
 /// The walk of tavValidateHierarchy. With bit 0 of `options` every child must lie inside its parent, else
 /// TAV_RC_OUTSIDE_PARENT; that check takes the parent's end without the length of its header, so it refuses some
-/// sound streams: an empty last child, the last child of a 64-bit group of type 1.
+/// sound streams: an empty last child, the last child of a 64-bit group of type 1, and every group that was never
+/// closed unless it stands at offset 0.
 TAV_API uint32_t tavValidateSubtreeInt(uint64_t options, TAVHandle* handle, TAVHeader* header);
 /// @}
 
