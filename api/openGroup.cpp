@@ -11,7 +11,7 @@
 #include "api/peek.h"
 #include "api/rawWrite.h"
 
-namespace tav
+namespace tav::inside
 {
 namespace
 {
@@ -260,4 +260,4 @@ uint32_t readAfterOpenGroup(TAVHandle& handle, const TAVHeader& parent, const TA
   return rc == TAV_RC_OK ? readBehindPair(handle, eyeOffset, out) : rc;
 }
 
-} // namespace tav
+} // namespace tav::inside

@@ -8,7 +8,7 @@
 #include "api/pairMemory.h"
 #include "tav/tav.h"
 
-namespace tav
+namespace tav::inside
 {
 
 /// Every handle is the first member of one of these, made by tavInitHandle. An operation that its user takes step by
@@ -83,4 +83,4 @@ private:
   TAVHandle& handle_;
 };
 
-} // namespace tav
+} // namespace tav::inside

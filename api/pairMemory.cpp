@@ -4,7 +4,7 @@
 #include <iterator>
 #include <new>
 
-namespace tav
+namespace tav::inside
 {
 namespace
 {
@@ -148,4 +148,4 @@ bool PairMemory::keep(Entries& entries, uint64_t key, uint64_t value) const
   return !isFull() && hasKept([&] { entries.emplace(key, value); });
 }
 
-} // namespace tav
+} // namespace tav::inside

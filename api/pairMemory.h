@@ -16,7 +16,7 @@
 
 #include "tav/tav.h"
 
-namespace tav
+namespace tav::inside
 {
 
 /// Allocates as the rest of the library does, by the form of `new` that tells of a failure; containers want it thrown.
@@ -110,4 +110,4 @@ private:
   Entries successors_;
 };
 
-} // namespace tav
+} // namespace tav::inside

@@ -6,7 +6,7 @@
 
 #include "api/nodeStep.h"
 
-namespace tav
+namespace tav::inside
 {
 namespace
 {
@@ -152,4 +152,4 @@ uint32_t readIfWhole(TAVHandle& handle, uint64_t offset, TAVHeaderData& node)
   return mustRead ? tavReadNodeInt(0, &handle, offset, true, &node) : report(handle, offset, node, rc);
 }
 
-} // namespace tav
+} // namespace tav::inside

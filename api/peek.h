@@ -5,7 +5,7 @@
 
 #include "tav/tav.h"
 
-namespace tav
+namespace tav::inside
 {
 
 /// Copies bytes of the stream from where the ring caches them, else from the storage, past the ring. `kUnusual` where
@@ -20,4 +20,4 @@ uint32_t peekNode(TAVHandle& handle, uint64_t offset, TAVHeaderData& node);
 /// without moving it.
 uint32_t readIfWhole(TAVHandle& handle, uint64_t offset, TAVHeaderData& node);
 
-} // namespace tav
+} // namespace tav::inside

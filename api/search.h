@@ -5,7 +5,7 @@
 
 #include "tav/tav.h"
 
-namespace tav
+namespace tav::inside
 {
 
 /// What tavFindElmInt looks for.
@@ -21,4 +21,4 @@ struct Wanted
 uint32_t findElement(TAVHandle* handle, TAVHeader* parent, const Wanted& wanted, TAVHeader* resume, TAVHdrStack* stack,
                      TAVHeaderData* out, uint64_t& reached);
 
-} // namespace tav
+} // namespace tav::inside
