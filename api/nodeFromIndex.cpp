@@ -64,12 +64,19 @@ bool isPairOfGroup(const TraceFrame& frame, TAVHandle& handle, const TAVHeader& 
   }
 }
 
-/// The node that ends at an eye catcher. A data element is taken as it is, whether or not its size fits the pair.
-uint32_t readNodeOfPair(const TraceFrame& frame, TAVHandle& handle, uint64_t eyeOffset, uint64_t distance,
+/// The node that ends at an eye catcher. A data element is taken as it is, whether or not its size fits the pair. The
+/// first is read at once, since mostly it is taken; those behind one that was not are looked at first.
+uint32_t readNodeOfPair(const TraceFrame& frame, TAVHandle& handle, uint64_t eyeOffset, uint64_t distance, bool first,
                         TAVHeaderData& out, bool& accepted)
 {
   uint64_t offset = 0;
-  if (!nodeBefore(eyeOffset, distance, offset) || readIfWhole(handle, offset, out) != TAV_RC_OK)
+  if (!nodeBefore(eyeOffset, distance, offset))
+  {
+    return TAV_RC_NOT_FOUND;
+  }
+  const uint32_t rc =
+      first ? tavReadNodeInt(0, &handle, offset, true, &out) : readIfWhole(handle, offset, out);
+  if (rc != TAV_RC_OK)
   {
     return TAV_RC_NOT_FOUND;
   }
@@ -146,7 +153,7 @@ struct Search
 uint32_t scanForNode(const TraceFrame& frame, TAVHandle& handle, Search search, TAVHeaderData& out)
 {
   Misses misses(search.pairs);
-  while (search.position < search.end)
+  for (bool first = true; search.position < search.end; first = false)
   {
     uint64_t eyeOffset = 0;
     uint64_t distance = 0;
@@ -172,7 +179,7 @@ uint32_t scanForNode(const TraceFrame& frame, TAVHandle& handle, Search search, 
     }
     else
     {
-      rc = readNodeOfPair(frame, handle, eyeOffset, distance, out, accepted);
+      rc = readNodeOfPair(frame, handle, eyeOffset, distance, first, out, accepted);
     }
     if (rc != TAV_RC_OK || accepted)
     {

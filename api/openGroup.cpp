@@ -117,7 +117,7 @@ private:
     while (true)
     {
       uint32_t rc = TAV_RC_OK;
-      if (isSkipping_ && (findKnown(eyeOffset) || pairs_->findEnd(position_, rc)))
+      if (isSkipping_ && (findKnown(eyeOffset) || (!isLimited() && pairs_->findEnd(position_, rc))))
       {
         return rc;
       }

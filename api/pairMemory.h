@@ -56,8 +56,8 @@ struct PairAllocator
 class PairMemory
 {
 public:
-  /// How many entries it has at the most: some 64 MiB.
-  static constexpr uint64_t kMostEntries = 0x100000;
+  /// How many entries it has at the most: some 16 MiB.
+  static constexpr uint64_t kMostEntries = 0x40000;
 
   /// Whether the pair at a place, or the next one, was looked at; `end`: where the chain goes on behind what was.
   [[nodiscard]] bool isCovered(uint64_t place, uint64_t& end) const;

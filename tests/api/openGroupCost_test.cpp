@@ -129,8 +129,14 @@ INSTANTIATE_TEST_SUITE_P(Access, Remembered, testing::Bool(),
 class ChangingMemory : public Remembered
 {
 protected:
-  void put(uint64_t at, const Bytes& more) { std::copy(more.begin(), more.end(), block_.begin() + static_cast<ptrdiff_t>(at)); }
-  uint32_t next(TAVHeader* parent, TAVHeader* reference) { return tavGetNextChild(0, handle_.get(), parent, reference, &out); }
+  void put(uint64_t at, const Bytes& more)
+  {
+    std::copy(more.begin(), more.end(), block_.begin() + static_cast<ptrdiff_t>(at));
+  }
+  uint32_t next(TAVHeader* parent, TAVHeader* reference)
+  {
+    return tavGetNextChild(0, handle_.get(), parent, reference, &out);
+  }
 
   TAVHeaderData out{};
 
@@ -149,7 +155,8 @@ TEST_P(ChangingMemory, APairThatIsThereNoLongerIsNotTaken)
 
 TEST_P(ChangingMemory, APairThatComesLaterIsFound)
 {
-  const Bytes pair(bytes.begin() + static_cast<ptrdiff_t>(endOfOuter), bytes.begin() + static_cast<ptrdiff_t>(endOfOuter) + 16);
+  const auto first = bytes.begin() + static_cast<ptrdiff_t>(endOfOuter);
+  const Bytes pair(first, first + 16);
   put(endOfOuter, Bytes(16));
   ASSERT_EQ(next(&root, &outer), TAV_RC_NOT_FOUND);
   put(endOfOuter, pair);
