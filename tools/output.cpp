@@ -183,7 +183,7 @@ bool wantsColour(const Invocation& invocation)
   return kor::isTerminal(stdout) && variable("NO_COLOR").empty() && variable("TERM") != "dumb";
 }
 
-Output::Output(std::string path, bool force)
+Output::Output(const std::string& path, bool force)
     : path_(plainName(path)), force_(force)
 {
   if (path_ == "-")

@@ -24,7 +24,7 @@ public:
   /// "-" is standard output. An existing file is replaced only with `force`; where a symbolic link is named, it is the
   /// file behind it. Devices, pipes and the open files that names like /dev/fd/3 stand for are written to, never
   /// replaced.
-  explicit Output(std::string path, bool force = false);
+  explicit Output(const std::string& path, bool force = false);
   ~Output();
   Output(const Output&) = delete;
   Output& operator=(const Output&) = delete;
