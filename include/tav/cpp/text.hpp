@@ -14,19 +14,26 @@ namespace tav::detail
 [[gnu::always_inline]] inline bool isAscii(std::string_view text) noexcept
 {
   constexpr uint64_t high = 0x8080808080808080U;
-  const char* at = text.data();
-  size_t left = text.size();
+  constexpr size_t width = sizeof(uint64_t);
+  const char* const first = text.data();
+  const size_t size = text.size();
   uint64_t seen = 0;
-  for (; left >= sizeof(uint64_t); at += sizeof(uint64_t), left -= sizeof(uint64_t))
+  uint64_t word = 0;
+  if (size < width)
   {
-    uint64_t word = 0;
-    std::memcpy(&word, at, sizeof word);
+    for (size_t at = 0; at != size; ++at)
+    {
+      seen |= static_cast<uint8_t>(first[at]);
+    }
+    return (seen & high) == 0;
+  }
+  for (size_t at = 0; at + width <= size; at += width)
+  {
+    std::memcpy(&word, first + at, width);
     seen |= word;
   }
-  for (; left != 0; ++at, --left)
-  {
-    seen |= static_cast<uint8_t>(*at);
-  }
+  std::memcpy(&word, first + size - width, width); // the rest, with some that were seen already
+  seen |= word;
   return (seen & high) == 0;
 }
 
