@@ -131,6 +131,13 @@ uint32_t withHalves(const T& value, Write& write) noexcept
   }
 }
 
+/// Out of line: the usual text shall not pay for it.
+template<class Write>
+[[gnu::noinline]] uint32_t withTextBeyondAscii(std::string_view text, Write& write) noexcept
+{
+  return isUtf8(text) ? withUtf8Payload(text, kCodePageUtf8, write) : TAV_RC_BAD_PARAM;
+}
+
 /// Calls `write(type, bytes, size)` with a text: an ASCII String where it is ASCII, else a UTF8 String where it is
 /// that. Other bytes are TAV_RC_BAD_PARAM.
 template<class Write>
@@ -140,7 +147,7 @@ uint32_t withText(std::string_view text, Write& write) noexcept
   {
     return write(TAV_TYPE_ASCII_STRING, bytesOf(text.data()), uint64_t{text.size()});
   }
-  return isUtf8(text) ? withUtf8Payload(text, kCodePageUtf8, write) : TAV_RC_BAD_PARAM;
+  return withTextBeyondAscii(text, write);
 }
 
 /// Calls `write(type, bytes, size)` with a text, a UTF-8 text, bytes or words. A null pointer is TAV_RC_BAD_PARAM.
