@@ -217,7 +217,7 @@ uint32_t findNode(uint64_t options, TAVHandle* handle, uint64_t index, uint64_t 
 
 } // namespace
 
-uint32_t tav::readBehindPair(TAVHandle& handle, uint64_t eyeOffset, TAVHeaderData& out)
+uint32_t tav::inside::readBehindPair(TAVHandle& handle, uint64_t eyeOffset, TAVHeaderData& out)
 {
   return findNode(kAfter, &handle, eyeOffset, 0, &out, pairsOf(handle));
 }

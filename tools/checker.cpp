@@ -119,7 +119,7 @@ void Checker::placeIsTaken(uint64_t offset)
 
 void Checker::beginNode()
 {
-  ++nodes_;
+  isEndElement(event_.node.elm()) ? ++endElements_ : ++nodes_;
   placeIsTaken(event_.offset);
   groups_.back().damagedTail = false;
   paddingCut_ = 0;

@@ -38,7 +38,9 @@ public:
   bool step();
 
   uint64_t position() const { return event_.offset + event_.length; }
+  /// End elements are structure: they are counted apart.
   uint64_t nodes() const { return nodes_; }
+  uint64_t endElements() const { return endElements_; }
 
 private:
   struct Group
@@ -85,6 +87,7 @@ private:
   Event event_{};
   std::vector<Group> groups_{}; ///< the first stands for the file
   uint64_t nodes_ = 0;
+  uint64_t endElements_ = 0;
   uint64_t paddingCut_ = 0; ///< bytes of padding that the last data element lacks at the end of the file
   uint64_t deepOpen_ = 0;   ///< groups below the deepest level that is told of that were never closed
   bool rootEnded_ = false;

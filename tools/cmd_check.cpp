@@ -86,14 +86,15 @@ public:
     out_.write(problemText(problem) + "\n");
   }
 
-  Status finish(uint64_t nodes)
+  Status finish(uint64_t nodes, uint64_t endElements)
   {
     const bool stream = stream_.isStream();
     if (json_)
     {
       out_.write(std::string(defects_ + notes_ == 0 ? "" : "\n ") + "],\n \"stream\": " + (stream ? "true" : "false") +
                  (stream_.kind ? ", \"kind\": " + json(std::string(stream_.kind->name)) : "") +
-                 ", \"nodes\": " + std::to_string(nodes) + ", \"bytes\": " + std::to_string(stream_.source->size()) +
+                 ", \"nodes\": " + std::to_string(nodes) + ", \"endElements\": " + std::to_string(endElements) +
+                 ", \"bytes\": " + std::to_string(stream_.source->size()) +
                  ", \"defects\": " + std::to_string(defects_) + ", \"notes\": " + std::to_string(notes_) + "}\n");
     }
     else
@@ -102,8 +103,8 @@ public:
                                  : defects_ == 0 ? "no defects"
                                                  : counted(defects_, "defect");
       out_.write("tav: " + shown(stream_.source->name()) + ": " + result +
-                 (notes_ == 0 ? "" : ", " + counted(notes_, "note")) +
-                 (stream ? " in " + counted(nodes, "node") : "") + "\n");
+                 (notes_ == 0 ? "" : ", " + counted(notes_, "note")) + (stream ? " in " + counted(nodes, "node") : "") +
+                 (stream && endElements != 0 ? " and " + counted(endElements, "end element") : "") + "\n");
     }
     out_.commit();
     return !stream ? kTooDamaged : defects_ == 0 ? kFine
@@ -174,7 +175,7 @@ int run(const Invocation& invocation)
       progress.at(checker.position());
     }
   }
-  const Status status = findings.finish(checker.nodes());
+  const Status status = findings.finish(checker.nodes(), checker.endElements());
   tellStatistics(invocation, stream.bytes());
   return status;
 }

@@ -35,7 +35,8 @@ struct Tally
 
 struct Counts
 {
-  uint64_t nodes = 0;
+  uint64_t nodes = 0; ///< but for end elements
+  uint64_t ends = 0;
   uint64_t groups = 0;
   uint64_t wide = 0;
   uint64_t open = 0;     ///< groups of unknown size that an end element ended
@@ -59,7 +60,8 @@ struct Counts
 
 void countNode(const Node& node, Counts& counts)
 {
-  counts.nodes += 1;
+  const bool end = layout::isEndElement(node.elm());
+  (end ? counts.ends : counts.nodes) += 1;
   counts.groups += node.isGroup() ? 1 : 0;
   counts.wide += node.is64() ? 1 : 0;
   counts.roots += node.depth == 0 ? 1 : 0;
@@ -69,6 +71,10 @@ void countNode(const Node& node, Counts& counts)
   counts.extras += node.has(kExtra) ? 1 : 0;
   counts.depth = std::max(counts.depth, node.depth + 1);
   counts.pairs += node.elm() == TAV_ELM_CMN_END_HDR_EYE_SIZE ? 1 : 0;
+  if (end)
+  {
+    return;
+  }
   const uint64_t bytes = node.headerLength() + (node.isGroup() ? 0 : node.size());
   for (Tally* const tally : {&counts.types[node.type()], &counts.elements[node.elm()]})
   {
@@ -200,7 +206,7 @@ std::string openText(const Counts& counts)
 
 void printCounts(Printer& print, const Counts& counts, uint64_t fileBytes)
 {
-  const uint64_t narrow = counts.nodes - counts.wide;
+  const uint64_t narrow = counts.nodes + counts.ends - counts.wide;
   const std::string mixed = std::to_string(counts.wide) + " 64-bit, " + std::to_string(narrow) + " 32-bit";
   print.line("headers", counts.wide == 0 ? "32-bit" : narrow == 0 ? "64-bit"
                                                                   : mixed);
@@ -210,6 +216,7 @@ void printCounts(Printer& print, const Counts& counts, uint64_t fileBytes)
     print.line("UTF-8 strings", std::to_string(counts.extras) + " with two uncounted bytes behind them");
   }
   print.line("nodes", std::to_string(counts.nodes) + ", of them " + counted(counts.groups, "group"));
+  print.line("end elements", counts.ends == 0 ? "none" : std::to_string(counts.ends));
   print.line("roots", std::to_string(counts.roots));
   print.line("depth", std::to_string(counts.depth));
   print.line("open groups", openText(counts));
