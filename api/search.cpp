@@ -156,7 +156,7 @@ uint32_t findInBlock(TAVHandle& handle, const Wanted& wanted, const TAVHeader* p
 } // namespace
 
 uint32_t tav::inside::findElement(TAVHandle* handle, TAVHeader* parent, const Wanted& wanted, TAVHeader* resume,
-                          TAVHdrStack* stack, TAVHeaderData* out, uint64_t& reached)
+                                  TAVHdrStack* stack, TAVHeaderData* out, uint64_t& reached)
 {
   const bool silent = !tracing() && handle != nullptr && isDirect(*handle) && isReadOnly(*handle) &&
                       parent != nullptr && out != nullptr;

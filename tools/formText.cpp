@@ -1,6 +1,8 @@
 // How a form is told.
 #include "tools/form.h"
 
+#include "tools/report.h"
+
 namespace tav::tool
 {
 

@@ -425,8 +425,8 @@ public:
 };
 
 /// One stream bound to one storage. Made by tavInitHandle; used by one thread at a time, and after a fork by one of the
-/// two processes: over a file they share its position, but not the ring. A copy of the record is no handle: what reading
-/// has found out lies behind it.
+/// two processes: over a file they share its position, but not the ring. A copy of the record is no handle: what
+/// reading has found out lies behind it.
 struct TAVHandle
 {
   uint64_t initVersion;
@@ -670,8 +670,8 @@ TAV_API uint32_t tavValidateSubtreeInt(uint64_t options, TAVHandle* handle, TAVH
 /// @retval TAV_RC_OUTSIDE_PARENT  a value's size does not fit its type
 /// Codes of the walk come up unchanged; what was printed before stays printed. XML is not escaped.
 /// What a stream refuses does not count. A line-buffered stream gets every piece by itself, which is slower.
-/// Cost: that of validation, and of the output: each line is indented by three characters a level, so that nested groups
-/// make text that grows with the square of their number: 3,999 of them, 64 KB, 72 MB.
+/// Cost: that of validation, and of the output: each line is indented by three characters a level, so that nested
+/// groups make text that grows with the square of their number: 3,999 of them, 64 KB, 72 MB.
 TAV_API uint32_t tavPrintSubtree(uint64_t options, TAVHandle* handle, TAVHeaderData* start, TAVPrintParam* param,
                                  uint64_t* bytesPrinted);
 

@@ -8,7 +8,7 @@
 namespace
 {
 
-using tav::PairMemory;
+using tav::inside::PairMemory;
 
 uint64_t endAt(const PairMemory& pairs, uint64_t place)
 {

@@ -60,7 +60,7 @@ protected:
     fill(reader.handle());
     const uint64_t headOffset = reader.handle()->pCircularBuf->headOffset;
     TAVHeaderData node{};
-    EXPECT_EQ(tav::peekNode(*reader.handle(), offset, node), rc) << offset;
+    EXPECT_EQ(tav::inside::peekNode(*reader.handle(), offset, node), rc) << offset;
     EXPECT_EQ(reader.handle()->pCircularBuf->headOffset, headOffset) << offset;
     EXPECT_EQ(node.header.hdr64.size, read.header.hdr64.size);
     EXPECT_EQ(node.header.nodeOffset, offset);
@@ -87,8 +87,8 @@ TEST_F(Peek, WhatTheStorageDoesNotHaveIsLeftToReading)
   StreamReader reader(bytes, form);
   fill(reader.handle());
   TAVHeaderData node{};
-  EXPECT_EQ(tav::peekNode(*reader.handle(), kLast + 8, node), TAV_RC_END_OF_STORAGE);
-  EXPECT_EQ(tav::peekNode(*reader.handle(), ~uint64_t{0} - 7, node), TAV_RC_END_OF_STORAGE);
+  EXPECT_EQ(tav::inside::peekNode(*reader.handle(), kLast + 8, node), TAV_RC_END_OF_STORAGE);
+  EXPECT_EQ(tav::inside::peekNode(*reader.handle(), ~uint64_t{0} - 7, node), TAV_RC_END_OF_STORAGE);
 }
 
 TEST_F(Peek, TheNextReadThroughTheRingIsNotMisled)
@@ -96,7 +96,7 @@ TEST_F(Peek, TheNextReadThroughTheRingIsNotMisled)
   StreamReader reader(bytes, form);
   fill(reader.handle());
   TAVHeaderData node{};
-  ASSERT_EQ(tav::peekNode(*reader.handle(), 0, node), TAV_RC_OK);
+  ASSERT_EQ(tav::inside::peekNode(*reader.handle(), 0, node), TAV_RC_OK);
   TAVCBUserArea area{};
   ASSERT_EQ(reader.handle()->pCircularBuf->getChunk(704, 8, &area, false, false), TAV_RC_OK);
   EXPECT_TRUE(std::equal(area.pChunk, area.pChunk + 8, bytes.begin() + 704));
@@ -107,11 +107,12 @@ TEST_F(Peek, BytesAroundTheBeginningAndTheEndOfWhatIsCachedAreThoseOfTheStream)
   StreamReader reader(bytes, form);
   fill(reader.handle());
   const TAVCircularBuf& ring = *reader.handle()->pCircularBuf;
-  const uint64_t end = ring.headOffset + tav::cachedBytes(ring);
+  const uint64_t end = ring.headOffset + tav::inside::cachedBytes(ring);
   for (const uint64_t offset : {ring.headOffset - 5, ring.headOffset, end - 5, end, end + 3, uint64_t{100}})
   {
     Bytes got(12);
-    ASSERT_EQ(tav::peekBytes(*reader.handle()->pCircularBuf, offset, got.data(), got.size()), TAV_RC_OK) << offset;
+    ASSERT_EQ(tav::inside::peekBytes(*reader.handle()->pCircularBuf, offset, got.data(), got.size()), TAV_RC_OK)
+        << offset;
     EXPECT_TRUE(std::equal(got.begin(), got.end(), bytes.begin() + static_cast<ptrdiff_t>(offset))) << offset;
   }
 }
@@ -121,7 +122,7 @@ TEST_F(Peek, ShortTransfersAreContinued)
   form.longestTransfer = 3;
   StreamReader reader(bytes, form);
   Bytes got(16);
-  ASSERT_EQ(tav::peekBytes(*reader.handle()->pCircularBuf, 200, got.data(), got.size()), TAV_RC_OK);
+  ASSERT_EQ(tav::inside::peekBytes(*reader.handle()->pCircularBuf, 200, got.data(), got.size()), TAV_RC_OK);
   EXPECT_TRUE(std::equal(got.begin(), got.end(), bytes.begin() + 200));
 }
 
@@ -131,7 +132,7 @@ TEST_F(Peek, AFailedReadComesUp)
   fill(reader.handle());
   reader.vectorStorage().failAt(2, KOR_RC_IO_ERROR);
   TAVHeaderData node{};
-  EXPECT_EQ(tav::peekNode(*reader.handle(), 0, node), KOR_RC_IO_ERROR);
+  EXPECT_EQ(tav::inside::peekNode(*reader.handle(), 0, node), KOR_RC_IO_ERROR);
 }
 
 TEST_F(Peek, WhereTheStorageDoesNotSeekTheRingIsAsked)
@@ -140,7 +141,7 @@ TEST_F(Peek, WhereTheStorageDoesNotSeekTheRingIsAsked)
   fill(reader.handle());
   reader.vectorStorage().attributes &= ~TAV_ATTR_SEEK;
   TAVHeaderData node{};
-  EXPECT_EQ(tav::peekNode(*reader.handle(), 0, node), TAV_RC_OK);
+  EXPECT_EQ(tav::inside::peekNode(*reader.handle(), 0, node), TAV_RC_OK);
   EXPECT_TRUE(reader.handle()->pCircularBuf->isCached(0));
 }
 
@@ -150,7 +151,7 @@ TEST_F(Peek, WhereASeekLandsElsewhereTheRingIsAsked)
   fill(reader.handle());
   reader.vectorStorage().seekError = 1;
   Bytes got(16);
-  EXPECT_EQ(tav::peekBytes(*reader.handle()->pCircularBuf, 0, got.data(), got.size()), tav::kUnusual);
+  EXPECT_EQ(tav::inside::peekBytes(*reader.handle()->pCircularBuf, 0, got.data(), got.size()), tav::inside::kUnusual);
 }
 
 TEST_F(Peek, WhereTheStorageDoesNotTellItsSizeTheRingIsAsked)
@@ -159,7 +160,7 @@ TEST_F(Peek, WhereTheStorageDoesNotTellItsSizeTheRingIsAsked)
   Handle handle(storage, TAV_OPT_READ, form);
   fill(handle.get());
   TAVHeaderData node{};
-  EXPECT_EQ(tav::peekNode(*handle.get(), 0, node), TAV_RC_OK);
+  EXPECT_EQ(tav::inside::peekNode(*handle.get(), 0, node), TAV_RC_OK);
   EXPECT_TRUE(handle->pCircularBuf->isCached(16));
 }
 
@@ -168,12 +169,12 @@ TEST_F(Peek, ANodeThatIsReadIfItIsWholeComesWithItsData)
   StreamReader reader(bytes, form);
   fill(reader.handle());
   TAVHeaderData node{};
-  ASSERT_EQ(tav::readIfWhole(*reader.handle(), 0, node), TAV_RC_OK);
+  ASSERT_EQ(tav::inside::readIfWhole(*reader.handle(), 0, node), TAV_RC_OK);
   EXPECT_EQ(payloadOf(node, 32), Bytes(32, 0x11));
   fill(reader.handle());
   const uint64_t headOffset = reader.handle()->pCircularBuf->headOffset;
-  EXPECT_EQ(tav::readIfWhole(*reader.handle(), 48, node), TAV_RC_DATA_TOO_LARGE);
-  EXPECT_EQ(tav::readIfWhole(*reader.handle(), 80, node), TAV_RC_OK);
+  EXPECT_EQ(tav::inside::readIfWhole(*reader.handle(), 48, node), TAV_RC_DATA_TOO_LARGE);
+  EXPECT_EQ(tav::inside::readIfWhole(*reader.handle(), 80, node), TAV_RC_OK);
   EXPECT_EQ(node.pDataBuf, nullptr);
   EXPECT_EQ(reader.handle()->pCircularBuf->headOffset, headOffset);
 }

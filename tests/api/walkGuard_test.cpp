@@ -8,7 +8,7 @@
 namespace
 {
 
-using namespace tav;
+using namespace tav::inside;
 
 constexpr uint64_t kMiB = 0x100000;
 

@@ -62,7 +62,7 @@ uint64_t walk(StreamReader& reader)
 {
   TAVHeaderData node{};
   if (tavGetNextChild(0, reader.handle(), nullptr, nullptr, &node) != TAV_RC_OK) return 0;
-  tav::WalkGuard guard(node.header);
+  tav::inside::WalkGuard guard(node.header);
   std::vector<TAVHeader> stack{node.header};
   bool first = true;
   while (!stack.empty())

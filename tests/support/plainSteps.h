@@ -67,7 +67,7 @@ inline uint32_t plainNextChild(TAVHandle* handle, TAVHeader* parent, TAVHeader* 
 inline uint32_t plainValidate(TAVHandle* handle, const TAVHeader& start)
 {
   std::vector<TAVHeader> stack{start};
-  tav::WalkGuard guard(start);
+  tav::inside::WalkGuard guard(start);
   TAVHeaderData node{};
   bool first = true;
   while (true)
@@ -108,7 +108,7 @@ inline uint32_t plainValidate(TAVHandle* handle, const TAVHeader& start)
 inline uint32_t plainPath(TAVHandle* handle, const TAVHeader& start, const std::vector<uint16_t>& path, uint64_t& found)
 {
   std::vector<TAVHeader> chain{start};
-  tav::WalkGuard guard(start);
+  tav::inside::WalkGuard guard(start);
   TAVHeaderData node{};
   bool first = true;
   bool any = false;
