@@ -8,6 +8,7 @@
 #include "tav/probes.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {
@@ -27,16 +28,6 @@ uint64_t encodeGroupSize(uint64_t size, bool wide, bool swap, uint8_t* to)
   const uint32_t word = swap ? kor::byteswap32(narrow) : narrow;
   std::memcpy(to, &word, sizeof word);
   return sizeof word;
-}
-
-void setSize(TAVHeader& group, uint64_t size)
-{
-  if (is64(group))
-  {
-    group.hdr64.size = size;
-    return;
-  }
-  group.hdr32.size = static_cast<uint32_t>(size);
 }
 
 /// Writes the size of a group over the one in the stream.
@@ -84,8 +75,9 @@ bool closeGroup32(TraceFrame& frame, TAVHandle& handle, TAVHeader& group)
   return frame.step(50, patchSize(handle, group));
 }
 
-/// A group of unknown size whose size could not be written is still given an end that a reader can find. The close
-/// succeeds then, and the failure is told by its record alone.
+/// A group that was pushed with an unknown size is given an end that a reader can find when its size cannot be written.
+/// The close succeeds then, and the failure is told by its record alone. Any other size stands for what is below the
+/// group, so that failing to write it fails the close.
 bool closeGroup64(TraceFrame& frame, TAVHandle& handle, TAVHeader& group)
 {
   const bool wasUnknown = isSizeUnknown(group);
@@ -93,13 +85,16 @@ bool closeGroup64(TraceFrame& frame, TAVHandle& handle, TAVHeader& group)
   const uint64_t payload = handle.streamBytes - group.nodeOffset - kHeaderSize64;
   setSize(group, payload + (hasEyeSize(group) ? endElementLength(wide) : 0));
   const uint32_t rc = patchSize(handle, group);
-  const bool needsEnd = hasEyeSize(group) || (rc != TAV_RC_OK && wasUnknown);
-  if (!needsEnd)
+  if (rc == TAV_RC_OK && !hasEyeSize(group))
   {
-    return frame.step(50, rc);
+    return true;
   }
   if (rc != TAV_RC_OK)
   {
+    if (!wasUnknown)
+    {
+      return frame.fail(50, rc);
+    }
     frame.report(50, rc);
   }
   return frame.step(60, appendEndElement(handle, payload, wide));

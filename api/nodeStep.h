@@ -22,7 +22,7 @@
 #include "tav/probes.h"
 #include "tav/tav.h"
 
-namespace tav
+namespace tav::inside
 {
 
 /// Never leaves the library: a silent step met something unusual.
@@ -262,9 +262,6 @@ template<class Frame>
          frame.require(120, start != level.end, TAV_RC_NO_MORE_CHILDREN);
 }
 
-/// The sibling after a group that was never closed: the node behind the eye catcher that leads back to the group.
-uint32_t readAfterOpenGroup(TAVHandle& handle, const TAVHeader& parent, const TAVHeader& reference, TAVHeaderData& out);
-
 /// @}
 
 /// @name Walking the direct block
@@ -322,4 +319,4 @@ inline uint32_t stepInBlock(const TAVHandle& handle, const Level& level, bool fi
 
 /// @}
 
-} // namespace tav
+} // namespace tav::inside

@@ -4,7 +4,7 @@
 
 #include "dictionary/dictionary.h"
 
-namespace tav::print
+namespace tav::inside::print
 {
 namespace
 {
@@ -81,6 +81,22 @@ uint64_t OutputBlock::settle(size_t taken)
   return counted;
 }
 
+/// Writes blanks out of the block, which is empty. A stream that pads by itself takes them a few at a time.
+bool OutputBlock::writeBlanks(size_t blanks)
+{
+  std::memset(text_.data(), ' ', std::min(blanks, kSize));
+  while (blanks != 0)
+  {
+    const size_t length = std::min(blanks, kSize);
+    if (std::fwrite(text_.data(), 1, length, stream_) != length)
+    {
+      return false;
+    }
+    blanks -= length;
+  }
+  return true;
+}
+
 uint64_t OutputBlock::addLong(size_t blanks, std::string_view text)
 {
   handOver();
@@ -89,10 +105,7 @@ uint64_t OutputBlock::addLong(size_t blanks, std::string_view text)
     return 0;
   }
   const size_t length = blanks + text.size();
-  const bool whole = blanks == 0 ? std::fwrite(text.data(), 1, length, stream_) == length
-                                 : std::fprintf(stream_, "%*s%.*s", static_cast<int>(blanks), "",
-                                                static_cast<int>(text.size()), text.data()) >= 0;
-  if (!whole)
+  if (!writeBlanks(blanks) || std::fwrite(text.data(), 1, text.size(), stream_) != text.size())
   {
     return 0;
   }
@@ -101,4 +114,4 @@ uint64_t OutputBlock::addLong(size_t blanks, std::string_view text)
   return length;
 }
 
-} // namespace tav::print
+} // namespace tav::inside::print

@@ -8,7 +8,7 @@
 #include <cstring>
 #include <string_view>
 
-namespace tav::print
+namespace tav::inside::print
 {
 
 inline constexpr int64_t kBlanksPerLevel = 3;
@@ -153,6 +153,7 @@ public:
 private:
   static constexpr uint16_t kNodeEnd = 0x8000; ///< beside the end of a node's last piece
 
+  bool writeBlanks(size_t blanks);
   uint64_t addLong(size_t blanks, std::string_view text);
   uint64_t settle(size_t taken);
 
@@ -167,4 +168,4 @@ private:
   std::array<uint16_t, kSize + kSize / 2> ends_; ///< where each piece ends; of three together one may be empty
 };
 
-} // namespace tav::print
+} // namespace tav::inside::print

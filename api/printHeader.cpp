@@ -6,7 +6,7 @@
 #include "dictionary/dictionary.h"
 #include "format/layout.h"
 
-namespace tav::print
+namespace tav::inside::print
 {
 namespace
 {
@@ -163,4 +163,4 @@ void descriptor(TAVPrintCtx& ctx, const TAVHeaderData& node)
   fields.number({"dataBufOffset = ", "dataBufOffset"}, node.dataBufOffset);
 }
 
-} // namespace tav::print
+} // namespace tav::inside::print

@@ -3,7 +3,7 @@
 #include "api/nodeStep.h"
 #include "api/printValue.h"
 
-namespace tav::print
+namespace tav::inside::print
 {
 namespace
 {
@@ -117,4 +117,4 @@ bool printLeaves(TAVPrintCtx& ctx, const TAVHandle& handle, const TAVHeader& par
   return run.count != 0;
 }
 
-} // namespace tav::print
+} // namespace tav::inside::print

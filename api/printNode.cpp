@@ -6,10 +6,11 @@
 #include "tav/probes.h"
 
 using namespace tav;
-using tav::print::has;
-using tav::print::lineOf;
-using tav::print::piece;
-using tav::print::ReadyTag;
+using namespace tav::inside;
+using tav::inside::print::has;
+using tav::inside::print::lineOf;
+using tav::inside::print::piece;
+using tav::inside::print::ReadyTag;
 
 namespace
 {
@@ -31,7 +32,7 @@ uint32_t dataText(TAVPrintCtx& ctx, TAVHeaderData& node)
 {
   if (has(ctx, TAV_PRINT_DESCRIPTORS))
   {
-    tav::print::descriptor(ctx, node);
+    tav::inside::print::descriptor(ctx, node);
   }
   if (!hasValue(node))
   {
@@ -54,7 +55,7 @@ uint32_t bodyText(TAVPrintCtx& ctx, TAVHeaderData& node)
   }
   if (has(ctx, TAV_PRINT_HEADERS))
   {
-    tav::print::header(ctx, node.header);
+    tav::inside::print::header(ctx, node.header);
   }
   return has(ctx, TAV_PRINT_DATA) ? dataText(ctx, node) : TAV_RC_OK;
 }
@@ -78,7 +79,7 @@ uint32_t dataXml(TAVPrintCtx& ctx, TAVHeaderData& node)
 {
   if (has(ctx, TAV_PRINT_DESCRIPTORS))
   {
-    tav::print::descriptor(ctx, node);
+    tav::inside::print::descriptor(ctx, node);
   }
   const bool wrapped = has(ctx, TAV_PRINT_HEADERS | TAV_PRINT_DESCRIPTORS);
   if (wrapped)
@@ -101,7 +102,7 @@ uint32_t bodyXml(TAVPrintCtx& ctx, TAVHeaderData& node)
   }
   if (has(ctx, TAV_PRINT_HEADERS))
   {
-    tav::print::header(ctx, node.header);
+    tav::inside::print::header(ctx, node.header);
   }
   return has(ctx, TAV_PRINT_DATA) ? dataXml(ctx, node) : TAV_RC_OK;
 }

@@ -2,6 +2,7 @@
 #include <cstdarg>
 
 #include "api/printer.h"
+#include "kor/lineBuffered.h"
 
 namespace
 {
@@ -33,12 +34,21 @@ uint64_t formatAlone(TAVPrintCtx& ctx, const char* format, va_list arguments)
   {
     return ctx.bufferSize != 0 ? formatToBuffer(ctx, format, arguments) : 0;
   }
-  FILE* const stream = tav::print::streamOf(ctx);
+  FILE* const stream = tav::inside::print::streamOf(ctx);
   const bool sound = std::ferror(stream) == 0;
   const int length = vfprintf(stream, format, arguments);
   // Not every C library counts nothing when the stream refuses.
   const bool refused = length < 0 || (sound && std::ferror(stream) != 0);
   return refused ? 0 : static_cast<uint64_t>(length);
+}
+
+/// Whether a stream takes a piece. Of one that ends a line fwrite counts all also when the line is refused, and such a
+/// piece has no NUL.
+bool writeWhole(FILE* stream, std::string_view text)
+{
+  return text.ends_with('\n') && tav::kor::isLineBuffered(stream)
+             ? std::fprintf(stream, "%.*s", static_cast<int>(text.size()), text.data()) >= 0
+             : std::fwrite(text.data(), 1, text.size(), stream) == text.size();
 }
 
 /// Formats a piece of at most a line's length, cutting what is longer.
@@ -57,8 +67,8 @@ void depthPrefix(TAVPrintCtx& ctx)
     return;
   }
   constexpr size_t width = 3;
-  std::array<char, tav::digits::kLongest> text;
-  char* end = tav::digits::writeDecimal(text.data(), static_cast<uint64_t>(ctx.depth));
+  std::array<char, tav::inside::digits::kLongest> text;
+  char* end = tav::inside::digits::writeDecimal(text.data(), static_cast<uint64_t>(ctx.depth));
   *end++ = '|';
   const auto length = static_cast<size_t>(end - text.data());
   ctx.pBlock->add(width + 1 - std::min(length, width + 1), {text.data(), length});
@@ -69,7 +79,7 @@ void indented(TAVPrintCtx& ctx, std::string_view text)
 {
   if (ctx.pBlock != nullptr)
   {
-    ctx.pBlock->add(static_cast<size_t>(ctx.depth * tav::print::kBlanksPerLevel), text);
+    ctx.pBlock->add(static_cast<size_t>(ctx.depth * tav::inside::print::kBlanksPerLevel), text);
     return;
   }
   tavPrintf(&ctx, ctx.indentFormat.data(), "", text.data());
@@ -96,7 +106,7 @@ uint64_t tavPrintf(TAVPrintCtx* ctx, const char* format, ...)
   return count;
 }
 
-namespace tav::print
+namespace tav::inside::print
 {
 
 FILE* streamOf(const TAVPrintCtx& ctx)
@@ -109,7 +119,7 @@ uint64_t pieceAlone(TAVPrintCtx& ctx, std::string_view text)
   uint64_t count = 0;
   if (!isToBuffer(ctx))
   {
-    count = std::fwrite(text.data(), 1, text.size(), streamOf(ctx)) == text.size() ? text.size() : 0;
+    count = writeWhole(streamOf(ctx), text) ? text.size() : 0;
   }
   else if (ctx.bufferSize != 0)
   {
@@ -156,11 +166,11 @@ void lineOf(TAVPrintCtx& ctx, std::initializer_list<std::string_view> parts)
     end = std::copy_n(part.data(), std::min(part.size(), room), end);
   }
   *end = '\0';
-  if (!tav::print::has(ctx, TAV_PRINT_XML))
+  if (!tav::inside::print::has(ctx, TAV_PRINT_XML))
   {
     depthPrefix(ctx);
   }
   indented(ctx, {text.data(), static_cast<size_t>(end - text.data())});
 }
 
-} // namespace tav::print
+} // namespace tav::inside::print

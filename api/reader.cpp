@@ -2,6 +2,7 @@
 #include "api/nodeStep.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {

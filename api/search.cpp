@@ -4,20 +4,13 @@
 #include <new>
 
 #include "api/nodeStep.h"
+#include "api/search.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {
-
-/// What tavFindElmInt looks for.
-struct Wanted
-{
-  uint32_t minDepth;
-  uint32_t maxDepth;
-  uint16_t infoKey;
-  uint32_t elm;
-};
 
 bool matches(const Wanted& wanted, const Node& node, uint64_t depth)
 {
@@ -33,7 +26,7 @@ bool matches(const Wanted& wanted, const Node& node, uint64_t depth)
 /// Looks through one level, from after `previous` on. A group on the way is entered by pushing it, and the caller gets
 /// control back; nothing climbs out of a group again, so a failed step means that nothing was found.
 uint32_t searchLevel(TAVHandle& handle, const Wanted& wanted, TAVHeader* previous, TAVHdrStack& stack,
-                     TAVHeaderData& out)
+                     TAVHeaderData& out, uint64_t& reached)
 {
   std::array<TAVHeaderData, 2> nodes{};
   for (size_t current = 0;; current ^= 1U)
@@ -43,6 +36,7 @@ uint32_t searchLevel(TAVHandle& handle, const Wanted& wanted, TAVHeader* previou
     {
       return TAV_RC_NOT_FOUND;
     }
+    reached = node.header.nodeOffset;
     if (matches(wanted, nodeOf(node.header), stack.count))
     {
       out = node;
@@ -59,7 +53,7 @@ uint32_t searchLevel(TAVHandle& handle, const Wanted& wanted, TAVHeader* previou
 /// Looks through one level of the direct block as searchLevel does. Without a stack the level is the first.
 template<bool Wide>
 uint32_t searchBlock(TAVHandle& handle, const Block& memory, const Level& children, const Wanted& wanted,
-                     const TAVHeader* previous, TAVHdrStack* stack, TAVHeaderData& out)
+                     const TAVHeader* previous, TAVHdrStack* stack, TAVHeaderData& out, uint64_t& reached)
 {
   const uint64_t depth = stack != nullptr ? stack->count : 1;
   const Block block = memory;
@@ -73,6 +67,7 @@ uint32_t searchBlock(TAVHandle& handle, const Block& memory, const Level& childr
     const uint32_t rc = stepInBlock<Wide>(block, level, first, node);
     if (rc != TAV_RC_OK) [[unlikely]]
     {
+      reached = first ? reached : node.offset;
       return rc == kUnusual ? kUnusual : TAV_RC_NOT_FOUND;
     }
     if (node.fields.elm == elm && matches(wanted, node, depth)) [[unlikely]]
@@ -81,6 +76,7 @@ uint32_t searchBlock(TAVHandle& handle, const Block& memory, const Level& childr
       {
         out.header.hdr64 = {}; // of which a 32-bit header fills a half
       }
+      reached = node.offset;
       return readSilently(handle, node, out) ? TAV_RC_OK : kUnusual;
     }
     if (!shallow && node.group()) [[unlikely]]
@@ -95,7 +91,7 @@ uint32_t searchBlock(TAVHandle& handle, const Block& memory, const Level& childr
 /// The search over direct memory while tracing is off: no call leaves the library, and where the caller wants no stack
 /// there is none. `kUnusual`, with the stack as it was, where an open group is on the way.
 uint32_t findInBlock(TAVHandle& handle, const Wanted& wanted, const TAVHeader* parent, const TAVHeader* resume,
-                     TAVHdrStack* stack, TAVHeaderData& out)
+                     TAVHdrStack* stack, TAVHeaderData& out, uint64_t& reached)
 {
   if (resume != nullptr && (stack == nullptr || stack->count == 0))
   {
@@ -119,8 +115,8 @@ uint32_t findInBlock(TAVHandle& handle, const Wanted& wanted, const TAVHeader* p
   else
   {
     const Level level = levelBelow(nodeOf(*parent));
-    rc = level.wide ? searchBlock<true>(handle, block, level, wanted, resume, stack, out)
-                    : searchBlock<false>(handle, block, level, wanted, resume, stack, out);
+    rc = level.wide ? searchBlock<true>(handle, block, level, wanted, resume, stack, out, reached)
+                    : searchBlock<false>(handle, block, level, wanted, resume, stack, out, reached);
   }
   if (rc == kUnusual && stack != nullptr && resume == nullptr)
   {
@@ -131,7 +127,7 @@ uint32_t findInBlock(TAVHandle& handle, const Wanted& wanted, const TAVHeader* p
 
 /// The search with its records, and over a circular buffer.
 [[gnu::noinline]] uint32_t findTraced(TAVHandle* handle, TAVHeader* parent, const Wanted& wanted, TAVHeader* resume,
-                                      TAVHdrStack* stack, TAVHeaderData* out)
+                                      TAVHdrStack* stack, TAVHeaderData* out, uint64_t& reached)
 {
   TraceFrame frame(probe::findElement);
   frame.dump(0, handle, trace::record(parent), wanted.minDepth, wanted.maxDepth, wanted.infoKey, wanted.elm,
@@ -150,7 +146,7 @@ uint32_t findInBlock(TAVHandle& handle, const Wanted& wanted, const TAVHeader* p
   if (frame.require(40, stack != nullptr, TAV_RC_NO_HDR_STACK) &&
       (resume == nullptr ? frame.step(50, stack->push(parent))
                          : frame.require(60, stack->count != 0, TAV_RC_BAD_PARAM)) &&
-      frame.step(70, searchLevel(*handle, wanted, resume, *stack, *out)))
+      frame.step(70, searchLevel(*handle, wanted, resume, *stack, *out, reached)))
   {
     frame.dump(100, trace::record(out));
   }
@@ -159,12 +155,18 @@ uint32_t findInBlock(TAVHandle& handle, const Wanted& wanted, const TAVHeader* p
 
 } // namespace
 
+uint32_t tav::inside::findElement(TAVHandle* handle, TAVHeader* parent, const Wanted& wanted, TAVHeader* resume,
+                                  TAVHdrStack* stack, TAVHeaderData* out, uint64_t& reached)
+{
+  const bool silent = !tracing() && handle != nullptr && isDirect(*handle) && isReadOnly(*handle) &&
+                      parent != nullptr && out != nullptr;
+  const uint32_t rc = silent ? findInBlock(*handle, wanted, parent, resume, stack, *out, reached) : kUnusual;
+  return rc != kUnusual ? rc : findTraced(handle, parent, wanted, resume, stack, out, reached);
+}
+
 uint32_t tavFindElmInt(TAVHandle* handle, TAVHeader* parent, uint32_t minDepth, uint32_t maxDepth, uint16_t infoKey,
                        uint32_t elm, TAVHeader* resume, TAVHdrStack* stack, TAVHeaderData* out)
 {
-  const Wanted wanted{minDepth, maxDepth, infoKey, elm};
-  const bool silent = !tracing() && handle != nullptr && isDirect(*handle) && isReadOnly(*handle) &&
-                      parent != nullptr && out != nullptr;
-  const uint32_t rc = silent ? findInBlock(*handle, wanted, parent, resume, stack, *out) : kUnusual;
-  return rc != kUnusual ? rc : findTraced(handle, parent, wanted, resume, stack, out);
+  uint64_t reached = 0;
+  return findElement(handle, parent, {minDepth, maxDepth, infoKey, elm}, resume, stack, out, reached);
 }

@@ -4,9 +4,11 @@
 #include <new>
 
 #include "api/nodeStep.h"
+#include "api/ownedHandle.h"
 #include "api/walkGuard.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {
@@ -160,6 +162,7 @@ uint32_t walkBlock(Walk& walk)
 
 uint32_t walkBelow(uint64_t options, TAVHandle& handle, TAVHdrStack& stack)
 {
+  const OwnPairs pairs(handle);
   Walk walk(options, handle, stack);
   return isDirect(handle) && isReadOnly(handle) ? walkBlock(walk) : walkTraced(walk);
 }

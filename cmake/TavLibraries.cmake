@@ -16,6 +16,7 @@ function(tav_add_library name alias)
     LINKER_LANGUAGE CXX
     VERSION ${TAV_ABI_VERSION}.${PROJECT_VERSION}
     SOVERSION ${TAV_ABI_VERSION})
+  tav_harden(${name})
   if(TAV_LIBRARY_TYPE STREQUAL "STATIC")
     string(TOUPPER ${name} upper)
     if(NOT name STREQUAL "tav_inspect") # which follows libtav
@@ -43,10 +44,6 @@ target_link_libraries(tav PUBLIC kor)
 tav_add_library(tav_inspect inspect inspect)
 target_link_libraries(tav_inspect PUBLIC tav)
 set_target_properties(tav_inspect PROPERTIES OUTPUT_NAME tav-inspect EXPORT_NAME inspect)
-# Where the pair is installed together, libtav finds libkor beside itself, wherever the prefix was moved to.
-if(UNIX AND NOT APPLE AND NOT DEFINED CMAKE_INSTALL_RPATH)
-  set_target_properties(tav tav_inspect PROPERTIES INSTALL_RPATH "$ORIGIN")
-endif()
 
 if(TAV_BUILD_TESTS OR TAV_BUILD_BENCH)
   set(objects)

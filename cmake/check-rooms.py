@@ -6,6 +6,8 @@
 Includes point one way: tools -> inspect -> api -> storage, dictionary -> format -> kor. The operating system, its headers and
 the byte order are kor's business, which has a file a platform: names that end in Posix or Windows. No other source
 asks for the platform, tests and examples included.
+
+Names in `tav` itself are those of the installed headers: what stays inside the library is in `tav::inside`.
 """
 import pathlib
 import re
@@ -34,6 +36,9 @@ PLATFORM_FILE = re.compile(r"^kor/(\w+(Posix|Windows)\.cpp|windows\.h)$")
 BESIDE = ("tests", "examples", "bench", "fuzz")
 # Libraries of others that a room may use.
 THIRD_PARTY = {"tools": ("CLI/", "nlohmann/")}
+
+# A namespace of the users' own names, in a source that is not installed.
+USERS_NAMESPACE = re.compile(r"^\s*namespace\s+tav\s*(\{|$)")
 
 STANDARD = set(
     """algorithm any array atomic barrier bit bitset cassert cctype cerrno cfenv cfloat charconv chrono cinttypes
@@ -94,6 +99,8 @@ def check_text(name, text):
             error = include_error(name, room, match["open"], match["path"])
             if error:
                 yield number, error
+        elif room != "include" and USERS_NAMESPACE.match(line):
+            yield number, "names in tav itself are those of the installed headers; these belong into tav::inside"
         elif not knows_platform(name):
             found = PLATFORM_TEST.search(COMMENT.sub("", line))
             if found:

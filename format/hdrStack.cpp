@@ -2,7 +2,7 @@
 
 #include "format/hdrStack.h"
 
-namespace tav
+namespace tav::inside
 {
 namespace
 {
@@ -12,9 +12,10 @@ constexpr uint32_t kIncrement = 200;
 constexpr const char* kUnit = "tavHdrStack";
 
 } // namespace
-} // namespace tav
+} // namespace tav::inside
 
 using namespace tav;
+using namespace tav::inside;
 
 TAVHdrStack::TAVHdrStack()
     : pEntries(nullptr), capacity(0), count(0)
@@ -27,6 +28,7 @@ TAVHdrStack::TAVHdrStack()
     pEntries = static_cast<TAVHeader*>(block);
     capacity = kFirstCapacity;
   }
+  frame.dump(100, capacity);
 }
 
 TAVHdrStack::~TAVHdrStack()
@@ -44,7 +46,7 @@ TAVHdrStack::~TAVHdrStack()
 
 /// The entries stay where they are: a reserved block has room for every capacity that the allocator grants, and the
 /// block asked for here only decides whether it is granted. It is released with the entries.
-uint32_t tav::growStack(TAVHdrStack& stack)
+uint32_t tav::inside::growStack(TAVHdrStack& stack)
 {
   TraceFrame frame(probe::hdrStackGrow);
   frame.dump(0, stack.capacity, kIncrement);
@@ -61,6 +63,7 @@ uint32_t tav::growStack(TAVHdrStack& stack)
       std::memcpy(block, stack.pEntries, stack.capacity * sizeof(TAVHeader));
     }
     stack.capacity += kIncrement;
+    frame.dump(100, stack.capacity);
   }
   return frame.code();
 }

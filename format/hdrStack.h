@@ -8,7 +8,7 @@
 #include "tav/probes.h"
 #include "tav/tav.h"
 
-namespace tav
+namespace tav::inside
 {
 
 /// Raises the stack's capacity by one increment.
@@ -40,9 +40,11 @@ template<class Frame>
 uint32_t popEntry(TAVHdrStack& stack)
 {
   Frame frame(probe::hdrStackPop);
+  frame.dump(0, stack.count);
   if (frame.require(10, stack.count != 0, TAV_RC_NO_MEMORY))
   {
     --stack.count;
+    frame.dump(100, stack.count);
   }
   return frame.code();
 }
@@ -51,11 +53,13 @@ template<class Frame>
 uint32_t popEntry(TAVHdrStack& stack, TAVHeader* out)
 {
   Frame frame(probe::hdrStackPopCopy);
+  frame.dump(0, out, stack.count);
   if (frame.require(10, out != nullptr, TAV_RC_BAD_PARAM) && frame.require(20, stack.count != 0, TAV_RC_NO_MEMORY))
   {
     *out = stack.pEntries[--stack.count];
+    frame.dump(100, trace::record(out), stack.count);
   }
   return frame.code();
 }
 
-} // namespace tav
+} // namespace tav::inside

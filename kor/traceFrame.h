@@ -8,7 +8,7 @@
 #include "kor/shared.h"
 #include "tav/kor.h"
 
-namespace tav
+namespace tav::inside
 {
 
 /// Whether a record would go anywhere. Asked before every record: tracing may be switched in mid-call.
@@ -232,4 +232,4 @@ private:
   uint32_t code_ = TAV_RC_OK;
 };
 
-} // namespace tav
+} // namespace tav::inside

@@ -7,7 +7,9 @@
 #pragma once
 
 #include "tav/inspect/checker.hpp"
+#include "tav/inspect/damageWatch.hpp"
 #include "tav/inspect/diff.hpp"
+#include "tav/inspect/fileKind.hpp"
 #include "tav/inspect/form.hpp"
 #include "tav/inspect/json.hpp"
 #include "tav/inspect/jsonText.hpp"
@@ -21,6 +23,7 @@
 #include "tav/inspect/recover.hpp"
 #include "tav/inspect/rules.hpp"
 #include "tav/inspect/scratch.hpp"
+#include "tav/inspect/similar.hpp"
 #include "tav/inspect/sink.hpp"
 #include "tav/inspect/source.hpp"
 #include "tav/inspect/textSource.hpp"

@@ -25,10 +25,10 @@ bool holds(const Tolerance& tolerance, uint64_t difference, uint64_t larger)
 
 DiffIndex indexOf(const DiffInput& input, const DiffOptions& options)
 {
-  return {input.source, input.form, options.ignored, options.makeFile, [&](uint64_t offset) {
-            if (options.progress)
+  return {input.source, input.form, options.ignored, options.makeFile, [&](const Walker& walker, const Event& event) {
+            if (options.seen)
             {
-              options.progress(input.source, offset);
+              options.seen(input.source, walker, event);
             }
           }};
 }

@@ -42,7 +42,7 @@ Node nodeOf(const Row& row)
 } // namespace
 
 DiffIndex::DiffIndex(ByteSource& source, const Form& form, const std::vector<Path>& ignored,
-                     const ScratchMaker& makeFile, const std::function<void(uint64_t)>& progress)
+                     const ScratchMaker& makeFile, const std::function<void(const Walker&, const Event&)>& seen)
     : source_(source), form_(form), scratch_(makeFile()), file_(scratch_->file())
 {
   std::vector<PathMatcher> matchers;
@@ -55,7 +55,7 @@ DiffIndex::DiffIndex(ByteSource& source, const Form& form, const std::vector<Pat
   Event event;
   while (walker.next(event))
   {
-    progress(event.offset);
+    seen(walker, event);
     add(event, matchers);
   }
 }

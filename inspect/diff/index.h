@@ -40,9 +40,9 @@ class DiffIndex
 {
 public:
   /// Walks the stream. Nodes that a path of `ignored` leads to are left out, with all below them. Rows are kept in a
-  /// file of `makeFile`; `progress` is told how far the walk is, by offset.
+  /// file of `makeFile`; `seen` is told of every event.
   DiffIndex(ByteSource& source, const Form& form, const std::vector<Path>& ignored, const ScratchMaker& makeFile,
-            const std::function<void(uint64_t)>& progress);
+            const std::function<void(const Walker&, const Event&)>& seen);
 
   uint64_t rows() const { return count_; }
   Row row(uint64_t number);

@@ -12,6 +12,7 @@ bool toJson(ByteSource& source, const Form& form, Sink& out, const ToJsonOptions
   Walker walker(source, form);
   JsonWriter writer(source, form, out, options.style, options.safe);
   writer.begin();
+  bool damaged = false;
   Event event;
   while (walker.next(event))
   {
@@ -19,10 +20,11 @@ bool toJson(ByteSource& source, const Form& form, Sink& out, const ToJsonOptions
     {
       options.progress(event.offset);
     }
+    damaged = damaged || event.what == What::damaged || event.what == What::unread;
     writer.add(walker, event);
   }
   writer.end();
-  return writer.foundDamage();
+  return damaged;
 }
 
 LeftOut fromJson(TextSource& document, PatchFile& out, const Conversion& conversion)

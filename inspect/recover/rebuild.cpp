@@ -82,6 +82,7 @@ void Rebuilder::close()
   const uint64_t start = group.nodeOffset + headerLength(group.hdrType);
   if (hasEyeSize(group))
   {
+    ++endElements_;
     const bool wide = hasChildren64(group);
     TAVHeader end{};
     end.hdrType = wide ? TAV_HDR_64 : TAV_HDR_32;

@@ -15,12 +15,19 @@ RecoveryTotals recover(ByteSource& source, const Form& form, PatchFile& out, con
     }
   };
   Rebuilder rebuilder(source, form, out, at);
-  Recovery recovery(source, form, rebuilder, options.search, [&](const Loss& loss) {
+  const auto loss = [&](const Loss& lost) {
     if (options.lost)
     {
-      options.lost(loss);
+      options.lost(lost);
     }
-  });
+  };
+  const auto doubt = [&](const Doubt& doubted) {
+    if (options.doubted)
+    {
+      options.doubted(doubted);
+    }
+  };
+  Recovery recovery(source, form, rebuilder, options.search, {.loss = loss, .doubt = doubt});
   while (recovery.step())
   {
     at(recovery.position());

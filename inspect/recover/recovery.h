@@ -26,16 +26,21 @@ namespace tav::inspect
 class Recovery
 {
 public:
-  using Sink = std::function<void(const Loss&)>;
+  /// Whom to tell. Either may be empty.
+  struct Sinks
+  {
+    std::function<void(const Loss&)> loss{};
+    std::function<void(const Doubt&)> doubt{};
+  };
 
   /// `search`: bytes that may be searched for nodes.
-  Recovery(ByteSource& source, const Form& form, Rebuilder& rebuilder, uint64_t search, Sink sink);
+  Recovery(ByteSource& source, const Form& form, Rebuilder& rebuilder, uint64_t search, Sinks sinks);
 
   /// Goes on by one node or one gap; false at the end, when all groups are closed.
   bool step();
 
   uint64_t position() const { return position_; }
-  const RecoveryTotals& totals() const { return totals_; }
+  RecoveryTotals totals() const;
 
 private:
   /// How much speaks for a node.
@@ -69,6 +74,7 @@ private:
     size_t sureAt = 0;   ///< the innermost frame from here up whose limit is confirmed
     size_t heldAt = 0;   ///< and the one that decides whether 64-bit headers can stand here
     bool hidden = false; ///< too deep: its children go to the group around
+    uint64_t claim = 0;  ///< where its size says that it ends, when only what stands there speaks against it; else 0
   };
 
   static bool isKnown(const TAVHeader& header);
@@ -86,7 +92,9 @@ private:
   Belief beliefBehind(uint64_t end, bool wide, uint64_t limit);
   bool goesOn(uint64_t offset, bool wide);
   static bool isExact(const TAVHeader& header);
+  static bool isOdd(const TAVHeader& group);
   static bool isStrange(const Candidate& found);
+  bool isMovedRoot(const Candidate& found);
   bool isSure(const uint8_t* bytes, uint64_t offset, bool wide);
   static bool mayHoldNodes(const Candidate& found);
   bool isContradicted(const Candidate& found);
@@ -94,6 +102,7 @@ private:
   bool believe(Candidate& found, bool onWay);
   bool endOfStranger(const TAVHeader& header, uint64_t limit, uint64_t& end);
   bool isStranger(const TAVHeader& header, uint64_t& end);
+  bool isTail(const Candidate& found, uint64_t from);
   bool isDamagedEnd(const Candidate& found, uint64_t limit);
   uint64_t firstSure(uint64_t from, uint64_t to, bool wide);
   bool leadsTo(uint64_t from, bool wide, uint64_t end);
@@ -105,6 +114,7 @@ private:
   bool takeEnd(uint64_t offset, bool wide);
   bool enterEnding();
   void trimPair(Candidate& found);
+  void contradict(uint64_t end);
   void take(Candidate found);
   void takeGroup(const Candidate& found);
   void keepHeader(const TAVHeader& header);
@@ -119,6 +129,9 @@ private:
   bool mayEndInZeros() const;
   bool endByZeros();
   void lose(uint64_t to, std::string reason);
+  void settleClaim();
+  bool isMostlyEyes(const TAVHeader& data);
+  void doubt(const TAVHeader& node);
   void openGroup(const Frame& frame, const TAVHeader& header);
   void closeGroup();
   void makeParent(bool wide);
@@ -132,7 +145,7 @@ private:
   Form form_;
   Rebuilder& rebuilder_;
   Prober prober_;
-  Sink sink_;
+  Sinks sinks_;
   uint64_t search_;
   uint64_t spent_ = 0;
   RecoveryTotals totals_{};
@@ -142,6 +155,9 @@ private:
   bool indexed_ = false;
   bool damaged_ = false; ///< bytes directly before the position are lost
   uint64_t position_ = 0;
+  uint64_t keptTo_ = 0;   ///< behind the last node that came back
+  TAVHeader last_{};      ///< that node,
+  bool lastTold_ = true;  ///< and whether nothing more is to be said of it
   uint64_t sureFrom_ = 0; ///< the first node beyond doubt at or behind this place is at sureAt_
   uint64_t sureAt_ = 0;
   bool sureFound_ = false;

@@ -20,8 +20,10 @@ Error::Error(std::string sentence, std::string hint)
 
 void failAt(const std::string& file, uint32_t code, std::string hint)
 {
-  throw Error(
-      Problem{.file = file, .sentence = std::string(codeSentence(code)), .code = code, .hint = std::move(hint)});
+  throw Error(Problem{.file = file.empty() ? "''" : file,
+                      .sentence = std::string(codeSentence(code)),
+                      .code = code,
+                      .hint = std::move(hint)});
 }
 
 } // namespace tav::inspect

@@ -3,14 +3,53 @@
 #include <algorithm>
 #include <filesystem>
 
+#include "tav/inspect/phrases.hpp"
 #include "tav/inspect/problem.hpp"
 
 namespace tav::inspect
 {
 
-ByteSource::ByteSource(std::string name, std::unique_ptr<TAVSideStorage> storage, uint64_t ringBytes,
+namespace
+{
+
+/// What stands in a storage from an offset on, for reading.
+class StorageWindow : public TAVSideStorage
+{
+public:
+  StorageWindow(TAVSideStorage& whole, uint64_t from)
+      : TAVSideStorage(0, whole.attributes & (TAV_ATTR_READ_FORWARD | TAV_ATTR_SEEK)), whole_(whole), from_(from)
+  {
+    ioUnit = whole.ioUnit;
+  }
+
+  uint32_t seek(uint64_t offset, uint64_t hint) override { return whole_.seek(from_ + offset, hint); }
+  uint32_t getPosition(uint64_t* position) override { return without(whole_.getPosition(position), position); }
+  uint32_t getTotalSize(uint64_t* size) override { return without(whole_.getTotalSize(size), size); }
+  uint32_t read(uint64_t wanted, void** data, uint64_t room, uint64_t* done, bool zeroCopy, bool backward) override
+  {
+    return backward ? TAV_RC_NOT_SUPPORTED : whole_.read(wanted, data, room, done, zeroCopy, false);
+  }
+  uint32_t write(const void*, uint64_t, uint64_t*) override { return TAV_RC_NOT_SUPPORTED; }
+  uint32_t getMemory(void**, uint64_t*) override { return TAV_RC_NOT_SUPPORTED; }
+  uint32_t lock(uint32_t mode) override { return whole_.lock(mode); }
+  uint32_t unlock() override { return whole_.unlock(); }
+
+private:
+  uint32_t without(uint32_t code, uint64_t* place) const
+  {
+    *place -= code == TAV_RC_OK ? from_ : 0;
+    return code;
+  }
+
+  TAVSideStorage& whole_;
+  uint64_t from_;
+};
+
+} // namespace
+
+ByteSource::ByteSource(std::string name, std::unique_ptr<TAVSideStorage> storage, uint64_t ringBytes, uint64_t from,
                        std::shared_ptr<void> keep)
-    : name_(std::move(name)), keep_(std::move(keep)), storage_(std::move(storage)),
+    : name_(std::move(name)), keep_(std::move(keep)), storage_(std::move(storage)), from_(from),
       maxPages_(static_cast<size_t>(std::max<uint64_t>(2, ringBytes / kPage)))
 {
   uint32_t code = storage_->getStatus();
@@ -22,6 +61,21 @@ ByteSource::ByteSource(std::string name, std::unique_ptr<TAVSideStorage> storage
   {
     failAt(name_, code);
   }
+  if (from_ != 0)
+  {
+    startAt();
+  }
+}
+
+void ByteSource::startAt()
+{
+  if (from_ >= size_)
+  {
+    throw Error(Problem{.file = name_, .offset = from_, .sentence = "--from: lies behind the end of the file"});
+  }
+  name_ += " from " + hexOffset(from_);
+  size_ -= from_;
+  window_ = std::make_unique<StorageWindow>(*storage_, from_);
 }
 
 ByteSource::ByteSource(std::string name, std::span<const uint8_t> bytes)
@@ -33,7 +87,7 @@ ByteSource::ByteSource(std::string name, std::span<const uint8_t> bytes)
 
 ByteSource::~ByteSource() = default;
 
-std::unique_ptr<ByteSource> ByteSource::open(const std::string& path, uint64_t ringBytes)
+std::unique_ptr<ByteSource> ByteSource::open(const std::string& path, uint64_t ringBytes, uint64_t from)
 {
   std::error_code error;
   if (std::filesystem::is_directory(std::filesystem::path(std::u8string(path.begin(), path.end())), error))
@@ -49,7 +103,7 @@ std::unique_ptr<ByteSource> ByteSource::open(const std::string& path, uint64_t r
   {
     failAt(path, code);
   }
-  return std::make_unique<ByteSource>(path, std::move(file), ringBytes);
+  return std::make_unique<ByteSource>(path, std::move(file), ringBytes, from);
 }
 
 ByteSource::Page& ByteSource::slotFor(uint64_t number)
@@ -78,7 +132,7 @@ void ByteSource::fetch(uint64_t number, uint64_t count)
   buffer_.resize(static_cast<size_t>(wanted));
   void* target = buffer_.data();
   uint64_t done = 0;
-  uint32_t code = storage_->seek(offset, 1);
+  uint32_t code = storage_->seek(from_ + offset, 1);
   if (code == TAV_RC_OK)
   {
     code = storage_->read(wanted, &target, wanted, &done, false, false);

@@ -16,6 +16,7 @@ namespace
 {
 
 using namespace tav;
+using namespace tav::inside;
 using namespace test;
 
 using ::testing::ElementsAre;
@@ -55,7 +56,7 @@ Printed printNode(uint64_t options, TAVHeaderData& node, bool open, bool body, b
 {
   CaughtStream stream;
   TAVPrintCtx ctx = printContext(stream.get(), options);
-  tav::print::setDepth(ctx, depth);
+  tav::inside::print::setDepth(ctx, depth);
   ctx.attributeForm = attributes ? 1 : 0;
   uint64_t count = 0xBAD;
   const uint32_t rc = tavPrintNode(&ctx, &node, open, body, close, &count);

@@ -152,7 +152,7 @@ TEST(SinkWithoutStreamAndBuffer, DoesNotLookAtTheBufferSize)
 std::string formatAt(int64_t depth)
 {
   TAVPrintCtx ctx = printContext(nullptr);
-  tav::print::setDepth(ctx, depth);
+  tav::inside::print::setDepth(ctx, depth);
   EXPECT_EQ(ctx.depth, depth);
   return ctx.indentFormat.data();
 }
@@ -173,9 +173,9 @@ TEST(Indentation, AtTheTopIsNone)
 {
   CaughtStream stream;
   TAVPrintCtx ctx = printContext(stream.get(), TAV_PRINT_XML);
-  tav::print::setDepth(ctx, 1);
-  tav::print::setDepth(ctx, 0);
-  tav::print::line(ctx, "%s", "line\n");
+  tav::inside::print::setDepth(ctx, 1);
+  tav::inside::print::setDepth(ctx, 0);
+  tav::inside::print::line(ctx, "%s", "line\n");
   EXPECT_EQ(stream.text(), "line\n");
 }
 
@@ -185,8 +185,8 @@ TEST(Line, OfTextBeginsWithTheDepth)
   TAVPrintCtx ctx = printContext(stream.get());
   for (const int64_t depth : {0, 1, 10, 100, 1000})
   {
-    tav::print::setDepth(ctx, depth);
-    tav::print::line(ctx, "x%d\n", 1);
+    tav::inside::print::setDepth(ctx, depth);
+    tav::inside::print::line(ctx, "x%d\n", 1);
   }
   EXPECT_EQ(stream.text(), "  0|x1\n  1|   x1\n 10|" + std::string(30, ' ') + "x1\n100|" + std::string(300, ' ') +
                                "x1\n1000|" + std::string(3000, ' ') + "x1\n");
@@ -196,16 +196,16 @@ TEST(Line, OfXmlHasNoDepth)
 {
   CaughtStream stream;
   TAVPrintCtx ctx = printContext(stream.get(), TAV_PRINT_XML);
-  tav::print::setDepth(ctx, 2);
-  tav::print::line(ctx, "<%s>\n", "host");
+  tav::inside::print::setDepth(ctx, 2);
+  tav::inside::print::line(ctx, "<%s>\n", "host");
   EXPECT_EQ(stream.text(), "      <host>\n");
 }
 
 TEST(Line, OfTextIsAPieceBehindItsDepth)
 {
   BufferSink sink(16);
-  tav::print::setDepth(sink.ctx, 1);
-  tav::print::line(sink.ctx, "ab\n");
+  tav::inside::print::setDepth(sink.ctx, 1);
+  tav::inside::print::line(sink.ctx, "ab\n");
   EXPECT_EQ(sink.held(), "   ab\n");
   EXPECT_EQ(sink.ctx.bytesWritten, 10U);
 }
@@ -213,8 +213,8 @@ TEST(Line, OfTextIsAPieceBehindItsDepth)
 TEST(Line, IsCutPieceByPiece)
 {
   BufferSink sink(3);
-  tav::print::setDepth(sink.ctx, 1);
-  tav::print::line(sink.ctx, "ab\n");
+  tav::inside::print::setDepth(sink.ctx, 1);
+  tav::inside::print::line(sink.ctx, "ab\n");
   EXPECT_EQ(sink.held(), "  ");
   EXPECT_EQ(sink.ctx.bytesWritten, 4U); // two of "  1|", two of "   ab\n"
 }

@@ -1,14 +1,12 @@
 #include "tools/shell/input.h"
 
-#include <cerrno>
 #include <cstdio>
-#include <cstring>
 #include <filesystem>
 #include <vector>
 
 #include "kor/host.h"
+#include "tav/inspect.hpp"
 #include "tools/shell/report.h"
-#include "tools/shell/temporary.h"
 
 namespace tav::tool
 {
@@ -67,6 +65,27 @@ private:
   bool named_ = false;
 };
 
+/// Whether a file has other bytes than its size says. Files that the system makes while they are read, as those of
+/// /proc, have the size 0 or that of a page; larger ones are believed.
+bool tellsWrongSize(const std::string& name, const std::string& path, uint64_t size)
+{
+  constexpr uint64_t mostDoubted = uint64_t{64} * 1024;
+  if (size > mostDoubted)
+  {
+    return false;
+  }
+  std::vector<uint8_t> bytes(static_cast<size_t>(size) + 1);
+  return PipeReader(name, path).read(bytes) != size;
+}
+
+[[noreturn]] void failAtLimit(const std::string& name, uint64_t limit)
+{
+  Problem problem{.file = name};
+  problem.sentence = "more than " + byteText(limit) + " come from it";
+  problem.hint = "--spool-limit sets how much is copied to a temporary file, 0 for no limit";
+  throw Error(problem);
+}
+
 /// A copy of what is read from a pipe, under a name until it is opened again.
 class Spool
 {
@@ -84,18 +103,25 @@ public:
 
   const std::string& path() const { return path_; }
 
-  void fill(PipeReader& reader)
+  void fill(const std::string& name, const std::string& path, uint64_t limit)
   {
+    PipeReader reader(name, path);
     std::vector<uint8_t> buffer(kPiece);
+    uint64_t total = 0;
     while (const size_t count = reader.read(buffer))
     {
+      total += count;
+      if (limit != 0 && total > limit)
+      {
+        failAtLimit(name, limit);
+      }
       KORFileWriteParam param;
       param.pData = buffer.data();
       param.length = count;
       uint64_t done = 0;
       if (const uint32_t code = file_.write(&param, &done); code != TAV_RC_OK)
       {
-        failAt(path_, code);
+        failAt(path_, code, "it holds what " + name + " has given so far; set TMPDIR to a folder with more room");
       }
     }
     file_.close();
@@ -106,8 +132,8 @@ public:
   {
     if (!path_.empty() && kor::removeFile(path_))
     {
+      kor::keepOnInterrupt(path_);
       path_.clear();
-      kor::removeOnInterrupt({});
     }
   }
 
@@ -116,11 +142,11 @@ private:
   std::string path_{};
 };
 
-std::unique_ptr<ByteSource> openSpooled(const std::string& name, const std::string& path, uint64_t ringBytes)
+std::unique_ptr<ByteSource> openSpooled(const std::string& name, const std::string& path, const InputLimits& limits,
+                                        uint64_t from)
 {
-  PipeReader reader(name, path);
   const auto spool = std::make_shared<Spool>();
-  spool->fill(reader);
+  spool->fill(name, path, limits.spool);
   KORFileOpenParam param;
   param.pPath = spool->path().c_str();
   param.options = KOR_FILE_READ;
@@ -131,22 +157,28 @@ std::unique_ptr<ByteSource> openSpooled(const std::string& name, const std::stri
     failAt(name, code);
   }
   spool->remove();
-  return std::make_unique<ByteSource>(name, std::move(storage), ringBytes, spool);
+  return std::make_unique<ByteSource>(name, std::move(storage), limits.ring, from, spool);
 }
 
 } // namespace
 
-std::unique_ptr<ByteSource> openSource(const std::string& path, uint64_t ringBytes)
+std::unique_ptr<ByteSource> openSource(const std::string& path, const InputLimits& limits, uint64_t from)
 {
   if (path == "-")
   {
-    return openSpooled("standard input", path, ringBytes);
+    return openSpooled("standard input", path, limits, from);
   }
+  using Kind = std::filesystem::file_type;
   std::error_code error;
-  const auto kind = std::filesystem::status(kor::pathOf(path), error).type();
-  const bool pipe = !error && kind != std::filesystem::file_type::regular &&
-                    kind != std::filesystem::file_type::directory && kind != std::filesystem::file_type::not_found;
-  return pipe ? openSpooled(path, path, ringBytes) : ByteSource::open(path, ringBytes);
+  const Kind kind = std::filesystem::status(kor::pathOf(path), error).type();
+  const bool regular = kind == Kind::regular && !error;
+  const bool pipe = !error && kind != Kind::regular && kind != Kind::directory && kind != Kind::not_found;
+  const uint64_t told = regular ? std::filesystem::file_size(kor::pathOf(path), error) : 0;
+  if (pipe || (regular && !error && tellsWrongSize(path, path, told)))
+  {
+    return openSpooled(path, path, limits, from);
+  }
+  return ByteSource::open(path, limits.ring, from);
 }
 
 namespace
@@ -157,9 +189,14 @@ class FileText final : public TextSource
 {
 public:
   explicit FileText(const std::string& path)
-      : TextSource(path == "-" ? "standard input" : path), file_(path == "-" ? stdin : kor::openStream(path, "rb"))
+      : TextSource(path == "-" ? "standard input" : path)
   {
-    require(file_ != nullptr);
+    uint32_t code = TAV_RC_OK;
+    file_ = path == "-" ? stdin : kor::openStream(path, "rb", code);
+    if (file_ == nullptr)
+    {
+      failAt(name(), code);
+    }
   }
 
   ~FileText() override
@@ -177,20 +214,15 @@ protected:
   size_t fetch(std::span<char> to) override
   {
     const size_t count = std::fread(to.data(), 1, to.size(), file_);
-    require(count != 0 || std::ferror(file_) == 0);
+    if (count == 0 && std::ferror(file_) != 0)
+    {
+      failAt(name(), KOR_RC_IO_ERROR);
+    }
     return count;
   }
 
 private:
-  void require(bool holds) const
-  {
-    if (!holds)
-    {
-      throw Error(Problem{.file = name(), .sentence = std::strerror(errno)});
-    }
-  }
-
-  std::FILE* file_;
+  std::FILE* file_ = nullptr;
 };
 
 } // namespace

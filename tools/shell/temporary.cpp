@@ -23,7 +23,7 @@ Temporary::~Temporary()
   if (!path_.empty())
   {
     kor::removeFile(path_);
-    kor::removeOnInterrupt({});
+    kor::keepOnInterrupt(path_);
   }
 }
 

@@ -34,9 +34,10 @@ struct DiffOptions
 {
   std::vector<Path> ignored{}; ///< nodes that one of them leads to are left out, with all below them
   Tolerance tolerance{};
-  uint64_t mostValue = uint64_t{64} * 1024;              ///< bytes of a payload that a side's value shows
-  ScratchMaker makeFile = makeScratch;                   ///< for the nodes of either stream
-  std::function<void(ByteSource&, uint64_t)> progress{}; ///< is told by offset how far the reading of a stream is
+  uint64_t mostValue = uint64_t{64} * 1024; ///< bytes of a payload that a side's value shows
+  ScratchMaker makeFile = makeScratch;      ///< for the nodes of either stream
+  /// Is told of every event while either stream is read, the first one first.
+  std::function<void(ByteSource&, const Walker&, const Event&)> seen{};
 };
 
 /// A node, or damaged bytes, on one side of a difference.

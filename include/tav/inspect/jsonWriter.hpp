@@ -44,8 +44,6 @@ public:
   /// The events of a walk, one after the other, from its beginning to its end.
   TAV_INSPECT_API void add(const Walker& walker, const Event& event);
 
-  bool foundDamage() const { return damaged_; }
-
 private:
   struct Group
   {
@@ -89,7 +87,6 @@ private:
   Sink& out_;
   JsonStyle style_;
   bool safe_;
-  bool damaged_ = false;
   bool firstKey_ = true;
   bool firstRoot_ = true;
   std::optional<DataPieces> data_{}; ///< written when something else begins

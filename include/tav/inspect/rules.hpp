@@ -42,6 +42,7 @@ enum class RuleId : uint8_t
   stringHigh,
   damaged,
   behindStream,
+  zerosBetween,
   zerosLong,
   tooDeep,
   count

@@ -26,14 +26,15 @@ public:
   static constexpr uint64_t kPage = uint64_t{16} * 1024;
   static constexpr uint64_t kLongRead = uint64_t{64} * kPage; ///< what is read at once when reading goes straight on
 
-  /// Opens a regular file by its path, UTF-8. At most `ringBytes` (and at least two pages) are kept in memory. Throws
-  /// Error when that does not work.
-  TAV_INSPECT_API static std::unique_ptr<ByteSource> open(const std::string& path, uint64_t ringBytes = kDefaultRing);
+  /// Opens a regular file by its path, UTF-8. At most `ringBytes` (and at least two pages) are kept in memory. What
+  /// stands before `from` is left out, and all offsets count from there. Throws Error when that does not work.
+  TAV_INSPECT_API static std::unique_ptr<ByteSource> open(const std::string& path, uint64_t ringBytes = kDefaultRing,
+                                                          uint64_t from = 0);
 
   /// The same over an open storage. `name` is how messages call it; `keep` is let go of after the storage. Throws
   /// Error.
   TAV_INSPECT_API ByteSource(std::string name, std::unique_ptr<TAVSideStorage> storage,
-                             uint64_t ringBytes = kDefaultRing, std::shared_ptr<void> keep = {});
+                             uint64_t ringBytes = kDefaultRing, uint64_t from = 0, std::shared_ptr<void> keep = {});
 
   /// Over bytes in memory, which outlive this object.
   TAV_INSPECT_API ByteSource(std::string name, std::span<const uint8_t> bytes);
@@ -45,7 +46,10 @@ public:
   /// As it is called in messages.
   const std::string& name() const { return name_; }
 
-  /// Bytes, as many as there were when it was opened.
+  /// Where in the storage it begins.
+  uint64_t from() const { return from_; }
+
+  /// Bytes from there on, as many as there were when it was opened.
   uint64_t size() const { return size_; }
 
   /// Copies bytes; fewer than asked only at the end. Throws Error when they cannot be read.
@@ -65,7 +69,7 @@ public:
 
   /// The storage underneath, for a handle of the library. Its cursor is shared: this object may be used again when
   /// the handle is done.
-  TAVSideStorage& storage() { return *storage_; }
+  TAVSideStorage& storage() { return window_ ? *window_ : *storage_; }
 
 private:
   struct Page
@@ -75,6 +79,7 @@ private:
     std::vector<uint8_t> bytes{};
   };
 
+  void startAt();
   const Page& page(uint64_t number);
   Page& slotFor(uint64_t number);
   void fetch(uint64_t number, uint64_t count);
@@ -82,6 +87,8 @@ private:
   std::string name_;
   std::shared_ptr<void> keep_{};
   std::unique_ptr<TAVSideStorage> storage_{};
+  std::unique_ptr<TAVSideStorage> window_{}; ///< on the storage, where it is not read from its first byte on
+  uint64_t from_ = 0;
   std::span<const uint8_t> memory_{}; ///< all bytes, where they are at hand
   uint64_t size_ = 0;
   uint64_t bytesRead_ = 0;

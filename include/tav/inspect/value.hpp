@@ -50,7 +50,7 @@ TAV_INSPECT_API std::optional<uint64_t> pairDistanceAt(ByteSource& source, const
 TAV_INSPECT_API std::string hexText(std::span<const uint8_t> bytes);
 
 /// `2024-02-29T10:30:00.000000+01:00`, from the right calendar; "12345678901234567 s" when the year has more than four
-/// digits.
+/// digits. Fraction A counts milliseconds, fraction B microseconds, and both are added to the seconds.
 TAV_INSPECT_API std::string dateText(const TAVTimeStamp& stamp);
 
 /// A 128-bit number in host order, in decimal.
