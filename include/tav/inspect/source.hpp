@@ -69,7 +69,7 @@ public:
 
   /// The storage underneath, for a handle of the library. Its cursor is shared: this object may be used again when
   /// the handle is done.
-  TAVSideStorage& storage() { return window_ ? *window_ : *storage_; }
+  TAVSideStorage& storage() { return window_ != nullptr ? *window_ : *storage_; }
 
 private:
   struct Page
