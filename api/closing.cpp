@@ -3,6 +3,7 @@
 #include <cstring>
 
 #include "api/rawWrite.h"
+#include "core/fastWay.h"
 #include "format/layout.h"
 #include "kor/traceFrame.h"
 #include "tav/probes.h"
@@ -166,6 +167,6 @@ bool closeSilently(TAVHandle& handle)
 
 uint32_t tavCloseHeader(uint64_t options, TAVHandle* handle)
 {
-  const bool silent = !tracing() && options == 0 && handle != nullptr;
+  const bool silent = core::isFastCall(options) && handle != nullptr;
   return silent && closeSilently(*handle) ? TAV_RC_OK : closeTraced(options, handle);
 }

@@ -148,7 +148,7 @@ uint32_t walk(TAVPrintCtx& ctx, TAVHandle& handle, TAVHdrStack& stack)
   for (size_t current = 0; stack.count != 0; current ^= 1U)
   {
     if (ctx.pBlock != nullptr &&
-        print::printLeaves(ctx, handle, *topEntry<SilentFrame>(stack), previous, guard, passed))
+        print::printLeaves(ctx, handle, stack.pEntries[stack.count - 1], previous, guard, passed))
     {
       previous = &passed;
       if (ctx.pBlock->stopped())

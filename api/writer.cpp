@@ -2,8 +2,8 @@
 #include <array>
 #include <cstring>
 
-#include "api/nodeStep.h"
 #include "api/rawWrite.h"
+#include "core/fastWay.h"
 #include "format/copySmall.h"
 #include "format/hdrStack.h"
 #include "format/layout.h"
@@ -150,7 +150,7 @@ uint32_t openSilently(TAVHandle& handle, TAVHeader& header, HeaderFields fields)
   uint8_t* const to = takePlace(handle, position, length);
   if (to == nullptr) [[unlikely]]
   {
-    return kUnusual;
+    return core::kNotHere;
   }
   if (Wide && handle.alignMode == 1)
   {
@@ -188,7 +188,7 @@ template<bool Wide>
   const uint8_t* const payload = node.pDataBuf;
   if (to == nullptr || (swap && !isApart(payload, size, to, length))) [[unlikely]]
   {
-    return kUnusual;
+    return core::kNotHere;
   }
   if (Wide && handle.alignMode == 1)
   {
@@ -240,20 +240,20 @@ template<bool Wide>
   return moveBehind(handle, node, position, kHeaderSize64 + size);
 }
 
-/// Appends a node in place, other than by putPlain; else `kUnusual`, with nothing done.
+/// Appends a node in place, other than by putPlain; else `core::kNotHere`, with nothing done.
 template<bool Wide>
 uint32_t addSilently(TAVHandle& handle, TAVHeaderData& node)
 {
   if (!isUsualChild<Wide>(handle))
   {
-    return kUnusual;
+    return core::kNotHere;
   }
   const HeaderFields fields = fieldsOf<Wide>(node.header);
   if (isGroupType(fields.type))
   {
     return openSilently<Wide>(handle, node.header, fields);
   }
-  return hasUsualPayload(node, fields) ? addInPlace<Wide>(handle, node, fields) : kUnusual;
+  return hasUsualPayload(node, fields) ? addInPlace<Wide>(handle, node, fields) : core::kNotHere;
 }
 
 /// The same for a node of either form.
@@ -266,7 +266,7 @@ uint32_t addSilently(TAVHandle& handle, TAVHeaderData& node)
   case TAV_HDR_32:
     return addSilently<false>(handle, node);
   default:
-    return kUnusual;
+    return core::kNotHere;
   }
 }
 
@@ -342,9 +342,9 @@ namespace
 /// Everything but the plain element.
 [[gnu::noinline]] uint32_t addNotPlain(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
 {
-  const bool silent = isSilentCall(options) && handle != nullptr && headerData != nullptr;
-  const uint32_t rc = silent ? addSilently(*handle, *headerData) : kUnusual;
-  return rc != kUnusual ? rc : addTraced(options, handle, headerData);
+  const bool silent = core::isFastCall(options) && handle != nullptr && headerData != nullptr;
+  const uint32_t rc = silent ? addSilently(*handle, *headerData) : core::kNotHere;
+  return rc != core::kNotHere ? rc : addTraced(options, handle, headerData);
 }
 
 /// Everything but the plain element in a block of memory, without a record. `used` keeps its arguments where they are.
@@ -402,12 +402,12 @@ namespace
 /// The same where tracing was on once, and every call with options or with records.
 [[gnu::noinline]] uint32_t addOnceTraced(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
 {
-  return isSilentCall(options) ? addPlain(handle, headerData) : addNotPlain(options, handle, headerData);
+  return core::isFastCall(options) ? addPlain(handle, headerData) : addNotPlain(options, handle, headerData);
 }
 
 } // namespace
 
 uint32_t tavAddElement(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
 {
-  return isUsualCall(options) ? addPlain(handle, headerData) : addOnceTraced(options, handle, headerData);
+  return core::isFastCallAtOnce(options) ? addPlain(handle, headerData) : addOnceTraced(options, handle, headerData);
 }

@@ -3,7 +3,7 @@
 
     check-rooms.py [ROOT]
 
-Includes point one way: tools -> api -> storage, dictionary -> format -> kor. The operating system, its headers and
+Includes point one way: tools -> api -> core -> storage, dictionary -> format -> kor. The operating system, its headers and
 the byte order are kor's business, which has a file a platform: names that end in Posix or Windows. No other source
 asks for the platform, tests and examples included.
 """
@@ -17,7 +17,8 @@ ROOMS = {
     "format": {"format", "kor"},
     "storage": {"storage", "format", "kor"},
     "dictionary": {"dictionary", "format", "kor"},
-    "api": {"api", "storage", "dictionary", "format", "kor"},
+    "core": {"core", "storage", "format", "kor"},
+    "api": {"api", "core", "storage", "dictionary", "format", "kor"},
     "tools": {"tools"},
     "include": set(),
 }

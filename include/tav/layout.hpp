@@ -19,26 +19,25 @@ namespace tav::layout
 /// @name Arithmetic on sizes and offsets that a stream gives: it never wraps
 /// @{
 
+/// Adds into `sum`; false when the result passes 64 bits.
+constexpr bool addFits(uint64_t a, uint64_t b, uint64_t& sum)
+{
+  uint64_t result = 0;
+  const bool passes = __builtin_add_overflow(a, b, &result);
+  sum = result;
+  return !passes;
+}
+
 /// Adds to `sum`; false, with `sum` at its maximum, when the result would pass 64 bits.
 constexpr bool addChecked(uint64_t& sum, uint64_t amount)
 {
-  if (amount > ~uint64_t{0} - sum)
-  {
-    sum = ~uint64_t{0};
-    return false;
-  }
-  sum += amount;
-  return true;
-}
-
-/// Adds into `sum`; false when the result passes 64 bits.
-inline bool addFits(uint64_t a, uint64_t b, uint64_t& sum)
-{
-  return !__builtin_add_overflow(a, b, &sum);
+  const bool fits = addFits(sum, amount, sum);
+  sum = fits ? sum : ~uint64_t{0};
+  return fits;
 }
 
 /// Takes off `room`; false when it has not so much.
-inline bool takeRoom(uint64_t& room, uint64_t amount)
+constexpr bool takeRoom(uint64_t& room, uint64_t amount)
 {
   return !__builtin_sub_overflow(room, amount, &room);
 }
@@ -214,37 +213,13 @@ inline uint16_t typeAt(const uint8_t* bytes)
   return type;
 }
 
-/// Loads a word of a header. It is stored as it was loaded, by itself: who reads a header's fields straight afterwards
-/// would wait for a wider store.
-inline uint64_t loadWord(const uint8_t* from)
-{
-  uint64_t word = 0;
-  std::memcpy(&word, from, sizeof word);
-#if defined(__GNUC__)
-  __asm__(""
-          : "+r"(word)); // keeps the compiler from joining the words
-#endif
-  return word;
-}
-
-/// Copies words one by one.
-template<size_t Words>
-inline void copyWords(void* to, const uint8_t* from)
-{
-  for (size_t at = 0; at < Words * sizeof(uint64_t); at += sizeof(uint64_t))
-  {
-    const uint64_t word = loadWord(from + at);
-    std::memcpy(static_cast<uint8_t*>(to) + at, &word, sizeof word);
-  }
-}
-
 /// Reads the header's stream form: sets the form and its fields, nothing else.
 inline void decodeHeader(const uint8_t* bytes, bool wide, bool swap, TAVHeader& header)
 {
   if (wide)
   {
     header.hdrType = TAV_HDR_64;
-    copyWords<2>(&header.hdr64, bytes);
+    std::memcpy(&header.hdr64, bytes, sizeof header.hdr64);
     if (swap)
     {
       swapFields(header.hdr64);
@@ -252,7 +227,7 @@ inline void decodeHeader(const uint8_t* bytes, bool wide, bool swap, TAVHeader& 
     return;
   }
   header.hdrType = TAV_HDR_32;
-  copyWords<1>(&header.hdr32, bytes);
+  std::memcpy(&header.hdr32, bytes, sizeof header.hdr32);
   if (swap)
   {
     swapFields(header.hdr32);

@@ -1,0 +1,161 @@
+/// The bytes that the fast way goes over: a block of memory, or what a ring caches next to each other.
+///
+/// Both kinds come with what is known of the stream's form. A form that is known when this is compiled costs nothing.
+#pragma once
+
+#include <cstdint>
+#include <type_traits>
+
+#include "core/node.h"
+#include "core/word.h"
+#include "format/layout.h"
+#include "storage/cachedRun.h"
+#include "tav/tav.h"
+
+namespace tav::core
+{
+
+inline bool isDirect(const TAVHandle& handle)
+{
+  return (handle.options & TAV_OPT_DIRECT) != 0;
+}
+
+inline bool isReadOnly(const TAVHandle& handle)
+{
+  return (handle.options & TAV_OPT_READ) != 0;
+}
+
+/// Host order, nothing padded; and a node with a pair, or one that ends a group, is not here.
+struct HostForm
+{
+  explicit HostForm(const TAVHandle& /*handle*/) {}
+  static constexpr bool swap = false;
+  static constexpr bool alignAll = false;
+  static constexpr bool bare = true;
+};
+
+/// Whatever the handle was opened with.
+struct AnyForm
+{
+  explicit AnyForm(const TAVHandle& handle)
+      : swap(handle.swapBytes != 0), alignAll(handle.alignMode == 1)
+  {
+  }
+  bool swap;
+  bool alignAll;
+  static constexpr bool bare = false;
+};
+
+/// A node's place: its offset, its header in memory, and how many bytes of its data are at hand behind that.
+struct Place
+{
+  uint64_t offset;
+  uint8_t* header;
+  uint64_t room;
+};
+
+/// A handle's direct block. Who walks keeps it in registers.
+template<class Form>
+struct BlockBytes
+{
+  explicit BlockBytes(const TAVHandle& handle)
+      : form(handle), base(handle.pDirectData), size(handle.directDataSize)
+  {
+  }
+
+  /// Whether the handle has such bytes. A block that does not begin with the stream, which walks rarely see, is left to
+  /// the operations.
+  static bool isOf(const TAVHandle& handle)
+  {
+    const bool direct = std::is_same_v<Form, HostForm> ? isHostWith(handle, TAV_OPT_DIRECT) : isDirect(handle);
+    return direct && handle.pDirectData != nullptr && handle.curOffset == 0;
+  }
+
+  /// Finds the header at an offset; false when it does not lie in the block.
+  [[gnu::always_inline]] bool find(uint64_t offset, uint64_t length, Place& place) const
+  {
+    uint64_t room = size;
+    if (!takeRoom(room, offset) || !takeRoom(room, length)) [[unlikely]]
+    {
+      return false;
+    }
+    place = {offset, base + offset, room};
+    return true;
+  }
+
+  static bool holds(uint64_t dataSize, const Place& place)
+  {
+    return dataSize <= place.room;
+  }
+
+  /// A 32-bit header of type 2 counts as a data element here.
+  template<bool Wide>
+  static bool hasData(uint16_t type)
+  {
+    return Wide ? !isGroupType(type) : type != TAV_TYPE_HEADER32;
+  }
+
+  /// Hands data out, all that follows, and returns how many bytes that are.
+  static uint64_t take(TAVHandle& /*handle*/, const Place& place, uint64_t /*length*/, uint64_t /*dataSize*/)
+  {
+    return place.room;
+  }
+
+  [[no_unique_address]] Form form;
+  uint8_t* base;
+  uint64_t size;
+};
+
+/// What a handle's ring caches.
+template<class Form>
+struct RingBytes
+{
+  explicit RingBytes(const TAVHandle& handle)
+      : form(handle), ring(*handle.pCircularBuf)
+  {
+  }
+
+  static bool isOf(const TAVHandle& handle)
+  {
+    const bool buffered = std::is_same_v<Form, HostForm> ? isHostWith(handle, 0) : !isDirect(handle);
+    return buffered && handle.pCircularBuf != nullptr;
+  }
+
+  /// Finds the header at an offset; false when it is not cached in one run.
+  [[gnu::always_inline]] bool find(uint64_t offset, uint64_t length, Place& place) const
+  {
+    auto [index, room] = runAt(ring, offset);
+    if (!takeRoom(room, length)) [[unlikely]]
+    {
+      return false;
+    }
+    place = {offset, ring.pRing + index, room};
+    return true;
+  }
+
+  /// No data have a place only by the ring's own step.
+  static bool holds(uint64_t dataSize, const Place& place)
+  {
+    return dataSize - 1 < place.room;
+  }
+
+  template<bool Wide>
+  static bool hasData(uint16_t type)
+  {
+    return !isGroupType(type);
+  }
+
+  /// Hands data out: they are the chunk that the handle was given last.
+  static uint64_t take(TAVHandle& handle, const Place& place, uint64_t length, uint64_t dataSize)
+  {
+    handle.curOffset = place.offset + length;
+    handle.pDirectData = place.header + length;
+    handle.directDataSize = dataSize;
+    return dataSize;
+  }
+
+  [[no_unique_address]] Form form;
+  const TAVCircularBuf& ring;
+};
+
+} // namespace tav::core
