@@ -118,8 +118,8 @@ uint32_t tav::nextChildElsewhere(uint64_t options, TAVHandle* handle, TAVHeader*
   // Without a parent the storage is asked for its size: a call that leaves the library.
   if (core::isFastCall(options) && handle != nullptr && parent != nullptr && out != nullptr && isReadOnly(*handle))
   {
-    rc = Block::isOf(*handle)  ? nextChildFast<Block>(*handle, *parent, refChild, *out)
-         : Ring::isOf(*handle) ? nextChildFast<Ring>(*handle, *parent, refChild, *out)
+    rc = Block::canRead(*handle)  ? nextChildFast<Block>(*handle, *parent, refChild, *out)
+         : Ring::canRead(*handle) ? nextChildFast<Ring>(*handle, *parent, refChild, *out)
                                : core::kNotHere;
   }
   return rc != core::kNotHere ? rc : nextChildTraced(options, handle, parent, refChild, out);

@@ -15,7 +15,7 @@ template<bool First, class Bytes>
 [[gnu::always_inline]] inline uint32_t nextChildIn(TAVHandle* handle, const TAVHeader* parent,
                                                    const TAVHeader* refChild, TAVHeaderData* out)
 {
-  const bool fast = handle != nullptr && Bytes::isOf(*handle) && isReadOnly(*handle) && parent != nullptr &&
+  const bool fast = handle != nullptr && Bytes::canRead(*handle) && isReadOnly(*handle) && parent != nullptr &&
                     hasChildren64(*parent) && out != nullptr;
   return fast ? core::nextChild<true, First>(Bytes(*handle), *handle, *parent, refChild, *out) : core::kNotHere;
 }

@@ -97,7 +97,7 @@ bool printLeaves(TAVPrintCtx& ctx, const TAVHandle& handle, const TAVHeader& par
                  WalkGuard& guard, TAVHeader& last)
 {
   using Bytes = core::BlockBytes<core::AnyForm>;
-  if (!isOneLine(ctx) || !core::isReadOnly(handle) || !Bytes::isOf(handle))
+  if (!isOneLine(ctx) || !core::isReadOnly(handle) || !Bytes::canRead(handle))
   {
     return false;
   }

@@ -100,7 +100,7 @@ namespace
 template<class Bytes>
 uint32_t readFast(TAVHandle& handle, uint64_t offset, bool wide, TAVHeaderData& out)
 {
-  if (!Bytes::isOf(handle))
+  if (!Bytes::canRead(handle))
   {
     return core::kNotHere;
   }

@@ -153,7 +153,7 @@ uint32_t tavFindElmInt(TAVHandle* handle, TAVHeader* parent, uint32_t minDepth, 
 {
   const Wanted wanted{minDepth, maxDepth, infoKey, elm};
   const bool fast = core::isFastCall(0) && handle != nullptr && parent != nullptr && out != nullptr &&
-                    core::BlockBytes<core::AnyForm>::isOf(*handle) && isReadOnly(*handle);
+                    core::BlockBytes<core::AnyForm>::canRead(*handle) && isReadOnly(*handle);
   const uint32_t rc = fast ? findInBlock(*handle, wanted, parent, resume, stack, *out) : core::kNotHere;
   return rc != core::kNotHere ? rc : findTraced(handle, parent, wanted, resume, stack, out);
 }

@@ -129,7 +129,7 @@ uint32_t walkLevel(Walk& walk, const core::Node& parent, const core::Level& chil
 uint32_t walkBlock(Walk& walk)
 {
   core::Node node{};
-  while (core::BlockBytes<core::AnyForm>::isOf(walk.handle) && core::isFastCall(0))
+  while (core::BlockBytes<core::AnyForm>::canRead(walk.handle) && core::isFastCall(0))
   {
     const core::Node parent = core::nodeOf(walk.stack.pEntries[walk.stack.count - 1]);
     const core::Level level = core::levelBelow(parent);

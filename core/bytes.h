@@ -54,21 +54,43 @@ struct Place
   uint64_t room;
 };
 
+/// A size far from where sums would pass 64 bits.
+inline constexpr uint64_t kFarSize = ~uint64_t{0} / 4;
+
+/// Whether a block of `size` bytes has room for `length` bytes at `position`, and for `more` behind them. Its last byte
+/// is never used.
+[[gnu::always_inline]] inline bool hasRoom(uint64_t size, uint64_t position, uint64_t length, uint64_t more = 0)
+{
+  if (!takeRoom(size, length) || !takeRoom(size, more)) [[unlikely]]
+  {
+    return false;
+  }
+  return size > position;
+}
+
 /// A handle's direct block. Who walks keeps it in registers.
 template<class Form>
 struct BlockBytes
 {
+  static constexpr bool bare = Form::bare;
+
   explicit BlockBytes(const TAVHandle& handle)
       : form(handle), base(handle.pDirectData), size(handle.directDataSize)
   {
   }
 
-  /// Whether the handle has such bytes. A block that does not begin with the stream, which walks rarely see, is left to
-  /// the operations.
-  static bool isOf(const TAVHandle& handle)
+  /// Whether the handle has such bytes to write.
+  static bool canWrite(const TAVHandle& handle)
   {
     const bool direct = std::is_same_v<Form, HostForm> ? isHostWith(handle, TAV_OPT_DIRECT) : isDirect(handle);
-    return direct && handle.pDirectData != nullptr && handle.curOffset == 0;
+    return direct && handle.pDirectData != nullptr;
+  }
+
+  /// Whether it has them to read. A block that does not begin with the stream, which walks rarely see, is left to the
+  /// operations.
+  static bool canRead(const TAVHandle& handle)
+  {
+    return canWrite(handle) && handle.curOffset == 0;
   }
 
   /// Finds the header at an offset; false when it does not lie in the block.
@@ -81,6 +103,16 @@ struct BlockBytes
     }
     place = {offset, base + offset, room};
     return true;
+  }
+
+  /// Where `length` bytes at `position`, and `more` behind them, can be written; null where there is no room.
+  [[gnu::always_inline]] uint8_t* placeFor(uint64_t position, uint64_t length, uint64_t more) const
+  {
+    if (!hasRoom(size, position, length, more)) [[unlikely]]
+    {
+      return nullptr;
+    }
+    return base + position;
   }
 
   static bool holds(uint64_t dataSize, const Place& place)
@@ -110,15 +142,22 @@ struct BlockBytes
 template<class Form>
 struct RingBytes
 {
+  static constexpr bool bare = Form::bare;
+
   explicit RingBytes(const TAVHandle& handle)
       : form(handle), ring(*handle.pCircularBuf)
   {
   }
 
-  static bool isOf(const TAVHandle& handle)
+  static bool canRead(const TAVHandle& handle)
   {
     const bool buffered = std::is_same_v<Form, HostForm> ? isHostWith(handle, 0) : !isDirect(handle);
     return buffered && handle.pCircularBuf != nullptr;
+  }
+
+  static bool canWrite(const TAVHandle& handle)
+  {
+    return canRead(handle);
   }
 
   /// Finds the header at an offset; false when it is not cached in one run.
@@ -131,6 +170,16 @@ struct RingBytes
     }
     place = {offset, ring.pRing + index, room};
     return true;
+  }
+
+  /// Where bytes can be written that the ring caches in one run; their pages are marked then.
+  [[gnu::always_inline]] uint8_t* placeFor(uint64_t position, uint64_t length, uint64_t more) const
+  {
+    if (ring.storageWritable == 0 || more > kFarSize) [[unlikely]]
+    {
+      return nullptr;
+    }
+    return bare ? takeInPage(ring, position, length + more) : takeCachedRun(ring, position, length + more);
   }
 
   /// No data have a place only by the ring's own step.
@@ -155,7 +204,7 @@ struct RingBytes
   }
 
   [[no_unique_address]] Form form;
-  const TAVCircularBuf& ring;
+  TAVCircularBuf& ring;
 };
 
 } // namespace tav::core

@@ -15,6 +15,16 @@ namespace tav::core
 /// Never leaves the library: the fast way does not lead there.
 inline constexpr uint32_t kNotHere = ~uint32_t{0};
 
+/// A code that is surely another one: a call that ends the fast way can be a jump then.
+[[gnu::always_inline]] inline uint32_t isHere(uint32_t code)
+{
+  if (code == kNotHere)
+  {
+    __builtin_unreachable();
+  }
+  return code;
+}
+
 /// Whether a call may take the fast way: it has no options, and nothing is traced.
 inline bool isFastCall(uint64_t options)
 {

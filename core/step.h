@@ -68,7 +68,7 @@ template<bool Wide, class Bytes, class AnyNode>
 [[gnu::always_inline]] inline uint32_t findNext(const Bytes& bytes, const Level& level, bool first,
                                                 const AnyNode& reference, Place& place)
 {
-  if (!first && (isOpenHere(reference) || (bytes.form.bare && !isBare(reference)))) [[unlikely]]
+  if (!first && (isOpenHere(reference) || (Bytes::bare && !isBare(reference)))) [[unlikely]]
   {
     return kNotHere;
   }

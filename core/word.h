@@ -46,4 +46,68 @@ template<bool Wide>
   }
 }
 
+/// The fields of a header, loaded one by one: who fills a header stores them one by one, and a wide load straight
+/// afterwards, to which the compiler would join these, waits until those stores have left the store buffer.
+template<bool Wide>
+[[gnu::always_inline]] inline HeaderFields loadFields(const TAVHeader& header)
+{
+  if constexpr (Wide)
+  {
+    const volatile TAVHeader64& from = header.hdr64;
+    return {from.size, from.info, from.type, from.elm};
+  }
+  else
+  {
+    const volatile TAVHeader32& from = header.hdr32;
+    return {from.size, 0, from.type, from.elm};
+  }
+}
+
+/// A header's stream form in registers.
+template<bool Wide>
+class HeaderWords
+{
+public:
+  [[gnu::always_inline]] HeaderWords(const HeaderFields& fields, bool swap)
+  {
+    const HeaderFields turned = swap ? turn(fields) : fields;
+    const auto type = static_cast<uint64_t>(turned.type);
+    const auto elm = static_cast<uint64_t>(turned.elm);
+    if constexpr (Wide)
+    {
+      first_ = turned.size;
+      last_ = kor::isLittleEndian ? turned.info | type << 32 | elm << 48 : uint64_t{turned.info} << 32 | type << 16 | elm;
+    }
+    else
+    {
+      last_ = kor::isLittleEndian ? turned.size | type << 32 | elm << 48 : turned.size << 32 | type << 16 | elm;
+    }
+  }
+
+  [[gnu::always_inline]] void store(uint8_t* to) const
+  {
+    if constexpr (Wide)
+    {
+      std::memcpy(to, &first_, sizeof first_);
+#if defined(__GNUC__)
+      __asm__("" ::
+                  : "memory");
+#endif
+    }
+    std::memcpy(to + lengthOf() - sizeof last_, &last_, sizeof last_);
+  }
+
+private:
+  static constexpr uint64_t lengthOf() { return Wide ? kHeaderSize64 : kHeaderSize32; }
+
+  static HeaderFields turn(const HeaderFields& fields)
+  {
+    const uint64_t size = Wide ? kor::byteswap64(fields.size) : kor::byteswap32(static_cast<uint32_t>(fields.size));
+    return {size, kor::byteswap32(fields.info), kor::byteswap16(fields.type), kor::byteswap16(fields.elm)};
+  }
+
+  uint64_t first_ = 0;
+  uint64_t last_;
+};
+
 } // namespace tav::core
