@@ -39,16 +39,7 @@ uint32_t appendEndElement(TAVHandle& handle, uint64_t payloadBefore, bool wide)
 {
   EyeSizeBytes pair = encodeEyeSize(groupDistance(payloadBefore, wide), handle.swapBytes != 0);
   TAVHeaderData element{};
-  if (wide)
-  {
-    element.header.hdr64 = {kEyeSizeLength, 0, TAV_TYPE_BINARY, TAV_ELM_CMN_END_HDR_EYE_SIZE};
-    element.header.hdrType = TAV_HDR_64;
-  }
-  else
-  {
-    element.header.hdr32 = {static_cast<uint32_t>(kEyeSizeLength), TAV_TYPE_BINARY, TAV_ELM_CMN_END_HDR_EYE_SIZE};
-    element.header.hdrType = TAV_HDR_32;
-  }
+  element.header = endElement(wide, handle.alignMode == 1);
   element.pDataBuf = pair.data();
   element.dataBufSize = pair.size();
   return tavAddElement(0, &handle, &element);

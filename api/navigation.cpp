@@ -120,7 +120,7 @@ uint32_t tav::nextChildElsewhere(uint64_t options, TAVHandle* handle, TAVHeader*
   {
     rc = Block::canRead(*handle)  ? nextChildFast<Block>(*handle, *parent, refChild, *out)
          : Ring::canRead(*handle) ? nextChildFast<Ring>(*handle, *parent, refChild, *out)
-                               : core::kNotHere;
+                                  : core::kNotHere;
   }
   return rc != core::kNotHere ? rc : nextChildTraced(options, handle, parent, refChild, out);
 }

@@ -5,7 +5,6 @@
 #include <new>
 
 #include "api/printLeaves.h"
-#include "format/hdrStack.h"
 #include "format/layout.h"
 #include "kor/traceFrame.h"
 #include "tav/probes.h"

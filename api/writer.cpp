@@ -31,7 +31,9 @@ uint32_t checkNodeRoom(const TAVHandle& handle, const TAVHeader& header, uint64_
   {
     return TAV_RC_NO_MEMORY;
   }
-  const bool fits = hasRoom(handle, position, headerLength(header.hdrType), isGroup(header) ? 0 : sizeOf(header));
+  // A header of no known form, which is refused next, is taken for the longer one.
+  const uint64_t length = header.hdrType == TAV_HDR_32 ? kHeaderSize32 : kHeaderSize64;
+  const bool fits = hasRoom(handle, position, length, isGroup(header) ? 0 : sizeOf(header));
   return fits ? TAV_RC_OK : TAV_RC_END_OF_STORAGE;
 }
 

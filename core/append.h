@@ -61,8 +61,8 @@ inline void encodePayload(uint16_t type, bool swap, const uint8_t* payload, uint
   handle.streamBytes = position + length;
 }
 
-/// The end of an append with a payload that copySmall would call for: apart, and the append ends in a jump to it, so that
-/// others save no registers.
+/// The end of an append with a payload that copySmall would call for: apart, and the append ends in a jump to it, so
+/// that others save no registers.
 [[gnu::noinline]] inline uint32_t putLong(uint8_t* to, TAVHandle& handle, TAVHeaderData& node, const uint8_t* payload,
                                           uint64_t size, uint64_t length)
 {
@@ -186,8 +186,9 @@ template<bool Wide, class Bytes>
     return openGroup<Wide>(bytes, handle, node.header, fields);
   }
   const bool complete = node.dataBufSize >= fields.size || node.dataBufSize == 0;
-  return complete && node.pDataBuf != nullptr && fields.size <= kFarSize ? appendElement<Wide>(bytes, handle, node, fields)
-                                                                        : kNotHere;
+  return complete && node.pDataBuf != nullptr && fields.size <= kFarSize
+             ? appendElement<Wide>(bytes, handle, node, fields)
+             : kNotHere;
 }
 
 } // namespace tav::core

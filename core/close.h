@@ -1,5 +1,5 @@
-/// Closing the innermost group where the bytes are at hand: the fast way of tavCloseHeader. And what the operation shares
-/// with it.
+/// Closing the innermost group where the bytes are at hand: the fast way of tavCloseHeader. And what the operation
+/// shares with it.
 #pragma once
 
 #include <cstdint>

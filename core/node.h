@@ -101,8 +101,7 @@ constexpr uint64_t lengthOfHeader(bool wide)
 
 [[gnu::always_inline]] inline Node nodeOf(const TAVHeader& header)
 {
-  const bool wide = is64(header);
-  return {header.nodeOffset, {sizeOf(header), infoOf(header), typeOf(header), elmOf(header)}, wide};
+  return {header.nodeOffset, fieldsOf(header), is64(header)};
 }
 
 [[gnu::always_inline]] inline void toHeader(const Node& node, TAVHeader& header)

@@ -76,7 +76,8 @@ public:
     if constexpr (Wide)
     {
       first_ = turned.size;
-      last_ = kor::isLittleEndian ? turned.info | type << 32 | elm << 48 : uint64_t{turned.info} << 32 | type << 16 | elm;
+      last_ =
+          kor::isLittleEndian ? turned.info | type << 32 | elm << 48 : uint64_t{turned.info} << 32 | type << 16 | elm;
     }
     else
     {
@@ -98,7 +99,10 @@ public:
   }
 
 private:
-  static constexpr uint64_t lengthOf() { return Wide ? kHeaderSize64 : kHeaderSize32; }
+  static constexpr uint64_t lengthOf()
+  {
+    return Wide ? kHeaderSize64 : kHeaderSize32;
+  }
 
   static HeaderFields turn(const HeaderFields& fields)
   {

@@ -195,41 +195,4 @@ private:
   uint32_t code_ = TAV_RC_OK;
 };
 
-/// A frame without records, for a call that began while tracing was off and that calls nothing outside the library:
-/// nobody can tell it from one that asks before every record.
-class SilentFrame
-{
-public:
-  explicit SilentFrame(uint32_t /*probe*/) {}
-
-  template<class... Values>
-  void dump(uint32_t /*point*/, const Values&... /*values*/) const
-  {
-  }
-
-  [[nodiscard]] bool require(uint32_t point, bool holds, uint32_t code)
-  {
-    return holds || fail(point, code);
-  }
-
-  [[nodiscard]] bool step(uint32_t point, uint32_t code)
-  {
-    return code == TAV_RC_OK || fail(point, code);
-  }
-
-  bool fail(uint32_t /*point*/, uint32_t code)
-  {
-    code_ = code;
-    return false;
-  }
-
-  [[nodiscard]] uint32_t code() const
-  {
-    return code_;
-  }
-
-private:
-  uint32_t code_ = TAV_RC_OK;
-};
-
 } // namespace tav

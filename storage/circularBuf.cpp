@@ -14,7 +14,13 @@ using namespace tav;
 namespace
 {
 
+// What the allocator's records name as the caller.
 constexpr const char* kUnit = "tavCircularBuf";
+constexpr uint32_t kMakeRingLine = 156;
+constexpr uint32_t kMakeFlagsLine = 163;
+constexpr uint32_t kRefusedLine = 169;
+constexpr uint32_t kEndRingLine = 239;
+constexpr uint32_t kEndFlagsLine = 244;
 constexpr uint64_t kDefaultPageSize = 0x10000;
 constexpr uint64_t kSeekHint = 1;
 
@@ -63,11 +69,11 @@ uint32_t TAVCircularBuf::allocate()
   {
     ringSize = pageCount * pageSize;
     void* ring = nullptr;
-    uint32_t rc = korMemAlloc(&ring, 0, ringSize, KOR_MEM_PLAIN, kUnit, 156);
+    uint32_t rc = korMemAlloc(&ring, 0, ringSize, KOR_MEM_PLAIN, kUnit, kMakeRingLine);
     if (rc == TAV_RC_OK)
     {
       void* flags = nullptr;
-      rc = korMemAlloc(&flags, 0, 2 * pageCount, KOR_MEM_PLAIN, kUnit, 163);
+      rc = korMemAlloc(&flags, 0, 2 * pageCount, KOR_MEM_PLAIN, kUnit, kMakeFlagsLine);
       if (rc == TAV_RC_OK)
       {
         pRing = static_cast<uint8_t*>(ring);
@@ -75,7 +81,7 @@ uint32_t TAVCircularBuf::allocate()
         std::memset(pPageFlags, 0, 2 * pageCount);
         return TAV_RC_OK;
       }
-      korMemFree(&ring, 0, 0, kUnit, 169);
+      korMemFree(&ring, 0, 0, kUnit, kRefusedLine);
     }
     if (pageCount == 1)
     {
@@ -103,13 +109,13 @@ TAVCircularBuf::~TAVCircularBuf()
   if (pRing != nullptr)
   {
     void* ring = pRing;
-    korMemFree(&ring, 0, 0, kUnit, 239);
+    korMemFree(&ring, 0, 0, kUnit, kEndRingLine);
     pRing = nullptr;
   }
   if (pPageFlags != nullptr)
   {
     void* flags = pPageFlags;
-    korMemFree(&flags, 0, 0, kUnit, 244);
+    korMemFree(&flags, 0, 0, kUnit, kEndFlagsLine);
     pPageFlags = nullptr;
   }
 }
