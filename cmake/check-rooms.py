@@ -5,7 +5,7 @@
 
 Includes point one way: tools -> api -> core -> storage, dictionary -> format -> kor. The operating system, its headers and
 the byte order are kor's business, which has a file a platform: names that end in Posix or Windows. No other source
-asks for the platform, tests and examples included.
+asks for the platform, tests and examples included. What keeps a compiler from its work stands in one file.
 """
 import pathlib
 import re
@@ -54,6 +54,9 @@ PLATFORM_TEST = re.compile(
     r"__BYTE_ORDER__|__BYTE_ORDER|__ORDER_\w+_ENDIAN__|__(?:BIG|LITTLE)_ENDIAN__|WORDS_BIGENDIAN|"
     r"std::endian|htonl|htons|ntohl|ntohs|hto[bl]e(?:16|32|64)|[bl]e(?:16|32|64)toh)\b"
 )
+# Tricks with the compiler, and the one file of the libraries that may hold them.
+TRICK = re.compile(r"__asm__|\basm\b|gnu::used|\bconst volatile\b")
+TRICK_FILE = "core/word.h"
 COMMENT = re.compile(r"//.*$")
 
 
@@ -90,6 +93,9 @@ def check_text(name, text):
         return
     for number, line in enumerate(text.splitlines(), start=1):
         match = INCLUDE.match(line)
+        trick = TRICK.search(COMMENT.sub("", line))
+        if trick and name != TRICK_FILE:
+            yield number, f"{trick[0]}: tricks with the compiler stand in {TRICK_FILE}"
         if match:
             error = include_error(name, room, match["open"], match["path"])
             if error:
