@@ -2,6 +2,7 @@
 
 #include <algorithm>
 
+#include "api/printer.h"
 #include "dictionary/dictionary.h"
 
 namespace tav::print
@@ -88,14 +89,7 @@ uint64_t OutputBlock::addLong(size_t blanks, std::string_view text)
   {
     return 0;
   }
-  const size_t length = blanks + text.size();
-  const bool whole = blanks == 0 ? std::fwrite(text.data(), 1, length, stream_) == length
-                                 : std::fprintf(stream_, "%*s%.*s", static_cast<int>(blanks), "",
-                                                static_cast<int>(text.size()), text.data()) >= 0;
-  if (!whole)
-  {
-    return 0;
-  }
+  const uint64_t length = putInStream(stream_, blanks, text);
   taken_ += length;
   total_ += length;
   return length;

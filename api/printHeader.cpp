@@ -66,12 +66,12 @@ public:
   {
     if (xml_)
     {
-      lineOf(ctx_, {indentation(), "<", label.tag, ">\n"});
+      line(ctx_, {indentation(), "<", label.tag, ">\n"});
     }
     else
     {
-      lineOf(ctx_, {indentation(), label.text, "\n"});
-      lineOf(ctx_, {indentation(), "{\n"});
+      line(ctx_, {indentation(), label.text, "\n"});
+      line(ctx_, {indentation(), "{\n"});
     }
     ++level_;
   }
@@ -81,11 +81,11 @@ public:
     --level_;
     if (xml_)
     {
-      lineOf(ctx_, {indentation(), "</", label.tag, ">\n"});
+      line(ctx_, {indentation(), "</", label.tag, ">\n"});
     }
     else
     {
-      lineOf(ctx_, {indentation(), "}\n"});
+      line(ctx_, {indentation(), "}\n"});
     }
   }
 
@@ -93,11 +93,11 @@ public:
   {
     if (xml_)
     {
-      lineOf(ctx_, {indentation(), "<", label.tag, ">", value, "</", label.tag, ">\n"});
+      line(ctx_, {indentation(), "<", label.tag, ">", value, "</", label.tag, ">\n"});
     }
     else
     {
-      lineOf(ctx_, {indentation(), label.text, value, "\n"});
+      line(ctx_, {indentation(), label.text, value, "\n"});
     }
   }
 
@@ -115,7 +115,7 @@ public:
     }
     else
     {
-      lineOf(ctx_, {indentation(), label.text, Characters::decimal(code).view(), " ( ", name, " )\n"});
+      line(ctx_, {indentation(), label.text, Characters::decimal(code).view(), " ( ", name, " )\n"});
     }
   }
 

@@ -7,7 +7,7 @@
 
 using namespace tav;
 using tav::print::has;
-using tav::print::lineOf;
+using tav::print::line;
 using tav::print::piece;
 using tav::print::ReadyTag;
 
@@ -27,26 +27,29 @@ bool hasValue(const TAVHeaderData& node)
   return !isGroup(node.header) && sizeOf(node.header) != 0;
 }
 
-uint32_t dataText(TAVPrintCtx& ctx, TAVHeaderData& node)
+/// What stands where a node's data does; XML wraps it where anything else stands beside it.
+uint32_t printData(TAVPrintCtx& ctx, TAVHeaderData& node)
 {
   if (has(ctx, TAV_PRINT_DESCRIPTORS))
   {
     tav::print::descriptor(ctx, node);
   }
-  if (!hasValue(node))
+  const bool xml = has(ctx, TAV_PRINT_XML);
+  const bool value = hasValue(node);
+  const bool wrapped = xml ? has(ctx, TAV_PRINT_HEADERS | TAV_PRINT_DESCRIPTORS) : value;
+  if (wrapped)
   {
-    return TAV_RC_OK;
+    line(ctx, {xml ? "   <tavData>" : "   "});
   }
-  lineOf(ctx, {"   "});
-  const uint32_t rc = tavPrintValue(&ctx, &node);
-  if (rc == TAV_RC_OK)
+  const uint32_t rc = value ? tavPrintValue(&ctx, &node) : TAV_RC_OK;
+  if (rc == TAV_RC_OK && wrapped)
   {
-    piece(ctx, "\n");
+    piece(ctx, xml ? "</tavData>\n" : "\n");
   }
   return rc;
 }
 
-uint32_t bodyText(TAVPrintCtx& ctx, TAVHeaderData& node)
+uint32_t printBody(TAVPrintCtx& ctx, TAVHeaderData& node)
 {
   if (has(ctx, TAV_PRINT_BARE))
   {
@@ -56,54 +59,22 @@ uint32_t bodyText(TAVPrintCtx& ctx, TAVHeaderData& node)
   {
     tav::print::header(ctx, node.header);
   }
-  return has(ctx, TAV_PRINT_DATA) ? dataText(ctx, node) : TAV_RC_OK;
+  return has(ctx, TAV_PRINT_DATA) ? printData(ctx, node) : TAV_RC_OK;
 }
 
 uint32_t nodeText(TAVPrintCtx& ctx, TAVHeaderData& node, const Parts& parts)
 {
   if (parts.open)
   {
-    lineOf(ctx, {elementEnumName(elmOf(node.header)), "\n"});
-    lineOf(ctx, {"{\n"});
+    line(ctx, {elementEnumName(elmOf(node.header)), "\n"});
+    line(ctx, {"{\n"});
   }
-  const uint32_t rc = parts.body ? bodyText(ctx, node) : TAV_RC_OK;
+  const uint32_t rc = parts.body ? printBody(ctx, node) : TAV_RC_OK;
   if (rc == TAV_RC_OK && parts.close)
   {
-    lineOf(ctx, {"}\n"});
+    line(ctx, {"}\n"});
   }
   return rc;
-}
-
-uint32_t dataXml(TAVPrintCtx& ctx, TAVHeaderData& node)
-{
-  if (has(ctx, TAV_PRINT_DESCRIPTORS))
-  {
-    tav::print::descriptor(ctx, node);
-  }
-  const bool wrapped = has(ctx, TAV_PRINT_HEADERS | TAV_PRINT_DESCRIPTORS);
-  if (wrapped)
-  {
-    lineOf(ctx, {"   <tavData>"});
-  }
-  const uint32_t rc = hasValue(node) ? tavPrintValue(&ctx, &node) : TAV_RC_OK;
-  if (rc == TAV_RC_OK && wrapped)
-  {
-    piece(ctx, "</tavData>\n");
-  }
-  return rc;
-}
-
-uint32_t bodyXml(TAVPrintCtx& ctx, TAVHeaderData& node)
-{
-  if (has(ctx, TAV_PRINT_BARE))
-  {
-    return tavPrintValue(&ctx, &node);
-  }
-  if (has(ctx, TAV_PRINT_HEADERS))
-  {
-    tav::print::header(ctx, node.header);
-  }
-  return has(ctx, TAV_PRINT_DATA) ? dataXml(ctx, node) : TAV_RC_OK;
 }
 
 /// The tags of a node that is one line, when the block has them ready.
@@ -115,7 +86,7 @@ const ReadyTag* readyTag(const TAVPrintCtx& ctx, const TAVHeaderData& node, cons
 
 void openXml(TAVPrintCtx& ctx, const TAVHeaderData& node, const Parts& parts)
 {
-  lineOf(ctx, {"<", elementTagName(elmOf(node.header)), ">"});
+  line(ctx, {"<", elementTagName(elmOf(node.header)), ">"});
   if (!parts.close || has(ctx, TAV_PRINT_HEADERS))
   {
     piece(ctx, "\n");
@@ -127,7 +98,7 @@ void closeXml(TAVPrintCtx& ctx, const TAVHeaderData& node, const Parts& parts)
   const char* const tag = elementTagName(elmOf(node.header));
   if (has(ctx, TAV_PRINT_HEADERS) || (!parts.open && !parts.body))
   {
-    lineOf(ctx, {"</", tag, ">\n"});
+    line(ctx, {"</", tag, ">\n"});
   }
   else
   {
@@ -146,7 +117,7 @@ uint32_t nodeXml(TAVPrintCtx& ctx, TAVHeaderData& node, const Parts& parts)
   {
     openXml(ctx, node, parts);
   }
-  const uint32_t rc = parts.body ? bodyXml(ctx, node) : TAV_RC_OK;
+  const uint32_t rc = parts.body ? printBody(ctx, node) : TAV_RC_OK;
   if (rc != TAV_RC_OK || !parts.close)
   {
     return rc;
@@ -167,7 +138,7 @@ uint32_t nodeAttributes(TAVPrintCtx& ctx, TAVHeaderData& node, const Parts& part
   const char* const tag = elementTagName(elmOf(node.header));
   if (parts.open)
   {
-    lineOf(ctx, {"<", tag});
+    line(ctx, {"<", tag});
   }
   uint32_t rc = TAV_RC_OK;
   if (parts.body)

@@ -12,7 +12,6 @@
 using namespace tav;
 using tav::print::has;
 using tav::print::OutputBlock;
-using tav::print::setDepth;
 
 namespace
 {
@@ -31,7 +30,6 @@ void leaveBlock(TAVPrintCtx& ctx)
 {
   ctx.pBlock->handOver();
   ctx.pBlock = nullptr;
-  setDepth(ctx, ctx.depth);
 }
 
 /// Ends a node in the block. A trace that has begun may go where the output goes: then nothing is held back.
@@ -128,13 +126,13 @@ uint32_t leaveGroup(TAVPrintCtx& ctx, TAVHdrStack& stack, TAVHeaderData& closed)
 {
   closed = {};
   const uint32_t rc = stack.pop(&closed.header);
-  setDepth(ctx, ctx.depth - 1);
+  --ctx.depth;
   return rc == TAV_RC_OK ? printSome(ctx, closed, false, false, true) : rc;
 }
 
 uint32_t enterGroup(TAVPrintCtx& ctx, TAVHdrStack& stack, const TAVHeader& group)
 {
-  setDepth(ctx, ctx.depth + 1);
+  ++ctx.depth;
   return stack.push(&group);
 }
 
@@ -231,7 +229,7 @@ uint32_t printAll(TAVPrintCtx& ctx, TAVHandle* handle, TAVHeaderData& start)
 TAVPrintCtx* makeContext(uint64_t options, const TAVHandle* handle, const TAVPrintParam& param)
 {
   const uint8_t swapBytes = handle != nullptr ? handle->swapBytes : uint8_t{0};
-  return new (std::nothrow) TAVPrintCtx{param.pBuffer, param.bufferSize, param.pStream, 0, print::kNoIndent, 0,
+  return new (std::nothrow) TAVPrintCtx{param.pBuffer, param.bufferSize, param.pStream, 0, 0,
                                         swapBytes, options, 0, 0, nullptr};
 }
 
