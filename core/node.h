@@ -12,7 +12,8 @@ namespace tav::core
 {
 
 /// A node in registers, where a TAVHeader would live in memory: one handed over there would be stored field by field
-/// and loaded whole, which waits until the stores have left the store buffer. So the steps are inlined by force.
+/// and loaded whole, which waits until the stores have left the store buffer. So all that takes one is inlined by
+/// force.
 struct Node
 {
   uint64_t place;
@@ -28,8 +29,8 @@ struct Node
   [[nodiscard]] bool group() const { return isGroupType(fields.type); }
 };
 
-/// A node by the caller's header, of a form that is known. Each field is loaded where it is needed: a step over it
-/// needs few registers.
+/// A node by the caller's header, of a form that is known. Each field is loaded where it is needed, so that a step over
+/// it saves no register.
 template<bool Wide>
 struct NodeAt
 {
@@ -43,7 +44,7 @@ struct NodeAt
   static constexpr bool wide() { return Wide; }
 };
 
-/// A node by its header in the stream, likewise.
+/// The same by a header in the stream.
 template<bool Wide>
 struct NodeIn
 {
@@ -86,8 +87,8 @@ template<class AnyNode>
   return node.size() == (node.wide() ? TAV_SIZE_UNKNOWN : kSizeUnknown32);
 }
 
-/// Whether a node is open, for a step: where it is not looked at here, no sum takes 64 bits of ones, and the step says
-/// "not here" as well.
+/// Whether a node is open, for the fast way: it only looks where nothing else would tell. The sums of a step are past
+/// 64 bits for an open node with a 64-bit header, but the element that ends a group is asked for before them.
 template<class AnyNode>
 [[gnu::always_inline]] inline bool isOpenHere(const AnyNode& node)
 {
