@@ -2,8 +2,9 @@
 #include "api/addElement.h"
 
 using namespace tav;
+using namespace tav::inside;
 
-[[gnu::noinline]] uint32_t tav::addToRing(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
+[[gnu::noinline]] uint32_t tav::inside::addToRing(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
 {
   const uint32_t rc = addTo<core::RingBytes<core::HostForm>>(handle, headerData);
   return rc != core::kNotHere ? rc : addElsewhere(options, handle, headerData);

@@ -6,7 +6,7 @@
 
 #include "core/append.h"
 
-namespace tav
+namespace tav::inside
 {
 
 /// The fast way into the bytes of one kind, of a stream in host order, for a data element with a 64-bit header.
@@ -23,4 +23,4 @@ uint32_t addToRing(uint64_t options, TAVHandle* handle, TAVHeaderData* headerDat
 /// Every other append: into other bytes, of other nodes, or with records.
 uint32_t addElsewhere(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData);
 
-} // namespace tav
+} // namespace tav::inside

@@ -9,6 +9,7 @@
 #include "tav/probes.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {
@@ -47,26 +48,30 @@ uint32_t appendEndElement(TAVHandle& handle, uint64_t payloadBefore, bool wide)
 
 bool closeGroup32(TraceFrame& frame, TAVHandle& handle, TAVHeader& group)
 {
-  core::setSize(group, handle.streamBytes - group.nodeOffset - kHeaderSize32);
+  setSize(group, handle.streamBytes - group.nodeOffset - kHeaderSize32);
   return frame.step(50, patchSize(handle, group));
 }
 
-/// A group of unknown size whose size could not be written is still given an end that a reader can find. The close
-/// succeeds then, and the failure is told by its record alone.
+/// A group that was pushed with an unknown size is given an end that a reader can find when its size cannot be written.
+/// The close succeeds then, and the failure is told by its record alone. Any other size stands for what is below the
+/// group, so that failing to write it fails the close.
 bool closeGroup64(TraceFrame& frame, TAVHandle& handle, TAVHeader& group)
 {
   const bool wasUnknown = isSizeUnknown(group);
   const bool wide = hasChildren64(group);
   const uint64_t payload = handle.streamBytes - group.nodeOffset - kHeaderSize64;
-  core::setSize(group, payload + (hasEyeSize(group) ? endElementLength(wide) : 0));
+  setSize(group, payload + (hasEyeSize(group) ? endElementLength(wide) : 0));
   const uint32_t rc = patchSize(handle, group);
-  const bool needsEnd = hasEyeSize(group) || (rc != TAV_RC_OK && wasUnknown);
-  if (!needsEnd)
+  if (rc == TAV_RC_OK && !hasEyeSize(group))
   {
-    return frame.step(50, rc);
+    return true;
   }
   if (rc != TAV_RC_OK)
   {
+    if (!wasUnknown)
+    {
+      return frame.fail(50, rc);
+    }
     frame.report(50, rc);
   }
   return frame.step(60, appendEndElement(handle, payload, wide));

@@ -7,7 +7,7 @@
 
 #include "tav/byteOrder.h"
 
-namespace tav::digits
+namespace tav::inside::digits
 {
 
 /// Room that a number takes at most; what is written runs over its end, but not out of this.
@@ -95,4 +95,4 @@ inline char* writeHex(char* to, uint8_t byte)
   return to + 2;
 }
 
-} // namespace tav::digits
+} // namespace tav::inside::digits

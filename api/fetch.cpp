@@ -4,7 +4,7 @@
 
 #include "format/layout.h"
 
-namespace tav
+namespace tav::inside
 {
 namespace
 {
@@ -72,4 +72,4 @@ uint32_t fetchData(TAVCircularBuf& ring, uint64_t offset, uint64_t size, TAVCBUs
   return cut ? bringWhole(ring, offset, size, area) : rc;
 }
 
-} // namespace tav
+} // namespace tav::inside

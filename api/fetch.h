@@ -5,7 +5,7 @@
 
 #include "tav/tav.h"
 
-namespace tav
+namespace tav::inside
 {
 
 /// Copies `length` bytes at `offset`, from as many chunks as it takes.
@@ -35,4 +35,4 @@ inline bool isInDirectData(const TAVHandle& handle, uint64_t offset, uint64_t& r
   return offset >= handle.curOffset && relative <= handle.directDataSize;
 }
 
-} // namespace tav
+} // namespace tav::inside

@@ -2,11 +2,13 @@
 #include <cstring>
 #include <new>
 
+#include "api/ownedHandle.h"
 #include "kor/traceFrame.h"
 #include "tav/probes.h"
 #include "tav/tav.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {
@@ -107,9 +109,9 @@ void destroyHdrStack(TAVHandle& handle)
 uint32_t allocateHandle(TAVHandle** out)
 {
   void* block = nullptr;
-  const uint32_t rc = korMemAlloc(&block, 0, sizeof(TAVHandle), KOR_MEM_PLAIN, kUnit, kMakeLine);
+  const uint32_t rc = korMemAlloc(&block, 0, sizeof(OwnedHandle), KOR_MEM_PLAIN, kUnit, kMakeLine);
   // All of it is set: a trace shows the bytes between the fields, too.
-  *out = rc == TAV_RC_OK ? new (std::memset(block, 0, sizeof(TAVHandle))) TAVHandle : nullptr;
+  *out = rc == TAV_RC_OK ? &(new (std::memset(block, 0, sizeof(OwnedHandle))) OwnedHandle)->handle : nullptr;
   return rc;
 }
 
@@ -158,6 +160,7 @@ uint32_t tavTermHandle(TAVHandle** inout)
   frame.dump(100, "tav handle to be terminated", trace::record(&handle));
   destroyHdrStack(handle);
   destroyRing(handle);
+  forgetPairs(handle);
   freeHandle(inout, kEndLine);
   return frame.code();
 }
@@ -171,6 +174,7 @@ uint32_t tavResetHandle(TAVHandle* handle, TAVResetParam* resetParam)
     return frame.code();
   }
   frame.dump(30, handle, "Reset parameter structure", resetParam);
+  forgetPairs(*handle);
   handle->streamBytes = 0;
   handle->curOffset = 0;
   if (handle->pSideStorage->hasAttributes(TAV_ATTR_DIRECT))

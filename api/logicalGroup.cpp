@@ -1,11 +1,14 @@
 /// Following a path of groups.
+#include "api/ownedHandle.h"
 #include "api/rawWrite.h"
+#include "api/search.h"
 #include "api/walkGuard.h"
 #include "format/layout.h"
 #include "kor/traceFrame.h"
 #include "tav/probes.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {
@@ -15,7 +18,8 @@ class PathSearch
 {
 public:
   PathSearch(TAVHandle& handle, TAVHeader& parent, const TAVFindLogicalGroupParam& param)
-      : handle_(handle), parent_(parent), param_(param), guard_(parent)
+      : handle_(handle), parent_(parent), param_(param), guard_(parent), levels_(parent.nodeOffset, param.pathCount),
+        pairs_(handle)
   {
   }
 
@@ -32,6 +36,10 @@ public:
       if (rc == TAV_RC_OK)
       {
         rc = isGroup(found.header) ? descend(found.header) : skip(found.header);
+      }
+      else if (rc == TAV_RC_OUTSIDE_PARENT)
+      {
+        return rc;
       }
       else if (level_ != 0 || anyGroup_)
       {
@@ -53,8 +61,14 @@ private:
   uint32_t findAtLevel(const TAVPathEntry& entry, TAVHeaderData& found)
   {
     TAVHeader* const parent = level_ == 0 ? &parent_ : chain_.top();
-    return tavFindElmInt(&handle_, parent, 0, 0, entry.infoKey, entry.elm, resuming_ ? &resume_ : nullptr, &place_,
-                         &found);
+    const uint64_t from = resuming_ ? resume_.nodeOffset : parent->nodeOffset;
+    const uint64_t scannedBefore = pairs_.scanned();
+    uint64_t reached = from;
+    const uint32_t rc = findElement(&handle_, parent, {0, 0, entry.infoKey, entry.elm}, resuming_ ? &resume_ : nullptr,
+                                    &place_, &found, reached);
+    const bool mayGoOn = levels_.pass(from, reached) &&
+                         levels_.pass(pairs_.farthest() - (pairs_.scanned() - scannedBefore), pairs_.farthest());
+    return mayGoOn ? rc : TAV_RC_OUTSIDE_PARENT;
   }
 
   /// Goes on among the siblings: a path leads through groups only.
@@ -97,6 +111,8 @@ private:
   const TAVFindLogicalGroupParam& param_;
   TAVHdrStack chain_; ///< the groups matched, one a level
   WalkGuard guard_;   ///< of the groups entered
+  LevelGuard levels_; ///< of the levels searched, and of the scans for the ends of groups among them
+  const OwnPairs pairs_;
   TAVHdrStack place_; ///< of the present level's search: its parent
   TAVHeader resume_{};
   uint32_t level_ = 0;

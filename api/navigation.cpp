@@ -1,9 +1,12 @@
 /// Walking forward: first children and siblings.
 #include "api/nextChild.h"
+#include "api/openGroup.h"
+#include "api/ownedHandle.h"
 #include "kor/traceFrame.h"
 #include "tav/probes.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {
@@ -14,45 +17,6 @@ core::Level levelOfRoot(const TAVHandle& handle)
   uint64_t end = 0;
   static_cast<void>(handle.pSideStorage->getTotalSize(&end));
   return {0, end, (handle.options & TAV_OPT_ROOT32) == 0, true};
-}
-
-bool isSameOpenGroup(const TAVHeader& node, const TAVHeader& reference)
-{
-  return isGroup(node) && sizeOf(node) == sizeOf(reference) && node.nodeOffset == reference.nodeOffset;
-}
-
-/// The sibling after a group that was never closed: the node behind the eye catcher that leads back to the group.
-uint32_t readAfterOpenGroup(TAVHandle& handle, const TAVHeader& parent, const TAVHeader& reference, TAVHeaderData& out)
-{
-  for (uint64_t position = reference.nodeOffset;;)
-  {
-    uint64_t eyeOffset = 0;
-    uint64_t distance = 0;
-    bool swapped = false;
-    // The limit is the parent's size less an offset, not a distance: modulo 2^64, mostly no limit at all.
-    uint32_t rc = tavFindEyeSizeComboInt(&handle, position, sizeOf(parent) - position, true, &eyeOffset, &distance,
-                                         &swapped);
-    uint64_t offset = 0;
-    if (rc == TAV_RC_OK && !nodeBefore(eyeOffset, distance, offset))
-    {
-      rc = TAV_RC_NO_MEMORY;
-    }
-    TAVHeaderData node{};
-    if (rc == TAV_RC_OK)
-    {
-      rc = tavReadNodeInt(0, &handle, offset, true, &node);
-    }
-    if (rc != TAV_RC_OK)
-    {
-      return rc;
-    }
-    if (isSameOpenGroup(node.header, reference))
-    {
-      constexpr uint64_t afterPair = 0x4;
-      return tavFindNodeFromIndex(afterPair, &handle, eyeOffset, 0, &out);
-    }
-    position = eyeOffset + kEyeSizeLength;
-  }
 }
 
 [[gnu::noinline]] uint32_t nextChildTraced(uint64_t options, TAVHandle* handle, TAVHeader* parent, TAVHeader* refChild,
@@ -69,6 +33,8 @@ uint32_t readAfterOpenGroup(TAVHandle& handle, const TAVHeader& parent, const TA
     return frame.code();
   }
   const bool sibling = parent != nullptr && refChild != nullptr;
+  const bool inAnswer = parent == &out->header || refChild == &out->header;
+  const TAVHeader before = out->header;
   bool found = false;
   if (sibling && isSizeUnknown(*refChild))
   {
@@ -78,6 +44,10 @@ uint32_t readAfterOpenGroup(TAVHandle& handle, const TAVHeader& parent, const TA
   }
   else
   {
+    if (parent == nullptr)
+    {
+      forgetPairs(*handle); // a walk begins anew, perhaps over other bytes
+    }
     const core::Level level = parent != nullptr ? core::levelBelow(core::nodeOf(*parent)) : levelOfRoot(*handle);
     uint64_t start = 0;
     const core::Node reference = sibling ? core::nodeOf(*refChild) : core::Node{};
@@ -87,6 +57,10 @@ uint32_t readAfterOpenGroup(TAVHandle& handle, const TAVHeader& parent, const TA
   if (found)
   {
     frame.dump(100, trace::record(out));
+  }
+  else if (inAnswer)
+  {
+    out->header = before; // reading may have put parts of the child there
   }
   return frame.code();
 }
@@ -109,8 +83,8 @@ uint32_t nextChildFast(TAVHandle& handle, const TAVHeader& parent, const TAVHead
 
 } // namespace
 
-uint32_t tav::nextChildElsewhere(uint64_t options, TAVHandle* handle, TAVHeader* parent, TAVHeader* refChild,
-                                 TAVHeaderData* out)
+uint32_t tav::inside::nextChildElsewhere(uint64_t options, TAVHandle* handle, TAVHeader* parent, TAVHeader* refChild,
+                                         TAVHeaderData* out)
 {
   using Block = core::BlockBytes<core::AnyForm>;
   using Ring = core::RingBytes<core::AnyForm>;

@@ -2,16 +2,17 @@
 #include "api/nextChild.h"
 
 using namespace tav;
+using namespace tav::inside;
 
-[[gnu::noinline]] uint32_t tav::nextChildFirst(uint64_t options, TAVHandle* handle, TAVHeader* parent,
-                                               TAVHeader* refChild, TAVHeaderData* out)
+[[gnu::noinline]] uint32_t tav::inside::nextChildFirst(uint64_t options, TAVHandle* handle, TAVHeader* parent,
+                                                       TAVHeader* refChild, TAVHeaderData* out)
 {
   const uint32_t rc = nextChildIn<true, core::BlockBytes<core::HostForm>>(handle, parent, refChild, out);
   return rc != core::kNotHere ? rc : nextChildElsewhere(options, handle, parent, refChild, out);
 }
 
-[[gnu::noinline]] uint32_t tav::nextChildInRing(uint64_t options, TAVHandle* handle, TAVHeader* parent,
-                                                TAVHeader* refChild, TAVHeaderData* out)
+[[gnu::noinline]] uint32_t tav::inside::nextChildInRing(uint64_t options, TAVHandle* handle, TAVHeader* parent,
+                                                        TAVHeader* refChild, TAVHeaderData* out)
 {
   const uint32_t rc = nextChildIn<false, core::RingBytes<core::HostForm>>(handle, parent, refChild, out);
   return rc != core::kNotHere ? rc : nextChildElsewhere(options, handle, parent, refChild, out);

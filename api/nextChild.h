@@ -7,7 +7,7 @@
 #include "api/rawWrite.h"
 #include "core/step.h"
 
-namespace tav
+namespace tav::inside
 {
 
 /// The fast way over the bytes of one kind, of a stream in host order whose children have 64-bit headers.
@@ -32,4 +32,4 @@ uint32_t nextChildInRing(uint64_t options, TAVHandle* handle, TAVHeader* parent,
 uint32_t nextChildElsewhere(uint64_t options, TAVHandle* handle, TAVHeader* parent, TAVHeader* refChild,
                             TAVHeaderData* out);
 
-} // namespace tav
+} // namespace tav::inside

@@ -4,6 +4,7 @@
 #include "tav/tav.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {
@@ -18,6 +19,7 @@ TAVInitParam::TAVInitParam()
       auxSize(kDefaultAuxBytes), byteOrder(0), alignMode(0)
 {
   const TraceFrame frame(probe::initParam);
+  frame.dump(100, trace::record(this));
 }
 
 TAVInitParam::TAVInitParam(TAVSideStorage* storage, uint64_t optionBits)
@@ -26,6 +28,7 @@ TAVInitParam::TAVInitParam(TAVSideStorage* storage, uint64_t optionBits)
 {
   const TraceFrame frame(probe::initParam);
   frame.dump(0, "Side storage object and options", trace::record(storage), options);
+  frame.dump(100, trace::record(this));
 }
 
 TAVInitParam::TAVInitParam(TAVSideStorage* storage, uint64_t optionBits, uint64_t ringBytes, uint64_t auxBytes,
@@ -37,6 +40,7 @@ TAVInitParam::TAVInitParam(TAVSideStorage* storage, uint64_t optionBits, uint64_
   frame.dump(0, options, circularBufSize, auxSize);
   frame.dump(1, "Side storage object", byteOrder, alignMode);
   frame.dump(2, trace::record(storage));
+  frame.dump(100, trace::record(this));
 }
 
 TAVInitParam::~TAVInitParam()
@@ -47,6 +51,7 @@ TAVInitParam::~TAVInitParam()
 uint32_t TAVInitParam::getVersion() const
 {
   const TraceFrame frame(probe::initParamVersion);
+  frame.dump(100, version);
   return version;
 }
 
@@ -54,6 +59,7 @@ TAVResetParam::TAVResetParam()
     : version(TAV_STRUCT_VERSION), options(0)
 {
   const TraceFrame frame(probe::resetParam);
+  frame.dump(100, trace::record(this));
 }
 
 TAVResetParam::~TAVResetParam()
@@ -64,5 +70,6 @@ TAVResetParam::~TAVResetParam()
 uint32_t TAVResetParam::getVersion() const
 {
   const TraceFrame frame(probe::resetParamVersion);
+  frame.dump(100, version);
   return version;
 }

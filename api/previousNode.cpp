@@ -8,6 +8,7 @@
 #include "tav/probes.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {
@@ -44,12 +45,21 @@ uint32_t readPairBefore(TAVHandle& handle, uint64_t nodeOffset, EyeSize& pair)
   return rc;
 }
 
+/// The reference may be in the descriptor that the answer goes to; a failure leaves it there.
 uint32_t readNodeBefore(TAVHandle& handle, const TAVHeader& reference, const EyeSize& pair, TAVHeaderData& out)
 {
   uint64_t offset = 0;
-  return nodeBefore(reference.nodeOffset - kEyeSizeLength, pair.distance, offset)
-             ? tavReadNodeInt(0, &handle, offset, is64(reference), &out)
-             : TAV_RC_NO_MEMORY;
+  if (!nodeBefore(reference.nodeOffset - kEyeSizeLength, pair.distance, offset))
+  {
+    return TAV_RC_NO_MEMORY;
+  }
+  const TAVHeader before = reference;
+  const uint32_t rc = tavReadNodeInt(0, &handle, offset, is64(reference), &out);
+  if (rc != TAV_RC_OK && &reference == &out.header)
+  {
+    out.header = before;
+  }
+  return rc;
 }
 
 } // namespace

@@ -5,7 +5,7 @@
 #include "api/printer.h"
 #include "dictionary/dictionary.h"
 
-namespace tav::print
+namespace tav::inside::print
 {
 namespace
 {
@@ -95,4 +95,4 @@ uint64_t OutputBlock::addLong(size_t blanks, std::string_view text)
   return length;
 }
 
-} // namespace tav::print
+} // namespace tav::inside::print

@@ -8,7 +8,7 @@
 #include <cstring>
 #include <string_view>
 
-namespace tav::print
+namespace tav::inside::print
 {
 
 inline constexpr int64_t kBlanksPerLevel = 3;
@@ -167,4 +167,4 @@ private:
   std::array<uint16_t, kSize + kSize / 2> ends_; ///< where each piece ends; of three together one may be empty
 };
 
-} // namespace tav::print
+} // namespace tav::inside::print

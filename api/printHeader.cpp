@@ -6,7 +6,7 @@
 #include "dictionary/dictionary.h"
 #include "format/layout.h"
 
-namespace tav::print
+namespace tav::inside::print
 {
 namespace
 {
@@ -132,4 +132,4 @@ void descriptor(TAVPrintCtx& ctx, const TAVHeaderData& node)
   fields.value("dataBufOffset", 13, decimal(node.dataBufOffset));
 }
 
-} // namespace tav::print
+} // namespace tav::inside::print

@@ -3,7 +3,7 @@
 #include "api/printValue.h"
 #include "core/step.h"
 
-namespace tav::print
+namespace tav::inside::print
 {
 namespace
 {
@@ -122,4 +122,4 @@ bool printLeaves(TAVPrintCtx& ctx, const TAVHandle& handle, const TAVHeader& par
   return run.count != 0;
 }
 
-} // namespace tav::print
+} // namespace tav::inside::print

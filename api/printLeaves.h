@@ -4,7 +4,7 @@
 #include "api/printer.h"
 #include "api/walkGuard.h"
 
-namespace tav::print
+namespace tav::inside::print
 {
 
 /// Prints into the context's block the data elements that follow `*previous` in a group, or that begin it when
@@ -17,4 +17,4 @@ namespace tav::print
 bool printLeaves(TAVPrintCtx& ctx, const TAVHandle& handle, const TAVHeader& parent, const TAVHeader* previous,
                  WalkGuard& guard, TAVHeader& last);
 
-} // namespace tav::print
+} // namespace tav::inside::print

@@ -6,10 +6,11 @@
 #include "tav/probes.h"
 
 using namespace tav;
-using tav::print::has;
-using tav::print::line;
-using tav::print::piece;
-using tav::print::ReadyTag;
+using namespace tav::inside;
+using tav::inside::print::has;
+using tav::inside::print::line;
+using tav::inside::print::piece;
+using tav::inside::print::ReadyTag;
 
 namespace
 {
@@ -32,7 +33,7 @@ uint32_t printData(TAVPrintCtx& ctx, TAVHeaderData& node)
 {
   if (has(ctx, TAV_PRINT_DESCRIPTORS))
   {
-    tav::print::descriptor(ctx, node);
+    tav::inside::print::descriptor(ctx, node);
   }
   const bool xml = has(ctx, TAV_PRINT_XML);
   const bool value = hasValue(node);
@@ -57,7 +58,7 @@ uint32_t printBody(TAVPrintCtx& ctx, TAVHeaderData& node)
   }
   if (has(ctx, TAV_PRINT_HEADERS))
   {
-    tav::print::header(ctx, node.header);
+    tav::inside::print::header(ctx, node.header);
   }
   return has(ctx, TAV_PRINT_DATA) ? printData(ctx, node) : TAV_RC_OK;
 }

@@ -4,8 +4,9 @@
 #include <new>
 
 #include "api/printer.h"
+#include "kor/lineBuffered.h"
 
-using namespace tav::print;
+using namespace tav::inside::print;
 
 namespace
 {
@@ -25,6 +26,33 @@ uint64_t putInBuffer(TAVPrintCtx& ctx, size_t blanks, std::string_view text)
   std::copy_n(text.data(), count - before, ctx.pBuffer + before);
   ctx.pBuffer[count] = '\0';
   return count;
+}
+
+/// A stream that pads by itself takes blanks a few at a time.
+bool writeBlanks(FILE* stream, size_t blanks)
+{
+  constexpr size_t most = 512;
+  std::array<char, most> some;
+  some.fill(' ');
+  while (blanks != 0)
+  {
+    const size_t length = std::min(blanks, most);
+    if (std::fwrite(some.data(), 1, length, stream) != length)
+    {
+      return false;
+    }
+    blanks -= length;
+  }
+  return true;
+}
+
+/// Whether a stream takes a piece. Of one that ends a line fwrite counts all also when the line is refused, and such a
+/// piece has no NUL.
+bool writeWhole(FILE* stream, std::string_view text)
+{
+  return text.ends_with('\n') && tav::kor::isLineBuffered(stream)
+             ? std::fprintf(stream, "%.*s", static_cast<int>(text.size()), text.data()) >= 0
+             : std::fwrite(text.data(), 1, text.size(), stream) == text.size();
 }
 
 } // namespace
@@ -52,7 +80,7 @@ uint64_t tavPrintf(TAVPrintCtx* ctx, const char* format, ...)
   return text != nullptr && length >= 0 ? put(*ctx, 0, {text, static_cast<size_t>(length)}) : 0;
 }
 
-namespace tav::print
+namespace tav::inside::print
 {
 
 FILE* streamOf(const TAVPrintCtx& ctx)
@@ -62,12 +90,7 @@ FILE* streamOf(const TAVPrintCtx& ctx)
 
 uint64_t putInStream(FILE* stream, size_t blanks, std::string_view text)
 {
-  const size_t length = blanks + text.size();
-  // A stream without a buffer of its own takes blanks and text as one, too.
-  const bool whole = blanks == 0 ? std::fwrite(text.data(), 1, length, stream) == length
-                                 : std::fprintf(stream, "%*s%.*s", static_cast<int>(blanks), "",
-                                                static_cast<int>(text.size()), text.data()) >= 0;
-  return whole ? length : 0;
+  return writeBlanks(stream, blanks) && writeWhole(stream, text) ? blanks + text.size() : 0;
 }
 
 uint64_t put(TAVPrintCtx& ctx, size_t blanks, std::string_view text)
@@ -103,4 +126,4 @@ void line(TAVPrintCtx& ctx, std::initializer_list<std::string_view> parts)
   put(ctx, static_cast<size_t>(ctx.depth * kBlanksPerLevel), {text.data(), static_cast<size_t>(end - text.data())});
 }
 
-} // namespace tav::print
+} // namespace tav::inside::print

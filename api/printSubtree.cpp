@@ -4,14 +4,17 @@
 #include <memory>
 #include <new>
 
+#include "api/ownedHandle.h"
 #include "api/printLeaves.h"
 #include "format/layout.h"
+#include "kor/lineBuffered.h"
 #include "kor/traceFrame.h"
 #include "tav/probes.h"
 
 using namespace tav;
-using tav::print::has;
-using tav::print::OutputBlock;
+using namespace tav::inside;
+using tav::inside::print::has;
+using tav::inside::print::OutputBlock;
 
 namespace
 {
@@ -61,7 +64,7 @@ uint32_t printSome(TAVPrintCtx& ctx, TAVHeaderData& node, bool open, bool body, 
 }
 
 /// The key elements of a group, each as an attribute.
-uint32_t printKeys(TAVPrintCtx& ctx, TAVHandle& handle, TAVHeader& group)
+uint32_t printKeys(TAVPrintCtx& ctx, TAVHandle& handle, TAVHeader& group, ChildGuard& guard)
 {
   std::array<TAVHeaderData, 2> slots{};
   TAVHeader* previous = nullptr;
@@ -72,6 +75,10 @@ uint32_t printKeys(TAVPrintCtx& ctx, TAVHandle& handle, TAVHeader& group)
     if (rc == TAV_RC_NO_MORE_CHILDREN)
     {
       return TAV_RC_OK;
+    }
+    if (rc == TAV_RC_OK && !guard.visit(child.header.nodeOffset))
+    {
+      rc = TAV_RC_OUTSIDE_PARENT;
     }
     if (rc == TAV_RC_OK && isAmong(kKeyElements, elmOf(child.header)))
     {
@@ -87,13 +94,13 @@ uint32_t printKeys(TAVPrintCtx& ctx, TAVHandle& handle, TAVHeader& group)
 
 /// A group's opening with its keys as attributes. Its children, the keys among them, are walked afterwards all the
 /// same.
-uint32_t printWithKeys(TAVPrintCtx& ctx, TAVHandle& handle, TAVHeaderData& group)
+uint32_t printWithKeys(TAVPrintCtx& ctx, TAVHandle& handle, TAVHeaderData& group, ChildGuard& guard)
 {
   ctx.attributeForm = 1;
   uint32_t rc = printSome(ctx, group, true, false, false);
   if (rc == TAV_RC_OK)
   {
-    rc = printKeys(ctx, handle, group.header);
+    rc = printKeys(ctx, handle, group.header, guard);
   }
   TAVHeaderData again{};
   if (rc == TAV_RC_OK)
@@ -113,12 +120,12 @@ uint32_t printWithKeys(TAVPrintCtx& ctx, TAVHandle& handle, TAVHeaderData& group
   return rc;
 }
 
-uint32_t printChild(TAVPrintCtx& ctx, TAVHandle& handle, TAVHeaderData& child)
+uint32_t printChild(TAVPrintCtx& ctx, TAVHandle& handle, TAVHeaderData& child, ChildGuard& keys)
 {
   const bool group = isGroup(child.header);
   const bool keyed = group && has(ctx, TAV_PRINT_XML) && has(ctx, TAV_PRINT_ATTRIBUTES) &&
                      isAmong(kKeyedGroups, elmOf(child.header));
-  return keyed ? printWithKeys(ctx, handle, child) : printSome(ctx, child, true, true, !group);
+  return keyed ? printWithKeys(ctx, handle, child, keys) : printSome(ctx, child, true, true, !group);
 }
 
 /// Leaves the innermost group and prints its closing; `closed` receives its header.
@@ -142,6 +149,8 @@ uint32_t walk(TAVPrintCtx& ctx, TAVHandle& handle, TAVHdrStack& stack)
   TAVHeader* previous = nullptr;
   TAVHeader passed{};
   WalkGuard guard(stack.pEntries[0]);
+  ChildGuard keys(stack.pEntries[0]);
+  const OwnPairs pairs(handle);
   for (size_t current = 0; stack.count != 0; current ^= 1U)
   {
     if (ctx.pBlock != nullptr &&
@@ -162,7 +171,7 @@ uint32_t walk(TAVPrintCtx& ctx, TAVHandle& handle, TAVHdrStack& stack)
     }
     else if (rc == TAV_RC_OK)
     {
-      rc = guard.visit(child.header.nodeOffset) ? printChild(ctx, handle, child) : TAV_RC_OUTSIDE_PARENT;
+      rc = guard.visit(child.header.nodeOffset) ? printChild(ctx, handle, child, keys) : TAV_RC_OUTSIDE_PARENT;
       if (rc == TAV_RC_OK && isGroup(child.header))
       {
         rc = enterGroup(ctx, stack, child.header);
@@ -207,7 +216,9 @@ uint32_t printBelow(TAVPrintCtx& ctx, TAVHandle* handle, const TAVHeader& start)
     return rc;
   }
   const bool toBuffer = ctx.pStream == nullptr && ctx.pBuffer != nullptr;
-  return toBuffer || tracing() ? walk(ctx, *handle, *stack) : walkInBlocks(ctx, *handle, *stack);
+  // Which lines a line-buffered stream refuses can only be told when they go out one by one.
+  const bool alone = toBuffer || tracing() || kor::isLineBuffered(print::streamOf(ctx));
+  return alone ? walk(ctx, *handle, *stack) : walkInBlocks(ctx, *handle, *stack);
 }
 
 uint32_t printAll(TAVPrintCtx& ctx, TAVHandle* handle, TAVHeaderData& start)

@@ -9,9 +9,10 @@
 #include "tav/probes.h"
 
 using namespace tav;
-using tav::print::kUnboundedText;
-using tav::print::shortPiece;
-using tav::print::Value;
+using namespace tav::inside;
+using tav::inside::print::kUnboundedText;
+using tav::inside::print::shortPiece;
+using tav::inside::print::Value;
 
 namespace
 {
@@ -102,6 +103,7 @@ uint32_t tavPrintValue(TAVPrintCtx* ctx, TAVHeaderData* node)
       frame.require(70, print::isSizeOfType(type, value.size()), TAV_RC_OUTSIDE_PARENT))
   {
     printByType(*ctx, *node, value);
+    frame.dump(100, ctx->bytesWritten);
   }
   return frame.code();
 }

@@ -10,7 +10,7 @@
 #include "format/layout.h"
 #include "tav/tav.h"
 
-namespace tav::print
+namespace tav::inside::print
 {
 
 inline constexpr uint64_t kUnboundedText = uint64_t{1} << 63U; ///< a text of this size ends at its NUL
@@ -139,4 +139,4 @@ inline char* writePart(char* to, char mark, uint16_t number)
   }
 }
 
-} // namespace tav::print
+} // namespace tav::inside::print

@@ -23,7 +23,7 @@ struct TAVPrintCtx
   uint8_t attributeForm; ///< the node in hand is printed as an opening tag with attributes
   uint8_t further;       ///< not used
 
-  tav::print::OutputBlock* pBlock = nullptr; ///< collects what goes to a stream; null: every piece goes out at once
+  tav::inside::print::OutputBlock* pBlock = nullptr; ///< collects for a stream; null: every piece goes out at once
 };
 
 /// Formats one piece of output to the stream, the buffer or standard output and returns its characters. In a buffer
@@ -38,7 +38,7 @@ uint32_t tavPrintValue(TAVPrintCtx* ctx, TAVHeaderData* node);
 uint32_t tavPrintNode(TAVPrintCtx* ctx, TAVHeaderData* node, uint8_t open, uint8_t body, uint8_t close,
                       uint64_t* count);
 
-namespace tav::print
+namespace tav::inside::print
 {
 
 inline bool has(const TAVPrintCtx& ctx, uint64_t option)
@@ -82,4 +82,4 @@ void shortPiece(TAVPrintCtx& ctx, const Write& write)
   piece(ctx, {place.data(), static_cast<size_t>(write(place.data()) - place.data())});
 }
 
-} // namespace tav::print
+} // namespace tav::inside::print

@@ -7,7 +7,7 @@
 #include "kor/traceFrame.h"
 #include "tav/probes.h"
 
-namespace tav
+namespace tav::inside
 {
 
 uint32_t rawWrite(TAVHandle& handle, uint64_t& position, const void* bytes, uint64_t length)
@@ -17,21 +17,26 @@ uint32_t rawWrite(TAVHandle& handle, uint64_t& position, const void* bytes, uint
   if (isDirect(handle))
   {
     if (frame.require(20, handle.pDirectData != nullptr, TAV_RC_NO_MEMORY) &&
-        frame.require(30, hasRoom(handle, position, length), TAV_RC_END_OF_STORAGE) && length != 0)
+        frame.require(30, hasRoom(handle, position, length), TAV_RC_END_OF_STORAGE))
     {
-      std::memmove(handle.pDirectData + position, bytes, length); // the bytes may lie in the block themselves
-      position += length;
+      if (length != 0)
+      {
+        std::memmove(handle.pDirectData + position, bytes, length); // the bytes may lie in the block themselves
+        position += length;
+      }
+      frame.dump(100, position);
     }
     return frame.code();
   }
-  if (frame.require(10, handle.pCircularBuf != nullptr, TAV_RC_NO_CIRCULAR_BUF) && length != 0 &&
-      frame.step(40, handle.pCircularBuf->write(position, bytes, length, false)))
+  if (frame.require(10, handle.pCircularBuf != nullptr, TAV_RC_NO_CIRCULAR_BUF) &&
+      (length == 0 || frame.step(40, handle.pCircularBuf->write(position, bytes, length, false))))
   {
-    if (handle.pCircularBuf->isCached(position))
+    if (length != 0 && handle.pCircularBuf->isCached(position))
     {
       handle.pCircularBuf->markPages(position, length);
     }
     position += length;
+    frame.dump(100, position);
   }
   return frame.code();
 }
@@ -77,8 +82,8 @@ uint32_t validateChild(TAVHandle& handle, const TAVHeader& child)
     static_cast<void>(frame.require(10, governing == TAV_TYPE_HEADER32, TAV_RC_BAD_CHILD_HDR));
     break;
   case TAV_HDR_64:
-    static_cast<void>(frame.require(
-        20, parent != nullptr ? governing != TAV_TYPE_HEADER32 : isGroupType(governing), TAV_RC_BAD_CHILD_HDR));
+    static_cast<void>(frame.require(20, parent != nullptr ? hasChildren64(*parent) : isGroupType(governing),
+                                    TAV_RC_BAD_CHILD_HDR));
     break;
   default:
     static_cast<void>(frame.fail(30, TAV_RC_BAD_PARAM));
@@ -86,4 +91,4 @@ uint32_t validateChild(TAVHandle& handle, const TAVHeader& child)
   return frame.code();
 }
 
-} // namespace tav
+} // namespace tav::inside

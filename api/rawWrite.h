@@ -11,7 +11,7 @@
 #include "tav/byteOrder.h"
 #include "tav/tav.h"
 
-namespace tav
+namespace tav::inside
 {
 
 using core::isDirect;
@@ -33,7 +33,8 @@ uint32_t writePayload(TAVHandle& handle, uint64_t& position, uint16_t type, cons
 /// The innermost open group; null when there is none or the handle keeps none.
 TAVHeader* openGroup(TAVHandle& handle);
 
-/// Whether a child may stand under the open group, or as a root where there is none.
+/// Whether a child may stand under the open group, or as a root where there is none. A group with a 32-bit header takes
+/// no child with a 64-bit one, whatever its type says: no reader would find it.
 uint32_t validateChild(TAVHandle& handle, const TAVHeader& child);
 
-} // namespace tav
+} // namespace tav::inside

@@ -4,24 +4,17 @@
 #include <new>
 
 #include "api/rawWrite.h"
+#include "api/search.h"
 #include "core/stack.h"
 #include "core/step.h"
 #include "kor/traceFrame.h"
 #include "tav/probes.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {
-
-/// What tavFindElmInt looks for.
-struct Wanted
-{
-  uint32_t minDepth;
-  uint32_t maxDepth;
-  uint16_t infoKey;
-  uint32_t elm;
-};
 
 bool matches(const Wanted& wanted, const core::Node& node, uint64_t depth)
 {
@@ -37,7 +30,7 @@ bool matches(const Wanted& wanted, const core::Node& node, uint64_t depth)
 /// Looks through one level, from after `previous` on. A group on the way is entered by pushing it, and the caller gets
 /// control back; nothing climbs out of a group again, so a failed step means that nothing was found.
 uint32_t searchLevel(TAVHandle& handle, const Wanted& wanted, TAVHeader* previous, TAVHdrStack& stack,
-                     TAVHeaderData& out)
+                     TAVHeaderData& out, uint64_t& reached)
 {
   std::array<TAVHeaderData, 2> nodes{};
   for (size_t current = 0;; current ^= 1U)
@@ -47,6 +40,7 @@ uint32_t searchLevel(TAVHandle& handle, const Wanted& wanted, TAVHeader* previou
     {
       return TAV_RC_NOT_FOUND;
     }
+    reached = node.header.nodeOffset;
     if (matches(wanted, core::nodeOf(node.header), stack.count))
     {
       out = node;
@@ -63,7 +57,7 @@ uint32_t searchLevel(TAVHandle& handle, const Wanted& wanted, TAVHeader* previou
 /// Looks through one level of the direct block as searchLevel does. Without a stack the level is the first.
 template<bool Wide>
 uint32_t searchBlock(TAVHandle& handle, const core::Level& children, const Wanted& wanted, const TAVHeader* previous,
-                     TAVHdrStack* stack, TAVHeaderData& out)
+                     TAVHdrStack* stack, TAVHeaderData& out, uint64_t& reached)
 {
   const core::BlockBytes<core::AnyForm> bytes(handle);
   const core::Level level = children;
@@ -78,6 +72,7 @@ uint32_t searchBlock(TAVHandle& handle, const core::Level& children, const Wante
     const uint32_t rc = core::step<Wide>(bytes, level, first, node, place);
     if (rc != TAV_RC_OK) [[unlikely]]
     {
+      reached = first ? reached : node.place;
       return rc == TAV_RC_NO_MORE_CHILDREN ? TAV_RC_NOT_FOUND : core::kNotHere;
     }
     if (node.fields.elm == elm && matches(wanted, node, depth)) [[unlikely]]
@@ -86,6 +81,7 @@ uint32_t searchBlock(TAVHandle& handle, const core::Level& children, const Wante
       {
         out.header.hdr64 = {}; // of which a 32-bit header fills a half
       }
+      reached = node.place;
       return core::handOut<Wide>(bytes, handle, place, out);
     }
     if (!shallow && node.group()) [[unlikely]]
@@ -100,7 +96,7 @@ uint32_t searchBlock(TAVHandle& handle, const core::Level& children, const Wante
 /// The search over direct memory while nothing is traced: no call leaves the library, and where the caller wants no
 /// stack there is none. `kNotHere` leaves the stack as it was.
 uint32_t findInBlock(TAVHandle& handle, const Wanted& wanted, const TAVHeader* parent, const TAVHeader* resume,
-                     TAVHdrStack* stack, TAVHeaderData& out)
+                     TAVHdrStack* stack, TAVHeaderData& out, uint64_t& reached)
 {
   const bool pushed = stack != nullptr && resume == nullptr;
   if ((resume != nullptr && (stack == nullptr || stack->count == 0)) || (pushed && !core::push(*stack, *parent)))
@@ -109,8 +105,8 @@ uint32_t findInBlock(TAVHandle& handle, const Wanted& wanted, const TAVHeader* p
   }
   const TAVHeader& group = stack != nullptr ? stack->pEntries[stack->count - 1] : *parent;
   const core::Level level = core::levelBelow(core::nodeOf(group));
-  const uint32_t rc = level.wide ? searchBlock<true>(handle, level, wanted, resume, stack, out)
-                                 : searchBlock<false>(handle, level, wanted, resume, stack, out);
+  const uint32_t rc = level.wide ? searchBlock<true>(handle, level, wanted, resume, stack, out, reached)
+                                 : searchBlock<false>(handle, level, wanted, resume, stack, out, reached);
   if (rc == core::kNotHere && pushed)
   {
     --stack->count;
@@ -120,7 +116,7 @@ uint32_t findInBlock(TAVHandle& handle, const Wanted& wanted, const TAVHeader* p
 
 /// The search with its records, and over a circular buffer.
 [[gnu::noinline]] uint32_t findTraced(TAVHandle* handle, TAVHeader* parent, const Wanted& wanted, TAVHeader* resume,
-                                      TAVHdrStack* stack, TAVHeaderData* out)
+                                      TAVHdrStack* stack, TAVHeaderData* out, uint64_t& reached)
 {
   TraceFrame frame(probe::findElement);
   frame.dump(0, handle, trace::record(parent), wanted.minDepth, wanted.maxDepth, wanted.infoKey, wanted.elm,
@@ -139,7 +135,7 @@ uint32_t findInBlock(TAVHandle& handle, const Wanted& wanted, const TAVHeader* p
   if (frame.require(40, stack != nullptr, TAV_RC_NO_HDR_STACK) &&
       (resume == nullptr ? frame.step(50, stack->push(parent))
                          : frame.require(60, stack->count != 0, TAV_RC_BAD_PARAM)) &&
-      frame.step(70, searchLevel(*handle, wanted, resume, *stack, *out)))
+      frame.step(70, searchLevel(*handle, wanted, resume, *stack, *out, reached)))
   {
     frame.dump(100, trace::record(out));
   }
@@ -148,12 +144,18 @@ uint32_t findInBlock(TAVHandle& handle, const Wanted& wanted, const TAVHeader* p
 
 } // namespace
 
+uint32_t tav::inside::findElement(TAVHandle* handle, TAVHeader* parent, const Wanted& wanted, TAVHeader* resume,
+                                  TAVHdrStack* stack, TAVHeaderData* out, uint64_t& reached)
+{
+  const bool fast = core::isFastCall(0) && handle != nullptr && parent != nullptr && out != nullptr &&
+                    core::BlockBytes<core::AnyForm>::canRead(*handle) && isReadOnly(*handle);
+  const uint32_t rc = fast ? findInBlock(*handle, wanted, parent, resume, stack, *out, reached) : core::kNotHere;
+  return rc != core::kNotHere ? rc : findTraced(handle, parent, wanted, resume, stack, out, reached);
+}
+
 uint32_t tavFindElmInt(TAVHandle* handle, TAVHeader* parent, uint32_t minDepth, uint32_t maxDepth, uint16_t infoKey,
                        uint32_t elm, TAVHeader* resume, TAVHdrStack* stack, TAVHeaderData* out)
 {
-  const Wanted wanted{minDepth, maxDepth, infoKey, elm};
-  const bool fast = core::isFastCall(0) && handle != nullptr && parent != nullptr && out != nullptr &&
-                    core::BlockBytes<core::AnyForm>::canRead(*handle) && isReadOnly(*handle);
-  const uint32_t rc = fast ? findInBlock(*handle, wanted, parent, resume, stack, *out) : core::kNotHere;
-  return rc != core::kNotHere ? rc : findTraced(handle, parent, wanted, resume, stack, out);
+  uint64_t reached = 0;
+  return findElement(handle, parent, {minDepth, maxDepth, infoKey, elm}, resume, stack, out, reached);
 }

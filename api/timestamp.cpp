@@ -6,6 +6,7 @@
 #include "tav/tav.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {

@@ -3,6 +3,7 @@
 #include <memory>
 #include <new>
 
+#include "api/ownedHandle.h"
 #include "api/rawWrite.h"
 #include "api/walkGuard.h"
 #include "core/stack.h"
@@ -11,6 +12,7 @@
 #include "tav/probes.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {
@@ -167,6 +169,7 @@ uint32_t walkBlock(Walk& walk)
 
 uint32_t walkBelow(uint64_t options, TAVHandle& handle, TAVHdrStack& stack)
 {
+  const OwnPairs pairs(handle);
   Walk walk(options, handle, stack);
   return isDirect(handle) && isReadOnly(handle) ? walkBlock(walk) : walkTraced(walk);
 }

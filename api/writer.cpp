@@ -9,6 +9,7 @@
 #include "tav/probes.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {
@@ -166,7 +167,7 @@ uint32_t addFast(TAVHandle& handle, TAVHeaderData& node)
 
 } // namespace
 
-uint32_t tav::addElsewhere(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
+uint32_t tav::inside::addElsewhere(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
 {
   uint32_t rc = core::kNotHere;
   if (core::isFastCall(options) && handle != nullptr && headerData != nullptr)

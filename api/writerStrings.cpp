@@ -5,6 +5,7 @@
 #include "tav/probes.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {
@@ -16,16 +17,17 @@ bool isStringType(uint16_t type, uint16_t codePage)
   return (type == TAV_TYPE_ASCII_STRING && codePage == TAV_CODE_PAGE_ASCII) || type == TAV_TYPE_UTF8_STRING;
 }
 
-void countCodePage(TAVHeader& header)
+/// Counts the code page in a string's size; false, with the size as it is, where the size has no room for it.
+bool countCodePage(TAVHeader& header)
 {
-  if (is64(header))
+  const uint64_t most = is64(header) ? ~uint64_t{0} : ~uint32_t{0};
+  const uint64_t size = sizeOf(header);
+  if (size > most - kCodePageLength)
   {
-    header.hdr64.size += kCodePageLength;
+    return false;
   }
-  else
-  {
-    header.hdr32.size += static_cast<uint32_t>(kCodePageLength);
-  }
+  setSize(header, size + kCodePageLength);
+  return true;
 }
 
 uint32_t writeCodePage(TAVHandle& handle, uint64_t& position, uint16_t codePage)
@@ -65,6 +67,12 @@ uint32_t writeText(TAVHandle& handle, const TAVHeader& header, uint64_t& positio
   return rc;
 }
 
+/// Whether the children of a group have headers of this kind. Below a 32-bit header there is no 64-bit one.
+bool takesKind(const TAVHeader& group, uint32_t hdrKind)
+{
+  return typeOf(group) == hdrKind && (hdrKind == TAV_HDR_32 || is64(group));
+}
+
 } // namespace
 
 uint32_t tavAddString(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData, uint16_t codePage)
@@ -84,9 +92,10 @@ uint32_t tavAddString(uint64_t options, TAVHandle* handle, TAVHeaderData* header
   {
     return frame.code();
   }
-  if (utf8)
+  const uint64_t size = sizeOf(header);
+  if (!frame.require(55, !utf8 || countCodePage(header), TAV_RC_BAD_PARAM))
   {
-    countCodePage(header);
+    return frame.code();
   }
   uint64_t position = handle->streamBytes;
   if (frame.step(60, tavWriteNodeInt(options, handle, &header, &position, nullptr, 0)) &&
@@ -94,6 +103,10 @@ uint32_t tavAddString(uint64_t options, TAVHandle* handle, TAVHeaderData* header
   {
     handle->streamBytes = position;
     frame.dump(100, position);
+  }
+  else
+  {
+    setSize(header, size); // which the same call counts again
   }
   return frame.code();
 }
@@ -112,7 +125,7 @@ uint32_t tavAddStream(uint64_t options, TAVHandle* handle, uint32_t hdrKind, uin
   }
   const TAVHeader* const group = openGroup(*handle);
   uint64_t position = handle->streamBytes;
-  if (frame.require(60, group != nullptr && typeOf(*group) == hdrKind, TAV_RC_BAD_CHILD_HDR) &&
+  if (frame.require(60, group != nullptr && takesKind(*group, hdrKind), TAV_RC_BAD_CHILD_HDR) &&
       frame.step(70, rawWrite(*handle, position, bytes, length)))
   {
     handle->streamBytes = position;

@@ -16,6 +16,7 @@ function(tav_add_library name)
     LINKER_LANGUAGE CXX
     VERSION ${TAV_ABI_VERSION}.${PROJECT_VERSION}
     SOVERSION ${TAV_ABI_VERSION})
+  tav_harden(${name})
   if(TAV_LIBRARY_TYPE STREQUAL "STATIC")
     string(TOUPPER ${name} upper)
     target_compile_definitions(${name} PUBLIC ${upper}_STATIC)
@@ -38,10 +39,6 @@ tav_add_library(kor kor)
 target_link_libraries(kor PRIVATE Threads::Threads)
 tav_add_library(tav format storage dictionary api)
 target_link_libraries(tav PUBLIC kor)
-# Where the pair is installed together, libtav finds libkor beside itself, wherever the prefix was moved to.
-if(UNIX AND NOT APPLE AND NOT DEFINED CMAKE_INSTALL_RPATH)
-  set_target_properties(tav PROPERTIES INSTALL_RPATH "$ORIGIN")
-endif()
 
 if(TAV_BUILD_TESTS OR TAV_BUILD_BENCH)
   set(objects)

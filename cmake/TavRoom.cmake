@@ -22,4 +22,5 @@ function(tav_add_room room)
     CXX_VISIBILITY_PRESET hidden
     VISIBILITY_INLINES_HIDDEN ON
     POSITION_INDEPENDENT_CODE ON)
+  tav_harden(${room}_objects)
 endfunction()

@@ -11,7 +11,7 @@ quietly() { "$@" >"$work/log" 2>&1 || { cat "$work/log"; return 1; }; }
 
 # The compiler by the name that preset release calls it by: then a compiler cache has all objects already.
 quietly cmake -S . -B "$build" -G Ninja -DCMAKE_CXX_COMPILER=g++ -DCMAKE_BUILD_TYPE=Release -DCMAKE_INSTALL_PREFIX=/usr \
-  -DCMAKE_SKIP_INSTALL_RPATH=ON -DTAV_BUILD_TESTS=OFF -DTAV_BUILD_EXAMPLES=OFF -DTAV_COMPRESS_MANUAL=ON
+  -DTAV_BUILD_TESTS=OFF -DTAV_BUILD_EXAMPLES=OFF -DTAV_COMPRESS_MANUAL=ON
 quietly cmake --build "$build" --parallel "$(nproc)"
 quietly cpack --config "$build/CPackConfig.cmake" -B "$work/packages"
 mapfile -t packages < <(find "$work/packages" -maxdepth 1 -name '*.deb' | sort)
@@ -28,8 +28,18 @@ dpkg_here() { dpkg --root="$root" --log=/dev/null --force-depends --force-not-ro
 quietly dpkg_here --install "${packages[@]}"
 libraries=$(dirname "$(find "$root/usr/lib" -name 'libtav.so.1')")
 
+echo "== hardened"
+# What Debian's own builds are given for it, the build has, too.
+for flag in $(DEB_BUILD_MAINT_OPTIONS=hardening=+all dpkg-buildflags --export=cmdline | grep -oE -e '-(fstack-protector|fcf-protection|fstack-clash|D_FORTIFY_SOURCE|Wformat|Werror=format)[^ "]*|-Wl,-z,[a-z]+' | sort -u); do
+  grep -qF -e "$flag" "$build/build.ninja" || { echo "dpkg-buildflags has $flag, the build has not"; exit 1; }
+done
+tests/install/hardening.py "$root/usr/bin/tav" "$libraries"/lib{kor,tav}.so.1
+
 echo "== run"
 LD_LIBRARY_PATH=$libraries "$root/usr/bin/tav" --version
+for page in $(LD_LIBRARY_PATH=$libraries "$root/usr/bin/tav" help json | grep -oE '[[:alnum:]/._-]+\.md'); do
+  [[ -s $root/usr/$page ]] || { echo "the package has no $page"; exit 1; }
+done
 read -ra flags <<<"$(PKG_CONFIG_PATH=$libraries/pkgconfig pkg-config --cflags --libs tav)"
 g++ -std=c++20 tests/install/outside/main.cpp -o "$work/outside" "${flags[@]}"
 LD_LIBRARY_PATH=$libraries "$work/outside"

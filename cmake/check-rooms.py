@@ -6,6 +6,9 @@
 Includes point one way: tools -> api -> core -> storage, dictionary -> format -> kor. The operating system, its headers and
 the byte order are kor's business, which has a file a platform: names that end in Posix or Windows. No other source
 asks for the platform, tests and examples included. What keeps a compiler from its work stands in one file.
+
+Names in `tav` itself are those of the installed headers: what stays inside the library is in `tav::inside`, and the
+steps are in `tav::core`.
 """
 import pathlib
 import re
@@ -34,6 +37,9 @@ PLATFORM_FILE = re.compile(r"^kor/(\w+(Posix|Windows)\.cpp|windows\.h)$")
 BESIDE = ("tests", "examples", "bench", "fuzz")
 # Libraries of others that a room may use.
 THIRD_PARTY = {"tools": ("CLI/", "nlohmann/")}
+
+# A namespace of the users' own names, in a source that is not installed.
+USERS_NAMESPACE = re.compile(r"^\s*namespace\s+tav\s*(\{|$)")
 
 STANDARD = set(
     """algorithm any array atomic barrier bit bitset cassert cctype cerrno cfenv cfloat charconv chrono cinttypes
@@ -100,6 +106,8 @@ def check_text(name, text):
             error = include_error(name, room, match["open"], match["path"])
             if error:
                 yield number, error
+        elif room != "include" and USERS_NAMESPACE.match(line):
+            yield number, "names in tav itself are those of the installed headers; these belong into tav::inside"
         elif not knows_platform(name):
             found = PLATFORM_TEST.search(COMMENT.sub("", line))
             if found:

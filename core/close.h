@@ -27,16 +27,6 @@ inline uint64_t encodeGroupSize(uint64_t size, bool wide, bool swap, uint8_t* to
   return sizeof word;
 }
 
-inline void setSize(TAVHeader& group, uint64_t size)
-{
-  if (is64(group))
-  {
-    group.hdr64.size = size;
-    return;
-  }
-  group.hdr32.size = static_cast<uint32_t>(size);
-}
-
 /// The bytes between a group's header and the write offset.
 inline uint64_t payloadOf(const TAVHandle& handle, const TAVHeader& group)
 {

@@ -11,6 +11,7 @@
 
 namespace tav::core
 {
+using namespace inside;
 
 /// Never leaves the library: the fast way does not lead there.
 inline constexpr uint32_t kNotHere = ~uint32_t{0};

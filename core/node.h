@@ -10,6 +10,7 @@
 
 namespace tav::core
 {
+using namespace inside;
 
 /// A node in registers, where a TAVHeader would live in memory: one handed over there would be stored field by field
 /// and loaded whole, which waits until the stores have left the store buffer. So all that takes one is inlined by

@@ -9,12 +9,13 @@
 #include <cstdint>
 #include <cstring>
 
+#include "format/layout.h"
 #include "tav/byteOrder.h"
-#include "tav/layout.hpp"
 #include "tav/tav.h"
 
 namespace tav::core
 {
+using namespace inside;
 
 /// Whether the stream is in host order and unpadded, and the options, which stand before both flags, hold no bit but
 /// `option` and the first 16. Options above the known ones are not told apart on every machine.

@@ -29,7 +29,7 @@ struct TAVElementRange
   const TAVElementEntry* pEntries;
 };
 
-namespace tav
+namespace tav::inside
 {
 
 /// Ranges in the directory, without the all-zero record that closes it.
@@ -85,4 +85,4 @@ EnumName elementEnumName(uint16_t id);
 /// The tag name of an id, kUnknownElement when it has no entry. The string lives for ever.
 const char* elementTagName(uint16_t id);
 
-} // namespace tav
+} // namespace tav::inside

@@ -5,7 +5,7 @@
 
 #include <algorithm>
 
-namespace tav
+namespace tav::inside
 {
 
 EnumName::EnumName(std::string_view text)
@@ -25,4 +25,4 @@ EnumName EnumName::fromTag(const char* tagName)
   return name;
 }
 
-} // namespace tav
+} // namespace tav::inside

@@ -2,7 +2,7 @@
 /// From an element id to its entry: the range by comparisons, then the entry within the range.
 #include "dictionary/dictionary.h"
 
-namespace tav
+namespace tav::inside
 {
 namespace
 {
@@ -118,4 +118,4 @@ const char* elementTagName(uint16_t id)
   return entry != nullptr ? tagNameOf(*entry) : kUnknownElement;
 }
 
-} // namespace tav
+} // namespace tav::inside

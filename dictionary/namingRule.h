@@ -5,7 +5,7 @@
 #include <cstddef>
 #include <string_view>
 
-namespace tav
+namespace tav::inside
 {
 
 inline constexpr std::string_view kEnumNamePrefix = "SQLM_ELM_";
@@ -31,4 +31,4 @@ constexpr bool followsFromTag(std::string_view enumName, std::string_view tagNam
   return true;
 }
 
-} // namespace tav
+} // namespace tav::inside

@@ -8,7 +8,7 @@
 #include <iterator>
 #include <string_view>
 
-namespace tav
+namespace tav::inside
 {
 namespace
 {
@@ -163,4 +163,4 @@ const char* tagNameOf(const TAVElementEntry& entry)
   return kTable.strings.data() + entry.tagNamePlace;
 }
 
-} // namespace tav
+} // namespace tav::inside

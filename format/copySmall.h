@@ -6,19 +6,21 @@
 #include <cstdint>
 #include <cstring>
 
-namespace tav
+namespace tav::inside
 {
 
 /// The leading and the last bytes of a run of `Size` to 2 * `Size` bytes, which overlap in the middle.
+/// By the compiler's own memcpy: the checked one of a hardened build has nothing to check here, where both sizes are
+/// one constant, but makes g++ 12 call for every copy: 15 instructions more for each element that is written.
 template<size_t Size>
 void copyEnds(uint8_t* to, const uint8_t* from, uint64_t length)
 {
   std::array<uint8_t, Size> first;
   std::array<uint8_t, Size> last;
-  std::memcpy(first.data(), from, Size);
-  std::memcpy(last.data(), from + length - Size, Size);
-  std::memcpy(to, first.data(), Size);
-  std::memcpy(to + length - Size, last.data(), Size);
+  __builtin_memcpy(first.data(), from, Size);
+  __builtin_memcpy(last.data(), from + length - Size, Size);
+  __builtin_memcpy(to, first.data(), Size);
+  __builtin_memcpy(to + length - Size, last.data(), Size);
 }
 
 /// The longest run that copySmall copies itself.
@@ -55,4 +57,4 @@ inline constexpr uint64_t kLongestSmall = 32;
   }
 }
 
-} // namespace tav
+} // namespace tav::inside

@@ -4,7 +4,7 @@
 
 #include "format/eyeSearch.h"
 
-namespace tav
+namespace tav::inside
 {
 namespace
 {
@@ -55,4 +55,4 @@ const uint8_t* EyeMatcher::follow(const uint8_t* at, const uint8_t* end)
   return at;
 }
 
-} // namespace tav
+} // namespace tav::inside

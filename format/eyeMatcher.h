@@ -5,7 +5,7 @@
 
 #include "format/layout.h"
 
-namespace tav
+namespace tav::inside
 {
 
 /// Follows eye catchers of both byte orders through a run of bytes that may come in pieces. A byte that breaks a
@@ -35,4 +35,4 @@ private:
   uint64_t reversed_ = 0;
 };
 
-} // namespace tav
+} // namespace tav::inside

@@ -3,7 +3,7 @@
 #include <cstddef>
 #include <cstring>
 
-namespace tav
+namespace tav::inside
 {
 namespace
 {
@@ -133,4 +133,4 @@ const uint8_t* findEyeOnAnyProcessor(const uint8_t* at, const uint8_t* end)
   return find(at, end);
 }
 
-} // namespace tav
+} // namespace tav::inside

@@ -7,7 +7,7 @@
 
 #include "format/layout.h"
 
-namespace tav
+namespace tav::inside
 {
 
 using EyeBytes = std::array<uint8_t, kEyeLength>;
@@ -24,4 +24,4 @@ const uint8_t* findEye(const uint8_t* at, const uint8_t* end);
 /// As `findEye`, with no more than what every processor of the kind that the library is built for can do.
 const uint8_t* findEyeOnAnyProcessor(const uint8_t* at, const uint8_t* end);
 
-} // namespace tav
+} // namespace tav::inside

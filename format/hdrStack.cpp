@@ -4,7 +4,7 @@
 #include "tav/probes.h"
 #include "tav/tav.h"
 
-namespace tav
+namespace tav::inside
 {
 namespace
 {
@@ -18,9 +18,10 @@ constexpr uint32_t kEndLine = 93;
 constexpr uint32_t kGrowLine = 117;
 
 } // namespace
-} // namespace tav
+} // namespace tav::inside
 
 using namespace tav;
+using namespace tav::inside;
 
 TAVHdrStack::TAVHdrStack()
     : pEntries(nullptr), capacity(0), count(0)
@@ -33,6 +34,7 @@ TAVHdrStack::TAVHdrStack()
     pEntries = static_cast<TAVHeader*>(block);
     capacity = kFirstCapacity;
   }
+  frame.dump(100, capacity);
 }
 
 TAVHdrStack::~TAVHdrStack()
@@ -67,6 +69,7 @@ uint32_t TAVHdrStack::grow()
       std::memcpy(block, pEntries, capacity * sizeof(TAVHeader));
     }
     capacity += kIncrement;
+    frame.dump(100, capacity);
   }
   return frame.code();
 }
@@ -93,9 +96,11 @@ TAVHeader* TAVHdrStack::top()
 uint32_t TAVHdrStack::pop()
 {
   TraceFrame frame(probe::hdrStackPop);
+  frame.dump(0, count);
   if (frame.require(10, count != 0, TAV_RC_NO_MEMORY))
   {
     --count;
+    frame.dump(100, count);
   }
   return frame.code();
 }
@@ -103,9 +108,11 @@ uint32_t TAVHdrStack::pop()
 uint32_t TAVHdrStack::pop(TAVHeader* out)
 {
   TraceFrame frame(probe::hdrStackPopCopy);
+  frame.dump(0, out, count);
   if (frame.require(10, out != nullptr, TAV_RC_BAD_PARAM) && frame.require(20, count != 0, TAV_RC_NO_MEMORY))
   {
     *out = pEntries[--count];
+    frame.dump(100, trace::record(out), count);
   }
   return frame.code();
 }

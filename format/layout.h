@@ -3,7 +3,19 @@
 
 #include "tav/layout.hpp"
 
-namespace tav
+namespace tav::inside
 {
 using namespace layout;
-} // namespace tav
+
+/// Sets the size that a header says, in the width of its form.
+inline void setSize(TAVHeader& header, uint64_t size)
+{
+  if (is64(header))
+  {
+    header.hdr64.size = size;
+    return;
+  }
+  header.hdr32.size = static_cast<uint32_t>(size);
+}
+
+} // namespace tav::inside

@@ -153,3 +153,34 @@ uint32_t KORHFile::getSize(uint64_t* pSize)
   if (native_ == kNoFile) return KOR_RC_NOT_OPEN;
   return sizeNative(native_, *pSize);
 }
+
+uint32_t KORHFile::setSize(uint64_t size)
+{
+  if (size > static_cast<uint64_t>(INT64_MAX)) return TAV_RC_BAD_PARAM;
+  return native_ == kNoFile ? KOR_RC_NOT_OPEN : setSizeNative(native_, static_cast<int64_t>(size));
+}
+
+uint32_t KORHFile::sync()
+{
+  return native_ == kNoFile ? KOR_RC_NOT_OPEN : syncNative(native_);
+}
+
+uint32_t KORHFile::copyRights(const KORHFile& from)
+{
+  const bool open = native_ != kNoFile && from.native_ != kNoFile;
+  return open ? copyRightsNative(from.native_, native_) : KOR_RC_NOT_OPEN;
+}
+
+bool KORHFile::isAt(const char* pPath) const
+{
+  return native_ != kNoFile && pPath != nullptr && isAtNative(native_, pPath);
+}
+
+uint32_t KORHFile::replaceBy(const char* pFrom, const char* pPath)
+{
+  if (pFrom == nullptr || pPath == nullptr) return TAV_RC_BAD_PARAM;
+  if (kOpenFileHoldsName && native_ != kNoFile) close();
+  const uint32_t code = renameNative(pFrom, pPath);
+  if (code == TAV_RC_OK && native_ != kNoFile) close(); // nobody reaches it by the path any more
+  return code;
+}

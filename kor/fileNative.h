@@ -45,4 +45,13 @@ uint32_t lockNative(intptr_t file, bool exclusive, bool wait, bool held);
 uint32_t unlockNative(intptr_t file);
 
 uint32_t sizeNative(intptr_t file, uint64_t& size);
+uint32_t setSizeNative(intptr_t file, int64_t size);
+uint32_t syncNative(intptr_t file);
+uint32_t copyRightsNative(intptr_t from, intptr_t to);
+bool isAtNative(intptr_t file, const char* pPath);
+
+/// Whether a file keeps its name from being given to another one for as long as it is open.
+extern const bool kOpenFileHoldsName;
+/// Renames a file, over one that is there.
+uint32_t renameNative(const char* pFrom, const char* pTo);
 } // namespace tav::kor

@@ -1,4 +1,5 @@
 #include <cerrno>
+#include <cstdio>
 #include <fcntl.h>
 #include <sys/file.h>
 #include <sys/stat.h>
@@ -133,5 +134,41 @@ uint32_t sizeNative(intptr_t file, uint64_t& size)
   if (end < 0 || ::lseek(descriptor(file), here, SEEK_SET) != here) return codeOfSystemError(errno);
   size = static_cast<uint64_t>(end);
   return TAV_RC_OK;
+}
+
+uint32_t setSizeNative(intptr_t file, int64_t size)
+{
+  return uninterrupted([&] { return ::ftruncate(descriptor(file), size); }) == 0 ? TAV_RC_OK : codeOfSystemError(errno);
+}
+
+uint32_t syncNative(intptr_t file)
+{
+  return uninterrupted([&] { return ::fsync(descriptor(file)); }) == 0 ? TAV_RC_OK : codeOfSystemError(errno);
+}
+
+uint32_t copyRightsNative(intptr_t from, intptr_t to)
+{
+  struct stat status = {};
+  if (::fstat(descriptor(from), &status) != 0) return codeOfSystemError(errno);
+  // The owner first: giving a file away takes the set-id bits from it.
+  const bool owned = ::fchown(descriptor(to), status.st_uid, status.st_gid) == 0;
+  if (!owned) static_cast<void>(::fchown(descriptor(to), static_cast<uid_t>(-1), status.st_gid) == 0);
+  const mode_t mode = status.st_mode & (owned ? 07777U : 0777U);
+  return ::fchmod(descriptor(to), mode) == 0 ? TAV_RC_OK : codeOfSystemError(errno);
+}
+
+bool isAtNative(intptr_t file, const char* pPath)
+{
+  struct stat open = {};
+  struct stat there = {};
+  return ::fstat(descriptor(file), &open) == 0 && ::stat(pPath, &there) == 0 && open.st_dev == there.st_dev &&
+         open.st_ino == there.st_ino;
+}
+
+const bool kOpenFileHoldsName = false;
+
+uint32_t renameNative(const char* pFrom, const char* pTo)
+{
+  return std::rename(pFrom, pTo) == 0 ? TAV_RC_OK : codeOfSystemError(errno);
 }
 } // namespace tav::kor

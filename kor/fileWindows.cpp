@@ -143,4 +143,51 @@ uint32_t sizeNative(intptr_t file, uint64_t& size)
   size = static_cast<uint64_t>(bytes.QuadPart);
   return TAV_RC_OK;
 }
+
+uint32_t setSizeNative(intptr_t file, int64_t size)
+{
+  FILE_END_OF_FILE_INFO end{};
+  end.EndOfFile.QuadPart = size;
+  return SetFileInformationByHandle(handleOf(file), FileEndOfFileInfo, &end, sizeof end)
+             ? TAV_RC_OK
+             : codeOfSystemError(GetLastError());
+}
+
+uint32_t syncNative(intptr_t file)
+{
+  return FlushFileBuffers(handleOf(file)) ? TAV_RC_OK : codeOfSystemError(GetLastError());
+}
+
+uint32_t copyRightsNative(intptr_t /*from*/, intptr_t /*to*/)
+{
+  return TAV_RC_OK;
+}
+
+bool isAtNative(intptr_t file, const char* pPath)
+{
+  std::wstring path;
+  if (widen(pPath, path) != ERROR_SUCCESS) return false;
+  const DWORD sharing = FILE_SHARE_READ | FILE_SHARE_WRITE | FILE_SHARE_DELETE;
+  const HANDLE other = CreateFileW(path.c_str(), 0, sharing, nullptr, OPEN_EXISTING, FILE_ATTRIBUTE_NORMAL, nullptr);
+  if (other == INVALID_HANDLE_VALUE) return false;
+  BY_HANDLE_FILE_INFORMATION open{};
+  BY_HANDLE_FILE_INFORMATION there{};
+  const bool known = GetFileInformationByHandle(handleOf(file), &open) && GetFileInformationByHandle(other, &there);
+  CloseHandle(other);
+  return known && open.dwVolumeSerialNumber == there.dwVolumeSerialNumber &&
+         open.nFileIndexHigh == there.nFileIndexHigh && open.nFileIndexLow == there.nFileIndexLow;
+}
+
+const bool kOpenFileHoldsName = true;
+
+uint32_t renameNative(const char* pFrom, const char* pTo)
+{
+  std::wstring from;
+  std::wstring to;
+  DWORD error = widen(pFrom, from);
+  if (error == ERROR_SUCCESS) error = widen(pTo, to);
+  if (error == ERROR_SUCCESS && !MoveFileExW(from.c_str(), to.c_str(), MOVEFILE_REPLACE_EXISTING))
+    error = GetLastError();
+  return error == ERROR_SUCCESS ? TAV_RC_OK : codeOfSystemError(error);
+}
 } // namespace tav::kor

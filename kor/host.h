@@ -36,13 +36,16 @@ bool isTerminal(FILE* stream);
 std::optional<unsigned> terminalWidth();
 
 /// Makes all standard streams streams of bytes, where a line ends as it was written, and a closed pipe or a file that
-/// must not grow further an error of the write. A program that is interrupted or told to end removes the file of
+/// must not grow further an error of the write. A program that is interrupted or told to end removes the files of
 /// `removeOnInterrupt` first.
 void prepareStandardStreams();
 
-/// Removes a file when the program is interrupted or told to end; one file at a time, an empty path stands for none.
-/// The program then ends as by the signal itself.
+/// Removes a file when the program is interrupted or told to end; it then ends as by the signal itself. Some eight
+/// files at a time.
 void removeOnInterrupt(const std::string& path);
+
+/// The file is gone or has come to stay.
+void keepOnInterrupt(const std::string& path);
 
 /// While one lives an interrupt waits, so that no file is made and not yet known to `removeOnInterrupt`. One at a time.
 class HeldInterrupts
@@ -60,11 +63,23 @@ uint64_t processId();
 /// Removes a file; false when that does not work, also because it is open where that is in the way.
 bool removeFile(const std::string& path);
 
-/// `std::fopen` for any path; `mode` is one of "rb", "wb".
-FILE* openStream(const std::string& path, const char* mode);
+/// `std::fopen` for any path; `mode` is one of "rb", "wb". What is written to a path that `ownFile` knows goes to that
+/// very open file, from where it stands. When that does not work the result is null, and `code` says why.
+FILE* openStream(const std::string& path, const char* mode, uint32_t& code);
 
-/// Moves a file into place; without `replace` it never takes the place of another one, not even of one that appeared
-/// just now. Returns a code of codes.h.
+/// The number of the open file of this process that a path stands for, itself or by links: /dev/stdout, /dev/fd/3,
+/// /proc/self/fd/3. To open such a path again would begin at the start of the file, or make another one in its place.
+std::optional<int> ownFile(const std::string& path);
+
+/// The file that a path leads to: symbolic links are followed, also those to a file that is not there yet. Links of the
+/// system to open files of other processes are not; the result is then such a link.
+std::filesystem::path targetOf(const std::string& path);
+
+/// Puts a complete file in its place, which lasts when the machine stops at any moment: its bytes are on the disk
+/// before it has the name, and the name is when this returns. Without `replace` it never takes the place of another
+/// file, not even of one that appeared just now. With it, the file gets mode and owner of the one whose place it takes,
+/// as far as the system lets; what it cannot have of the owner's group, that group may not do with it either. A new
+/// file gets the mode of new files. Returns a code of codes.h.
 uint32_t moveIntoPlace(const std::string& from, const std::string& to, bool replace);
 
 struct CpuFacts

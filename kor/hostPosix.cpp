@@ -1,9 +1,7 @@
 #include <algorithm>
-#include <cerrno>
 #include <csignal>
 #include <cstdlib>
 #include <cstring>
-#include <filesystem>
 #include <fstream>
 #include <sstream>
 #include <sys/ioctl.h>
@@ -11,16 +9,14 @@
 #include <unistd.h>
 
 #include "kor/host.h"
-#include "kor/systemError.h"
-#include "tav/kor.h"
+#include "kor/interruptedFiles.h"
 
 namespace tav::kor
 {
 namespace
 {
-// What a signal's handler may look at. The flag is set last when there is a path and cleared first when there is none.
-char pathToRemove[4096];
-volatile std::sig_atomic_t hasPath = 0;
+// What a signal's handler may look at.
+InterruptedFiles<char> filesToRemove;
 volatile std::sig_atomic_t held = 0;
 volatile std::sig_atomic_t waiting = 0; ///< the number of a signal that came while it was held
 
@@ -31,7 +27,7 @@ extern "C" void endBySignal(int number)
     waiting = number;
     return;
   }
-  if (hasPath != 0) ::unlink(pathToRemove);
+  filesToRemove.each([](const char* path) { ::unlink(path); });
   std::signal(number, SIG_DFL);
   std::raise(number);
 }
@@ -119,7 +115,7 @@ void prepareStandardStreams()
 {
   std::signal(SIGPIPE, SIG_IGN);
   std::signal(SIGXFSZ, SIG_IGN);
-  for (const int number : {SIGINT, SIGTERM, SIGHUP})
+  for (const int number : {SIGINT, SIGTERM, SIGHUP, SIGQUIT})
   {
     // Who was told to ignore a signal (nohup) goes on ignoring it.
     if (std::signal(number, endBySignal) == SIG_IGN) std::signal(number, SIG_IGN);
@@ -128,12 +124,12 @@ void prepareStandardStreams()
 
 void removeOnInterrupt(const std::string& path)
 {
-  hasPath = 0;
-  if (!path.empty() && path.size() < sizeof pathToRemove)
-  {
-    std::memcpy(pathToRemove, path.c_str(), path.size() + 1);
-    hasPath = 1;
-  }
+  filesToRemove.add(path);
+}
+
+void keepOnInterrupt(const std::string& path)
+{
+  filesToRemove.drop(path);
 }
 
 HeldInterrupts::HeldInterrupts()
@@ -150,33 +146,6 @@ HeldInterrupts::~HeldInterrupts()
 uint64_t processId()
 {
   return static_cast<uint64_t>(::getpid());
-}
-
-bool removeFile(const std::string& path)
-{
-  return ::unlink(path.c_str()) == 0;
-}
-
-FILE* openStream(const std::string& path, const char* mode)
-{
-  return std::fopen(path.c_str(), mode);
-}
-
-uint32_t moveIntoPlace(const std::string& from, const std::string& to, bool replace)
-{
-  if (!replace)
-  {
-    // A link is refused when the name is taken, even by a file that came this very moment.
-    if (::link(from.c_str(), to.c_str()) == 0)
-    {
-      ::unlink(from.c_str());
-      return TAV_RC_OK;
-    }
-    std::error_code error;
-    if (errno == EEXIST || std::filesystem::exists(to, error)) return KOR_RC_FILE_EXISTS;
-    // A file system without links: the name was free a moment ago.
-  }
-  return ::rename(from.c_str(), to.c_str()) == 0 ? TAV_RC_OK : codeOfSystemError(errno);
 }
 
 MachineFacts describeMachine()

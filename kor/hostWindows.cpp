@@ -1,16 +1,14 @@
 #include <algorithm>
 #include <csignal>
-#include <cwchar>
 #include <fcntl.h>
 #include <io.h>
 #include <process.h>
 #include <thread>
 
 #include "kor/host.h"
-#include "kor/systemError.h"
+#include "kor/interruptedFiles.h"
 #include "kor/wideText.h"
 #include "kor/windows.h"
-#include "tav/kor.h"
 
 #include <shellapi.h> // behind the system's main header
 
@@ -18,9 +16,8 @@ namespace tav::kor
 {
 namespace
 {
-// What a signal's handler may look at. The flag is set last when there is a path and cleared first when there is none.
-wchar_t pathToRemove[4096];
-volatile std::sig_atomic_t hasPath = 0;
+// What a signal's handler may look at.
+InterruptedFiles<wchar_t> filesToRemove;
 volatile std::sig_atomic_t held = 0;
 volatile std::sig_atomic_t waiting = 0; ///< the number of a signal that came while it was held
 
@@ -31,7 +28,7 @@ extern "C" void endBySignal(int number)
     waiting = number;
     return;
   }
-  if (hasPath != 0) DeleteFileW(pathToRemove);
+  filesToRemove.each([](const wchar_t* path) { DeleteFileW(path); });
   std::signal(number, SIG_DFL);
   std::raise(number);
 }
@@ -125,11 +122,14 @@ void prepareStandardStreams()
 
 void removeOnInterrupt(const std::string& path)
 {
-  hasPath = 0;
   std::wstring wide;
-  if (path.empty() || widen(path.c_str(), wide) != ERROR_SUCCESS || wide.size() >= std::size(pathToRemove)) return;
-  std::wmemcpy(pathToRemove, wide.c_str(), wide.size() + 1);
-  hasPath = 1;
+  if (widen(path.c_str(), wide) == ERROR_SUCCESS) filesToRemove.add(wide);
+}
+
+void keepOnInterrupt(const std::string& path)
+{
+  std::wstring wide;
+  if (widen(path.c_str(), wide) == ERROR_SUCCESS) filesToRemove.drop(wide);
 }
 
 HeldInterrupts::HeldInterrupts()
@@ -146,33 +146,6 @@ HeldInterrupts::~HeldInterrupts()
 uint64_t processId()
 {
   return GetCurrentProcessId();
-}
-
-bool removeFile(const std::string& path)
-{
-  std::wstring wide;
-  return widen(path.c_str(), wide) == ERROR_SUCCESS && DeleteFileW(wide.c_str()) != 0;
-}
-
-FILE* openStream(const std::string& path, const char* mode)
-{
-  std::wstring wide;
-  std::wstring wideMode;
-  if (widen(path.c_str(), wide) != ERROR_SUCCESS || widen(mode, wideMode) != ERROR_SUCCESS) return nullptr;
-  return _wfopen(wide.c_str(), wideMode.c_str());
-}
-
-uint32_t moveIntoPlace(const std::string& from, const std::string& to, bool replace)
-{
-  std::wstring wideFrom;
-  std::wstring wideTo;
-  for (const auto& [text, wide] : {std::pair{&from, &wideFrom}, std::pair{&to, &wideTo}})
-  {
-    const DWORD error = widen(text->c_str(), *wide);
-    if (error != ERROR_SUCCESS) return codeOfSystemError(error);
-  }
-  const DWORD flags = replace ? MOVEFILE_REPLACE_EXISTING : 0;
-  return MoveFileExW(wideFrom.c_str(), wideTo.c_str(), flags) != 0 ? TAV_RC_OK : codeOfSystemError(GetLastError());
 }
 
 MachineFacts describeMachine()

@@ -8,7 +8,7 @@
 #include "kor/shared.h"
 #include "tav/kor.h"
 
-namespace tav
+namespace tav::inside
 {
 
 /// Whether a record would go anywhere. Asked before every record: tracing may be switched in mid-call.
@@ -195,4 +195,35 @@ private:
   uint32_t code_ = TAV_RC_OK;
 };
 
-} // namespace tav
+/// A frame without records, for a step of a call that leaves none and calls nothing outside the library.
+class UntracedFrame
+{
+public:
+  explicit UntracedFrame(uint32_t /*probe*/) {}
+
+  template<class... Values>
+  void dump(uint32_t /*point*/, const Values&... /*values*/) const
+  {
+  }
+
+  [[nodiscard]] bool require(uint32_t point, bool holds, uint32_t code)
+  {
+    return holds || fail(point, code);
+  }
+
+  bool fail(uint32_t /*point*/, uint32_t code)
+  {
+    code_ = code;
+    return false;
+  }
+
+  [[nodiscard]] uint32_t code() const
+  {
+    return code_;
+  }
+
+private:
+  uint32_t code_ = TAV_RC_OK;
+};
+
+} // namespace tav::inside

@@ -1,6 +1,6 @@
 #include "storage/cachedRun.h"
 
-namespace tav
+namespace tav::inside
 {
 
 void markPending(TAVCircularBuf& ring, uint64_t page, uint64_t last)
@@ -29,4 +29,4 @@ uint8_t* takeCachedRun(TAVCircularBuf& ring, uint64_t offset, uint64_t length)
   return ring.pRing + index;
 }
 
-} // namespace tav
+} // namespace tav::inside

@@ -7,7 +7,7 @@
 
 #include "tav/tav.h"
 
-namespace tav
+namespace tav::inside
 {
 
 /// How many bytes the ring caches.
@@ -82,4 +82,4 @@ void markPending(TAVCircularBuf& ring, uint64_t page, uint64_t last);
 /// so cached.
 uint8_t* takeCachedRun(TAVCircularBuf& ring, uint64_t offset, uint64_t length);
 
-} // namespace tav
+} // namespace tav::inside

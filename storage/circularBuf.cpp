@@ -2,6 +2,7 @@
 /// circularFill.cpp and circularRelease.cpp.
 #include <algorithm>
 #include <cstring>
+#include <utility>
 
 #include "format/layout.h"
 #include "kor/traceFrame.h"
@@ -10,6 +11,7 @@
 #include "tav/tav.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {
@@ -30,6 +32,49 @@ uint64_t pagesFor(uint64_t size, uint64_t pageSize)
   return size > ~uint64_t{0} - (pageSize - 1) ? size / pageSize : unitsFor(size, pageSize);
 }
 
+// The steps that every access asks for several times. They look at the switch of the trace once, not at every record.
+
+template<class Frame>
+bool cachesNothing(const TAVCircularBuf& ring)
+{
+  const Frame frame(probe::cbIsEmpty);
+  frame.dump(100, ring.empty);
+  return ring.empty != 0;
+}
+
+template<class Frame>
+uint64_t countCached(const TAVCircularBuf& ring)
+{
+  const Frame frame(probe::cbCachedCount);
+  const uint64_t count = cachedBytes(ring);
+  frame.dump(100, count);
+  return count;
+}
+
+template<class Frame>
+bool findIndex(const TAVCircularBuf& ring, uint64_t offset, uint64_t& index)
+{
+  const Frame frame(probe::cbOffsetToIndex);
+  frame.dump(0, offset);
+  const bool cached = !cachesNothing<Frame>(ring) && offset >= ring.headOffset &&
+                      offset - ring.headOffset < countCached<Frame>(ring);
+  if (cached) index = runAt(ring, offset).index;
+  frame.dump(100, cached, index);
+  return cached;
+}
+
+template<class Frame>
+uint64_t findPage(const TAVCircularBuf& ring, uint64_t index)
+{
+  const Frame frame(probe::cbPageOfIndex);
+  frame.dump(0, index);
+  const uint64_t page = pageOfIndex(ring, index);
+  frame.dump(100, page);
+  return page;
+}
+/// What came to the class later stands where there was padding: programs that know the class without it fit.
+static_assert(sizeof(TAVCircularBuf) == 88);
+
 /// The next smaller ring to try: a quarter less, and 1 page after 2 or 3.
 uint64_t fewerPages(uint64_t pages)
 {
@@ -40,7 +85,7 @@ uint64_t fewerPages(uint64_t pages)
 
 TAVCircularBuf::TAVCircularBuf(TAVSideStorage* storage, uint64_t size, uint32_t* rc)
     : status(TAV_RC_OK), pRing(nullptr), ringSize(0), head(0), tail(0), headOffset(0), pageSize(0), pageCount(0),
-      pPageFlags(nullptr), pStorage(storage), storageWritable(0), empty(1)
+      pPageFlags(nullptr), pStorage(storage), storageWritable(0), empty(1), writeFailure_(TAV_RC_OK)
 {
   TraceFrame frame(probe::circularBuf);
   frame.dump(0, storage, size, rc);
@@ -202,19 +247,21 @@ uint32_t TAVCircularBuf::write(uint64_t offset, const void* data, uint64_t size,
   const uint64_t contiguous = runAt(*this, offset).length;
   if (!direct && !large && size > contiguous)
   {
-    static_cast<void>(fill(offset, unitsFor(size, pageSize), false, Purpose::write));
+    const uint32_t filled = fill(offset, unitsFor(size, pageSize), false, Purpose::write);
     cached = indexOf(offset, index);
+    writeFailure_ = cached ? TAV_RC_OK : filled;
   }
   if (cached)
   {
-    static_cast<void>(frame.step(40, writeCached(index, offset, bytes, size, direct)));
+    if (frame.step(40, writeCached(index, offset, bytes, size, direct))) frame.dump(100, offset + size);
     return frame.code();
   }
   const bool overlaps = !isEmpty() && offset < headOffset && headOffset - offset < size;
   if (frame.require(50, direct || large, TAV_RC_BAD_PARAM) &&
-      (!(large || overlaps) || frame.step(60, releasePages(pageCount, false))))
+      (!(large || overlaps) || frame.step(60, releasePages(pageCount, false))) &&
+      frame.step(70, writeStraight(offset, bytes, size)))
   {
-    static_cast<void>(frame.step(70, writeStraight(offset, bytes, size)));
+    frame.dump(100, offset + size);
   }
   return frame.code();
 }
@@ -284,6 +331,11 @@ uint32_t TAVCircularBuf::seekStorage(uint64_t offset)
   return rc != TAV_RC_OK || position == offset ? rc : TAV_RC_NO_MEMORY;
 }
 
+uint32_t TAVCircularBuf::takeWriteFailure()
+{
+  return std::exchange(writeFailure_, TAV_RC_OK);
+}
+
 uint32_t TAVCircularBuf::reset()
 {
   TraceFrame frame(probe::cbReset);
@@ -298,7 +350,7 @@ uint32_t TAVCircularBuf::reposition(uint64_t offset, int8_t adjustment, uint8_t 
   if (frame.step(10, pRing != nullptr ? reset() : TAV_RC_BAD_PARAM))
   {
     const uint64_t from = offset + static_cast<uint64_t>(int64_t{adjustment});
-    static_cast<void>(frame.step(20, fill(from, pages, false, Purpose::read)));
+    if (frame.step(20, fill(from, pages, false, Purpose::read))) frame.dump(100, headOffset, cachedBytes(*this));
   }
   return frame.code();
 }
@@ -321,6 +373,7 @@ uint32_t TAVCircularBuf::markPages(uint64_t offset, uint64_t length)
   const uint64_t page = pageOf(index);
   const uint64_t last = indexOf(end, index) ? pageOf(index) : pageOf(tail);
   markPending(*this, page, last);
+  frame.dump(100, page, last);
   return frame.code();
 }
 
@@ -332,26 +385,18 @@ bool TAVCircularBuf::isCached(uint64_t offset) const
 
 uint64_t TAVCircularBuf::cachedCount() const
 {
-  const TraceFrame frame(probe::cbCachedCount);
-  return cachedBytes(*this);
+  return tracing() ? countCached<TraceFrame>(*this) : countCached<UntracedFrame>(*this);
 }
 
 bool TAVCircularBuf::isEmpty() const
 {
-  const TraceFrame frame(probe::cbIsEmpty);
-  return empty != 0;
+  return tracing() ? cachesNothing<TraceFrame>(*this) : cachesNothing<UntracedFrame>(*this);
 }
 
 /// The ring index of a stream offset; false when it is not cached.
 bool TAVCircularBuf::indexOf(uint64_t offset, uint64_t& index) const
 {
-  const TraceFrame frame(probe::cbOffsetToIndex);
-  if (isEmpty() || offset < headOffset || offset - headOffset >= cachedCount())
-  {
-    return false;
-  }
-  index = runAt(*this, offset).index;
-  return true;
+  return tracing() ? findIndex<TraceFrame>(*this, offset, index) : findIndex<UntracedFrame>(*this, offset, index);
 }
 
 /// The mapping behind the chunkOffset of a backward chunk. It is given a stream offset where an index is meant, and
@@ -376,12 +421,13 @@ uint32_t TAVCircularBuf::offsetOf(uint64_t value, uint64_t& offset) const
   else
   {
     static_cast<void>(frame.fail(10, TAV_RC_CB_STATE));
+    return frame.code();
   }
+  frame.dump(100, offset);
   return frame.code();
 }
 
 uint64_t TAVCircularBuf::pageOf(uint64_t index) const
 {
-  const TraceFrame frame(probe::cbPageOfIndex);
-  return pageOfIndex(*this, index);
+  return tracing() ? findPage<TraceFrame>(*this, index) : findPage<UntracedFrame>(*this, index);
 }

@@ -4,10 +4,12 @@
 
 #include "format/layout.h"
 #include "kor/traceFrame.h"
+#include "storage/cachedRun.h"
 #include "storage/circularPiece.h"
 #include "tav/probes.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {
@@ -39,9 +41,10 @@ uint32_t TAVCircularBuf::fill(uint64_t offset, uint64_t pages, bool backward, Pu
                     : isEmpty() ? startEmpty(offset, pages, backward)
                                 : planUncached(offset, pages, backward);
   const bool far = !cached && plan.pages >= 2 * pageCount && pStorage->hasAttributes(TAV_ATTR_SEEK);
-  if (frame.step(10, far ? jump(offset, backward, purpose) : readPages(plan.pages, plan.backward, offset, purpose)))
+  if (frame.step(10, far ? jump(offset, backward, purpose) : readPages(plan.pages, plan.backward, offset, purpose)) &&
+      frame.step(20, readUntilCached(offset, purpose)))
   {
-    static_cast<void>(frame.step(20, readUntilCached(offset, purpose)));
+    frame.dump(100, headOffset, cachedBytes(*this));
   }
   return frame.code();
 }
@@ -133,7 +136,8 @@ uint32_t TAVCircularBuf::readPages(uint64_t pages, bool backward, uint64_t offse
   TraceFrame frame(probe::cbReadPages);
   frame.dump(0, pages, backward);
   bool full = true;
-  for (uint64_t done = 0; full && done < pages; ++done)
+  uint64_t done = 0;
+  for (; full && done < pages; ++done)
   {
     const uint32_t rc = backward ? readPageBackward(offset, full) : readPageForward(offset, purpose, full);
     const bool enough = rc == TAV_RC_END_OF_STORAGE && isCached(offset);
@@ -142,6 +146,7 @@ uint32_t TAVCircularBuf::readPages(uint64_t pages, bool backward, uint64_t offse
       break;
     }
   }
+  if (frame.code() == TAV_RC_OK) frame.dump(100, done, cachedBytes(*this));
   return frame.code();
 }
 

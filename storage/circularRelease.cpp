@@ -1,9 +1,11 @@
 /// How pages leave the ring: the page-release step.
 #include "kor/traceFrame.h"
+#include "storage/cachedRun.h"
 #include "storage/circularPiece.h"
 #include "tav/probes.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 /// The piece at an end of the cached range: the bytes of one page. Head and tail may share a page without being
 /// neighbours, when the range wraps.
@@ -26,18 +28,20 @@ uint32_t TAVCircularBuf::releasePages(uint64_t pages, bool fromTail)
 {
   TraceFrame frame(probe::cbReleasePages);
   frame.dump(0, pages, fromTail);
+  uint64_t done = 0;
+  uint64_t position = 0;
   if (isEmpty())
   {
+    frame.dump(100, done, cachedBytes(*this));
     return frame.code();
   }
-  uint64_t position = 0;
   if (!frame.step(10, pStorage->getPosition(&position)))
   {
     return frame.code();
   }
   bool seekNeeded = position != headOffset;
   const uint64_t most = pages < pageCount ? pages : pageCount + 1;
-  for (uint64_t done = 0; done < most && !isEmpty(); ++done)
+  for (; done < most && !isEmpty(); ++done)
   {
     const Piece piece = pieceAt(fromTail);
     seekNeeded = seekNeeded || fromTail;
@@ -49,6 +53,7 @@ uint32_t TAVCircularBuf::releasePages(uint64_t pages, bool fromTail)
     seekNeeded = !pending;
     dropPiece(piece, fromTail);
   }
+  if (frame.code() == TAV_RC_OK) frame.dump(100, done, cachedBytes(*this));
   return frame.code();
 }
 

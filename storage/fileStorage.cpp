@@ -6,6 +6,7 @@
 #include "tav/tav.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {
@@ -74,6 +75,10 @@ TAVSSFile::TAVSSFile(KORFileOpenParam* openParam, uint32_t* rc)
         delete pFile;
         pFile = nullptr;
       }
+      else
+      {
+        frame.dump(100, pFile, attributes, ioUnit);
+      }
     }
     status = frame.code();
   }
@@ -104,6 +109,7 @@ uint32_t TAVSSFile::seek(uint64_t offset, uint64_t hint)
   if (frame.require(10, pFile != nullptr, KOR_RC_NOT_OPEN) && frame.step(20, seekFile(*pFile, offset, landed)))
   {
     position = offset;
+    frame.dump(100, position);
   }
   return frame.code();
 }

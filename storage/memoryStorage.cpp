@@ -6,6 +6,7 @@
 #include "tav/tav.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {
@@ -30,6 +31,7 @@ TAVSSMemory::TAVSSMemory(uint64_t size, uint32_t* rc)
     pBuffer = static_cast<uint8_t*>(block);
     bufferSize = size;
     ownsBuffer = 1;
+    frame.dump(100, pBuffer, bufferSize);
   }
   if (rc != nullptr)
   {
@@ -43,6 +45,7 @@ TAVSSMemory::TAVSSMemory(void* block, uint64_t size)
 {
   const TraceFrame frame(probe::ssMemory);
   frame.dump(0, block, size);
+  frame.dump(100, pBuffer, bufferSize);
 }
 
 TAVSSMemory::~TAVSSMemory()
@@ -65,6 +68,7 @@ uint32_t TAVSSMemory::seek(uint64_t offset, uint64_t hint)
   if (frame.require(10, offset < bufferSize, TAV_RC_BAD_PARAM))
   {
     position = offset;
+    frame.dump(100, position);
   }
   return frame.code();
 }

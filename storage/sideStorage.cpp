@@ -3,6 +3,7 @@
 #include "tav/tav.h"
 
 using namespace tav;
+using namespace tav::inside;
 
 namespace
 {
@@ -33,11 +34,15 @@ TAVSideStorage::~TAVSideStorage()
 uint32_t TAVSideStorage::getStatus() const
 {
   const TraceFrame frame(probe::ssGetStatus);
+  frame.dump(100, status);
   return status;
 }
 
 bool TAVSideStorage::hasAttributes(uint64_t mask) const
 {
   const TraceFrame frame(probe::ssHasAttributes);
-  return (attributes & mask) >= mask;
+  frame.dump(0, mask);
+  const bool has = (attributes & mask) >= mask;
+  frame.dump(100, has);
+  return has;
 }

@@ -68,7 +68,7 @@ PatchFile::~PatchFile()
   if (!temporary_.empty())
   {
     kor::removeFile(temporary_);
-    kor::removeOnInterrupt({});
+    kor::keepOnInterrupt(temporary_);
   }
 }
 

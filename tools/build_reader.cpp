@@ -149,6 +149,10 @@ void DocumentReader::startForm()
   const std::string name = top().key;
   if (name == "nodes")
   {
+    if (top().given)
+    {
+      fail("the nodes are given twice");
+    }
     beginNodes();
     top().given = true;
     push(Where::shortList);
@@ -161,6 +165,10 @@ void DocumentReader::startForm()
   if (formSet_)
   {
     fail("the form must stand before the nodes");
+  }
+  if (std::exchange(formGiven_, true))
+  {
+    fail("the form is given twice");
   }
   push(Where::form);
 }

@@ -147,6 +147,7 @@ private:
   Draft draft_{};
   Form form_{};
   bool formSet_ = false;
+  bool formGiven_ = false; ///< the document has a form of its own
   bool lines_ = false;
   bool started_ = false;
   TAVTimeStamp date_{};

@@ -409,12 +409,13 @@ void DocumentReader::dateField(const std::string& name, const Scalar& value)
 }
 
 TextSource::TextSource(const std::string& path)
-    : name_(path == "-" ? "standard input" : path), file_(path == "-" ? stdin : kor::openStream(path, "rb")),
-      standard_(path == "-"), buffer_(kBuffer)
+    : name_(path == "-" ? "standard input" : path), file_(stdin), standard_(path == "-"), buffer_(kBuffer)
 {
+  uint32_t code = TAV_RC_OK;
+  file_ = standard_ ? stdin : kor::openStream(path, "rb", code);
   if (file_ == nullptr)
   {
-    throw Failure(kTrouble, Problem{.file = name_, .sentence = std::strerror(errno)});
+    failAt(name_, code);
   }
   setg(buffer_.data(), buffer_.data(), buffer_.data());
 }
@@ -436,7 +437,7 @@ TextSource::int_type TextSource::underflow()
   setg(buffer_.data(), buffer_.data(), buffer_.data() + count);
   if (count == 0 && std::ferror(file_) != 0)
   {
-    throw Failure(kTrouble, Problem{.file = name_, .sentence = std::strerror(errno)});
+    failAt(name_, KOR_RC_IO_ERROR);
   }
   return count == 0 ? traits_type::eof() : traits_type::to_int_type(*gptr());
 }

@@ -66,8 +66,7 @@ std::string dateBytes(const std::string& text)
   const auto stamp = parseDate(text);
   if (!stamp)
   {
-    throw BuildError(quoted(text) + " is no date that a timestamp holds; 2024-02-29T10:30:00.000000+01:00 is, "
-                                    "with a fraction of 0.065535 at the most");
+    throw BuildError(quoted(text) + " is no date that a timestamp holds; 2024-02-29T10:30:00.123456+01:00 is");
   }
   return {reinterpret_cast<const char*>(&*stamp), sizeof *stamp};
 }

@@ -4,6 +4,7 @@
 #include <array>
 #include <utility>
 
+#include "tools/form.h"
 #include "tools/report.h"
 #include "tools/textScan.h"
 #include "tools/value.h"
@@ -50,8 +51,9 @@ std::string endsPast(uint64_t by, const char* what)
 
 } // namespace
 
-Checker::Checker(ByteSource& source, const Form& form, std::function<bool(RuleId)> wanted, Sink sink)
-    : source_(source), form_(form), wanted_(std::move(wanted)), sink_(std::move(sink)), walker_(source, form)
+Checker::Checker(ByteSource& source, const Form& form, std::function<bool(RuleId)> wanted, Sink sink, PathStyle style)
+    : source_(source), form_(form), wanted_(std::move(wanted)), sink_(std::move(sink)), style_(style),
+      walker_(source, form)
 {
   Group file;
   file.wide = form.root64;
@@ -62,10 +64,14 @@ void Checker::found(RuleId rule, uint64_t offset, uint64_t length, std::string s
 {
   if (wanted_(rule))
   {
-    // So deep, a path is longer than anyone reads; the offset tells the place.
-    sink_(
-        {rule, offset, length, event_.depth > kMostNested ? std::string() : walker_.path(event_), std::move(sentence)});
+    sink_({rule, offset, length, path(), std::move(sentence)});
   }
+}
+
+std::string Checker::path() const
+{
+  // So deep, a whole path is longer than anyone reads; the offset tells the place.
+  return style_ == PathStyle::whole && event_.depth > kMostNested ? std::string() : walker_.path(event_, style_);
 }
 
 bool Checker::step()
@@ -101,16 +107,6 @@ bool Checker::step()
   return true;
 }
 
-uint64_t Checker::paddedSize(const Node& node) const
-{
-  uint64_t size = node.size();
-  if (form_.aligned || (node.info() & TAV_INFO_ALIGNED8) != 0)
-  {
-    roundUp8Checked(size);
-  }
-  return size;
-}
-
 void Checker::placeIsTaken(uint64_t offset)
 {
   Group& group = groups_.back();
@@ -123,7 +119,7 @@ void Checker::placeIsTaken(uint64_t offset)
 
 void Checker::beginNode()
 {
-  ++nodes_;
+  isEndElement(event_.node.elm()) ? ++endElements_ : ++nodes_;
   placeIsTaken(event_.offset);
   groups_.back().damagedTail = false;
   paddingCut_ = 0;
@@ -304,15 +300,11 @@ void Checker::endNode()
 void Checker::checkDataEnd()
 {
   const Node& node = event_.node;
-  const bool announced = node.is64() && hasEyeSize(node.header);
-  const uint64_t end = event_.offset - (announced && !node.has(kNoPair) ? kEyeSizeLength : 0);
-  const uint64_t extra = node.has(kExtra) ? 2 : 0;
-  const uint64_t padded = addSaturated(node.payloadOffset() + extra, paddedSize(node));
-  if (end < padded)
+  if (const uint64_t missing = missingPadding(event_, form_); missing != 0)
   {
-    paddingCut_ = end == source_.size() ? padded - end : 0;
-    found(RuleId::paddingMissing, node.payloadOffset() + node.size() + extra, 0,
-          counted(padded - end, "byte") + " of padding " + (padded - end == 1 ? "is" : "are") + " not there");
+    paddingCut_ = event_.offset == source_.size() ? missing : 0;
+    found(RuleId::paddingMissing, node.payloadOffset() + node.size() + (node.has(kExtra) ? 2 : 0), 0,
+          counted(missing, "byte") + " of padding " + (missing == 1 ? "is" : "are") + " not there");
   }
   if (node.has(kNoPair))
   {
@@ -345,6 +337,7 @@ void Checker::endGroup()
   Group group = std::move(groups_.back());
   groups_.pop_back();
   const Node& node = event_.node;
+  bool open = false;
   if (node.has(kOverrun))
   {
     checkOverrun(group);
@@ -352,10 +345,7 @@ void Checker::endGroup()
   else if (node.has(kOpen) && event_.end != End::byEndElement)
   {
     const bool empty = node.size() == 0 && event_.offset == node.payloadOffset(); // sound when it was closed at once
-    if (!empty)
-    {
-      tellOpen();
-    }
+    open = !empty;
   }
   else if (node.has(kOpen) && isSizeUnknown(node.header))
   {
@@ -370,13 +360,14 @@ void Checker::endGroup()
   {
     found(RuleId::endMissing, node.offset(), node.headerLength(), "announces an eye/size pair, but has no end element");
   }
+  tellOpen(open);
   if (node.has(kWrongSize))
   {
     Group& parent = groups_.back();
     parent.lastClaim = group.claimedEnd;
     parent.lastClaimer = node.offset();
     parent.lastClaimEnd = event_.offset;
-    parent.lastClaimPath = walker_.path(event_);
+    parent.lastClaimPath = path();
   }
   else
   {
@@ -389,9 +380,22 @@ void Checker::endGroup()
   }
 }
 
-void Checker::tellOpen()
+void Checker::tellOpen(bool open)
 {
-  found(RuleId::groupOpen, event_.node.offset(), event_.node.headerLength(), "was never closed");
+  if (event_.node.depth > kMostNested)
+  {
+    deepOpen_ += open ? 1 : 0; // told together: a line for each says no more
+    return;
+  }
+  const uint64_t below = event_.node.depth == kMostNested ? std::exchange(deepOpen_, 0) : 0;
+  if (open || below != 0)
+  {
+    const std::string more = below == 0 ? "" : counted(below, "group") + " in it";
+    found(RuleId::groupOpen, event_.node.offset(), event_.node.headerLength(),
+          below == 0 ? "was never closed"
+          : open     ? "was never closed, nor " + std::string(below == 1 ? "was " : "were ") + more
+                     : more + (below == 1 ? " was" : " were") + " never closed");
+  }
 }
 
 void Checker::checkOverrun(const Group& group)
@@ -453,8 +457,11 @@ void Checker::checkDamage()
   const Group& group = groups_.back();
   if (groups_.size() == 1 && rootEnded_)
   {
+    const auto other = otherStreamAt(source_, form_, event_.offset);
     found(RuleId::behindStream, event_.offset, event_.length,
-          counted(event_.length, "byte") + " behind the stream that are not zeros");
+          counted(event_.length, "byte") + " behind the stream" +
+              (other ? ": " + otherStreamText(*other) + "; " + fromText(source_, event_.offset) + " reads it"
+                     : " that are no node"));
     return;
   }
   if (checkCutHeader())
@@ -499,7 +506,12 @@ void Checker::checkDamage()
 
 void Checker::checkZeros()
 {
-  if (event_.length > kMostZeros)
+  if (event_.offset + event_.length < source_.size())
+  {
+    found(RuleId::zerosBetween, event_.offset, event_.length,
+          counted(event_.length, "byte") + " of zeros between streams");
+  }
+  else if (event_.length > kMostZeros)
   {
     found(RuleId::zerosLong, event_.offset, event_.length,
           byteText(event_.length) + " of zeros behind the stream; a writer leaves 2 MiB at most");

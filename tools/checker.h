@@ -30,13 +30,17 @@ public:
   using Sink = std::function<void(const Finding&)>;
 
   /// `wanted` tells which rules to look for: payloads are read only for rules about strings.
-  Checker(ByteSource& source, const Form& form, std::function<bool(RuleId)> wanted, Sink sink);
+  /// `style` is that of the findings' paths; whole ones are given down to 4,000 levels.
+  Checker(ByteSource& source, const Form& form, std::function<bool(RuleId)> wanted, Sink sink,
+          PathStyle style = PathStyle::whole);
 
   /// Goes on by one piece of the file; false at its end.
   bool step();
 
   uint64_t position() const { return event_.offset + event_.length; }
+  /// End elements are structure: they are counted apart.
   uint64_t nodes() const { return nodes_; }
+  uint64_t endElements() const { return endElements_; }
 
 private:
   struct Group
@@ -60,7 +64,8 @@ private:
   void endNode();
   void endGroup();
   void checkHeader();
-  void tellOpen();
+  std::string path() const;
+  void tellOpen(bool open);
   void checkOverrun(const Group& group);
   void checkEndElement();
   void checkDataEnd();
@@ -72,17 +77,19 @@ private:
   bool checkCutHeader();
   void checkZeros();
   void placeIsTaken(uint64_t offset);
-  uint64_t paddedSize(const Node& node) const;
 
   ByteSource& source_;
   Form form_;
   std::function<bool(RuleId)> wanted_;
   Sink sink_;
+  PathStyle style_;
   Walker walker_;
   Event event_{};
   std::vector<Group> groups_{}; ///< the first stands for the file
   uint64_t nodes_ = 0;
+  uint64_t endElements_ = 0;
   uint64_t paddingCut_ = 0; ///< bytes of padding that the last data element lacks at the end of the file
+  uint64_t deepOpen_ = 0;   ///< groups below the deepest level that is told of that were never closed
   bool rootEnded_ = false;
   bool deepTold_ = false;
 };

@@ -26,7 +26,7 @@ int run(const Invocation& invocation)
 {
   const std::string input = invocation.arguments().empty() ? "-" : invocation.arguments().front();
   const std::string output = invocation.text("--output", "-");
-  if (output == "-" && kor::isTerminal(stdout))
+  if (isStandardOutput(output) && kor::isTerminal(stdout))
   {
     throw Failure("build: a stream is no text for a terminal", "-o FILE writes it to a file");
   }
@@ -58,7 +58,7 @@ const Registration registration{{
         "given. Documents can be written by hand: names of elements with their values suffice, as in\n"
         "{\"system\": {\"host\": {\"hostName\": \"ada\", \"cpuOnline\": 8}}}; an array stands for several elements\n"
         "of the name; types are chosen from the values; keys with $ are properties ($type, $eyeSize).\n"
-        "docs/json.md describes every key.\n\n"
+        "share/doc/tav-tools/json.md describes every key.\n\n"
         "--byte-order, --root, --align, --no-align and --eye-size convert: then sizes, pairs and paddings are\n"
         "made anew, and what is no node is left out, with exit status 1.",
     .options = {{.names = "-o,--output",
@@ -66,6 +66,7 @@ const Registration registration{{
                  .value = "FILE",
                  .help = "where to; standard output unless given"},
                 {.names = "--eye-size", .help = "end every node with an eye/size pair"}},
+    .concerns = kForm,
     .examples = {{"tav json x.tav | tav build -o y.tav", "the same bytes again"},
                  {"tav json x.tav | tav build --byte-order big --align -o y.tav", "convert a stream"},
                  {"echo '{\"system\": {\"host\": {\"hostName\": \"ada\"}}}' | tav build -o x.tav", "a stream by hand"}},

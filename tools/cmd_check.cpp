@@ -86,22 +86,25 @@ public:
     out_.write(problemText(problem) + "\n");
   }
 
-  Status finish(uint64_t nodes)
+  Status finish(uint64_t nodes, uint64_t endElements)
   {
-    const bool stream = stream_.recognition.isStream;
+    const bool stream = stream_.isStream();
     if (json_)
     {
       out_.write(std::string(defects_ + notes_ == 0 ? "" : "\n ") + "],\n \"stream\": " + (stream ? "true" : "false") +
-                 ", \"nodes\": " + std::to_string(nodes) + ", \"bytes\": " + std::to_string(stream_.source->size()) +
+                 (stream_.kind ? ", \"kind\": " + json(std::string(stream_.kind->name)) : "") +
+                 ", \"nodes\": " + std::to_string(nodes) + ", \"endElements\": " + std::to_string(endElements) +
+                 ", \"bytes\": " + std::to_string(stream_.source->size()) +
                  ", \"defects\": " + std::to_string(defects_) + ", \"notes\": " + std::to_string(notes_) + "}\n");
     }
     else
     {
-      const std::string result = !stream         ? "no stream, or nothing of it is whole"
+      const std::string result = !stream         ? noStream(stream_).sentence
                                  : defects_ == 0 ? "no defects"
                                                  : counted(defects_, "defect");
-      out_.write("tav: " + stream_.source->name() + ": " + result +
-                 (notes_ == 0 ? "" : ", " + counted(notes_, "note")) + " in " + counted(nodes, "node") + "\n");
+      out_.write("tav: " + shown(stream_.source->name()) + ": " + result +
+                 (notes_ == 0 ? "" : ", " + counted(notes_, "note")) + (stream ? " in " + counted(nodes, "node") : "") +
+                 (stream && endElements != 0 ? " and " + counted(endElements, "end element") : "") + "\n");
     }
     out_.commit();
     return !stream ? kTooDamaged : defects_ == 0 ? kFine
@@ -159,19 +162,20 @@ int run(const Invocation& invocation)
                   "'tav check --help' tells more; - is standard input");
   }
   const Choice choice(invocation);
-  Stream stream = openStream(invocation, invocation.arguments().front(), true);
+  Stream stream = openStream(invocation, true);
   Findings findings(invocation, stream, choice);
   Checker checker(
       stream.bytes(), stream.form(), [&](RuleId rule) { return choice.wants(rule); },
-      [&](const Finding& finding) { findings.put(finding); });
+      [&](const Finding& finding) { findings.put(finding); },
+      invocation.has("--json") ? PathStyle::whole : PathStyle::brief);
   {
     Progress progress("check", stream.bytes());
-    while (checker.step())
+    while (stream.isStream() && checker.step())
     {
       progress.at(checker.position());
     }
   }
-  const Status status = findings.finish(checker.nodes());
+  const Status status = findings.finish(checker.nodes(), checker.endElements());
   tellStatistics(invocation, stream.bytes());
   return status;
 }

@@ -274,14 +274,21 @@ int run(const Invocation& invocation)
     ignored.emplace_back(path).requireNames();
   }
   Tolerance::parse(invocation.text("--tolerance", "0")); // told before the work begins
-  Stream a = openStream(invocation, nameA);
-  Stream b = openStream(invocation, nameB);
-  DiffIndex indexA(a, ignored);
-  DiffIndex indexB(b, ignored);
+  const auto from = [&](const char* own) {
+    return invocation.has(own) ? invocation.number(own) : invocation.number("--from");
+  };
+  Stream a = openStream(invocation, nameA, from("--from-a").value_or(0));
+  Stream b = openStream(invocation, nameB, from("--from-b").value_or(0));
+  DamageNotices noticesA(a);
+  DamageNotices noticesB(b);
+  DiffIndex indexA(a, ignored, noticesA);
+  DiffIndex indexB(b, ignored, noticesB);
   const bool different = Comparer(invocation, indexA, indexB).run();
   tellStatistics(invocation, a.bytes());
   tellStatistics(invocation, b.bytes());
-  return different ? kFindings : kFine;
+  const bool damagedA = noticesA.tell() != kFine;
+  const bool damagedB = noticesB.tell() != kFine;
+  return different || damagedA || damagedB ? kFindings : kFine;
 }
 
 const Registration registration{{
@@ -295,7 +302,8 @@ const Registration registration{{
         "padding, pairs and end elements are no difference; types, values, info bits and damaged bytes are.\n"
         "Groups of one name are matched by their keys (node_number, db_name, hostName) where they have\n"
         "some; other elements of one name by what is equal in their order, and else one after the other.\n"
-        "The order of elements with different names is no difference. Exit status 1: there are some.\n\n"
+        "The order of elements with different names is no difference. Exit status 1: there are some,\n"
+        "or damage was passed over, which is told on standard error.\n\n"
         "Nodes are listed in a temporary file; in memory are only the children of the groups on the way\n"
         "to the place that is compared. Of a group with more than 200,000 children, 200,000 at a time\n"
         "are compared, so that what moved farther is told as removed and added.",
@@ -308,6 +316,11 @@ const Registration registration{{
                  .kind = ValueKind::text,
                  .value = "N",
                  .help = "numbers may differ by N, or by N% of the larger one"},
+                {.names = "--from-a",
+                 .kind = ValueKind::number,
+                 .value = "OFFSET",
+                 .help = "read A as if it began at OFFSET; --from is for both"},
+                {.names = "--from-b", .kind = ValueKind::number, .value = "OFFSET", .help = "the same for B"},
                 {.names = "--json", .help = "one JSON object a difference"},
                 {.names = "--color",
                  .kind = ValueKind::choice,

@@ -109,6 +109,7 @@ const Registration registration{{
         "Lists the elements whose tag, enum name or constant holds PATTERN, or matches it when it has * or ?;\n"
         "letter case does not count. A number is an id. Exit status 1: none.",
     .options = {{.names = "--unused", .help = "the unused ids inside the ranges, too"}},
+    .concerns = kNoConcern,
     .examples = {{"tav elements host", "every element with 'host' in one of its names"},
                  {"tav elements 60103", "the element with this id"}},
     .run = run,

@@ -23,6 +23,7 @@ namespace
 {
 
 constexpr uint64_t kMostText = uint64_t{1024} * 1024; ///< longer values are copied piece by piece
+constexpr uint64_t kMostSteps = 4000;                 ///< deeper nodes are named by their offset in JSON
 
 /// A path with what was found so far.
 struct Wanted
@@ -58,20 +59,11 @@ public:
 
   Status run(const Invocation& invocation)
   {
-    Walker walker(stream_.bytes(), stream_.form());
-    Progress progress("get", stream_.bytes());
-    Event event;
-    while (!isDone() && walker.next(event))
-    {
-      progress.at(event.offset);
-      if (event.what == What::nodeBegin)
-      {
-        visit(walker, event);
-      }
-    }
+    DamageNotices notices(stream_);
+    walk(notices);
     out_.commit();
     tellStatistics(invocation, stream_.bytes());
-    Status status = kFine;
+    Status status = notices.tell();
     for (const auto& wanted : wanted_)
     {
       if (wanted->found == 0)
@@ -84,6 +76,22 @@ public:
   }
 
 private:
+  void walk(DamageNotices& notices)
+  {
+    Walker walker(stream_.bytes(), stream_.form());
+    Progress progress("get", stream_.bytes());
+    Event event;
+    while (!isDone() && walker.next(event))
+    {
+      progress.at(event.offset);
+      notices.see(walker, event);
+      if (event.what == What::nodeBegin)
+      {
+        visit(walker, event);
+      }
+    }
+  }
+
   bool isDone() const
   {
     return !all_ && std::all_of(wanted_.begin(), wanted_.end(), [](const auto& wanted) { return wanted->found != 0; });
@@ -124,12 +132,12 @@ private:
     }
     if (paths_)
     {
-      out_.write(walker.path(event) + "\t");
+      out_.write(walker.path(event, PathStyle::brief) + "\t");
     }
     if (node.isGroup())
     {
       // A group has no value; its path and size tell that it is there.
-      out_.write((paths_ ? "" : walker.path(event) + ": ") + "group of " +
+      out_.write((paths_ ? "" : walker.path(event, PathStyle::brief) + ": ") + "group of " +
                  counted(node.limit - node.payloadOffset(), "byte"));
     }
     else if (const auto text = plainText(stream_.bytes(), stream_.form(), node, kMostText))
@@ -147,7 +155,7 @@ private:
   {
     const Node& node = event.node;
     nlohmann::ordered_json object;
-    object["path"] = walker.path(event);
+    object["path"] = event.depth <= kMostSteps ? walker.path(event) : offsetPath(node);
     object["offset"] = node.offset();
     object["size"] = node.size();
     object["type"] = typeText(node.type());
@@ -240,10 +248,11 @@ const Registration registration{{
     .description =
         "Prints the value of the first node that each path leads to, in the order of the stream, one a line:\n"
         "texts as they are, numbers in decimal, bytes in hexadecimal. A path is made of tags, enum names or\n"
-        "ids (#12345); [2] is the second of its name among its siblings, * any one node, ** any number of\n"
-        "levels; / alone leads to the roots. Every path that any command prints is understood. On a terminal\n"
+        "ids (#12345); [2] is the second that a step finds in a group, * any one node, ** any number of\n"
+        "levels; / alone leads to the roots. Every path that a command prints whole is understood. On a terminal\n"
         "control characters of texts are written as \\x1b, as 'tav tree' does. Exit status 1: a path leads nowhere,\n"
-        "also by a name that no element has; the values of the others are printed. 2: a path is malformed.",
+        "also by a name that no element has, or damage was passed over, which is told on standard error; the other\n"
+        "values are printed. 2: a path is malformed.",
     .options = {{.names = "-a,--all", .help = "every node that a path leads to, not only the first"},
                 {.names = "--raw", .help = "the payload's bytes as they stand in the file, without line ends"},
                 {.names = "--json", .help = "one JSON object a match: path, offset, size, type, value"},

@@ -1,6 +1,4 @@
 // tav help and tav completion: what the table of options says of the program.
-#include <algorithm>
-
 #include "tools/options.h"
 #include "tools/output.h"
 #include "tools/report.h"
@@ -29,15 +27,12 @@ int help(const Invocation& invocation)
   {
     return print(helpText());
   }
-  const auto all = commands();
-  const auto found = std::find_if(all.begin(), all.end(), [&](const Command* command) {
-    return command->name == invocation.arguments().front();
-  });
-  if (found == all.end())
+  const Command* const command = findCommand(invocation.arguments().front());
+  if (command == nullptr)
   {
-    throw Failure("there is no command '" + invocation.arguments().front() + "'", "'tav --help' lists the commands");
+    failUnknownCommand(invocation.arguments().front());
   }
-  return print(helpText(**found));
+  return print(helpText(*command));
 }
 
 int complete(const Invocation& invocation)
@@ -58,6 +53,7 @@ const Registration helpRegistration{{
     .inputs = 0,
     .summary = "this list, or help on one command",
     .options = {{.names = "--man", .help = "the manual page, for man -l -"}},
+    .concerns = kNoConcern,
     .run = help,
 }};
 
@@ -67,6 +63,7 @@ const Registration completionRegistration{{
     .arguments = "bash|zsh|fish",
     .inputs = 0,
     .summary = "completion for bash, zsh or fish",
+    .concerns = kNoConcern,
     .examples = {{"source <(tav completion bash)", "complete commands and options in this shell"}},
     .run = complete,
 }};

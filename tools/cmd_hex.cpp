@@ -26,17 +26,22 @@ constexpr uint64_t kMostOfPiece = 32 * kRow; ///< bytes that are shown where no 
 class Dumper
 {
 public:
-  explicit Dumper(Stream& stream)
-      : stream_(stream), out_("-") {}
+  Dumper(Stream& stream, DamageNotices& notices)
+      : stream_(stream), notices_(notices), out_("-") {}
 
   /// Dumps from `event` on, one node with all below it or everything.
   void dump(Walker& walker, Event& event, bool oneNode)
   {
     Progress progress("hex", stream_.bytes());
     const uint64_t base = event.depth;
+    bool seen = oneNode; // on the way to it
     do
     {
       progress.at(event.offset);
+      if (!std::exchange(seen, false))
+      {
+        notices_.see(walker, event);
+      }
       if (event.what == What::nodeEnd)
       {
         if (oneNode && event.depth <= base)
@@ -45,17 +50,28 @@ public:
         }
         continue;
       }
-      damaged_ = damaged_ || event.what == What::damaged;
       heading(walker, event);
       rows(event.offset, event.length);
     } while (walker.next(event));
     out_.commit();
   }
 
+  /// Dumps all bytes of what is no stream.
+  void dumpAll(const std::string& sentence)
+  {
+    if (stream_.bytes().size() != 0)
+    {
+      out_.write("; " + sentence + "\n");
+    }
+    rows(0, stream_.bytes().size());
+    out_.commit();
+  }
+
   /// Dumps from an offset on what is left of the piece that `event` stands for, for it is no node's first byte.
   void dumpWithin(const Walker& walker, const Event& event, uint64_t offset)
   {
-    out_.write("; no node begins at " + hexOffset(offset) + ", which lies in " + walker.path(event) + "\n");
+    out_.write("; no node begins at " + hexOffset(offset) + ", which lies in " +
+               walker.path(event, PathStyle::brief) + "\n");
     heading(walker, event);
     const uint64_t left = event.length - (offset - event.offset);
     rows(offset, std::min(left, kMostOfPiece));
@@ -66,8 +82,6 @@ public:
     out_.commit();
   }
 
-  bool foundDamage() const { return damaged_; }
-
 private:
   void heading(const Walker& walker, const Event& event);
   std::string headerText(const Node& node) const;
@@ -75,8 +89,8 @@ private:
   void rows(uint64_t offset, uint64_t length);
 
   Stream& stream_;
+  DamageNotices& notices_;
   Output out_;
-  bool damaged_ = false;
 };
 
 std::string Dumper::headerText(const Node& node) const
@@ -112,7 +126,7 @@ void Dumper::heading(const Walker& walker, const Event& event)
   std::string text;
   switch (event.what)
   {
-  case What::nodeBegin: text = walker.path(event) + "\n;   " + headerText(event.node); break;
+  case What::nodeBegin: text = walker.path(event, PathStyle::brief) + "\n;   " + headerText(event.node); break;
   case What::payload:
     text = "  " + std::string(event.node.elm() == TAV_ELM_CMN_END_HDR_EYE_SIZE && event.length == layout::kEyeSizeLength
                                   ? "eye/size pair of the group"
@@ -122,7 +136,13 @@ void Dumper::heading(const Walker& walker, const Event& event)
   case What::padding: text = "  padding"; break;
   case What::pair: text = "  " + pairText(event.node, event.offset); break;
   case What::damaged: text = "damaged: " + event.reason; break;
-  case What::zeros: text = "zeros behind the stream, " + counted(event.length, "byte"); break;
+  case What::zeros:
+  {
+    const bool between = event.offset + event.length < stream_.bytes().size();
+    text = std::string("zeros ") + (between ? "between streams, " : "behind the stream, ") +
+           counted(event.length, "byte");
+    break;
+  }
   case What::unread: text = "not looked at"; break;
   default: break;
   }
@@ -168,20 +188,37 @@ void Dumper::rows(uint64_t offset, uint64_t length)
 
 int run(const Invocation& invocation)
 {
-  Stream stream = openStream(invocation, invocation.arguments().front(), true);
+  Stream stream = openStream(invocation, true);
   Walker walker(stream.bytes(), stream.form());
   Event event;
+  DamageNotices notices(stream);
+  Dumper dumper(stream, notices);
+  const Seen seen = [&](const Event& passed) { notices.see(walker, passed); };
   bool oneNode = true;
   if (invocation.has("--at") && invocation.has("--path"))
   {
     throw Failure("hex: --at and --path exclude each other");
   }
+  if (!stream.isStream() && (!invocation.has("--at") || stream.bytes().size() == 0))
+  {
+    if (!invocation.has("--path"))
+    {
+      dumper.dumpAll(noStream(stream).sentence);
+    }
+    throw Failure(kTooDamaged, noStream(stream));
+  }
   if (const auto at = invocation.number("--at"))
   {
-    if (findOffset(stream.bytes(), walker, event, *at))
+    if (findOffset(stream.bytes(), walker, event, *at, seen))
     {
-      Dumper(stream).dumpWithin(walker, event, *at);
+      event.reason = stream.isStream() ? event.reason : noStream(stream).sentence;
+      dumper.dumpWithin(walker, event, *at);
       tellStatistics(invocation, stream.bytes());
+      if (!stream.isStream())
+      {
+        throw Failure(kTooDamaged, noStream(stream));
+      }
+      notices.tell();
       return kFindings;
     }
   }
@@ -189,8 +226,9 @@ int run(const Invocation& invocation)
   {
     const Path path(invocation.text("--path"));
     PathMatcher matcher(path);
-    if (!goToMatch(walker, matcher, event))
+    if (!goToMatch(walker, matcher, event, seen))
     {
+      notices.tell();
       throw Failure(kFindings, path.noMatch(stream.bytes().name()));
     }
   }
@@ -202,10 +240,9 @@ int run(const Invocation& invocation)
       return kFine;
     }
   }
-  Dumper dumper(stream);
   dumper.dump(walker, event, oneNode);
   tellStatistics(invocation, stream.bytes());
-  return dumper.foundDamage() ? kFindings : kFine;
+  return notices.tell();
 }
 
 const Registration registration{{

@@ -1,9 +1,12 @@
 // tav info: what a file is, and why it is taken for that.
 #include <algorithm>
-#include <chrono>
 #include <cstdio>
 #include <map>
+#include <optional>
 
+#include <nlohmann/json.hpp>
+
+#include "tools/json_text.h"
 #include "tools/options.h"
 #include "tools/output.h"
 #include "tools/path.h"
@@ -32,7 +35,8 @@ struct Tally
 
 struct Counts
 {
-  uint64_t nodes = 0;
+  uint64_t nodes = 0; ///< but for end elements
+  uint64_t ends = 0;
   uint64_t groups = 0;
   uint64_t wide = 0;
   uint64_t open = 0;     ///< groups of unknown size that an end element ended
@@ -46,8 +50,9 @@ struct Counts
   uint64_t roots = 0;
   uint64_t damages = 0;
   uint64_t damagedBytes = 0;
-  uint64_t zeros = 0;
-  uint64_t end = 0; ///< where counting ended
+  uint64_t zeros = 0;        ///< at the end of the file
+  uint64_t zerosBetween = 0; ///< between its streams
+  uint64_t end = 0;          ///< where counting ended
   bool complete = true;
   std::map<uint16_t, Tally> types{};
   std::map<uint16_t, Tally> elements{};
@@ -55,7 +60,8 @@ struct Counts
 
 void countNode(const Node& node, Counts& counts)
 {
-  counts.nodes += 1;
+  const bool end = layout::isEndElement(node.elm());
+  (end ? counts.ends : counts.nodes) += 1;
   counts.groups += node.isGroup() ? 1 : 0;
   counts.wide += node.is64() ? 1 : 0;
   counts.roots += node.depth == 0 ? 1 : 0;
@@ -65,6 +71,10 @@ void countNode(const Node& node, Counts& counts)
   counts.extras += node.has(kExtra) ? 1 : 0;
   counts.depth = std::max(counts.depth, node.depth + 1);
   counts.pairs += node.elm() == TAV_ELM_CMN_END_HDR_EYE_SIZE ? 1 : 0;
+  if (end)
+  {
+    return;
+  }
   const uint64_t bytes = node.headerLength() + (node.isGroup() ? 0 : node.size());
   for (Tally* const tally : {&counts.types[node.type()], &counts.elements[node.elm()]})
   {
@@ -73,7 +83,7 @@ void countNode(const Node& node, Counts& counts)
   }
 }
 
-void countEvent(const Event& event, Counts& counts)
+void countEvent(const Event& event, uint64_t fileBytes, Counts& counts)
 {
   counts.end = event.offset + event.length;
   switch (event.what)
@@ -90,7 +100,7 @@ void countEvent(const Event& event, Counts& counts)
     counts.damages += 1;
     counts.damagedBytes += event.length;
     break;
-  case What::zeros: counts.zeros = event.length; break;
+  case What::zeros: (counts.end < fileBytes ? counts.zerosBetween : counts.zeros) += event.length; break;
   case What::unread:
     counts.complete = false;
     counts.end = event.offset;
@@ -99,7 +109,7 @@ void countEvent(const Event& event, Counts& counts)
   }
 }
 
-Counts countAll(Stream& stream, bool full)
+Counts countAll(Stream& stream, bool full, DamageNotices& notices)
 {
   Counts counts;
   ByteSource& source = stream.bytes();
@@ -110,7 +120,8 @@ Counts countAll(Stream& stream, bool full)
   while (walker.next(event))
   {
     progress.at(event.offset);
-    countEvent(event, counts);
+    notices.see(walker, event);
+    countEvent(event, source.size(), counts);
     const bool enough = counts.nodes >= kNodes || source.bytesRead() - readBefore > kRead;
     if (!full && enough && counts.end < source.size())
     {
@@ -195,7 +206,7 @@ std::string openText(const Counts& counts)
 
 void printCounts(Printer& print, const Counts& counts, uint64_t fileBytes)
 {
-  const uint64_t narrow = counts.nodes - counts.wide;
+  const uint64_t narrow = counts.nodes + counts.ends - counts.wide;
   const std::string mixed = std::to_string(counts.wide) + " 64-bit, " + std::to_string(narrow) + " 32-bit";
   print.line("headers", counts.wide == 0 ? "32-bit" : narrow == 0 ? "64-bit"
                                                                   : mixed);
@@ -205,6 +216,7 @@ void printCounts(Printer& print, const Counts& counts, uint64_t fileBytes)
     print.line("UTF-8 strings", std::to_string(counts.extras) + " with two uncounted bytes behind them");
   }
   print.line("nodes", std::to_string(counts.nodes) + ", of them " + counted(counts.groups, "group"));
+  print.line("end elements", counts.ends == 0 ? "none" : std::to_string(counts.ends));
   print.line("roots", std::to_string(counts.roots));
   print.line("depth", std::to_string(counts.depth));
   print.line("open groups", openText(counts));
@@ -215,6 +227,10 @@ void printCounts(Printer& print, const Counts& counts, uint64_t fileBytes)
   print.line("damaged", counts.damages == 0
                             ? "none found"
                             : counted(counts.damagedBytes, "byte") + " in " + counted(counts.damages, "place"));
+  if (counts.zerosBetween != 0)
+  {
+    print.line("zeros between", byteText(counts.zerosBetween));
+  }
   if (counts.zeros != 0)
   {
     print.line("zeros at the end", byteText(counts.zeros));
@@ -224,32 +240,91 @@ void printCounts(Printer& print, const Counts& counts, uint64_t fileBytes)
                                               "; --full counts everything");
 }
 
-int run(const Invocation& invocation)
+using Json = nlohmann::ordered_json;
+
+Json formJson(const Form& form)
 {
-  Stream stream = openStream(invocation, invocation.arguments().front(), true);
+  return {{"byteOrder", form.swapped != kor::isLittleEndian ? "little" : "big"},
+          {"root", form.root64 ? 64 : 32},
+          {"aligned", form.aligned}};
+}
+
+Json countsJson(const Counts& counts)
+{
+  return {{"complete", counts.complete},
+          {"bytes", counts.end},
+          {"nodes", counts.nodes},
+          {"groups", counts.groups},
+          {"roots", counts.roots},
+          {"depth", counts.depth},
+          {"headers64", counts.wide},
+          {"headers32", counts.nodes - counts.wide},
+          {"eyeSizePairs", counts.pairs},
+          {"extraStrings", counts.extras},
+          {"openGroups", counts.complete ? counts.open + counts.unclosed : counts.begun},
+          {"unclosedGroups", counts.unclosed},
+          {"cutGroups", counts.cut},
+          {"damagedPlaces", counts.damages},
+          {"damagedBytes", counts.damagedBytes},
+          {"zerosBetween", counts.zerosBetween},
+          {"zerosAtEnd", counts.zeros}};
+}
+
+Json infoJson(const Stream& stream, const Counts* counts)
+{
   const Recognition& found = stream.recognition;
-  Output out("-");
+  Json object = {{"file", stream.source->name()}, {"bytes", stream.source->size()}, {"stream", stream.isStream()}};
+  if (stream.kind)
+  {
+    object["kind"] = stream.kind->name;
+  }
+  if (counts != nullptr)
+  {
+    object["damagedStart"] = found.damagedStart;
+    object["ambiguous"] = found.ambiguous();
+    object["form"] = formJson(found.form);
+    object["alternatives"] = Json::array();
+    for (const Form& form : found.alternatives)
+    {
+      object["alternatives"].push_back(formJson(form));
+    }
+    object["counted"] = countsJson(*counts);
+    object["types"] = Json::array();
+    for (const auto& [type, tally] : counts->types)
+    {
+      object["types"].push_back({{"type", jsonTypeName(type).value_or(std::to_string(type))},
+                                 {"nodes", tally.nodes},
+                                 {"bytes", tally.bytes}});
+    }
+    object["elements"] = Json::array();
+    for (const auto& [elm, tally] : counts->elements)
+    {
+      object["elements"].push_back(
+          {{"element", elementText(elm)}, {"id", elm}, {"nodes", tally.nodes}, {"bytes", tally.bytes}});
+    }
+  }
+  object["because"] = stream.isStream() ? found.because : std::vector<std::string>{noStream(stream).sentence};
+  return object;
+}
+
+void printText(const Stream& stream, const Counts* counts, bool full, Output& out)
+{
+  const Recognition& found = stream.recognition;
   Printer print(out);
-  print.line("file", stream.bytes().name() + ", " + byteText(stream.bytes().size()));
-  Status status = kFine;
-  if (!found.isStream)
+  print.line("file", shown(stream.source->name()) + ", " + byteText(stream.source->size()));
+  if (counts == nullptr)
   {
     print.line("stream", "no");
-    status = kTooDamaged;
+    print.line("because", noStream(stream).sentence);
+    return;
   }
-  else
-  {
-    const bool full = invocation.has("--full");
-    const Counts counts = countAll(stream, full);
-    print.line("stream", found.damagedStart ? "yes, with a damaged start" : counts.damages != 0 ? "yes, damaged"
-                                                                                                : "yes");
-    printForm(print, stream);
-    printCounts(print, counts, stream.bytes().size());
-    print.tallies("type", counts.types, typeName, full ? ~size_t{0} : 20);
-    print.tallies("element", counts.elements, elementText, full ? ~size_t{0} : 12);
-    out.write("\n");
-    status = counts.damages != 0 || found.ambiguous() ? kFindings : kFine;
-  }
+  print.line("stream", found.damagedStart ? "yes, with a damaged start" : counts->damages != 0 ? "yes, damaged"
+                                                                                               : "yes");
+  printForm(print, stream);
+  printCounts(print, *counts, stream.source->size());
+  print.tallies("type", counts->types, typeName, full ? ~size_t{0} : 20);
+  print.tallies("element", counts->elements, elementText, full ? ~size_t{0} : 12);
+  out.write("\n");
   for (const std::string& reason : found.because)
   {
     print.line("because", reason);
@@ -258,9 +333,29 @@ int run(const Invocation& invocation)
   {
     print.line("or", formText(form));
   }
+}
+
+int run(const Invocation& invocation)
+{
+  Stream stream = openStream(invocation, true);
+  const bool full = invocation.has("--full");
+  DamageNotices notices(stream);
+  const std::optional<Counts> counts =
+      stream.isStream() ? std::optional(countAll(stream, full, notices)) : std::nullopt;
+  Output out("-");
+  if (invocation.has("--json"))
+  {
+    out.write(infoJson(stream, counts ? &*counts : nullptr).dump(1, ' ', false, Json::error_handler_t::replace) + "\n");
+  }
+  else
+  {
+    printText(stream, counts ? &*counts : nullptr, full, out);
+  }
   out.commit();
   tellStatistics(invocation, stream.bytes());
-  return status;
+  const bool found = notices.tell() != kFine || stream.recognition.ambiguous();
+  return !counts ? kTooDamaged : found ? kFindings
+                                       : kFine;
 }
 
 const Registration registration{{
@@ -271,8 +366,10 @@ const Registration registration{{
     .description =
         "Nothing in a stream says how to read it: the ways are tried and compared, and the reasons are told.\n"
         "\"ambiguous\" means that two ways explain the bytes equally well and find different nodes. Large\n"
-        "files are counted in part unless --full is given. Exit status 1: damaged or ambiguous; 3: no stream.",
-    .options = {{.names = "--full", .help = "count the whole file, and list all types and elements"}},
+        "files are counted in part unless --full is given. Exit status 1: damaged, each place with a line on\n"
+        "standard error, or ambiguous; 3: no stream.",
+    .options = {{.names = "--full", .help = "count the whole file, and list all types and elements"},
+                {.names = "--json", .help = "one JSON object, with all types and elements that were counted"}},
     .examples = {{"tav info x.tav", "what x.tav is"},
                  {"tav info --byte-order big x.tav", "what it would be if it were big-endian"}},
     .run = run,

@@ -27,26 +27,37 @@ int run(const Invocation& invocation)
   const JsonStyle style = styleOf(invocation);
   Output out(invocation.text("--output", "-"), invocation.has("--force"));
   // Also what is no stream at all is handed out: as damaged bytes.
-  Stream stream = openStream(invocation, invocation.arguments().at(0), true);
+  Stream stream = openStream(invocation, true);
   Walker walker(stream.bytes(), stream.form());
   Progress progress("json", stream.bytes());
   JsonWriter writer(stream.bytes(), stream.form(), out, style, invocation.has("--safe"));
   writer.begin();
   Event event;
-  while (walker.next(event))
+  if (!stream.isStream() && stream.bytes().size() != 0)
   {
+    event.what = What::damaged;
+    event.length = stream.bytes().size();
+    event.reason = noStream(stream).sentence;
+    writer.add(walker, event);
+  }
+  DamageNotices notices(stream);
+  while (stream.isStream() && walker.next(event))
+  {
+    notices.see(walker, event);
     progress.at(event.offset);
     writer.add(walker, event);
   }
   writer.end();
   out.commit();
   tellStatistics(invocation, stream.bytes());
-  if (!stream.recognition.isStream && stream.bytes().size() != 0)
+  if (!stream.isStream())
   {
-    report(Problem{.file = stream.bytes().name(), .sentence = "no node is found; all bytes are given as they are"});
+    Problem problem = noStream(stream);
+    problem.sentence += stream.bytes().size() == 0 ? "" : "; all bytes are given as they are";
+    report(problem);
     return kTooDamaged;
   }
-  return writer.foundDamage() ? kFindings : kFine;
+  return notices.tell();
 }
 
 const Registration registration{{
@@ -57,8 +68,8 @@ const Registration registration{{
     .description =
         "Every byte of the file can be made again from the JSON: 'tav json X | tav build -o Y' gives the bytes\n"
         "of X, damaged parts included. Numbers, texts and dates are values where that is exactly\n"
-        "reversible; other bytes are hexadecimal. docs/json.md describes every key. Exit status 1: some\n"
-        "bytes are no node; 3: nothing in the file is one.\n\n"
+        "reversible; other bytes are hexadecimal. share/doc/tav-tools/json.md describes every key. Exit\n"
+        "status 1: some bytes are no node; 3: nothing in the file is one.\n\n"
         "With --lines the first line is the form, and every node, or damaged part, is an object in a line\n"
         "of its own with path, offset and depth, for jq and grep; 'tav build' reads that, too.",
     .options = {{.names = "-o,--output",

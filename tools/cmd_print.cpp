@@ -54,6 +54,17 @@ uint64_t printOptions(const Invocation& invocation)
          bit("--attributes", TAV_PRINT_ATTRIBUTES | TAV_PRINT_XML) | TAV_PRINT_DATA;
 }
 
+/// Walks over what the library prints, for it may end at damage, or before a second stream, without a word. `event` is
+/// the first of its events.
+void seeRest(Walker& walker, Event& event, bool oneNode, DamageNotices& notices)
+{
+  const uint64_t base = event.depth;
+  while (!(oneNode && event.what == What::nodeEnd && event.depth <= base) && walker.next(event))
+  {
+    notices.see(walker, event);
+  }
+}
+
 /// Whether standard output took everything. Throws when not.
 void checkOutput()
 {
@@ -73,10 +84,11 @@ int run(const Invocation& invocation)
   bool hasStart = false;
   bool group = true;
   Walker walker(stream.bytes(), stream.form());
+  DamageNotices notices(stream);
   Event event;
   if (const auto at = invocation.number("--at"))
   {
-    goToOffset(stream.bytes(), walker, event, *at);
+    goToOffset(stream.bytes(), walker, event, *at, [&](const Event& seen) { notices.see(walker, seen); });
     start.header = event.node.header;
     group = event.node.isGroup();
     hasStart = true;
@@ -84,10 +96,12 @@ int run(const Invocation& invocation)
   else
   {
     walker.next(event);
+    notices.see(walker, event);
   }
   if (invocation.has("--bare") && event.node.isGroup())
   {
-    throw Failure("print: " + walker.path(event) + " is a group, which has no value of its own for --bare",
+    throw Failure("print: " + walker.path(event, PathStyle::brief) +
+                      " is a group, which has no value of its own for --bare",
                   "--at OFFSET leads to a node with a value: 'tav tree' lists offsets; 'tav get' finds it by path");
   }
   const Handle handle = openHandle(invocation, stream);
@@ -110,6 +124,8 @@ int run(const Invocation& invocation)
     std::fputc('\n', stdout); // a single value has no line end of its own
   }
   checkOutput();
+  seeRest(walker, event, hasStart, notices);
+  const Status status = notices.tell();
   if (code != TAV_RC_OK)
   {
     fail(
@@ -117,7 +133,7 @@ int run(const Invocation& invocation)
         "it prints no UTF-8 strings, no Sint128, no unknown types and no damaged streams; 'tav tree' and 'tav xml' do");
   }
   tellStatistics(invocation, stream.bytes());
-  return kFine;
+  return status;
 }
 
 const Registration registration{{
@@ -128,7 +144,8 @@ const Registration registration{{
     .description =
         "What tavPrintSubtree makes of the stream, to the letter: its XML is not escaped, its dates are off by\n"
         "a day in some places, and it stops at the first node that it cannot print, with exit status 3.\n"
-        "'tav tree', 'tav xml' and 'tav json' have none of these limits.",
+        "'tav tree', 'tav xml' and 'tav json' have none of these limits. Damage that it passes over, and streams\n"
+        "behind the first in another form, are told on standard error; the exit status is then 1.",
     .options = {{.names = "--xml", .help = "XML instead of text"},
                 {.names = "--headers", .help = "each node's header"},
                 {.names = "--descriptors", .help = "the lines of the node descriptor"},

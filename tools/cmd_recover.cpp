@@ -1,6 +1,4 @@
 // tav recover: a sound stream of what is whole in a damaged one.
-#include <deque>
-#include <optional>
 #include <utility>
 #include <vector>
 
@@ -9,7 +7,7 @@
 #include "tools/options.h"
 #include "tools/output.h"
 #include "tools/progress.h"
-#include "tools/recovery.h"
+#include "tools/recoveryForms.h"
 #include "tools/report.h"
 #include "tools/session.h"
 
@@ -19,34 +17,7 @@ namespace tav::tool
 namespace
 {
 
-constexpr size_t kMostListed = 1000; ///< losses that are listed; the totals have all
-
-/// What came of one way of reading.
-struct Account
-{
-  Form form{};
-  RecoveryTotals totals{};
-  std::deque<Loss> losses{};
-  uint64_t bytes = 0;
-  uint64_t written = 0;
-
-  bool lostNothing() const { return totals.lost + totals.unread == 0; }
-  /// Nodes come first. Bytes say nothing of padding: with it, damaged ones are taken for some.
-  bool keepsMoreThan(const Account& other) const
-  {
-    const bool likePadding = form.swapped == other.form.swapped && form.root64 == other.form.root64;
-    return totals.nodes != other.totals.nodes ? totals.nodes > other.totals.nodes
-                                              : !likePadding && totals.kept > other.totals.kept;
-  }
-};
-
-/// The way that was taken, and the other one that was tried where it was in doubt.
-struct Outcome
-{
-  Account taken{};
-  std::optional<Account> other{};
-  std::vector<Form> alternatives{}; ///< that were about as likely at the first look
-};
+constexpr size_t kMostListed = 1000; ///< losses that are listed, and doubts; the totals have all
 
 nlohmann::ordered_json formJson(const Form& form)
 {
@@ -73,6 +44,7 @@ std::string asJson(const std::string& name, const Outcome& outcome)
   object["zerosKept"] = totals.zeros;
   object["written"] = account.written;
   object["nodes"] = totals.nodes;
+  object["endElements"] = totals.ends;
   object["groupsClosed"] = totals.closed;
   object["groupsMade"] = totals.made;
   object["pairsMade"] = totals.pairs;
@@ -81,6 +53,12 @@ std::string asJson(const std::string& name, const Outcome& outcome)
   for (const Loss& loss : account.losses)
   {
     object["list"].push_back({{"offset", loss.offset}, {"length", loss.length}, {"reason", loss.reason}});
+  }
+  object["doubts"] = totals.doubts;
+  object["doubtful"] = nlohmann::ordered_json::array();
+  for (const Doubt& doubt : account.doubts)
+  {
+    object["doubtful"].push_back({{"offset", doubt.offset}, {"length", doubt.length}, {"reason", doubt.reason}});
   }
   return object.dump(1, ' ', false, nlohmann::json::error_handler_t::replace) + "\n";
 }
@@ -119,13 +97,23 @@ std::string asText(const std::string& name, const Outcome& outcome)
   {
     text += "tav: " + name + ": and " + std::to_string(totals.losses - account.losses.size()) + " more losses\n";
   }
-  text += "nodes            " + std::to_string(totals.nodes) + "\n" +
-          "groups closed    " + std::to_string(totals.closed) + ", of open groups and such with a wrong size\n" +
-          "groups made      " + std::to_string(totals.made) + ", for nodes that have lost their own\n" +
-          "pairs made       " + std::to_string(totals.pairs) + "\n" +
-          "bytes            " + std::to_string(account.bytes) + " = " + std::to_string(totals.kept) + " kept + " +
-          std::to_string(totals.lost) + " lost + " + std::to_string(totals.unread) + " unread\n" +
-          "written          " + std::to_string(account.written) + "\n";
+  for (const Doubt& doubt : account.doubts)
+  {
+    text += "tav: " + name + ": " + hexOffset(doubt.offset) + ": the node of " + counted(doubt.length, "byte") +
+            " is doubtful: it " + doubt.reason + "\n";
+  }
+  if (totals.doubts > account.doubts.size())
+  {
+    text +=
+        "tav: " + name + ": and " + std::to_string(totals.doubts - account.doubts.size()) + " more doubtful nodes\n";
+  }
+  text += "nodes            " + std::to_string(totals.nodes) + ", " + std::to_string(totals.doubts) +
+          " of them doubtful\n" + "end elements     " + std::to_string(totals.ends) + "\n" + "groups closed    " +
+          std::to_string(totals.closed) + ", of open groups and such with a wrong size\n" + "groups made      " +
+          std::to_string(totals.made) + ", for nodes that have lost their own\n" + "pairs made       " +
+          std::to_string(totals.pairs) + "\n" + "bytes            " + std::to_string(account.bytes) + " = " +
+          std::to_string(totals.kept) + " kept + " + std::to_string(totals.lost) + " lost + " +
+          std::to_string(totals.unread) + " unread\n" + "written          " + std::to_string(account.written) + "\n";
   return text;
 }
 
@@ -138,7 +126,7 @@ void putReport(const Invocation& invocation, const std::string& output, const st
     out.commit();
     return;
   }
-  if (output == "-")
+  if (isStandardOutput(output))
   {
     std::fputs(text.c_str(), stderr);
     return;
@@ -148,69 +136,6 @@ void putReport(const Invocation& invocation, const std::string& output, const st
   out.commit();
 }
 
-Account recoverInto(const Invocation& invocation, ByteSource& source, const Form& form, PatchFile& file)
-{
-  Account account;
-  account.form = form;
-  Progress progress("recover", source.size());
-  Rebuilder rebuilder(source, form, file, [&](uint64_t offset) { progress.at(offset); });
-  Recovery recovery(source, form, rebuilder, invocation.number("--search").value_or(kNoOffset),
-                    [&](const Loss& loss) {
-                      if (account.losses.size() < kMostListed)
-                      {
-                        account.losses.push_back(loss);
-                      }
-                    });
-  while (recovery.step())
-  {
-    progress.at(recovery.position());
-  }
-  account.totals = recovery.totals();
-  account.bytes = source.size();
-  account.written = file.length();
-  return account;
-}
-
-void copy(PatchFile& from, PatchFile& to)
-{
-  std::vector<uint8_t> piece(size_t{64} * 1024);
-  for (uint64_t at = 0; at < from.length();)
-  {
-    const size_t count = from.read(at, piece);
-    to.append(std::span<const uint8_t>(piece).first(count));
-    at += count;
-  }
-}
-
-/// Where another way of reading is not far off, both are tried, and the one that keeps more is taken; of equals the
-/// likelier one.
-Outcome recoverBest(const Invocation& invocation, Stream& stream, PatchFile& file)
-{
-  const Recognition& found = stream.recognition;
-  Outcome outcome{.alternatives = found.alternatives};
-  if (!found.runnerUp)
-  {
-    outcome.taken = recoverInto(invocation, stream.bytes(), found.form, file);
-    return outcome;
-  }
-  PatchFile first;
-  outcome.taken = recoverInto(invocation, stream.bytes(), found.form, first);
-  if (outcome.taken.lostNothing())
-  {
-    copy(first, file);
-    return outcome;
-  }
-  PatchFile second;
-  outcome.other = recoverInto(invocation, stream.bytes(), *found.runnerUp, second);
-  const bool swap = outcome.other->keepsMoreThan(outcome.taken);
-  if (swap)
-  {
-    std::swap(outcome.taken, *outcome.other);
-  }
-  copy(swap ? second : first, file);
-  return outcome;
-}
-
 int run(const Invocation& invocation)
 {
   const std::string output = invocation.text("--output");
@@ -218,23 +143,27 @@ int run(const Invocation& invocation)
   {
     throw Failure("recover: -o OUT is missing", "- is standard output");
   }
-  Stream stream = openStream(invocation, invocation.arguments().front(), true);
+  Stream stream = openStream(invocation, true);
   Outcome outcome;
   {
     Output out(output, invocation.has("--force"));
     PatchFile file(out);
-    outcome = recoverBest(invocation, stream, file);
+    Progress progress("recover", stream.bytes().size());
+    FormRecovery recovery(stream.bytes(), invocation.number("--search").value_or(kNoOffset), kMostListed,
+                          [&](uint64_t offset) { progress.at(offset); });
+    outcome = recovery.run(stream.recognition, file);
     if (outcome.taken.totals.nodes == 0)
     {
       Problem problem{stream.source->name()};
       problem.sentence = "nothing in it is whole";
       problem.hint = "'tav info' tells what was tried; --byte-order, --root and --align say how to read it";
-      throw Failure(kTooDamaged, problem);
+      throw Failure(kTooDamaged, stream.isStream() ? problem : noStream(stream));
     }
     file.finish();
   }
   const std::string& name = stream.source->name();
-  putReport(invocation, output, invocation.has("--json") ? asJson(name, outcome) : asText(name, outcome));
+  const std::string seen = invocation.has("--report") ? name : shown(name, isStandardOutput(output) ? stderr : stdout);
+  putReport(invocation, output, invocation.has("--json") ? asJson(name, outcome) : asText(seen, outcome));
   tellStatistics(invocation, stream.bytes());
   const RecoveryTotals& totals = outcome.taken.totals;
   return totals.lost + totals.unread + totals.closed + totals.made + totals.pairs == 0 ? kFine : kFindings;
@@ -251,8 +180,9 @@ const Registration registration{{
         "that\n"
         "have lost all groups around them. The report accounts for every byte: kept + lost + unread is the file's "
         "size.\n"
-        "Where the form is in doubt and something is lost, a second one is tried; the one that keeps more nodes is\n"
-        "taken, and the report says that it is a guess. --byte-order, --root and --align tell the form.\n"
+        "Where the start is damaged and something is lost, every form that nothing refutes is tried; the one that\n"
+        "keeps most is taken, and the report names the runner-up. --byte-order, --root and --align tell the form.\n"
+        "Nodes beside lost bytes that may be none are marked as doubtful.\n"
         "Exit status 1: something was lost or repaired; 3: nothing is whole, and no file is written.",
     .options = {{.names = "-o,--output",
                  .kind = ValueKind::file,

@@ -136,7 +136,7 @@ int run(const Invocation& invocation)
                   "only 64-bit headers can announce an eye/size pair");
   }
   Output out(invocation.text("--output", "-"), invocation.has("--force"));
-  if (invocation.text("--output", "-") == "-" && kor::isTerminal(stdout))
+  if (isStandardOutput(invocation.text("--output", "-")) && kor::isTerminal(stdout))
   {
     throw Failure("snapshot: a stream is no text for a terminal", "-o FILE writes it to a file");
   }
@@ -169,6 +169,7 @@ const Registration registration{{
                  .help = "where to; standard output unless given"},
                 {.names = "--eye-size", .help = "end every node with an eye/size pair"},
                 {.names = "--hdr32", .help = "32-bit headers, as with --root 32"}},
+    .concerns = kForm | kCalls,
     .examples = {{"tav snapshot -o x.tav", "write one"},
                  {"tav snapshot --byte-order big --align -o y.tav", "in another form"},
                  {"tav snapshot | tav tree -", "look at this machine"}},

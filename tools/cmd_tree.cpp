@@ -1,6 +1,7 @@
 // tav tree: one line a node.
 #include <algorithm>
 #include <cstdio>
+#include <utility>
 
 #include "kor/host.h"
 #include "tools/locate.h"
@@ -60,12 +61,17 @@ public:
   }
 
   /// Prints what `walker` hands out from `event` on; `base` is the depth that is not indented.
-  void print(Walker& walker, Event& event, uint64_t base, bool oneNode)
+  void print(Walker& walker, Event& event, uint64_t base, bool oneNode, DamageNotices& notices)
   {
     Progress progress("tree", stream_.bytes());
+    bool seen = oneNode; // on the way to it
     do
     {
       progress.at(event.offset);
+      if (!std::exchange(seen, false))
+      {
+        notices.see(walker, event);
+      }
       line(walker, event, base);
       if (event.what == What::nodeBegin && event.node.isGroup() && event.depth - base >= maxDepth_)
       {
@@ -79,7 +85,6 @@ public:
     out_.commit();
   }
 
-  bool foundDamage() const { return damaged_; }
   bool printedNothing() const { return lines_ == 0; }
 
 private:
@@ -97,7 +102,6 @@ private:
   bool paths_;
   uint64_t maxDepth_;
   std::vector<uint16_t> only_{};
-  bool damaged_ = false;
   uint64_t lines_ = 0;
 };
 
@@ -105,7 +109,7 @@ std::string TreePrinter::label(const Walker& walker, const Event& event, uint64_
 {
   if (paths_ || !only_.empty())
   {
-    return walker.path(event);
+    return walker.path(event, PathStyle::brief);
   }
   std::string text;
   if (level > kMaxIndent)
@@ -145,11 +149,12 @@ void TreePrinter::line(const Walker& walker, const Event& event, uint64_t base)
   const uint64_t level = event.depth - std::min(base, event.depth);
   if (event.what == What::damaged)
   {
-    damaged_ = true;
     put(event.offset, std::to_string(event.length), label(walker, event, level), "damaged", "", event.reason);
     return;
   }
-  if (event.what == What::unread || (event.what == What::zeros && event.length > uint64_t{2} * 1024 * 1024))
+  const bool between = event.offset + event.length < stream_.bytes().size();
+  if (event.what == What::unread ||
+      (event.what == What::zeros && (between || event.length > uint64_t{2} * 1024 * 1024)))
   {
     put(event.offset, std::to_string(event.length), "", event.what == What::zeros ? "zeros" : "unread", "", "");
     return;
@@ -207,19 +212,20 @@ int run(const Invocation& invocation)
   Stream stream = openStream(invocation);
   Walker walker(stream.bytes(), stream.form());
   TreePrinter printer(invocation, stream);
+  DamageNotices notices(stream);
   Event event;
   const auto at = invocation.number("--at");
   if (at)
   {
-    goToOffset(stream.bytes(), walker, event, *at);
-    printer.print(walker, event, event.depth, true);
+    goToOffset(stream.bytes(), walker, event, *at, [&](const Event& seen) { notices.see(walker, seen); });
+    printer.print(walker, event, event.depth, true, notices);
   }
   else if (walker.next(event))
   {
-    printer.print(walker, event, 0, false);
+    printer.print(walker, event, 0, false, notices);
   }
   tellStatistics(invocation, stream.bytes());
-  return printer.foundDamage() || (invocation.has("--only") && printer.printedNothing()) ? kFindings : kFine;
+  return notices.tell() != kFine || (invocation.has("--only") && printer.printedNothing()) ? kFindings : kFine;
 }
 
 const Registration registration{{

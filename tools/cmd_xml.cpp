@@ -105,8 +105,6 @@ public:
     }
   }
 
-  bool foundDamage() const { return damaged_; }
-
 private:
   void indent(uint64_t depth) { out_.write(std::string(static_cast<size_t>(1 + std::min(depth, kMaxIndent)), ' ')); }
 
@@ -131,7 +129,6 @@ private:
   ByteSource& source_;
   Form form_;
   Output& out_;
-  bool damaged_ = false;
   std::vector<uint8_t> buffer_{};
 };
 
@@ -323,7 +320,6 @@ void XmlWriter::putDamage(const Event& event)
   attribute("length", std::to_string(event.length));
   if (event.what == What::damaged)
   {
-    damaged_ = true;
     attribute("reason", event.reason);
     attribute("encoding", "hex");
   }
@@ -343,16 +339,18 @@ int run(const Invocation& invocation)
   Progress progress("xml", stream.bytes());
   XmlWriter writer(stream, out);
   writer.begin();
+  DamageNotices notices(stream);
   Event event;
   while (walker.next(event))
   {
+    notices.see(walker, event);
     progress.at(event.offset);
     writer.add(event);
   }
   writer.end();
   out.commit();
   tellStatistics(invocation, stream.bytes());
-  return writer.foundDamage() ? kFindings : kFine;
+  return notices.tell();
 }
 
 const Registration registration{{

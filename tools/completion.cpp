@@ -7,17 +7,6 @@ namespace tav::tool
 namespace
 {
 
-/// All names of an option: "-o", "--output".
-std::vector<std::string> namesOf(const OptionSpec& option)
-{
-  const size_t comma = option.names.find(',');
-  if (comma == std::string::npos)
-  {
-    return {option.names};
-  }
-  return {option.names.substr(0, comma), option.names.substr(comma + 1)};
-}
-
 std::string joined(const std::vector<std::string>& words, const std::string& between)
 {
   std::string text;
@@ -38,13 +27,6 @@ std::string commandNames()
   return joined(names, " ");
 }
 
-std::vector<OptionSpec> optionsOf(const Command& command)
-{
-  std::vector<OptionSpec> options = command.options;
-  options.insert(options.end(), globalOptions().begin(), globalOptions().end());
-  return options;
-}
-
 /// Single quotes for a shell.
 std::string inQuotes(const std::string& text)
 {
@@ -59,7 +41,7 @@ std::string inQuotes(const std::string& text)
 std::string bashChoices(const Command& command)
 {
   std::string text;
-  for (const OptionSpec& option : optionsOf(command))
+  for (const OptionSpec& option : allOptions(command))
   {
     if (option.kind == ValueKind::choice)
     {
@@ -86,7 +68,7 @@ std::string bash()
   for (const Command* command : commands())
   {
     std::vector<std::string> names;
-    for (const OptionSpec& option : optionsOf(*command))
+    for (const OptionSpec& option : allOptions(*command))
     {
       names.push_back(joined(namesOf(option), " "));
     }
@@ -131,7 +113,7 @@ std::string zsh()
   for (const Command* command : commands())
   {
     text += "    " + command->name + ")\n      shift words; ((CURRENT--))\n      _arguments";
-    for (const OptionSpec& option : optionsOf(*command))
+    for (const OptionSpec& option : allOptions(*command))
     {
       text += zshOption(option);
     }
@@ -161,7 +143,7 @@ std::string fish()
   for (const Command* command : commands())
   {
     text += "complete -c tav -n __fish_use_subcommand -a " + command->name + " -d " + inQuotes(command->summary) + "\n";
-    for (const OptionSpec& option : optionsOf(*command))
+    for (const OptionSpec& option : allOptions(*command))
     {
       text += fishOption("__fish_seen_subcommand_from " + command->name, option);
     }

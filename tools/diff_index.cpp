@@ -42,7 +42,7 @@ Node nodeOf(const Row& row)
 
 } // namespace
 
-DiffIndex::DiffIndex(Stream& stream, const std::vector<Path>& ignored)
+DiffIndex::DiffIndex(Stream& stream, const std::vector<Path>& ignored, DamageNotices& notices)
     : stream_(stream)
 {
   std::vector<PathMatcher> matchers;
@@ -57,6 +57,7 @@ DiffIndex::DiffIndex(Stream& stream, const std::vector<Path>& ignored)
   while (walker.next(event))
   {
     progress.at(event.offset);
+    notices.see(walker, event);
     add(event, matchers);
   }
 }

@@ -39,8 +39,9 @@ struct Row
 class DiffIndex
 {
 public:
-  /// Walks the stream. Nodes that a path of `ignored` leads to are left out, with all below them.
-  DiffIndex(Stream& stream, const std::vector<Path>& ignored);
+  /// Walks the stream; `notices` sees all of it. Nodes that a path of `ignored` leads to are left out, with all below
+  /// them.
+  DiffIndex(Stream& stream, const std::vector<Path>& ignored, DamageNotices& notices);
 
   uint64_t rows() const { return count_; }
   Row row(uint64_t number);

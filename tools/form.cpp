@@ -339,6 +339,72 @@ double margin(const Trial& best, const Trial& other)
   return (other.rate() - best.rate()) * static_cast<double>(std::min(best.extent, other.extent));
 }
 
+/// Whether the first bytes say how to read the file: a usual root, and what is in it follows. The last 8 bytes of a
+/// 64-bit header look like an empty 32-bit root.
+bool isStartSound(ByteSource& source, const Trial& best)
+{
+  Prober prober(source, best.form, 0);
+  return best.isExact() ||
+         (best.first.offset() == 0 && best.root == RootBelief::usual && (best.form.root64 || best.first.size() != 0) &&
+          (best.first.has(kOverrun) || prober.judge(0, best.form.root64, source.size()) == Belief::followed));
+}
+
+/// Whether eye catchers tell that the other byte order is the right one.
+bool isOrderRefuted(const std::vector<Trial>& trials, bool swapped)
+{
+  constexpr uint64_t enough = 4;
+  bool refuted = false;
+  for (const Trial& trial : trials)
+  {
+    if (trial.form.swapped == swapped && trial.eyes != 0)
+    {
+      return false;
+    }
+    refuted = refuted || (trial.form.swapped != swapped && trial.eyes >= enough && trial.otherEyes == 0);
+  }
+  return refuted;
+}
+
+/// Whether the headers tell that payloads are padded, or that they are not. A few are found by chance.
+bool isPaddingRefuted(const std::vector<Trial>& trials, const Form& form)
+{
+  constexpr uint64_t enough = 16;
+  return std::any_of(trials.begin(), trials.end(), [&](const Trial& trial) {
+    return trial.form.swapped == form.swapped && trial.form.root64 == form.root64 && trial.wide >= enough &&
+           trial.wide > trial.nodes / 2 && trial.alignBits == (form.aligned ? 0 : trial.wide);
+  });
+}
+
+Form formOf(const Trial& trial)
+{
+  Form form = trial.form;
+  form.extra = trial.extras > trial.plainStrings;
+  return form;
+}
+
+/// The ways that may be the right one where the start is damaged, the likeliest first, those together that differ in
+/// the padding alone. One that finds no node in all of the file is refuted where another one finds some.
+std::vector<Form> notRefuted(const ByteSource& source, const std::vector<Trial>& trials)
+{
+  std::vector<Form> forms;
+  const bool found = !trials.empty() && trials.front().nodes != 0;
+  for (const Trial& first : trials)
+  {
+    for (const Trial& trial : trials)
+    {
+      const Form form = formOf(trial);
+      const bool together = form.swapped == first.form.swapped && form.root64 == first.form.root64;
+      if (together && (trial.nodes != 0 || !found || trial.extent < source.size()) &&
+          !isOrderRefuted(trials, form.swapped) && !isPaddingRefuted(trials, form) &&
+          std::find(forms.begin(), forms.end(), form) == forms.end())
+      {
+        forms.push_back(form);
+      }
+    }
+  }
+  return forms;
+}
+
 void explainPadding(const std::vector<Trial>& trials, std::vector<std::string>& because)
 {
   const Trial& best = trials.front();
@@ -367,7 +433,7 @@ void explainPadding(const std::vector<Trial>& trials, std::vector<std::string>& 
                                            : "nodes are found on the way only when payloads are not padded");
 }
 
-std::vector<std::string> explain(const std::vector<Trial>& trials, const Recognition& result)
+std::vector<std::string> explain(const ByteSource& source, const std::vector<Trial>& trials, const Recognition& result)
 {
   const Trial& best = trials.front();
   std::vector<std::string> because;
@@ -393,7 +459,8 @@ std::vector<std::string> explain(const std::vector<Trial>& trials, const Recogni
   }
   if (best.otherAt != 0)
   {
-    because.push_back("at " + hexOffset(best.otherAt) + " " + otherStreamText(best.otherForm));
+    because.push_back("at " + hexOffset(best.otherAt) + " " + otherStreamText(best.otherForm) + "; " +
+                      fromText(source, best.otherAt) + " reads it");
   }
   explainPadding(trials, because);
   if (best.extras + best.plainStrings != 0)
@@ -427,18 +494,13 @@ std::optional<Form> otherStreamAt(ByteSource& source, const Form& form, uint64_t
   return std::nullopt;
 }
 
-std::string otherStreamText(const Form& form)
-{
-  return "a stream in another form seems to begin: " + orderText(form) + ", " + (form.root64 ? "64" : "32") +
-         "-bit root header";
-}
-
 Recognition recognise(ByteSource& source, const FormChoice& choice)
 {
   Recognition result;
   const std::vector<Trial> trials = tryAll(source, choice);
   if (trials.empty() || trials.front().nodes == 0)
   {
+    result.possible = notRefuted(source, trials);
     result.form.swapped = choice.swapped.value_or(false);
     result.form.root64 = choice.root64.value_or(true);
     result.form.aligned = choice.aligned.value_or(false);
@@ -448,10 +510,14 @@ Recognition recognise(ByteSource& source, const FormChoice& choice)
   }
   const Trial& best = trials.front();
   result.isStream = true;
-  result.form = best.form;
-  result.form.extra = best.extras > best.plainStrings;
+  result.form = formOf(best);
   result.damagedStart = best.first.offset() != 0;
   result.looked = best.extent;
+  const bool soundStart = isStartSound(source, best);
+  if (!soundStart)
+  {
+    result.possible = notRefuted(source, trials);
+  }
   for (const Trial& other : trials)
   {
     if (other.nodes == 0 || other.signature == best.signature)
@@ -462,25 +528,13 @@ Recognition recognise(ByteSource& source, const FormChoice& choice)
     {
       result.alternatives.push_back(other.form);
     }
-    if (best.cost >= kDamage && margin(best, other) <= kNear && !result.runnerUp)
+    if (soundStart && best.cost >= kDamage && margin(best, other) <= kNear && result.possible.empty())
     {
-      result.runnerUp = other.form;
-      result.runnerUp->extra = other.extras > other.plainStrings;
+      result.possible.push_back(formOf(other));
     }
   }
-  result.because = explain(trials, result);
+  result.because = explain(source, trials, result);
   return result;
-}
-
-std::string orderText(const Form& form)
-{
-  return form.swapped != kor::isLittleEndian ? "little-endian" : "big-endian";
-}
-
-std::string formText(const Form& form)
-{
-  return orderText(form) + ", " + (form.root64 ? "64" : "32") + "-bit root header, " +
-         (form.aligned ? "padded to 8" : "not padded");
 }
 
 } // namespace tav::tool

@@ -24,10 +24,12 @@ struct FormChoice
 struct Recognition
 {
   Form form{};
-  bool isStream = false;              ///< at least one way finds a node
-  bool damagedStart = false;          ///< the first node is not where it should be
-  std::vector<Form> alternatives{};   ///< other ways that explain the bytes as well, and differ in what they find
-  std::optional<Form> runnerUp{};     ///< the next best way, where the best one leaves a doubt and it is not far off
+  bool isStream = false;            ///< at least one way finds a node
+  bool damagedStart = false;        ///< the first node is not where it should be
+  std::vector<Form> alternatives{}; ///< other ways that explain the bytes as well, and differ in what they find
+  /// Ways to try where bytes are lost, likelier ones first: all that nothing refutes where the start is damaged, else
+  /// the next best one where the best leaves a doubt and it is not far off.
+  std::vector<Form> possible{};
   std::vector<std::string> because{}; ///< why, one reason a line
   uint64_t looked = 0;                ///< bytes that the judgement rests on
 
@@ -43,6 +45,9 @@ std::optional<Form> otherStreamAt(ByteSource& source, const Form& form, uint64_t
 
 /// What to say of it.
 std::string otherStreamText(const Form& form);
+
+/// The option that reads a file from an offset of this source on: "--from 0x1a40".
+std::string fromText(const ByteSource& source, uint64_t offset);
 
 /// "little-endian", "big-endian"
 std::string orderText(const Form& form);

@@ -81,8 +81,8 @@ std::string helpText(const Command& command)
   {
     text += optionText(option);
   }
-  text += "\nOptions of all commands\n";
-  for (const OptionSpec& option : globalOptions())
+  text += "\nCommon options\n";
+  for (const OptionSpec& option : commonOptions(command))
   {
     text += optionText(option);
   }

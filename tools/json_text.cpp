@@ -204,7 +204,7 @@ std::optional<TAVTimeStamp> parseDate(std::string_view text)
                     (!scan.take('.') || scan.fraction(fraction)) && scanZone(scan, zone) && scan.isDone();
   const std::chrono::year_month_day date{std::chrono::year(static_cast<int>(year)), std::chrono::month(month),
                                          std::chrono::day(day)};
-  if (!read || !date.ok() || hour > 23 || minute > 59 || second > 59 || fraction > 0xFFFF)
+  if (!read || !date.ok() || hour > 23 || minute > 59 || second > 59)
   {
     return std::nullopt;
   }
@@ -215,8 +215,8 @@ std::optional<TAVTimeStamp> parseDate(std::string_view text)
   {
     return std::nullopt;
   }
-  return TAVTimeStamp{static_cast<uint64_t>(seconds), 0, static_cast<uint16_t>(fraction), 0,
-                      static_cast<int16_t>(zone)};
+  return TAVTimeStamp{static_cast<uint64_t>(seconds), static_cast<uint16_t>(fraction / 1000),
+                      static_cast<uint16_t>(fraction % 1000), 0, static_cast<int16_t>(zone)};
 }
 
 std::optional<std::array<uint8_t, 16>> parseInt128(std::string_view text, bool isSigned)

@@ -30,8 +30,9 @@ std::optional<uint16_t> jsonTypeOf(std::string_view name);
 /// The bytes of hexadecimal text, appended; false when it is none.
 bool appendHexBytes(std::string& out, std::string_view text);
 
-/// A date as `dateText` writes it; the fraction and the zone may be left out, Z stands for +00:00. Nothing when the
-/// text is no date, or when a timestamp cannot hold it.
+/// A date as `dateText` writes it; the fraction and the zone may be left out, Z stands for +00:00. The fraction becomes
+/// whole milliseconds in A and the microseconds of the millisecond in B. Nothing when the text is no date, or when a
+/// timestamp cannot hold it.
 std::optional<TAVTimeStamp> parseDate(std::string_view text);
 
 /// The 16 bytes, in host order, of a decimal number; nothing when it is none or does not fit.

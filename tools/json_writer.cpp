@@ -159,19 +159,7 @@ std::string JsonWriter::pathOf(const Walker& walker, const Event& event) const
   {
     return {};
   }
-  if (event.depth <= kMaxSteps)
-  {
-    return walker.path(event);
-  }
-  if (event.node.header.hdrType == 0)
-  {
-    return "/**";
-  }
-  Node node = event.node;
-  node.ordinal = 0;
-  std::string path = "/**";
-  appendStep(path, node);
-  return path;
+  return event.depth <= kMaxSteps ? walker.path(event) : offsetPath(event.node);
 }
 
 void JsonWriter::add(const Walker& walker, const Event& event)
@@ -214,7 +202,6 @@ void JsonWriter::addDamage(const Walker& walker, const Event& event)
   }
   else if (event.what == What::damaged)
   {
-    damaged_ = true;
     putBytes("damaged", event.offset, event.length);
     putString("reason", event.reason);
   }

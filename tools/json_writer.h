@@ -43,8 +43,6 @@ public:
   /// The events of a walk, one after the other, from its beginning to its end.
   void add(const Walker& walker, const Event& event);
 
-  bool foundDamage() const { return damaged_; }
-
 private:
   struct Group
   {
@@ -88,7 +86,6 @@ private:
   Output& out_;
   JsonStyle style_;
   bool safe_;
-  bool damaged_ = false;
   bool firstKey_ = true;
   bool firstRoot_ = true;
   std::optional<DataPieces> data_{}; ///< written when something else begins

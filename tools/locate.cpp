@@ -5,11 +5,13 @@
 namespace tav::tool
 {
 
-std::optional<std::string> findOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offset)
+std::optional<std::string> findOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offset,
+                                      const Seen& seen)
 {
   std::string before;
   while (walker.next(event) && event.offset <= offset)
   {
+    seen(event);
     const bool begins = event.what == What::nodeBegin;
     if (begins && event.offset == offset)
     {
@@ -17,7 +19,7 @@ std::optional<std::string> findOffset(ByteSource& source, Walker& walker, Event&
     }
     if (begins)
     {
-      before = "the node before it begins at " + hexOffset(event.offset) + ": " + walker.path(event);
+      before = "the node before it begins at " + hexOffset(event.offset) + ": " + walker.path(event, PathStyle::brief);
     }
     if (offset - event.offset < event.length)
     {
@@ -35,9 +37,9 @@ std::optional<std::string> findOffset(ByteSource& source, Walker& walker, Event&
   throw Failure(kFindings, problem);
 }
 
-void goToOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offset)
+void goToOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offset, const Seen& seen)
 {
-  const auto before = findOffset(source, walker, event, offset);
+  const auto before = findOffset(source, walker, event, offset, seen);
   if (before)
   {
     Problem problem{source.name(), offset};
@@ -49,10 +51,11 @@ void goToOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offse
   }
 }
 
-bool goToMatch(Walker& walker, PathMatcher& matcher, Event& event)
+bool goToMatch(Walker& walker, PathMatcher& matcher, Event& event, const Seen& seen)
 {
   while (walker.next(event))
   {
+    seen(event);
     if (event.what != What::nodeBegin)
     {
       continue;

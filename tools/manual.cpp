@@ -69,6 +69,17 @@ std::string optionsText(const std::vector<OptionSpec>& options)
   return text;
 }
 
+/// Which of the common options a command takes.
+std::string commonNames(const Command& command)
+{
+  std::string text;
+  for (const OptionSpec& option : commonOptions(command))
+  {
+    text += (text.empty() ? "" : ", ") + longName(option);
+  }
+  return ".PP\nCommon options: " + roff(text) + ".\n";
+}
+
 } // namespace
 
 std::string manualPage()
@@ -84,20 +95,26 @@ std::string manualPage()
     text += ".SS tav " + roff(command->name) + " " + roff(argumentsOf(*command)) + "\n";
     text += paragraphs(command->description.empty() ? command->summary + "." : command->description);
     text += optionsText(command->options);
+    text += commonNames(*command);
   }
-  text += ".SH OPTIONS OF ALL COMMANDS\n" + optionsText(globalOptions());
+  text += ".SH COMMON OPTIONS\nEach command tells above which of them it takes.\n" + optionsText(globalOptions());
   text +=
       ".SH PATHS\n"
       "A path leads to nodes: \\fB/system/host[2]/hostName\\fR. A step is an element's tag, its enum name, its\n"
       "constant, or \\fB#\\fIid\\fR; \\fB*\\fR is any one node, \\fB**\\fR any number of levels. \\fB[2]\\fR is the\n"
-      "second of its element among its siblings, \\fB[@0x1a40]\\fR the one at this offset. Every path that a\n"
+      "second of those that the step finds in a group, \\fB[@0x1a40]\\fR the one at this offset. Every path that a\n"
       "command prints is understood by every command.\n"
       ".SH EXIT STATUS\n"
       ".TP\n0\nfine\n.TP\n1\nfindings, differences, or no match\n.TP\n2\nwrong usage, or the system refused something\n"
       ".TP\n3\nthe stream is too damaged to go on\n"
       ".SH ENVIRONMENT\n.TP\nNO_COLOR\nno colours, also on a terminal\n"
       ".TP\nTERM\nno colours when it is dumb\n"
-      ".TP\nTMPDIR\nwhere standard input is copied to, so that everything works on it\n"
+      ".TP\nTMPDIR\nwhere standard input and pipes are copied to, so that everything works on them; see "
+      "\\-\\-spool\\-limit\n"
+      ".SH FILES\n.TP\nshare/doc/tav\\-tools/tav.md\nwhen to use which command\n"
+      ".TP\nshare/doc/tav\\-tools/json.md\nthe keys of the JSON form\n"
+      ".TP\nshare/doc/tav\\-tools/check\\-rules.md\nwhat check looks for\n"
+      ".TP\nshare/doc/tav\\-tools/trace.md\nhow to read a trace\n"
       ".SH EXAMPLES\n";
   for (const Command* command : commands())
   {

@@ -5,6 +5,7 @@
 #include <stdexcept>
 
 #include "tools/report.h"
+#include "tools/similar.h"
 
 namespace tav::tool
 {
@@ -36,6 +37,32 @@ std::vector<const Command*> commands()
   return list;
 }
 
+const Command* findCommand(std::string_view name)
+{
+  const auto found =
+      std::find_if(table().begin(), table().end(), [&](const Command& command) { return command.name == name; });
+  return found == table().end() ? nullptr : &*found;
+}
+
+void failUnknownCommand(std::string_view name)
+{
+  const bool option = name.starts_with('-');
+  name = option ? name.substr(0, name.find('=')) : name;
+  std::vector<std::string> known;
+  for (const Command* command : commands())
+  {
+    known.push_back(command->name);
+  }
+  for (const OptionSpec& common : globalOptions())
+  {
+    known.push_back(longName(common));
+  }
+  known.emplace_back("--version");
+  const std::string near = nearest(name, known);
+  throw Failure("there is no " + std::string(option ? "option" : "command") + " '" + std::string(name) + "'",
+                (near.empty() ? "" : "did you mean " + near + "? ") + std::string("'tav --help' lists the commands"));
+}
+
 const std::vector<OptionSpec>& globalOptions()
 {
   static const std::vector<OptionSpec> options = {
@@ -43,38 +70,89 @@ const std::vector<OptionSpec>& globalOptions()
        .kind = ValueKind::choice,
        .value = "ORDER",
        .help = "read FILE in this byte order instead of the recognised one",
-       .choices = {"native", "swapped", "little", "big"}},
+       .choices = {"native", "swapped", "little", "big"},
+       .concern = kForm},
       {.names = "--root",
        .kind = ValueKind::choice,
        .value = "BITS",
        .help = "width of the first node's header",
-       .choices = {"32", "64"}},
-      {.names = "--align", .help = "payloads are padded to multiples of 8"},
-      {.names = "--no-align", .help = "payloads are not padded unless their header says so"},
+       .choices = {"32", "64"},
+       .concern = kForm},
+      {.names = "--align", .help = "payloads are padded to multiples of 8", .concern = kForm},
+      {.names = "--no-align", .help = "payloads are not padded unless their header says so", .concern = kForm},
+      {.names = "--from",
+       .kind = ValueKind::number,
+       .value = "OFFSET",
+       .help = "read FILE as if it began at OFFSET; all offsets then count from there",
+       .concern = kInput},
       {.names = "--ring",
        .kind = ValueKind::number,
        .value = "BYTES",
-       .help = "memory for the file's bytes, 10M unless given"},
+       .help = "memory for the file's bytes, 10M unless given",
+       .concern = kInput},
+      {.names = "--spool-limit",
+       .kind = ValueKind::number,
+       .value = "BYTES",
+       .help = "the most that is copied from a pipe, 16G unless given; 0 for no limit",
+       .concern = kInput},
       {.names = "--trace",
        .kind = ValueKind::file,
        .value = "FILE",
-       .help = "write the library's trace to FILE as text"},
+       .help = "write the library's trace to FILE as text",
+       .concern = kCalls},
       {.names = "--trace-probe",
        .kind = ValueKind::text,
        .value = "PROBE",
        .help = "only records of this function, by name or id",
-       .many = true},
-      {.names = "--force", .help = "replace existing files"},
-      {.names = "--stats", .help = "tell on standard error how much was read"},
+       .many = true,
+       .concern = kCalls},
+      {.names = "--force", .help = "replace existing files", .concern = kFiles},
+      {.names = "--stats", .help = "tell on standard error how much was read", .concern = kInput},
       {.names = "-h,--help", .help = "show help and exit"},
   };
   return options;
 }
 
+std::vector<OptionSpec> commonOptions(const Command& command)
+{
+  unsigned concerns = command.concerns;
+  const auto writes = [](const OptionSpec& option) { return option.kind == ValueKind::file; };
+  if ((concerns & kCalls) != 0 || std::any_of(command.options.begin(), command.options.end(), writes))
+  {
+    concerns |= kFiles; // a trace is a file, too
+  }
+  std::vector<OptionSpec> options;
+  for (const OptionSpec& option : globalOptions())
+  {
+    if (option.concern == kNoConcern || (option.concern & concerns) != 0)
+    {
+      options.push_back(option);
+    }
+  }
+  return options;
+}
+
+std::vector<OptionSpec> allOptions(const Command& command)
+{
+  std::vector<OptionSpec> options = command.options;
+  const std::vector<OptionSpec> common = commonOptions(command);
+  options.insert(options.end(), common.begin(), common.end());
+  return options;
+}
+
+std::vector<std::string> namesOf(const OptionSpec& option)
+{
+  const size_t comma = option.names.find(',');
+  if (comma == std::string::npos)
+  {
+    return {option.names};
+  }
+  return {option.names.substr(0, comma), option.names.substr(comma + 1)};
+}
+
 std::string longName(const OptionSpec& option)
 {
-  const size_t dashes = option.names.find("--");
-  return option.names.substr(dashes == std::string::npos ? 0 : dashes);
+  return namesOf(option).back();
 }
 
 std::string argumentsOf(const Command& command)

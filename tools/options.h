@@ -28,6 +28,17 @@ enum class ValueKind : uint8_t
   choice  ///< one of `choices`
 };
 
+/// What a command has to do with. It decides which of the common options the command takes.
+enum Concern : unsigned
+{
+  kNoConcern = 0,
+  kForm = 1,  ///< how a stream is laid out
+  kInput = 2, ///< streams that are read
+  kCalls = 4, ///< the library's calls
+  kAllConcerns = 7,
+  kFiles = 8 ///< files that are written; the command's options tell
+};
+
 struct OptionSpec
 {
   std::string names; ///< "-o,--output"; the long one is what commands ask for
@@ -35,8 +46,9 @@ struct OptionSpec
   std::string value{}; ///< how the value is called in help: "FILE"
   std::string help{};
   std::vector<std::string> choices{};
-  bool many = false;     ///< may be given several times
-  bool required = false; ///< shown in the command's usage; the command itself tells that it is missing
+  bool many = false;            ///< may be given several times
+  bool required = false;        ///< shown in the command's usage; the command itself tells that it is missing
+  Concern concern = kNoConcern; ///< of a common option: what a command must have to do with; else it takes it always
 };
 
 struct Example
@@ -56,6 +68,7 @@ struct Command
   std::string summary{};     ///< one line, lower case, no full stop
   std::string description{}; ///< paragraphs, separated by an empty line
   std::vector<OptionSpec> options{};
+  unsigned concerns = kAllConcerns; ///< decide which common options there are, too
   std::vector<Example> examples{};
   int (*run)(const Invocation&) = nullptr; ///< returns the exit status
 };
@@ -63,8 +76,20 @@ struct Command
 /// All commands in order.
 std::vector<const Command*> commands();
 
-/// The options that every command takes.
+/// The options that commands have in common.
 const std::vector<OptionSpec>& globalOptions();
+
+/// Those of the common options that a command takes.
+std::vector<OptionSpec> commonOptions(const Command& command);
+
+/// All that a command takes: its own options and the common ones.
+std::vector<OptionSpec> allOptions(const Command& command);
+
+/// "tree", or null.
+const Command* findCommand(std::string_view name);
+
+/// Throws Failure for a name that no command has, with the nearest one.
+[[noreturn]] void failUnknownCommand(std::string_view name);
 
 /// Puts a command into the table.
 struct Registration
@@ -104,8 +129,15 @@ std::optional<uint64_t> parseNumber(std::string_view text);
 /// The long name of an option: "--output" of "-o,--output".
 std::string longName(const OptionSpec& option);
 
+/// All names of an option: "-o", "--output".
+std::vector<std::string> namesOf(const OptionSpec& option);
+
 /// "FILE -o OUT": the arguments of a command and what else must be given.
 std::string argumentsOf(const Command& command);
+
+/// Reads the words of a command line, the command's name left out. They are taken as they are: nothing in them but the
+/// dashes of options has a meaning here. Throws Failure for what the command does not take.
+Invocation readCommandLine(const Command& command, const std::vector<std::string>& words);
 
 /// Runs the program: reads the command line, runs the command, and returns the exit status.
 int runProgram(int argc, char** argv);

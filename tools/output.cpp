@@ -5,7 +5,6 @@
 #include <cstdio>
 #include <cstdlib>
 #include <filesystem>
-#include <optional>
 #include <utility>
 
 #include "kor/host.h"
@@ -19,19 +18,43 @@ namespace
 
 constexpr size_t kBuffer = size_t{64} * 1024;
 
-/// Whether the path leads to something that is no file: a device, a pipe.
-bool isSpecial(const std::string& path)
+/// "-" for every name of standard output.
+std::string plainName(const std::string& path)
+{
+  return isStandardOutput(path) ? "-" : path;
+}
+
+/// Whether a path leads to something that can only be written to where it is: a device, a pipe, and what is no name of
+/// a folder, but a link of the system to a file that some process has open.
+bool isInPlace(const std::string& path, const std::filesystem::path& target)
 {
   std::error_code error;
   const auto status = std::filesystem::status(kor::pathOf(path), error);
-  return !error && std::filesystem::exists(status) && !std::filesystem::is_regular_file(status);
+  const bool known = !error && std::filesystem::exists(status);
+  return known && (!std::filesystem::is_regular_file(status) || std::filesystem::is_symlink(target, error));
+}
+
+/// The name of a file beside the target that nobody has; `attempt` tells one from another. Long names are cut, since a
+/// system allows 255 bytes or less.
+std::string besideName(const std::filesystem::path& target, unsigned attempt)
+{
+  constexpr size_t most = 100;
+  std::string name = kor::textOf(target.filename());
+  size_t end = std::min(most, name.size());
+  while (end != 0 && end < name.size() && (static_cast<unsigned char>(name[end]) & 0xC0) == 0x80)
+  {
+    --end; // no character is divided
+  }
+  name.resize(end);
+  return kor::textOf(target.parent_path() /
+                     kor::pathOf(name + ".tav-" + std::to_string(kor::processId()) + "-" + std::to_string(attempt)));
 }
 
 /// Throws Failure when a file of this name is there and `force` is not given.
 void checkWritable(const std::string& path, bool force)
 {
   std::error_code error;
-  if (path == "-" || force)
+  if (force || path == "-" || kor::ownFile(path))
   {
     return;
   }
@@ -51,33 +74,19 @@ struct NamedOutput
   std::string path;
 };
 
-/// Where a path leads to, also when nothing is there yet: links are followed, even those that lead to nothing.
-std::filesystem::path targetOf(const std::string& text)
-{
-  constexpr int mostLinks = 40;
-  std::error_code error;
-  std::filesystem::path path = std::filesystem::absolute(kor::pathOf(text), error);
-  for (int i = 0; i < mostLinks && std::filesystem::is_symlink(path, error); ++i)
-  {
-    path = path.parent_path() / std::filesystem::read_symlink(path, error);
-  }
-  const std::filesystem::path whole = std::filesystem::weakly_canonical(path, error);
-  return error ? path : whole;
-}
-
 bool isSameFile(const std::string& first, const std::string& second)
 {
   std::error_code error;
-  if (first == "-" || second == "-")
-  {
-    return first == second;
-  }
-  if (std::filesystem::is_character_file(kor::pathOf(first), error))
+  if (first != "-" && std::filesystem::is_character_file(kor::pathOf(first), error))
   {
     return false; // a terminal and /dev/null serve any number of ends
   }
+  if (first == "-" || second == "-")
+  {
+    return plainName(first) == plainName(second);
+  }
   return std::filesystem::equivalent(kor::pathOf(first), kor::pathOf(second), error) ||
-         targetOf(first) == targetOf(second);
+         kor::targetOf(first) == kor::targetOf(second);
 }
 
 std::vector<NamedOutput> outputsOf(const Invocation& invocation)
@@ -110,6 +119,11 @@ std::vector<std::string> inputsOf(const Invocation& invocation)
 
 } // namespace
 
+bool isStandardOutput(const std::string& path)
+{
+  return path == "-" || kor::ownFile(path) == 1;
+}
+
 void checkOutputs(const Invocation& invocation)
 {
   const std::string& command = invocation.command().name;
@@ -134,15 +148,25 @@ void checkOutputs(const Invocation& invocation)
   }
 }
 
+namespace
+{
+
+uint32_t codeOfWrite(int error)
+{
+  return error == ENOSPC  ? KOR_RC_NO_SPACE
+         : error == EFBIG ? KOR_RC_FILE_TOO_LARGE
+                          : KOR_RC_IO_ERROR;
+}
+
+} // namespace
+
 void failAtStandardOutput(int error)
 {
   if (error == EPIPE)
   {
     throw ClosedPipe{};
   }
-  failAt("standard output", error == ENOSPC  ? KOR_RC_NO_SPACE
-                            : error == EFBIG ? KOR_RC_FILE_TOO_LARGE
-                                             : KOR_RC_IO_ERROR);
+  failAt("standard output", codeOfWrite(error));
 }
 
 bool wantsColour(const Invocation& invocation)
@@ -159,35 +183,62 @@ bool wantsColour(const Invocation& invocation)
   return kor::isTerminal(stdout) && variable("NO_COLOR").empty() && variable("TERM") != "dumb";
 }
 
-Output::Output(std::string path, bool force)
-    : path_(std::move(path)), force_(force), standard_(path_ == "-")
+Output::Output(const std::string& path, bool force)
+    : path_(plainName(path)), force_(force)
 {
-  if (!standard_)
+  if (path_ == "-")
   {
-    checkWritable(path_, force);
-    openFile(force);
+    stream_ = stdout;
+    return;
+  }
+  checkWritable(path_, force);
+  const std::filesystem::path target = kor::targetOf(path_);
+  target_ = kor::textOf(target);
+  std::error_code error;
+  if (std::filesystem::is_symlink(target, error) && !std::filesystem::exists(target, error))
+  {
+    failAt(path_, KOR_RC_BAD_NAME, "its links lead to each other");
+  }
+  isInPlace(path_, target) ? openInPlace() : openBeside();
+}
+
+void Output::openInPlace()
+{
+  uint32_t code = TAV_RC_OK;
+  if (kor::ownFile(path_))
+  {
+    stream_ = kor::openStream(path_, "wb", code);
+  }
+  else
+  {
+    // Of another process's open file nothing that was in it stays behind the output.
+    std::error_code error;
+    const bool regular = std::filesystem::is_regular_file(kor::pathOf(path_), error);
+    KORFileOpenParam param;
+    param.pPath = path_.c_str();
+    param.options = regular ? KOR_FILE_WRITE | KOR_FILE_TRUNCATE : KOR_FILE_WRITE;
+    code = file_.open(&param);
+  }
+  if (code != TAV_RC_OK)
+  {
+    failAt(path_, code);
   }
 }
 
-void Output::openFile(bool)
+void Output::openBeside()
 {
-  const bool special = isSpecial(path_);
   for (unsigned attempt = 0;; ++attempt)
   {
-    const std::string name =
-        special ? path_ : path_ + ".tav-" + std::to_string(kor::processId()) + "-" + std::to_string(attempt);
+    const std::string name = besideName(kor::pathOf(target_), attempt);
     KORFileOpenParam param;
     param.pPath = name.c_str();
-    param.options = special ? KOR_FILE_WRITE : KOR_FILE_WRITE | KOR_FILE_CREATE | KOR_FILE_EXCLUSIVE;
-    std::optional<kor::HeldInterrupts> held;
-    if (!special) // a pipe may let an open wait for ever
-    {
-      held.emplace();
-    }
+    param.options = KOR_FILE_WRITE | KOR_FILE_CREATE | KOR_FILE_EXCLUSIVE;
+    param.permissions = 0600; // until it has its name, it is nobody else's
+    const kor::HeldInterrupts held;
     const uint32_t code = file_.open(&param);
     if (code == TAV_RC_OK)
     {
-      temporary_ = special ? std::string() : name;
+      temporary_ = name;
       kor::removeOnInterrupt(temporary_);
       return;
     }
@@ -200,19 +251,29 @@ void Output::openFile(bool)
 
 Output::~Output()
 {
-  if (standard_)
+  if (stream_ != nullptr)
   {
     // What was printed before a failure is still worth reading; a second failure has nobody to tell.
-    std::fwrite(buffer_.data(), 1, buffer_.size(), stdout);
-    std::fflush(stdout);
+    std::fwrite(buffer_.data(), 1, buffer_.size(), stream_);
+    stream_ == stdout ? std::fflush(stream_) : std::fclose(stream_);
     return;
   }
   file_.close();
   if (!temporary_.empty())
   {
     kor::removeFile(temporary_);
-    kor::removeOnInterrupt({});
+    kor::keepOnInterrupt(temporary_);
   }
+}
+
+void Output::failAtStream(int error)
+{
+  buffer_.clear();
+  if (stream_ == stdout)
+  {
+    failAtStandardOutput(error);
+  }
+  failAt(path_, codeOfWrite(error));
 }
 
 void Output::writeOut(const char* bytes, size_t count)
@@ -221,7 +282,7 @@ void Output::writeOut(const char* bytes, size_t count)
   {
     return;
   }
-  if (!standard_)
+  if (stream_ == nullptr)
   {
     KORFileWriteParam param;
     param.pData = bytes;
@@ -234,11 +295,9 @@ void Output::writeOut(const char* bytes, size_t count)
     return;
   }
   errno = 0;
-  if (std::fwrite(bytes, 1, count, stdout) != count || std::fflush(stdout) != 0)
+  if (std::fwrite(bytes, 1, count, stream_) != count || std::fflush(stream_) != 0)
   {
-    const int error = errno;
-    buffer_.clear();
-    failAtStandardOutput(error);
+    failAtStream(errno);
   }
 }
 
@@ -272,7 +331,7 @@ void Output::flush()
 void Output::commit()
 {
   flush();
-  if (standard_)
+  if (stream_ != nullptr)
   {
     return;
   }
@@ -284,12 +343,12 @@ void Output::commit()
   {
     return;
   }
-  if (const uint32_t code = kor::moveIntoPlace(temporary_, path_, force_); code != TAV_RC_OK)
+  if (const uint32_t code = kor::moveIntoPlace(temporary_, target_, force_); code != TAV_RC_OK)
   {
     failAt(path_, code, code == KOR_RC_FILE_EXISTS ? "--force replaces it" : "");
   }
+  kor::keepOnInterrupt(temporary_);
   temporary_.clear();
-  kor::removeOnInterrupt({});
 }
 
 } // namespace tav::tool

@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstdint>
+#include <cstdio>
 #include <span>
 #include <string>
 #include <string_view>
@@ -13,14 +14,17 @@
 namespace tav::tool
 {
 
-/// An output file is written beside its final name and moved into place by `commit`. Without that, it is removed: when
-/// the object goes, and when the program is interrupted. Throws Failure when the system refuses, and ClosedPipe when
-/// nobody reads standard output any more.
+/// An output file is written beside its final name, readable by its owner alone, and moved into place by `commit`:
+/// there it has mode and owner of the file that it replaces. Without `commit` it is removed: when the object goes, and
+/// when the program is interrupted. Throws Failure when the system refuses, and ClosedPipe when nobody reads standard
+/// output any more.
 class Output
 {
 public:
-  /// "-" is standard output. An existing file is replaced only with `force`; devices and pipes are written to directly.
-  explicit Output(std::string path, bool force = false);
+  /// "-" is standard output. An existing file is replaced only with `force`; where a symbolic link is named, it is the
+  /// file behind it. Devices, pipes and the open files that names like /dev/fd/3 stand for are written to, never
+  /// replaced.
+  explicit Output(const std::string& path, bool force = false);
   ~Output();
   Output(const Output&) = delete;
   Output& operator=(const Output&) = delete;
@@ -42,14 +46,17 @@ public:
   const std::string& temporaryPath() const { return temporary_; }
 
 private:
-  void openFile(bool force);
+  void openInPlace();
+  void openBeside();
   void writeOut(const char* bytes, size_t count);
+  [[noreturn]] void failAtStream(int error);
 
   std::string path_;
+  std::string target_{};    ///< the file that the path leads to
   std::string temporary_{}; ///< while the file has not got its name
   bool force_;
   KORHFile file_{};
-  bool standard_;
+  FILE* stream_ = nullptr; ///< standard output, or another file that is open already
   std::string buffer_{};
   uint64_t written_ = 0;
 };
@@ -61,6 +68,9 @@ private:
 /// --force is not given, or it is also a file that the command reads, or another output, by whatever names and links.
 /// Called once, before anything is opened for writing.
 void checkOutputs(const Invocation& invocation);
+
+/// Whether a path stands for standard output: "-", and names as /dev/stdout.
+bool isStandardOutput(const std::string& path);
 
 /// Whether standard output is to be coloured: --color, else on a terminal that knows colours unless NO_COLOR is set.
 bool wantsColour(const Invocation& invocation);

@@ -6,6 +6,7 @@
 #include <unordered_map>
 
 #include "tav/dictionary.hpp"
+#include "tools/similar.h"
 
 namespace tav::tool
 {
@@ -70,28 +71,6 @@ bool parseNumber(std::string_view text, Number& value, int base)
   return result.ec == std::errc() && result.ptr == end;
 }
 
-size_t editDistance(std::string_view a, std::string_view b)
-{
-  std::vector<size_t> row(b.size() + 1);
-  for (size_t j = 0; j <= b.size(); ++j)
-  {
-    row[j] = j;
-  }
-  for (size_t i = 1; i <= a.size(); ++i)
-  {
-    size_t diagonal = row[0];
-    row[0] = i;
-    for (size_t j = 1; j <= b.size(); ++j)
-    {
-      const auto lower = [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c + ('a' - 'A')) : c; };
-      const size_t changed = diagonal + (lower(a[i - 1]) == lower(b[j - 1]) ? 0 : 1);
-      diagonal = row[j];
-      row[j] = std::min({row[j] + 1, row[j - 1] + 1, changed});
-    }
-  }
-  return row.back();
-}
-
 } // namespace
 
 std::string elementText(uint16_t elm)
@@ -128,6 +107,18 @@ void appendStep(std::string& path, const Node& node)
   }
 }
 
+std::string offsetPath(const Node& node)
+{
+  std::string path = "/**";
+  if (node.header.hdrType != 0)
+  {
+    Node unnumbered = node;
+    unnumbered.ordinal = 0;
+    appendStep(path, unnumbered);
+  }
+  return path;
+}
+
 std::vector<uint16_t> idsOf(std::string_view name)
 {
   const std::string_view digits = name.starts_with('#') ? name.substr(1) : name;
@@ -150,7 +141,7 @@ std::string similarNames(std::string_view name)
   for (const dictionary::Entry& entry : dictionary::entries())
   {
     const size_t distance = editDistance(name, entry.tag);
-    if (distance <= 1 + name.size() / 4)
+    if (distance <= mostSlips(name))
     {
       close.emplace_back(distance, entry.tag);
     }
@@ -302,6 +293,7 @@ void PathMatcher::enter(size_t state, bool& match)
       return;
     }
     states_.push_back(state);
+    counts_.push_back(0);
     if (steps_[state].kind != Path::Step::Kind::anyLevels)
     {
       return;
@@ -316,6 +308,7 @@ bool PathMatcher::matches(const Node& node)
   if (level + 1 < starts_.size())
   {
     states_.resize(starts_[level + 1]);
+    counts_.resize(states_.size());
     starts_.resize(level + 1);
   }
   const size_t first = starts_.back();
@@ -326,14 +319,16 @@ bool PathMatcher::matches(const Node& node)
   {
     const size_t state = states_[i];
     const Path::Step& step = steps_[state];
+    const bool isNode = !layout::isEndElement(node.elm()); // what only ends a group counts where it is named
     if (step.kind == Path::Step::Kind::anyLevels)
     {
-      enter(state, match);
+      isNode ? enter(state, match) : void();
       continue;
     }
-    const bool named = step.kind == Path::Step::Kind::any ||
+    const bool named = (step.kind == Path::Step::Kind::any && isNode) ||
                        std::find(step.ids.begin(), step.ids.end(), node.elm()) != step.ids.end();
-    if (named && (step.ordinal == 0 || step.ordinal == node.ordinal) &&
+    counts_[i] += named ? 1 : 0;
+    if (named && (step.ordinal == 0 || step.ordinal == counts_[i]) &&
         (step.offset == kNoOffset || step.offset == node.offset()))
     {
       enter(state + 1, match);

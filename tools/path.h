@@ -2,11 +2,12 @@
 /// Paths through a stream: `/system/host[2]/hostName`.
 ///
 ///   step   = name | #id | * | **           name: an element's tag, enum name or constant
-///   index  = [n]                           the how-manieth of its id among its siblings, from 1
+///   index  = [n]                           the nth of those that the step finds under the same parent, from 1
 ///          | [@offset]                     the one at this offset; 0x for hexadecimal
 ///   path   = / | / { step [index] / }
 ///
-/// `*` is any one node, `**` any number of levels. The leading slash may be left out. A slash alone leads to the roots.
+/// `*` is any one node, `**` any number of levels; elements that only end a group are meant where they are named. The
+/// leading slash may be left out. A slash alone leads to the roots.
 #pragma once
 
 #include <cstdint>
@@ -26,6 +27,9 @@ std::string elementText(uint16_t elm);
 /// Appends "/tag", "/tag[3]" or "/tag[@0x1a40]": the step that leads to `node` from its parent. The first of its id
 /// gets no index, as the first match is what every command takes.
 void appendStep(std::string& path, const Node& node);
+
+/// "/**/tag[@0x1a40]": a path that leads to `node` alone and is short at any depth. Without a node: "/**".
+std::string offsetPath(const Node& node);
 
 /// The ids that a name means: a tag, an enum name, a constant, "#12" or "12". Empty when there is none.
 std::vector<uint16_t> idsOf(std::string_view name);
@@ -91,8 +95,9 @@ private:
   void enter(size_t state, bool& match);
 
   const std::vector<Path::Step>& steps_;
-  std::vector<size_t> states_{}; ///< positions in the path, level by level
-  std::vector<size_t> starts_{}; ///< where a level's positions begin
+  std::vector<size_t> states_{};   ///< positions in the path, level by level
+  std::vector<uint64_t> counts_{}; ///< what the step at each of them has found under the present parent
+  std::vector<size_t> starts_{};   ///< where a level's positions begin
 };
 
 } // namespace tav::tool

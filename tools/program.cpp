@@ -1,10 +1,8 @@
-// Reads the command line with the table of options, and runs a command.
+// Finds out which command is meant, and runs it.
 #include <algorithm>
 #include <cstdio>
-#include <map>
 #include <new>
-
-#include <CLI/CLI.hpp>
+#include <optional>
 
 #include "kor/host.h"
 #include "tools/options.h"
@@ -22,135 +20,52 @@ namespace tav::tool
 namespace
 {
 
-/// Where the parser puts what it found: one entry an option.
-using Values = std::map<std::string, std::vector<std::string>>;
-
-void addOption(CLI::App& app, const OptionSpec& spec, Values& values)
-{
-  const std::string name = longName(spec);
-  if (name == "--help")
-  {
-    return;
-  }
-  if (spec.kind == ValueKind::flag)
-  {
-    app.add_flag_callback(
-        spec.names, [&values, name] { values[name]; }, spec.help);
-    return;
-  }
-  CLI::Option* const option = app.add_option(spec.names, values[name + "="], spec.help);
-  option->type_name(spec.value)
-      ->expected(1)
-      ->allow_extra_args(false)
-      ->multi_option_policy(spec.many ? CLI::MultiOptionPolicy::TakeAll : CLI::MultiOptionPolicy::TakeLast);
-  option->each([&values, name](const std::string& value) { values[name].push_back(value); });
-  if (spec.kind == ValueKind::choice)
-  {
-    option->check(CLI::IsMember(spec.choices));
-  }
-  if (spec.kind == ValueKind::number)
-  {
-    option->check([](const std::string& text) {
-      return parseNumber(text) ? std::string() : "'" + text + "' is no number; 10, 0x1a40, 64K and 10M are";
-    });
-  }
-}
-
-struct Arity
-{
-  size_t least = 0;
-  size_t most = 0;
-};
-
-/// How many arguments "FILE [PATH...]" stands for.
-Arity arityOf(const std::string& arguments)
-{
-  Arity arity;
-  for (size_t at = 0; at < arguments.size();)
-  {
-    const size_t end = std::min(arguments.find(' ', at), arguments.size());
-    const std::string word = arguments.substr(at, end - at);
-    const bool optional = word.starts_with('[');
-    const bool many = word.find("...") != std::string::npos;
-    arity.least += optional ? 0 : 1;
-    arity.most = many ? 1'000'000 : arity.most + 1;
-    at = end + 1;
-  }
-  return arity;
-}
-
-const Command* findCommand(std::string_view name)
-{
-  for (const Command* command : commands())
-  {
-    if (command->name == name)
-    {
-      return command;
-    }
-  }
-  return nullptr;
-}
-
-void checkArguments(const Command& command, const std::vector<std::string>& arguments)
-{
-  const Arity arity = arityOf(command.arguments);
-  if (arguments.size() < arity.least)
-  {
-    throw Failure(command.name + ": an argument is missing: tav " + command.name + " " + argumentsOf(command),
-                  "'tav " + command.name + " --help' tells more" +
-                      (command.inputs == 0 ? "" : "; - is standard input"));
-  }
-  if (arguments.size() > arity.most)
-  {
-    throw Failure(command.name + ": '" + arguments[arity.most] + "' is one argument too many");
-  }
-}
-
-int runCommand(const Command& command, std::vector<std::string> words)
-{
-  CLI::App app;
-  app.set_help_flag();
-  app.allow_windows_style_options(false);
-  Values values;
-  std::vector<std::string> arguments;
-  for (const auto* list : {&command.options, &globalOptions()})
-  {
-    for (const OptionSpec& spec : *list)
-    {
-      addOption(app, spec, values);
-    }
-  }
-  app.add_option("arguments", arguments);
-  std::reverse(words.begin(), words.end());
-  try
-  {
-    app.parse(words);
-  }
-  catch (const CLI::ParseError& error)
-  {
-    throw Failure(command.name + ": " + error.what(), "'tav " + command.name + " --help' lists the options");
-  }
-  Invocation invocation(command);
-  for (auto& [name, list] : values)
-  {
-    if (!name.ends_with('='))
-    {
-      invocation.give(name, std::move(list));
-    }
-  }
-  checkArguments(command, arguments);
-  invocation.giveArguments(std::move(arguments));
-  checkOutputs(invocation);
-  const TraceFile trace(invocation);
-  return command.run(invocation);
-}
-
 int print(const std::string& text)
 {
   Output out("-");
   out.write(text);
   out.commit();
   return kFine;
+}
+
+int runCommand(const Command& command, const std::vector<std::string>& words)
+{
+  std::optional<Invocation> invocation;
+  try
+  {
+    invocation = readCommandLine(command, words);
+  }
+  catch (const Failure&)
+  {
+    // Who asks for help beside something that is wrong gets it.
+    const auto end = std::find(words.begin(), words.end(), "--");
+    if (std::find(words.begin(), end, "--help") == end && std::find(words.begin(), end, "-h") == end)
+    {
+      throw;
+    }
+  }
+  if (!invocation || invocation->has("--help"))
+  {
+    return print(helpText(command));
+  }
+  checkOutputs(*invocation);
+  const TraceFile trace(*invocation);
+  return command.run(*invocation);
+}
+
+/// The common option that a word begins with: "--name" or "--name=value"; null for others.
+const OptionSpec* findCommonOption(const std::string& word)
+{
+  const auto& options = globalOptions();
+  const std::string name = word.substr(0, word.find('='));
+  const auto found =
+      std::find_if(options.begin(), options.end(), [&](const OptionSpec& option) { return longName(option) == name; });
+  return found == options.end() ? nullptr : &*found;
+}
+
+bool isUnknownOption(const std::string& word)
+{
+  return word.starts_with("--") && word != "--" && findCommonOption(word) == nullptr;
 }
 
 int dispatch(const std::vector<std::string>& words)
@@ -173,24 +88,16 @@ int dispatch(const std::vector<std::string>& words)
   size_t at = 0;
   while (at < words.size() && words[at].starts_with("-") && words[at] != "-")
   {
-    const auto& options = globalOptions();
-    const auto spec =
-        std::find_if(options.begin(), options.end(), [&](const OptionSpec& s) { return longName(s) == words[at]; });
-    at += spec != options.end() && spec->kind != ValueKind::flag ? 2 : 1;
+    const OptionSpec* const option = findCommonOption(words[at]);
+    at += option != nullptr && option->kind != ValueKind::flag && words[at].find('=') == std::string::npos ? 2 : 1;
   }
-  const std::string name = at < words.size() ? words[at] : first;
-  const Command* const command = findCommand(name);
+  const Command* const command = at < words.size() ? findCommand(words[at]) : nullptr;
   if (command == nullptr)
   {
-    throw Failure("there is no command '" + name + "'", "'tav --help' lists the commands");
+    failUnknownCommand(at < words.size() && !isUnknownOption(first) ? words[at] : first);
   }
   std::vector<std::string> rest = words;
   rest.erase(rest.begin() + static_cast<ptrdiff_t>(at));
-  const auto end = std::find(rest.begin(), rest.end(), "--");
-  if (std::find(rest.begin(), end, "--help") != end || std::find(rest.begin(), end, "-h") != end)
-  {
-    return print(helpText(*command));
-  }
   return runCommand(*command, rest);
 }
 

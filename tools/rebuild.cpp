@@ -82,6 +82,7 @@ void Rebuilder::close()
   const uint64_t start = group.nodeOffset + headerLength(group.hdrType);
   if (hasEyeSize(group))
   {
+    ++endElements_;
     const bool wide = hasChildren64(group);
     const uint64_t before = out_.length() - start;
     TAVHeader end = endElement(wide, form_.aligned);

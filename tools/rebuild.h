@@ -34,6 +34,8 @@ public:
   void add(const FoundData& data);
   void close();
 
+  /// End elements written so far.
+  uint64_t endElements() const { return endElements_; }
   uint64_t depth() const { return groups_.size(); }
   /// Whether the innermost group would have size 0 if it were closed now.
   bool isEmpty() const;
@@ -49,6 +51,7 @@ private:
   PatchFile& out_;
   std::function<void(uint64_t)> reading_;
   std::vector<TAVHeader> groups_{};
+  uint64_t endElements_ = 0;
 };
 
 } // namespace tav::tool

@@ -32,8 +32,8 @@ TAVHeader madeHeader(bool wideHeader, bool wideChildren, bool eye)
 
 } // namespace
 
-Recovery::Recovery(ByteSource& source, const Form& form, Rebuilder& rebuilder, uint64_t search, Sink sink)
-    : source_(source), form_(form), rebuilder_(rebuilder), prober_(source, form, kNoOffset), sink_(std::move(sink)),
+Recovery::Recovery(ByteSource& source, const Form& form, Rebuilder& rebuilder, uint64_t search, Sinks sinks)
+    : source_(source), form_(form), rebuilder_(rebuilder), prober_(source, form, kNoOffset), sinks_(std::move(sinks)),
       search_(search)
 {
   Frame file;
@@ -119,8 +119,24 @@ void Recovery::keepOpen()
   top.sureAt = 0;
 }
 
+RecoveryTotals Recovery::totals() const
+{
+  RecoveryTotals totals = totals_;
+  totals.ends = rebuilder_.endElements();
+  return totals;
+}
+
+/// A root that seemed to end too soon was right where nothing of it came back from behind its end.
+void Recovery::settleClaim()
+{
+  Frame& top = frames_.back();
+  totals_.closed += top.claim != 0 && keptTo_ > top.claim && !top.hidden ? 1 : 0;
+  top.claim = 0;
+}
+
 void Recovery::closeGroup()
 {
+  settleClaim();
   if (!frames_.back().hidden)
   {
     rebuilder_.close();
@@ -203,13 +219,15 @@ bool Recovery::takeEnd(uint64_t offset, bool wide)
   damaged_ = false;
   while (frames_.size() > at)
   {
-    const Frame& top = frames_.back();
+    Frame& top = frames_.back();
     if (wouldReadAsOpen()) // of a root that asks for no end element none is kept
     {
       keepOpen();
       break;
     }
-    totals_.closed += !top.hidden && (top.open || top.limit != ending.end) ? 1 : 0;
+    const bool right = top.claim != 0 ? top.claim == ending.end : !top.open && top.limit == ending.end;
+    totals_.closed += !top.hidden && !right ? 1 : 0;
+    top.claim = 0;
     closeGroup();
   }
   return true;
@@ -320,6 +338,21 @@ void Recovery::trimPair(Candidate& found)
   }
 }
 
+/// A node that goes on beyond a size that nothing confirms contradicts it.
+void Recovery::contradict(uint64_t end)
+{
+  const bool beyond = frames_.back().limit < end;
+  for (size_t i = 1; beyond && i < frames_.size(); ++i)
+  {
+    if (frames_[i].limit < end)
+    {
+      totals_.closed += frames_[i].open || frames_[i].hidden ? 0 : 1;
+      frames_[i].limit = frames_[i - 1].limit;
+      frames_[i].open = true;
+    }
+  }
+}
+
 void Recovery::take(Candidate found)
 {
   if (found.pairBytes != 0)
@@ -327,25 +360,23 @@ void Recovery::take(Candidate found)
     trimPair(found);
   }
   fit(is64(found.header()), found.isGroup());
+  contradict(found.isGroup() ? position_ + headerLength(found.header().hdrType) : found.end);
+  last_ = found.header();
+  lastTold_ = false;
+  if (damaged_)
+  {
+    doubt(last_);
+  }
   if (found.isGroup())
   {
     takeGroup(found);
     damaged_ = false;
+    keptTo_ = position_;
     return;
   }
   ++totals_.nodes;
   damaged_ = false;
-  // A node that goes on beyond a size that nothing confirms contradicts it.
-  const bool beyond = frames_.back().limit < found.end;
-  for (size_t i = 1; beyond && i < frames_.size(); ++i)
-  {
-    if (frames_[i].limit < found.end)
-    {
-      totals_.closed += frames_[i].open || frames_[i].hidden ? 0 : 1;
-      frames_[i].limit = frames_[i - 1].limit;
-      frames_[i].open = true;
-    }
-  }
+  keptTo_ = found.end - found.pairBytes;
   rebuilder_.add(found.data);
   totals_.kept += found.end - found.pairBytes - position_;
   totals_.pairs += found.pairBytes != 0 || found.pairMissing ? 1 : 0;
@@ -374,9 +405,10 @@ void Recovery::takeGroup(const Candidate& found)
   frame.sure = found.trust == Trust::paired;
   frame.fixed = frames_.size() == 1 && !damaged_;
   const uint64_t around = frames_.back().limit;
-  frame.open = found.open || found.end > around || (frames_.size() == 1 && !frame.sure && endsTooSoon(found.end));
+  const bool repaired = found.open || found.end > around;
+  frame.claim = !repaired && frames_.size() == 1 && !frame.sure && endsTooSoon(found.end) ? found.end : 0;
+  frame.open = repaired || frame.claim != 0;
   frame.limit = frame.open ? around : found.end;
-  const bool repaired = frame.open;
   if (frame.sure && found.end > around)
   {
     for (size_t i = frames_.size(); i-- > 1 && frames_[i].limit < found.end;)
@@ -446,9 +478,16 @@ bool Recovery::endByZeros()
 
 void Recovery::lose(uint64_t to, std::string reason)
 {
+  if (!lastTold_ && keptTo_ == position_)
+  {
+    doubt(last_);
+  }
   totals_.lost += to - position_;
   ++totals_.losses;
-  sink_({position_, to - position_, std::move(reason)});
+  if (sinks_.loss)
+  {
+    sinks_.loss({position_, to - position_, std::move(reason)});
+  }
   position_ = to;
   damaged_ = true;
 }

@@ -23,6 +23,14 @@ struct Loss
   std::string reason{};
 };
 
+/// A node that came back from beside lost bytes, of which something says that it may be none.
+struct Doubt
+{
+  uint64_t offset = 0;
+  uint64_t length = 0; ///< of its header and its payload; of a group: its header
+  std::string reason{};
+};
+
 /// Where every byte of the file went, and what was done.
 struct RecoveryTotals
 {
@@ -31,7 +39,9 @@ struct RecoveryTotals
   uint64_t unread = 0; ///< behind the place where searching was given up
   uint64_t zeros = 0;  ///< of the kept: behind the stream
   uint64_t nodes = 0;  ///< that came back, end elements not counted
+  uint64_t ends = 0;   ///< end elements that were written
   uint64_t losses = 0; ///< runs of lost bytes
+  uint64_t doubts = 0; ///< nodes that may be none
   uint64_t closed = 0; ///< groups that were open or whose size was wrong
   uint64_t made = 0;   ///< groups made for what has lost its own
   uint64_t pairs = 0;  ///< pairs and end elements that were missing or damaged
@@ -47,16 +57,21 @@ struct RecoveryTotals
 class Recovery
 {
 public:
-  using Sink = std::function<void(const Loss&)>;
+  /// Whom to tell. Either may be empty.
+  struct Sinks
+  {
+    std::function<void(const Loss&)> loss{};
+    std::function<void(const Doubt&)> doubt{};
+  };
 
   /// `search`: bytes that may be searched for nodes.
-  Recovery(ByteSource& source, const Form& form, Rebuilder& rebuilder, uint64_t search, Sink sink);
+  Recovery(ByteSource& source, const Form& form, Rebuilder& rebuilder, uint64_t search, Sinks sinks);
 
   /// Goes on by one node or one gap; false at the end, when all groups are closed.
   bool step();
 
   uint64_t position() const { return position_; }
-  const RecoveryTotals& totals() const { return totals_; }
+  RecoveryTotals totals() const;
 
 private:
   /// How much speaks for a node.
@@ -90,6 +105,7 @@ private:
     size_t sureAt = 0;   ///< the innermost frame from here up whose limit is confirmed
     size_t heldAt = 0;   ///< and the one that decides whether 64-bit headers can stand here
     bool hidden = false; ///< too deep: its children go to the group around
+    uint64_t claim = 0;  ///< where its size says that it ends, when only what stands there speaks against it; else 0
   };
 
   static bool isKnown(const TAVHeader& header);
@@ -107,7 +123,9 @@ private:
   Belief beliefBehind(uint64_t end, bool wide, uint64_t limit);
   bool goesOn(uint64_t offset, bool wide);
   static bool isExact(const TAVHeader& header);
+  static bool isOdd(const TAVHeader& group);
   static bool isStrange(const Candidate& found);
+  bool isMovedRoot(const Candidate& found);
   bool isSure(const uint8_t* bytes, uint64_t offset, bool wide);
   static bool mayHoldNodes(const Candidate& found);
   bool isContradicted(const Candidate& found);
@@ -115,6 +133,7 @@ private:
   bool believe(Candidate& found, bool onWay);
   bool endOfStranger(const TAVHeader& header, uint64_t limit, uint64_t& end);
   bool isStranger(const TAVHeader& header, uint64_t& end);
+  bool isTail(const Candidate& found, uint64_t from);
   bool isDamagedEnd(const Candidate& found, uint64_t limit);
   uint64_t firstSure(uint64_t from, uint64_t to, bool wide);
   bool leadsTo(uint64_t from, bool wide, uint64_t end);
@@ -126,6 +145,7 @@ private:
   bool takeEnd(uint64_t offset, bool wide);
   bool enterEnding();
   void trimPair(Candidate& found);
+  void contradict(uint64_t end);
   void take(Candidate found);
   void takeGroup(const Candidate& found);
   void keepHeader(const TAVHeader& header);
@@ -140,6 +160,9 @@ private:
   bool mayEndInZeros() const;
   bool endByZeros();
   void lose(uint64_t to, std::string reason);
+  void settleClaim();
+  bool isMostlyEyes(const TAVHeader& data);
+  void doubt(const TAVHeader& node);
   void openGroup(const Frame& frame, const TAVHeader& header);
   void closeGroup();
   void makeParent(bool wide);
@@ -153,7 +176,7 @@ private:
   Form form_;
   Rebuilder& rebuilder_;
   Prober prober_;
-  Sink sink_;
+  Sinks sinks_;
   uint64_t search_;
   uint64_t spent_ = 0;
   RecoveryTotals totals_{};
@@ -163,6 +186,9 @@ private:
   bool indexed_ = false;
   bool damaged_ = false; ///< bytes directly before the position are lost
   uint64_t position_ = 0;
+  uint64_t keptTo_ = 0;   ///< behind the last node that came back
+  TAVHeader last_{};      ///< that node,
+  bool lastTold_ = true;  ///< and whether nothing more is to be said of it
   uint64_t sureFrom_ = 0; ///< the first node beyond doubt at or behind this place is at sureAt_
   uint64_t sureAt_ = 0;
   bool sureFound_ = false;

@@ -134,7 +134,7 @@ void Recovery::lookAtGroup(Candidate& found, uint64_t limit)
   {
     found.trust = named ? Trust::followed : Trust::alone;
   }
-  else if (!found.open || (named && isCutAt(start, wide)))
+  else if (!found.open || (named && (isCutAt(start, wide) || (header.nodeOffset == 0 && !isOdd(header)))))
   {
     found.trust = Trust::alone;
   }
@@ -263,7 +263,7 @@ bool Recovery::isExact(const TAVHeader& header)
 /// Whether several nodes follow one another, or few up to the end of a group.
 bool Recovery::isRun(uint64_t offset, bool wide)
 {
-  constexpr int kEnough = 6; ///< three nodes that are followed, or two whose sizes can be no others
+  constexpr int kEnough = 5; ///< three nodes that are followed, or two of which the size of one can be no other
   for (int weight = 0; weight < kEnough;)
   {
     Ending ending;
@@ -286,24 +286,38 @@ bool Recovery::isRun(uint64_t offset, bool wide)
   return true;
 }
 
+/// Whether a header is such as no writer makes of a group.
+bool Recovery::isOdd(const TAVHeader& group)
+{
+  return is64(group) ? (infoOf(group) & ~kInfoBits) != 0 : typeOf(group) != TAV_TYPE_HEADER32;
+}
+
 /// Whether a group's header is such as no writer makes, or its claim such as few groups have.
 bool Recovery::isStrange(const Candidate& found)
 {
+  return found.isGroup() && ((found.open && !isSizeUnknown(found.header())) || isOdd(found.header()));
+}
+
+/// Whether a group claims more than there is from its place on, and from the start of the file just what there is: a
+/// root whose sector went elsewhere.
+bool Recovery::isMovedRoot(const Candidate& found)
+{
   const TAVHeader& header = found.header();
-  return found.isGroup() && ((found.open && !isSizeUnknown(header)) ||
-                             (is64(header) ? (infoOf(header) & ~kInfoBits) != 0 : typeOf(header) != TAV_TYPE_HEADER32));
+  return found.isGroup() && found.open && !isOdd(header) && found.trust >= Trust::followed &&
+         addSaturated(headerLength(header.hdrType), sizeOf(header)) == source_.size();
 }
 
 bool Recovery::isSure(const uint8_t* bytes, uint64_t offset, bool wide)
 {
   Candidate found;
   if (tryAt(bytes, offset, wide, found) && (found.trust >= Trust::followed || isExact(found.header())) &&
-      !isStrange(found))
+      (!isStrange(found) || (isMovedRoot(found) && isRun(offset, wide))))
   {
     return true;
   }
-  return form_.root64 && canHold(!wide) && tryAt(bytes, offset, !wide, found) && found.trust >= Trust::followed &&
-         !isStrange(found) && isRun(offset, !wide);
+  return form_.root64 && tryAt(bytes, offset, !wide, found) && found.trust >= Trust::followed &&
+         (isStrange(found) ? isMovedRoot(found) : !found.isGroup() || !wide || isConfirmed(found)) &&
+         isRun(offset, !wide);
 }
 
 /// The first node between two places that is followed or paired; `to` when there is none.
@@ -427,8 +441,8 @@ bool Recovery::holdsRun(uint64_t from, uint64_t to)
     for (const bool wide : {true, false})
     {
       Candidate found;
-      if (canHold(wide) && tryAt(window.data(), at, wide, found) && found.trust >= Trust::followed &&
-          !isStrange(found) && (!found.isGroup() || isConfirmed(found)) && isRun(at, wide))
+      if ((!wide || form_.root64) && tryAt(window.data(), at, wide, found) && found.trust >= Trust::followed &&
+          (isStrange(found) ? isMovedRoot(found) : !found.isGroup() || wide || isConfirmed(found)) && isRun(at, wide))
       {
         return true;
       }
@@ -452,17 +466,20 @@ bool Recovery::mayHoldNodes(const Candidate& found)
   return (type == TAV_TYPE_BINARY || type == TAV_TYPE_UINT64_ARRAY) && !found.pairMissing && found.pairBytes == 0;
 }
 
-/// Whether nodes inside of what a node claims follow one another exactly to its end.
+/// Whether nodes inside of what a node claims follow one another exactly to its end, or to that of its payload where
+/// the announced pair is damaged.
 bool Recovery::isContradicted(const Candidate& found)
 {
   const TAVHeader& header = found.header();
-  if (found.isGroup() || isExact(header) || mayHoldNodes(found))
+  if (found.isGroup() || (isExact(header) && found.pairBytes == 0) || mayHoldNodes(found))
   {
     return false;
   }
   const uint64_t start = header.nodeOffset + headerLength(header.hdrType);
   const uint64_t sure = firstSure(start, found.end, is64(header));
-  return sure < start + sizeOf(header) && leadsTo(sure, is64(header), found.end);
+  return sure < start + sizeOf(header) &&
+         (leadsTo(sure, is64(header), found.end) ||
+          (found.pairBytes != 0 && leadsTo(sure, is64(header), found.end - found.pairBytes)));
 }
 
 /// Whether a node stands where it seems to. On the way from node to node its header is trusted; behind damage, all its
@@ -470,15 +487,16 @@ bool Recovery::isContradicted(const Candidate& found)
 bool Recovery::believe(Candidate& found, bool onWay)
 {
   const TAVHeader& header = found.header();
-  if (found.trust >= Trust::followed)
-  {
-    return found.trust == Trust::paired || !isContradicted(found);
-  }
   const bool named = Prober::isNamed(elmOf(header));
   const uint64_t start = header.nodeOffset + headerLength(header.hdrType);
+  if (found.trust >= Trust::followed)
+  {
+    return found.trust == Trust::paired ? named || !found.isGroup() || !holdsRun(header.nodeOffset + 1, start)
+                                        : !isContradicted(found);
+  }
   if (onWay && !damaged_ && named && isExact(header))
   {
-    return !holdsRun(start, found.end);
+    return !holdsRun(header.nodeOffset + 1, found.end);
   }
   // Its size can be damaged: then nodes stand inside of what it claims, and go on beyond.
   const uint64_t end = found.isGroup() ? start : found.end;

@@ -1,5 +1,6 @@
 // Behind damage: where the next node is, and what is said of the bytes before it.
 #include <algorithm>
+#include <cstring>
 
 #include "tools/form.h"
 #include "tools/recovery.h"
@@ -18,6 +19,19 @@ bool Recovery::isDamagedEnd(const Candidate& found, uint64_t limit)
   return isEndElement(elmOf(header)) && !readEnding(source_, form_, header.nodeOffset, is64(header), limit, ending);
 }
 
+/// Whether a 32-bit header without anything that speaks for it is the second half of a 64-bit one, which a node follows
+/// and which begins at `from` or later.
+bool Recovery::isTail(const Candidate& found, uint64_t from)
+{
+  const TAVHeader& header = found.header();
+  constexpr uint64_t half = kHeaderSize64 - kHeaderSize32;
+  TAVHeader whole{};
+  return form_.root64 && !is64(header) && found.trust == Trust::alone &&
+         header.nodeOffset >= addSaturated(from, half) &&
+         prober_.header(header.nodeOffset - half, true, sureLimit(), whole) && sizeOf(whole) != 0 &&
+         prober_.judge(header.nodeOffset - half, true, sureLimit()) == Belief::followed;
+}
+
 /// The first place from `from` on where a node can begin; false when there is none before `to`.
 bool Recovery::findNext(uint64_t from, uint64_t to, Candidate& found)
 {
@@ -34,14 +48,16 @@ bool Recovery::findNext(uint64_t from, uint64_t to, Candidate& found)
       const uint64_t offset = at + i;
       if (tryAt(window.data() + i, offset, own, found))
       {
-        const bool strange = found.isGroup() && found.trust == Trust::alone &&
-                             (isStrange(found) || found.open || (!own && sizeOf(found.header()) == 0));
-        if (!strange && !isDamagedEnd(found, to) && believe(found, false))
+        const bool strange = found.isGroup() &&
+                             (found.trust == Trust::alone
+                                  ? isStrange(found) || found.open || (!own && sizeOf(found.header()) == 0)
+                                  : isStrange(found) && found.open && isOdd(found.header()));
+        if (!strange && !isTail(found, from) && !isDamagedEnd(found, to) && believe(found, false))
         {
           return true;
         }
       }
-      if (canHold(!own) && form_.root64 && tryAt(window.data() + i, offset, !own, found) &&
+      if (form_.root64 && tryAt(window.data() + i, offset, !own, found) &&
           found.trust >= Trust::followed && !isDamagedEnd(found, to) && isRun(offset, !own) && believe(found, false))
       {
         return true;
@@ -103,6 +119,41 @@ std::string Recovery::reasonAt(uint64_t offset)
     }
   }
   return "no node is whole";
+}
+
+/// Whether most of a payload, as far as one page goes, is eye catchers: a damaged size covers nodes with pairs.
+bool Recovery::isMostlyEyes(const TAVHeader& data)
+{
+  std::vector<uint8_t> bytes(static_cast<size_t>(std::min<uint64_t>(sizeOf(data), ByteSource::kPage)));
+  bytes.resize(source_.read(data.nodeOffset + headerLength(data.hdrType), bytes));
+  uint64_t covered = 0;
+  for (size_t i = 0; i + kEyeLength <= bytes.size();)
+  {
+    uint64_t word = 0;
+    std::memcpy(&word, bytes.data() + i, sizeof word);
+    const bool eye = word == TAV_EYE_CATCHER || word == kor::byteswap64(TAV_EYE_CATCHER);
+    covered += eye ? kEyeLength : 0;
+    i += eye ? kEyeLength : 1;
+  }
+  return covered * 2 > bytes.size();
+}
+
+/// Tells of a node beside lost bytes when its element or its payload says that it may be none.
+void Recovery::doubt(const TAVHeader& node)
+{
+  const bool eyes = !isGroup(node) && isMostlyEyes(node);
+  lastTold_ = true;
+  if (Prober::isNamed(elmOf(node)) && !eyes)
+  {
+    return;
+  }
+  ++totals_.doubts;
+  if (sinks_.doubt)
+  {
+    sinks_.doubt({node.nodeOffset, headerLength(node.hdrType) + (isGroup(node) ? 0 : sizeOf(node)),
+                  eyes ? "stands beside lost bytes, and most of its payload is eye catchers"
+                       : "stands beside lost bytes, and its element is not in the dictionary"});
+  }
 }
 
 void Recovery::gap()

@@ -2,6 +2,9 @@
 
 #include <cstdio>
 
+#include "kor/host.h"
+#include "tools/value.h"
+
 namespace tav::tool
 {
 
@@ -57,12 +60,13 @@ std::string byteText(uint64_t bytes)
   return text;
 }
 
-std::string problemText(const Problem& problem)
+std::string problemText(const Problem& problem, std::FILE* where)
 {
+  const auto part = [where](const std::string& text) { return shown(text, where); };
   std::string text = "tav: ";
   if (!problem.file.empty())
   {
-    text += problem.file + ": ";
+    text += part(problem.file) + ": ";
   }
   if (problem.offset)
   {
@@ -71,28 +75,33 @@ std::string problemText(const Problem& problem)
   }
   if (!problem.path.empty())
   {
-    text += problem.path + ": ";
+    text += part(problem.path) + ": ";
   }
-  text += problem.sentence;
+  text += part(problem.sentence);
   if (problem.code != TAV_RC_OK)
   {
     text += std::string(" (") + korCodeName(problem.code) + ")";
   }
   if (!problem.hint.empty())
   {
-    text += "\n     " + problem.hint;
+    text += "\n     " + part(problem.hint);
   }
   return text;
 }
 
 void report(const Problem& problem)
 {
-  std::fprintf(stderr, "%s\n", problemText(problem).c_str());
+  std::fprintf(stderr, "%s\n", problemText(problem, stderr).c_str());
 }
 
 void report(std::string_view sentence)
 {
-  std::fprintf(stderr, "tav: %.*s\n", static_cast<int>(sentence.size()), sentence.data());
+  report(Problem{.file = {}, .sentence = std::string(sentence)});
+}
+
+std::string shown(std::string_view text, std::FILE* where)
+{
+  return kor::isTerminal(where) ? forTerminal(text) : std::string(text);
 }
 
 Failure::Failure(Status exitStatus, Problem what)
@@ -109,7 +118,7 @@ Failure::Failure(std::string sentence, std::string hint)
 
 void failAt(const std::string& file, uint32_t code, std::string hint)
 {
-  Problem problem{file};
+  Problem problem{file.empty() ? "''" : file};
   problem.sentence = codeSentence(code);
   problem.code = code;
   problem.hint = std::move(hint);

@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstdint>
+#include <cstdio>
 #include <optional>
 #include <stdexcept>
 #include <string>
@@ -34,11 +35,15 @@ struct Problem
   std::string hint{};               ///< what to do next; a line of its own
 };
 
-/// The lines of a problem, without a line end after the last one.
-std::string problemText(const Problem& problem);
+/// The lines of a problem, without a line end after the last one, as they are printed to a stream: see `shown`.
+std::string problemText(const Problem& problem, std::FILE* where = stdout);
 
 /// Prints a problem to standard error.
 void report(const Problem& problem);
+
+/// A text, a name of a file for instance, as it is printed to a stream: where that is a terminal, nothing in it steers
+/// it; it is written as `get` writes values there.
+std::string shown(std::string_view text, std::FILE* where = stdout);
 
 /// Prints `tav: sentence` to standard error.
 void report(std::string_view sentence);

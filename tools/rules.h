@@ -41,6 +41,7 @@ enum class RuleId : uint8_t
   stringHigh,
   damaged,
   behindStream,
+  zerosBetween,
   zerosLong,
   tooDeep,
   count

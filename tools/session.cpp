@@ -1,11 +1,25 @@
 #include "tools/session.h"
 
-#include <cstdio>
-
 #include "tools/report.h"
+#include "tools/walker.h"
 
 namespace tav::tool
 {
+
+namespace
+{
+
+/// Whether the first bytes are the header of a group that the dictionary knows and the file has room for: then they are
+/// nothing else, whatever they look like.
+bool beginsWithRoot(Stream& stream)
+{
+  Walker walker(stream.bytes(), stream.form());
+  Event event;
+  return stream.recognition.isStream && walker.next(event) && event.what == What::nodeBegin && event.node.isGroup() &&
+         !event.node.has(kOverrun) && Prober::isNamed(event.node.elm());
+}
+
+} // namespace
 
 FormChoice formChoice(const Invocation& invocation)
 {
@@ -35,33 +49,80 @@ uint64_t ringBytes(const Invocation& invocation)
   return invocation.number("--ring").value_or(kDefaultRing);
 }
 
-Stream openStream(const Invocation& invocation, const std::string& path, bool lenient)
+Stream openStream(const Invocation& invocation, const std::string& path, uint64_t from, bool lenient)
 {
-  Stream stream{ByteSource::open(path, ringBytes(invocation)), {}};
-  stream.recognition = recognise(*stream.source, formChoice(invocation));
-  if (!stream.recognition.isStream && !lenient)
+  const SourceLimits limits{ringBytes(invocation), invocation.number("--spool-limit").value_or(kDefaultSpool)};
+  Stream stream{ByteSource::open(path, limits, from), {}};
+  const FormChoice choice = formChoice(invocation);
+  stream.recognition = recognise(*stream.source, choice);
+  const bool formGiven = choice.swapped || choice.root64 || choice.aligned;
+  if (!formGiven && !beginsWithRoot(stream))
   {
-    Problem problem{stream.source->name()};
-    problem.sentence =
-        stream.source->size() == 0 ? "the file is empty" : "this is no stream, or nothing of it is whole";
-    problem.hint = "'tav info' tells what was tried; --byte-order, --root and --align say how to read it";
-    throw Failure(kTooDamaged, problem);
+    stream.kind = fileKindOf(*stream.source);
+  }
+  if (!stream.isStream() && !lenient)
+  {
+    throw Failure(kTooDamaged, noStream(stream));
   }
   return stream;
 }
 
-Stream openStream(const Invocation& invocation)
+Problem noStream(const Stream& stream)
 {
-  return openStream(invocation, invocation.arguments().at(0));
+  Problem problem{stream.source->name()};
+  if (stream.kind)
+  {
+    problem.sentence = "this is " + std::string(stream.kind->text) + ", no stream";
+    problem.hint = stream.kind->hint;
+    return problem;
+  }
+  problem.sentence =
+      stream.source->size() == 0 ? "the file is empty, no stream" : "this is no stream, or nothing of it is whole";
+  problem.hint = stream.source->size() == 0
+                     ? ""
+                     : "'tav info' tells what was tried; --byte-order, --root and --align say how to read it";
+  return problem;
+}
+
+Stream openStream(const Invocation& invocation, bool lenient)
+{
+  return openStream(invocation, invocation.arguments().at(0), invocation.number("--from").value_or(0), lenient);
+}
+
+DamageNotices::DamageNotices(Stream& stream)
+    : stream_(stream), watch_(stream.bytes(), stream.form(), [this](PassedOver passed) {
+        ++places_;
+        if (passed_.size() < kMostLines)
+        {
+          passed_.push_back(std::move(passed));
+        }
+      })
+{
+}
+
+Status DamageNotices::tell() const
+{
+  const std::string& name = stream_.source->name();
+  for (const PassedOver& passed : passed_)
+  {
+    report(Problem{name, passed.offset, passed.path, passed.sentence, passed.code});
+  }
+  if (places_ > passed_.size())
+  {
+    report(Problem{.file = name,
+                   .sentence = "passed over " + counted(places_ - passed_.size(), "more place") +
+                               "; 'tav check' tells all"});
+  }
+  return places_ == 0 ? kFine : kFindings;
 }
 
 void tellStatistics(const Invocation& invocation, const ByteSource& source)
 {
   if (invocation.has("--stats"))
   {
-    std::fprintf(stderr, "tav: %s: %llu bytes read in %llu calls\n", source.name().c_str(),
-                 static_cast<unsigned long long>(source.bytesRead()),
-                 static_cast<unsigned long long>(source.readCalls()));
+    report(Problem{.file = source.name(),
+                   .sentence = std::to_string(source.bytesRead()) + " bytes read in " +
+                               std::to_string(source.readCalls()) + " calls"});
   }
 }
 

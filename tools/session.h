@@ -4,9 +4,13 @@
 
 #include <memory>
 #include <string>
+#include <vector>
 
+#include "tools/damage_watch.h"
+#include "tools/file_kind.h"
 #include "tools/form.h"
 #include "tools/options.h"
+#include "tools/report.h"
 #include "tools/source.h"
 
 namespace tav::tool
@@ -17,10 +21,15 @@ struct Stream
 {
   std::unique_ptr<ByteSource> source;
   Recognition recognition;
+  std::optional<FileKind> kind{}; ///< what else the file is, when it is no stream
 
   ByteSource& bytes() { return *source; }
   const Form& form() const { return recognition.form; }
+  bool isStream() const { return recognition.isStream && !kind; }
 };
+
+/// What to report of a file that is no stream, an empty one included: one wording for all commands.
+Problem noStream(const Stream& stream);
 
 /// What the options say of the form: --byte-order, --root, --align, --no-align.
 FormChoice formChoice(const Invocation& invocation);
@@ -28,12 +37,34 @@ FormChoice formChoice(const Invocation& invocation);
 /// Bytes of memory for pages: --ring.
 uint64_t ringBytes(const Invocation& invocation);
 
-/// Opens a file and recognises its form; options override. Throws Failure with kTooDamaged when nothing in it looks
-/// like a stream. With `lenient`, such a file is handed out all the same, with the most likely form.
-Stream openStream(const Invocation& invocation, const std::string& path, bool lenient = false);
+/// Opens a file, from an offset on, and recognises its form; options override. Throws Failure with kTooDamaged when it
+/// is no stream. With `lenient`, such a file is handed out all the same, with the most likely form.
+Stream openStream(const Invocation& invocation, const std::string& path, uint64_t from, bool lenient = false);
 
-/// The one FILE argument of most commands.
-Stream openStream(const Invocation& invocation);
+/// The one FILE argument of most commands, from --from on.
+Stream openStream(const Invocation& invocation, bool lenient = false);
+
+/// Collects what a command passes over, to be told when its result is written: a line each on standard error.
+class DamageNotices
+{
+public:
+  explicit DamageNotices(Stream& stream);
+  DamageNotices(const DamageNotices&) = delete;
+  DamageNotices& operator=(const DamageNotices&) = delete;
+
+  void see(const Walker& walker, const Event& event) { watch_.see(walker, event); }
+
+  /// Prints the lines; kFindings when there are some, else kFine.
+  Status tell() const;
+
+private:
+  static constexpr size_t kMostLines = 1000; ///< the rest is counted
+
+  const Stream& stream_;
+  std::vector<PassedOver> passed_{};
+  uint64_t places_ = 0;
+  DamageWatch watch_;
+};
 
 /// Remembers how much was read for --stats. Called when a source is done with.
 void tellStatistics(const Invocation& invocation, const ByteSource& source);

@@ -62,8 +62,62 @@ private:
   bool named_ = false;
 };
 
+/// Whether a file has other bytes than its size says. Files that the system makes while they are read, as those of
+/// /proc, have the size 0 or that of a page; larger ones are believed.
+bool tellsWrongSize(const std::string& name, const std::string& path, uint64_t size)
+{
+  constexpr uint64_t mostDoubted = uint64_t{64} * 1024;
+  if (size > mostDoubted)
+  {
+    return false;
+  }
+  std::vector<uint8_t> bytes(static_cast<size_t>(size) + 1);
+  return PipeReader(name, path).read(bytes) != size;
+}
+
+[[noreturn]] void failAtLimit(const std::string& name, uint64_t limit)
+{
+  Problem problem{name};
+  problem.sentence = "more than " + byteText(limit) + " come from it";
+  problem.hint = "--spool-limit sets how much is copied to a temporary file, 0 for no limit";
+  throw Failure(kTrouble, problem);
+}
+
+/// What stands in a storage from an offset on, for reading.
+class StorageWindow : public TAVSideStorage
+{
+public:
+  StorageWindow(TAVSideStorage& whole, uint64_t from)
+      : TAVSideStorage(0, whole.attributes & (TAV_ATTR_READ_FORWARD | TAV_ATTR_SEEK)), whole_(whole), from_(from)
+  {
+    ioUnit = whole.ioUnit;
+  }
+
+  uint32_t seek(uint64_t offset, uint64_t hint) override { return whole_.seek(from_ + offset, hint); }
+  uint32_t getPosition(uint64_t* position) override { return without(whole_.getPosition(position), position); }
+  uint32_t getTotalSize(uint64_t* size) override { return without(whole_.getTotalSize(size), size); }
+  uint32_t read(uint64_t wanted, void** data, uint64_t room, uint64_t* done, bool zeroCopy, bool backward) override
+  {
+    return backward ? TAV_RC_NOT_SUPPORTED : whole_.read(wanted, data, room, done, zeroCopy, false);
+  }
+  uint32_t write(const void*, uint64_t, uint64_t*) override { return TAV_RC_NOT_SUPPORTED; }
+  uint32_t getMemory(void**, uint64_t*) override { return TAV_RC_NOT_SUPPORTED; }
+  uint32_t lock(uint32_t mode) override { return whole_.lock(mode); }
+  uint32_t unlock() override { return whole_.unlock(); }
+
+private:
+  uint32_t without(uint32_t code, uint64_t* place) const
+  {
+    *place -= code == TAV_RC_OK ? from_ : 0;
+    return code;
+  }
+
+  TAVSideStorage& whole_;
+  uint64_t from_;
+};
+
 /// Copies a pipe to a temporary file and returns its path.
-std::string spool(const std::string& name, const std::string& path)
+std::string spool(const std::string& name, const std::string& path, uint64_t limit)
 {
   PipeReader reader(name, path);
   KORHFile file;
@@ -74,24 +128,30 @@ std::string spool(const std::string& name, const std::string& path)
     kor::removeOnInterrupt(temporary);
   }
   std::vector<uint8_t> buffer(ByteSource::kLongRead);
+  uint64_t total = 0;
   try
   {
     while (const size_t count = reader.read(buffer))
     {
+      total += count;
+      if (limit != 0 && total > limit)
+      {
+        failAtLimit(name, limit);
+      }
       KORFileWriteParam param;
       param.pData = buffer.data();
       param.length = count;
       uint64_t done = 0;
       if (const uint32_t code = file.write(&param, &done); code != TAV_RC_OK)
       {
-        failAt(temporary, code);
+        failAt(temporary, code, "it holds what " + name + " has given so far; set TMPDIR to a folder with more room");
       }
     }
   }
   catch (...)
   {
     kor::removeFile(temporary);
-    kor::removeOnInterrupt({});
+    kor::keepOnInterrupt(temporary);
     throw;
   }
   return temporary;
@@ -127,8 +187,8 @@ std::string openTemporary(KORHFile& file)
   }
 }
 
-ByteSource::ByteSource(std::string name, std::string path, uint64_t ringBytes)
-    : name_(std::move(name)), maxPages_(static_cast<size_t>(std::max<uint64_t>(2, ringBytes / kPage)))
+ByteSource::ByteSource(std::string name, std::string path, const SourceLimits& limits, uint64_t from)
+    : name_(std::move(name)), from_(from), maxPages_(static_cast<size_t>(std::max<uint64_t>(2, limits.ring / kPage)))
 {
   std::error_code error;
   const auto kind = std::filesystem::status(kor::pathOf(path), error).type();
@@ -138,9 +198,11 @@ ByteSource::ByteSource(std::string name, std::string path, uint64_t ringBytes)
   }
   const bool regular = path != "-" && (error || kind == std::filesystem::file_type::regular ||
                                        kind == std::filesystem::file_type::not_found);
-  if (!regular)
+  const bool known = regular && kind == std::filesystem::file_type::regular;
+  const uint64_t told = known ? std::filesystem::file_size(kor::pathOf(path), error) : 0;
+  if (!regular || (known && !error && tellsWrongSize(name_, path, told)))
   {
-    path = temporary_ = spool(name_, path);
+    path = temporary_ = spool(name_, path, limits.spool);
   }
   KORFileOpenParam param;
   param.pPath = path.c_str();
@@ -152,8 +214,8 @@ ByteSource::ByteSource(std::string name, std::string path, uint64_t ringBytes)
     // Where an open file can be removed it is gone from now on, however the program ends.
     if (kor::removeFile(temporary_))
     {
+      kor::keepOnInterrupt(temporary_);
       temporary_.clear();
-      kor::removeOnInterrupt({});
     }
   }
   if (code == TAV_RC_OK)
@@ -164,6 +226,23 @@ ByteSource::ByteSource(std::string name, std::string path, uint64_t ringBytes)
   {
     failAt(name_, code);
   }
+  if (from_ != 0)
+  {
+    startAt();
+  }
+}
+
+void ByteSource::startAt()
+{
+  if (from_ >= size_)
+  {
+    Problem problem{name_, from_};
+    problem.sentence = "--from: lies behind the end of the file";
+    throw Failure(kTrouble, problem);
+  }
+  name_ += " from " + hexOffset(from_);
+  size_ -= from_;
+  window_ = std::make_unique<StorageWindow>(*file_, from_);
 }
 
 ByteSource::~ByteSource()
@@ -172,13 +251,13 @@ ByteSource::~ByteSource()
   {
     file_.reset();
     kor::removeFile(temporary_);
-    kor::removeOnInterrupt({});
+    kor::keepOnInterrupt(temporary_);
   }
 }
 
-std::unique_ptr<ByteSource> ByteSource::open(const std::string& path, uint64_t ringBytes)
+std::unique_ptr<ByteSource> ByteSource::open(const std::string& path, const SourceLimits& limits, uint64_t from)
 {
-  return std::unique_ptr<ByteSource>(new ByteSource(path == "-" ? "standard input" : path, path, ringBytes));
+  return std::unique_ptr<ByteSource>(new ByteSource(path == "-" ? "standard input" : path, path, limits, from));
 }
 
 ByteSource::Page& ByteSource::slotFor(uint64_t number)
@@ -207,7 +286,7 @@ void ByteSource::fetch(uint64_t number, uint64_t count)
   buffer_.resize(static_cast<size_t>(wanted));
   void* target = buffer_.data();
   uint64_t done = 0;
-  uint32_t code = file_->seek(offset, 1);
+  uint32_t code = file_->seek(from_ + offset, 1);
   if (code == TAV_RC_OK)
   {
     code = file_->read(wanted, &target, wanted, &done, false, false);

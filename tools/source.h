@@ -16,21 +16,30 @@ namespace tav::tool
 {
 
 inline constexpr uint64_t kDefaultRing = uint64_t{10} * 1024 * 1024;
+inline constexpr uint64_t kDefaultSpool = uint64_t{16} * 1024 * 1024 * 1024;
+
+/// How much may be taken for a file's bytes.
+struct SourceLimits
+{
+  uint64_t ring = kDefaultRing;   ///< of memory, at least two pages
+  uint64_t spool = kDefaultSpool; ///< of a temporary file for a pipe; 0 is no limit
+};
 
 /// Opens a new file in the folder for temporary files and returns its path. The name is tried until nobody else has it.
 std::string openTemporary(KORHFile& file);
 
-/// A file that is read at any offset, through pages that are kept while they are used. Standard input and pipes are
-/// copied to a temporary file first, so that everything works on them. Used by one thread.
+/// A file that is read at any offset, through pages that are kept while they are used. Standard input, pipes and files
+/// that tell a wrong size, as those of /proc do, are copied to a temporary file first, so that everything works on
+/// them. Used by one thread.
 class ByteSource
 {
 public:
   static constexpr uint64_t kPage = uint64_t{16} * 1024;
   static constexpr uint64_t kLongRead = uint64_t{64} * kPage; ///< what is read at once when reading goes straight on
 
-  /// Opens a file, "-" for standard input. At most `ringBytes` (and at least two pages) are kept in memory.
-  /// Throws Failure when that does not work.
-  static std::unique_ptr<ByteSource> open(const std::string& path, uint64_t ringBytes = kDefaultRing);
+  /// Opens a file, "-" for standard input. What stands before `from` is left out, and all offsets count from there.
+  /// Throws Failure when that does not work, also because a limit is reached.
+  static std::unique_ptr<ByteSource> open(const std::string& path, const SourceLimits& limits = {}, uint64_t from = 0);
   ~ByteSource();
   ByteSource(const ByteSource&) = delete;
   ByteSource& operator=(const ByteSource&) = delete;
@@ -38,7 +47,10 @@ public:
   /// As it is called in messages.
   const std::string& name() const { return name_; }
 
-  /// Bytes in the file, as it was when it was opened.
+  /// Where in the file it begins.
+  uint64_t from() const { return from_; }
+
+  /// Bytes in the file from there on, as it was when it was opened.
   uint64_t size() const { return size_; }
 
   /// Copies bytes; fewer than asked only at the end of the file. Throws Failure when the file cannot be read.
@@ -58,7 +70,7 @@ public:
 
   /// The storage underneath, for a handle of the library. Its cursor is shared: this object may be used again when
   /// the handle is done.
-  TAVSideStorage& storage() { return *file_; }
+  TAVSideStorage& storage() { return window_ ? *window_ : *file_; }
 
 private:
   struct Page
@@ -68,7 +80,8 @@ private:
     std::vector<uint8_t> bytes{};
   };
 
-  ByteSource(std::string name, std::string path, uint64_t ringBytes);
+  ByteSource(std::string name, std::string path, const SourceLimits& limits, uint64_t from);
+  void startAt();
   const Page& page(uint64_t number);
   Page& slotFor(uint64_t number);
   void fetch(uint64_t number, uint64_t count);
@@ -76,6 +89,8 @@ private:
   std::string name_;
   std::string temporary_{}; ///< to be removed at the end
   std::unique_ptr<TAVSSFile> file_{};
+  std::unique_ptr<TAVSideStorage> window_{}; ///< on the file, where it is not read from its first byte on
+  uint64_t from_;
   uint64_t size_ = 0;
   uint64_t bytesRead_ = 0;
   uint64_t readCalls_ = 0;

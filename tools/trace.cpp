@@ -60,10 +60,11 @@ TraceFile::TraceFile(const Invocation& invocation)
     }
     return;
   }
-  filter_.file = path == "-" ? stderr : kor::openStream(path, "wb");
+  uint32_t code = TAV_RC_OK;
+  filter_.file = path == "-" ? stderr : kor::openStream(path, "wb", code);
   if (filter_.file == nullptr)
   {
-    throw Failure("the trace file '" + path + "' cannot be written");
+    failAt(path, code);
   }
   korTraceStart(filteringSink, &filter_);
 }

@@ -44,7 +44,7 @@ bool isUtf8(std::string_view text);
 std::string hexText(std::span<const uint8_t> bytes);
 
 /// `2024-02-29T10:30:00.000000+01:00`, from the right calendar; "12345678901234567 s" when the year has more than four
-/// digits.
+/// digits. Fraction A counts milliseconds, fraction B microseconds, and both are added to the seconds.
 std::string dateText(const TAVTimeStamp& stamp);
 
 /// A 128-bit number in host order, in decimal.

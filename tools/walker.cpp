@@ -18,6 +18,20 @@ constexpr size_t kMaxCounts = 256; ///< different ids among siblings that are co
 
 } // namespace
 
+uint64_t missingPadding(const Event& ended, const Form& form)
+{
+  const Node& node = ended.node;
+  const bool pair = node.is64() && hasEyeSize(node.header) && !node.has(kNoPair);
+  const uint64_t end = ended.offset - (pair ? kEyeSizeLength : 0);
+  uint64_t size = node.size();
+  if (form.aligned || (node.info() & TAV_INFO_ALIGNED8) != 0)
+  {
+    roundUp8Checked(size);
+  }
+  const uint64_t padded = addSaturated(node.payloadOffset() + (node.has(kExtra) ? 2 : 0), size);
+  return padded - std::min(end, padded);
+}
+
 Walker::Walker(ByteSource& source, const Form& form, WalkStart start)
     : source_(source), form_(form), prober_(source, form, start.budget),
       position_(std::min(start.offset, source.size()))
@@ -66,6 +80,10 @@ bool Walker::skip()
   {
     return false;
   }
+  if (!endIsSure())
+  {
+    return false;
+  }
   canSkip_ = false;
   if (position_ < top.limit)
   {
@@ -75,6 +93,22 @@ bool Walker::skip()
     position_ = top.limit;
   }
   return true;
+}
+
+bool Walker::endIsSure()
+{
+  const Frame& top = frames_.back();
+  const Frame& around = frames_[frames_.size() - 2];
+  const bool room = top.limit - position_ >= kEyeSizeLength;
+  if (hasEyeSize(top.node.header) &&
+      !(room && prober_.pairEnds(top.limit - kEyeSizeLength, top.limit, top.node.header)))
+  {
+    return false;
+  }
+  TAVHeader behind{};
+  return top.limit == around.limit || frames_.size() == 2 ||
+         (prober_.header(top.limit, around.wide, around.limit, behind) &&
+          prober_.judgeHeader(behind, around.limit) != Belief::none);
 }
 
 void Walker::step()
@@ -95,6 +129,10 @@ void Walker::step()
   const bool fits = prober_.header(position_, top.wide, top.limit, header);
   const bool blank = !fits || (sizeOf(header) == 0 && typeOf(header) == 0 && elmOf(header) == 0);
   if (blank && top.open && top.limit == source_.size() && endByZeros())
+  {
+    return;
+  }
+  if (blank && passZeros())
   {
     return;
   }
@@ -179,30 +217,6 @@ bool Walker::isStrange(const TAVHeader& header)
     return true;
   }
   return !prober_.isFollowed(header, top.limit) && !prober_.isChain(header.nodeOffset, top.wide, top.limit);
-}
-
-std::string Walker::whyNot(const TAVHeader& header, uint64_t limit) const
-{
-  const uint64_t start = header.nodeOffset + headerLength(header.hdrType);
-  if (sizeOf(header) == 0 && typeOf(header) == 0)
-  {
-    return "zeros where a node should begin";
-  }
-  if (sizeOf(header) > limit - start && !isSizeUnknown(header))
-  {
-    const bool file = limit == source_.size();
-    return "no node: it would end " + counted(sizeOf(header) - (limit - start), "byte") + " past " +
-           (file ? "the end of the file" : "its parent");
-  }
-  if (isSizeUnknown(header))
-  {
-    return isGroup(header) ? "no node: a group without an end and without a child" : "no node: its size is all ones";
-  }
-  const std::string type = std::to_string(typeOf(header));
-  return "no node: " +
-         (typeInfo(typeOf(header)).known ? "a size of " + std::to_string(sizeOf(header)) + " does not suit type " + type
-                                         : "type " + type + " is unknown") +
-         ", and no node follows";
 }
 
 bool Walker::looksUnfinished(const Node& node, const Frame& parent)
@@ -411,45 +425,6 @@ void Walker::endGroup(End end)
   frames_.pop_back();
 }
 
-bool Walker::endByZeros()
-{
-  bool gaveUp = false;
-  if (!prober_.zerosToEnd(position_, gaveUp) && !gaveUp)
-  {
-    return false;
-  }
-  if (frames_.size() > 1)
-  {
-    endGroup(End::byFile);
-    return true;
-  }
-  queue(gaveUp ? What::unread : What::zeros, position_, source_.size() - position_).node = {};
-  position_ = source_.size();
-  return true;
-}
-
-void Walker::damage(uint64_t from, uint32_t code, std::string reason)
-{
-  Frame& top = frames_.back();
-  const Restart restart = prober_.findRestart(from, top.wide, frames_.size() == 1, top.limit);
-  uint64_t to = restart.offset;
-  if (!restart.gaveUp && to == top.limit && top.open && to == source_.size())
-  {
-    to = std::max(from + 1, prober_.zerosStart(from)); // zeros at the end belong to the file, not to the damage
-  }
-  Event& event = queue(What::damaged, from, to - from);
-  event.node = {};
-  event.code = code;
-  event.reason = std::move(reason);
-  if (restart.gaveUp)
-  {
-    event.what = What::unread;
-  }
-  position_ = to;
-  top.lastDamage = to;
-  afterDamage_ = true;
-}
-
 uint64_t Walker::countChild(uint16_t elm)
 {
   Frame& top = frames_.back();
@@ -468,17 +443,20 @@ uint64_t Walker::countChild(uint16_t elm)
   return 1;
 }
 
-std::string Walker::path(const Event& event) const
+std::string Walker::path(const Event& event, PathStyle style) const
 {
+  const uint64_t groups = std::min<uint64_t>(event.depth, frames_.size() - 1);
+  const uint64_t steps = groups + (event.node.header.hdrType != 0 ? 1 : 0);
+  const bool cut = style == PathStyle::brief && steps > kWholeSteps;
   std::string text;
-  const uint64_t depth = std::min<uint64_t>(event.depth, frames_.size() - 1);
-  for (uint64_t i = 1; i <= depth; ++i)
+  for (uint64_t i = 1; i <= steps; ++i)
   {
-    appendStep(text, frames_[static_cast<size_t>(i)].node);
-  }
-  if (event.node.header.hdrType != 0)
-  {
-    appendStep(text, event.node);
+    if (cut && i == kFirstSteps + 1)
+    {
+      text += "/\xE2\x80\xA6";
+      i = steps - kLastSteps + 1;
+    }
+    appendStep(text, i <= groups ? frames_[static_cast<size_t>(i)].node : event.node);
   }
   return text.empty() ? "/" : text;
 }

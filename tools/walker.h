@@ -25,7 +25,7 @@ enum class What : uint8_t
   pair,      ///< a data element's eye/size pair, which has no header of its own
   nodeEnd,   ///< no bytes; the node ends at `offset`
   damaged,   ///< cannot be explained; see `reason`
-  zeros,     ///< to the end of the file, behind the last node: a file may be longer than its stream
+  zeros,     ///< behind a root: to the end of the file, which may be longer than its stream, or to what stands there
   skipped,   ///< the children of a group that were not asked for
   unread     ///< to the end of the file; not looked at, because the budget was used up
 };
@@ -50,6 +50,20 @@ struct Event
   uint32_t code = TAV_RC_OK; ///< of damaged
   std::string reason{};      ///< of damaged
 };
+
+/// How a path is written. A text with a whole path for each node grows with the square of the depth.
+enum class PathStyle : uint8_t
+{
+  whole,
+  brief ///< of more than kWholeSteps steps the first and the last ones, with an ellipsis between them
+};
+
+inline constexpr uint64_t kWholeSteps = 24;
+inline constexpr uint64_t kFirstSteps = 4;
+inline constexpr uint64_t kLastSteps = 8;
+
+/// Bytes of padding that are not there between a data element's payload and its pair or end. `ended` is its nodeEnd.
+uint64_t missingPadding(const Event& ended, const Form& form);
 
 inline constexpr uint64_t kNoBudget = ~uint64_t{0};
 
@@ -76,12 +90,14 @@ public:
   bool next(Event& event);
 
   /// Directly after the nodeBegin of a group: hands out its children as one `skipped` piece. False, and no effect, for
-  /// a group whose end is not known without walking it.
+  /// a group whose end is not known without walking it: it was never closed, or what stands at its end, or behind it,
+  /// is not what should.
   bool skip();
 
   /// The path of the event's node, which must be the event returned last (or one of the same node before). Every
-  /// command takes it as input: steps are tags, or ids where a tag is not unique, and the how-manieth of its name.
-  std::string path(const Event& event) const;
+  /// command takes a whole one as input: steps are tags, or ids where a tag is not unique, and the place among the
+  /// siblings of that name.
+  std::string path(const Event& event, PathStyle style = PathStyle::whole) const;
 
   const Form& form() const { return form_; }
   /// UTF-8 strings so far with and without the two extra bytes, where the bytes around told.
@@ -106,10 +122,13 @@ private:
     bool open = false;       ///< an end element ends it
   };
 
+  bool endIsSure();
   void step();
   void endGroup(End end);
   void endByLimit();
   bool endByZeros();
+  bool passZeros();
+  bool rootBegins(uint64_t offset);
   void begin(TAVHeader& header);
   void beginGroup(Node& node);
   bool holdsNodes(TAVHeader group, uint64_t limit);

@@ -244,6 +244,19 @@ public:
   uint32_t unlock();
   /// The file's size in bytes.
   uint32_t getSize(uint64_t* pSize);
+  /// Cuts the file to a size, or fills it up with zeros. The position stays.
+  uint32_t setSize(uint64_t size);
+  /// Returns when all that was written is on the device.
+  uint32_t sync();
+  /// Gives this file the mode of another open one, and its owner and group as far as the process may; without the
+  /// owner the bits go that let a program run as him. Nothing on Windows, where rights come from the folder.
+  uint32_t copyRights(const KORHFile& from);
+  /// Whether a path (UTF-8) leads to this file: after waiting for a lock it may be another one's.
+  bool isAt(const char* pPath) const;
+  /// Renames a closed file to the path of this one, whose place it takes at once; this one is closed then, its lock
+  /// held for as long as the system lets it. Without an open file it is a plain renaming that replaces. After a
+  /// failure this file is as it was, but on Windows it is closed.
+  uint32_t replaceBy(const char* pFrom, const char* pPath);
 
 private:
   intptr_t native_; ///< descriptor or system handle; -1 when closed

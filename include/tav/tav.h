@@ -180,7 +180,8 @@ static_assert(sizeof(TAVHeaderData) == 56 && sizeof(TAVTimeStamp) == 16 && sizeo
 /// @{
 
 /// A byte store with a cursor, under a handle. Derive from it to keep streams elsewhere: a handle and a circular
-/// buffer use nothing but this interface. Used by one thread at a time.
+/// buffer use nothing but this interface. Used by one thread at a time. What it does for a handle must not call that
+/// handle's operations: they are not made to be entered twice.
 class TAV_API TAVSideStorage
 {
 public:
@@ -249,7 +250,8 @@ public:
 
 /// A file. A handle over it works through a circular buffer of pages of 1 MiB. Open with KOR_FILE_READ to read and
 /// with KOR_FILE_UPDATE to write: a handle reads pages back while it writes, and a writable storage gets every page
-/// that was held written back, also when the handle only reads.
+/// that was held written back, also when the handle only reads. Of an existing file that is longer than the stream, the
+/// old bytes stay behind it unless it is opened with KOR_FILE_TRUNCATE.
 class TAV_API TAVSSFile : public TAVSideStorage
 {
 public:
@@ -259,7 +261,7 @@ public:
 
   uint32_t seek(uint64_t offset, uint64_t hint) override;
   uint32_t getPosition(uint64_t* pPosition) override;
-  uint32_t getTotalSize(uint64_t* pSize) override;
+  uint32_t getTotalSize(uint64_t* pSize) override; ///< a pipe has none, and files that the system makes up have 0
   uint32_t read(uint64_t wanted, void** ppData, uint64_t bufSize, uint64_t* pRead, bool zeroCopy,
                 bool backward) override; ///< a backward read fills the end of the buffer
   uint32_t write(const void* pData, uint64_t size, uint64_t* pWritten) override;
@@ -274,7 +276,7 @@ public:
 
 /// A ring of pages that caches a contiguous range of a storage's bytes, so that a stream larger than memory can be
 /// written and read. Belongs to one handle. A data element larger than `ringSize` can be written, but neither read
-/// back nor updated through it.
+/// back nor updated through it, and validation and printing end there.
 class TAV_API TAVCircularBuf
 {
 public:
@@ -285,7 +287,11 @@ public:
   TAVCircularBuf& operator=(const TAVCircularBuf&) = delete;
 
   /// Writes `size` bytes at a stream offset. `direct`: bytes that are not cached go straight to the storage.
+  /// TAV_RC_BAD_PARAM for a small one whose page could not be brought in: see takeWriteFailure.
   uint32_t write(uint64_t offset, const void* data, uint64_t size, bool direct);
+  /// Why the last small write was refused: the code with which its page could not be brought in, for want of space for
+  /// the page that has to make room, say. 0 when there is nothing to tell; asking forgets it. Leaves no trace record.
+  uint32_t takeWriteFailure();
 
   /// Hands out up to `length` bytes that start (`backward`: end) at a stream offset. A chunk can be shorter than
   /// asked. Without `copy` the pointer leads into the ring and is valid until the next call.
@@ -354,6 +360,8 @@ private:
   bool indexOf(uint64_t offset, uint64_t& index) const;
   uint32_t offsetOf(uint64_t value, uint64_t& offset) const;
   uint64_t pageOf(uint64_t index) const;
+
+  uint32_t writeFailure_; ///< for takeWriteFailure
 };
 /// @}
 
@@ -396,7 +404,8 @@ public:
 
   uint32_t version;             ///< TAV_STRUCT_VERSION
   TAVSideStorage* pSideStorage; ///< not owned; must outlive the handle
-  uint64_t options;             ///< exactly one of TAV_OPT_READ, _WRITE, _UPDATE; TAV_OPT_ROOT32 beside it
+  uint64_t options;             ///< exactly one of TAV_OPT_READ, _WRITE, _UPDATE; TAV_OPT_ROOT32 beside it. Never
+                                ///< TAV_OPT_DIRECT: over a ring it is believed, and every call finds no block
   uint64_t circularBufSize;     ///< bytes of the ring over a storage without direct memory; 10 MiB
   uint64_t auxSize;             ///< carried, not used
   uint8_t byteOrder;            ///< TAV_BYTE_ORDER_SWAPPED: the stream is in the other byte order
@@ -415,7 +424,9 @@ public:
   uint64_t options; ///< not used
 };
 
-/// One stream bound to one storage. Made by tavInitHandle; used by one thread at a time.
+/// One stream bound to one storage. Made by tavInitHandle; used by one thread at a time, and after a fork by one of the
+/// two processes: over a file they share its position, but not the ring. A copy of the record is no handle: what
+/// reading has found out lies behind it.
 struct TAVHandle
 {
   uint64_t initVersion;
@@ -471,12 +482,15 @@ TAV_API uint32_t tavGetSideStorage(TAVHandle* handle, TAVSideStorage** outStorag
 /// @param options     must be 0
 /// @param handle      opened for writing or updating
 /// @param headerData  header and payload; `nodeOffset` receives the node's offset, and under alignment `info`
-///                    of a 64-bit header receives TAV_INFO_ALIGNED8. A group needs no payload. The payload may be
-///                    anywhere, in the descriptor or the handle, too; the descriptor must not lie in the block.
+///                    of a 64-bit header receives TAV_INFO_ALIGNED8, which stays: clear it before the descriptor
+///                    goes to a handle without alignment, or readers skip padding that is not there. A group needs
+///                    no payload. The payload may be anywhere, in the descriptor or the handle, too; the descriptor
+///                    must not lie in the block.
 /// @retval TAV_RC_BAD_PARAM       null argument, null payload of a data element, unknown hdrType
 /// @retval TAV_RC_WRONG_MODE      the handle is for reading
 /// @retval TAV_RC_BAD_OPTIONS     options not 0
-/// @retval TAV_RC_BAD_CHILD_HDR   the open group takes the other header form, or a root is not a group
+/// @retval TAV_RC_BAD_CHILD_HDR   the open group takes the other header form (one with a 32-bit header takes no 64-bit
+///                                child, whatever its type), or a root is not a group
 /// @retval TAV_RC_BAD_PAYLOAD     `dataBufSize` is smaller than the header's size
 /// @retval TAV_RC_END_OF_STORAGE  the block is full
 /// @retval TAV_RC_NO_MEMORY       more than 4,000 open groups: the group's header is written, but it is not open
@@ -490,7 +504,8 @@ TAV_API uint32_t tavAddElement(uint64_t options, TAVHandle* handle, TAVHeaderDat
 /// that many bytes are taken from `pDataBuf`, so 2 bytes more than the text must be readable there; they follow the
 /// node in the stream without being counted, and a walk seeks the next node 2 bytes early. To write UTF-8 that walks
 /// well, give tavAddElement a payload that begins with the code page.
-/// `nodeOffset` is not set. Codes as tavAddElement; neither mode nor options are checked.
+/// `nodeOffset` is not set. Codes as tavAddElement, and TAV_RC_BAD_PARAM for a size to which 2 cannot be added; neither
+/// mode nor options are checked. A failure leaves the caller's `size` as it was.
 TAV_API uint32_t tavAddString(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData, uint16_t codePage);
 
 /// Appends nodes that are encoded already, byte for byte, under the open group.
@@ -510,7 +525,10 @@ TAV_API uint32_t tavWriteNodeInt(uint64_t options, TAVHandle* handle, TAVHeader*
 /// @param options  0 to close; 1 to abandon the group: the write offset goes back to its first byte
 /// @retval TAV_RC_NOT_FOUND    no group is open
 /// @retval TAV_RC_WRONG_MODE, TAV_RC_BAD_OPTIONS, TAV_RC_BAD_PARAM  misuse
-/// A failure leaves the group open; its size may be written already.
+/// Codes of the storage come up unchanged, but for one: a 64-bit group that was opened with TAV_SIZE_UNKNOWN and whose
+/// size cannot be written stays of unknown size and gets its end element, whose code is the result.
+/// A failure leaves the group open; its size may be written already. The same call gives the stream that would have
+/// been when the cause is gone.
 TAV_API uint32_t tavCloseHeader(uint64_t options, TAVHandle* handle);
 
 /// Overwrites the payload of a data element in place. Size, type and element id must be those in the stream.
@@ -544,6 +562,7 @@ TAV_API uint32_t tavReadNodeInt(uint64_t options, TAVHandle* handle, uint64_t of
 /// @param[out] eyeSize      the word behind it, in host order; 0 after a failure
 /// @param[out] swapped      whether the pair is in the other byte order
 /// @retval TAV_RC_NOT_FOUND  none there. A byte that breaks a match is not tried again as the first of another.
+/// Cost: the bytes up to the eye catcher, once.
 TAV_API uint32_t tavFindEyeSizeComboInt(TAVHandle* handle, uint64_t start, uint64_t length, bool unused,
                                         uint64_t* foundOffset, uint64_t* eyeSize, bool* swapped);
 
@@ -554,6 +573,7 @@ TAV_API uint32_t tavFindEyeSizeComboInt(TAVHandle* handle, uint64_t start, uint6
 /// @param length   bytes to scan; 0: to the end
 /// @retval TAV_RC_NOT_FOUND  no eye catcher, or no node that fits one
 /// @retval TAV_RC_BAD_PARAM, TAV_RC_BAD_OPTIONS, TAV_RC_WRONG_MODE  misuse
+/// Cost: the bytes up to the node's pair, and a header for each pair before that does not fit.
 TAV_API uint32_t tavFindNodeFromIndex(uint64_t options, TAVHandle* handle, uint64_t index, uint64_t length,
                                       TAVHeaderData* out);
 
@@ -563,21 +583,27 @@ TAV_API uint32_t tavFindNodeFromIndex(uint64_t options, TAVHandle* handle, uint6
 /// @param handle    opened with TAV_OPT_READ
 /// @param parent    group to walk; null: the node at offset 0
 /// @param refChild  child returned last; null: the first child
-/// @param[out] out  the child; `refChild` may be its own header, so that a walk needs one descriptor
+/// @param[out] out  the child; `refChild` or `parent` may be its own header, so that a walk needs one descriptor
 /// @retval TAV_RC_NO_MORE_CHILDREN  the level has ended (not a failure)
+/// @retval TAV_RC_NO_MEMORY         the end of a block, in a group that was never closed; over a storage its own code,
+///                                  TAV_RC_END_OF_STORAGE
 /// @retval TAV_RC_OUTSIDE_PARENT    the next child would start past its parent's end: damaged stream
 /// @retval TAV_RC_NOT_SUPPORTED     `refChild` is a data element of unknown size
 /// @retval TAV_RC_BAD_PARAM, TAV_RC_BAD_OPTIONS, TAV_RC_WRONG_MODE  misuse
 /// Codes of tavReadNodeInt come up unchanged. A failure leaves `parent` and `refChild` untouched.
-/// Cost: one header fetch; an open `refChild` is ended by a scan for its eye catcher.
+/// Cost: one header fetch; an open `refChild` is ended by a scan for its eye catcher. The handle remembers what scans
+/// have shown until a walk begins anew with `parent` null, so that over a whole walk each byte is scanned once: of a
+/// stream whose bytes change meanwhile, a pair that comes to stand before a known one is not seen until then.
 TAV_API uint32_t tavGetNextChild(uint64_t options, TAVHandle* handle, TAVHeader* parent, TAVHeader* refChild,
                                  TAVHeaderData* out);
 
 /// Steps back to the node whose eye/size pair ends where `ref` starts. Only nodes written with TAV_INFO_EYE_SIZE
 /// can be reached, and not those whose pair does not count all that lies before it (padding, the extra bytes of
-/// tavAddString, the header of a 64-bit group of type 1).
+/// tavAddString, the header of a 64-bit group of type 1). `out` may be `ref`. A failure leaves the header of `ref`
+/// untouched.
 /// @retval TAV_RC_NOT_FOUND  no eye catcher in the handle's byte order stands there
 /// @retval TAV_RC_NO_MEMORY  the pair or the node would lie outside the stream
+/// Cost: two header fetches.
 TAV_API uint32_t tavGetPrevNode(uint64_t options, TAVHandle* handle, TAVHeaderData* ref, TAVHeaderData* out);
 /// @}
 
@@ -594,6 +620,9 @@ TAV_API uint32_t tavGetPrevNode(uint64_t options, TAVHandle* handle, TAVHeaderDa
 /// @retval TAV_RC_OK         found, or, with maxDepth above the current level, a group that does not match was
 ///                           entered: then `out` is untouched and the group is on top of `stack`
 /// @retval TAV_RC_NOT_FOUND  no match, or the walk failed; the search never climbs out of a group it entered
+/// A failure leaves `parent`, `resume` and `out` untouched, and on `stack` what was pushed before it. `parent` or
+/// `resume` may be the header of `out`.
+/// Cost: a step of tavGetNextChild for each node of the level up to the match.
 TAV_API uint32_t tavFindElmInt(TAVHandle* handle, TAVHeader* parent, uint32_t minDepth, uint32_t maxDepth,
                                uint16_t infoKey, uint32_t elm, TAVHeader* resume, TAVHdrStack* stack,
                                TAVHeaderData* out);
@@ -606,8 +635,10 @@ TAV_API uint32_t tavFindElmInt(TAVHandle* handle, TAVHeader* parent, uint32_t mi
 /// always ends.
 /// @retval TAV_RC_NOT_FOUND      the path is empty
 /// @retval TAV_RC_NO_MEMORY      the first entry matches, the whole path does not
-/// @retval TAV_RC_OUTSIDE_PARENT damage leads to groups that were searched before
+/// @retval TAV_RC_OUTSIDE_PARENT damage leads to groups that were searched before, or gives many the same children
 /// @retval TAV_RC_NOT_SUPPORTED  the second list is set, even if the path was found
+/// A failure leaves `parent` and `out` untouched; `parent` may be the header of `out`.
+/// Cost: the levels searched; in all no more than 16 times the stream and twice for each entry of the path, or 1 MiB.
 TAV_API uint32_t tavFindLogicalGroup(uint64_t options, TAVHandle* handle, TAVHeader* parent,
                                      TAVFindLogicalGroupParam* param, TAVHeaderData* out);
 
@@ -615,11 +646,13 @@ TAV_API uint32_t tavFindLogicalGroup(uint64_t options, TAVHandle* handle, TAVHea
 /// @param options  bit 0 (containment) is refused here: see tavValidateSubtreeInt
 /// @retval TAV_RC_BAD_PARAM  null argument, or bit 0 set
 /// Codes of tavGetNextChild come up unchanged. 4,000 nested groups at the most: deeper gives TAV_RC_NO_MEMORY.
+/// Cost: each header once, and each byte of open groups once more.
 TAV_API uint32_t tavValidateHierarchy(uint64_t options, TAVHandle* handle, TAVHeader* header);
 
 /// The walk of tavValidateHierarchy. With bit 0 of `options` every child must lie inside its parent, else
 /// TAV_RC_OUTSIDE_PARENT; that check takes the parent's end without the length of its header, so it refuses some
-/// sound streams: an empty last child, the last child of a 64-bit group of type 1.
+/// sound streams: an empty last child, the last child of a 64-bit group of type 1, and every group that was never
+/// closed unless it stands at offset 0.
 TAV_API uint32_t tavValidateSubtreeInt(uint64_t options, TAVHandle* handle, TAVHeader* header);
 /// @}
 
@@ -636,6 +669,9 @@ TAV_API uint32_t tavValidateSubtreeInt(uint64_t options, TAVHandle* handle, TAVH
 /// @retval TAV_RC_NOT_SUPPORTED   a UTF-8 string, a Sint128 or an unknown type
 /// @retval TAV_RC_OUTSIDE_PARENT  a value's size does not fit its type
 /// Codes of the walk come up unchanged; what was printed before stays printed. XML is not escaped.
+/// What a stream refuses does not count. A line-buffered stream gets every piece by itself, which is slower.
+/// Cost: that of validation, and of the output: each line is indented by three characters a level, so that nested
+/// groups make text that grows with the square of their number: 3,999 of them, 64 KB, 72 MB.
 TAV_API uint32_t tavPrintSubtree(uint64_t options, TAVHandle* handle, TAVHeaderData* start, TAVPrintParam* param,
                                  uint64_t* bytesPrinted);
 

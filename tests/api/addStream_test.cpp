@@ -93,6 +93,8 @@ void PrintTo(const Kind& row, std::ostream* out)
 constexpr Kind kKinds[] = {
     {"Kind1Under32", 1, 1, 1, TAV_RC_OK, 0},
     {"Kind2Under32", 1, 1, 2, TAV_RC_BAD_CHILD_HDR, 60},
+    {"Kind1Under32OfType2", 1, 2, 1, TAV_RC_BAD_CHILD_HDR, 60},
+    {"Kind2Under32OfType2", 1, 2, 2, TAV_RC_BAD_CHILD_HDR, 60},
     {"Kind1Under64OfType1", 2, 1, 1, TAV_RC_OK, 0},
     {"Kind2Under64OfType1", 2, 1, 2, TAV_RC_BAD_CHILD_HDR, 60},
     {"Kind1Under64OfType2", 2, 2, 1, TAV_RC_BAD_CHILD_HDR, 60},
@@ -116,6 +118,10 @@ TEST_P(StreamKind, IsTheOneOfTheOpenGroup)
   if (row.parentHdr != 0)
   {
     writer.add(row.parentHdr == TAV_HDR_64 ? group64(kRoot, row.parentType) : group32(kRoot));
+    if (row.parentHdr == TAV_HDR_32 && row.parentType != TAV_TYPE_HEADER32)
+    {
+      writer.add({header32(0, row.parentType, kRoot), {}}); // such a group cannot be a root
+    }
   }
   const uint64_t before = writer.length();
   Bytes bytes{1, 2, 3};

@@ -188,13 +188,27 @@ TEST(CloseHeaderOfAGroupOfKnownSize, GetsNoElementWhenTheSizeCannotBeWritten)
   EXPECT_EQ(stream.handle()->pHdrStack->count, 1U);
 }
 
-TEST(CloseHeaderOfAGroupWithAPair, HasTheElementsCodeWhenTheSizeCannotBeWritten)
+TEST(CloseHeaderOfAGroupWithAPair, HasTheElementsCodeWhenAnUnknownSizeCannotBeWritten)
 {
-  OneWayStream stream(TAV_INFO_EYE_SIZE, 0);
+  OneWayStream stream(TAV_INFO_EYE_SIZE, TAV_SIZE_UNKNOWN);
   const uint64_t before = stream.handle()->streamBytes;
   EXPECT_EQ(tavCloseHeader(0, stream.handle()), TAV_RC_OK);
   EXPECT_EQ(stream.handle()->streamBytes, before + 32);
   EXPECT_EQ(stream.handle()->pHdrStack->count, 0U);
+}
+
+TEST(CloseHeaderOfAGroupWithAPair, GetsNoElementWhenAKnownSizeCannotBeWritten)
+{
+  OneWayStream stream(TAV_INFO_EYE_SIZE, 0);
+  const uint64_t before = stream.handle()->streamBytes;
+  TraceLog trace;
+  const uint32_t rc = tavCloseHeader(0, stream.handle());
+  EXPECT_NE(rc, TAV_RC_OK);
+  EXPECT_THAT(trace.failuresOf(probe::closeHeader), ElementsAre(Failure{probe::closeHeader, 50, rc}));
+  EXPECT_EQ(trace.recordsOf(probe::closeHeader).back().code, rc);
+  EXPECT_THAT(trace.recordsOf(probe::addElement), ::testing::IsEmpty());
+  EXPECT_EQ(stream.handle()->streamBytes, before);
+  EXPECT_EQ(stream.handle()->pHdrStack->count, 1U);
 }
 
 } // namespace

@@ -360,7 +360,8 @@ TEST(CloseHeaderTrace, ShowsArgumentsAndTheWriteOffset)
   EXPECT_THAT(trace.stepsOf(probe::closeHeader),
               ElementsAre(Step{KOR_TRACE_ENTRY, probe::closeHeader, 0}, Step{KOR_TRACE_VAR, probe::closeHeader, 0},
                           Step{KOR_TRACE_VAR, probe::closeHeader, 100}, Step{KOR_TRACE_EXIT, probe::closeHeader, 0}));
-  EXPECT_EQ(trace.stepsOf(probe::hdrStackPop).size(), 2U);
+  EXPECT_THAT(trace.dump(probe::hdrStackPop, 0).items, ElementsAre(bytesOf(uint32_t{1})));
+  EXPECT_THAT(trace.dump(probe::hdrStackPop, 100).items, ElementsAre(bytesOf(uint32_t{0})));
 }
 
 TEST(CloseHeaderTrace, WritesTheSizeBeforeTheEndElementAndPopsLast)

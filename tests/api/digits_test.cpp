@@ -16,6 +16,7 @@ namespace
 {
 
 using namespace tav;
+using namespace tav::inside;
 
 /// What a writer wrote; nothing outside its room may be touched.
 template<class Write>

@@ -19,7 +19,7 @@ TEST(FetchBytes, CompletesACopyFromAsManyChunksAsItTakes)
   SmallRing small(100);
   small.storage.longestTransfer = 3;
   std::vector<uint8_t> to(30);
-  ASSERT_EQ(tav::fetchBytes(small.ring, 7, to.data(), to.size()), TAV_RC_OK);
+  ASSERT_EQ(tav::inside::fetchBytes(small.ring, 7, to.data(), to.size()), TAV_RC_OK);
   EXPECT_EQ(to, pattern(7, 30)) << "more than the ring holds";
 }
 
@@ -27,7 +27,7 @@ TEST(FetchBytes, EndsWhereTheStorageEnds)
 {
   SmallRing small(10);
   std::vector<uint8_t> to(8);
-  EXPECT_EQ(tav::fetchBytes(small.ring, 5, to.data(), to.size()), TAV_RC_END_OF_STORAGE);
+  EXPECT_EQ(tav::inside::fetchBytes(small.ring, 5, to.data(), to.size()), TAV_RC_END_OF_STORAGE);
 }
 
 TEST(FetchBytes, EndsWhereOffsetsEnd)
@@ -36,13 +36,13 @@ TEST(FetchBytes, EndsWhereOffsetsEnd)
   SmallRing small(0, 3, VectorStorage::kReadOnly);
   small.cache(0, last - 7, 8);
   std::vector<uint8_t> to(16);
-  EXPECT_EQ(tav::fetchBytes(small.ring, last - 7, to.data(), to.size()), TAV_RC_END_OF_STORAGE);
+  EXPECT_EQ(tav::inside::fetchBytes(small.ring, last - 7, to.data(), to.size()), TAV_RC_END_OF_STORAGE);
 }
 
 TEST(FetchBytes, OfNoBytesAsksForNothing)
 {
   SmallRing small(10);
-  EXPECT_EQ(tav::fetchBytes(small.ring, 5, nullptr, 0), TAV_RC_OK);
+  EXPECT_EQ(tav::inside::fetchBytes(small.ring, 5, nullptr, 0), TAV_RC_OK);
   EXPECT_THAT(small.storage.takeLog(), IsEmpty());
 }
 
@@ -50,7 +50,7 @@ TEST(FetchData, OfNoBytesIsAPointerToNothing)
 {
   SmallRing small(10);
   TAVCBUserArea area{};
-  EXPECT_EQ(tav::fetchData(small.ring, 10, 0, area), TAV_RC_OK);
+  EXPECT_EQ(tav::inside::fetchData(small.ring, 10, 0, area), TAV_RC_OK);
   EXPECT_NE(area.pChunk, nullptr);
   EXPECT_EQ(area.chunkLength, 0U);
   EXPECT_THAT(small.storage.takeLog(), IsEmpty());
@@ -61,7 +61,7 @@ TEST(FetchData, BringsAnElementThatIsCutIntoTheRingWhole)
   SmallRing small(100, 3, VectorStorage::kReadOnly);
   small.cache(16, 40, 24);
   TAVCBUserArea area{};
-  ASSERT_EQ(tav::fetchData(small.ring, 44, 24, area), TAV_RC_OK);
+  ASSERT_EQ(tav::inside::fetchData(small.ring, 44, 24, area), TAV_RC_OK);
   EXPECT_EQ(std::vector<uint8_t>(area.pChunk, area.pChunk + area.chunkLength), pattern(44, 24));
   EXPECT_EQ(small.ring.headOffset, 44U);
 }
@@ -71,7 +71,7 @@ TEST(FetchData, LeavesAnElementThatIsWholeWhereItIs)
   SmallRing small(100);
   small.cache(16, 40, 24);
   TAVCBUserArea area{};
-  ASSERT_EQ(tav::fetchData(small.ring, 44, 4, area), TAV_RC_OK);
+  ASSERT_EQ(tav::inside::fetchData(small.ring, 44, 4, area), TAV_RC_OK);
   EXPECT_EQ(area.pChunk, small.ring.pRing + 20);
   EXPECT_THAT(small.storage.takeLog(), IsEmpty());
 }
@@ -81,7 +81,7 @@ TEST(FetchData, LargerThanTheRingIsNotBroughtInAnew)
   SmallRing small(100);
   small.cache(16, 40, 24);
   TAVCBUserArea area{};
-  ASSERT_EQ(tav::fetchData(small.ring, 44, 25, area), TAV_RC_OK);
+  ASSERT_EQ(tav::inside::fetchData(small.ring, 44, 25, area), TAV_RC_OK);
   EXPECT_EQ(area.chunkLength, 4U) << "the part at hand";
   EXPECT_EQ(small.ring.headOffset, 40U);
   EXPECT_THAT(small.storage.takeLog(), IsEmpty());
@@ -96,7 +96,7 @@ TEST(FetchData, ReadsOnWhereTheStorageDeliversPieces)
       SmallRing small(100, pages);
       small.storage.longestTransfer = piece;
       TAVCBUserArea area{};
-      ASSERT_EQ(tav::fetchData(small.ring, 13, pages * 8, area), TAV_RC_OK);
+      ASSERT_EQ(tav::inside::fetchData(small.ring, 13, pages * 8, area), TAV_RC_OK);
       EXPECT_EQ(std::vector<uint8_t>(area.pChunk, area.pChunk + area.chunkLength), pattern(13, pages * 8))
           << pages << " pages in pieces of " << piece;
     }
@@ -108,7 +108,7 @@ TEST(FetchData, OfMorePagesThanARepositionTakesComesWhole)
   SmallRing small(5000, 600, VectorStorage::kReadOnly);
   TAVCBUserArea area{};
   ASSERT_EQ(small.chunk(0, 1), TAV_RC_OK);
-  ASSERT_EQ(tav::fetchData(small.ring, 1, 4800, area), TAV_RC_OK);
+  ASSERT_EQ(tav::inside::fetchData(small.ring, 1, 4800, area), TAV_RC_OK);
   EXPECT_EQ(std::vector<uint8_t>(area.pChunk, area.pChunk + area.chunkLength), pattern(1, 4800));
 }
 
@@ -116,7 +116,7 @@ TEST(FetchData, BehindTheEndComesShort)
 {
   SmallRing small(20);
   TAVCBUserArea area{};
-  ASSERT_EQ(tav::fetchData(small.ring, 15, 9, area), TAV_RC_OK);
+  ASSERT_EQ(tav::inside::fetchData(small.ring, 15, 9, area), TAV_RC_OK);
   EXPECT_EQ(std::vector<uint8_t>(area.pChunk, area.pChunk + area.chunkLength), pattern(15, 5));
 }
 
@@ -126,7 +126,7 @@ TEST(FetchData, KeepsACodeMetWhileReadingOn)
   small.storage.longestTransfer = 2;
   TAVCBUserArea area{};
   small.storage.failAt(4, KOR_RC_IO_ERROR);
-  EXPECT_EQ(tav::fetchData(small.ring, 0, 24, area), KOR_RC_IO_ERROR);
+  EXPECT_EQ(tav::inside::fetchData(small.ring, 0, 24, area), KOR_RC_IO_ERROR);
 }
 
 TEST(RawWrite, OfNoBytesSucceedsWithoutTheRing)
@@ -135,7 +135,7 @@ TEST(RawWrite, OfNoBytesSucceedsWithoutTheRing)
   const uint64_t calls = writer.vectorStorage().calls();
   uint64_t position = 5;
   TraceLog trace;
-  EXPECT_EQ(tav::rawWrite(*writer.handle(), position, nullptr, 0), TAV_RC_OK);
+  EXPECT_EQ(tav::inside::rawWrite(*writer.handle(), position, nullptr, 0), TAV_RC_OK);
   EXPECT_EQ(position, 5U);
   EXPECT_EQ(writer.vectorStorage().calls(), calls);
   EXPECT_THAT(trace.recordsOf(tav::probe::cbWrite), IsEmpty());

@@ -72,10 +72,13 @@ TEST(InitParamTrace, ShowsItsLife)
   {
     const TAVInitParam param;
     param.getVersion();
+    EXPECT_THAT(trace.dump(0x88A0001, 100).items, ElementsAre(bytesOf(param)));
   }
-  EXPECT_THAT(trace.steps(), ElementsAre(Step{KOR_TRACE_ENTRY, 0x88A0001, 0}, Step{KOR_TRACE_EXIT, 0x88A0001, 0},
-                                         Step{KOR_TRACE_ENTRY, 0x88A0003, 0}, Step{KOR_TRACE_EXIT, 0x88A0003, 0},
+  EXPECT_THAT(trace.steps(), ElementsAre(Step{KOR_TRACE_ENTRY, 0x88A0001, 0}, Step{KOR_TRACE_VAR, 0x88A0001, 100},
+                                         Step{KOR_TRACE_EXIT, 0x88A0001, 0}, Step{KOR_TRACE_ENTRY, 0x88A0003, 0},
+                                         Step{KOR_TRACE_VAR, 0x88A0003, 100}, Step{KOR_TRACE_EXIT, 0x88A0003, 0},
                                          Step{KOR_TRACE_ENTRY, 0x88A0002, 0}, Step{KOR_TRACE_EXIT, 0x88A0002, 0}));
+  EXPECT_THAT(trace.dump(0x88A0003, 100).items, ElementsAre(bytesOf(TAV_STRUCT_VERSION)));
   for (const Record& record : trace.records())
   {
     EXPECT_EQ(record.code, 0U);
@@ -88,7 +91,8 @@ TEST(InitParamTrace, ShowsStorageAndOptions)
   TraceLog trace;
   const TAVInitParam param(&storage, 0x11);
   EXPECT_THAT(trace.steps(), ElementsAre(Step{KOR_TRACE_ENTRY, 0x88A0001, 0}, Step{KOR_TRACE_VAR, 0x88A0001, 0},
-                                         Step{KOR_TRACE_EXIT, 0x88A0001, 0}));
+                                         Step{KOR_TRACE_VAR, 0x88A0001, 100}, Step{KOR_TRACE_EXIT, 0x88A0001, 0}));
+  EXPECT_THAT(trace.dump(0x88A0001, 100).items, ElementsAre(bytesOf(param)));
   EXPECT_THAT(trace.dump(0x88A0001, 0).items,
               ElementsAre("Side storage object and options", baseOf(storage), bytesOf(uint64_t{0x11})));
 }
@@ -100,7 +104,8 @@ TEST(InitParamTrace, ShowsEveryField)
   const TAVInitParam param(&storage, 2, 0x30, 0x40, 3, 1);
   EXPECT_THAT(trace.steps(), ElementsAre(Step{KOR_TRACE_ENTRY, 0x88A0001, 0}, Step{KOR_TRACE_VAR, 0x88A0001, 0},
                                          Step{KOR_TRACE_VAR, 0x88A0001, 1}, Step{KOR_TRACE_VAR, 0x88A0001, 2},
-                                         Step{KOR_TRACE_EXIT, 0x88A0001, 0}));
+                                         Step{KOR_TRACE_VAR, 0x88A0001, 100}, Step{KOR_TRACE_EXIT, 0x88A0001, 0}));
+  EXPECT_THAT(trace.dump(0x88A0001, 100).items, ElementsAre(bytesOf(param)));
   EXPECT_THAT(trace.dump(0x88A0001, 0).items,
               ElementsAre(bytesOf(uint64_t{2}), bytesOf(uint64_t{0x30}), bytesOf(uint64_t{0x40})));
   EXPECT_THAT(trace.dump(0x88A0001, 1).items,
@@ -134,9 +139,12 @@ TEST(ResetParam, TracesItsLife)
   {
     const TAVResetParam param;
     param.getVersion();
+    EXPECT_THAT(trace.dump(0x88A0004, 100).items, ElementsAre(bytesOf(param)));
   }
-  EXPECT_THAT(trace.steps(), ElementsAre(Step{KOR_TRACE_ENTRY, 0x88A0004, 0}, Step{KOR_TRACE_EXIT, 0x88A0004, 0},
-                                         Step{KOR_TRACE_ENTRY, 0x88A0006, 0}, Step{KOR_TRACE_EXIT, 0x88A0006, 0},
+  EXPECT_THAT(trace.dump(0x88A0006, 100).items, ElementsAre(bytesOf(TAV_STRUCT_VERSION)));
+  EXPECT_THAT(trace.steps(), ElementsAre(Step{KOR_TRACE_ENTRY, 0x88A0004, 0}, Step{KOR_TRACE_VAR, 0x88A0004, 100},
+                                         Step{KOR_TRACE_EXIT, 0x88A0004, 0}, Step{KOR_TRACE_ENTRY, 0x88A0006, 0},
+                                         Step{KOR_TRACE_VAR, 0x88A0006, 100}, Step{KOR_TRACE_EXIT, 0x88A0006, 0},
                                          Step{KOR_TRACE_ENTRY, 0x88A0005, 0}, Step{KOR_TRACE_EXIT, 0x88A0005, 0}));
 }
 

@@ -17,6 +17,7 @@ namespace
 {
 
 using namespace tav;
+using namespace tav::inside;
 using namespace test;
 
 using ::testing::ElementsAre;

@@ -102,6 +102,9 @@ Bytes mixedTree()
   writer.add(element(true, TAV_TYPE_BINARY, 60104, {1, 2, 0xAB}));
   writer.add(element(true, TAV_TYPE_UINT64_ARRAY, 60104, Bytes(24, 7)));
   writer.add(element(true, TAV_TYPE_UTC_TIMESTAMP, 60105, Bytes(16, 3)));
+  writer.add(element(true, TAV_TYPE_SINT8, 60104, {0}));
+  writer.add(element(true, TAV_TYPE_SINT8, 60104, {'\n'}));
+  writer.add(ascii(60103, "two\nlines"));
   writer.add(group64(60109));
   writer.add(group64(60109));
   writer.add(element(true, TAV_TYPE_BYTE, 64999, {0}));
@@ -135,7 +138,10 @@ TEST(OutputOfAWalk, IsThatOfItsPieces)
     for (const uint64_t options : kOptions)
     {
       const Printed pieces = printPieces(bytes, {}, options & ~uint64_t{8}, 0, 0, _IOFBF);
-      ASSERT_EQ(printRefused(bytes, {}, options & ~uint64_t{8}, 0, 0, _IOFBF), pieces) << options;
+      for (const int buffering : {_IOFBF, _IOLBF, _IONBF})
+      {
+        ASSERT_EQ(printRefused(bytes, {}, options & ~uint64_t{8}, 0, 0, buffering), pieces) << options;
+      }
       ASSERT_EQ(pieces.count, pieces.text.size());
     }
   }
@@ -176,26 +182,77 @@ TEST_P(RefusedOutput, OfABufferedStreamIsThatOfItsPieces)
   }
 }
 
+TEST_P(RefusedOutput, OfALineBufferedStreamIsThatOfItsPiecesWhereverItRefuses)
+{
+  const Bytes bytes = mixedTree();
+  for (const uint64_t options : kOptions)
+  {
+    const uint64_t length = printRefused(bytes, {}, options, 0, 0, _IOFBF).text.size();
+    for (uint64_t from = 0; from < length; from += from < 300 ? 1 : 97)
+    {
+      ASSERT_EQ(printRefused(bytes, {}, options & ~uint64_t{8}, from, GetParam(), _IOLBF),
+                printPieces(bytes, {}, options & ~uint64_t{8}, from, GetParam(), _IOLBF))
+          << "options " << options << ", refused from " << from;
+    }
+  }
+}
+
 INSTANTIATE_TEST_SUITE_P(Refusing, RefusedOutput, ::testing::Values(1, 2, 3, 10, kForEver));
+
+/// Code and count of printing to a device that takes nothing.
+std::pair<uint32_t, uint64_t> printToFullDevice(uint64_t options, int buffering, bool traced)
+{
+  StreamReader reader(longTree(), {});
+  FILE* const full = std::fopen("/dev/full", "w");
+  std::setvbuf(full, nullptr, buffering, BUFSIZ);
+  TAVPrintParam param{0, nullptr, 0, full};
+  uint64_t count = 0xBAD;
+  if (traced)
+  {
+    korTraceStart([](void*, const KORTraceRecord*) {}, nullptr);
+  }
+  const uint32_t rc = tavPrintSubtree(options, reader.handle(), nullptr, &param, &count);
+  korTraceStop();
+  std::fclose(full);
+  return {rc, count};
+}
 
 TEST(OutputToAFullDevice, IsThatOfItsPieces)
 {
-  const auto print = [](bool traced) {
-    StreamReader reader(longTree(), {});
-    FILE* const full = std::fopen("/dev/full", "w");
-    TAVPrintParam param{0, nullptr, 0, full};
-    uint64_t count = 0xBAD;
-    if (traced)
+  for (const int buffering : {_IOFBF, _IOLBF, _IONBF})
+  {
+    for (const uint64_t options : kOptions)
     {
-      korTraceStart([](void*, const KORTraceRecord*) {}, nullptr);
+      EXPECT_EQ(printToFullDevice(options & ~uint64_t{8}, buffering, false),
+                printToFullDevice(options & ~uint64_t{8}, buffering, true))
+          << "buffering " << buffering << ", options " << options;
     }
-    const uint32_t rc = tavPrintSubtree(0x45, reader.handle(), nullptr, &param, &count);
-    korTraceStop();
-    std::fclose(full);
-    return std::pair(rc, count);
-  };
-  EXPECT_EQ(print(false), print(true));
-  EXPECT_GT(print(true).second, 0U);
+  }
+  EXPECT_GT(printToFullDevice(0x45, _IOFBF, true).second, 0U);
+}
+
+TEST(OutputToAFullDevice, OfXmlIsRefusedWithTheFirstTagThatEndsALine)
+{
+  for (const bool traced : {false, true})
+  {
+    EXPECT_EQ(printToFullDevice(0x45, _IONBF, traced), std::pair(TAV_RC_NO_MEMORY, uint64_t{0}));
+    EXPECT_EQ(printToFullDevice(0x45, _IOLBF, traced).first, TAV_RC_NO_MEMORY);
+  }
+}
+
+TEST(OutputToALineBufferedStream, CountsNoLineThatIsRefused)
+{
+  StreamWriter writer;
+  writer.add(group64(20));
+  writer.add(u32(60110, 7));
+  writer.close();
+  for (const bool traced : {false, true})
+  {
+    const Printed lines = (traced ? printPieces : printRefused)(writer.bytes(), {}, 0x45, 0, kForEver, _IOLBF);
+    EXPECT_EQ(lines.rc, TAV_RC_NO_MEMORY);
+    EXPECT_EQ(lines.text, "");
+    EXPECT_EQ(lines.count, std::string("<docRoot>   <cpuTotal>7").size()) << "what does not end a line is buffered";
+  }
 }
 
 TEST(OutputOfAWalk, IsNotHeldBackOnceATraceHasBegun)

@@ -167,7 +167,7 @@ size_t blanksAt(int64_t depth)
   CaughtStream stream;
   TAVPrintCtx ctx = printContext(stream.get(), TAV_PRINT_XML);
   ctx.depth = depth;
-  tav::print::line(ctx, {"x"});
+  tav::inside::print::line(ctx, {"x"});
   EXPECT_EQ(ctx.bytesWritten, stream.text().size());
   return stream.text().find('x');
 }
@@ -186,7 +186,7 @@ TEST(Indentation, AtTheTopIsNone)
   TAVPrintCtx ctx = printContext(stream.get(), TAV_PRINT_XML);
   ctx.depth = 1;
   ctx.depth = 0;
-  tav::print::line(ctx, {"line\n"});
+  tav::inside::print::line(ctx, {"line\n"});
   EXPECT_EQ(stream.text(), "line\n");
 }
 
@@ -197,7 +197,7 @@ TEST(Line, OfTextBeginsWithTheDepth)
   for (const int64_t depth : {0, 1, 10, 100, 1000})
   {
     ctx.depth = depth;
-    tav::print::line(ctx, {"x", "1\n"});
+    tav::inside::print::line(ctx, {"x", "1\n"});
   }
   EXPECT_EQ(stream.text(), "  0|x1\n  1|   x1\n 10|" + std::string(30, ' ') + "x1\n100|" + std::string(300, ' ') +
                                "x1\n1000|" + std::string(3000, ' ') + "x1\n");
@@ -208,7 +208,7 @@ TEST(Line, OfXmlHasNoDepth)
   CaughtStream stream;
   TAVPrintCtx ctx = printContext(stream.get(), TAV_PRINT_XML);
   ctx.depth = 2;
-  tav::print::line(ctx, {"<", "host", ">\n"});
+  tav::inside::print::line(ctx, {"<", "host", ">\n"});
   EXPECT_EQ(stream.text(), "      <host>\n");
 }
 
@@ -216,7 +216,7 @@ TEST(Line, OfTextIsAPieceBehindItsDepth)
 {
   BufferSink sink(16);
   sink.ctx.depth = 1;
-  tav::print::line(sink.ctx, {"ab\n"});
+  tav::inside::print::line(sink.ctx, {"ab\n"});
   EXPECT_EQ(sink.held(), "   ab\n");
   EXPECT_EQ(sink.ctx.bytesWritten, 10U);
 }
@@ -225,7 +225,7 @@ TEST(Line, IsCutPieceByPiece)
 {
   BufferSink sink(3);
   sink.ctx.depth = 1;
-  tav::print::line(sink.ctx, {"ab\n"});
+  tav::inside::print::line(sink.ctx, {"ab\n"});
   EXPECT_EQ(sink.held(), "  ");
   EXPECT_EQ(sink.ctx.bytesWritten, 4U); // two of "  1|", two of "   ab\n"
 }

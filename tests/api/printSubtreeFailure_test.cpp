@@ -19,6 +19,7 @@ namespace
 {
 
 using namespace tav;
+using namespace tav::inside;
 using namespace test;
 
 using ::testing::ElementsAre;

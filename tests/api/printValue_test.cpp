@@ -19,6 +19,7 @@ namespace
 {
 
 using namespace tav;
+using namespace tav::inside;
 using namespace test;
 using namespace std::string_literals;
 
@@ -467,7 +468,7 @@ TEST(PrintValueArguments, FewerBytesThanTheNodeHasAreNotReadBeyond)
   EXPECT_THAT(trace.failures(), ElementsAre(Failure{probe::printValue, 40, TAV_RC_OUTSIDE_PARENT}));
 }
 
-TEST(PrintValueTrace, IsEntryArgumentsAndExit)
+TEST(PrintValueTrace, IsEntryArgumentsCharactersAndExit)
 {
   PrintValue print(TAV_TYPE_UINT32, {7, 0, 0, 0}, false);
   CaughtStream stream;
@@ -476,7 +477,8 @@ TEST(PrintValueTrace, IsEntryArgumentsAndExit)
   ASSERT_EQ(tavPrintValue(&ctx, &print.node), TAV_RC_OK);
   EXPECT_THAT(trace.steps(),
               ElementsAre(Step{KOR_TRACE_ENTRY, probe::printValue, 0}, Step{KOR_TRACE_VAR, probe::printValue, 0},
-                          Step{KOR_TRACE_EXIT, probe::printValue, 0}));
+                          Step{KOR_TRACE_VAR, probe::printValue, 100}, Step{KOR_TRACE_EXIT, probe::printValue, 0}));
+  EXPECT_THAT(trace.dump(probe::printValue, 100).items, ElementsAre(bytesOf(uint64_t{1})));
   TAVPrintCtx* const pCtx = &ctx;
   EXPECT_THAT(trace.dump(probe::printValue, 0).items, ElementsAre(bytesOf(pCtx), bytesOf(print.node)));
 }

@@ -13,6 +13,7 @@ namespace
 {
 
 using namespace tav;
+using namespace tav::inside;
 using namespace test;
 
 using ::testing::ElementsAre;
@@ -51,7 +52,7 @@ TEST_P(RawWriteStep, OfNoBytesWritesNothing)
   EXPECT_EQ(writer.bytes(), Bytes(16, 0xEE));
 }
 
-TEST_P(RawWriteStep, TracesItsArguments)
+TEST_P(RawWriteStep, TracesItsArgumentsAndTheNewPosition)
 {
   StreamWriter writer(GetParam());
   const Bytes bytes{1, 2, 3};
@@ -62,7 +63,17 @@ TEST_P(RawWriteStep, TracesItsArguments)
               ElementsAre(bytesOf(uint64_t{5}), bytesOf(bytes.data()), bytesOf(uint64_t{3})));
   EXPECT_THAT(trace.stepsOf(probe::rawWrite),
               ElementsAre(Step{KOR_TRACE_ENTRY, probe::rawWrite, 0}, Step{KOR_TRACE_VAR, probe::rawWrite, 0},
-                          Step{KOR_TRACE_EXIT, probe::rawWrite, 0}));
+                          Step{KOR_TRACE_VAR, probe::rawWrite, 100}, Step{KOR_TRACE_EXIT, probe::rawWrite, 0}));
+  EXPECT_THAT(trace.dump(probe::rawWrite, 100).items, ElementsAre(bytesOf(uint64_t{8})));
+}
+
+TEST_P(RawWriteStep, TracesThePositionThatNoBytesLeave)
+{
+  StreamWriter writer(GetParam());
+  uint64_t position = 5;
+  TraceLog trace;
+  ASSERT_EQ(rawWrite(*writer.handle(), position, nullptr, 0), TAV_RC_OK);
+  EXPECT_THAT(trace.dump(probe::rawWrite, 100).items, ElementsAre(bytesOf(uint64_t{5})));
 }
 
 TEST(RawWriteBuffered, GivesTheRingTheOffsetTheBytesTheLengthAndNoDirectFlag)

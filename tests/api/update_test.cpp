@@ -15,6 +15,7 @@ namespace
 {
 
 using namespace tav;
+using namespace tav::inside;
 using namespace test;
 
 using ::testing::ElementsAre;
@@ -424,7 +425,7 @@ TEST(UpdateElementRoom, IsAskedForAWholeArrayBeforeAnyOfItIsReversed)
   constexpr uint64_t size = 4096;
   constexpr bool swap = true;
   Bytes block(16 + size, 0xAA); // ends with the array
-  tav::encodeHeader(header64(size, TAV_TYPE_UINT64_ARRAY, kBlob), swap, block.data());
+  tav::layout::encodeHeader(header64(size, TAV_TYPE_UINT64_ARRAY, kBlob), swap, block.data());
   const Bytes before = block;
   TAVSSMemory storage(block.data(), block.size());
   Handle handle(storage, TAV_OPT_UPDATE, {.swap = swap});

@@ -294,6 +294,18 @@ TEST_P(Validation, AStackThatBeganWithoutABlockGrows)
   EXPECT_EQ(allocations::live(), before);
 }
 
+TEST_P(Validation, AStackWithoutABlockThatCannotGrowEndsTheWalk)
+{
+  read();
+
+  TraceLog trace;
+  const allocations::OnlySizes small(0, sizeof(TAVHdrStack));
+  EXPECT_EQ(validate(), TAV_RC_NO_MEMORY);
+  EXPECT_THAT(trace.failuresOf(probe::validateSubtree),
+              ElementsAre(Failure{probe::validateSubtree, 40, TAV_RC_NO_MEMORY}));
+  EXPECT_EQ(callsOf(trace, probe::getNextChild), 0U);
+}
+
 TEST_P(Validation, RefusesTheContainmentBitWithoutReading)
 {
   writer.add(u32(1, 1));

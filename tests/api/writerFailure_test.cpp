@@ -336,10 +336,12 @@ TEST(AddElementTrace, RunsThroughItsStepsInOrder)
                           Step{KOR_TRACE_ENTRY, probe::validateChild, 0}, Step{KOR_TRACE_VAR, probe::validateChild, 0},
                           Step{KOR_TRACE_EXIT, probe::validateChild, 0}, Step{KOR_TRACE_ENTRY, probe::writeNode, 0},
                           Step{KOR_TRACE_VAR, probe::writeNode, 0}, Step{KOR_TRACE_ENTRY, probe::rawWrite, 0},
-                          Step{KOR_TRACE_VAR, probe::rawWrite, 0}, Step{KOR_TRACE_EXIT, probe::rawWrite, 0},
-                          Step{KOR_TRACE_ENTRY, probe::rawWrite, 0}, Step{KOR_TRACE_VAR, probe::rawWrite, 0},
+                          Step{KOR_TRACE_VAR, probe::rawWrite, 0}, Step{KOR_TRACE_VAR, probe::rawWrite, 100},
                           Step{KOR_TRACE_EXIT, probe::rawWrite, 0}, Step{KOR_TRACE_ENTRY, probe::rawWrite, 0},
-                          Step{KOR_TRACE_VAR, probe::rawWrite, 0}, Step{KOR_TRACE_EXIT, probe::rawWrite, 0},
+                          Step{KOR_TRACE_VAR, probe::rawWrite, 0}, Step{KOR_TRACE_VAR, probe::rawWrite, 100},
+                          Step{KOR_TRACE_EXIT, probe::rawWrite, 0}, Step{KOR_TRACE_ENTRY, probe::rawWrite, 0},
+                          Step{KOR_TRACE_VAR, probe::rawWrite, 0}, Step{KOR_TRACE_VAR, probe::rawWrite, 100},
+                          Step{KOR_TRACE_EXIT, probe::rawWrite, 0},
                           Step{KOR_TRACE_VAR, probe::writeNode, 100}, Step{KOR_TRACE_EXIT, probe::writeNode, 0},
                           Step{KOR_TRACE_VAR, probe::addElement, 100}, Step{KOR_TRACE_EXIT, probe::addElement, 0}));
 }

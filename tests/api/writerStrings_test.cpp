@@ -7,6 +7,7 @@
 
 #include "support/traceLog.h"
 #include "support/writing.h"
+#include "tav/layout.hpp"
 #include "tav/probes.h"
 #include "tav/tav.h"
 
@@ -325,7 +326,7 @@ TEST(AddStringRoom, ForTheCountedBytesIsCheckedBeforeAnyByte)
   EXPECT_EQ(tavAddString(0, writer.handle(), &data, kUtf8Page), TAV_RC_END_OF_STORAGE);
   EXPECT_THAT(trace.failures(), ElementsAre(Failure{probe::writeNode, 50, TAV_RC_END_OF_STORAGE},
                                             Failure{probe::addString, 60, TAV_RC_END_OF_STORAGE}));
-  EXPECT_EQ(data.header.hdr64.size, 5U); // changed before the failure
+  EXPECT_EQ(data.header.hdr64.size, 3U);
   EXPECT_EQ(writer.length(), 16U);
   EXPECT_EQ(Bytes(writer.handle()->pDirectData + 16, writer.handle()->pDirectData + 37), Bytes(21));
 }
@@ -365,16 +366,100 @@ TEST(AddStringRoom, ForThePairIsMissedLast)
   EXPECT_EQ(writer.handle()->pDirectData[34], 'c');
 }
 
-TEST(AddStringRoom, ForASizeThatWrapsIsThatOfTheWrappedSize)
+TEST(AddStringSize, ThatHasNoRoomForTheCodePageIsRefused)
+{
+  for (const bool buffered : {false, true})
+  {
+    for (const bool wide : {false, true})
+    {
+      for (const uint64_t below : {0U, 1U})
+      {
+        StreamWriter writer({.buffered = buffered, .root32 = !wide});
+        writer.add(wide ? group64(kRoot) : group32(kRoot));
+        const uint64_t before = writer.length();
+        Bytes text = bytesOfText("ab");
+        TAVHeaderData data = textOf(wide ? header64(~uint64_t{0} - below, TAV_TYPE_UTF8_STRING, kName)
+                                         : header32(~uint32_t{0} - static_cast<uint32_t>(below), TAV_TYPE_UTF8_STRING,
+                                                    kName),
+                                    text);
+        const uint64_t size = layout::sizeOf(data.header);
+        TraceLog trace;
+        EXPECT_EQ(tavAddString(0, writer.handle(), &data, kUtf8Page), TAV_RC_BAD_PARAM);
+        EXPECT_THAT(trace.failures(), ElementsAre(Failure{probe::addString, 55, TAV_RC_BAD_PARAM}));
+        EXPECT_EQ(layout::sizeOf(data.header), size);
+        EXPECT_EQ(writer.length(), before);
+      }
+    }
+  }
+}
+
+TEST(AddStringSize, ThatHasJustRoomForTheCodePageMeetsTheRoomOfTheBlock)
 {
   StreamWriter writer;
   writer.add(group64(kRoot));
   Bytes text = bytesOfText("ab");
-  TAVHeaderData data = textOf(header64(~uint64_t{0} - 1, TAV_TYPE_UTF8_STRING, kName), text);
-  EXPECT_EQ(tavAddString(0, writer.handle(), &data, kUtf8Page), TAV_RC_OK);
-  EXPECT_EQ(data.header.hdr64.size, 0U);
-  EXPECT_EQ(writer.length(), 34U);
+  TAVHeaderData data = textOf(header64(~uint64_t{0} - 2, TAV_TYPE_UTF8_STRING, kName), text);
+  EXPECT_EQ(tavAddString(0, writer.handle(), &data, kUtf8Page), TAV_RC_END_OF_STORAGE);
+  EXPECT_EQ(data.header.hdr64.size, ~uint64_t{0} - 2);
 }
+
+TEST(AddStringSize, OfAnAsciiStringNearTheTopIsNotCountedUp)
+{
+  StreamWriter writer;
+  writer.add(group64(kRoot));
+  Bytes text = bytesOfText("ab");
+  TAVHeaderData data = textOf(header64(~uint64_t{0}, TAV_TYPE_ASCII_STRING, kName), text);
+  EXPECT_EQ(tavAddString(0, writer.handle(), &data, 437), TAV_RC_END_OF_STORAGE);
+  EXPECT_EQ(data.header.hdr64.size, ~uint64_t{0});
+}
+
+/// A string whose adding fails at one call of the storage, added until it succeeds.
+class StringTakenAgain : public ::testing::TestWithParam<Form>
+{
+};
+
+TEST_P(StringTakenAgain, IsTheOneThatWouldHaveBeen)
+{
+  Form form = GetParam();
+  form.buffered = true;
+  form.ringBytes = 2 * form.pageBytes;
+  uint64_t failures = 0;
+  for (const bool wide : {false, true})
+  {
+    form.root32 = !wide;
+    const auto write = [&](uint64_t nth) {
+      StreamWriter writer(form);
+      writer.add(wide ? group64(kRoot) : group32(kRoot));
+      writer.add(binary(kName, Bytes(101, 1), wide));
+      Bytes text(150, 'x');
+      TAVHeaderData data = textOf(wide ? header64(148, TAV_TYPE_UTF8_STRING, kName, TAV_INFO_EYE_SIZE)
+                                       : header32(148, TAV_TYPE_UTF8_STRING, kName),
+                                  text);
+      writer.vectorStorage().failAt(nth, kStorageCode);
+      if (tavAddString(0, writer.handle(), &data, kUtf8Page) != TAV_RC_OK)
+      {
+        ++failures;
+        EXPECT_EQ(layout::sizeOf(data.header), 148U);
+        EXPECT_EQ(tavAddString(0, writer.handle(), &data, kUtf8Page), TAV_RC_OK);
+      }
+      EXPECT_EQ(layout::sizeOf(data.header), 150U);
+      writer.vectorStorage().failAt(0, TAV_RC_OK);
+      writer.close();
+      return writer.bytes();
+    };
+    const Bytes expected = write(0);
+    for (uint64_t nth = 1; nth < 20; ++nth)
+    {
+      EXPECT_EQ(toHex(write(nth)), toHex(expected)) << "call " << nth;
+    }
+  }
+  EXPECT_GT(failures, 4U);
+}
+
+INSTANTIATE_TEST_SUITE_P(Forms, StringTakenAgain,
+                         ::testing::Values(Form{}, Form{.swap = true}, Form{.align = true},
+                                           Form{.swap = true, .align = true}),
+                         [](const auto& instance) { return formName(instance.param); });
 
 TEST(AddStringSink, WithoutBlockOrRingIsRefused)
 {

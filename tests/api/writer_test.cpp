@@ -387,7 +387,13 @@ constexpr Place kPlaces[] = {
     {"Group32OfType2Under32OfType1", 1, 1, 1, 2, TAV_RC_OK, 0},
     {"Data64Under32OfType1", 1, 1, 2, 55, TAV_RC_BAD_CHILD_HDR, 20},
     {"Group64Under32OfType1", 1, 1, 2, 2, TAV_RC_BAD_CHILD_HDR, 20},
+    {"Data32Under32OfType2", 1, 2, 1, 55, TAV_RC_BAD_CHILD_HDR, 10},
+    {"Data64Under32OfType2", 1, 2, 2, 55, TAV_RC_BAD_CHILD_HDR, 20},
+    {"Group64Under32OfType2", 1, 2, 2, 2, TAV_RC_BAD_CHILD_HDR, 20},
+    {"Group64OfType1Under32OfType2", 1, 2, 2, 1, TAV_RC_BAD_CHILD_HDR, 20},
+    {"Data64Under32OfAnyOtherType", 1, 7, 2, 55, TAV_RC_BAD_CHILD_HDR, 20},
     {"Data32Under64OfType1", 2, 1, 1, 55, TAV_RC_OK, 0},
+    {"Group32Under64OfType1", 2, 1, 1, 1, TAV_RC_OK, 0},
     {"Data64Under64OfType1", 2, 1, 2, 55, TAV_RC_BAD_CHILD_HDR, 20},
     {"Group64Under64OfType1", 2, 1, 2, 1, TAV_RC_BAD_CHILD_HDR, 20},
     {"Data32Under64OfType2", 2, 2, 1, 55, TAV_RC_BAD_CHILD_HDR, 10},
@@ -404,11 +410,9 @@ class ChildAgainstParent : public ::testing::TestWithParam<Place>
 {
 };
 
-TEST_P(ChildAgainstParent, IsTakenOrRefused)
+/// Adds the row's child under its parent.
+Added addChild(StreamWriter& writer, const Place& row)
 {
-  const Place& row = GetParam();
-  uint8_t bytes[4] = {};
-  StreamWriter writer;
   if (row.parentHdr != 0)
   {
     const TAVHeader parent = row.parentHdr == TAV_HDR_64 ? header64(0, row.parentType, kRoot)
@@ -417,9 +421,16 @@ TEST_P(ChildAgainstParent, IsTakenOrRefused)
   }
   TAVHeader header = row.hdrType == TAV_HDR_64 ? header64(4, row.type, kCpu) : header32(4, row.type, kCpu);
   header.hdrType = row.hdrType;
+  uint8_t bytes[4] = {};
+  return add(writer, header, bytes, 4);
+}
 
+TEST_P(ChildAgainstParent, IsTakenOrRefused)
+{
+  const Place& row = GetParam();
+  StreamWriter writer;
   TraceLog trace;
-  const Added added = add(writer, header, bytes, 4);
+  const Added added = addChild(writer, row);
   EXPECT_EQ(added.code, row.code);
   if (row.code == TAV_RC_OK)
   {
@@ -431,6 +442,46 @@ TEST_P(ChildAgainstParent, IsTakenOrRefused)
                                             Failure{probe::addElement, 50, row.code}));
   EXPECT_EQ(added.length, 0U);
   EXPECT_EQ(added.nodeOffset, kBefore);
+}
+
+TEST_P(ChildAgainstParent, IsTakenOrRefusedWithoutATrace)
+{
+  for (const Form& form : allForms())
+  {
+    StreamWriter writer(form);
+    const uint32_t open = GetParam().parentHdr != 0 ? 1 : 0;
+    const Added added = addChild(writer, GetParam());
+    EXPECT_EQ(added.code, GetParam().code) << form;
+    EXPECT_EQ(added.length != 0, added.code == TAV_RC_OK) << form;
+    const bool opened = added.code == TAV_RC_OK && (GetParam().type == 1 || GetParam().type == 2);
+    EXPECT_EQ(writer.handle()->pHdrStack->count, open + (opened ? 1 : 0)) << form;
+  }
+}
+
+TEST(GroupOf32BitsThatAnnounces64, TakesNoNodeInAnyWay)
+{
+  for (const bool buffered : {false, true})
+  {
+    StreamWriter writer({.buffered = buffered, .root32 = true});
+    writer.add(group32(kRoot));
+    writer.add({header32(0, TAV_TYPE_HEADER64, kRoot), {}});
+    const uint64_t before = writer.length();
+    uint8_t bytes[16] = {};
+    for (const uint16_t type : {TAV_TYPE_HEADER32, TAV_TYPE_HEADER64, TAV_TYPE_BINARY, TAV_TYPE_ASCII_STRING})
+    {
+      EXPECT_EQ(add(writer, header64(4, type, kCpu), bytes, 4).code, TAV_RC_BAD_CHILD_HDR);
+      EXPECT_EQ(add(writer, header32(4, type, kCpu), bytes, 4).code, TAV_RC_BAD_CHILD_HDR);
+    }
+    TAVHeaderData text{header64(4, TAV_TYPE_ASCII_STRING, kCpu), bytes, 4, 0};
+    EXPECT_EQ(tavAddString(0, writer.handle(), &text, 437), TAV_RC_BAD_CHILD_HDR);
+    for (const uint32_t kind : {TAV_HDR_32, TAV_HDR_64})
+    {
+      EXPECT_EQ(tavAddStream(0, writer.handle(), kind, bytes, sizeof bytes), TAV_RC_BAD_CHILD_HDR);
+    }
+    EXPECT_EQ(writer.length(), before);
+    writer.close();
+    writer.add(u32(kCpu, 7, false)); // its own parent takes nodes as before
+  }
 }
 
 INSTANTIATE_TEST_SUITE_P(Rules, ChildAgainstParent, ::testing::ValuesIn(kPlaces),

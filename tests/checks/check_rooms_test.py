@@ -90,6 +90,22 @@ class CheckRooms(unittest.TestCase):
             with self.subTest(name=name, line=line):
                 self.assertEqual(len(findings(name, line)), 1)
 
+    def test_leaves_the_users_names_to_the_installed_headers(self):
+        for name, line in [
+            ("api/nodeStep.h", "namespace tav"),
+            ("kor/traceFrame.h", "namespace tav {"),
+            ("tools/form.h", "namespace tav"),
+        ]:
+            with self.subTest(name=name, line=line):
+                self.assertEqual(len(findings(name, line)), 1)
+        for name, line in [
+            ("include/tav/cpp/node.hpp", "namespace tav"),
+            ("api/nodeStep.h", "namespace tav::inside"),
+            ("api/nodeStep.h", "using namespace tav;"),
+        ]:
+            with self.subTest(name=name, line=line):
+                self.assertEqual(findings(name, line), [])
+
     def test_ignores_line_comments(self):
         self.assertEqual(findings("api/printer.cpp", "int x; // the same on _WIN32"), [])
 

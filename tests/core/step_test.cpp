@@ -96,7 +96,7 @@ TEST_P(FastStep, AnswersOrStoresNothing)
   expectStep<tav::core::HostForm>(reader.handle(), root, &first, one.toSecond);
   expectStep<tav::core::AnyForm>(reader.handle(), root, nullptr, TAV_RC_OK);
   expectStep<tav::core::AnyForm>(reader.handle(), root, &first,
-                                 tav::isEndElement(first.hdr64.elm) ? TAV_RC_NO_MORE_CHILDREN : TAV_RC_OK);
+                                 tav::layout::isEndElement(first.hdr64.elm) ? TAV_RC_NO_MORE_CHILDREN : TAV_RC_OK);
 }
 
 INSTANTIATE_TEST_SUITE_P(

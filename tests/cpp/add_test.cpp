@@ -1,4 +1,5 @@
 #include <array>
+#include <cstring>
 #include <vector>
 
 #include "cpp/layer.h"
@@ -137,6 +138,57 @@ TEST(LayerAdd, Utf8LongerThanTheShortWayIsWhole)
   const Bytes all = bytesOf(writer.bytes());
   ASSERT_EQ(all.size(), 16 + 16 + 2 + text.size());
   EXPECT_EQ(std::string(all.begin() + 34, all.end()), text);
+}
+
+TEST(LayerAdd, TextBeyondAsciiIsAUtf8String)
+{
+  const std::string expected = rows("04 00 00 00 00 00 00 00 00 00 00 00 66 00 34 12 B8 04 C3 A4");
+  EXPECT_EQ(added("\xC3\xA4"), expected);
+  EXPECT_EQ(added(std::string("\xC3\xA4")), expected);
+  EXPECT_EQ(added(std::string_view("\xC3\xA4")), expected);
+  EXPECT_EQ(added(std::string(300, 'x') + "\xC3\xA4"), added(tav::Utf8{std::string(300, 'x') + "\xC3\xA4"}));
+  for (size_t place = 0; place < 20; ++place) // wherever it stands in the words that are looked at
+  {
+    std::string text(20, 'x');
+    text.replace(place, 1, "\xF0\x9F\x98\x80");
+    EXPECT_EQ(added(text), added(tav::Utf8{text})) << place;
+  }
+  EXPECT_EQ(added(std::string("\x7F\0", 2)), rows("02 00 00 00 00 00 00 00 00 00 00 00 32 00 34 12 7F 00"));
+}
+
+TEST(LayerAdd, TextThatIsNoUtf8IsRefused)
+{
+  for (const char* const text :
+       {"\x80", "\xC3", "\xC3(", "\xC0\x80", "\xE0\x80\x80", "\xED\xA0\x80", "\xF0\x80\x80\x80", "\xF4\x90\x80\x80",
+        "\xF5\x80\x80\x80", "\xE2\x82", "\xF0\x9F\x98", "\xFF", "abcdefgh\xE4"})
+  {
+    EXPECT_EQ(refusal(text), TAV_RC_BAD_PARAM) << toHex(Bytes(text, text + std::strlen(text)));
+  }
+  EXPECT_EQ(added("\xEF\xBF\xBF"), added(tav::Utf8{"\xEF\xBF\xBF"})) << "a character, if not one to be exchanged";
+}
+
+TEST(LayerAdd, IdBeyond65535IsRefusedAndDoesNotBecomeAnother)
+{
+  tav::Writer writer;
+  EXPECT_EQ(thrownBy([&] { static_cast<void>(writer.group(0x10001)); }), TAV_RC_BAD_PARAM);
+  tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM);
+  for (const int64_t id : {int64_t{65536}, int64_t{65537}, int64_t{-1}, int64_t{1} << 32U, INT64_MIN})
+  {
+    EXPECT_EQ(thrownBy([&] { root.add(id, 5); }), TAV_RC_BAD_PARAM) << id;
+    EXPECT_EQ(givenBy([&](std::error_code& ec) { root.add<TAV_TYPE_UINT8>(id, 5, ec); }), TAV_RC_BAD_PARAM) << id;
+    EXPECT_EQ(thrownBy([&] { root.addRaw(TAV_TYPE_BINARY, id, {}); }), TAV_RC_BAD_PARAM) << id;
+    EXPECT_EQ(givenBy([&](std::error_code& ec) { static_cast<void>(root.group(id, ec)); }), TAV_RC_BAD_PARAM) << id;
+  }
+  tav::Writer narrow({.root = tav::Width::bits32});
+  tav::Group other = narrow.group(TAV_ELM_CMN_SYSTEM);
+  EXPECT_EQ(thrownBy([&] { other.add(65536, 5); }), TAV_RC_BAD_PARAM) << "on the slow way, too";
+  EXPECT_EQ(root.add(65535, 5).elm(), 65535);
+  EXPECT_EQ(root.add(uint8_t{7}, 5).elm(), 7);
+  enum Own
+  {
+    own = 40000
+  };
+  EXPECT_EQ(root.add(own, 5).elm(), 40000);
 }
 
 TEST(LayerAdd, BytesAreBinary)

@@ -130,3 +130,117 @@ TEST(LayerErrors, NameThePathThatIsNone)
   EXPECT_THAT(messageOf([&] { static_cast<void>(reader.path("/noSuchName")); }),
               ::testing::StartsWith("searching /noSuchName: TAV_RC_BAD_PARAM: "));
 }
+
+TEST(LayerErrors, SayWhichGroupIsStillOpen)
+{
+  tav::Writer writer;
+  const std::string finishing = "finishing a stream: TAV_RC_BAD_PARAM: ";
+  tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM);
+  EXPECT_EQ(messageOf([&] { writer.finish(); }), finishing + "the group system (60100) at 0x0 is still open");
+  tav::Group host = root.group(TAV_ELM_CMN_HOST);
+  EXPECT_EQ(messageOf([&] { writer.finish(); }),
+            finishing + "the group host (60102) at 0x10 and 1 around it are still open");
+  EXPECT_EQ(messageOf([&] { root.add(TAV_ELM_CMN_HOST_NAME, "x"); }),
+            "adding hostName (60103): TAV_RC_BAD_PARAM: the group host (60102) at 0x10, inside it, is still open");
+  EXPECT_EQ(messageOf([&] { static_cast<void>(root.group(TAV_ELM_CMN_OS)); }),
+            "opening the group os (60104): TAV_RC_BAD_PARAM: the group host (60102) at 0x10, inside it, is still open");
+  EXPECT_EQ(messageOf([&] { root.close(); }),
+            "closing a group: TAV_RC_BAD_PARAM: the group host (60102) at 0x10, inside it, is still open");
+  host.close();
+  EXPECT_EQ(messageOf([&] { host.add(TAV_ELM_CMN_HOST_NAME, "x"); }),
+            "adding hostName (60103): TAV_RC_BAD_PARAM: the group is closed");
+  EXPECT_EQ(messageOf([&] { host.addStream(tav::Width::bits64, {}); }),
+            "adding encoded nodes: TAV_RC_BAD_PARAM: the group is closed");
+  root.close();
+  writer.finish();
+  EXPECT_EQ(messageOf([&] { static_cast<void>(writer.group(TAV_ELM_CMN_OS)); }),
+            "opening the group os (60104): TAV_RC_BAD_PARAM: the stream is finished");
+}
+
+TEST(LayerErrors, SayWhyAValueWasRefused)
+{
+  tav::Writer writer;
+  tav::Group root = writer.group(TAV_ELM_CMN_HOST);
+  const std::string adding = "adding hostName (60103): ";
+  const auto added = [&](const auto& value) { return messageOf([&] { root.add(TAV_ELM_CMN_HOST_NAME, value); }); };
+  EXPECT_THAT(added("\xFF"), ::testing::StartsWith(adding + "TAV_RC_BAD_PARAM: the text is neither ASCII nor UTF-8"));
+  EXPECT_EQ(added(static_cast<const char*>(nullptr)), adding + "TAV_RC_BAD_PARAM: the text is a null pointer");
+  EXPECT_EQ(added(std::chrono::sys_seconds(std::chrono::seconds(-1))),
+            adding + "TAV_RC_OUTSIDE_PARENT: a time before 1970, or too late for a timestamp");
+  EXPECT_EQ(messageOf([&] { root.add<TAV_TYPE_UINT8>(TAV_ELM_CMN_HOST_NAME, 256); }),
+            adding + "TAV_RC_OUTSIDE_PARENT: the number does not fit the type");
+  EXPECT_EQ(messageOf([&] { root.add(TAV_ELM_CMN_HOST_NAME, 1, {.infoKey = 2048}); }),
+            adding + "TAV_RC_BAD_PARAM: the key does not fit 11 bits");
+  EXPECT_EQ(messageOf([&] { root.add(70000, 1); }),
+            "adding element 70000: TAV_RC_BAD_PARAM: ids of elements go from 0 to 65535");
+  EXPECT_EQ(messageOf([&] { root.addRaw(TAV_TYPE_HEADER64, TAV_ELM_CMN_HOST_NAME, {}); }),
+            adding + "TAV_RC_BAD_PARAM: the type is a group's: group() opens one");
+}
+
+TEST(LayerErrors, SayHowAValueCanBeRead)
+{
+  tav::Writer writer;
+  {
+    tav::Group root = writer.group(TAV_ELM_CMN_HOST);
+    root.add(TAV_ELM_CMN_CPU_ONLINE, int32_t{-5});
+    root.add(TAV_ELM_CMN_HOST_NAME, "ada");
+    root.add(TAV_ELM_CMN_OS, std::byte{1});
+    root.addRaw(TAV_TYPE_UINT32, TAV_ELM_CMN_OS_NAME, std::array<std::byte, 3>{});
+    root.addRaw(999, TAV_ELM_CMN_MACHINE_ID, {});
+  }
+  writer.finish();
+  const tav::Reader reader(writer.bytes());
+  const auto read = [&]<class T>(const char* name, std::type_identity<T>) {
+    const std::string said = messageOf([&] { static_cast<void>(reader.path(name)->as<T>()); });
+    return said.substr(std::min(said.size(), said.find("TAV_RC")));
+  };
+  constexpr std::type_identity<uint32_t> number;
+  EXPECT_EQ(read("/host/cpuOnline", number), "TAV_RC_NOT_SUPPORTED: the node is a Sint32: asNumber<uint32_t>()");
+  EXPECT_EQ(read("/host/cpuOnline", std::type_identity<std::string>()),
+            "TAV_RC_NOT_SUPPORTED: the node is a Sint32: as<int32_t>()");
+  EXPECT_EQ(read("/host/hostName", number), "TAV_RC_NOT_SUPPORTED: the node is an ASCII String: as<std::string>()");
+  EXPECT_EQ(read("/host/os", number), "TAV_RC_NOT_SUPPORTED: the node is a Byte: as<std::byte>()");
+  EXPECT_EQ(read("/host/osName", number), "TAV_RC_OUTSIDE_PARENT: the node is a Uint32 of another size");
+  EXPECT_EQ(read("/host/machineId", number), "TAV_RC_NOT_SUPPORTED: the node is of type 999: payload()");
+  EXPECT_EQ(read("/host", number), "TAV_RC_NOT_SUPPORTED: the node is a group");
+  EXPECT_THAT(messageOf([&] { static_cast<void>(reader.path("/host/cpuOnline")->asNumber<uint32_t>()); }),
+              ::testing::EndsWith("TAV_RC_OUTSIDE_PARENT: the node's value does not fit"));
+}
+
+TEST(LayerErrors, SayWhatAnUpdateLacks)
+{
+  tav::Writer writer;
+  tav::Group root = writer.group(TAV_ELM_CMN_HOST);
+  const tav::HeaderView name = root.add(TAV_ELM_CMN_HOST_NAME, "ada");
+  const std::string updating = "updating hostName (60103) at 0x10, type 50, 3 bytes: ";
+  EXPECT_EQ(messageOf([&] { writer.update(name, "grace"); }),
+            updating + "TAV_RC_OUTSIDE_PARENT: the node has 3 bytes, the value 5");
+  EXPECT_EQ(messageOf([&] { writer.update(name, 1); }),
+            updating + "TAV_RC_NOT_SUPPORTED: the node is an ASCII String, the value a Sint32");
+  EXPECT_EQ(messageOf([&] { writer.update(name, "\xC3\xA4!"); }),
+            updating + "TAV_RC_NOT_SUPPORTED: the node is an ASCII String, the value a UTF8 String");
+  tav::Writer other;
+  tav::Group group = other.group(TAV_ELM_CMN_HOST);
+  group.add(TAV_ELM_CMN_OS_NAME, "ada");
+  EXPECT_EQ(messageOf([&] { other.update(name, "bob"); }), updating + "TAV_RC_BAD_PARAM: the stream has no such node");
+  const tav::HeaderView text = root.add(TAV_ELM_CMN_HOST_NAME, "\xC3\xA4");
+  EXPECT_NO_THROW(writer.update(text, "ab")) << "ASCII is UTF-8, too";
+}
+
+TEST(LayerErrors, NameTheColumnOfAPathThatIsNone)
+{
+  const auto said = [](const char* path) {
+    const std::string all = messageOf([&] { tav::Path{path}; });
+    return all.substr(all.find("PARAM: ") + 7);
+  };
+  EXPECT_EQ(said("/host/hostNam"), "column 7: no element is called 'hostNam'; did you mean hostName?");
+  EXPECT_EQ(said("/host/nothingLikeThisAtAll"), "column 7: no element is called 'nothingLikeThisAtAll'");
+  EXPECT_EQ(said("host/70000"), "column 6: '70000' is no id; they go from 0 to 65535");
+  EXPECT_EQ(said("host//hostName"), "column 6: a step is empty");
+  EXPECT_EQ(said(""), "column 1: a step is empty");
+  EXPECT_EQ(said("/host/hostName["), "column 15: a [ without a ] at the end of its step");
+  EXPECT_EQ(said("/host/hostName[2]x"), "column 15: a [ without a ] at the end of its step");
+  EXPECT_EQ(said("/host/hostName[x]"), "column 16: 'x' is no place; the first is [1]");
+  EXPECT_EQ(said("/host/hostName[0]"), "column 16: '0' is no place; the first is [1]");
+  EXPECT_EQ(said("/h\xC3\xB6st/\xC3\xA4"), "column 2: no element is called 'h\xC3\xB6st'; did you mean host?");
+}

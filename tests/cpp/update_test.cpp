@@ -162,3 +162,21 @@ TEST(LayerUpdateBlock, EmptyBlockIsRefused)
 {
   EXPECT_EQ(thrownBy([] { tav::Updater updater{std::span<std::byte>()}; }), TAV_RC_BAD_PARAM);
 }
+
+TEST(LayerReaderOverAWritableStorage, WritesNothingBack)
+{
+  VectorStorage storage(0x40, sample());
+  {
+    const tav::Reader reader(storage);
+    const tav::Node node = *reader.path("system/cpuOnline");
+    tav::Updater updater(storage);
+    updater.update(node, uint32_t{7});
+    updater.finish();
+    const uint64_t writes = storage.writes;
+    EXPECT_EQ(reader.path("system/hostName")->as<std::string>(), "ada");
+    EXPECT_EQ(node.as<uint32_t>(), 0x01020304U) << "which the reader's ring has had before";
+    EXPECT_EQ(storage.writes, writes);
+  }
+  const tav::Reader after(storage);
+  EXPECT_EQ(after.path("system/cpuOnline")->as<uint32_t>(), 7U) << "the reader's end takes nothing back";
+}

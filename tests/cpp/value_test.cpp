@@ -103,6 +103,46 @@ TEST(LayerValue, Utf8InAllItsForms)
   EXPECT_EQ(element.node().as<tav::Utf8>(), (tav::Utf8{"\xC3\xA4", 1208}));
 }
 
+TEST(LayerValue, TextOfEitherTypeIsReadAlike)
+{
+  const OneElement element(kLow, TAV_TYPE_UTF8_STRING, hex("B8 04 C3 A4"));
+  EXPECT_EQ(element.node().as<std::string_view>(), "\xC3\xA4");
+  tav::Writer writer;
+  const std::vector<std::string> texts{"ascii", "gr\xC3\xBC\xC3\x9F"
+                                                "e",
+                                       ""};
+  {
+    tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM);
+    for (const std::string& text : texts) root.add(TAV_ELM_CMN_HOST_NAME, text);
+  }
+  writer.finish();
+  const tav::Reader reader(writer.bytes());
+  std::vector<std::string> read;
+  for (const tav::Node& node : reader.root().children())
+  {
+    read.push_back(node.as<std::string>());
+    EXPECT_EQ(node.as<std::string_view>(), read.back());
+  }
+  EXPECT_EQ(read, texts);
+}
+
+TEST(LayerValue, TimeComesBackAsItWasWritten)
+{
+  using Micro = std::chrono::sys_time<std::chrono::microseconds>;
+  for (const auto fraction : {0us, 1us, 999us, 1000us, 123456us, 999999us})
+  {
+    const Micro time = Micro(1709164800s) + fraction;
+    tav::Writer writer;
+    writer.group(TAV_ELM_CMN_SYSTEM).add(TAV_ELM_CMN_HOST_NAME, time);
+    const tav::Reader reader(writer.bytes());
+    const tav::Node node = reader.path("/system/*").value();
+    EXPECT_EQ(node.as<Micro>(), time);
+    const auto stamp = node.as<TAVTimeStamp>();
+    EXPECT_EQ(stamp.fractionA, fraction.count() / 1000);
+    EXPECT_EQ(stamp.fractionB, fraction.count() % 1000);
+  }
+}
+
 TEST(LayerValue, CodePageIsReadInTheStreamsByteOrder)
 {
   EXPECT_EQ(valueOf<tav::Utf8Text>(TAV_TYPE_UTF8_STRING, "01 02 41", kHighFirst), (tav::Utf8Text{"A", 0x0102}));

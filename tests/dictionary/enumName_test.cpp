@@ -14,6 +14,7 @@ namespace
 {
 
 using namespace tav;
+using namespace tav::inside;
 
 using ::testing::StrEq;
 

@@ -117,8 +117,8 @@ enum class Act : uint8_t
 };
 
 /// The steps of one stream: groups of elements, some far larger than a page, closed when their headers have long left
-/// the ring; a reset between them. The groups neither have pairs nor unknown sizes: such a group gets its end element
-/// even when its size could not be written, and the element's code is the answer of the close.
+/// the ring; a reset between them. No group is opened with an unknown size: it would get its end element even when its
+/// size could not be written, and the element's code would be the answer of the close.
 std::vector<Act> script()
 {
   std::vector<Act> acts{Act::open};
@@ -144,7 +144,7 @@ public:
   {
     switch (act)
     {
-    case Act::open: return append(group64(TAV_ELM_CMN_HOST, TAV_TYPE_HEADER64, 0, 0), 0);
+    case Act::open: return append(group64(TAV_ELM_CMN_HOST, TAV_TYPE_HEADER64, TAV_INFO_EYE_SIZE, 0), 0);
     case Act::add: return append(binary(7, Bytes(100 + added_ * 977 % 9000, static_cast<uint8_t>(added_))), 1);
     case Act::addSmall: return append(binary(8, Bytes(100 + added_ * 7 % 300, static_cast<uint8_t>(added_))), 1);
     case Act::close: return tavCloseHeader(0, handle_.get());

@@ -121,8 +121,8 @@ void flush(Steps& steps, TAVHandle* handle)
   steps.call("reset", [&] { return handle->pCircularBuf->reset(); });
 }
 
-/// The groups neither have pairs nor unknown sizes: such a group gets its end element even when its size could not be
-/// written, and the element's code is the answer of the close.
+/// No group is opened with an unknown size: it would get its end element even when its size could not be written, and
+/// the element's code would be the answer of the close.
 /// `longest`: of an element that has to be read back, also through a ring for which memory was short.
 void writeNodes(Steps& steps, TAVHandle* handle, uint64_t longest)
 {

@@ -18,6 +18,7 @@ namespace
 {
 
 using namespace tav;
+using namespace tav::inside;
 
 using Bytes = std::vector<uint8_t>;
 

@@ -139,7 +139,8 @@ TEST(HdrStack, The1001stEntryGrowsTheStackOnce)
   fillTo(stack, 1200);
   EXPECT_THAT(trace.stepsOf(probe::hdrStackGrow),
               ElementsAre(Step{KOR_TRACE_ENTRY, probe::hdrStackGrow, 0}, Step{KOR_TRACE_VAR, probe::hdrStackGrow, 0},
-                          Step{KOR_TRACE_EXIT, probe::hdrStackGrow, 0}));
+                          Step{KOR_TRACE_VAR, probe::hdrStackGrow, 100}, Step{KOR_TRACE_EXIT, probe::hdrStackGrow, 0}));
+  EXPECT_THAT(trace.dump(probe::hdrStackGrow, 100).items, ElementsAre(bytesOf(uint32_t{1200})));
   EXPECT_THAT(trace.dump(probe::hdrStackGrow, 0).items, ElementsAre(bytesOf(uint32_t{1000}), bytesOf(uint32_t{200})));
   EXPECT_EQ(stack.capacity, 1200U);
   fillTo(stack, 1201);
@@ -278,8 +279,10 @@ TEST(HdrStackTrace, ShowsTheLifeOfAStack)
   {
     const TAVHdrStack stack;
   }
-  EXPECT_THAT(trace.steps(), ElementsAre(Step{KOR_TRACE_ENTRY, 0x88A001A, 0}, Step{KOR_TRACE_EXIT, 0x88A001A, 0},
-                                         Step{KOR_TRACE_ENTRY, 0x88A001B, 0}, Step{KOR_TRACE_EXIT, 0x88A001B, 0}));
+  EXPECT_THAT(trace.steps(), ElementsAre(Step{KOR_TRACE_ENTRY, 0x88A001A, 0}, Step{KOR_TRACE_VAR, 0x88A001A, 100},
+                                         Step{KOR_TRACE_EXIT, 0x88A001A, 0}, Step{KOR_TRACE_ENTRY, 0x88A001B, 0},
+                                         Step{KOR_TRACE_EXIT, 0x88A001B, 0}));
+  EXPECT_THAT(trace.dump(0x88A001A, 100).items, ElementsAre(bytesOf(uint32_t{1000})));
 }
 
 TEST(HdrStackTrace, PushShowsTheHeaderTheCountAndTheCapacity)
@@ -311,11 +314,18 @@ TEST(HdrStackTrace, TheTwoPopsHaveProbesOfTheirOwn)
   TAVHdrStack stack;
   fillTo(stack, 2);
   TAVHeader out{};
+  TAVHeader* const pOut = &out;
   TraceLog trace;
   stack.pop();
-  stack.pop(&out);
-  EXPECT_THAT(trace.steps(), ElementsAre(Step{KOR_TRACE_ENTRY, 0x88A001F, 0}, Step{KOR_TRACE_EXIT, 0x88A001F, 0},
-                                         Step{KOR_TRACE_ENTRY, 0x88A001E, 0}, Step{KOR_TRACE_EXIT, 0x88A001E, 0}));
+  stack.pop(pOut);
+  EXPECT_THAT(trace.steps(), ElementsAre(Step{KOR_TRACE_ENTRY, 0x88A001F, 0}, Step{KOR_TRACE_VAR, 0x88A001F, 0},
+                                         Step{KOR_TRACE_VAR, 0x88A001F, 100}, Step{KOR_TRACE_EXIT, 0x88A001F, 0},
+                                         Step{KOR_TRACE_ENTRY, 0x88A001E, 0}, Step{KOR_TRACE_VAR, 0x88A001E, 0},
+                                         Step{KOR_TRACE_VAR, 0x88A001E, 100}, Step{KOR_TRACE_EXIT, 0x88A001E, 0}));
+  EXPECT_THAT(trace.dump(0x88A001F, 0).items, ElementsAre(bytesOf(uint32_t{2})));
+  EXPECT_THAT(trace.dump(0x88A001F, 100).items, ElementsAre(bytesOf(uint32_t{1})));
+  EXPECT_THAT(trace.dump(0x88A001E, 0).items, ElementsAre(bytesOf(pOut), bytesOf(uint32_t{1})));
+  EXPECT_THAT(trace.dump(0x88A001E, 100).items, ElementsAre(bytesOf(out), bytesOf(uint32_t{0})));
 }
 
 } // namespace

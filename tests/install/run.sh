@@ -22,6 +22,28 @@ if [[ -e $prefix/include/tav && -z $(find "$prefix/include" -name '*.h') ]]; the
   exit 1
 fi
 
+if grep -q '^TAV_HARDEN:BOOL=ON' "$build/CMakeCache.txt"; then
+  echo "== hardened"
+  optimized=()
+  if grep -q '^CMAKE_BUILD_TYPE:STRING=Debug' "$build/CMakeCache.txt"; then optimized=(--not-optimized); fi
+  mapfile -t binaries < <(find "$prefix" -type f \( -name '*.so.*' -o -path '*/bin/tav' \))
+  if ((${#binaries[@]} > 0)); then "$here/hardening.py" "${optimized[@]}" "${binaries[@]}"; fi
+fi
+
+if [[ -x $prefix/bin/tav ]]; then
+  echo "== pages that help texts name"
+  mapfile -t pages < <({
+    LD_LIBRARY_PATH=$(dirname "$(find "$prefix" -name 'libtav.*' | head -n 1)")
+    export LD_LIBRARY_PATH
+    "$prefix/bin/tav" help --man | sed 's/\\-/-/g'
+    for command in $("$prefix/bin/tav" help | awk '/^  [a-z]/ { print $1 }'); do "$prefix/bin/tav" "$command" --help; done
+  } | grep -oE '[[:alnum:]/._-]+\.md' | sort -u)
+  ((${#pages[@]} > 0)) || { echo "the help texts name no page"; exit 1; }
+  for page in "${pages[@]}"; do
+    [[ -s $prefix/$page ]] || { echo "the help texts name $page, which is not installed"; exit 1; }
+  done
+fi
+
 echo "== CMake package"
 cmake -S "$here/outside" -B "$work/outside" -DCMAKE_PREFIX_PATH="$prefix" -DCMAKE_CXX_COMPILER="$compiler" \
   -DCMAKE_FIND_USE_PACKAGE_REGISTRY=OFF >"$work/configure.log"
@@ -51,6 +73,7 @@ done
 if ((${#mode[@]} == 0)); then
   echo "== shared libraries find each other"
   unset LD_LIBRARY_PATH
+  if [[ -x $prefix/bin/tav ]]; then LD_LIBRARY_PATH=$(pkg-config --variable=libdir tav) "$prefix/bin/tav" --version; fi
   readelf -d "$work/main" | grep -q 'NEEDED.*libtav\.so\.1' || { echo "the program does not ask for libtav.so.1"; exit 1; }
 fi
 echo "the installed package works"

@@ -9,11 +9,13 @@
 #include <filesystem>
 #include <functional>
 #include <gtest/gtest.h>
+#include <new>
 #include <string>
 #include <sys/mman.h>
 #include <sys/resource.h>
 #include <sys/stat.h>
 #include <sys/time.h>
+#include <unistd.h>
 #include <vector>
 
 namespace
@@ -293,7 +295,16 @@ TEST(FilePosix, AReadOfMoreThanTwoGiBEndsWithTheFile)
   EXPECT_EQ(readFile(file, buffer.data(), LargeBuffer::kSize), (Transfer{TAV_RC_END_OF_STORAGE, 5000}));
 }
 
-std::atomic<int> alarms{0};
+/// How often this process was interrupted; a child sees it, too.
+std::atomic<int>& alarms()
+{
+  static auto* const shared = [] {
+    void* const page =
+        ::mmap(nullptr, sizeof(std::atomic<int>), PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0);
+    return page == MAP_FAILED ? throw std::bad_alloc() : new (page) std::atomic<int>(0);
+  }();
+  return *shared;
+}
 
 /// Interrupts the system calls of this process every millisecond for as long as it lives.
 class Interruptions
@@ -301,9 +312,8 @@ class Interruptions
 public:
   Interruptions()
   {
-    alarms = 0;
     struct sigaction action = {};
-    action.sa_handler = [](int) { alarms.fetch_add(1); };
+    action.sa_handler = [](int) { alarms().fetch_add(1); };
     ::sigaction(SIGALRM, &action, &before_); // without SA_RESTART
     setTimer(1000);
   }
@@ -330,7 +340,11 @@ class InterruptedFifo : public testing::Test
 protected:
   static constexpr std::size_t kLength = 400000; ///< several times what a pipe holds
 
-  void SetUp() override { ASSERT_EQ(::mkfifo(path_.c_str(), 0600), 0); }
+  void SetUp() override
+  {
+    alarms() = 0; // before a child sees it
+    ASSERT_EQ(::mkfifo(path_.c_str(), 0600), 0);
+  }
 
   static std::string pattern()
   {
@@ -347,7 +361,7 @@ protected:
 TEST_F(InterruptedFifo, IsReadWhole)
 {
   Child writer([this] {
-    usleep(20000);
+    while (alarms().load() < 5) usleep(1000); // until the open has waited, however busy the machine is
     KORHFile file;
     if (openFile(file, path_, KOR_FILE_WRITE) != TAV_RC_OK) return UINT32_MAX;
     const std::string bytes = pattern();
@@ -360,12 +374,12 @@ TEST_F(InterruptedFifo, IsReadWhole)
   });
   const Interruptions interruptions;
   ASSERT_EQ(openFile(file_, path_, KOR_FILE_READ), TAV_RC_OK);
-  EXPECT_GT(alarms.load(), 0) << "the open was not interrupted";
-  const int alarmsBefore = alarms.load();
+  EXPECT_GT(alarms().load(), 0) << "the open was not interrupted";
+  const int alarmsBefore = alarms().load();
   std::string bytes(kLength, '\0');
   EXPECT_EQ(readFile(file_, bytes.data(), kLength), (Transfer{TAV_RC_OK, kLength}));
   EXPECT_TRUE(bytes == pattern());
-  EXPECT_GT(alarms.load(), alarmsBefore) << "the read was not interrupted";
+  EXPECT_GT(alarms().load(), alarmsBefore) << "the read was not interrupted";
   file_.close(); // lets a writer go that has bytes left
   EXPECT_EQ(writer.result(), TAV_RC_OK);
 }
@@ -388,7 +402,7 @@ TEST_F(InterruptedFifo, IsWrittenWhole)
   {
     const Interruptions interruptions;
     EXPECT_EQ(writeFile(file_, bytes), (Transfer{TAV_RC_OK, kLength}));
-    EXPECT_GT(alarms.load(), 0) << "the write was not interrupted";
+    EXPECT_GT(alarms().load(), 0) << "the write was not interrupted";
   }
   file_.close(); // lets a reader go that waits for more
   EXPECT_EQ(reader.result(), TAV_RC_OK);
@@ -444,4 +458,57 @@ TEST(FilePosix, ADeviceTellsItsSizeByItsEnd)
   EXPECT_EQ(file.getSize(&size), TAV_RC_OK);
   EXPECT_EQ(size, 0u);
 }
+/// Mode, owner and group of a file.
+struct Rights
+{
+  mode_t mode;
+  uid_t owner;
+  gid_t group;
+  bool operator==(const Rights&) const = default;
+};
+
+Rights rightsOf(const std::string& path)
+{
+  struct stat status = {};
+  ::stat(path.c_str(), &status);
+  return {static_cast<mode_t>(status.st_mode & 07777U), status.st_uid, status.st_gid};
+}
+
+TEST(FileRights, AreTakenFromAnotherFile)
+{
+  const TestFolder folder;
+  touch(folder / "old", 0640);
+  const bool mayGive = ::geteuid() == 0 && ::chown((folder / "old").c_str(), 12, 34) == 0;
+  ::chmod((folder / "old").c_str(), 04751);
+  KORHFile from;
+  KORHFile to;
+  ASSERT_EQ(openFile(from, folder / "old", KOR_FILE_READ), TAV_RC_OK);
+  ASSERT_EQ(openFile(to, folder / "new", KOR_FILE_UPDATE | KOR_FILE_CREATE, 0600), TAV_RC_OK);
+  EXPECT_EQ(rightsOf(folder / "new").mode, 0600U);
+  EXPECT_EQ(to.copyRights(from), TAV_RC_OK);
+  EXPECT_EQ(rightsOf(folder / "new"), rightsOf(folder / "old"));
+  EXPECT_EQ(rightsOf(folder / "new").owner, mayGive ? 12U : ::geteuid());
+}
+
+TEST(FileRights, WithoutTheOwnerDoNotLetAProgramRunAsHim)
+{
+  if (::geteuid() != 0) GTEST_SKIP() << "only root has files of others";
+  const TestFolder folder;
+  touch(folder / "old");
+  ASSERT_EQ(::chown((folder / "old").c_str(), 12, 34), 0);
+  ::chmod((folder / "old").c_str(), 06755);
+  ::chmod(folder.path().c_str(), 0777);
+  KORHFile from;
+  KORHFile to;
+  ASSERT_EQ(openFile(from, folder / "old", KOR_FILE_READ), TAV_RC_OK);
+  ASSERT_EQ(::seteuid(65534), 0);
+  const uint32_t opened = openFile(to, folder / "new", KOR_FILE_UPDATE | KOR_FILE_CREATE, 0600);
+  const uint32_t copied = to.copyRights(from);
+  ASSERT_EQ(::seteuid(0), 0);
+  EXPECT_EQ(opened, TAV_RC_OK);
+  EXPECT_EQ(copied, TAV_RC_OK);
+  EXPECT_EQ(rightsOf(folder / "new").mode, 0755U);
+  EXPECT_EQ(rightsOf(folder / "new").owner, 65534U);
+}
+
 } // namespace

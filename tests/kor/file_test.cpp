@@ -429,4 +429,58 @@ TEST(FileParameters, CarryTheVersionWord)
   EXPECT_EQ(KORFileSeekParam().version, 0x09070000u);
   EXPECT_EQ(KORFileLockParam().version, 0x09070000u);
 }
+TEST_F(File, IsCutAndFilledUpToASizeAndKeepsItsPosition)
+{
+  KORHFile file;
+  ASSERT_EQ(openFile(file, given("a", "content"), KOR_FILE_UPDATE), TAV_RC_OK);
+  ASSERT_EQ(seekFile(file, 3), TAV_RC_OK);
+  EXPECT_EQ(file.setSize(5), TAV_RC_OK);
+  EXPECT_EQ(readText(file, 9), "te");
+  EXPECT_EQ(file.setSize(7), TAV_RC_OK);
+  EXPECT_EQ(readText(file, 9), std::string(2, '\0'));
+  EXPECT_EQ(file.setSize(uint64_t{1} << 63U), TAV_RC_BAD_PARAM);
+  EXPECT_EQ(file.sync(), TAV_RC_OK);
+}
+
+TEST_F(File, IsAtItsPathUntilAnotherTakesThat)
+{
+  KORHFile file;
+  const std::string name = given("a", "old");
+  ASSERT_EQ(openFile(file, name, KOR_FILE_UPDATE), TAV_RC_OK);
+  EXPECT_TRUE(file.isAt(name.c_str()));
+  EXPECT_FALSE(file.isAt(given("b", "old").c_str()));
+  EXPECT_FALSE(file.isAt(path("missing").c_str()));
+  EXPECT_FALSE(file.isAt(nullptr));
+  EXPECT_EQ(file.replaceBy(path("b").c_str(), name.c_str()), TAV_RC_OK);
+  EXPECT_FALSE(file.isAt(name.c_str())) << "it is closed";
+  EXPECT_FALSE(std::filesystem::exists(path("b")));
+}
+
+TEST_F(File, IsReplacedByAnother)
+{
+  const std::string old = given("a", "old");
+  const std::string fresh = given("b", "new");
+  KORHFile file;
+  ASSERT_EQ(openFile(file, old, KOR_FILE_UPDATE), TAV_RC_OK);
+  EXPECT_EQ(file.replaceBy(path("missing").c_str(), old.c_str()), KOR_RC_NO_SUCH_FILE);
+  EXPECT_EQ(file.replaceBy(nullptr, old.c_str()), TAV_RC_BAD_PARAM);
+  EXPECT_EQ(file.replaceBy(fresh.c_str(), nullptr), TAV_RC_BAD_PARAM);
+  EXPECT_EQ(file.replaceBy(fresh.c_str(), old.c_str()), TAV_RC_OK);
+  KORHFile again;
+  ASSERT_EQ(openFile(again, old, KOR_FILE_READ), TAV_RC_OK);
+  EXPECT_EQ(readText(again, 9), "new");
+}
+
+TEST_F(File, ThatIsNotOpenHasNoSizeToSetAndNoRights)
+{
+  KORHFile closed;
+  KORHFile open;
+  ASSERT_EQ(openFile(open, path("a"), kNewFile), TAV_RC_OK);
+  EXPECT_EQ(closed.setSize(0), KOR_RC_NOT_OPEN);
+  EXPECT_EQ(closed.sync(), KOR_RC_NOT_OPEN);
+  EXPECT_EQ(closed.copyRights(open), KOR_RC_NOT_OPEN);
+  EXPECT_EQ(open.copyRights(closed), KOR_RC_NOT_OPEN);
+  EXPECT_FALSE(closed.isAt(path("a").c_str()));
+}
+
 } // namespace

@@ -46,7 +46,7 @@ TEST(TraceStart, SwitchesTheControlBlockOn)
   ASSERT_EQ(korTraceStart(count, &records), TAV_RC_OK);
   ASSERT_NE(g_pWTCB, nullptr);
   EXPECT_NE(g_pWTCB->enable, 0u);
-  EXPECT_TRUE(tav::tracing());
+  EXPECT_TRUE(tav::inside::tracing());
   korTraceStop();
 }
 
@@ -83,7 +83,7 @@ TEST(TraceStop, SwitchesTheControlBlockOff)
   EXPECT_EQ(korTraceStop(), TAV_RC_OK);
   ASSERT_NE(g_pWTCB, nullptr);
   EXPECT_EQ(g_pWTCB->enable, 0u);
-  EXPECT_FALSE(tav::tracing());
+  EXPECT_FALSE(tav::inside::tracing());
 }
 
 TEST(TraceStop, IsRefusedWhenNoTraceRuns)
@@ -207,7 +207,7 @@ TEST(TraceFrame, TellsItsCallFromEntryToExit)
 {
   TraceLog recorder;
   {
-    tav::TraceFrame frame(kProbe);
+    tav::inside::TraceFrame frame(kProbe);
     EXPECT_FALSE(frame.require(10, false, TAV_RC_BAD_PARAM));
   }
   std::vector<KORTraceKind> kinds;
@@ -320,7 +320,7 @@ TEST(TraceStop, DoesNotWaitForCallsOfALaterTrace)
   std::thread tracedFirst([] { _wtraceEntry(kThread, kProbe, 0, 0); });
   first.entered.get_future().wait();
   std::future<uint32_t> stopped = std::async(std::launch::async, korTraceStop);
-  while (tav::tracing()) std::this_thread::yield();
+  while (tav::inside::tracing()) std::this_thread::yield();
 
   ASSERT_EQ(korTraceStart(waitAtGate, &second), TAV_RC_OK);
   std::thread tracedSecond([] { _wtraceEntry(kThread, kProbe, 0, 0); });
@@ -397,7 +397,7 @@ TEST(Trace, StartsAndStopsWhileOtherThreadsTrace)
     threads.emplace_back([&done, &calls] {
       while (!done.load())
       {
-        tav::TraceFrame frame(kProbe);
+        tav::inside::TraceFrame frame(kProbe);
         frame.dump(0, uint64_t{7});
         frame.report(10, TAV_RC_NOT_FOUND);
         calls.fetch_add(1);

@@ -20,7 +20,7 @@ LONG_NUMBER = re.compile(rb"(?<![0-9A-F])[0-9A-F]{32}(?![0-9A-F])")
 
 
 def run(command, cwd):
-    done = subprocess.run(command, cwd=cwd, capture_output=True, timeout=120)
+    done = subprocess.run(command, cwd=cwd, capture_output=True, timeout=1200)
     return done.returncode, done.stdout, done.stderr
 
 

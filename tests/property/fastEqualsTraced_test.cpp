@@ -190,7 +190,7 @@ private:
   void readNode(TAVHeaderData& out)
   {
     const uint64_t offset = random_.oneIn(2) ? out.header.nodeOffset : random_.below(size_ + 20);
-    const bool wide = random_.oneIn(2) ? tav::is64(out.header) : random_.oneIn(2);
+    const bool wide = random_.oneIn(2) ? tav::layout::is64(out.header) : random_.oneIn(2);
     keep(twins_.take(
              "tavReadNodeInt", out,
              [&](TAVHandle* handle, TAVHeaderData& node) { return tavReadNodeInt(0, handle, offset, wide, &node); }),
@@ -212,7 +212,7 @@ private:
     TAVHeader resume = pick();
     const bool fresh = random_.oneIn(2);
     const bool own = random_.oneIn(2);
-    const uint32_t elm = tav::elmOf(pick());
+    const uint32_t elm = tav::layout::elmOf(pick());
     const auto deepest = static_cast<uint32_t>(random_.below(3));
     uint32_t counts[2] = {};
     keep(twins_.take("tavFindElmInt", out,
@@ -307,7 +307,7 @@ Element pickNode(Random& random, bool wide, Bytes payload)
   if (random.oneIn(8))
   {
     return wide ? group64(elm, random.oneIn(3) ? TAV_TYPE_HEADER32 : TAV_TYPE_HEADER64, info, TAV_SIZE_UNKNOWN)
-                : group32(elm, 0);
+                : Element{header32(0, random.oneIn(4) ? TAV_TYPE_HEADER64 : TAV_TYPE_HEADER32, elm), {}};
   }
   return element(wide,
                  random.pick<uint16_t>({TAV_TYPE_BINARY, TAV_TYPE_UINT32, TAV_TYPE_UINT64, TAV_TYPE_ASCII_STRING}), elm,
@@ -317,7 +317,7 @@ Element pickNode(Random& random, bool wide, Bytes payload)
 void addNode(Twins& twins, Random& random, bool usual)
 {
   const TAVHdrStack& stack = *twins.fast()->pHdrStack;
-  const bool wide = stack.count == 0 || tav::typeOf(stack.pEntries[stack.count - 1]) == TAV_TYPE_HEADER64;
+  const bool wide = stack.count == 0 || tav::layout::typeOf(stack.pEntries[stack.count - 1]) == TAV_TYPE_HEADER64;
   constexpr uint64_t longest = 300;
   Bytes payload(random.oneIn(4) ? random.below(longest) : random.pick<uint64_t>({1, 4, 8, 16, 24, 33}));
   for (uint8_t& byte : payload) byte = static_cast<uint8_t>(random.next());
@@ -328,10 +328,10 @@ void addNode(Twins& twins, Random& random, bool usual)
   {
     const uint64_t there = node.payload.size();
     disturb(data.header, random);
-    data.dataBufSize = tav::sizeOf(data.header) <= there && random.oneIn(2) ? 0 : there;
+    data.dataBufSize = tav::layout::sizeOf(data.header) <= there && random.oneIn(2) ? 0 : there;
     if (random.oneIn(6)) data.pDataBuf = nullptr;
     // Without a length the header's size is believed.
-    if (data.dataBufSize == 0 && tav::sizeOf(data.header) > there) return;
+    if (data.dataBufSize == 0 && tav::layout::sizeOf(data.header) > there) return;
   }
   const uint64_t options = random.oneIn(50) ? 1 : 0;
   twins.take("tavAddElement", data,

@@ -18,7 +18,7 @@ def instructions():
         out = pathlib.Path(folder) / "cost"
         done = subprocess.run(
             [VALGRIND, "--tool=callgrind", f"--callgrind-out-file={out}", "--zero-before=tavMeasured",
-             "--dump-after=tavMeasured", PROGRAM, str(NODES)], capture_output=True, text=True, timeout=240, check=False)
+             "--dump-after=tavMeasured", PROGRAM, str(NODES)], capture_output=True, text=True, timeout=1200, check=False)
         if done.returncode != 0:
             raise AssertionError(done.stdout + done.stderr)
         names = [line.split() for line in done.stdout.splitlines()]

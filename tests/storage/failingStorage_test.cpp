@@ -73,14 +73,14 @@ private:
     return tavAddStream(0, handle_, TAV_HDR_64, bytes.data(), bytes.size());
   }
 
-  /// The groups neither have pairs nor unknown sizes: such a group gets its end element even when its size could not
-  /// be written, and the element's code is the answer of the close.
+  /// No group is opened with an unknown size: it would get its end element even when its size could not be written, and
+  /// the element's code would be the answer of the close.
   uint32_t nodes()
   {
     const std::vector<std::function<uint32_t()>> steps{
-        [&] { return add(group64(1, TAV_TYPE_HEADER64, 0, 0)); },
+        [&] { return add(group64(1, TAV_TYPE_HEADER64, TAV_INFO_EYE_SIZE, 0)); },
         [&] { return add(u32(5, 7, true, TAV_INFO_EYE_SIZE)); },
-        [&] { return add(group64(2, TAV_TYPE_HEADER32, 0, 0)); },
+        [&] { return add(group64(2, TAV_TYPE_HEADER32, TAV_INFO_EYE_SIZE, 0)); },
         [&] { return add(u32(6, 8, false)); },
         [&] { return add(binary(7, pattern(3, 200), false)); },
         [&] { return add(binary(8, pattern(4, 30), false)); },

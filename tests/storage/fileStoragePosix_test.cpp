@@ -65,6 +65,37 @@ TEST_F(FileStorage, WritesUpToTheSizeThatIsAllowed)
   EXPECT_EQ(contentOf(path), pattern(0, 8192));
 }
 
+TEST_F(FileStorage, HasNoSizeWhereTheSystemMakesUpTheBytes)
+{
+  OpenFile file("/proc/self/status", KOR_FILE_READ);
+  ASSERT_EQ(file.rc, TAV_RC_OK);
+  uint64_t size = 99;
+  EXPECT_EQ(file->getTotalSize(&size), TAV_RC_OK);
+  EXPECT_EQ(size, 0U);
+  EXPECT_EQ(read(file, 5).bytes.size(), 5U);
+}
+
+TEST_F(FileStorage, OverAPipeHasNoSizeAndCannotSeek)
+{
+  std::array<int, 2> ends{};
+  ASSERT_EQ(pipe(ends.data()), 0);
+  OpenFile file("/dev/fd/" + std::to_string(ends[0]), KOR_FILE_READ);
+  ASSERT_EQ(file.rc, TAV_RC_OK);
+  uint64_t size = 99;
+  EXPECT_EQ(file->getTotalSize(&size), KOR_RC_NOT_SEEKABLE);
+  EXPECT_EQ(file->seek(0, 1), KOR_RC_NOT_SEEKABLE);
+  ::close(ends[0]);
+  ::close(ends[1]);
+}
+
+TEST_F(FileStorage, SharesTheFilesPositionWithAChild)
+{
+  OpenFile file(fileOf(64), KOR_FILE_READ);
+  ASSERT_EQ(read(file, 4), (Got{TAV_RC_OK, pattern(0, 4)}));
+  ASSERT_EQ(inChild([&] { return read(file, 4).code; }), TAV_RC_OK);
+  EXPECT_EQ(read(file, 4), (Got{TAV_RC_OK, pattern(8, 4)})) << "what the child read is missing";
+}
+
 TEST_F(FileStorage, IsRefusedWhileAnotherProcessHoldsTheLock)
 {
   const std::string path = fileOf(10);

@@ -133,4 +133,28 @@ TEST_F(FileStorage, OpenedForWritingAloneRefusesSmallWrites)
   EXPECT_EQ(tavAddElement(0, handle.get(), &data), TAV_RC_BAD_PARAM);
 }
 
+TEST_F(FileStorage, KeepsTheBytesOfALongerFileBehindANewStream)
+{
+  const std::string path = fileOf(2000);
+  uint64_t written = 0;
+  {
+    OpenFile file(path, KOR_FILE_UPDATE);
+    file->ioUnit = 64;
+    TAVInitParam param(&*file, TAV_OPT_WRITE, 640, 0, 0, 0);
+    TAVHandle* handle = nullptr;
+    ASSERT_EQ(tavInitHandle(&handle, &param), TAV_RC_OK);
+    TAVHeaderData root{};
+    root.header.hdrType = TAV_HDR_64;
+    root.header.hdr64 = {0, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM};
+    ASSERT_EQ(tavAddElement(0, handle, &root), TAV_RC_OK);
+    ASSERT_EQ(tavCloseHeader(0, handle), TAV_RC_OK);
+    written = handle->streamBytes;
+    ASSERT_EQ(tavTermHandle(&handle), TAV_RC_OK);
+  }
+  const std::vector<uint8_t> content = contentOf(path);
+  ASSERT_EQ(content.size(), 2000U);
+  EXPECT_EQ(std::vector<uint8_t>(content.begin() + static_cast<ptrdiff_t>(written), content.end()),
+            pattern(written, 2000 - written));
+}
+
 } // namespace

@@ -149,12 +149,55 @@ TEST_F(FileStorage, SeeksAnywhereAlsoBehindTheEnd)
   EXPECT_THAT(trace.dump(tav::probe::ssFileGetPosition, 100).items, ElementsAre(bytesOf(uint64_t{1000})));
 }
 
+TEST_F(FileStorage, TracesWhatItOpenedAndWhereASeekLanded)
+{
+  const std::string path = fileOf(10);
+  TraceLog trace;
+  OpenFile file(path, KOR_FILE_READ);
+  ASSERT_EQ(file->seek(4, 1), TAV_RC_OK);
+  EXPECT_THAT(trace.dump(tav::probe::ssFile, 100).items,
+              ElementsAre(bytesOf(file->pFile), bytesOf(file->attributes), bytesOf(file->ioUnit)));
+  EXPECT_THAT(trace.dump(tav::probe::ssFileSeek, 100).items, ElementsAre(bytesOf(uint64_t{4})));
+}
+
+TEST_F(FileStorage, TracesNoResultOfAnOpeningThatFailed)
+{
+  TraceLog trace;
+  OpenFile file(folder_ / "missing", KOR_FILE_READ);
+  EXPECT_NE(file.rc, TAV_RC_OK);
+  EXPECT_THAT(trace.dump(tav::probe::ssFile, 100).items, IsEmpty());
+}
+
+TEST_F(FileStorage, PassesOnWhyThereIsNoSize)
+{
+  OpenFile file(fileOf(10), KOR_FILE_READ);
+  ASSERT_EQ(file->pFile->close(), TAV_RC_OK);
+  uint64_t size = 5;
+  TraceLog trace;
+  EXPECT_EQ(file->getTotalSize(&size), KOR_RC_NOT_OPEN);
+  EXPECT_EQ(size, 5U);
+  EXPECT_THAT(trace.failures(), ElementsAre(at(tav::probe::ssFileGetTotalSize, 30, KOR_RC_NOT_OPEN)));
+}
+
+TEST_F(FileStorage, PassesOnWhyNothingCanBeReadBackward)
+{
+  OpenFile file(fileOf(10), KOR_FILE_WRITE);
+  file->attributes |= TAV_ATTR_READ_BACKWARD; // which the file was not opened for
+  ASSERT_EQ(file->seek(10, 1), TAV_RC_OK);
+  TraceLog trace;
+  const Got got = read(file, 4, 64, true);
+  EXPECT_NE(got.code, TAV_RC_OK);
+  EXPECT_THAT(got.bytes, IsEmpty());
+  EXPECT_THAT(trace.failures(), ElementsAre(at(tav::probe::ssFileRead, 50, got.code)));
+}
+
 TEST_F(FileStorage, KeepsItsCursorWhenASeekFails)
 {
   OpenFile file(fileOf(10), KOR_FILE_READ);
   ASSERT_EQ(file->seek(4, 1), TAV_RC_OK);
   TraceLog trace;
   EXPECT_EQ(file->seek(~uint64_t{0}, 1), TAV_RC_BAD_PARAM);
+  EXPECT_THAT(trace.dump(tav::probe::ssFileSeek, 100).items, IsEmpty());
   EXPECT_EQ(file->position, 4U);
   EXPECT_THAT(trace.failures(), ElementsAre(at(tav::probe::ssFileSeek, 20, TAV_RC_BAD_PARAM)));
   EXPECT_EQ(read(file, 2), (Got{TAV_RC_OK, pattern(4, 2)}));

@@ -396,10 +396,31 @@ TEST(MemoryStorageTrace, ShowsItsLife)
   }
   EXPECT_THAT(trace.steps(), ElementsAre(Step{KOR_TRACE_ENTRY, 0x88A0044, 0}, Step{KOR_TRACE_VAR, 0x88A0044, 0},
                                          Step{KOR_TRACE_EXIT, 0x88A0044, 0}, Step{KOR_TRACE_ENTRY, 0x88A0053, 0},
-                                         Step{KOR_TRACE_VAR, 0x88A0053, 0}, Step{KOR_TRACE_EXIT, 0x88A0053, 0},
-                                         Step{KOR_TRACE_ENTRY, 0x88A0054, 0}, Step{KOR_TRACE_EXIT, 0x88A0054, 0},
-                                         Step{KOR_TRACE_ENTRY, 0x88A0045, 0}, Step{KOR_TRACE_EXIT, 0x88A0045, 0}));
+                                         Step{KOR_TRACE_VAR, 0x88A0053, 0}, Step{KOR_TRACE_VAR, 0x88A0053, 100},
+                                         Step{KOR_TRACE_EXIT, 0x88A0053, 0}, Step{KOR_TRACE_ENTRY, 0x88A0054, 0},
+                                         Step{KOR_TRACE_EXIT, 0x88A0054, 0}, Step{KOR_TRACE_ENTRY, 0x88A0045, 0},
+                                         Step{KOR_TRACE_EXIT, 0x88A0045, 0}));
   EXPECT_THAT(trace.failures(), IsEmpty());
+  EXPECT_THAT(trace.dump(0x88A0053, 100).items, ElementsAre(bytesOf(block.data()), bytesOf(uint64_t{4})));
+}
+
+TEST(MemoryStorageTrace, ShowsTheBlockThatItAllocated)
+{
+  TraceLog trace;
+  uint32_t rc = 1;
+  const TAVSSMemory storage(8, &rc);
+  EXPECT_THAT(trace.dump(0x88A0053, 100).items, ElementsAre(bytesOf(storage.pBuffer), bytesOf(uint64_t{8})));
+}
+
+TEST(MemoryStorageTrace, ShowsWhereASeekLanded)
+{
+  std::array<uint8_t, 4> block{};
+  TAVSSMemory storage(block.data(), block.size());
+  TraceLog trace;
+  EXPECT_EQ(storage.seek(4, 0), TAV_RC_BAD_PARAM);
+  EXPECT_THAT(trace.dump(probe::ssMemorySeek, 100).items, IsEmpty());
+  EXPECT_EQ(storage.seek(3, 0), TAV_RC_OK);
+  EXPECT_THAT(trace.dump(probe::ssMemorySeek, 100).items, ElementsAre(bytesOf(uint64_t{3})));
 }
 
 TEST(MemoryStorageTrace, ShowsAnAllocationThatFailed)

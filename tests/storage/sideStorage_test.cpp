@@ -129,8 +129,13 @@ TEST(SideStorageTrace, ShowsItsAccessors)
   TraceLog trace;
   storage.getStatus();
   storage.hasAttributes(0xC0);
-  EXPECT_THAT(trace.steps(), ElementsAre(Step{KOR_TRACE_ENTRY, 0x88A0047, 0}, Step{KOR_TRACE_EXIT, 0x88A0047, 0},
-                                         Step{KOR_TRACE_ENTRY, 0x88A0050, 0}, Step{KOR_TRACE_EXIT, 0x88A0050, 0}));
+  EXPECT_THAT(trace.steps(), ElementsAre(Step{KOR_TRACE_ENTRY, 0x88A0047, 0}, Step{KOR_TRACE_VAR, 0x88A0047, 100},
+                                         Step{KOR_TRACE_EXIT, 0x88A0047, 0}, Step{KOR_TRACE_ENTRY, 0x88A0050, 0},
+                                         Step{KOR_TRACE_VAR, 0x88A0050, 0}, Step{KOR_TRACE_VAR, 0x88A0050, 100},
+                                         Step{KOR_TRACE_EXIT, 0x88A0050, 0}));
+  EXPECT_THAT(trace.dump(0x88A0047, 100).items, ElementsAre(bytesOf(uint32_t{0})));
+  EXPECT_THAT(trace.dump(0x88A0050, 0).items, ElementsAre(bytesOf(uint64_t{0xC0})));
+  EXPECT_THAT(trace.dump(0x88A0050, 100).items, ElementsAre(bytesOf(false)));
 }
 
 } // namespace

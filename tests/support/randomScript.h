@@ -245,7 +245,7 @@ private:
   [[nodiscard]] bool wide() const
   {
     const TAVHeader* const group = direct_->pHdrStack->top();
-    return group == nullptr ? !root32_ : tav::typeOf(*group) != TAV_TYPE_HEADER32;
+    return group == nullptr ? !root32_ : tav::layout::typeOf(*group) != TAV_TYPE_HEADER32;
   }
 
   void written(uint32_t direct, uint32_t buffered, const char* what)
@@ -351,7 +351,7 @@ private:
       {
         const Element node = u64(SQLM_ELM_NODE_NUMBER, random_.next(), wide());
         bytes.resize(bytes.size() + 16);
-        const uint64_t used = tav::encodeHeader(node.header, case_.swap, bytes.data() + bytes.size() - 16);
+        const uint64_t used = tav::layout::encodeHeader(node.header, case_.swap, bytes.data() + bytes.size() - 16);
         bytes.resize(bytes.size() - 16 + used);
         bytes.insert(bytes.end(), node.payload.begin(), node.payload.end());
       }
@@ -370,13 +370,13 @@ private:
     std::erase_if(nodes_, [end](const WrittenNode& node) { return node.header.nodeOffset >= end; });
   }
 
-  [[nodiscard]] bool inRing(const TAVHeader& header) const { return tav::sizeOf(header) <= case_.ringBytes(); }
+  [[nodiscard]] bool inRing(const TAVHeader& header) const { return tav::layout::sizeOf(header) <= case_.ringBytes(); }
 
   void update()
   {
     if (nodes_.empty()) return;
     WrittenNode& node = nodes_[random_.below(nodes_.size())];
-    const uint64_t size = tav::sizeOf(node.header);
+    const uint64_t size = tav::layout::sizeOf(node.header);
     if (!node.updatable || node.header.nodeOffset + 16 + size > direct_->streamBytes) return;
     Bytes payload = randomBytes(size);
     payload.reserve(1);
@@ -393,18 +393,19 @@ private:
     const TAVHeader& known = nodes_[random_.below(nodes_.size())].header;
     const bool arbitrary = random_.oneIn(4);
     const uint64_t offset = arbitrary ? random_.below(direct_->streamBytes + 20) : known.nodeOffset;
-    const bool wideHere = arbitrary ? random_.oneIn(2) : tav::is64(known);
+    const bool wideHere = arbitrary ? random_.oneIn(2) : tav::layout::is64(known);
     TAVHeaderData one{};
     TAVHeaderData other{};
     const uint32_t direct = tavReadNodeInt(0, direct_, offset, wideHere, &one);
     const uint32_t buffered = tavReadNodeInt(0, buffered_, offset, wideHere, &other);
-    const uint64_t end = offset + tav::headerLength(one.header.hdrType);
-    const bool inside = direct == TAV_RC_OK && end + 8 <= direct_->streamBytes &&
-                        (tav::isGroup(one.header) || tav::sizeOf(one.header) + 8 <= direct_->streamBytes - end);
+    const uint64_t end = offset + tav::layout::headerLength(one.header.hdrType);
+    const bool inside =
+        direct == TAV_RC_OK && end + 8 <= direct_->streamBytes &&
+        (tav::layout::isGroup(one.header) || tav::layout::sizeOf(one.header) + 8 <= direct_->streamBytes - end);
     if (!inside || (!wideHere && one.header.hdr32.type == TAV_TYPE_HEADER64)) return;
     same(std::memcmp(&one.header, &other.header, sizeof one.header) == 0, "header read back at ", offset);
-    if (tav::isGroup(one.header)) return;
-    const uint64_t size = tav::sizeOf(one.header);
+    if (tav::layout::isGroup(one.header)) return;
+    const uint64_t size = tav::layout::sizeOf(one.header);
     same(buffered == (inRing(one.header) ? TAV_RC_OK : TAV_RC_DATA_TOO_LARGE), "read back: ", nameOf(buffered));
     same(buffered != TAV_RC_OK || std::memcmp(one.pDataBuf, other.pDataBuf, size) == 0, "data read back at ", offset);
   }

@@ -45,6 +45,10 @@ struct Step
 };
 std::ostream& operator<<(std::ostream& out, const Step& step);
 
+/// Sends every record of the program to `sink` as well, those between the logs and those that a log takes, until it is
+/// called with null. A test that starts a trace by itself has to stop this one before.
+void traceAllTo(KORTraceSink sink);
+
 class TraceLog
 {
 public:

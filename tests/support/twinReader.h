@@ -39,7 +39,7 @@ public:
     for (uint64_t i = 0; i < 6 && !nodes.empty(); ++i)
     {
       const TAVHeader& header = nodes[random_.below(nodes.size())].header;
-      readNode(header.nodeOffset, tav::is64(header));
+      readNode(header.nodeOffset, tav::layout::is64(header));
       stepBack(header);
     }
     for (uint64_t i = 0; i < 4; ++i)
@@ -100,13 +100,14 @@ private:
   /// The code that a read through the ring gives where direct memory gave `code`.
   [[nodiscard]] uint32_t expectedRead(const TAVHeaderData& node, uint32_t code) const
   {
-    const bool data = !tav::isGroup(node.header);
-    const bool tooLarge = data && tav::sizeOf(node.header) > ringBytes_;
+    const uint64_t payload = node.header.nodeOffset + tav::layout::headerLength(node.header.hdrType);
+    const bool data = !tav::layout::isGroup(node.header);
+    const bool tooLarge = data && tav::layout::sizeOf(node.header) > ringBytes_;
     switch (code)
     {
     case TAV_RC_OK: return tooLarge ? TAV_RC_DATA_TOO_LARGE : TAV_RC_OK;
     case TAV_RC_DATA_TOO_LARGE: // none of it at all, or a part
-      return node.header.nodeOffset + tav::headerLength(node.header.hdrType) >= size_ ? TAV_RC_END_OF_STORAGE : code;
+      return payload >= size_ ? TAV_RC_END_OF_STORAGE : code;
     case TAV_RC_NO_MEMORY: return TAV_RC_END_OF_STORAGE;
     default: return code;
     }
@@ -118,14 +119,15 @@ private:
     same(std::memcmp(&one, &buffered.node.header, sizeof one) == 0, "headers at ", one.nodeOffset, " and ",
          buffered.node.header.nodeOffset);
     if (buffered.code != TAV_RC_OK) return;
-    if (tav::isGroup(one))
+    if (tav::layout::isGroup(one))
     {
       same(buffered.node.pDataBuf == nullptr && buffered.node.dataBufSize == 0, "a group with data");
       return;
     }
-    same(buffered.node.dataBufSize == tav::sizeOf(one) && buffered.node.pDataBuf != nullptr, "data of ",
+    same(buffered.node.dataBufSize == tav::layout::sizeOf(one) && buffered.node.pDataBuf != nullptr, "data of ",
          buffered.node.dataBufSize, " bytes at ", one.nodeOffset);
-    same(std::memcmp(direct.node.pDataBuf, buffered.node.pDataBuf, tav::sizeOf(one)) == 0, "data at ", one.nodeOffset);
+    same(std::memcmp(direct.node.pDataBuf, buffered.node.pDataBuf, tav::layout::sizeOf(one)) == 0, "data at ",
+         one.nodeOffset);
   }
 
   Answer readNode(uint64_t offset, bool wide)
@@ -193,10 +195,10 @@ private:
         continue;
       }
       const TAVHeader& node = answer.node.header;
-      if (!tav::is64(node) && node.hdr32.type == TAV_TYPE_HEADER64) return; // a group through the ring alone
+      if (!tav::layout::is64(node) && node.hdr32.type == TAV_TYPE_HEADER64) return; // a group through the ring alone
       visited_.push_back(node);
       previous = node;
-      first = tav::isGroup(node) && parents.size() < 100;
+      first = tav::layout::isGroup(node) && parents.size() < 100;
       if (first)
       {
         parents.push_back(node);
@@ -268,7 +270,7 @@ private:
   {
     if (visited_.empty()) return;
     TAVHeader parent = visited_[random_.below(visited_.size())];
-    const uint32_t elm = tav::elmOf(visited_[random_.below(visited_.size())]);
+    const uint32_t elm = tav::layout::elmOf(visited_[random_.below(visited_.size())]);
     const auto deepest = static_cast<uint32_t>(random_.below(3));
     const auto key = static_cast<uint16_t>(random_.oneIn(2) ? random_.below(4) : 0);
     compareCalls("tavFindElmInt", [&](TAVHandle* handle, TAVHeaderData& found) {
@@ -289,11 +291,11 @@ private:
   /// A path whose first entry is known to match: one that misses there does not come back.
   void searchPath()
   {
-    if (root_.hdrType == 0 || !tav::isGroup(root_)) return;
+    if (root_.hdrType == 0 || !tav::layout::isGroup(root_)) return;
     Answer answer;
     const uint32_t rc = tavGetNextChild(0, buffered_->get(), &root_, nullptr, &answer.node);
-    if (rc != TAV_RC_OK || !tav::isGroup(answer.node.header)) return;
-    const TAVPathEntry path[] = {{0, tav::elmOf(answer.node.header)},
+    if (rc != TAV_RC_OK || !tav::layout::isGroup(answer.node.header)) return;
+    const TAVPathEntry path[] = {{0, tav::layout::elmOf(answer.node.header)},
                                  {0, random_.pick<uint32_t>({SQLM_ELM_NODE, SQLM_ELM_DBASE})}};
     TAVFindLogicalGroupParam param{0, path, random_.oneIn(2) ? 1U : 2U, nullptr, 0};
     compareCalls("tavFindLogicalGroup", [&](TAVHandle* handle, TAVHeaderData& node) {

@@ -307,6 +307,12 @@ class Planter:
         made = encode(form, root)
         return form, made + bytes(rng.randrange(3)) + bytes([rng.randrange(1, 256)]) + rng.randbytes(rng.randrange(40)), len(made)
 
+    def plant_zeros_between(self, rng):
+        form, root = self.tree(rng)
+        made = encode(form, root)
+        zeros = bytes(16 + rng.randrange(9000))
+        return form, made + zeros + encode(form, random_group(rng, form, form.wide)), len(made)
+
     def plant_zeros_long(self, rng):
         form, root = self.tree(rng)
         made = encode(form, root)

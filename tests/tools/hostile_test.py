@@ -3,7 +3,6 @@ import os
 import random
 import resource
 import struct
-import time
 import unittest
 
 from support import EMULATOR, SANITIZED, ToolTest, bytes_of_hex, generate, tav, tav_in_little_memory, tree_rows
@@ -64,7 +63,7 @@ class Hostile(ToolTest):
             path.write_bytes(content)
             with self.subTest(case=case, options=options):
                 shown = tav("hex", path)
-                self.assertIn(shown.status, (0, 1), shown.err)
+                self.assertIn(shown.status, (0, 1, 3), shown.err)
                 self.assertEqual(bytes_of_hex(shown.out), content)
                 for command in ("info", "tree"):
                     result = tav(command, path)
@@ -112,10 +111,10 @@ class Hostile(ToolTest):
         for content in (group(OPEN) * 100_000, b"".join(group(16 * (99_999 - i)) for i in range(100_000))):
             path = self.file(content)
             for command in ("info", "tree"):
-                start = time.monotonic()
+                before = processor_time()
                 run = tav_in_little_memory(command, path)
                 self.assertEqual(run.status, 0, run.err[:200])
-                self.assertLess(time.monotonic() - start, 20)
+                self.assertLess(processor_time() - before, 20)
             self.assertIn("depth             100000", tav("info", path).out)
             self.assertIn("(99999)", tav("tree", path).out.splitlines()[-1])
 

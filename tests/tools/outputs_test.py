@@ -3,7 +3,7 @@ import os
 import subprocess
 import unittest
 
-from support import EMULATOR, TAV, WINDOWS, ToolTest, tav
+from support import EMULATOR, PATIENCE, TAV, WINDOWS, ToolTest, tav
 
 try:
     import resource
@@ -24,6 +24,17 @@ class Outputs(ToolTest):
         self.assertEqual((result.status, result.out), (2, ""), arguments)
         self.assertEqual({entry.name: entry.read_bytes() for entry in self.folder.iterdir() if entry.exists()}, before)
         return result.err
+
+    @unittest.skipIf(resource is None or EMULATOR, "limits are of this system")
+    def test_what_keeps_an_output_from_growing_is_told(self):
+        document = self.folder / "x.json"
+        document.write_text(tav("json", self.path).out, encoding="utf-8")
+        limit = lambda: resource.setrlimit(resource.RLIMIT_FSIZE, (16, 16))  # noqa: E731
+        for arguments in (["snapshot"], ["build", document], ["recover", self.path]):
+            with self.subTest(arguments[0]):
+                error = self.refused(*arguments, "-o", self.folder / "y.tav", preexec_fn=limit)
+                self.assertIn("KOR_RC_FILE_TOO_LARGE", error)
+                self.assertIn("the file would grow beyond the size that is allowed", error)
 
     def test_an_existing_file_becomes_a_trace_only_by_force(self):
         trace = self.folder / "trace"
@@ -58,7 +69,7 @@ class Outputs(ToolTest):
     def test_standard_input_that_comes_from_a_file_is_a_file_that_is_read(self):
         for arguments in (("tree", "-", "--trace", self.path), ("build", "-o", self.path)):
             with self.subTest(arguments=arguments), self.path.open("rb") as file:
-                done = subprocess.run([*TAV, *map(str, arguments), "--force"], stdin=file, capture_output=True, timeout=60)
+                done = subprocess.run([*TAV, *map(str, arguments), "--force"], stdin=file, capture_output=True, timeout=PATIENCE)
                 self.assertEqual((done.returncode, done.stdout), (2, b""))
                 self.assertIn(b"is a file that is read", done.stderr)
                 self.assertEqual(self.path.read_bytes(), self.content)
@@ -100,7 +111,7 @@ class Outputs(ToolTest):
     def test_a_limit_for_files_is_told_of_standard_output(self):
         for command in ("tree", "print"):
             with self.subTest(command), (self.folder / "out").open("wb") as out:
-                done = subprocess.run([*TAV, command, str(self.path)], stdout=out, stderr=subprocess.PIPE, timeout=60,
+                done = subprocess.run([*TAV, command, str(self.path)], stdout=out, stderr=subprocess.PIPE, timeout=PATIENCE,
                                       preexec_fn=lambda: resource.setrlimit(resource.RLIMIT_FSIZE, (100, 100)))
                 self.assertEqual(done.returncode, 2)
                 self.assertIn(b"KOR_RC_FILE_TOO_LARGE", done.stderr)

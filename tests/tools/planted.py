@@ -131,7 +131,8 @@ def text(rng, length):
     return bytes(rng.randrange(97, 123) for _ in range(length))
 
 
-def random_data(rng, form, wide, pairs=0.5, strings=0.5, kinds=None):
+def random_data(rng, form, wide, pairs=0.5, strings=0.5, kinds=None, empty=0):
+    """`empty`: how many of the texts and of the bytes have none."""
     kind = rng.choice(kinds or list(SIZES) + FREE * 2)
     extra = b""
     if kind in SIZES:
@@ -143,18 +144,19 @@ def random_data(rng, form, wide, pairs=0.5, strings=0.5, kinds=None):
         extra = b"~~" if rng.random() < strings else b""
     else:
         payload = text(rng, rng.randrange(24)) if kind == 50 else rng.randbytes(rng.randrange(40))
+        payload = b"" if empty and rng.random() < empty else payload
     info = EYE_SIZE if wide and rng.random() < pairs else 0
     return Node(rng.choice(NAMED), kind, payload, info=info, extra=extra)
 
 
-def random_group(rng, form, wide, depth=3, pairs=0.5, strings=0.5, nodes=6, mixed=0.25):
+def random_group(rng, form, wide, depth=3, pairs=0.5, strings=0.5, nodes=6, mixed=0.25, **data):
     inner = wide and rng.random() >= mixed
     children = []
     for _ in range(rng.randrange(2, nodes + 2)):
         if depth > 0 and rng.random() < 0.35:
-            children.append(random_group(rng, form, inner, depth - 1, pairs, strings, nodes, mixed))
+            children.append(random_group(rng, form, inner, depth - 1, pairs, strings, nodes, mixed, **data))
         else:
-            children.append(random_data(rng, form, inner, pairs, strings))
+            children.append(random_data(rng, form, inner, pairs, strings, **data))
     info = EYE_SIZE if wide and rng.random() < pairs else 0
     return Node(rng.choice(NAMED), 2 if inner else 1, children=children, info=info)
 

@@ -8,8 +8,9 @@ import random
 import tempfile
 import unittest
 
-from planted import (ALIGNED, ARRAY, BINARY, END, EYE, EYE_SIZE, FREE, HOST, NAMED, SIZES, Form, Node, encode, random_form,
-                     random_tree)
+from oracle import ELEMENTS
+from planted import ALIGNED, ARRAY, BINARY, END, EYE, EYE_SIZE, NAMED, Form, Node, encode, random_form, random_tree
+from recovering import identity, missing, read_back, recovered
 from support import ToolTest, generate, tav
 
 # Damages of each kind of stream, and the first of them: with 1 and 7, the eighth alone.
@@ -18,9 +19,7 @@ FIRST = int(os.environ.get("TAV_FIRST_DAMAGE", "0"))
 PROCESSES = min(2, os.cpu_count() or 1)
 KILOBYTE = 1024
 PAGE = 512
-KINDS = (1, 2, *SIZES, *FREE)
 FORMS = [Form(big, wide, align) for big in (False, True) for wide in (False, True) for align in (False, True)]
-ELEMENTS = {int(line.split()[0]) for line in tav("elements").out.splitlines() if line.split()[0].isdigit()}
 UNNAMED = next(elm for elm in range(30000, 60000) if elm not in ELEMENTS)
 
 
@@ -118,105 +117,6 @@ class Judge:
         if self.whole(end.offset, end.end) if end else self.whole(node.offset, node.payload_offset):
             for child in node.children:
                 self.visit(child, due)
-
-
-def identity(node):
-    return (node.elm, node.kind, None if node.is_group else bytes(node.payload))
-
-
-class Unsound(AssertionError):
-    """The saved stream cannot be read by its sizes."""
-
-
-def read_back(made, form):
-    """The nodes of a sound stream, by their sizes alone."""
-    def number(at, width):
-        return int.from_bytes(made[at:at + width], form.order)
-
-    def begins(at, end, wide, info):
-        """Whether a pair, a node or the end stands here, not two bytes farther on."""
-        if info & EYE_SIZE:
-            return number(at, 8) == EYE or int.from_bytes(made[at:at + 8], HOST) == EYE
-        if at == end or at + 2 == end:
-            return at == end
-        return likeness(at, wide) >= likeness(at + 2, wide)
-
-    def likeness(at, wide):
-        kind, elm = (number(at + 12, 2), number(at + 14, 2)) if wide else (number(at + 4, 2), number(at + 6, 2))
-        size = number(at, 8 if wide else 4)
-        if kind not in KINDS or size != SIZES.get(kind, size) or size > len(made) - at:
-            return 0
-        return 2 if elm in (*NAMED, END) else 1 if elm in ELEMENTS else 0
-
-    def nodes(at, end, wide):
-        """The nodes between two places. Where a string leaves open whether two bytes stand behind it and the likelier way
-        leads past the end, the other way is gone."""
-        found, others = [], []
-        while at < end:
-            try:
-                at, node, other = node_at(at, end, wide)
-                if other is not None:
-                    others.append((other, len(found) + len(node)))
-                found += node
-            except Unsound:
-                if not others:
-                    raise
-                at, count = others.pop()
-                del found[count:]
-        return found
-
-    def node_at(at, end, wide):
-        """Where the next node begins, the node with what is inside, and where else the next one could begin."""
-        size, kind, elm = (number(at, 8), number(at + 12, 2), number(at + 14, 2)) if wide else (
-            number(at, 4), number(at + 4, 2), number(at + 6, 2))
-        info = number(at + 8, 4) if wide else 0
-        start = at + (16 if wide else 8)
-        if start + size > end:
-            raise Unsound(f"the node at {at:#x} of the saved stream ends outside its parent")
-        if kind in (1, 2):
-            return start + size, [(elm, kind, None), *nodes(start, start + size, wide and kind == 2)], None
-        node = [(elm, kind, bytes(made[start:start + size]))] if elm != END else []
-        plain = start + size + (-size % 8 if form.align or info & ALIGNED else 0)
-        pair = 16 if info & EYE_SIZE else 0
-        if kind != 102:
-            return plain + pair, node, None
-        ways = [plain + pair, plain + 2 + pair]
-        likely = 0 if begins(plain, end, wide, info) else 1
-        return ways[likely], node, ways[1 - likely] if ways[1 - likely] <= end else None
-    return nodes(0, len(made), form.wide)
-
-
-def missing(due, back):
-    """Nodes that are due and did not come back, in their order."""
-    counts = {}
-    for node in back:
-        counts[node] = counts.get(node, 0) + 1
-    lacking = []
-    for node in due:
-        counts[identity(node)] = counts.get(identity(node), 0) - 1
-        if counts[identity(node)] < 0:
-            lacking.append(node)
-    return lacking
-
-
-def recovered(folder, made, form):
-    """What comes back: the report, and the bytes of the saved stream; none where nothing is whole. Raises AssertionError
-    where the account is wrong."""
-    check = unittest.TestCase()
-    source, target = folder / "damaged.tav", folder / "saved.tav"
-    source.write_bytes(made)
-    result = tav("recover", source, "-o", target, "--force", "--json", *form.options())
-    if result.status == 3:
-        return None, b""
-    check.assertEqual(result.err, "")
-    report = json.loads(result.out)
-    check.assertEqual(report["kept"] + report["lost"] + report["unread"], len(made))
-    check.assertEqual(sum(loss["length"] for loss in report["list"]), report["lost"])
-    repaired = sum(report[name] for name in ("lost", "unread", "groupsClosed", "groupsMade", "pairsMade"))
-    check.assertEqual(result.status, 1 if repaired else 0)
-    saved = target.read_bytes()
-    check.assertEqual(report["written"], len(saved))
-    return report, saved
 
 
 def damaged_stream(pairs, number):
@@ -450,6 +350,81 @@ class Strangers(ToolTest):
                 report, saved = recovered(self.folder, made, form)
                 self.assertEqual(missing(inside, read_back(saved, form)), [])
                 self.assertEqual(report["lost"], group.payload_offset - group.offset)
+
+
+class Report(ToolTest):
+    """What is told of a recovery is what was done."""
+
+    def tree(self, form):
+        info = EYE_SIZE if form.wide else 0
+        inside = [Node(NAMED[1], 57, bytes(range(8))), Node(NAMED[2], 55, b"abcd")]
+        group = Node(NAMED[3], 2 if form.wide else 1, children=inside, info=info)
+        return Node(NAMED[0], group.kind, children=[group, Node(NAMED[4], 55, b"last")])
+
+    def test_garbage_behind_a_sound_stream_closes_no_group(self):
+        for form in FORMS:
+            made = encode(form, self.tree(form))
+            with self.subTest(form=form.options()):
+                report, saved = recovered(self.folder, made + random.Random(1).randbytes(200), form)
+                self.assertEqual((report["groupsClosed"], report["lost"], saved), (0, 200, bytes(made)))
+
+    def test_a_root_whose_size_is_too_small_is_closed(self):
+        for form in FORMS:
+            root = self.tree(form)
+            root.add_size = -5
+            made = encode(form, root)
+            with self.subTest(form=form.options()):
+                report, saved = recovered(self.folder, made, form)
+                self.assertEqual((report["groupsClosed"], report["lost"], saved), (1, 0, encode(form, self.tree(form))))
+
+    def test_nodes_are_counted_alike_by_every_command_and_end_elements_apart(self):
+        for form in FORMS:
+            path = self.folder / "x.tav"
+            path.write_bytes(encode(form, self.tree(form)))
+            ends = 1 if form.wide else 0
+            with self.subTest(form=form.options()):
+                report, _ = recovered(self.folder, path.read_bytes(), form)
+                checked = json.loads(tav("check", path, "--json", *form.options()).out)
+                self.assertEqual([(found["nodes"], found["endElements"]) for found in (report, checked)], [(5, ends)] * 2)
+                text = tav("info", path, *form.options()).out
+                self.assertIn("nodes             5, of them 2 groups\n", text)
+                self.assertIn(f"end elements      {ends or 'none'}\n", text)
+                self.assertIn("no defects in 5 nodes" + (" and 1 end element\n" if ends else "\n"),
+                              tav("check", path, *form.options()).out)
+
+    def test_nodes_beside_damage_that_may_be_none_are_told(self):
+        for form in FORMS:
+            eyes = Node(NAMED[2], BINARY, EYE.to_bytes(8, form.order) * 3)
+            stranger, plain = Node(UNNAMED, 55, b"abcd"), Node(NAMED[5], 55, b"last")
+            far = Node(UNNAMED, 55, b"efgh")
+            hit, hit_too = Node(NAMED[4], 57, bytes(8)), Node(NAMED[4], 57, bytes(8))
+            children = [eyes, hit, plain, far, Node(NAMED[1], 57, bytes(range(8))), stranger, hit_too, Node(NAMED[6], 55, b"LAST")]
+            made = encode(form, Node(NAMED[0], 2 if form.wide else 1, children=children))
+            for node in (hit, hit_too):
+                made[node.offset:node.end] = b"\xff" * (node.end - node.offset)
+            with self.subTest(form=form.options()):
+                report, _ = recovered(self.folder, made, form)
+                told = [(doubt["offset"], doubt["reason"].split(", and ")[1]) for doubt in report["doubtful"]]
+                self.assertEqual(told, [(eyes.offset, "most of its payload is eye catchers"),
+                                        (stranger.offset, "its element is not in the dictionary")])
+                self.assertEqual(report["doubts"], 2)
+                text = tav("recover", self.folder / "damaged.tav", "-o", self.folder / "y.tav", "--force", *form.options()).out
+                self.assertIn(f"{eyes.offset:#x}: the node of {eyes.payload_offset + 24 - eyes.offset} bytes is doubtful: it stands", text)
+                self.assertIn(f"nodes            {report['nodes']}, 2 of them doubtful\n", text)
+
+    def test_a_group_in_bytes_whose_announced_pair_is_gone_comes_back(self):
+        for form in (form for form in FORMS if form.wide):
+            for kind, info, pair in ((kind, info, pair) for kind in (1, 2) for info in (0, EYE_SIZE)
+                                     for pair in (bytes(16), b"\xff" * 16, b"")):
+                inside = [Node(NAMED[4], 57, bytes(range(8))), Node(NAMED[5], 55, b"abcd"), Node(NAMED[6], 55, b"efgh")]
+                group = Node(NAMED[3], kind, children=inside, info=info)
+                holder = Node(NAMED[2], BINARY, bytes(encode(form, group)), info=EYE_SIZE)
+                holder.force_pair = pair
+                others = [Node(NAMED[1], 57, bytes(8)), Node(NAMED[7], 55, b"last"), Node(NAMED[8], 55, b"LAST")]
+                made = encode(form, Node(NAMED[0], 2, children=[others[0], holder, *others[1:]]))
+                with self.subTest(form=form.options(), kind=kind, info=info, pair=pair[:1]):
+                    _, saved = recovered(self.folder, made, form)
+                    self.assertEqual(missing([group, *inside, *others], read_back(saved, form)), [])
 
 
 class Cost(ToolTest):

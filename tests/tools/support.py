@@ -5,6 +5,7 @@ import pathlib
 import resource
 import subprocess
 import tempfile
+import time
 import unittest
 
 # What runs a program of another machine here; empty when it is this machine's.
@@ -17,6 +18,11 @@ GENERATE = [*EMULATOR, os.environ["TAV_GENERATE"]]
 # A build with sanitizers needs terabytes of addresses and more time: limits of memory and of time say nothing there.
 SANITIZED = os.environ.get("TAV_SANITIZED", "") != ""
 
+# How long something may take that is over at once. It ends a test that hangs, and says nothing of how fast a machine is that
+# does something else, too, or runs a build with sanitizers.
+PATIENCE = 600
+LONGEST_MESSAGE = 2000
+
 
 class Result:
     def __init__(self, done):
@@ -27,9 +33,9 @@ class Result:
 
 
 def tav(*arguments, stdin=None, **more):
-    """Runs the program; it has to end within a minute."""
+    """Runs the program; it has to end."""
     done = subprocess.run([*TAV, *map(str, arguments)], input=stdin if stdin is not None else b"",
-                          capture_output=True, timeout=60, **more)
+                          capture_output=True, timeout=PATIENCE, **more)
     return Result(done)
 
 
@@ -40,9 +46,17 @@ def tav_in_little_memory(*arguments):
     return tav(*arguments, preexec_fn=lambda: resource.setrlimit(resource.RLIMIT_AS, (400 << 20, 400 << 20)))
 
 
+def until(condition):
+    """Waits until a condition holds, and returns what it gives."""
+    deadline = time.monotonic() + PATIENCE
+    while not (found := condition()) and time.monotonic() < deadline:
+        time.sleep(0.005)
+    return found
+
+
 def generate(path, *options):
     """Writes a random stream and returns what is in it."""
-    done = subprocess.run([*GENERATE, str(path), *map(str, options)], capture_output=True, check=True, timeout=60)
+    done = subprocess.run([*GENERATE, str(path), *map(str, options)], capture_output=True, check=True, timeout=PATIENCE)
     return json.loads(done.stdout)
 
 
@@ -73,6 +87,14 @@ def bytes_of_hex(text):
 
 
 class ToolTest(unittest.TestCase):
+    def _formatMessage(self, msg, standardMsg):
+        """What a failure says. Outputs of megabytes are cut: nobody reads them, and logs have limits."""
+        text = super()._formatMessage(msg, standardMsg)
+        if len(text) <= LONGEST_MESSAGE:
+            return text
+        half = LONGEST_MESSAGE // 2
+        return f"{text[:half]}\n... {len(text) - 2 * half} characters left out ...\n{text[-half:]}"
+
     def setUp(self):
         folder = tempfile.TemporaryDirectory(prefix="tav-test-")
         self.addCleanup(folder.cleanup)

@@ -11,6 +11,7 @@
 #include <utility>
 #include <vector>
 
+#include "tav/cpp/header.hpp"
 #include "tav/cpp/values.hpp"
 
 namespace tav::detail
@@ -129,16 +130,6 @@ uint32_t decode(const RawValue& raw, std::chrono::sys_time<Duration>& out) noexc
   return rc == TAV_RC_OK && !fromTimeStamp(stamp, out) ? TAV_RC_OUTSIDE_PARENT : rc;
 }
 
-inline uint32_t decode(const RawValue& raw, std::string_view& out) noexcept
-{
-  if (raw.type != TAV_TYPE_ASCII_STRING)
-  {
-    return TAV_RC_NOT_SUPPORTED;
-  }
-  out = {reinterpret_cast<const char*>(raw.bytes), raw.length()};
-  return TAV_RC_OK;
-}
-
 inline uint32_t decode(const RawValue& raw, Utf8& out) noexcept
 {
   if (raw.type != TAV_TYPE_UTF8_STRING)
@@ -154,6 +145,20 @@ inline uint32_t decode(const RawValue& raw, Utf8& out) noexcept
   out.codePage = raw.swap ? kor::byteswap16(codePage) : codePage;
   out.text = {reinterpret_cast<const char*>(raw.bytes) + sizeof codePage, raw.length() - sizeof codePage};
   return TAV_RC_OK;
+}
+
+/// Text of either string type, whatever its code page: which of them a text was written as follows from its characters.
+inline uint32_t decode(const RawValue& raw, std::string_view& out) noexcept
+{
+  if (raw.type == TAV_TYPE_ASCII_STRING)
+  {
+    out = {reinterpret_cast<const char*>(raw.bytes), raw.length()};
+    return TAV_RC_OK;
+  }
+  Utf8 view;
+  const uint32_t rc = decode(raw, view);
+  out = view.text;
+  return rc;
 }
 
 inline uint32_t decode(const RawValue& raw, Utf8Text& out)
@@ -190,13 +195,11 @@ inline uint32_t decode(const RawValue& raw, std::u8string& out)
   return rc;
 }
 
-/// Text of either string type, whatever its code page.
 inline uint32_t decode(const RawValue& raw, std::string& out)
 {
-  Utf8 view;
-  const bool ascii = raw.type == TAV_TYPE_ASCII_STRING;
-  const uint32_t rc = ascii ? decode(raw, view.text) : decode(raw, view);
-  out.assign(view.text);
+  std::string_view view;
+  const uint32_t rc = decode(raw, view);
+  out.assign(view);
   return rc;
 }
 
@@ -300,6 +303,83 @@ uint32_t decodeNumber(const RawValue& raw, T& out) noexcept
   default:
     return TAV_RC_NOT_SUPPORTED;
   }
+}
+
+/// The C++ type that a data element's value is read as; empty for a type without one.
+inline std::string_view readerOf(uint16_t type) noexcept
+{
+  switch (type)
+  {
+  case TAV_TYPE_ASCII_STRING:
+  case TAV_TYPE_UTF8_STRING:
+    return "std::string";
+  case TAV_TYPE_UINT8:
+    return "uint8_t";
+  case TAV_TYPE_SINT8:
+    return "int8_t";
+  case TAV_TYPE_UINT16:
+    return "uint16_t";
+  case TAV_TYPE_SINT16:
+    return "int16_t";
+  case TAV_TYPE_UINT32:
+    return "uint32_t";
+  case TAV_TYPE_SINT32:
+    return "int32_t";
+  case TAV_TYPE_UINT64:
+    return "uint64_t";
+  case TAV_TYPE_SINT64:
+    return "int64_t";
+  case TAV_TYPE_UTC_TIMESTAMP:
+    return "TAVTimeStamp";
+  case TAV_TYPE_BINARY:
+    return "std::vector<std::byte>";
+  case TAV_TYPE_UINT128:
+    return "tav::Uint128";
+  case TAV_TYPE_SINT128:
+    return "tav::Sint128";
+  case TAV_TYPE_BYTE:
+    return "std::byte";
+  case TAV_TYPE_UINT64_ARRAY:
+    return "std::vector<uint64_t>";
+  default:
+    return {};
+  }
+}
+
+inline bool isIntegerType(uint16_t type) noexcept
+{
+  return (type >= TAV_TYPE_UINT8 && type <= TAV_TYPE_SINT64) || type == TAV_TYPE_UINT128 || type == TAV_TYPE_SINT128;
+}
+
+/// Why a value could not be read as a `T`: "the node is a Sint32: asNumber<uint32_t>()". Empty when the code says it.
+template<class T>
+[[gnu::noinline, gnu::cold]] std::string readingRefusal(uint32_t code, const HeaderView& node, bool isGroup)
+{
+  const uint16_t type = node.type();
+  if (isGroup)
+  {
+    return code == TAV_RC_NOT_SUPPORTED ? "the node is a group" : "";
+  }
+  if (code == TAV_RC_OUTSIDE_PARENT && layout::typeInfo(type).known)
+  {
+    const uint8_t exact = layout::typeInfo(type).valueSize;
+    const bool isSized = exact == 0 || node.size() == exact;
+    return isSized ? "the node's value does not fit" : "the node is " + typeText(type) + " of another size";
+  }
+  if (code != TAV_RC_NOT_SUPPORTED)
+  {
+    return {};
+  }
+  const std::string reader(readerOf(type));
+  std::string text = "the node is " + typeText(type) + ": ";
+  if constexpr (StreamInteger<T>)
+  {
+    if (isIntegerType(type))
+    {
+      return text + "asNumber<" + std::string(readerOf(integerType<T>())) + ">()";
+    }
+  }
+  return text + (reader.empty() ? "payload()" : "as<" + reader + ">()");
 }
 
 } // namespace tav::detail

@@ -12,6 +12,7 @@
 #include <new>
 #include <utility>
 
+#include "tav/cpp/text.hpp"
 #include "tav/cpp/values.hpp"
 
 namespace tav::detail
@@ -60,6 +61,19 @@ bool toTimeStamp(std::chrono::sys_time<Duration> time, TAVTimeStamp& stamp) noex
   stamp = {static_cast<uint64_t>(whole.time_since_epoch().count()), static_cast<uint16_t>(fraction / 1000),
            static_cast<uint16_t>(fraction % 1000), 0, 0};
   return true;
+}
+
+template<class T>
+constexpr bool isNullPointer(const T& value) noexcept
+{
+  if constexpr (std::is_pointer_v<T>)
+  {
+    return value == nullptr;
+  }
+  else
+  {
+    return false;
+  }
 }
 
 /// Text up to its NUL; an array that has none ends with its last character.
@@ -117,21 +131,36 @@ uint32_t withHalves(const T& value, Write& write) noexcept
   }
 }
 
+/// Out of line: the usual text shall not pay for it.
+template<class Write>
+[[gnu::noinline]] uint32_t withTextBeyondAscii(std::string_view text, Write& write) noexcept
+{
+  return isUtf8(text) ? withUtf8Payload(text, kCodePageUtf8, write) : TAV_RC_BAD_PARAM;
+}
+
+/// Calls `write(type, bytes, size)` with a text: an ASCII String where it is ASCII, else a UTF8 String where it is
+/// that. Other bytes are TAV_RC_BAD_PARAM.
+template<class Write>
+uint32_t withText(std::string_view text, Write& write) noexcept
+{
+  if (isAscii(text)) [[likely]]
+  {
+    return write(TAV_TYPE_ASCII_STRING, bytesOf(text.data()), uint64_t{text.size()});
+  }
+  return withTextBeyondAscii(text, write);
+}
+
 /// Calls `write(type, bytes, size)` with a text, a UTF-8 text, bytes or words. A null pointer is TAV_RC_BAD_PARAM.
 template<class T, class Write>
 uint32_t withView(const T& value, Write& write) noexcept
 {
-  if constexpr (std::is_pointer_v<T>)
+  if (isNullPointer(value))
   {
-    if (value == nullptr)
-    {
-      return TAV_RC_BAD_PARAM;
-    }
+    return TAV_RC_BAD_PARAM;
   }
   if constexpr (Text<T>)
   {
-    const std::string_view text = textOf(value);
-    return write(TAV_TYPE_ASCII_STRING, bytesOf(text.data()), uint64_t{text.size()});
+    return withText(textOf(value), write);
   }
   else if constexpr (Utf8View<T>)
   {
@@ -183,6 +212,43 @@ uint32_t withPayload(const T& value, Write&& write) noexcept
   else
   {
     return withView(value, write);
+  }
+}
+
+/// As withPayload, for a node whose type is there already: ASCII fits a UTF8 String, too.
+template<Addable T, class Write>
+uint32_t withPayloadFor(uint16_t type, const T& value, Write&& write) noexcept
+{
+  if constexpr (Text<T>)
+  {
+    if (type == TAV_TYPE_UTF8_STRING && !isNullPointer(value) && isUtf8(textOf(value)))
+    {
+      return withUtf8Payload(textOf(value), kCodePageUtf8, write);
+    }
+  }
+  return withPayload(value, write);
+}
+
+/// Why withPayload refused a value; null when its code says it.
+template<class T>
+const char* refusalOf(const T& value, uint32_t code) noexcept
+{
+  if constexpr (isSysTime<T>)
+  {
+    return code == TAV_RC_OUTSIDE_PARENT ? "a time before 1970, or too late for a timestamp" : nullptr;
+  }
+  else if constexpr (Text<T>)
+  {
+    const bool isRefused = code == TAV_RC_BAD_PARAM;
+    return !isRefused             ? nullptr
+           : isNullPointer(value) ? "the text is a null pointer"
+           : !isUtf8(textOf(value))
+               ? "the text is neither ASCII nor UTF-8; tav::Utf8 takes a code page, Binary any bytes"
+               : nullptr;
+  }
+  else
+  {
+    return code == TAV_RC_BAD_PARAM && isNullPointer(value) ? "the text is a null pointer" : nullptr;
   }
 }
 

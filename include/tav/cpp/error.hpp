@@ -3,8 +3,10 @@
 #pragma once
 
 #include <cstdint>
+#include <stdexcept>
 #include <string>
 #include <system_error>
+#include <type_traits>
 
 #include "tav/codes.h"
 
@@ -27,6 +29,19 @@ inline constexpr CodeText kCodeTexts[] = {
 #undef TAV_CODE_TEXT
 };
 
+/// The name and the sentence of a code.
+inline const CodeText* codeTextOf(uint32_t code) noexcept
+{
+  for (const CodeText& text : kCodeTexts)
+  {
+    if (text.code == code)
+    {
+      return &text;
+    }
+  }
+  return nullptr;
+}
+
 class Category : public std::error_category
 {
 public:
@@ -38,14 +53,8 @@ public:
   /// "TAV_RC_NOT_FOUND: nothing was found, or no group is open"
   [[nodiscard]] std::string message(int value) const override
   {
-    for (const CodeText& text : kCodeTexts)
-    {
-      if (text.code == static_cast<uint32_t>(value))
-      {
-        return std::string(text.name) + ": " + text.sentence;
-      }
-    }
-    return "unknown code";
+    const CodeText* const text = codeTextOf(static_cast<uint32_t>(value));
+    return text != nullptr ? std::string(text->name) + ": " + text->sentence : "unknown code";
   }
 
   [[nodiscard]] std::error_condition default_error_condition(int value) const noexcept override
@@ -106,17 +115,60 @@ namespace detail
   throw std::system_error(makeError(code), what);
 }
 
-/// The same where more can be said: `about` tells what it was done with.
-template<class About>
-[[noreturn, gnu::noinline, gnu::cold]] void raiseAbout(uint32_t code, const char* what, const About& about)
-{
-  throw std::system_error(makeError(code), std::string(what) + ' ' + about());
-}
-
 /// The form with an error code of an operation.
 inline void report(uint32_t code, std::error_code& ec) noexcept
 {
   ec = makeError(code);
+}
+
+/// What is known of a failure beside its code: what it was done with, and a sentence that says more than the code's.
+struct Told
+{
+  std::string about;
+  std::string sentence;
+};
+
+/// A failure of which more is known than its code tells: "adding cpu (60004): TAV_RC_BAD_PARAM: the group is closed".
+class ToldError : public std::system_error
+{
+public:
+  ToldError(uint32_t code, const std::string& text)
+      : std::system_error(makeError(code)), text_(text)
+  {
+  }
+  [[nodiscard]] const char* what() const noexcept override
+  {
+    return text_.what();
+  }
+
+private:
+  std::runtime_error text_; ///< whose copies cannot fail
+};
+
+/// As raise, for a failure of which there may be more to say.
+[[noreturn, gnu::noinline, gnu::cold]] inline void raiseTold(uint32_t code, const char* what, const Told& told)
+{
+  const std::string text = told.about.empty() ? std::string(what) : std::string(what) + ' ' + told.about;
+  const CodeText* const known = codeTextOf(code);
+  if (told.sentence.empty() || known == nullptr)
+  {
+    throw std::system_error(makeError(code), text);
+  }
+  throw ToldError(code, text + ": " + known->name + ": " + told.sentence);
+}
+
+/// The same where more can be said: `about` tells what it was done with.
+template<class About>
+[[noreturn, gnu::noinline, gnu::cold]] void raiseAbout(uint32_t code, const char* what, const About& about)
+{
+  if constexpr (std::is_same_v<decltype(about()), Told>)
+  {
+    raiseTold(code, what, about());
+  }
+  else
+  {
+    throw std::system_error(makeError(code), std::string(what) + ' ' + about());
+  }
 }
 
 /// The throwing form of an operation: nothing for success.
@@ -128,7 +180,7 @@ inline void demand(uint32_t code, const char* what)
   }
 }
 
-/// The same, where `about()` makes a text of what it was done with; it is called after a failure alone.
+/// The same, where `about()` makes a text of what it was done with, or a Told; it is called after a failure alone.
 template<class About>
 void demand(uint32_t code, const char* what, const About& about)
 {

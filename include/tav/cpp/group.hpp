@@ -35,19 +35,20 @@ public:
 
   /// Appends a data element whose type follows from the value's; gives its header, by which Writer::update finds it.
   template<class T>
-  HeaderView add(uint16_t elm, const T& value, const NodeOptions& options = {})
+  HeaderView add(ElementId elm, const T& value, const NodeOptions& options = {})
   {
     TAVHeaderData node;
-    detail::demand(append(node, elm, value, options), "adding", [elm] { return detail::elementText(elm); });
+    const uint32_t rc = append(node, elm, value, options);
+    detail::demand(rc, "adding", [&] { return tell(rc, elm, options, detail::refusalOf(value, rc)); });
     return HeaderView(node.header);
   }
   template<class T>
-  HeaderView add(uint16_t elm, const T& value, std::error_code& ec) noexcept
+  HeaderView add(ElementId elm, const T& value, std::error_code& ec) noexcept
   {
     return add(elm, value, NodeOptions{}, ec);
   }
   template<class T>
-  HeaderView add(uint16_t elm, const T& value, const NodeOptions& options, std::error_code& ec) noexcept
+  HeaderView add(ElementId elm, const T& value, const NodeOptions& options, std::error_code& ec) noexcept
   {
     TAVHeaderData node{};
     detail::report(append(node, elm, value, options), ec);
@@ -57,19 +58,20 @@ public:
   /// Appends an integer as a given type: `add<TAV_TYPE_UINT8>(elm, 5)`. A number that the type cannot hold is refused
   /// with TAV_RC_OUTSIDE_PARENT.
   template<uint16_t Type, class T>
-  HeaderView add(uint16_t elm, T value, const NodeOptions& options = {})
+  HeaderView add(ElementId elm, T value, const NodeOptions& options = {})
   {
     TAVHeaderData node;
-    detail::demand(appendAs<Type>(node, elm, value, options), "adding", [elm] { return detail::elementText(elm); });
+    const uint32_t rc = appendAs<Type>(node, elm, value, options);
+    detail::demand(rc, "adding", [&] { return tell(rc, elm, options, "the number does not fit the type"); });
     return HeaderView(node.header);
   }
   template<uint16_t Type, class T>
-  HeaderView add(uint16_t elm, T value, std::error_code& ec) noexcept
+  HeaderView add(ElementId elm, T value, std::error_code& ec) noexcept
   {
     return add<Type>(elm, value, NodeOptions{}, ec);
   }
   template<uint16_t Type, class T>
-  HeaderView add(uint16_t elm, T value, const NodeOptions& options, std::error_code& ec) noexcept
+  HeaderView add(ElementId elm, T value, const NodeOptions& options, std::error_code& ec) noexcept
   {
     TAVHeaderData node{};
     detail::report(appendAs<Type>(node, elm, value, options), ec);
@@ -77,13 +79,15 @@ public:
   }
 
   /// Appends a data element of any type with its payload in this machine's byte order.
-  HeaderView addRaw(uint16_t type, uint16_t elm, std::span<const std::byte> payload, const NodeOptions& options = {})
+  HeaderView addRaw(uint16_t type, ElementId elm, std::span<const std::byte> payload, const NodeOptions& options = {})
   {
     TAVHeaderData node{};
-    detail::demand(appendRaw(node, type, elm, payload, options), "adding", [elm] { return detail::elementText(elm); });
+    const uint32_t rc = appendRaw(node, type, elm, payload, options);
+    const char* const refusal = layout::isGroupType(type) ? "the type is a group's: group() opens one" : nullptr;
+    detail::demand(rc, "adding", [&] { return tell(rc, elm, options, refusal); });
     return HeaderView(node.header);
   }
-  HeaderView addRaw(uint16_t type, uint16_t elm, std::span<const std::byte> payload, const NodeOptions& options,
+  HeaderView addRaw(uint16_t type, ElementId elm, std::span<const std::byte> payload, const NodeOptions& options,
                     std::error_code& ec) noexcept
   {
     TAVHeaderData node{};
@@ -95,7 +99,7 @@ public:
   /// group takes the other width.
   void addStream(Width width, std::span<const std::byte> nodes)
   {
-    detail::demand(appendStream(width, nodes), "adding encoded nodes");
+    detail::demand(appendStream(width, nodes), "adding encoded nodes", [this] { return tell(); });
   }
   void addStream(Width width, std::span<const std::byte> nodes, std::error_code& ec) noexcept
   {
@@ -103,32 +107,32 @@ public:
   }
 
   /// Opens a group inside.
-  Group group(uint16_t elm, const GroupOptions& options = {}) &
+  Group group(ElementId elm, const GroupOptions& options = {}) &
   {
     uint32_t rc = TAV_RC_OK;
     Group inner = open(state_, own(), elm, options, rc);
-    detail::demand(rc, "opening the group", [elm] { return detail::elementText(elm); });
+    detail::demand(rc, "opening the group", [&] { return tell(rc, elm, options, nullptr); });
     return inner;
   }
-  Group group(uint16_t elm, const GroupOptions& options, std::error_code& ec) & noexcept
+  Group group(ElementId elm, const GroupOptions& options, std::error_code& ec) & noexcept
   {
     uint32_t rc = TAV_RC_OK;
     Group inner = open(state_, own(), elm, options, rc);
     detail::report(rc, ec);
     return inner;
   }
-  Group group(uint16_t elm, std::error_code& ec) & noexcept
+  Group group(ElementId elm, std::error_code& ec) & noexcept
   {
     return group(elm, GroupOptions{}, ec);
   }
-  Group group(uint16_t, const GroupOptions& = {}) && = delete;
-  Group group(uint16_t, const GroupOptions&, std::error_code&) && = delete;
-  Group group(uint16_t, std::error_code&) && = delete;
+  Group group(ElementId, const GroupOptions& = {}) && = delete;
+  Group group(ElementId, const GroupOptions&, std::error_code&) && = delete;
+  Group group(ElementId, std::error_code&) && = delete;
 
   /// Closes the group; afterwards it takes nothing more. After a failure it is still open.
   void close()
   {
-    detail::demand(end(0), "closing a group");
+    detail::demand(end(0), "closing a group", [this] { return tell(); });
   }
   void close(std::error_code& ec) noexcept
   {
@@ -138,7 +142,7 @@ public:
   /// Takes back the group and all in it: the next node is written in its place.
   void abandon()
   {
-    detail::demand(end(1), "abandoning a group");
+    detail::demand(end(1), "abandoning a group", [this] { return tell(); });
   }
   void abandon(std::error_code& ec) noexcept
   {
@@ -159,7 +163,7 @@ private:
   {
   }
 
-  static Group open(const detail::WriterRef& state, uint32_t outer, uint16_t elm, const GroupOptions& options,
+  static Group open(const detail::WriterRef& state, uint32_t outer, ElementId elm, const GroupOptions& options,
                     uint32_t& rc) noexcept
   {
     const bool quick = state && state->quick == outer;
@@ -185,6 +189,36 @@ private:
     return Group(state, state->innermost, outer);
   }
 
+  /// What there is to say of a failure; `refusal` is why the value itself was refused, or null.
+  template<class Options>
+  [[gnu::noinline, gnu::cold]] detail::Told tell(uint32_t rc, ElementId elm, const Options& options,
+                                                 const char* refusal) const
+  {
+    return tellOf(state_, own(), rc, elm, options, refusal);
+  }
+  [[gnu::noinline, gnu::cold]] detail::Told tell() const
+  {
+    return {{}, state_ ? state_->refusal(own()) : "the group was moved from, or could not be opened"};
+  }
+
+  template<class Options>
+  static detail::Told tellOf(const detail::WriterRef& state, uint32_t level, uint32_t rc, ElementId elm,
+                             const Options& options, const char* refusal)
+  {
+    detail::Told told{detail::elementText(elm),
+                      state ? state->refusal(level) : "the group was moved from, or could not be opened"};
+    const bool isMisuse = rc == TAV_RC_BAD_PARAM || rc == TAV_RC_OUTSIDE_PARENT;
+    if (told.sentence.empty() && isMisuse)
+    {
+      const char* const id = elm.isValid() ? nullptr : "ids of elements go from 0 to 65535";
+      const char* const key = options.infoKey <= TAV_INFO_KEY_MASK ? nullptr : "the key does not fit 11 bits";
+      const char* const sentence = id != nullptr ? id : key != nullptr ? key
+                                                                       : refusal;
+      told.sentence = sentence != nullptr ? sentence : "";
+    }
+    return told;
+  }
+
   /// The level for the shared checks: one that no group has when this one is closed.
   [[nodiscard]] uint32_t own() const noexcept
   {
@@ -197,7 +231,7 @@ private:
   }
 
   template<class T>
-  uint32_t append(TAVHeaderData& node, uint16_t elm, const T& value, const NodeOptions& options) noexcept
+  uint32_t append(TAVHeaderData& node, ElementId elm, const T& value, const NodeOptions& options) noexcept
   {
     static_assert(detail::Addable<T>,
                   "a value of this type has no type in the stream: use a sized integer, std::byte, "
@@ -205,9 +239,9 @@ private:
     if constexpr (detail::Addable<T>)
     {
       const auto write = [&](uint16_t type, const uint8_t* bytes, uint64_t size) {
-        return state_->appendQuickly(node, type, elm, options, bytes, size);
+        return state_->appendQuickly(node, type, elm.id(), options, bytes, size);
       };
-      if (isQuick(options)) [[likely]]
+      if (isQuick(elm, options)) [[likely]]
       {
         return detail::withPayload(value, write);
       }
@@ -217,26 +251,30 @@ private:
   }
 
   /// Whether a data element can be added without a look at anything else.
-  [[gnu::always_inline]] bool isQuick(const NodeOptions& options) const noexcept
+  [[gnu::always_inline]] bool isQuick(ElementId elm, const NodeOptions& options) const noexcept
   {
-    return state_ && state_->quick == level_ && options.infoKey <= TAV_INFO_KEY_MASK;
+    return state_ && state_->quick == level_ && options.infoKey <= TAV_INFO_KEY_MASK && elm.isValid();
   }
 
   /// When there is something to look at before. `give(write)` calls `write` with the payload.
   template<class Give>
-  [[gnu::noinline, gnu::cold]] uint32_t appendSlowly(TAVHeaderData& node, uint16_t elm, const NodeOptions& options,
+  [[gnu::noinline, gnu::cold]] uint32_t appendSlowly(TAVHeaderData& node, ElementId elm, const NodeOptions& options,
                                                      const Give& give) noexcept
   {
     node = {};
-    const uint32_t rc = enter();
+    uint32_t rc = enter();
+    if (rc == TAV_RC_OK && !elm.isValid())
+    {
+      rc = TAV_RC_BAD_PARAM;
+    }
     const auto write = [&](uint16_t type, const uint8_t* bytes, uint64_t size) {
-      return state_->append(node, type, elm, options, bytes, size);
+      return state_->append(node, type, elm.id(), options, bytes, size);
     };
     return rc == TAV_RC_OK ? give(write) : rc;
   }
 
   template<uint16_t Type, class T>
-  uint32_t appendAs(TAVHeaderData& node, uint16_t elm, T value, const NodeOptions& options) noexcept
+  uint32_t appendAs(TAVHeaderData& node, ElementId elm, T value, const NodeOptions& options) noexcept
   {
     static_assert(detail::isIntegerTypeCode<Type>, "this is not the code of an integer type: use add with a value of "
                                                    "the type, or addRaw");
@@ -244,9 +282,9 @@ private:
     if constexpr (detail::isIntegerTypeCode<Type> && StreamInteger<T>)
     {
       const auto write = [&](uint16_t type, const uint8_t* bytes, uint64_t size) {
-        return state_->appendQuickly(node, type, elm, options, bytes, size);
+        return state_->appendQuickly(node, type, elm.id(), options, bytes, size);
       };
-      if (isQuick(options)) [[likely]]
+      if (isQuick(elm, options)) [[likely]]
       {
         return detail::withPayloadAs<Type>(value, write);
       }
@@ -255,16 +293,16 @@ private:
     }
   }
 
-  uint32_t appendRaw(TAVHeaderData& node, uint16_t type, uint16_t elm, std::span<const std::byte> payload,
+  uint32_t appendRaw(TAVHeaderData& node, uint16_t type, ElementId elm, std::span<const std::byte> payload,
                      const NodeOptions& options) noexcept
   {
     uint32_t rc = enter();
-    if (rc == TAV_RC_OK && layout::isGroupType(type))
+    if (rc == TAV_RC_OK && (layout::isGroupType(type) || !elm.isValid()))
     {
       rc = TAV_RC_BAD_PARAM;
     }
     return rc == TAV_RC_OK
-               ? state_->append(node, type, elm, options, detail::bytesOf(payload.data()), payload.size())
+               ? state_->append(node, type, elm.id(), options, detail::bytesOf(payload.data()), payload.size())
                : rc;
   }
 
@@ -278,7 +316,7 @@ private:
     if (rc == TAV_RC_OK && !nodes.empty())
     {
       auto* const bytes = const_cast<uint8_t*>(detail::bytesOf(nodes.data())); // only read
-      rc = tavAddStream(0, state_->handle, static_cast<uint32_t>(width), bytes, nodes.size());
+      rc = state_->told(tavAddStream(0, state_->handle, static_cast<uint32_t>(width), bytes, nodes.size()));
     }
     return rc;
   }

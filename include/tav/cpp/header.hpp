@@ -100,14 +100,43 @@ inline std::string elementText(uint16_t elm)
   return tag.empty() ? "element " + number : std::string(tag) + " (" + number + ')';
 }
 
-/// "hostName (60104) at 0x28, type 50, 3 bytes"
-inline std::string nodeText(const HeaderView& node)
+/// An id as it was given: "hostName (60104)", "element -1".
+inline std::string elementText(ElementId elm)
+{
+  return elm.isValid() ? elementText(elm.id()) : "element " + std::to_string(static_cast<int64_t>(elm.number()));
+}
+
+/// "hostName (60104) at 0x28"
+inline std::string placeText(const HeaderView& node)
 {
   char digits[16];
   const std::to_chars_result end = std::to_chars(digits, digits + sizeof digits, node.offset(), 16);
+  return elementText(node.elm()) + " at 0x" + std::string(digits, end.ptr);
+}
+
+/// "hostName (60104) at 0x28, type 50, 3 bytes"
+inline std::string nodeText(const HeaderView& node)
+{
   const std::string size = node.isOpen() ? "open" : std::to_string(node.size()) + " bytes";
-  return elementText(node.elm()) + " at 0x" + std::string(digits, end.ptr) + ", type " + std::to_string(node.type()) +
-         ", " + size;
+  return placeText(node) + ", type " + std::to_string(node.type()) + ", " + size;
+}
+
+/// "a Uint32", "a group", "of type 7"
+inline std::string typeText(uint16_t type)
+{
+  if (layout::isGroupType(type))
+  {
+    return "a group";
+  }
+  const layout::TypeInfo& known = layout::typeInfo(type);
+  if (!known.known)
+  {
+    return "of type " + std::to_string(type);
+  }
+  const char* const name = known.printName != nullptr ? known.printName // two are printed without a name
+                           : type == TAV_TYPE_BYTE    ? "Byte"
+                                                      : "Uint64 array";
+  return (type == TAV_TYPE_ASCII_STRING ? "an " : "a ") + std::string(name);
 }
 
 } // namespace detail

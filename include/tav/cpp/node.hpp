@@ -22,6 +22,10 @@ namespace tav
 class ChildRange;
 class DescendantRange;
 class Path;
+namespace detail
+{
+class Printer;
+}
 
 /// Whether a walk shows the elements that only end a group (ids 65000 and 65001).
 enum class EndElements : uint8_t
@@ -29,6 +33,29 @@ enum class EndElements : uint8_t
   skip,
   show
 };
+
+namespace detail
+{
+
+/// Says of a type that cannot be read that it cannot.
+template<class T>
+constexpr bool checkReadable() noexcept
+{
+  static_assert(
+      Readable<T>,
+      "as<T>() takes a sized integer, std::byte, std::string, std::string_view, std::u8string, std::u8string_view, "
+      "tav::Utf8, tav::Utf8Text, std::vector<std::byte>, std::span<const std::byte>, "
+      "std::vector<uint64_t>, tav::Uint128, tav::Sint128, TAVTimeStamp or a std::chrono::sys_time");
+  return Readable<T>;
+}
+
+template<class T>
+[[gnu::noinline, gnu::cold]] Told tellReading(uint32_t rc, const HeaderView& node, bool isGroup)
+{
+  return {nodeText(node), readingRefusal<T>(rc, node, isGroup)};
+}
+
+} // namespace detail
 
 /// A node with a copy of its payload: independent of the reader it came from.
 class OwnedNode : public HeaderView
@@ -47,26 +74,33 @@ public:
   std::span<const std::byte> payload() const&& = delete;
 
   /// The value, as Node::as. Views live as long as the node.
-  template<Readable T>
+  template<class T>
   [[nodiscard]] T as() const&
   {
-    T value{};
-    detail::demand(read(value), "reading", [this] { return detail::nodeText(*this); });
-    return value;
+    if constexpr (detail::checkReadable<T>())
+    {
+      T value{};
+      const uint32_t rc = read(value);
+      detail::demand(rc, "reading", [&] { return detail::tellReading<T>(rc, *this, isGroup()); });
+      return value;
+    }
   }
-  template<Readable T>
+  template<class T>
   [[nodiscard]] T as(std::error_code& ec) const&
   {
-    T value{};
-    detail::report(read(value), ec);
-    return value;
+    if constexpr (detail::checkReadable<T>())
+    {
+      T value{};
+      detail::report(read(value), ec);
+      return value;
+    }
   }
-  template<Readable T>
+  template<class T>
   requires(!detail::isView<T>) [[nodiscard]] T as() const&&
   {
     return as<T>();
   }
-  template<Readable T>
+  template<class T>
   requires(!detail::isView<T>) [[nodiscard]] T as(std::error_code& ec) const&&
   {
     return as<T>(ec);
@@ -83,7 +117,8 @@ public:
   [[nodiscard]] T asNumber() const
   {
     T value{};
-    detail::demand(readNumber(value), "reading", [this] { return detail::nodeText(*this); });
+    const uint32_t rc = readNumber(value);
+    detail::demand(rc, "reading", [&] { return detail::tellReading<T>(rc, *this, isGroup()); });
     return value;
   }
   template<StreamInteger T>
@@ -192,7 +227,7 @@ public:
   /// Views live as long as payload(), and are not checked.
   /// @throws std::system_error TAV_RC_NOT_SUPPORTED for another type, TAV_RC_OUTSIDE_PARENT for a size or a number
   ///         that does not fit
-  template<Readable T>
+  template<class T>
   [[nodiscard]] T as() const
   {
     if constexpr (kIsUsual<T>)
@@ -202,9 +237,12 @@ public:
         return readQuickly<T>();
       }
     }
-    return readWhole<T>();
+    if constexpr (detail::checkReadable<T>())
+    {
+      return readWhole<T>();
+    }
   }
-  template<Readable T>
+  template<class T>
   [[nodiscard]] T as(std::error_code& ec) const
   {
     if constexpr (kIsUsual<T>)
@@ -215,9 +253,12 @@ public:
         return readQuickly<T>();
       }
     }
-    T value{};
-    detail::report(read(value), ec);
-    return value;
+    if constexpr (detail::checkReadable<T>())
+    {
+      T value{};
+      detail::report(read(value), ec);
+      return value;
+    }
   }
 
   /// The number in a node of any integer type, when `T` can hold it: else TAV_RC_OUTSIDE_PARENT.
@@ -225,7 +266,8 @@ public:
   [[nodiscard]] T asNumber() const
   {
     T value{};
-    detail::demand(readNumber(value), "reading", [this] { return detail::nodeText(*this); });
+    const uint32_t rc = readNumber(value);
+    detail::demand(rc, "reading", [&] { return detail::tellReading<T>(rc, *this, isGroup()); });
     return value;
   }
   template<StreamInteger T>
@@ -254,6 +296,7 @@ private:
   friend class ChildRange;
   friend class DescendantRange;
   friend class Path;
+  friend class detail::Printer;
 
   /// A node of no known group.
   Node(detail::ReaderState& state, const TAVHeaderData& data) noexcept
@@ -365,7 +408,8 @@ private:
   [[gnu::noinline]] T readWhole() const
   {
     T value{};
-    detail::demand(read(value), "reading", [this] { return detail::nodeText(*this); });
+    const uint32_t rc = read(value);
+    detail::demand(rc, "reading", [&] { return detail::tellReading<T>(rc, *this, isGroup()); });
     return value;
   }
   template<class T>

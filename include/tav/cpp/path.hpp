@@ -4,30 +4,35 @@
 
 #include <algorithm>
 #include <charconv>
+#include <cstddef>
 #include <cstdint>
 #include <optional>
+#include <string>
 #include <string_view>
 #include <utility>
 #include <vector>
 
+#include "tav/cpp/nearest.hpp"
 #include "tav/cpp/ranges.hpp"
 
 namespace tav
 {
 
 /// A path, read once and usable for any number of searches: steps between slashes, each a tag, an enum name, a decimal
-/// id (also as `#60105`) or `*`, each with `[n]` for the nth match among its siblings, from 1. A slash may lead.
+/// id (also as `#60105`) or `*`, each with `[n]` for the nth of those that the step finds under the same parent, from
+/// 1:
+/// `*[2]` is the second child. A slash may lead.
 class Path
 {
 public:
   /// TAV_RC_BAD_PARAM for a text that is no path, a name that no element has among them.
   explicit Path(std::string_view text)
+      : Path(text, "understanding the path")
   {
-    detail::demand(parse(text), "understanding the path", [text] { return std::string(text); });
   }
   Path(std::string_view text, std::error_code& ec)
   {
-    detail::report(parse(text), ec);
+    detail::report(parse(text, nullptr), ec);
   }
 
   /// Calls `visit(node)` for every match below `start`, in stream order, until it returns false.
@@ -104,6 +109,8 @@ public:
   }
 
 private:
+  friend class Reader;
+
   struct Step
   {
     std::vector<uint16_t> ids; ///< empty: any
@@ -158,22 +165,49 @@ private:
     return !ec;
   }
 
-  uint32_t parse(std::string_view text)
+  Path(std::string_view text, const char* doing)
   {
-    text.remove_prefix(text.starts_with('/') ? 1 : 0);
+    std::string fault;
+    const uint32_t rc = parse(text, &fault);
+    detail::demand(rc, doing, [&] { return detail::Told{std::string(text), fault}; });
+  }
+
+  /// A place in a path, and where to tell what is wrong there.
+  struct Spot
+  {
+    std::string_view path;
+    size_t at;          ///< of the text's first byte
+    std::string* fault; ///< null: nobody asks
+
+    /// Tells that something is wrong at a place behind this one; always false.
+    bool fail(size_t behind, const std::string& what) const
+    {
+      if (fault != nullptr)
+      {
+        const std::string_view before = path.substr(0, at + behind);
+        const auto column = std::count_if(before.begin(), before.end(), [](char c) { return (c & 0xC0) != 0x80; });
+        *fault = "column " + std::to_string(column + 1) + ": " + what;
+      }
+      return false;
+    }
+  };
+
+  uint32_t parse(std::string_view path, std::string* fault)
+  {
+    size_t at = path.starts_with('/') ? 1 : 0;
     for (bool more = true; more;)
     {
-      const size_t slash = text.find('/');
+      const size_t slash = path.find('/', at);
       more = slash != std::string_view::npos;
       Step step;
-      if (!parseStep(text.substr(0, slash), step))
+      if (!parseStep(path.substr(at, slash - at), Spot{path, at, fault}, step))
       {
         steps_.clear();
         return TAV_RC_BAD_PARAM;
       }
       step.only = step.ids.size() == 1 ? step.ids.front() : uint16_t{0};
       steps_.push_back(std::move(step));
-      text.remove_prefix(more ? slash + 1 : text.size());
+      at = slash + 1;
     }
     isStraight_ = areStraight();
     return TAV_RC_OK;
@@ -186,19 +220,29 @@ private:
     return error == std::errc() && end == text.data() + text.size();
   }
 
-  static bool parseStep(std::string_view text, Step& step)
+  static bool parseStep(std::string_view text, const Spot& spot, Step& step)
   {
-    if (text.ends_with(']'))
+    const size_t bracket = text.find('[');
+    const std::string_view name = text.substr(0, bracket);
+    if (name.empty())
     {
-      const size_t bracket = text.rfind('[');
-      if (bracket == std::string_view::npos ||
-          !parseNumber(text.substr(bracket + 1, text.size() - bracket - 2), step.nth) || step.nth == 0)
-      {
-        return false;
-      }
-      text = text.substr(0, bracket);
+      return spot.fail(0, "a step is empty");
     }
-    return text == "*" || (!text.empty() && parseName(text, step.ids));
+    if (name != "*" && !parseName(name, spot, step.ids))
+    {
+      return false;
+    }
+    if (bracket == std::string_view::npos)
+    {
+      return true;
+    }
+    if (!text.ends_with(']'))
+    {
+      return spot.fail(bracket, "a [ without a ] at the end of its step");
+    }
+    const std::string_view place = text.substr(bracket + 1, text.size() - bracket - 2);
+    const bool isPlace = parseNumber(place, step.nth) && step.nth != 0;
+    return isPlace || spot.fail(bracket + 1, "'" + std::string(place) + "' is no place; the first is [1]");
   }
 
   static std::string_view trimmed(std::string_view name) noexcept
@@ -208,7 +252,13 @@ private:
     return first == std::string_view::npos ? std::string_view() : name.substr(first, end - first);
   }
 
-  static bool parseName(std::string_view text, std::vector<uint16_t>& ids)
+  static bool isNameOf(const dictionary::Entry& entry, std::string_view text) noexcept
+  {
+    return entry.constant == text || entry.tag == text || trimmed(entry.tag) == text || entry.name == text ||
+           trimmed(entry.name) == text;
+  }
+
+  static bool parseName(std::string_view text, const Spot& spot, std::vector<uint16_t>& ids)
   {
     uint16_t id = 0;
     if (parseNumber(text.substr(text.front() == '#' ? 1 : 0), id))
@@ -218,13 +268,28 @@ private:
     }
     for (const dictionary::Entry& entry : dictionary::entries()) // several elements can share a tag
     {
-      const bool named = entry.tag == text || entry.constant == text || trimmed(entry.name) == text;
-      if (named && entry.constant != "INVALID_ELEMENT")
+      if (isNameOf(entry, text) && entry.constant != "INVALID_ELEMENT")
       {
         ids.push_back(entry.id);
       }
     }
-    return !ids.empty();
+    return !ids.empty() || failName(text, spot);
+  }
+
+  [[gnu::noinline, gnu::cold]] static bool failName(std::string_view text, const Spot& spot)
+  {
+    if (spot.fault == nullptr)
+    {
+      return false;
+    }
+    const std::string quoted = "'" + std::string(text) + "'";
+    if (text.front() == '#' || (text.front() >= '0' && text.front() <= '9'))
+    {
+      return spot.fail(0, quoted + " is no id; they go from 0 to 65535");
+    }
+    const std::string_view nearest = detail::nearestTag(text);
+    return spot.fail(0, "no element is called " + quoted +
+                            (nearest.empty() ? "" : "; did you mean " + std::string(nearest) + "?"));
   }
 
   std::vector<Step> steps_;

@@ -6,6 +6,7 @@
 #include <cstdio>
 #include <filesystem>
 #include <memory>
+#include <new>
 #include <optional>
 #include <span>
 #include <string_view>
@@ -13,33 +14,13 @@
 #include <vector>
 
 #include "tav/cpp/path.hpp"
+#include "tav/cpp/print.hpp"
 
 namespace tav
 {
 
-/// What tav::Reader::print shows.
-struct PrintOptions
-{
-  bool xml = false;
-  bool data = true;
-  bool headers = false;
-  bool descriptors = false;
-  bool bare = false;       ///< the value alone, of a data element; TAV_RC_BAD_PARAM for all below a group
-  bool attributes = false; ///< in XML, the key elements of groups as attributes
-  bool subtree = true;     ///< all below the node, too
-};
-
 namespace detail
 {
-
-/// Below a data element there is nothing, which the operation takes for misuse.
-inline uint64_t printBits(const PrintOptions& options, const HeaderView& node) noexcept
-{
-  return (options.subtree && node.isGroup() ? TAV_PRINT_SUBTREE : 0) | (options.headers ? TAV_PRINT_HEADERS : 0) |
-         (options.data ? TAV_PRINT_DATA : 0) | (options.descriptors ? TAV_PRINT_DESCRIPTORS : 0) |
-         (options.bare ? TAV_PRINT_BARE : 0) | (options.xml ? TAV_PRINT_XML : 0) |
-         (options.attributes ? TAV_PRINT_ATTRIBUTES : 0);
-}
 
 /// Bytes in an object that ends with the call: a stream over them could not be read.
 template<class T>
@@ -145,19 +126,15 @@ public:
   [[nodiscard]] std::optional<Node> path(std::string_view path) const&
   {
     std::error_code ec;
-    std::optional<Node> node = this->path(path, ec);
+    const Path parsed = parse(path, nullptr);
+    std::optional<Node> node = first(parsed, ec);
     detail::demand(codeOf(ec), "searching", [path] { return std::string(path); });
     return node;
   }
   [[nodiscard]] std::optional<Node> path(std::string_view path, std::error_code& ec) const&
   {
-    std::optional<Node> found;
-    const auto keep = [&found](const Node& node) {
-      found = node;
-      return false;
-    };
-    visit(path, keep, ec);
-    return found;
+    const Path parsed = parse(path, &ec);
+    return ec ? std::nullopt : first(parsed, ec);
   }
   std::optional<Node> path(std::string_view path) const&& = delete;
   std::optional<Node> path(std::string_view path, std::error_code& ec) const&& = delete;
@@ -166,25 +143,24 @@ public:
   [[nodiscard]] std::vector<Node> all(std::string_view path) const&
   {
     std::error_code ec;
-    std::vector<Node> nodes = all(path, ec);
+    const Path parsed = parse(path, nullptr);
+    std::vector<Node> nodes = every(parsed, ec);
     detail::demand(codeOf(ec), "searching", [path] { return std::string(path); });
     return nodes;
   }
   [[nodiscard]] std::vector<Node> all(std::string_view path, std::error_code& ec) const&
   {
-    std::vector<Node> found;
-    const auto keep = [&found](const Node& node) {
-      found.push_back(node);
-      return true;
-    };
-    visit(path, keep, ec);
-    return found;
+    const Path parsed = parse(path, &ec);
+    return ec ? std::vector<Node>() : every(parsed, ec);
   }
   std::vector<Node> all(std::string_view path) const&& = delete;
   std::vector<Node> all(std::string_view path, std::error_code& ec) const&& = delete;
 
-  /// Prints the stream to a stream of the C library, standard output when null; returns the characters.
-  /// TAV_RC_NO_MEMORY when there is nothing to print, as for a group without its header and what is below.
+  /// Prints the stream to a stream of the C library, standard output when null; returns the characters. Every value
+  /// that a Group can add is printed, as tavPrintSubtree does it where it can: UTF-8 texts as they are, times with
+  /// their zone as ISO 8601, other types as the digits of their bytes. XML is well-formed and escaped; texts that it
+  /// cannot hold are digits, with encoding="hex". TAV_RC_NO_MEMORY when there is nothing to print, as for a group
+  /// without its header and what is below, and for more than 4,000 levels; KOR_RC_IO_ERROR when the stream refuses.
   uint64_t print(FILE* stream, const PrintOptions& options = {}) const
   {
     return print(stream, root(), options);
@@ -238,6 +214,11 @@ private:
   uint32_t open(TAVSideStorage* storage, const StreamOptions& options) noexcept
   {
     const uint32_t rc = detail::openHandle(storage, TAV_OPT_READ, options, state_->handle);
+    if (rc == TAV_RC_OK && state_->isBuffered())
+    {
+      // A ring over a writable storage writes back all that it held, over what another handle has written since.
+      state_->handle->pCircularBuf->storageWritable = 0;
+    }
     state_->settle();
     return rc;
   }
@@ -263,7 +244,9 @@ private:
 
   uint32_t openPath(const std::filesystem::path& path, const StreamOptions& options)
   {
-    const uint32_t rc = detail::openFile(path, KOR_FILE_READ, state_->owned);
+    std::unique_ptr<TAVSSFile> storage;
+    const uint32_t rc = detail::openFile(path, KOR_FILE_READ, storage);
+    state_->owned = std::move(storage);
     return rc != TAV_RC_OK ? rc : open(state_->owned.get(), options);
   }
 
@@ -314,17 +297,44 @@ private:
     return rc == TAV_RC_NOT_FOUND ? TAV_RC_OK : rc;
   }
 
+  /// Without `ec` a text that is no path throws.
+  static Path parse(std::string_view path, std::error_code* ec)
+  {
+    return ec != nullptr ? Path(path, *ec) : Path(path, "searching");
+  }
+
+  [[nodiscard]] std::optional<Node> first(const Path& path, std::error_code& ec) const
+  {
+    std::optional<Node> found;
+    const auto keep = [&found](const Node& node) {
+      found = node;
+      return false;
+    };
+    visit(path, keep, ec);
+    return found;
+  }
+
+  [[nodiscard]] std::vector<Node> every(const Path& path, std::error_code& ec) const
+  {
+    std::vector<Node> found;
+    const auto keep = [&found](const Node& node) {
+      found.push_back(node);
+      return true;
+    };
+    visit(path, keep, ec);
+    return found;
+  }
+
   /// Calls `keep(node)` for the matches of a path that begins with the root's name.
   template<class Keep>
-  void visit(std::string_view path, Keep& keep, std::error_code& ec) const
+  void visit(const Path& path, Keep& keep, std::error_code& ec) const
   {
-    const Path parsed(path, ec);
-    const Node first = ec ? Node() : root(ec);
-    if (ec || !parsed.beginsWith(first))
+    const Node first = root(ec);
+    if (ec || !path.beginsWith(first))
     {
       return;
     }
-    const Path rest = parsed.rest();
+    const Path rest = path.rest();
     if (rest.empty())
     {
       keep(first);
@@ -340,10 +350,19 @@ private:
     {
       return TAV_RC_BAD_PARAM;
     }
-    TAVHeaderData start{};
-    const uint32_t rc = tavReadNodeInt(0, used, node.offset(), node.width() == Width::bits64, &start);
-    TAVPrintParam param{0, nullptr, 0, stream};
-    return rc == TAV_RC_OK ? tavPrintSubtree(detail::printBits(options, node), used, &start, &param, &characters) : rc;
+    try
+    {
+      Node start;
+      detail::Printer printer(stream, options, state_->isSwapped());
+      const uint32_t read = readAt(node.offset(), node.width(), start);
+      const uint32_t rc = read == TAV_RC_OK ? printer.print(start) : read;
+      characters = printer.count();
+      return rc;
+    }
+    catch (const std::bad_alloc&)
+    {
+      return TAV_RC_NO_MEMORY;
+    }
   }
 
   uint32_t check() const noexcept

@@ -1,18 +1,17 @@
 /// @file storage.hpp
-/// What readers and writers sit on: options, files, and a block that grows.
+/// What readers and writers sit on: options, handles, and a block that grows.
 #pragma once
 
 #include <algorithm>
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
-#include <filesystem>
 #include <memory>
 #include <new>
-#include <string>
 #include <utility>
 
 #include "tav/cpp/error.hpp"
+#include "tav/cpp/file.hpp"
 #include "tav/cpp/values.hpp"
 
 namespace tav
@@ -27,21 +26,8 @@ struct StreamOptions
   uint64_t ringBytes = 10ULL << 20U; ///< memory of the ring over a file; a data element can be as large, not larger
 };
 
-/// How a file is written.
-struct FileOptions
-{
-  bool overwrite = false; ///< replace an existing file instead of refusing it
-};
-
 namespace detail
 {
-
-/// A file's name in UTF-8, as it is opened and as messages show it.
-inline std::string fileText(const std::filesystem::path& path)
-{
-  const std::u8string name = path.u8string(); // string() throws where a locale lacks a letter
-  return std::string(name.begin(), name.end());
-}
 
 /// Opens a handle over a storage.
 inline uint32_t openHandle(TAVSideStorage* storage, uint64_t mode, const StreamOptions& options,
@@ -52,17 +38,6 @@ inline uint32_t openHandle(TAVSideStorage* storage, uint64_t mode, const StreamO
                      options.byteOrder == ByteOrder::swapped ? TAV_BYTE_ORDER_SWAPPED : uint8_t{0},
                      options.align8 ? uint8_t{1} : uint8_t{0});
   return tavInitHandle(&handle, &param);
-}
-
-inline uint32_t openFile(const std::filesystem::path& path, uint64_t options, std::unique_ptr<TAVSideStorage>& storage)
-{
-  const std::string name = fileText(path);
-  KORFileOpenParam param;
-  param.pPath = name.c_str();
-  param.options = options;
-  uint32_t rc = TAV_RC_OK;
-  storage.reset(new (std::nothrow) TAVSSFile(&param, &rc));
-  return storage != nullptr ? rc : TAV_RC_NO_MEMORY;
 }
 
 /// A block of memory that grows ahead of what is written. The handle addresses it directly, so it is told of each move.

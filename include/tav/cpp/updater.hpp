@@ -11,6 +11,7 @@
 #include "tav/cpp/encode.hpp"
 #include "tav/cpp/header.hpp"
 #include "tav/cpp/storage.hpp"
+#include "tav/cpp/writerState.hpp"
 
 namespace tav
 {
@@ -36,10 +37,38 @@ uint32_t updateValue(TAVHandle* handle, const HeaderView& node, const T& value) 
         return TAV_RC_OUTSIDE_PARENT;
       }
       TAVHeaderData data{node.header(), const_cast<uint8_t*>(bytes), size, 0}; // only read
-      return tavUpdateElement(0, handle, &data);
+      const uint32_t rc = tavUpdateElement(0, handle, &data);
+      return rc == TAV_RC_OK ? rc : causeOf(rc, handle);
     };
-    return handle != nullptr ? withPayload(value, write) : TAV_RC_BAD_PARAM;
+    return handle != nullptr ? withPayloadFor(node.type(), value, write) : TAV_RC_BAD_PARAM;
   }
+}
+
+/// What there is to say of an update that was refused.
+template<Addable T>
+[[gnu::noinline, gnu::cold]] Told tellUpdate(uint32_t rc, const HeaderView& node, const T& value)
+{
+  Told told{nodeText(node), {}};
+  static_cast<void>(withPayloadFor(node.type(), value, [&](uint16_t type, const uint8_t*, uint64_t size) {
+    if (rc == TAV_RC_NOT_SUPPORTED)
+    {
+      told.sentence = "the node is " + typeText(node.type()) + ", the value " + typeText(type);
+    }
+    if (rc == TAV_RC_OUTSIDE_PARENT)
+    {
+      told.sentence = "the node has " + std::to_string(node.size()) + " bytes, the value " + std::to_string(size);
+    }
+    return TAV_RC_OK;
+  }));
+  if (told.sentence.empty() && rc == TAV_RC_BAD_PARAM)
+  {
+    told.sentence = "the stream has no such node";
+  }
+  if (const char* const refusal = refusalOf(value, rc); refusal != nullptr)
+  {
+    told.sentence = refusal;
+  }
+  return told;
 }
 
 } // namespace detail
@@ -61,13 +90,20 @@ public:
 
   /// In a file, through a ring: a change is in the file after finish(), and a reader that has a ring of its own may
   /// show the old value until it is opened again. An element larger than the ring gives TAV_RC_DATA_TOO_LARGE.
-  explicit Updater(const std::filesystem::path& path, const StreamOptions& options = {})
+  /// A file that a writer has locked is refused with KOR_RC_LOCKED; of the file options `lock` counts.
+  explicit Updater(const std::filesystem::path& path, const StreamOptions& options = {}, const FileOptions& file = {})
   {
-    detail::demand(openPath(path, options), "opening for updating", [&path] { return detail::fileText(path); });
+    const detail::FileOutcome opened = openPath(path, options, file);
+    detail::demand(opened.code, "opening for updating", [&] { return detail::tellFile(path, opened); });
   }
   Updater(const std::filesystem::path& path, const StreamOptions& options, std::error_code& ec)
+      : Updater(path, options, FileOptions{}, ec)
   {
-    detail::report(openPath(path, options), ec);
+  }
+  Updater(const std::filesystem::path& path, const StreamOptions& options, const FileOptions& file,
+          std::error_code& ec)
+  {
+    detail::report(openPath(path, options, file).code, ec);
   }
 
   /// In any storage, which outlives the updater.
@@ -104,7 +140,8 @@ public:
   template<class T>
   void update(const HeaderView& node, const T& value)
   {
-    detail::demand(detail::updateValue(handle_, node, value), "updating", [&node] { return detail::nodeText(node); });
+    const uint32_t rc = detail::updateValue(handle_, node, value);
+    detail::demand(rc, "updating", [&] { return detail::tellUpdate(rc, node, value); });
   }
   template<class T>
   void update(const HeaderView& node, const T& value, std::error_code& ec) noexcept
@@ -136,10 +173,13 @@ private:
     return block.empty() ? TAV_RC_BAD_PARAM : open(owned_.get(), options);
   }
 
-  uint32_t openPath(const std::filesystem::path& path, const StreamOptions& options)
+  detail::FileOutcome openPath(const std::filesystem::path& path, const StreamOptions& options,
+                               const FileOptions& file)
   {
-    const uint32_t rc = detail::openFile(path, KOR_FILE_UPDATE, owned_);
-    return rc != TAV_RC_OK ? rc : open(owned_.get(), options);
+    std::unique_ptr<TAVSSFile> storage;
+    const detail::FileOutcome opened = detail::openLocked(path, KOR_FILE_UPDATE, file.lock, storage);
+    owned_ = std::move(storage);
+    return opened.code != TAV_RC_OK ? opened : detail::FileOutcome{open(owned_.get(), options)};
   }
 
   uint32_t flush() noexcept

@@ -31,6 +31,38 @@ enum class Width : uint8_t
   bits64 = TAV_HDR_64
 };
 
+/// An element's id as it is given where a node is written. One beyond 65,535 is refused with TAV_RC_BAD_PARAM: it does
+/// not become another.
+class ElementId
+{
+public:
+  template<class Number>
+  requires(std::integral<Number> || (std::is_enum_v<Number> && std::is_convertible_v<Number, uint64_t>))
+      // NOLINTNEXTLINE(google-explicit-constructor): ids are given as numbers
+      constexpr ElementId(Number id) noexcept
+      : number_(static_cast<uint64_t>(id))
+  {
+  }
+
+  [[nodiscard]] constexpr bool isValid() const noexcept
+  {
+    return number_ <= UINT16_MAX;
+  }
+  /// The id, when it is valid.
+  [[nodiscard]] constexpr uint16_t id() const noexcept
+  {
+    return static_cast<uint16_t>(number_);
+  }
+  /// What was given; a negative number stands at the other end.
+  [[nodiscard]] constexpr uint64_t number() const noexcept
+  {
+    return number_;
+  }
+
+private:
+  uint64_t number_;
+};
+
 inline constexpr uint16_t kCodePageUtf8 = 1208;
 
 /// UTF-8 text that is somewhere else: to be written, as an ordinary element that a walk passes correctly, or as a view

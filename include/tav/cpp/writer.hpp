@@ -44,16 +44,19 @@ public:
     detail::report(openBlock(block, options), ec);
   }
 
-  /// Into a file, through a ring. An existing file is refused unless it is to be overwritten.
+  /// Into a file, through a ring. An existing file is refused unless it is to be overwritten, and one that another
+  /// writer has locked with KOR_RC_LOCKED. Until finish() a file that is overwritten stays as it is: the stream is
+  /// written beside it, and takes its place, its mode and, where that is allowed, its owner. See FileOptions.
   explicit Writer(const std::filesystem::path& path, const FileOptions& file = {}, const StreamOptions& options = {})
       : Writer(Unopened::state)
   {
-    detail::demand(openPath(path, file, options), "opening for writing", [&path] { return detail::fileText(path); });
+    const detail::FileOutcome opened = openPath(path, file, options);
+    detail::demand(opened.code, "opening for writing", [&] { return detail::tellFile(path, opened); });
   }
   Writer(const std::filesystem::path& path, const FileOptions& file, const StreamOptions& options, std::error_code& ec)
       : Writer(Unopened::state)
   {
-    detail::report(openPath(path, file, options), ec);
+    detail::report(openPath(path, file, options).code, ec);
   }
 
   /// Into any storage, which outlives the writer.
@@ -81,39 +84,40 @@ public:
   {
     if (state_)
     {
-      state_->closeHandle(); // groups that are still there answer errors from now on
+      state_->letGo(); // groups that are still there answer errors from now on
     }
   }
 
   /// Opens the stream's root group, with the header form of StreamOptions::root.
-  Group group(uint16_t elm, const GroupOptions& options = {}) &
+  Group group(ElementId elm, const GroupOptions& options = {}) &
   {
     uint32_t rc = TAV_RC_OK;
     Group root = Group::open(state_, 0, elm, options, rc);
-    detail::demand(rc, "opening the group", [elm] { return detail::elementText(elm); });
+    detail::demand(rc, "opening the group", [&] { return Group::tellOf(state_, 0, rc, elm, options, nullptr); });
     return root;
   }
-  Group group(uint16_t elm, const GroupOptions& options, std::error_code& ec) & noexcept
+  Group group(ElementId elm, const GroupOptions& options, std::error_code& ec) & noexcept
   {
     uint32_t rc = TAV_RC_OK;
     Group root = Group::open(state_, 0, elm, options, rc);
     detail::report(rc, ec);
     return root;
   }
-  Group group(uint16_t elm, std::error_code& ec) & noexcept
+  Group group(ElementId elm, std::error_code& ec) & noexcept
   {
     return group(elm, GroupOptions{}, ec);
   }
-  Group group(uint16_t, const GroupOptions& = {}) && = delete;
-  Group group(uint16_t, const GroupOptions&, std::error_code&) && = delete;
-  Group group(uint16_t, std::error_code&) && = delete;
+  Group group(ElementId, const GroupOptions& = {}) && = delete;
+  Group group(ElementId, const GroupOptions&, std::error_code&) && = delete;
+  Group group(ElementId, std::error_code&) && = delete;
 
   /// Gives a data element of this stream another value, of the same type and size: what Updater::update does.
   template<class T>
   void update(const HeaderView& node, const T& value)
   {
     TAVHandle* const handle = state_ ? state_->handle : nullptr;
-    detail::demand(detail::updateValue(handle, node, value), "updating", [&node] { return detail::nodeText(node); });
+    const uint32_t rc = detail::updateValue(handle, node, value);
+    detail::demand(rc, "updating", [&] { return detail::tellUpdate(rc, node, value); });
   }
   template<class T>
   void update(const HeaderView& node, const T& value, std::error_code& ec) noexcept
@@ -126,9 +130,11 @@ public:
   /// After a failure it can be called again, and after a success it does nothing.
   void finish()
   {
-    detail::demand(end(), "finishing a stream");
+    detail::demand(end(), "finishing a stream", [this] {
+      return detail::Told{{}, state_ ? state_->refusal(0) : "the writer was moved from"};
+    });
   }
-  void finish(std::error_code& ec) noexcept
+  void finish(std::error_code& ec)
   {
     detail::report(end(), ec);
   }
@@ -191,14 +197,16 @@ private:
     return block.empty() ? TAV_RC_BAD_PARAM : open(state_->owned.get(), options);
   }
 
-  uint32_t openPath(const std::filesystem::path& path, const FileOptions& file, const StreamOptions& options)
+  detail::FileOutcome openPath(const std::filesystem::path& path, const FileOptions& file,
+                               const StreamOptions& options)
   {
-    const uint64_t existing = file.overwrite ? KOR_FILE_TRUNCATE : KOR_FILE_EXCLUSIVE;
-    const uint32_t rc = detail::openFile(path, KOR_FILE_UPDATE | KOR_FILE_CREATE | existing, state_->owned);
-    return rc != TAV_RC_OK ? rc : open(state_->owned.get(), options);
+    std::unique_ptr<TAVSSFile> storage;
+    const detail::FileOutcome opened = detail::openForWriting(path, file, storage, state_->replacement);
+    state_->owned = std::move(storage);
+    return opened.code != TAV_RC_OK ? opened : detail::FileOutcome{open(state_->owned.get(), options)};
   }
 
-  uint32_t end() noexcept
+  uint32_t end()
   {
     if (!state_)
     {
@@ -206,18 +214,22 @@ private:
     }
     if (state_->handle == nullptr)
     {
-      return state_->isFinished ? TAV_RC_OK : TAV_RC_BAD_PARAM;
+      return state_->isFinished ? takePlace() : TAV_RC_BAD_PARAM;
     }
     uint32_t rc = state_->enter(0);
     if (rc == TAV_RC_OK && state_->handle->pCircularBuf != nullptr)
     {
       rc = state_->handle->pCircularBuf->reset(); // tavTermHandle would hide a failure
     }
+    if (rc == TAV_RC_OK && state_->replacement != nullptr)
+    {
+      rc = state_->replacement->prepare(static_cast<TAVSSFile&>(*state_->owned));
+    }
     return rc == TAV_RC_OK ? letGo() : rc;
   }
 
   /// Closes the handle and the file.
-  uint32_t letGo() noexcept
+  uint32_t letGo()
   {
     detail::WriterState& state = *state_;
     state.finished = state.bytes();
@@ -228,8 +240,24 @@ private:
     {
       return TAV_RC_OK;
     }
-    const uint32_t rc = static_cast<TAVSSFile&>(*state.owned).pFile->close();
+    state.unclosed = static_cast<TAVSSFile&>(*state.owned).pFile->close();
     state.owned.reset();
+    return takePlace();
+  }
+
+  /// The file that was written beside another one takes its place; one whose last bytes are lost does not.
+  uint32_t takePlace()
+  {
+    detail::WriterState& state = *state_;
+    if (state.unclosed != TAV_RC_OK || state.replacement == nullptr)
+    {
+      return state.replacement == nullptr ? std::exchange(state.unclosed, TAV_RC_OK) : state.unclosed;
+    }
+    const uint32_t rc = state.replacement->commit();
+    if (rc == TAV_RC_OK)
+    {
+      state.replacement.reset();
+    }
     return rc;
   }
 

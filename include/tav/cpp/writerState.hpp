@@ -8,6 +8,7 @@
 #include <span>
 #include <utility>
 
+#include "tav/cpp/header.hpp"
 #include "tav/cpp/storage.hpp"
 
 namespace tav
@@ -39,6 +40,15 @@ uint32_t infoOf(const Options& options) noexcept
   return (options.info & ~TAV_INFO_ALIGNED8) | options.infoKey | (options.eyeSize ? TAV_INFO_EYE_SIZE : 0);
 }
 
+/// The code of an operation, or what made it refuse: through a ring a small write whose page could not be brought in
+/// answers TAV_RC_BAD_PARAM, and the ring knows why.
+[[gnu::noinline, gnu::cold]] inline uint32_t causeOf(uint32_t code, const TAVHandle* handle) noexcept
+{
+  const bool canTell = handle != nullptr && handle->pCircularBuf != nullptr;
+  const uint32_t cause = canTell ? handle->pCircularBuf->takeWriteFailure() : TAV_RC_OK;
+  return code == TAV_RC_BAD_PARAM && cause != TAV_RC_OK ? cause : code;
+}
+
 /// Kept by a plain count: a writer and its groups belong to one thread.
 struct WriterState
 {
@@ -46,6 +56,7 @@ struct WriterState
 
   uint32_t users = 1;
   TAVHandle* handle = nullptr;
+  std::unique_ptr<Replacement> replacement; ///< a file that stays until the stream is complete
   std::unique_ptr<TAVSideStorage> owned;
   std::unique_ptr<GrowingBlock> block;
   Width root = Width::bits64;
@@ -53,10 +64,12 @@ struct WriterState
   uint32_t innermost = 0;              ///< level of the innermost Group that is there and open; 1 for the root
   uint32_t orphans = 0;                ///< groups inside it that are still open, their Group objects gone
   uint32_t deferred = TAV_RC_OK;       ///< the first failure that a destructor could not report
+  bool toldDeferred = false;           ///< the last operation has reported it
   std::span<const std::byte> finished; ///< the stream, when it was in memory, after its end
   uint64_t finishedSize = 0;
   bool isFinished = false;
-  bool isShared = false; ///< the handle was given away: plain operations can open and close groups
+  uint32_t unclosed = TAV_RC_OK; ///< what closing the file answered
+  bool isShared = false;         ///< the handle was given away: plain operations can open and close groups
 
   WriterState() = default;
   WriterState(const WriterState&) = delete;
@@ -73,6 +86,14 @@ struct WriterState
       tavTermHandle(&handle);
     }
     settle();
+  }
+
+  /// The end of a writer that was not finished: of a file that was to be replaced nothing is left but the old one.
+  void letGo() noexcept
+  {
+    closeHandle();
+    owned.reset();
+    replacement.reset();
   }
 
   /// After whatever `enter` and `width` look at has changed: nodes are added by the dozen in between.
@@ -108,11 +129,12 @@ struct WriterState
   /// report comes first; then groups that a destructor could not end are ended, in the way in which this one is.
   uint32_t enter(uint32_t level, uint64_t how = 0) noexcept
   {
+    toldDeferred = deferred != TAV_RC_OK;
     if (handle == nullptr)
     {
       return TAV_RC_BAD_PARAM;
     }
-    if (deferred != TAV_RC_OK) [[unlikely]]
+    if (toldDeferred) [[unlikely]]
     {
       const uint32_t rc = std::exchange(deferred, TAV_RC_OK);
       settle();
@@ -134,6 +156,36 @@ struct WriterState
     return TAV_RC_OK;
   }
 
+  /// Why `enter` has refused an operation on the group at a level, or on the stream; empty when it has not.
+  [[nodiscard]] std::string refusal(uint32_t level) const
+  {
+    if (handle == nullptr)
+    {
+      return isFinished ? "the stream is finished" : "the writer is gone";
+    }
+    if (toldDeferred)
+    {
+      return "a group that went out of scope before could not be closed";
+    }
+    if (level == kNoLevel)
+    {
+      return "the group is closed";
+    }
+    if (depth() < level + orphans)
+    {
+      return "groups were closed by plain operations";
+    }
+    if (innermost == level && depth() == level + orphans)
+    {
+      return {};
+    }
+    const TAVHdrStack& stack = *handle->pHdrStack;
+    const std::string open = placeText(HeaderView(stack.pEntries[stack.count - 1]));
+    const uint32_t others = depth() - level - 1;
+    return "the group " + open + (others == 0 ? "" : " and " + std::to_string(others) + " around it") +
+           (level == 0 ? "" : ", inside it,") + (others == 0 ? " is" : " are") + " still open";
+  }
+
   uint32_t reserve(uint64_t bytes) noexcept
   {
     constexpr uint64_t around = 128; // header, padding, pair, an end element
@@ -153,7 +205,7 @@ struct WriterState
     fillHeader(node, true, type, elm, infoOf(options), size);
     node.pDataBuf = const_cast<uint8_t*>(bytes != nullptr ? bytes : &nothing); // only read
     node.dataBufSize = size;
-    return tavAddElement(0, handle, &node);
+    return told(tavAddElement(0, handle, &node));
   }
 
   /// Appends a data element with the header form that the open group prescribes.
@@ -173,13 +225,13 @@ struct WriterState
     fillHeader(node, wide, type, elm, infoOf(options), size);
     node.pDataBuf = const_cast<uint8_t*>(bytes != nullptr ? bytes : &nothing); // only read
     node.dataBufSize = size;
-    return tavAddElement(0, handle, &node);
+    return told(tavAddElement(0, handle, &node));
   }
 
   /// Opens a group of unknown size.
-  uint32_t openGroup(uint16_t elm, const GroupOptions& options) noexcept
+  uint32_t openGroup(ElementId elm, const GroupOptions& options) noexcept
   {
-    if (options.infoKey > TAV_INFO_KEY_MASK)
+    if (options.infoKey > TAV_INFO_KEY_MASK || !elm.isValid())
     {
       return TAV_RC_BAD_PARAM;
     }
@@ -190,9 +242,9 @@ struct WriterState
     const bool wide = quick != kNoLevel || width() == Width::bits64;
     const auto type = static_cast<uint16_t>(wide ? options.children : Width::bits32);
     TAVHeaderData node{};
-    fillHeader(node, wide, type, elm, infoOf(options), wide ? TAV_SIZE_UNKNOWN : layout::kSizeUnknown32);
+    fillHeader(node, wide, type, elm.id(), infoOf(options), wide ? TAV_SIZE_UNKNOWN : layout::kSizeUnknown32);
     const uint64_t start = handle->streamBytes;
-    const uint32_t rc = tavAddElement(0, handle, &node);
+    const uint32_t rc = told(tavAddElement(0, handle, &node));
     if (rc != TAV_RC_OK)
     {
       handle->streamBytes = start; // a group that is nested too deeply has left its header
@@ -207,13 +259,19 @@ struct WriterState
     uint32_t rc = reserve(0);
     if (rc == TAV_RC_OK)
     {
-      rc = tavCloseHeader(how, handle);
+      rc = told(tavCloseHeader(how, handle));
     }
     if (rc == TAV_RC_OK && block != nullptr && handle->streamBytes < end)
     {
       block->clear(handle->streamBytes, end);
     }
     return rc;
+  }
+
+  /// The code of a plain operation, and the cause where the code hides it.
+  [[gnu::always_inline]] uint32_t told(uint32_t code) const noexcept
+  {
+    return code == TAV_RC_OK ? code : causeOf(code, handle);
   }
 
   static void fillHeader(TAVHeaderData& node, bool wide, uint16_t type, uint16_t elm, uint32_t info,

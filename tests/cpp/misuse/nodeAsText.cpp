@@ -1,4 +1,4 @@
-// EXPECT: (no matching|no match)
+// EXPECT: as<T>\(\) takes a sized integer, .*std::chrono::sys_time
 #include <string_view>
 #include <vector>
 

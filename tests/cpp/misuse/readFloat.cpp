@@ -1,4 +1,5 @@
-// EXPECT: (no matching|no match)
+// EXPECT: as<T>\(\) takes a sized integer, .*std::chrono::sys_time
+// AND: \bfloat\b
 #include <string_view>
 #include <vector>
 

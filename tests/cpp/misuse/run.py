@@ -4,7 +4,8 @@
     run.py COMPILER [FLAG...]
 
 Every source beside this script but control.cpp begins with `// EXPECT: REGULAR EXPRESSION`: it must be refused, with a
-message that matches. control.cpp must be accepted, so that a refusal says something.
+message that matches; after it `// AND: REGULAR EXPRESSION` may say what else the compiler tells beside its messages, and
+`// STANDARD: NAME` which language it is told to take. control.cpp must be accepted, so that a refusal says something.
 """
 import concurrent.futures
 import pathlib
@@ -12,28 +13,30 @@ import re
 import subprocess
 import sys
 
-EXPECT = re.compile(r"// EXPECT: (?P<message>.+)\n")
-FLAGS = ["-std=c++20", "-fsyntax-only", "-Werror=unused-result", "-Werror=unused-value"]
+EXPECT = re.compile(r"// EXPECT: (?P<message>.+)\n(?:// AND: (?P<told>.+)\n)?(?:// STANDARD: (?P<standard>.+)\n)?")
+FLAGS = ["-fsyntax-only", "-Werror=unused-result", "-Werror=unused-value"]
 
 
-def compiles(compiler, source):
+def compiles(compiler, source, standard):
     """Returns (whether the source was accepted, what the compiler said)."""
-    result = subprocess.run([*compiler, *FLAGS, str(source)], capture_output=True, text=True, check=False)
+    result = subprocess.run([*compiler, f"-std={standard}", *FLAGS, str(source)], capture_output=True, text=True, check=False)
     return result.returncode == 0, result.stderr
 
 
 def fault(compiler, source):
     """What is wrong with how the compiler takes a source, or None."""
-    accepted, said = compiles(compiler, source)
+    expected = EXPECT.match(source.read_text(encoding="utf-8"))
+    if expected is None and source.name != "control.cpp":
+        return "does not begin with // EXPECT: and what the compiler has to say"
+    standard = expected["standard"] if expected is not None else None
+    accepted, said = compiles(compiler, source, standard or "c++20")
     if source.name == "control.cpp":
         return None if accepted else f"is refused:\n{said}"
-    expected = EXPECT.match(source.read_text(encoding="utf-8"))
-    if expected is None:
-        return "does not begin with // EXPECT: and what the compiler has to say"
     if accepted:
         return "compiles"
     errors = "\n".join(line for line in said.splitlines() if "error:" in line)
-    return None if re.search(expected["message"], errors) else f"is refused for another reason:\n{errors}"
+    told = expected["told"] is None or re.search(expected["told"], said)
+    return None if told and re.search(expected["message"], errors) else f"is refused for another reason:\n{errors}"
 
 
 def main(arguments):

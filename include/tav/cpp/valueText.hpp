@@ -1,0 +1,245 @@
+/// @file valueText.hpp
+/// Values as characters, for Reader::print.
+#pragma once
+
+#include <array>
+#include <chrono>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <string>
+#include <string_view>
+
+#include "tav/cpp/decode.hpp"
+#include "tav/cpp/text.hpp"
+
+namespace tav::detail
+{
+
+/// Whether XML can hold a text: well-formed UTF-8 without control characters but tab and line ends, and without U+FFFE
+/// and U+FFFF.
+inline bool isXmlText(std::string_view text) noexcept
+{
+  while (!text.empty())
+  {
+    const size_t length = characterLength(text);
+    const std::string_view character = text.substr(0, length);
+    const bool steers = length == 1 && static_cast<uint8_t>(text[0]) < 0x20 && text[0] != '\t' && text[0] != '\n' &&
+                        text[0] != '\r';
+    if (length == 0 || steers || character == "\xEF\xBF\xBE" || character == "\xEF\xBF\xBF")
+    {
+      return false;
+    }
+    text.remove_prefix(length);
+  }
+  return true;
+}
+
+/// Appends a text in the form that XML takes in an element or, where line ends would become blanks, between quotes.
+inline void appendXml(std::string& to, std::string_view text, bool quoted)
+{
+  for (const char c : text)
+  {
+    switch (c)
+    {
+    case '&':
+      to += "&amp;";
+      break;
+    case '<':
+      to += "&lt;";
+      break;
+    case '>':
+      to += "&gt;";
+      break;
+    case '"':
+      to += "&quot;";
+      break;
+    case '\r':
+      to += "&#13;";
+      break;
+    case '\n':
+      to += quoted ? "&#10;" : "\n";
+      break;
+    case '\t':
+      to += quoted ? "&#9;" : "\t";
+      break;
+    default:
+      to += c;
+    }
+  }
+}
+
+inline void appendHex(std::string& to, const uint8_t* bytes, size_t size)
+{
+  constexpr std::string_view digits = "0123456789ABCDEF";
+  for (size_t i = 0; i < size; ++i)
+  {
+    to += digits[bytes[i] >> 4U];
+    to += digits[bytes[i] & 0xFU];
+  }
+}
+
+/// A moment with the offset of its time zone: "2024-05-01T12:20:30.123456+02:00"; of a year beyond 9999 the seconds.
+inline std::string timeText(const TAVTimeStamp& stamp)
+{
+  using namespace std::chrono;
+  constexpr uint64_t endOf9999 = 253402300800;
+  constexpr uint64_t million = 1'000'000;
+  // Each fraction holds more than its unit needs: what is above a second belongs to the seconds.
+  const uint64_t fraction = uint64_t{stamp.fractionA} * 1000 + stamp.fractionB;
+  const int64_t shift = static_cast<int64_t>(fraction / million) + int64_t{stamp.offsetMinutes} * 60;
+  if (stamp.seconds >= endOf9999 || static_cast<int64_t>(stamp.seconds) + shift >= static_cast<int64_t>(endOf9999))
+  {
+    return std::to_string(stamp.seconds) + " s";
+  }
+  const sys_seconds time{seconds(static_cast<int64_t>(stamp.seconds) + shift)};
+  const sys_days day = floor<days>(time);
+  const year_month_day date{day};
+  const hh_mm_ss<seconds> clock{time - day};
+  const auto east = static_cast<unsigned>(std::abs(int{stamp.offsetMinutes}));
+  std::array<char, 64> text{};
+  std::snprintf(text.data(), text.size(), "%04d-%02u-%02uT%02d:%02d:%02d.%06u%c%02u:%02u", int{date.year()},
+                unsigned{date.month()}, unsigned{date.day()}, static_cast<int>(clock.hours().count()),
+                static_cast<int>(clock.minutes().count()), static_cast<int>(clock.seconds().count()),
+                static_cast<unsigned>(fraction % million), stamp.offsetMinutes < 0 ? '-' : '+', east / 60, east % 60);
+  return text.data();
+}
+
+/// The digits of a 128-bit number.
+inline std::string longText(const Sint128& number)
+{
+  const bool negative = number.high < 0;
+  auto high = static_cast<uint64_t>(number.high);
+  uint64_t low = number.low;
+  if (negative)
+  {
+    low = ~low + 1;
+    high = ~high + (low == 0 ? 1 : 0);
+  }
+  std::array<uint32_t, 4> words{static_cast<uint32_t>(high >> 32U), static_cast<uint32_t>(high),
+                                static_cast<uint32_t>(low >> 32U), static_cast<uint32_t>(low)};
+  std::string text;
+  uint32_t left = 0;
+  do
+  {
+    uint64_t remainder = 0;
+    left = 0;
+    for (uint32_t& word : words)
+    {
+      const uint64_t part = remainder << 32U | word;
+      word = static_cast<uint32_t>(part / 10);
+      remainder = part % 10;
+      left |= word;
+    }
+    text.insert(text.begin(), static_cast<char>('0' + remainder));
+  } while (left != 0);
+  return negative ? '-' + text : text;
+}
+
+/// A value as it is printed.
+struct ValueText
+{
+  std::string text;
+  bool isText = false; ///< characters of the stream, which XML has to escape and cannot always hold
+  bool isHex = false;  ///< the bytes' digits, in place of a value
+  uint16_t codePage = kCodePageUtf8;
+};
+
+template<class Number>
+std::string numberText(const RawValue& raw)
+{
+  Number number{};
+  static_cast<void>(decode(raw, number));
+  return std::to_string(number);
+}
+
+inline std::string wordsText(const RawValue& raw)
+{
+  std::vector<uint64_t> words;
+  static_cast<void>(decode(raw, words));
+  std::string text;
+  for (const uint64_t word : words)
+  {
+    text += std::to_string(word);
+  }
+  return text;
+}
+
+inline std::string hexText(const RawValue& raw)
+{
+  std::string text;
+  std::array<uint8_t, 16> number{};
+  size_t done = 0;
+  if (raw.type == TAV_TYPE_UINT128 && raw.swap && raw.size >= number.size())
+  {
+    layout::swapPayload(layout::SwapRule::one128, raw.bytes, number.data(), number.size());
+    appendHex(text, number.data(), number.size());
+    done = number.size();
+  }
+  appendHex(text, raw.bytes + done, raw.length() - done);
+  return text;
+}
+
+/// The bytes as they stand in the stream.
+inline ValueText bytesText(const RawValue& raw)
+{
+  ValueText value{.text = {}, .isHex = true};
+  appendHex(value.text, raw.bytes, raw.length());
+  return value;
+}
+
+/// A value in the form in which the plain operation prints it, but for moments, of which it shows others. What it does
+/// not print, a type or a size without a value, is the digits of the bytes.
+inline ValueText valueText(const RawValue& raw)
+{
+  const uint8_t exact = layout::typeInfo(raw.type).valueSize;
+  const std::string_view characters(reinterpret_cast<const char*>(raw.bytes), raw.length());
+  if (exact != 0 && raw.size != exact)
+  {
+    return bytesText(raw);
+  }
+  switch (raw.type)
+  {
+  case TAV_TYPE_ASCII_STRING:
+  case TAV_TYPE_SINT8: // a character, as the plain operation prints it
+  case TAV_TYPE_BYTE:
+    return {.text = std::string(characters), .isText = true};
+  case TAV_TYPE_UINT16:
+    return {.text = numberText<uint16_t>(raw)};
+  case TAV_TYPE_SINT16:
+    return {.text = numberText<int16_t>(raw)};
+  case TAV_TYPE_UINT32:
+    return {.text = numberText<uint32_t>(raw)};
+  case TAV_TYPE_SINT32:
+    return {.text = numberText<int32_t>(raw)};
+  case TAV_TYPE_UINT64:
+    return {.text = numberText<uint64_t>(raw)};
+  case TAV_TYPE_SINT64:
+    return {.text = numberText<int64_t>(raw)};
+  default:
+    break;
+  }
+  TAVTimeStamp stamp{};
+  if (decode(raw, stamp) == TAV_RC_OK)
+  {
+    return {.text = timeText(stamp)};
+  }
+  Utf8 text;
+  if (decode(raw, text) == TAV_RC_OK)
+  {
+    return {.text = std::string(text.text), .isText = true, .codePage = text.codePage};
+  }
+  Sint128 number;
+  if (decode(raw, number) == TAV_RC_OK)
+  {
+    return {.text = longText(number)};
+  }
+  if (raw.type == TAV_TYPE_UINT64_ARRAY && raw.size % sizeof(uint64_t) == 0)
+  {
+    return {.text = wordsText(raw)};
+  }
+  const bool isDigits = raw.type == TAV_TYPE_UINT8 || raw.type == TAV_TYPE_BINARY || raw.type == TAV_TYPE_UINT128;
+  return isDigits ? ValueText{.text = hexText(raw)} : bytesText(raw);
+}
+
+} // namespace tav::detail
