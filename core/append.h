@@ -78,11 +78,11 @@ inline void encodePayload(uint16_t type, bool swap, const uint8_t* payload, uint
 {
   if (size == sizeof(uint32_t))
   {
-    std::memcpy(to, payload, sizeof(uint32_t));
+    store(to, load<uint32_t>(payload));
   }
   else if (size == sizeof(uint64_t))
   {
-    std::memcpy(to, payload, sizeof(uint64_t));
+    store(to, load<uint64_t>(payload));
   }
   else if (size > kLongestSmall)
   {

@@ -3,14 +3,13 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <cstring>
 
+#include "core/word.h"
 #include "format/layout.h"
 #include "tav/tav.h"
 
 namespace tav::core
 {
-using namespace inside;
 
 /// A node in registers, where a TAVHeader would live in memory: one handed over there would be stored field by field
 /// and loaded whole, which waits until the stores have left the store buffer. So all that takes one is inlined by
@@ -56,30 +55,21 @@ struct NodeIn
   {
     if constexpr (Wide)
     {
-      const auto word = load<uint64_t>(offsetof(TAVHeader64, size));
+      const auto word = load<uint64_t>(header + offsetof(TAVHeader64, size));
       return swap ? kor::byteswap64(word) : word;
     }
     else
     {
-      const auto word = load<uint32_t>(offsetof(TAVHeader32, size));
+      const auto word = load<uint32_t>(header + offsetof(TAVHeader32, size));
       return swap ? kor::byteswap32(word) : word;
     }
   }
   [[nodiscard]] uint16_t type() const
   {
-    const auto word = load<uint16_t>(Wide ? offsetof(TAVHeader64, type) : offsetof(TAVHeader32, type));
+    const auto word = load<uint16_t>(header + (Wide ? offsetof(TAVHeader64, type) : offsetof(TAVHeader32, type)));
     return swap ? kor::byteswap16(word) : word;
   }
   static constexpr bool wide() { return Wide; }
-
-private:
-  template<class Word>
-  [[nodiscard]] Word load(size_t at) const
-  {
-    Word word = 0;
-    std::memcpy(&word, header + at, sizeof word);
-    return word;
-  }
 };
 
 template<class AnyNode>
