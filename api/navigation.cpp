@@ -34,6 +34,7 @@ core::Level levelOfRoot(const TAVHandle& handle)
   }
   const bool sibling = parent != nullptr && refChild != nullptr;
   const bool inAnswer = parent == &out->header || refChild == &out->header;
+  // NOLINTNEXTLINE(clang-analyzer-core.NonNullParamChecker): likewise
   const TAVHeader before = out->header;
   bool found = false;
   if (sibling && isSizeUnknown(*refChild))

@@ -33,6 +33,7 @@ struct PairAllocator
 
   T* allocate(size_t count)
   {
+    // NOLINTNEXTLINE(bugprone-sizeof-expression): a container's table holds pointers
     void* const block = ::operator new(count * sizeof(T), std::nothrow);
     if (block == nullptr)
     {
