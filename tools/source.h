@@ -70,7 +70,7 @@ public:
 
   /// The storage underneath, for a handle of the library. Its cursor is shared: this object may be used again when
   /// the handle is done.
-  TAVSideStorage& storage() { return window_ ? *window_ : *file_; }
+  TAVSideStorage& storage() { return window_ != nullptr ? *window_ : static_cast<TAVSideStorage&>(*file_); }
 
 private:
   struct Page
