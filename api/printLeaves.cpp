@@ -70,7 +70,7 @@ void print(OutputBlock& output, int64_t depth, const TAVHandle& handle, Run& run
   WalkGuard guard = run.guard;
   bool first = run.previous == nullptr;
   core::Node node = first ? core::Node{} : core::nodeOf(*run.previous);
-  core::Place place{0, bytes.base, 0};
+  core::Place place = bytes.nowhere();
   uint64_t count = 0;
   uint64_t lastOffset = 0;
   while (!tracing() && !output.stopped() && core::step<wide>(bytes, level, first, node, place) == TAV_RC_OK &&

@@ -68,7 +68,7 @@ uint32_t searchBlock(TAVHandle& handle, const core::Level& children, const Wante
   core::Node node = first ? core::Node{} : core::nodeOf(*previous);
   for (;; first = false)
   {
-    core::Place place{0, bytes.base, 0};
+    core::Place place = bytes.nowhere();
     const uint32_t rc = core::step<Wide>(bytes, level, first, node, place);
     if (rc != TAV_RC_OK) [[unlikely]]
     {

@@ -105,7 +105,7 @@ uint32_t walkLevel(Walk& walk, const core::Node& parent, const core::Level& chil
   bool first = walk.descended;
   for (;; first = false)
   {
-    core::Place place{0, bytes.base, 0};
+    core::Place place = bytes.nowhere();
     rc = core::step<Wide>(bytes, level, first, child, place);
     if (rc != TAV_RC_OK) [[unlikely]]
     {

@@ -93,6 +93,12 @@ struct BlockBytes
     return canWrite(handle) && handle.curOffset == 0;
   }
 
+  /// What a place is before one is found; analysers do not follow a search that finds none.
+  [[nodiscard]] Place nowhere() const
+  {
+    return {0, base, 0};
+  }
+
   /// Finds the header at an offset; false when it does not lie in the block.
   [[gnu::always_inline]] bool find(uint64_t offset, uint64_t length, Place& place) const
   {
@@ -158,6 +164,11 @@ struct RingBytes
   static bool canWrite(const TAVHandle& handle)
   {
     return canRead(handle);
+  }
+
+  [[nodiscard]] Place nowhere() const
+  {
+    return {0, ring.pRing, 0};
   }
 
   /// Finds the header at an offset; false when it is not cached in one run.

@@ -141,7 +141,7 @@ template<bool Wide, class Bytes>
 [[gnu::always_inline]] inline uint32_t readNode(const Bytes& bytes, TAVHandle& handle, uint64_t offset,
                                                 TAVHeaderData& out)
 {
-  Place place{};
+  Place place = bytes.nowhere();
   return findNode<Wide>(bytes, offset, place) ? handOut<Wide>(bytes, handle, place, out) : kNotHere;
 }
 
@@ -155,7 +155,7 @@ template<bool Wide, bool First, class Bytes>
   {
     return kNotHere;
   }
-  Place place{};
+  Place place = bytes.nowhere();
   const uint32_t rc = First ? findNext<Wide>(bytes, level, true, Node{}, place)
                             : findNext<Wide>(bytes, level, false, NodeAt<Wide>{*before}, place);
   return rc == TAV_RC_OK ? handOut<Wide>(bytes, handle, place, out) : rc;
