@@ -86,7 +86,7 @@ check_static_analysis()
   cppcheck --enable=warning,performance,portability --inconclusive --std=c++20 --language=c++ --inline-suppr --quiet \
     --error-exitcode=1 -j "$(nproc)" -I include -I . -DTAV_VERSION='""' \
     --template='{file}:{line}: {severity}: {id}: {message}' \
-    kor format storage dictionary api include tools examples
+    kor format storage dictionary core api include tools examples
 }
 
 check_documents()
@@ -161,7 +161,7 @@ run_properties()
   GTEST_FILTER='-*RingEqualsDirect*' run_rooms "$@" property
 }
 
-rooms=(kor format storage dictionary api golden cpp)
+rooms=(kor format storage dictionary core api golden cpp)
 
 # check_platform PRESET FOLDER ENDING EMULATOR ROOM...: rooms and properties on another platform, the exported symbols,
 # the program's behaviour that platforms tend to differ in, and the streams that cross from and to this one.
@@ -253,8 +253,8 @@ full()
   stage "static libraries" check_static
   stage "link-time optimisation" check_link_time
   # What touches bytes, files or the system; CI has no time for more.
-  stage "s390x, big-endian" check_s390x kor format storage api golden
-  stage "Windows" check_windows kor format storage api golden
+  stage "s390x, big-endian" check_s390x kor format storage core api golden
+  stage "Windows" check_windows kor format storage core api golden
   stage "address and undefined behaviour" check_sanitizers
   stage "fuzzing" fuzz/run.sh fixed
   stage "threads" check_thread

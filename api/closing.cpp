@@ -3,6 +3,7 @@
 #include <cstring>
 
 #include "api/rawWrite.h"
+#include "core/close.h"
 #include "format/layout.h"
 #include "kor/traceFrame.h"
 #include "tav/probes.h"
@@ -15,27 +16,12 @@ namespace
 
 constexpr uint64_t kAbandon = 1;
 
-/// Encodes the size of a group's header, the header's first field, and returns its length.
-uint64_t encodeGroupSize(uint64_t size, bool wide, bool swap, uint8_t* to)
-{
-  if (wide)
-  {
-    const uint64_t word = swap ? kor::byteswap64(size) : size;
-    std::memcpy(to, &word, sizeof word);
-    return sizeof word;
-  }
-  const auto narrow = static_cast<uint32_t>(size);
-  const uint32_t word = swap ? kor::byteswap32(narrow) : narrow;
-  std::memcpy(to, &word, sizeof word);
-  return sizeof word;
-}
-
 /// Writes the size of a group over the one in the stream.
 uint32_t patchSize(TAVHandle& handle, const TAVHeader& group)
 {
   uint64_t position = group.nodeOffset;
   std::array<uint8_t, sizeof(uint64_t)> bytes;
-  const uint64_t length = encodeGroupSize(sizeOf(group), is64(group), handle.swapBytes != 0, bytes.data());
+  const uint64_t length = core::encodeGroupSize(sizeOf(group), is64(group), handle.swapBytes != 0, bytes.data());
   return rawWrite(handle, position, bytes.data(), length);
 }
 
@@ -54,16 +40,7 @@ uint32_t appendEndElement(TAVHandle& handle, uint64_t payloadBefore, bool wide)
 {
   EyeSizeBytes pair = encodeEyeSize(groupDistance(payloadBefore, wide), handle.swapBytes != 0);
   TAVHeaderData element{};
-  if (wide)
-  {
-    element.header.hdr64 = {kEyeSizeLength, 0, TAV_TYPE_BINARY, TAV_ELM_CMN_END_HDR_EYE_SIZE};
-    element.header.hdrType = TAV_HDR_64;
-  }
-  else
-  {
-    element.header.hdr32 = {static_cast<uint32_t>(kEyeSizeLength), TAV_TYPE_BINARY, TAV_ELM_CMN_END_HDR_EYE_SIZE};
-    element.header.hdrType = TAV_HDR_32;
-  }
+  element.header = endElement(wide, handle.alignMode == 1);
   element.pDataBuf = pair.data();
   element.dataBufSize = pair.size();
   return tavAddElement(0, &handle, &element);
@@ -130,37 +107,15 @@ bool endGroup(uint64_t options, TraceFrame& frame, TAVHandle& handle, TAVHeader&
   return frame.code();
 }
 
-/// Closes the innermost group in place while tracing is off and it has no end element; false, with nothing done, where
-/// anything else is to be done.
-bool closeSilently(TAVHandle& handle)
-{
-  TAVHdrStack* const stack = handle.pHdrStack;
-  if (stack == nullptr || stack->count == 0 || isReadOnly(handle)) [[unlikely]]
-  {
-    return false;
-  }
-  TAVHeader& group = stack->pEntries[stack->count - 1];
-  if (!isKnownHdrType(group.hdrType) || hasEyeSize(group)) [[unlikely]]
-  {
-    return false;
-  }
-  const uint64_t payload = handle.streamBytes - group.nodeOffset - headerLength(group.hdrType);
-  const bool wide = is64(group);
-  uint8_t* const to = takePlace(handle, group.nodeOffset, wide ? sizeof payload : sizeof(uint32_t));
-  if (to == nullptr) [[unlikely]]
-  {
-    return false;
-  }
-  setSize(group, payload);
-  encodeGroupSize(payload, wide, handle.swapBytes != 0, to);
-  --stack->count;
-  return true;
-}
-
 } // namespace
 
 uint32_t tavCloseHeader(uint64_t options, TAVHandle* handle)
 {
-  const bool silent = !tracing() && options == 0 && handle != nullptr;
-  return silent && closeSilently(*handle) ? TAV_RC_OK : closeTraced(options, handle);
+  uint32_t rc = core::kNotHere;
+  if (core::isFastCall(options) && handle != nullptr)
+  {
+    rc = core::isDirect(*handle) ? core::closeGroup<core::BlockBytes<core::AnyForm>>(*handle)
+                                 : core::closeGroup<core::RingBytes<core::AnyForm>>(*handle);
+  }
+  return rc != core::kNotHere ? rc : closeTraced(options, handle);
 }

@@ -1,4 +1,5 @@
-/// Operations of the reader that nothing exports.
+/// Operations of the reader that are neither exported nor called by the library. They belong to its inner interface and
+/// stay; their tests call them.
 #pragma once
 
 #include <cstdint>

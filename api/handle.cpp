@@ -13,7 +13,11 @@ using namespace tav::inside;
 namespace
 {
 
+// What the allocator's records name as the caller.
 constexpr const char* kUnit = "tavAPI";
+constexpr uint32_t kMakeLine = 465;
+constexpr uint32_t kRefusedLine = 602;
+constexpr uint32_t kEndLine = 772;
 constexpr uint64_t kModeBits = TAV_OPT_READ | TAV_OPT_WRITE | TAV_OPT_UPDATE;
 
 bool hasOneMode(uint64_t options)
@@ -105,7 +109,7 @@ void destroyHdrStack(TAVHandle& handle)
 uint32_t allocateHandle(TAVHandle** out)
 {
   void* block = nullptr;
-  const uint32_t rc = korMemAlloc(&block, 0, sizeof(OwnedHandle), KOR_MEM_PLAIN, kUnit, 465);
+  const uint32_t rc = korMemAlloc(&block, 0, sizeof(OwnedHandle), KOR_MEM_PLAIN, kUnit, kMakeLine);
   // All of it is set: a trace shows the bytes between the fields, too.
   *out = rc == TAV_RC_OK ? &(new (std::memset(block, 0, sizeof(OwnedHandle))) OwnedHandle)->handle : nullptr;
   return rc;
@@ -139,7 +143,7 @@ uint32_t tavInitHandle(TAVHandle** out, TAVInitParam* param)
   }
   destroyRing(handle);
   destroyHdrStack(handle);
-  freeHandle(out, 602);
+  freeHandle(out, kRefusedLine);
   frame.report(210, frame.code());
   return frame.code();
 }
@@ -157,7 +161,7 @@ uint32_t tavTermHandle(TAVHandle** inout)
   destroyHdrStack(handle);
   destroyRing(handle);
   forgetPairs(handle);
-  freeHandle(inout, 772);
+  freeHandle(inout, kEndLine);
   return frame.code();
 }
 

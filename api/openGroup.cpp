@@ -5,11 +5,12 @@
 #include <array>
 #include <bit>
 
+#include "api/fetch.h"
 #include "api/nodeFromIndex.h"
-#include "api/nodeStep.h"
 #include "api/ownedHandle.h"
 #include "api/peek.h"
 #include "api/rawWrite.h"
+#include "core/fastWay.h"
 
 namespace tav::inside
 {
@@ -123,7 +124,7 @@ private:
       }
       TAVHeaderData node{};
       rc = nextPair(eyeOffset, node);
-      if (rc == kUnusual)
+      if (rc == core::kNotHere)
       {
         continue;
       }
@@ -141,7 +142,7 @@ private:
     }
   }
 
-  /// Finds the next pair and the node that it leads to. `kUnusual` where there is none before bytes that were looked at
+  /// Finds the next pair and the node that it leads to. `kNotHere` where there is none before bytes that were looked at
   /// already: no eye catcher reaches into those, which begin with a group's size.
   uint32_t nextPair(uint64_t& eyeOffset, TAVHeaderData& node)
   {
@@ -157,7 +158,7 @@ private:
     if (rc == TAV_RC_NOT_FOUND && meetsBorder)
     {
       advance(border);
-      return kUnusual;
+      return core::kNotHere;
     }
     uint64_t offset = 0;
     if (rc != TAV_RC_OK)

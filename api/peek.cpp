@@ -4,7 +4,10 @@
 #include <array>
 #include <cstring>
 
-#include "api/nodeStep.h"
+#include "api/fetch.h"
+#include "api/rawWrite.h"
+#include "core/fastWay.h"
+#include "tav/probes.h"
 
 namespace tav::inside
 {
@@ -23,13 +26,13 @@ uint32_t readPastRing(TAVSideStorage& storage, uint64_t offset, uint8_t* to, uin
 {
   if (!storage.hasAttributes(TAV_ATTR_SEEK))
   {
-    return kUnusual;
+    return core::kNotHere;
   }
   uint64_t position = 0;
   if (storage.seek(offset, kSeekHint) != TAV_RC_OK || storage.getPosition(&position) != TAV_RC_OK ||
       position != offset)
   {
-    return kUnusual;
+    return core::kNotHere;
   }
   while (length != 0)
   {
@@ -45,13 +48,13 @@ uint32_t readPastRing(TAVSideStorage& storage, uint64_t offset, uint8_t* to, uin
     length -= got;
     if (length != 0 && (got == 0 || isEnd(rc)))
     {
-      return kUnusual;
+      return core::kNotHere;
     }
   }
   return TAV_RC_OK;
 }
 
-/// Whether the storage has the bytes up to `end`; `kUnusual` when it does not tell.
+/// Whether the storage has the bytes up to `end`; `kNotHere` when it does not tell.
 uint32_t judgeEnd(TAVCircularBuf& ring, uint64_t dataOffset, uint64_t size)
 {
   uint64_t end = dataOffset;
@@ -63,7 +66,7 @@ uint32_t judgeEnd(TAVCircularBuf& ring, uint64_t dataOffset, uint64_t size)
   uint64_t total = 0;
   if (ring.pStorage->getTotalSize(&total) != TAV_RC_OK)
   {
-    return kUnusual;
+    return core::kNotHere;
   }
   if (dataOffset >= total)
   {
@@ -72,12 +75,12 @@ uint32_t judgeEnd(TAVCircularBuf& ring, uint64_t dataOffset, uint64_t size)
   return fits && end <= total ? TAV_RC_OK : TAV_RC_DATA_TOO_LARGE;
 }
 
-/// The code that reading the node would give, and its header; `kUnusual` where only reading it can tell.
+/// The code that reading the node would give, and its header; `kNotHere` where only reading it can tell.
 uint32_t judge(TAVHandle& handle, uint64_t offset, TAVHeaderData& node)
 {
   if (isDirect(handle) || handle.pCircularBuf == nullptr)
   {
-    return kUnusual;
+    return core::kNotHere;
   }
   std::array<uint8_t, kHeaderSize64> bytes;
   const uint32_t rc = peekBytes(*handle.pCircularBuf, offset, bytes.data(), bytes.size());
@@ -133,7 +136,7 @@ uint32_t peekBytes(TAVCircularBuf& ring, uint64_t offset, uint8_t* to, uint64_t 
     length -= piece;
     if (length != 0 && !addChecked(offset, piece))
     {
-      return kUnusual;
+      return core::kNotHere;
     }
   }
   return TAV_RC_OK;
@@ -142,13 +145,13 @@ uint32_t peekBytes(TAVCircularBuf& ring, uint64_t offset, uint8_t* to, uint64_t 
 uint32_t peekNode(TAVHandle& handle, uint64_t offset, TAVHeaderData& node)
 {
   const uint32_t rc = judge(handle, offset, node);
-  return rc == kUnusual ? tavReadNodeInt(0, &handle, offset, true, &node) : report(handle, offset, node, rc);
+  return rc == core::kNotHere ? tavReadNodeInt(0, &handle, offset, true, &node) : report(handle, offset, node, rc);
 }
 
 uint32_t readIfWhole(TAVHandle& handle, uint64_t offset, TAVHeaderData& node)
 {
   const uint32_t rc = judge(handle, offset, node);
-  const bool mustRead = rc == kUnusual || (rc == TAV_RC_OK && !isGroup(node.header));
+  const bool mustRead = rc == core::kNotHere || (rc == TAV_RC_OK && !isGroup(node.header));
   return mustRead ? tavReadNodeInt(0, &handle, offset, true, &node) : report(handle, offset, node, rc);
 }
 

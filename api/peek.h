@@ -8,7 +8,7 @@
 namespace tav::inside
 {
 
-/// Copies bytes of the stream from where the ring caches them, else from the storage, past the ring. `kUnusual` where
+/// Copies bytes of the stream from where the ring caches them, else from the storage, past the ring. `kNotHere` where
 /// the storage does not seek or does not have them: then the ring has to say what is there.
 uint32_t peekBytes(TAVCircularBuf& ring, uint64_t offset, uint8_t* to, uint64_t length);
 

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 
+#include "api/printer.h"
 #include "dictionary/dictionary.h"
 
 namespace tav::inside::print
@@ -81,22 +82,6 @@ uint64_t OutputBlock::settle(size_t taken)
   return counted;
 }
 
-/// Writes blanks out of the block, which is empty. A stream that pads by itself takes them a few at a time.
-bool OutputBlock::writeBlanks(size_t blanks)
-{
-  std::memset(text_.data(), ' ', std::min(blanks, kSize));
-  while (blanks != 0)
-  {
-    const size_t length = std::min(blanks, kSize);
-    if (std::fwrite(text_.data(), 1, length, stream_) != length)
-    {
-      return false;
-    }
-    blanks -= length;
-  }
-  return true;
-}
-
 uint64_t OutputBlock::addLong(size_t blanks, std::string_view text)
 {
   handOver();
@@ -104,11 +89,7 @@ uint64_t OutputBlock::addLong(size_t blanks, std::string_view text)
   {
     return 0;
   }
-  const size_t length = blanks + text.size();
-  if (!writeBlanks(blanks) || std::fwrite(text.data(), 1, text.size(), stream_) != text.size())
-  {
-    return 0;
-  }
+  const uint64_t length = putInStream(stream_, blanks, text);
   taken_ += length;
   total_ += length;
   return length;

@@ -153,7 +153,6 @@ public:
 private:
   static constexpr uint16_t kNodeEnd = 0x8000; ///< beside the end of a node's last piece
 
-  bool writeBlanks(size_t blanks);
   uint64_t addLong(size_t blanks, std::string_view text);
   uint64_t settle(size_t taken);
 

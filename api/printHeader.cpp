@@ -11,46 +11,36 @@ namespace tav::inside::print
 namespace
 {
 
-/// What a line begins with in the text form, and its element in XML.
-struct Label
-{
-  std::string_view text;
-  std::string_view tag;
-};
-
 /// The characters of a number.
-class Characters
+struct Characters
 {
-public:
-  static Characters decimal(uint64_t number)
-  {
-    Characters result;
-    result.length_ = static_cast<size_t>(digits::writeDecimal(result.text_.data(), number) - result.text_.data());
-    return result;
-  }
+  std::array<char, digits::kLongest> text;
+  size_t length;
 
-  /// The number in hexadecimal digits, with zeros before it up to `width`.
-  static Characters hex(uint64_t number, size_t width)
+  operator std::string_view() const // NOLINT(google-explicit-constructor): a text is what it is
   {
-    Characters result;
-    const size_t length = std::max(width, (static_cast<size_t>(std::bit_width(number)) + 3) / 4);
-    for (size_t at = length; at != 0; number >>= 4U)
-    {
-      result.text_[--at] = digits::hexDigit(number & 0xFU);
-    }
-    result.length_ = length;
-    return result;
+    return {text.data(), length};
   }
-
-  [[nodiscard]] std::string_view view() const
-  {
-    return {text_.data(), length_};
-  }
-
-private:
-  std::array<char, digits::kLongest> text_;
-  size_t length_ = 0;
 };
+
+Characters decimal(uint64_t number)
+{
+  Characters result{};
+  result.length = static_cast<size_t>(digits::writeDecimal(result.text.data(), number) - result.text.data());
+  return result;
+}
+
+/// A number in hexadecimal digits, with zeros before it up to `width`.
+Characters hex(uint64_t number, size_t width)
+{
+  Characters result{};
+  result.length = std::max(width, (static_cast<size_t>(std::bit_width(number)) + 3) / 4);
+  for (size_t at = result.length; at != 0; number >>= 4U)
+  {
+    result.text[--at] = digits::hexDigit(number & 0xFU);
+  }
+  return result;
+}
 
 /// Records of fields in either form: "name = value" between braces, or elements.
 class Fields
@@ -62,68 +52,49 @@ public:
   }
 
   /// Opens a record; what follows stands a step further in.
-  void open(const Label& label)
+  void open(std::string_view text, std::string_view tag)
   {
-    if (xml_)
+    row({indent(), "<", tag, ">\n"}, {indent(), text, "\n"});
+    if (!xml_)
     {
-      lineOf(ctx_, {indentation(), "<", label.tag, ">\n"});
-    }
-    else
-    {
-      lineOf(ctx_, {indentation(), label.text, "\n"});
-      lineOf(ctx_, {indentation(), "{\n"});
+      line(ctx_, {indent(), "{\n"});
     }
     ++level_;
   }
 
-  void close(const Label& label)
+  void close(std::string_view tag)
   {
     --level_;
-    if (xml_)
-    {
-      lineOf(ctx_, {indentation(), "</", label.tag, ">\n"});
-    }
-    else
-    {
-      lineOf(ctx_, {indentation(), "}\n"});
-    }
+    row({indent(), "</", tag, ">\n"}, {indent(), "}\n"});
   }
 
-  void value(const Label& label, std::string_view value)
+  /// A field whose name takes so many characters in the text form.
+  void value(std::string_view name, size_t width, std::string_view value)
   {
-    if (xml_)
-    {
-      lineOf(ctx_, {indentation(), "<", label.tag, ">", value, "</", label.tag, ">\n"});
-    }
-    else
-    {
-      lineOf(ctx_, {indentation(), label.text, value, "\n"});
-    }
-  }
-
-  void number(const Label& label, uint64_t number)
-  {
-    value(label, Characters::decimal(number).view());
+    row({indent(), "<", name, ">", value, "</", name, ">\n"},
+        {indent(), name, kBlanks.substr(0, width - name.size()), " = ", value, "\n"});
   }
 
   /// A code with a name; XML shows the name alone.
-  void code(const Label& label, uint16_t code, std::string_view name)
+  void code(std::string_view field, size_t width, uint16_t code, std::string_view name)
   {
-    if (xml_)
-    {
-      value(label, name);
-    }
-    else
-    {
-      lineOf(ctx_, {indentation(), label.text, Characters::decimal(code).view(), " ( ", name, " )\n"});
-    }
+    row({indent(), "<", field, ">", name, "</", field, ">\n"},
+        {indent(), field, kBlanks.substr(0, width - field.size()), " = ", decimal(code), " ( ", name, " )\n"});
   }
 
 private:
-  [[nodiscard]] std::string_view indentation() const
+  static constexpr std::string_view kBlanks = "             ";
+  using Parts = std::initializer_list<std::string_view>;
+
+  /// A line in the form that is asked for.
+  void row(Parts xml, Parts text)
   {
-    constexpr std::string_view blanks = "         ";
-    return blanks.substr(0, level_ * kBlanksPerLevel);
+    line(ctx_, xml_ ? xml : text);
+  }
+
+  [[nodiscard]] std::string_view indent() const
+  {
+    return kBlanks.substr(0, level_ * kBlanksPerLevel);
   }
 
   TAVPrintCtx& ctx_;
@@ -135,32 +106,30 @@ private:
 
 void header(TAVPrintCtx& ctx, const TAVHeader& header)
 {
-  constexpr Label whole{"TAVHeader", "tavHeader"};
-  const Label form = is64(header) ? Label{"TAVHeader64", "tavHeader64"} : Label{"TAVHeader32", "tavHeader32"};
+  const bool wide = is64(header);
   Fields fields(ctx);
-  fields.open(whole);
-  fields.open(form);
-  fields.number({"size = ", "size"}, sizeOf(header));
-  if (is64(header))
+  fields.open("TAVHeader", "tavHeader");
+  fields.open(wide ? "TAVHeader64" : "TAVHeader32", wide ? "tavHeader64" : "tavHeader32");
+  fields.value("size", 4, decimal(sizeOf(header)));
+  if (wide)
   {
-    fields.value({"info = ", "info"}, Characters::hex(header.hdr64.info, 1).view());
+    fields.value("info", 4, hex(header.hdr64.info, 1));
   }
-  fields.code({"type = ", "type"}, typeOf(header), typePrintName(typeOf(header)));
-  fields.code({"elm  = ", "elm"}, elmOf(header), elementEnumName(elmOf(header)));
-  fields.close(form);
-  fields.code({"hdrType    = ", "hdrType"}, header.hdrType, typePrintName(header.hdrType));
-  fields.number({"nodeOffset = ", "nodeOffset"}, header.nodeOffset);
-  fields.close(whole);
+  fields.code("type", 4, typeOf(header), typePrintName(typeOf(header)));
+  fields.code("elm", 4, elmOf(header), elementEnumName(elmOf(header)));
+  fields.close(wide ? "tavHeader64" : "tavHeader32");
+  fields.code("hdrType", 10, header.hdrType, typePrintName(header.hdrType));
+  fields.value("nodeOffset", 10, decimal(header.nodeOffset));
+  fields.close("tavHeader");
 }
 
 void descriptor(TAVPrintCtx& ctx, const TAVHeaderData& node)
 {
   constexpr size_t addressDigits = 16;
-  const auto address = static_cast<uint64_t>(reinterpret_cast<uintptr_t>(node.pDataBuf));
   Fields fields(ctx);
-  fields.value({"pDataBuf      = ", "pDataBuf"}, Characters::hex(address, addressDigits).view());
-  fields.number({"dataBufSize   = ", "dataBufSize"}, node.dataBufSize);
-  fields.number({"dataBufOffset = ", "dataBufOffset"}, node.dataBufOffset);
+  fields.value("pDataBuf", 13, hex(reinterpret_cast<uintptr_t>(node.pDataBuf), addressDigits));
+  fields.value("dataBufSize", 13, decimal(node.dataBufSize));
+  fields.value("dataBufOffset", 13, decimal(node.dataBufOffset));
 }
 
 } // namespace tav::inside::print

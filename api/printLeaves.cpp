@@ -1,7 +1,7 @@
 #include "api/printLeaves.h"
 
-#include "api/nodeStep.h"
 #include "api/printValue.h"
+#include "core/step.h"
 
 namespace tav::inside::print
 {
@@ -52,8 +52,7 @@ template<bool swap>
 /// Where a run goes on, and where it has come to.
 struct Run
 {
-  const Block& bytes;
-  const Level& level;
+  const core::Level& level;
   const TAVHeader* previous; ///< null: the level's first child is next
   WalkGuard& guard;
   uint64_t count = 0;
@@ -63,24 +62,27 @@ struct Run
 /// Steps to the next data elements and prints them. The level's children have 64-bit headers if `wide`, and their
 /// bytes are reversed if `swap`.
 template<bool wide, bool swap>
-void print(OutputBlock& output, int64_t depth, Run& run)
+void print(OutputBlock& output, int64_t depth, const TAVHandle& handle, Run& run)
 {
-  const Block bytes{run.bytes.base, run.bytes.size, swap, run.bytes.alignAll};
-  const Level level = run.level;
+  core::BlockBytes<core::AnyForm> bytes(handle);
+  bytes.form.swap = swap;
+  const core::Level level = run.level;
   WalkGuard guard = run.guard;
   bool first = run.previous == nullptr;
-  Node node = first ? Node{} : nodeOf(*run.previous);
+  core::Node node = first ? core::Node{} : core::nodeOf(*run.previous);
+  core::Place place = bytes.nowhere();
   uint64_t count = 0;
   uint64_t lastOffset = 0;
-  while (!tracing() && !output.stopped() && stepInBlock<wide>(bytes, level, first, node) == TAV_RC_OK && !node.group())
+  while (!tracing() && !output.stopped() && core::step<wide>(bytes, level, first, node, place) == TAV_RC_OK &&
+         !node.group())
   {
     const ReadyTag* const tag = isCommon(node.fields) ? output.tags.find(node.fields.elm, depth) : nullptr;
-    if (tag == nullptr || !guard.visit(node.offset))
+    if (tag == nullptr || !guard.visit(node.place))
     {
       break; // a visit that is refused is refused again
     }
-    printLeaf<swap>(output, *tag, node.fields, bytes.base + node.offset + node.length());
-    lastOffset = node.offset;
+    printLeaf<swap>(output, *tag, node.fields, place.header + core::lengthOfHeader(wide));
+    lastOffset = node.place;
     ++count;
     first = false;
   }
@@ -94,25 +96,28 @@ void print(OutputBlock& output, int64_t depth, Run& run)
 bool printLeaves(TAVPrintCtx& ctx, const TAVHandle& handle, const TAVHeader& parent, const TAVHeader* previous,
                  WalkGuard& guard, TAVHeader& last)
 {
-  Block bytes{};
-  if (!isOneLine(ctx) || !isReadOnly(handle) || !blockOf(handle, bytes))
+  using Bytes = core::BlockBytes<core::AnyForm>;
+  if (!isOneLine(ctx) || !core::isReadOnly(handle) || !Bytes::canRead(handle))
   {
     return false;
   }
-  const Level level = levelBelow(nodeOf(parent));
-  Run run{bytes, level, previous, guard};
+  const Bytes bytes(handle);
+  const core::Level level = core::levelBelow(core::nodeOf(parent));
+  Run run{level, previous, guard};
   if (level.wide)
   {
-    bytes.swap ? print<true, true>(*ctx.pBlock, ctx.depth, run) : print<true, false>(*ctx.pBlock, ctx.depth, run);
+    bytes.form.swap ? print<true, true>(*ctx.pBlock, ctx.depth, handle, run)
+                    : print<true, false>(*ctx.pBlock, ctx.depth, handle, run);
   }
   else
   {
-    bytes.swap ? print<false, true>(*ctx.pBlock, ctx.depth, run) : print<false, false>(*ctx.pBlock, ctx.depth, run);
+    bytes.form.swap ? print<false, true>(*ctx.pBlock, ctx.depth, handle, run)
+                    : print<false, false>(*ctx.pBlock, ctx.depth, handle, run);
   }
   if (run.count != 0)
   {
-    const HeaderFields fields = decodeFields(bytes.base + run.lastOffset, level.wide, bytes.swap);
-    toHeader({run.lastOffset, fields, level.wide}, last);
+    const HeaderFields fields = decodeFields(bytes.base + run.lastOffset, level.wide, bytes.form.swap);
+    core::toHeader({run.lastOffset, fields, level.wide}, last);
   }
   return run.count != 0;
 }

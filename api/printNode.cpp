@@ -8,7 +8,7 @@
 using namespace tav;
 using namespace tav::inside;
 using tav::inside::print::has;
-using tav::inside::print::lineOf;
+using tav::inside::print::line;
 using tav::inside::print::piece;
 using tav::inside::print::ReadyTag;
 
@@ -28,26 +28,29 @@ bool hasValue(const TAVHeaderData& node)
   return !isGroup(node.header) && sizeOf(node.header) != 0;
 }
 
-uint32_t dataText(TAVPrintCtx& ctx, TAVHeaderData& node)
+/// What stands where a node's data does; XML wraps it where anything else stands beside it.
+uint32_t printData(TAVPrintCtx& ctx, TAVHeaderData& node)
 {
   if (has(ctx, TAV_PRINT_DESCRIPTORS))
   {
     tav::inside::print::descriptor(ctx, node);
   }
-  if (!hasValue(node))
+  const bool xml = has(ctx, TAV_PRINT_XML);
+  const bool value = hasValue(node);
+  const bool wrapped = xml ? has(ctx, TAV_PRINT_HEADERS | TAV_PRINT_DESCRIPTORS) : value;
+  if (wrapped)
   {
-    return TAV_RC_OK;
+    line(ctx, {xml ? "   <tavData>" : "   "});
   }
-  lineOf(ctx, {"   "});
-  const uint32_t rc = tavPrintValue(&ctx, &node);
-  if (rc == TAV_RC_OK)
+  const uint32_t rc = value ? tavPrintValue(&ctx, &node) : TAV_RC_OK;
+  if (rc == TAV_RC_OK && wrapped)
   {
-    piece(ctx, "\n");
+    piece(ctx, xml ? "</tavData>\n" : "\n");
   }
   return rc;
 }
 
-uint32_t bodyText(TAVPrintCtx& ctx, TAVHeaderData& node)
+uint32_t printBody(TAVPrintCtx& ctx, TAVHeaderData& node)
 {
   if (has(ctx, TAV_PRINT_BARE))
   {
@@ -57,54 +60,22 @@ uint32_t bodyText(TAVPrintCtx& ctx, TAVHeaderData& node)
   {
     tav::inside::print::header(ctx, node.header);
   }
-  return has(ctx, TAV_PRINT_DATA) ? dataText(ctx, node) : TAV_RC_OK;
+  return has(ctx, TAV_PRINT_DATA) ? printData(ctx, node) : TAV_RC_OK;
 }
 
 uint32_t nodeText(TAVPrintCtx& ctx, TAVHeaderData& node, const Parts& parts)
 {
   if (parts.open)
   {
-    lineOf(ctx, {elementEnumName(elmOf(node.header)), "\n"});
-    lineOf(ctx, {"{\n"});
+    line(ctx, {elementEnumName(elmOf(node.header)), "\n"});
+    line(ctx, {"{\n"});
   }
-  const uint32_t rc = parts.body ? bodyText(ctx, node) : TAV_RC_OK;
+  const uint32_t rc = parts.body ? printBody(ctx, node) : TAV_RC_OK;
   if (rc == TAV_RC_OK && parts.close)
   {
-    lineOf(ctx, {"}\n"});
+    line(ctx, {"}\n"});
   }
   return rc;
-}
-
-uint32_t dataXml(TAVPrintCtx& ctx, TAVHeaderData& node)
-{
-  if (has(ctx, TAV_PRINT_DESCRIPTORS))
-  {
-    tav::inside::print::descriptor(ctx, node);
-  }
-  const bool wrapped = has(ctx, TAV_PRINT_HEADERS | TAV_PRINT_DESCRIPTORS);
-  if (wrapped)
-  {
-    lineOf(ctx, {"   <tavData>"});
-  }
-  const uint32_t rc = hasValue(node) ? tavPrintValue(&ctx, &node) : TAV_RC_OK;
-  if (rc == TAV_RC_OK && wrapped)
-  {
-    piece(ctx, "</tavData>\n");
-  }
-  return rc;
-}
-
-uint32_t bodyXml(TAVPrintCtx& ctx, TAVHeaderData& node)
-{
-  if (has(ctx, TAV_PRINT_BARE))
-  {
-    return tavPrintValue(&ctx, &node);
-  }
-  if (has(ctx, TAV_PRINT_HEADERS))
-  {
-    tav::inside::print::header(ctx, node.header);
-  }
-  return has(ctx, TAV_PRINT_DATA) ? dataXml(ctx, node) : TAV_RC_OK;
 }
 
 /// The tags of a node that is one line, when the block has them ready.
@@ -116,7 +87,7 @@ const ReadyTag* readyTag(const TAVPrintCtx& ctx, const TAVHeaderData& node, cons
 
 void openXml(TAVPrintCtx& ctx, const TAVHeaderData& node, const Parts& parts)
 {
-  lineOf(ctx, {"<", elementTagName(elmOf(node.header)), ">"});
+  line(ctx, {"<", elementTagName(elmOf(node.header)), ">"});
   if (!parts.close || has(ctx, TAV_PRINT_HEADERS))
   {
     piece(ctx, "\n");
@@ -128,7 +99,7 @@ void closeXml(TAVPrintCtx& ctx, const TAVHeaderData& node, const Parts& parts)
   const char* const tag = elementTagName(elmOf(node.header));
   if (has(ctx, TAV_PRINT_HEADERS) || (!parts.open && !parts.body))
   {
-    lineOf(ctx, {"</", tag, ">\n"});
+    line(ctx, {"</", tag, ">\n"});
   }
   else
   {
@@ -147,7 +118,7 @@ uint32_t nodeXml(TAVPrintCtx& ctx, TAVHeaderData& node, const Parts& parts)
   {
     openXml(ctx, node, parts);
   }
-  const uint32_t rc = parts.body ? bodyXml(ctx, node) : TAV_RC_OK;
+  const uint32_t rc = parts.body ? printBody(ctx, node) : TAV_RC_OK;
   if (rc != TAV_RC_OK || !parts.close)
   {
     return rc;
@@ -168,7 +139,7 @@ uint32_t nodeAttributes(TAVPrintCtx& ctx, TAVHeaderData& node, const Parts& part
   const char* const tag = elementTagName(elmOf(node.header));
   if (parts.open)
   {
-    lineOf(ctx, {"<", tag});
+    line(ctx, {"<", tag});
   }
   uint32_t rc = TAV_RC_OK;
   if (parts.body)

@@ -6,7 +6,6 @@
 
 #include "api/ownedHandle.h"
 #include "api/printLeaves.h"
-#include "format/hdrStack.h"
 #include "format/layout.h"
 #include "kor/lineBuffered.h"
 #include "kor/traceFrame.h"
@@ -16,7 +15,6 @@ using namespace tav;
 using namespace tav::inside;
 using tav::inside::print::has;
 using tav::inside::print::OutputBlock;
-using tav::inside::print::setDepth;
 
 namespace
 {
@@ -35,7 +33,6 @@ void leaveBlock(TAVPrintCtx& ctx)
 {
   ctx.pBlock->handOver();
   ctx.pBlock = nullptr;
-  setDepth(ctx, ctx.depth);
 }
 
 /// Ends a node in the block. A trace that has begun may go where the output goes: then nothing is held back.
@@ -136,13 +133,13 @@ uint32_t leaveGroup(TAVPrintCtx& ctx, TAVHdrStack& stack, TAVHeaderData& closed)
 {
   closed = {};
   const uint32_t rc = stack.pop(&closed.header);
-  setDepth(ctx, ctx.depth - 1);
+  --ctx.depth;
   return rc == TAV_RC_OK ? printSome(ctx, closed, false, false, true) : rc;
 }
 
 uint32_t enterGroup(TAVPrintCtx& ctx, TAVHdrStack& stack, const TAVHeader& group)
 {
-  setDepth(ctx, ctx.depth + 1);
+  ++ctx.depth;
   return stack.push(&group);
 }
 
@@ -157,7 +154,7 @@ uint32_t walk(TAVPrintCtx& ctx, TAVHandle& handle, TAVHdrStack& stack)
   for (size_t current = 0; stack.count != 0; current ^= 1U)
   {
     if (ctx.pBlock != nullptr &&
-        print::printLeaves(ctx, handle, *topEntry<SilentFrame>(stack), previous, guard, passed))
+        print::printLeaves(ctx, handle, stack.pEntries[stack.count - 1], previous, guard, passed))
     {
       previous = &passed;
       if (ctx.pBlock->stopped())
@@ -243,7 +240,7 @@ uint32_t printAll(TAVPrintCtx& ctx, TAVHandle* handle, TAVHeaderData& start)
 TAVPrintCtx* makeContext(uint64_t options, const TAVHandle* handle, const TAVPrintParam& param)
 {
   const uint8_t swapBytes = handle != nullptr ? handle->swapBytes : uint8_t{0};
-  return new (std::nothrow) TAVPrintCtx{param.pBuffer, param.bufferSize, param.pStream, 0, print::kNoIndent, 0,
+  return new (std::nothrow) TAVPrintCtx{param.pBuffer, param.bufferSize, param.pStream, 0, 0,
                                         swapBytes, options, 0, 0, nullptr};
 }
 

@@ -17,7 +17,6 @@ struct TAVPrintCtx
   uint64_t bufferSize;
   FILE* pStream;
   uint64_t bytesWritten;
-  std::array<char, 10> indentFormat; ///< applied to an empty string and a line
   int64_t depth;
   uint8_t swapBytes;
   uint64_t options;
@@ -47,19 +46,18 @@ inline bool has(const TAVPrintCtx& ctx, uint64_t option)
   return (ctx.options & option) != 0;
 }
 
-inline constexpr std::array<char, 10> kNoIndent{'%', 's', '%', 's'};
-
 /// The stream that a context without a buffer prints to.
 FILE* streamOf(const TAVPrintCtx& ctx);
 
-/// Sets the depth, and the indentation of three blanks a level.
-void setDepth(TAVPrintCtx& ctx, int64_t depth);
+/// Gives a stream one piece: blanks, then a text. Returns the characters that count, none when it refuses any.
+uint64_t putInStream(FILE* stream, size_t blanks, std::string_view text);
 
-/// One line of text, indented; in the text form behind the depth.
-void line(TAVPrintCtx& ctx, const char* format, ...) KOR_PRINTF_FORMAT(2, 3);
+/// The sink: takes one piece to where the context's output goes, the block, the buffer or the stream. Returns the
+/// characters that count.
+uint64_t put(TAVPrintCtx& ctx, size_t blanks, std::string_view text);
 
-/// As `line`, of parts that stand side by side.
-void lineOf(TAVPrintCtx& ctx, std::initializer_list<std::string_view> parts);
+/// The sink's other verb: a line of parts that stand side by side, indented by the depth; in the text form behind it.
+void line(TAVPrintCtx& ctx, std::initializer_list<std::string_view> parts);
 
 /// The lines that show a header.
 void header(TAVPrintCtx& ctx, const TAVHeader& header);
@@ -67,13 +65,10 @@ void header(TAVPrintCtx& ctx, const TAVHeader& header);
 /// The lines that show where a node's data lie.
 void descriptor(TAVPrintCtx& ctx, const TAVHeaderData& node);
 
-/// A piece that goes out at once.
-uint64_t pieceAlone(TAVPrintCtx& ctx, std::string_view text);
-
 /// A piece of output that is ready.
 inline uint64_t piece(TAVPrintCtx& ctx, std::string_view text)
 {
-  return ctx.pBlock != nullptr ? ctx.pBlock->add(0, text) : pieceAlone(ctx, text);
+  return put(ctx, 0, text);
 }
 
 inline constexpr size_t kLongestShort = 64;
@@ -83,14 +78,8 @@ inline constexpr size_t kLongestShort = 64;
 template<class Write>
 void shortPiece(TAVPrintCtx& ctx, const Write& write)
 {
-  if (ctx.pBlock != nullptr)
-  {
-    char* const place = ctx.pBlock->reserve(kLongestShort);
-    ctx.pBlock->endPiece(static_cast<size_t>(write(place) - place));
-    return;
-  }
   std::array<char, kLongestShort> place;
-  pieceAlone(ctx, {place.data(), static_cast<size_t>(write(place.data()) - place.data())});
+  piece(ctx, {place.data(), static_cast<size_t>(write(place.data()) - place.data())});
 }
 
 } // namespace tav::inside::print

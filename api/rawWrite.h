@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <cstring>
 
+#include "core/bytes.h"
 #include "format/layout.h"
 #include "storage/cachedRun.h"
 #include "tav/byteOrder.h"
@@ -13,62 +14,13 @@
 namespace tav::inside
 {
 
-inline bool isDirect(const TAVHandle& handle)
-{
-  return (handle.options & TAV_OPT_DIRECT) != 0;
-}
+using core::isDirect;
+using core::isReadOnly;
 
-inline bool isReadOnly(const TAVHandle& handle)
+/// Whether the direct block has room for bytes.
+inline bool hasRoom(const TAVHandle& handle, uint64_t position, uint64_t length, uint64_t more = 0)
 {
-  return (handle.options & TAV_OPT_READ) != 0;
-}
-
-/// Whether the direct block has room for `length` bytes at `position`, and for `more` behind them. Its last byte is
-/// never used.
-[[gnu::always_inline]] inline bool hasRoom(const TAVHandle& handle, uint64_t position, uint64_t length,
-                                           uint64_t more = 0)
-{
-  uint64_t room = handle.directDataSize;
-  return takeRoom(room, length) && takeRoom(room, more) && room > position;
-}
-
-/// Whether the stream is in host order and unpadded, and the options, which stand before both flags, hold no bit but
-/// `option` and the first 16, in one look. What is not told apart here is no option that is known.
-[[gnu::always_inline]] inline bool isPlainWith(const TAVHandle& handle, uint64_t option)
-{
-  static_assert(offsetof(TAVHandle, alignMode) == offsetof(TAVHandle, options) + sizeof handle.options &&
-                offsetof(TAVHandle, swapBytes) == offsetof(TAVHandle, alignMode) + 1);
-  constexpr size_t mode = 2; // bytes of the options that tell how the handle was opened
-  constexpr uint64_t looked = kor::isLittleEndian ? ~uint64_t{0} : ~(uint64_t{0xFFFF} << (8 * mode));
-  const uint64_t asked = kor::isLittleEndian ? option >> (8 * mode) : option << (8 * mode);
-  uint64_t word = 0;
-  std::memcpy(&word, reinterpret_cast<const uint8_t*>(&handle) + offsetof(TAVHandle, options) + mode, sizeof word);
-  return (word & looked) == asked;
-}
-
-/// Whether the stream is plain and stands in directly addressed memory.
-[[gnu::always_inline]] inline bool isPlainBlock(const TAVHandle& handle)
-{
-  return isPlainWith(handle, TAV_OPT_DIRECT);
-}
-
-/// Whether the stream is plain and read or written through a ring.
-[[gnu::always_inline]] inline bool isPlainRing(const TAVHandle& handle)
-{
-  return isPlainWith(handle, 0) && handle.pCircularBuf != nullptr;
-}
-
-/// Where `length` bytes at `position` can be written in place: in the block, or in bytes that the ring caches next to
-/// each other, of which the pages are marked then. Null where rawWrite has more to do, or to refuse.
-inline uint8_t* takePlace(TAVHandle& handle, uint64_t position, uint64_t length)
-{
-  if (isDirect(handle)) [[likely]]
-  {
-    const bool fits = handle.pDirectData != nullptr && hasRoom(handle, position, length);
-    return fits ? handle.pDirectData + position : nullptr;
-  }
-  TAVCircularBuf* const ring = handle.pCircularBuf;
-  return ring != nullptr && ring->storageWritable != 0 ? takeCachedRun(*ring, position, length) : nullptr;
+  return core::hasRoom(handle.directDataSize, position, length, more);
 }
 
 /// Writes a run of bytes at `position`, which moves past it on success. No bytes need a place all the same, but

@@ -1,5 +1,11 @@
 /// Reading the node at an offset.
-#include "api/nodeStep.h"
+#include <algorithm>
+#include <array>
+
+#include "api/fetch.h"
+#include "core/step.h"
+#include "kor/traceFrame.h"
+#include "tav/probes.h"
 
 using namespace tav;
 using namespace tav::inside;
@@ -34,22 +40,25 @@ uint32_t readBuffered(TAVHandle& handle, uint64_t offset, bool wide, TAVHeaderDa
 
 /// The room is what the block holds beyond the absolute offset, also when it begins elsewhere in the stream: it has
 /// always been so over direct memory.
-uint32_t readDirect(const TAVHandle& handle, uint64_t offset, bool wide, TAVHeaderData& out)
+template<bool Wide>
+uint32_t readDirect(const TAVHandle& handle, uint64_t offset, TAVHeaderData& out)
 {
+  constexpr uint64_t length = core::lengthOfHeader(Wide);
   uint64_t relative = 0;
   if (!isInDirectData(handle, offset, relative))
   {
     return TAV_RC_NO_MEMORY;
   }
-  out.header.hdrType = wide ? TAV_HDR_64 : TAV_HDR_32;
-  const uint64_t length = headerLength(out.header.hdrType);
+  out.header.hdrType = Wide ? TAV_HDR_64 : TAV_HDR_32;
   if (offset > handle.directDataSize || handle.directDataSize - offset < length)
   {
     return TAV_RC_NO_MEMORY;
   }
-  Node node{offset, decodeFields(handle.pDirectData + relative, wide, handle.swapBytes != 0), wide};
-  handOut(node, {handle.pDirectData + relative + length, handle.directDataSize - relative - length},
-          hasDirectData(node), handle.swapBytes != 0, out);
+  uint8_t* const header = handle.pDirectData + relative;
+  const bool swap = handle.swapBytes != 0;
+  const bool hasData = core::BlockBytes<core::AnyForm>::hasData<Wide>(core::NodeIn<Wide>{header, swap}.type());
+  core::describe<Wide>(header, swap, offset, hasData ? header + length : nullptr,
+                       hasData ? handle.directDataSize - relative - length : 0, out);
   return TAV_RC_OK;
 }
 
@@ -71,12 +80,12 @@ bool isDataWhole(const TAVHeaderData& node)
   out->dataBufSize = 0;
   out->dataBufOffset = 0;
   out->header.nodeOffset = offset;
-  const bool read =
-      isDirect(*handle)
-          ? frame.require(50, handle->pDirectData != nullptr, TAV_RC_NO_MEMORY) &&
-                frame.step(60, readDirect(*handle, offset, wide, *out))
-          : frame.require(30, handle->pCircularBuf != nullptr, TAV_RC_NO_CIRCULAR_BUF) &&
-                frame.step(40, readBuffered(*handle, offset, wide, *out));
+  const bool read = core::isDirect(*handle)
+                        ? frame.require(50, handle->pDirectData != nullptr, TAV_RC_NO_MEMORY) &&
+                              frame.step(60, wide ? readDirect<true>(*handle, offset, *out)
+                                                  : readDirect<false>(*handle, offset, *out))
+                        : frame.require(30, handle->pCircularBuf != nullptr, TAV_RC_NO_CIRCULAR_BUF) &&
+                              frame.step(40, readBuffered(*handle, offset, wide, *out));
   if (read && frame.require(70, isDataWhole(*out), TAV_RC_DATA_TOO_LARGE))
   {
     frame.dump(100, trace::record(out));
@@ -86,12 +95,29 @@ bool isDataWhole(const TAVHeaderData& node)
 
 } // namespace
 
+namespace
+{
+
+template<class Bytes>
+uint32_t readFast(TAVHandle& handle, uint64_t offset, bool wide, TAVHeaderData& out)
+{
+  if (!Bytes::canRead(handle))
+  {
+    return core::kNotHere;
+  }
+  const Bytes bytes(handle);
+  return wide ? core::readNode<true>(bytes, handle, offset, out) : core::readNode<false>(bytes, handle, offset, out);
+}
+
+} // namespace
+
 uint32_t tavReadNodeInt(uint64_t options, TAVHandle* handle, uint64_t offset, bool is64, TAVHeaderData* out)
 {
-  Node node{offset, {}, is64};
-  if (!tracing() && handle != nullptr && out != nullptr && readSilently(*handle, node, *out)) [[likely]]
+  uint32_t rc = core::kNotHere;
+  if (core::isFastCall(0) && handle != nullptr && out != nullptr) [[likely]] // whatever the options are
   {
-    return TAV_RC_OK;
+    rc = core::isDirect(*handle) ? readFast<core::BlockBytes<core::AnyForm>>(*handle, offset, is64, *out)
+                                 : readFast<core::RingBytes<core::AnyForm>>(*handle, offset, is64, *out);
   }
-  return readTraced(options, handle, offset, is64, out);
+  return rc != core::kNotHere ? rc : readTraced(options, handle, offset, is64, out);
 }

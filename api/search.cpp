@@ -3,8 +3,12 @@
 #include <memory>
 #include <new>
 
-#include "api/nodeStep.h"
+#include "api/rawWrite.h"
 #include "api/search.h"
+#include "core/stack.h"
+#include "core/step.h"
+#include "kor/traceFrame.h"
+#include "tav/probes.h"
 
 using namespace tav;
 using namespace tav::inside;
@@ -12,14 +16,14 @@ using namespace tav::inside;
 namespace
 {
 
-bool matches(const Wanted& wanted, const Node& node, uint64_t depth)
+bool matches(const Wanted& wanted, const core::Node& node, uint64_t depth)
 {
   if (node.fields.elm != wanted.elm) [[likely]]
   {
     return false;
   }
   const bool keyMatches =
-      wanted.infoKey == 0 || (node.wide && (node.fields.info & TAV_INFO_KEY_MASK) == wanted.infoKey);
+      wanted.infoKey == 0 || (node.is64 && (node.fields.info & TAV_INFO_KEY_MASK) == wanted.infoKey);
   return keyMatches && depth >= uint64_t{wanted.minDepth} + 1 && depth <= uint64_t{wanted.maxDepth} + 1;
 }
 
@@ -37,7 +41,7 @@ uint32_t searchLevel(TAVHandle& handle, const Wanted& wanted, TAVHeader* previou
       return TAV_RC_NOT_FOUND;
     }
     reached = node.header.nodeOffset;
-    if (matches(wanted, nodeOf(node.header), stack.count))
+    if (matches(wanted, core::nodeOf(node.header), stack.count))
     {
       out = node;
       return TAV_RC_OK;
@@ -52,23 +56,24 @@ uint32_t searchLevel(TAVHandle& handle, const Wanted& wanted, TAVHeader* previou
 
 /// Looks through one level of the direct block as searchLevel does. Without a stack the level is the first.
 template<bool Wide>
-uint32_t searchBlock(TAVHandle& handle, const Block& memory, const Level& children, const Wanted& wanted,
-                     const TAVHeader* previous, TAVHdrStack* stack, TAVHeaderData& out, uint64_t& reached)
+uint32_t searchBlock(TAVHandle& handle, const core::Level& children, const Wanted& wanted, const TAVHeader* previous,
+                     TAVHdrStack* stack, TAVHeaderData& out, uint64_t& reached)
 {
+  const core::BlockBytes<core::AnyForm> bytes(handle);
+  const core::Level level = children;
   const uint64_t depth = stack != nullptr ? stack->count : 1;
-  const Block block = memory;
-  const Level level = children;
   const uint32_t elm = wanted.elm;
   const bool shallow = depth > wanted.maxDepth;
   bool first = previous == nullptr;
-  Node node = first ? Node{} : nodeOf(*previous);
+  core::Node node = first ? core::Node{} : core::nodeOf(*previous);
   for (;; first = false)
   {
-    const uint32_t rc = stepInBlock<Wide>(block, level, first, node);
+    core::Place place = bytes.nowhere();
+    const uint32_t rc = core::step<Wide>(bytes, level, first, node, place);
     if (rc != TAV_RC_OK) [[unlikely]]
     {
-      reached = first ? reached : node.offset;
-      return rc == kUnusual ? kUnusual : TAV_RC_NOT_FOUND;
+      reached = first ? reached : node.place;
+      return rc == TAV_RC_NO_MORE_CHILDREN ? TAV_RC_NOT_FOUND : core::kNotHere;
     }
     if (node.fields.elm == elm && matches(wanted, node, depth)) [[unlikely]]
     {
@@ -76,49 +81,33 @@ uint32_t searchBlock(TAVHandle& handle, const Block& memory, const Level& childr
       {
         out.header.hdr64 = {}; // of which a 32-bit header fills a half
       }
-      reached = node.offset;
-      return readSilently(handle, node, out) ? TAV_RC_OK : kUnusual;
+      reached = node.place;
+      return core::handOut<Wide>(bytes, handle, place, out);
     }
     if (!shallow && node.group()) [[unlikely]]
     {
       TAVHeader group{};
       toHeader(node, group);
-      return stack != nullptr ? pushEntry<SilentFrame>(*stack, &group) : TAV_RC_OK;
+      return stack == nullptr || core::push(*stack, group) ? TAV_RC_OK : core::kNotHere;
     }
   }
 }
 
-/// The search over direct memory while tracing is off: no call leaves the library, and where the caller wants no stack
-/// there is none. `kUnusual`, with the stack as it was, where an open group is on the way.
+/// The search over direct memory while nothing is traced: no call leaves the library, and where the caller wants no
+/// stack there is none. `kNotHere` leaves the stack as it was.
 uint32_t findInBlock(TAVHandle& handle, const Wanted& wanted, const TAVHeader* parent, const TAVHeader* resume,
                      TAVHdrStack* stack, TAVHeaderData& out, uint64_t& reached)
 {
-  if (resume != nullptr && (stack == nullptr || stack->count == 0))
+  const bool pushed = stack != nullptr && resume == nullptr;
+  if ((resume != nullptr && (stack == nullptr || stack->count == 0)) || (pushed && !core::push(*stack, *parent)))
   {
-    return TAV_RC_BAD_PARAM;
+    return core::kNotHere;
   }
-  uint32_t rc = TAV_RC_OK;
-  if (stack != nullptr)
-  {
-    rc = resume == nullptr ? pushEntry<SilentFrame>(*stack, parent) : TAV_RC_OK;
-    if (rc != TAV_RC_OK)
-    {
-      return rc;
-    }
-    parent = topEntry<SilentFrame>(*stack);
-  }
-  Block block{};
-  if (!blockOf(handle, block))
-  {
-    rc = kUnusual;
-  }
-  else
-  {
-    const Level level = levelBelow(nodeOf(*parent));
-    rc = level.wide ? searchBlock<true>(handle, block, level, wanted, resume, stack, out, reached)
-                    : searchBlock<false>(handle, block, level, wanted, resume, stack, out, reached);
-  }
-  if (rc == kUnusual && stack != nullptr && resume == nullptr)
+  const TAVHeader& group = stack != nullptr ? stack->pEntries[stack->count - 1] : *parent;
+  const core::Level level = core::levelBelow(core::nodeOf(group));
+  const uint32_t rc = level.wide ? searchBlock<true>(handle, level, wanted, resume, stack, out, reached)
+                                 : searchBlock<false>(handle, level, wanted, resume, stack, out, reached);
+  if (rc == core::kNotHere && pushed)
   {
     --stack->count;
   }
@@ -158,10 +147,10 @@ uint32_t findInBlock(TAVHandle& handle, const Wanted& wanted, const TAVHeader* p
 uint32_t tav::inside::findElement(TAVHandle* handle, TAVHeader* parent, const Wanted& wanted, TAVHeader* resume,
                                   TAVHdrStack* stack, TAVHeaderData* out, uint64_t& reached)
 {
-  const bool silent = !tracing() && handle != nullptr && isDirect(*handle) && isReadOnly(*handle) &&
-                      parent != nullptr && out != nullptr;
-  const uint32_t rc = silent ? findInBlock(*handle, wanted, parent, resume, stack, *out, reached) : kUnusual;
-  return rc != kUnusual ? rc : findTraced(handle, parent, wanted, resume, stack, out, reached);
+  const bool fast = core::isFastCall(0) && handle != nullptr && parent != nullptr && out != nullptr &&
+                    core::BlockBytes<core::AnyForm>::canRead(*handle) && isReadOnly(*handle);
+  const uint32_t rc = fast ? findInBlock(*handle, wanted, parent, resume, stack, *out, reached) : core::kNotHere;
+  return rc != core::kNotHere ? rc : findTraced(handle, parent, wanted, resume, stack, out, reached);
 }
 
 uint32_t tavFindElmInt(TAVHandle* handle, TAVHeader* parent, uint32_t minDepth, uint32_t maxDepth, uint16_t infoKey,

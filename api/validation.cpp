@@ -3,9 +3,13 @@
 #include <memory>
 #include <new>
 
-#include "api/nodeStep.h"
 #include "api/ownedHandle.h"
+#include "api/rawWrite.h"
 #include "api/walkGuard.h"
+#include "core/stack.h"
+#include "core/step.h"
+#include "kor/traceFrame.h"
+#include "tav/probes.h"
 
 using namespace tav;
 using namespace tav::inside;
@@ -17,12 +21,12 @@ constexpr uint64_t kContainment = 0x1;
 
 /// Whether a child lies inside its parent. The parent's end leaves out the length of its header, so some sound streams
 /// are refused: an empty last child, or the last child of a 64-bit group of type 1.
-bool isContained(const Node& child, const Node& parent)
+bool isContained(const core::Node& child, const core::Node& parent)
 {
-  uint64_t parentEnd = parent.offset;
-  uint64_t childEnd = child.offset;
+  uint64_t parentEnd = parent.offset();
+  uint64_t childEnd = child.offset();
   return addChecked(parentEnd, parent.fields.size) && addChecked(childEnd, child.fields.size) &&
-         child.offset < parentEnd && child.offset > parent.offset && childEnd <= parentEnd;
+         child.offset() < parentEnd && child.offset() > parent.offset() && childEnd <= parentEnd;
 }
 
 /// A walk under way: every node below the group on the stack, depth first.
@@ -42,9 +46,9 @@ struct Walk
 };
 
 /// Whether the walk may take the node that it has come to.
-bool isAccepted(bool containment, WalkGuard& guard, const Node& child, const Node& parent)
+bool isAccepted(bool containment, WalkGuard& guard, const core::Node& child, const core::Node& parent)
 {
-  return (!containment || isContained(child, parent)) && guard.visit(child.offset);
+  return (!containment || isContained(child, parent)) && guard.visit(child.offset());
 }
 
 /// Goes on through the exported steps, whose records tell of every node.
@@ -69,7 +73,7 @@ uint32_t walkTraced(Walk& walk)
     }
     else if (rc == TAV_RC_OK)
     {
-      if (!isAccepted(walk.containment, walk.guard, nodeOf(child.header), nodeOf(*parent)))
+      if (!isAccepted(walk.containment, walk.guard, core::nodeOf(child.header), core::nodeOf(*parent)))
       {
         return TAV_RC_OUTSIDE_PARENT;
       }
@@ -90,17 +94,19 @@ uint32_t walkTraced(Walk& walk)
 /// The children of the group on top of the stack from `node` on, up to a group among them or the end of the level.
 /// Everything that a step needs is kept in registers.
 template<bool Wide>
-uint32_t walkLevel(Walk& walk, const Block& memory, const Node& parent, const Level& children, Node& node)
+uint32_t walkLevel(Walk& walk, const core::Node& parent, const core::Level& children, core::Node& node)
 {
-  const Block block = memory;
-  const Level level = children;
+  const core::BlockBytes<core::AnyForm> bytes(walk.handle);
+  const core::Level level = children;
   const bool containment = walk.containment;
   WalkGuard guard = walk.guard;
-  Node child = node;
+  core::Node child = node;
   uint32_t rc = TAV_RC_OK;
-  for (bool first = walk.descended;; first = false)
+  bool first = walk.descended;
+  for (;; first = false)
   {
-    rc = stepInBlock<Wide>(block, level, first, child);
+    core::Place place = bytes.nowhere();
+    rc = core::step<Wide>(bytes, level, first, child, place);
     if (rc != TAV_RC_OK) [[unlikely]]
     {
       break;
@@ -116,27 +122,26 @@ uint32_t walkLevel(Walk& walk, const Block& memory, const Node& parent, const Le
     }
   }
   walk.guard = guard;
+  walk.descended = first;
   node = child;
   return rc;
 }
 
-/// The same walk over direct memory, until its end, an open group's sibling, or until tracing is switched on.
+/// The same walk over direct memory, until its end, or until a step is not here.
 uint32_t walkBlock(Walk& walk)
 {
-  Block block{};
-  Node node{};
-  while (blockOf(walk.handle, block) && !tracing())
+  core::Node node{};
+  while (core::BlockBytes<core::AnyForm>::canRead(walk.handle) && core::isFastCall(0))
   {
-    const Node parent = nodeOf(*topEntry<SilentFrame>(walk.stack));
-    const Level level = levelBelow(parent);
-    uint32_t rc = level.wide ? walkLevel<true>(walk, block, parent, level, node)
-                             : walkLevel<false>(walk, block, parent, level, node);
-    walk.descended = rc == TAV_RC_OK;
+    const core::Node parent = core::nodeOf(walk.stack.pEntries[walk.stack.count - 1]);
+    const core::Level level = core::levelBelow(parent);
+    uint32_t rc = level.wide ? walkLevel<true>(walk, parent, level, node) : walkLevel<false>(walk, parent, level, node);
     if (rc == TAV_RC_OK)
     {
       TAVHeader group{};
       toHeader(node, group);
-      rc = pushEntry<SilentFrame>(walk.stack, &group);
+      rc = core::push(walk.stack, group) ? TAV_RC_OK : walk.stack.push(&group);
+      walk.descended = true;
     }
     else if (rc == TAV_RC_NO_MORE_CHILDREN)
     {
@@ -144,10 +149,12 @@ uint32_t walkBlock(Walk& walk)
       {
         return TAV_RC_OK;
       }
-      rc = popEntry<SilentFrame>(walk.stack, &walk.last);
-      node = nodeOf(walk.last);
+      walk.last = walk.stack.pEntries[--walk.stack.count];
+      walk.descended = false;
+      node = core::nodeOf(walk.last);
+      continue;
     }
-    if (rc == kUnusual)
+    if (rc == core::kNotHere)
     {
       toHeader(node, walk.last);
       break;

@@ -2,10 +2,8 @@
 #include <array>
 #include <cstring>
 
-#include "api/nodeStep.h"
+#include "api/addElement.h"
 #include "api/rawWrite.h"
-#include "format/copySmall.h"
-#include "format/hdrStack.h"
 #include "format/layout.h"
 #include "kor/traceFrame.h"
 #include "tav/probes.h"
@@ -34,7 +32,9 @@ uint32_t checkNodeRoom(const TAVHandle& handle, const TAVHeader& header, uint64_
   {
     return TAV_RC_NO_MEMORY;
   }
-  const bool fits = hasRoom(handle, position, headerLength(header.hdrType), isGroup(header) ? 0 : sizeOf(header));
+  // A header of no known form, which is refused next, is taken for the longer one.
+  const uint64_t length = header.hdrType == TAV_HDR_32 ? kHeaderSize32 : kHeaderSize64;
+  const bool fits = hasRoom(handle, position, length, isGroup(header) ? 0 : sizeOf(header));
   return fits ? TAV_RC_OK : TAV_RC_END_OF_STORAGE;
 }
 
@@ -82,193 +82,6 @@ uint32_t writeNode(TAVHandle& handle, const TAVHeader& header, uint64_t& positio
 uint32_t pushGroup(TAVHandle& handle, const TAVHeader& group)
 {
   return handle.pHdrStack != nullptr ? handle.pHdrStack->push(&group) : TAV_RC_NO_HDR_STACK;
-}
-
-/// The bytes of a payload with its padding.
-uint64_t paddedSize(const TAVHandle& handle, uint64_t size)
-{
-  if (handle.alignMode == 1)
-  {
-    roundUp8Checked(size);
-  }
-  return size;
-}
-
-/// Whether a payload stands apart from the place that its node is encoded to.
-bool isApart(const uint8_t* payload, uint64_t size, const uint8_t* to, uint64_t length)
-{
-  const auto from = reinterpret_cast<uintptr_t>(payload);
-  const auto start = reinterpret_cast<uintptr_t>(to);
-  return from + size <= start || start + length <= from;
-}
-
-/// Encodes a payload at its place, in the other byte order if `swap`.
-void encodePayload(uint16_t type, bool swap, const uint8_t* payload, uint64_t size, uint8_t* to)
-{
-  uint64_t prefix = 0;
-  if (swap) [[unlikely]]
-  {
-    const SwapRule rule = typeInfo(type).swapRule;
-    prefix = swappedPrefix(rule, size);
-    swapPayload(rule, payload, to, prefix);
-  }
-  copySmall(to + prefix, payload + prefix, size - prefix);
-}
-
-/// Whether a child of this form may stand under the open group. A stream's first node is not a usual child.
-template<bool Wide>
-[[gnu::always_inline]] inline bool isUsualChild(const TAVHandle& handle)
-{
-  const TAVHdrStack* const stack = handle.pHdrStack;
-  if (isReadOnly(handle) || stack == nullptr) [[unlikely]]
-  {
-    return false;
-  }
-  const uint64_t open = stack->count;
-  if (open == 0) [[unlikely]]
-  {
-    return false;
-  }
-  const TAVHeader& parent = stack->pEntries[open - 1];
-  return Wide ? is64(parent) && parent.hdr64.type != TAV_TYPE_HEADER32 : typeOf(parent) == TAV_TYPE_HEADER32;
-}
-
-constexpr uint64_t kUsualSize = ~uint64_t{0} / 2; // far from where sums would pass 64 bits
-
-/// Whether a data element comes with its payload, of a size that can be.
-[[gnu::always_inline]] inline bool hasUsualPayload(const TAVHeaderData& node, const HeaderFields& fields)
-{
-  const bool complete = node.dataBufSize == 0 || node.dataBufSize >= fields.size;
-  return node.pDataBuf != nullptr && complete && fields.size <= kUsualSize;
-}
-
-/// Opens a group in place.
-template<bool Wide>
-uint32_t openSilently(TAVHandle& handle, TAVHeader& header, HeaderFields fields)
-{
-  const uint64_t position = handle.streamBytes;
-  constexpr uint64_t length = Wide ? kHeaderSize64 : kHeaderSize32;
-  uint8_t* const to = takePlace(handle, position, length);
-  if (to == nullptr) [[unlikely]]
-  {
-    return kUnusual;
-  }
-  if (Wide && handle.alignMode == 1)
-  {
-    fields.info |= TAV_INFO_ALIGNED8;
-    header.hdr64.info = fields.info;
-  }
-  encodeFields(fields, Wide, handle.swapBytes != 0, to);
-  header.nodeOffset = position;
-  handle.streamBytes = position + length;
-  return pushEntry<SilentFrame>(*handle.pHdrStack, &header);
-}
-
-/// What ends an append: the node stands where the write offset was. The payload was read before, as it may be one of
-/// these numbers.
-[[gnu::always_inline]] inline uint32_t moveBehind(TAVHandle& handle, TAVHeaderData& node, uint64_t position,
-                                                  uint64_t length)
-{
-  node.header.nodeOffset = position;
-  handle.streamBytes = position + length;
-  return TAV_RC_OK;
-}
-
-/// Appends a data element in place, whether or not it is in the other byte order, padded, or followed by a pair.
-template<bool Wide>
-[[gnu::noinline]] uint32_t addInPlace(TAVHandle& handle, TAVHeaderData& node, HeaderFields fields)
-{
-  constexpr uint64_t headerSize = Wide ? kHeaderSize64 : kHeaderSize32;
-  const uint64_t size = fields.size;
-  const uint64_t padded = paddedSize(handle, size);
-  const bool pair = (fields.info & TAV_INFO_EYE_SIZE) != 0;
-  const uint64_t length = headerSize + (pair ? padded + kEyeSizeLength : size); // last padding is not written
-  const uint64_t position = handle.streamBytes;
-  const bool swap = handle.swapBytes != 0;
-  uint8_t* const to = takePlace(handle, position, length);
-  const uint8_t* const payload = node.pDataBuf;
-  if (to == nullptr || (swap && !isApart(payload, size, to, length))) [[unlikely]]
-  {
-    return kUnusual;
-  }
-  if (Wide && handle.alignMode == 1)
-  {
-    fields.info |= TAV_INFO_ALIGNED8;
-    node.header.hdr64.info = fields.info;
-  }
-  encodeFields(fields, Wide, swap, to);
-  encodePayload(fields.type, swap, payload, size, to + headerSize);
-  if (pair)
-  {
-    const EyeSizeBytes bytes = encodeEyeSize(dataDistance(size), swap);
-    std::memcpy(to + headerSize + padded, bytes.data(), bytes.size());
-  }
-  return moveBehind(handle, node, position, pair ? length : headerSize + padded);
-}
-
-/// Copies a payload that copySmall would call for: as a function of its own that ends the caller, which then saves no
-/// registers.
-[[gnu::noinline, gnu::used]] uint32_t putLong(uint64_t /*options*/, TAVHandle* handle, TAVHeaderData* node,
-                                              const uint8_t* payload, uint64_t size, uint8_t* to)
-{
-  std::memmove(to, payload, size);
-  return moveBehind(*handle, *node, handle->streamBytes, kHeaderSize64 + size);
-}
-
-/// Puts a data element with a 64-bit header in host order, neither padded nor with a pair, behind the stream's last
-/// node. `to` is where its payload goes; most are one 32-bit or 64-bit value.
-[[gnu::always_inline]] inline uint32_t putPlain(TAVHandle& handle, TAVHeaderData& node, uint64_t size, uint64_t rest,
-                                                const uint8_t* payload, uint64_t position, uint8_t* to)
-{
-  std::memcpy(to - kHeaderSize64, &size, sizeof size);
-  keepStoresApart();
-  std::memcpy(to - sizeof rest, &rest, sizeof rest);
-  if (size == sizeof(uint32_t))
-  {
-    std::memcpy(to, payload, sizeof(uint32_t));
-    return moveBehind(handle, node, position, kHeaderSize64 + size);
-  }
-  if (size == sizeof(uint64_t))
-  {
-    std::memcpy(to, payload, sizeof(uint64_t));
-    return moveBehind(handle, node, position, kHeaderSize64 + size);
-  }
-  if (size > kLongestSmall)
-  {
-    return putLong(0, &handle, &node, payload, size, to);
-  }
-  copySmall(to, payload, size);
-  return moveBehind(handle, node, position, kHeaderSize64 + size);
-}
-
-/// Appends a node in place, other than by putPlain; else `kUnusual`, with nothing done.
-template<bool Wide>
-uint32_t addSilently(TAVHandle& handle, TAVHeaderData& node)
-{
-  if (!isUsualChild<Wide>(handle))
-  {
-    return kUnusual;
-  }
-  const HeaderFields fields = fieldsOf<Wide>(node.header);
-  if (isGroupType(fields.type))
-  {
-    return openSilently<Wide>(handle, node.header, fields);
-  }
-  return hasUsualPayload(node, fields) ? addInPlace<Wide>(handle, node, fields) : kUnusual;
-}
-
-/// The same for a node of either form.
-uint32_t addSilently(TAVHandle& handle, TAVHeaderData& node)
-{
-  switch (node.header.hdrType)
-  {
-  case TAV_HDR_64:
-    return addSilently<true>(handle, node);
-  case TAV_HDR_32:
-    return addSilently<false>(handle, node);
-  default:
-    return kUnusual;
-  }
 }
 
 } // namespace
@@ -333,82 +146,34 @@ namespace
   return frame.code();
 }
 
-/// Whether a node is a data element with its whole payload and without a pair.
-[[gnu::always_inline]] inline bool isPlainElement(const HeaderFields& fields, const uint8_t* payload, uint64_t length)
+/// The fast way over bytes of any kind.
+template<class Bytes>
+uint32_t addFast(TAVHandle& handle, TAVHeaderData& node)
 {
-  return fields.type > TAV_TYPE_HEADER64 && length >= fields.size && (fields.info & TAV_INFO_EYE_SIZE) == 0 &&
-         payload != nullptr;
-}
-
-/// Everything but the plain element.
-[[gnu::noinline]] uint32_t addNotPlain(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
-{
-  const bool silent = isSilentCall(options) && handle != nullptr && headerData != nullptr;
-  const uint32_t rc = silent ? addSilently(*handle, *headerData) : kUnusual;
-  return rc != kUnusual ? rc : addTraced(options, handle, headerData);
-}
-
-/// Everything but the plain element in a block of memory, without a record. `used` keeps its arguments where they are.
-[[gnu::noinline, gnu::used]] uint32_t addOther(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
-{
-  if (handle == nullptr || headerData == nullptr || !isPlainRing(*handle) || !is64(headerData->header) ||
-      !isUsualChild<true>(*handle)) [[unlikely]]
+  if (!Bytes::canWrite(handle))
   {
-    return addNotPlain(options, handle, headerData);
+    return core::kNotHere;
   }
-  const HeaderFields fields = fieldsOf<true>(headerData->header);
-  const uint8_t* const payload = headerData->pDataBuf;
-  const uint64_t position = handle->streamBytes;
-  TAVCircularBuf& ring = *handle->pCircularBuf;
-  if (!isPlainElement(fields, payload, headerData->dataBufSize) || fields.size > kUsualSize ||
-      ring.storageWritable == 0) [[unlikely]]
+  switch (node.header.hdrType)
   {
-    return addNotPlain(0, handle, headerData);
+  case TAV_HDR_64:
+    return core::append<true>(Bytes(handle), handle, node);
+  case TAV_HDR_32:
+    return core::append<false>(Bytes(handle), handle, node);
+  default:
+    return core::kNotHere;
   }
-  const uint64_t rest = joinRest(fields);
-  uint8_t* const to = takeInPage(ring, position, kHeaderSize64 + fields.size);
-  if (to == nullptr) [[unlikely]]
-  {
-    return addNotPlain(0, handle, headerData);
-  }
-  return putPlain(*handle, *headerData, fields.size, rest, payload, position, to + kHeaderSize64);
-}
-
-/// The data element with a 64-bit header in host order, added to a block of memory, is what streams are made of. Every
-/// other way out ends in one call. Accesses to memory are what limits it: no field is loaded twice, no register saved.
-[[gnu::always_inline]] inline uint32_t addPlain(TAVHandle* handle, TAVHeaderData* headerData)
-{
-  if (handle == nullptr || headerData == nullptr || !isPlainBlock(*handle) || !is64(headerData->header) ||
-      !isUsualChild<true>(*handle)) [[unlikely]]
-  {
-    return addOther(0, handle, headerData);
-  }
-  const HeaderFields fields = fieldsOf<true>(headerData->header);
-  const uint8_t* const payload = headerData->pDataBuf;
-  if (!isPlainElement(fields, payload, headerData->dataBufSize)) [[unlikely]]
-  {
-    return addOther(0, handle, headerData);
-  }
-  const uint64_t size = fields.size;
-  const uint64_t rest = joinRest(fields);
-  if (!hasRoom(*handle, handle->streamBytes, kHeaderSize64, size) || handle->pDirectData == nullptr) [[unlikely]]
-  {
-    return addOther(0, handle, headerData);
-  }
-  const uint64_t position = handle->streamBytes;
-  uint8_t* const to = handle->pDirectData + position + kHeaderSize64;
-  return putPlain(*handle, *headerData, size, rest, payload, position, to);
-}
-
-/// The same where tracing was on once, and every call with options or with records.
-[[gnu::noinline]] uint32_t addOnceTraced(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
-{
-  return isSilentCall(options) ? addPlain(handle, headerData) : addNotPlain(options, handle, headerData);
 }
 
 } // namespace
 
-uint32_t tavAddElement(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
+uint32_t tav::inside::addElsewhere(uint64_t options, TAVHandle* handle, TAVHeaderData* headerData)
 {
-  return isUsualCall(options) ? addPlain(handle, headerData) : addOnceTraced(options, handle, headerData);
+  uint32_t rc = core::kNotHere;
+  if (core::isFastCall(options) && handle != nullptr && headerData != nullptr)
+  {
+    rc = core::isDirect(*handle) ? addFast<core::BlockBytes<core::AnyForm>>(*handle, *headerData)
+                                 : addFast<core::RingBytes<core::AnyForm>>(*handle, *headerData);
+  }
+  return rc != core::kNotHere ? rc : addTraced(options, handle, headerData);
 }

@@ -11,6 +11,7 @@
 
 #include "bench/library/layer.hpp"
 #include "bench/library/plain.hpp"
+#include "bench/library/ringSteps.hpp"
 
 using namespace snapshot;
 
@@ -35,6 +36,7 @@ struct Streams
       : hosts(hostCount), encoded(streamBytes(hosts)), block(encoded.size() + 1)
   {
     floor0::encode(model(), encoded.data(), hosts);
+    library::addThroughRing(library::RingHandle(buffered, TAV_OPT_WRITE).get(), kLeaves);
   }
   [[nodiscard]] bool isSum(uint64_t sum) const { return sum == hosts * model().checksum; }
   [[nodiscard]] const char* end() const { return encoded.data() + encoded.size(); }
@@ -42,6 +44,7 @@ struct Streams
   size_t hosts;
   std::vector<char> encoded;
   std::vector<char> block;
+  library::BufferedMemory buffered{library::ringBytes(kLeaves)}; ///< as many elements as the host has leaves
 };
 
 /// All random paths; `find` returns what floor0::find does.
@@ -77,6 +80,18 @@ bool printXml(Streams& streams)
                              library::kXml) != 0;
 }
 
+bool addThroughRing(Streams& streams)
+{
+  const library::RingHandle handle(streams.buffered, TAV_OPT_WRITE);
+  return library::addThroughRing(handle.get(), kLeaves);
+}
+
+bool stepThroughRing(Streams& streams)
+{
+  const library::RingHandle handle(streams.buffered, TAV_OPT_READ);
+  return library::stepThroughRing(handle.get()) == kLeaves * (kLeaves - 1) / 2;
+}
+
 const std::map<std::string, std::function<bool(Streams&)>> kParts = {
     {"nothing", [](Streams&) { return true; }},
     {"W1/floor", [](Streams& s) { return floor0::encode(model(), s.block.data(), s.hosts) == s.encoded.size(); }},
@@ -104,6 +119,8 @@ const std::map<std::string, std::function<bool(Streams&)>> kParts = {
     {"W5/floor", [](Streams& s) { return floor0::validate(s.encoded.data(), s.end()) != 0; }},
     {"W5/tavValidateHierarchy",
      [](Streams& s) { return library::validatePlain(s.encoded.data(), s.encoded.size()); }},
+    {"ring/tavAddElement", addThroughRing},
+    {"ring/tavGetNextChild", stepThroughRing},
 };
 
 bool run(const std::string& argument)

@@ -3,11 +3,12 @@
 
     check-rooms.py [ROOT]
 
-Includes point one way: tools -> inspect -> api -> storage, dictionary -> format -> kor. The operating system, its headers and
+Includes point one way: tools -> inspect -> api -> core -> storage, dictionary -> format -> kor. The system, its headers and
 the byte order are kor's business, which has a file a platform: names that end in Posix or Windows. No other source
-asks for the platform, tests and examples included.
+asks for the platform, tests and examples included. What keeps a compiler from its work stands in one file.
 
-Names in `tav` itself are those of the installed headers: what stays inside the library is in `tav::inside`.
+Names in `tav` itself are those of the installed headers: what stays inside the library is in `tav::inside`, and the
+steps are in `tav::core`.
 """
 import pathlib
 import re
@@ -19,7 +20,8 @@ ROOMS = {
     "format": {"format", "kor"},
     "storage": {"storage", "format", "kor"},
     "dictionary": {"dictionary", "format", "kor"},
-    "api": {"api", "storage", "dictionary", "format", "kor"},
+    "core": {"core", "storage", "format", "kor"},
+    "api": {"api", "core", "storage", "dictionary", "format", "kor"},
     "inspect": {"inspect"},
     "tools": {"tools"},
     "include": set(),
@@ -59,6 +61,9 @@ PLATFORM_TEST = re.compile(
     r"__BYTE_ORDER__|__BYTE_ORDER|__ORDER_\w+_ENDIAN__|__(?:BIG|LITTLE)_ENDIAN__|WORDS_BIGENDIAN|"
     r"std::endian|htonl|htons|ntohl|ntohs|hto[bl]e(?:16|32|64)|[bl]e(?:16|32|64)toh)\b"
 )
+# Tricks with the compiler, and the one file of the libraries that may hold them.
+TRICK = re.compile(r"__asm__|\basm\b|gnu::used|\bconst volatile\b")
+TRICK_FILE = "core/word.h"
 COMMENT = re.compile(r"//.*$")
 
 
@@ -95,6 +100,9 @@ def check_text(name, text):
         return
     for number, line in enumerate(text.splitlines(), start=1):
         match = INCLUDE.match(line)
+        trick = TRICK.search(COMMENT.sub("", line))
+        if trick and name != TRICK_FILE:
+            yield number, f"{trick[0]}: tricks with the compiler stand in {TRICK_FILE}"
         if match:
             error = include_error(name, room, match["open"], match["path"])
             if error:

@@ -195,12 +195,11 @@ private:
   uint32_t code_ = TAV_RC_OK;
 };
 
-/// A frame without records, for a call that began while tracing was off and that calls nothing outside the library:
-/// nobody can tell it from one that asks before every record.
-class SilentFrame
+/// A frame without records, for a step of a call that leaves none and calls nothing outside the library.
+class UntracedFrame
 {
 public:
-  explicit SilentFrame(uint32_t /*probe*/) {}
+  explicit UntracedFrame(uint32_t /*probe*/) {}
 
   template<class... Values>
   void dump(uint32_t /*point*/, const Values&... /*values*/) const
@@ -210,11 +209,6 @@ public:
   [[nodiscard]] bool require(uint32_t point, bool holds, uint32_t code)
   {
     return holds || fail(point, code);
-  }
-
-  [[nodiscard]] bool step(uint32_t point, uint32_t code)
-  {
-    return code == TAV_RC_OK || fail(point, code);
   }
 
   bool fail(uint32_t /*point*/, uint32_t code)

@@ -16,7 +16,13 @@ using namespace tav::inside;
 namespace
 {
 
+// What the allocator's records name as the caller.
 constexpr const char* kUnit = "tavCircularBuf";
+constexpr uint32_t kMakeRingLine = 156;
+constexpr uint32_t kMakeFlagsLine = 163;
+constexpr uint32_t kRefusedLine = 169;
+constexpr uint32_t kEndRingLine = 239;
+constexpr uint32_t kEndFlagsLine = 244;
 constexpr uint64_t kDefaultPageSize = 0x10000;
 constexpr uint64_t kSeekHint = 1;
 
@@ -108,11 +114,11 @@ uint32_t TAVCircularBuf::allocate()
   {
     ringSize = pageCount * pageSize;
     void* ring = nullptr;
-    uint32_t rc = korMemAlloc(&ring, 0, ringSize, KOR_MEM_PLAIN, kUnit, 156);
+    uint32_t rc = korMemAlloc(&ring, 0, ringSize, KOR_MEM_PLAIN, kUnit, kMakeRingLine);
     if (rc == TAV_RC_OK)
     {
       void* flags = nullptr;
-      rc = korMemAlloc(&flags, 0, 2 * pageCount, KOR_MEM_PLAIN, kUnit, 163);
+      rc = korMemAlloc(&flags, 0, 2 * pageCount, KOR_MEM_PLAIN, kUnit, kMakeFlagsLine);
       if (rc == TAV_RC_OK)
       {
         pRing = static_cast<uint8_t*>(ring);
@@ -120,7 +126,7 @@ uint32_t TAVCircularBuf::allocate()
         std::memset(pPageFlags, 0, 2 * pageCount);
         return TAV_RC_OK;
       }
-      korMemFree(&ring, 0, 0, kUnit, 169);
+      korMemFree(&ring, 0, 0, kUnit, kRefusedLine);
     }
     if (pageCount == 1)
     {
@@ -148,13 +154,13 @@ TAVCircularBuf::~TAVCircularBuf()
   if (pRing != nullptr)
   {
     void* ring = pRing;
-    korMemFree(&ring, 0, 0, kUnit, 239);
+    korMemFree(&ring, 0, 0, kUnit, kEndRingLine);
     pRing = nullptr;
   }
   if (pPageFlags != nullptr)
   {
     void* flags = pPageFlags;
-    korMemFree(&flags, 0, 0, kUnit, 244);
+    korMemFree(&flags, 0, 0, kUnit, kEndFlagsLine);
     pPageFlags = nullptr;
   }
 }
@@ -379,18 +385,18 @@ bool TAVCircularBuf::isCached(uint64_t offset) const
 
 uint64_t TAVCircularBuf::cachedCount() const
 {
-  return tracing() ? countCached<TraceFrame>(*this) : countCached<SilentFrame>(*this);
+  return tracing() ? countCached<TraceFrame>(*this) : countCached<UntracedFrame>(*this);
 }
 
 bool TAVCircularBuf::isEmpty() const
 {
-  return tracing() ? cachesNothing<TraceFrame>(*this) : cachesNothing<SilentFrame>(*this);
+  return tracing() ? cachesNothing<TraceFrame>(*this) : cachesNothing<UntracedFrame>(*this);
 }
 
 /// The ring index of a stream offset; false when it is not cached.
 bool TAVCircularBuf::indexOf(uint64_t offset, uint64_t& index) const
 {
-  return tracing() ? findIndex<TraceFrame>(*this, offset, index) : findIndex<SilentFrame>(*this, offset, index);
+  return tracing() ? findIndex<TraceFrame>(*this, offset, index) : findIndex<UntracedFrame>(*this, offset, index);
 }
 
 /// The mapping behind the chunkOffset of a backward chunk. It is given a stream offset where an index is meant, and
@@ -423,5 +429,5 @@ uint32_t TAVCircularBuf::offsetOf(uint64_t value, uint64_t& offset) const
 
 uint64_t TAVCircularBuf::pageOf(uint64_t index) const
 {
-  return tracing() ? findPage<TraceFrame>(*this, index) : findPage<SilentFrame>(*this, index);
+  return tracing() ? findPage<TraceFrame>(*this, index) : findPage<UntracedFrame>(*this, index);
 }

@@ -11,7 +11,10 @@ using namespace tav::inside;
 namespace
 {
 
+// What the allocator's records name as the caller.
 constexpr const char* kUnit = "tavSideStorage";
+constexpr uint32_t kMakeLine = 812;
+constexpr uint32_t kEndLine = 847;
 constexpr uint64_t kMemoryAttributes = 0xE3; // writable, readable forward, direct memory, and a bit of no use here
 
 } // namespace
@@ -22,7 +25,7 @@ TAVSSMemory::TAVSSMemory(uint64_t size, uint32_t* rc)
   TraceFrame frame(probe::ssMemory);
   frame.dump(0, size, rc);
   void* block = nullptr;
-  status = korMemAlloc(&block, 0, size, KOR_MEM_PLAIN, kUnit, 812);
+  status = korMemAlloc(&block, 0, size, KOR_MEM_PLAIN, kUnit, kMakeLine);
   if (frame.step(10, status))
   {
     pBuffer = static_cast<uint8_t*>(block);
@@ -51,7 +54,7 @@ TAVSSMemory::~TAVSSMemory()
   if (ownsBuffer != 0 && pBuffer != nullptr)
   {
     void* block = pBuffer;
-    korMemFree(&block, 0, 0, kUnit, 847);
+    korMemFree(&block, 0, 0, kUnit, kEndLine);
   }
   pBuffer = nullptr;
   bufferSize = 0;

@@ -19,26 +19,25 @@ namespace tav::layout
 /// @name Arithmetic on sizes and offsets that a stream gives: it never wraps
 /// @{
 
+/// Adds into `sum`; false when the result passes 64 bits.
+constexpr bool addFits(uint64_t a, uint64_t b, uint64_t& sum)
+{
+  uint64_t result = 0;
+  const bool passes = __builtin_add_overflow(a, b, &result);
+  sum = result;
+  return !passes;
+}
+
 /// Adds to `sum`; false, with `sum` at its maximum, when the result would pass 64 bits.
 constexpr bool addChecked(uint64_t& sum, uint64_t amount)
 {
-  if (amount > ~uint64_t{0} - sum)
-  {
-    sum = ~uint64_t{0};
-    return false;
-  }
-  sum += amount;
-  return true;
-}
-
-/// Adds into `sum`; false when the result passes 64 bits.
-inline bool addFits(uint64_t a, uint64_t b, uint64_t& sum)
-{
-  return !__builtin_add_overflow(a, b, &sum);
+  const bool fits = addFits(sum, amount, sum);
+  sum = fits ? sum : ~uint64_t{0};
+  return fits;
 }
 
 /// Takes off `room`; false when it has not so much.
-inline bool takeRoom(uint64_t& room, uint64_t amount)
+constexpr bool takeRoom(uint64_t& room, uint64_t amount)
 {
   return !__builtin_sub_overflow(room, amount, &room);
 }
@@ -81,7 +80,7 @@ constexpr bool isGroupType(uint16_t type)
   return type == TAV_TYPE_HEADER32 || type == TAV_TYPE_HEADER64;
 }
 
-/// What a header says, whichever form it has.
+/// What a header says, whichever form it has. One of no known form counts as a 32-bit header.
 inline bool is64(const TAVHeader& header)
 {
   return header.hdrType == TAV_HDR_64;
@@ -126,7 +125,7 @@ constexpr bool isKnownHdrType(uint16_t hdrType)
 
 constexpr uint64_t headerLength(uint16_t hdrType)
 {
-  return hdrType == TAV_HDR_32 ? kHeaderSize32 : kHeaderSize64;
+  return hdrType == TAV_HDR_64 ? kHeaderSize64 : kHeaderSize32;
 }
 
 /// Whether the children of a group have 64-bit headers.
@@ -171,6 +170,11 @@ struct HeaderFields
   uint16_t elm;
 };
 
+inline HeaderFields fieldsOf(const TAVHeader& header)
+{
+  return {sizeOf(header), infoOf(header), typeOf(header), elmOf(header)};
+}
+
 /// Reads the fields of a header's stream form.
 inline HeaderFields decodeFields(const uint8_t* bytes, bool wide, bool swap)
 {
@@ -206,45 +210,13 @@ inline void setHeader(const HeaderFields& fields, bool wide, TAVHeader& header)
   header.hdr32 = {static_cast<uint32_t>(fields.size), fields.type, fields.elm};
 }
 
-/// The type in the stream form of a 64-bit header in this machine's order.
-inline uint16_t typeAt(const uint8_t* bytes)
-{
-  uint16_t type = 0;
-  std::memcpy(&type, bytes + offsetof(TAVHeader64, type), sizeof type);
-  return type;
-}
-
-/// Loads a word of a header. It is stored as it was loaded, by itself: who reads a header's fields straight afterwards
-/// would wait for a wider store.
-inline uint64_t loadWord(const uint8_t* from)
-{
-  uint64_t word = 0;
-  std::memcpy(&word, from, sizeof word);
-#if defined(__GNUC__)
-  __asm__(""
-          : "+r"(word)); // keeps the compiler from joining the words
-#endif
-  return word;
-}
-
-/// Copies words one by one.
-template<size_t Words>
-inline void copyWords(void* to, const uint8_t* from)
-{
-  for (size_t at = 0; at < Words * sizeof(uint64_t); at += sizeof(uint64_t))
-  {
-    const uint64_t word = loadWord(from + at);
-    std::memcpy(static_cast<uint8_t*>(to) + at, &word, sizeof word);
-  }
-}
-
 /// Reads the header's stream form: sets the form and its fields, nothing else.
 inline void decodeHeader(const uint8_t* bytes, bool wide, bool swap, TAVHeader& header)
 {
   if (wide)
   {
     header.hdrType = TAV_HDR_64;
-    copyWords<2>(&header.hdr64, bytes);
+    std::memcpy(&header.hdr64, bytes, sizeof header.hdr64);
     if (swap)
     {
       swapFields(header.hdr64);
@@ -252,51 +224,11 @@ inline void decodeHeader(const uint8_t* bytes, bool wide, bool swap, TAVHeader& 
     return;
   }
   header.hdrType = TAV_HDR_32;
-  copyWords<1>(&header.hdr32, bytes);
+  std::memcpy(&header.hdr32, bytes, sizeof header.hdr32);
   if (swap)
   {
     swapFields(header.hdr32);
   }
-}
-
-/// The fields of a header of a form that is known. They are loaded one by one, which `volatile` keeps the compiler from
-/// joining: who fills a header stores them one by one, and a wide load straight afterwards would wait until those
-/// stores have left the store buffer.
-template<bool Wide>
-inline HeaderFields fieldsOf(const TAVHeader& header)
-{
-  if constexpr (Wide)
-  {
-    const volatile TAVHeader64& from = header.hdr64;
-    return {from.size, from.info, from.type, from.elm};
-  }
-  else
-  {
-    const volatile TAVHeader32& from = header.hdr32;
-    return {from.size, 0, from.type, from.elm};
-  }
-}
-
-/// The second word of a 64-bit header in this machine's order. The compiler joins the fields here, not where the word
-/// is stored: that would take three registers until then.
-inline uint64_t joinRest(const HeaderFields& fields)
-{
-  uint64_t word = kor::isLittleEndian ? fields.info | uint64_t{fields.type} << 32 | uint64_t{fields.elm} << 48
-                                      : uint64_t{fields.info} << 32 | uint64_t{fields.type} << 16 | fields.elm;
-#if defined(__GNUC__)
-  __asm__(""
-          : "+r"(word));
-#endif
-  return word;
-}
-
-/// Keeps the compiler from joining a store before with one behind, where it takes longer to join the values.
-inline void keepStoresApart()
-{
-#if defined(__GNUC__)
-  __asm__("" ::
-              : "memory");
-#endif
 }
 
 /// Writes a header's stream form to `out` and returns its length.
@@ -324,8 +256,7 @@ inline uint64_t encodeFields(const HeaderFields& fields, bool wide, bool swap, u
 /// Writes the header's stream form to `out` and returns its length.
 inline uint64_t encodeHeader(const TAVHeader& header, bool swap, uint8_t* out)
 {
-  return header.hdrType == TAV_HDR_32 ? encodeFields(fieldsOf<false>(header), false, swap, out)
-                                      : encodeFields(fieldsOf<true>(header), true, swap, out);
+  return encodeFields(fieldsOf(header), is64(header), swap, out);
 }
 
 /// @}
@@ -508,6 +439,16 @@ constexpr uint64_t groupDistance(uint64_t payloadBefore, bool wideElement)
 constexpr uint64_t endElementLength(bool wideElement)
 {
   return (wideElement ? kHeaderSize64 : kHeaderSize32) + kEyeSizeLength;
+}
+
+/// The header of a group's end element; the pair behind it is its data, and as long as it would be padded to.
+/// `aligned`: the stream's payloads are padded, which the flag of a wide header says.
+inline TAVHeader endElement(bool wide, bool aligned)
+{
+  const uint32_t info = aligned ? TAV_INFO_ALIGNED8 : 0;
+  TAVHeader header{};
+  setHeader({kEyeSizeLength, info, TAV_TYPE_BINARY, TAV_ELM_CMN_END_HDR_EYE_SIZE}, wide, header);
+  return header;
 }
 
 /// Where the node begins that a pair at `eyeOffset` ends; false when that lies before the stream's first byte.

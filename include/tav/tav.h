@@ -388,7 +388,7 @@ public:
   uint32_t count;
 
 private:
-  uint32_t grow(); ///< kept for the binary interface
+  uint32_t grow(); ///< raises the capacity by one increment
 };
 
 /// How to open a handle.

@@ -114,17 +114,7 @@ void StreamEncoder::putEndElement(const Group& group)
 {
   const bool wide = hasChildren64(group.header);
   const auto pair = encodeEyeSize(groupDistance(file_.length() - group.payload, wide), form_.swapped);
-  TAVHeader end{};
-  end.hdrType = wide ? TAV_HDR_64 : TAV_HDR_32;
-  if (wide)
-  {
-    end.hdr64 = {pair.size(), form_.aligned ? TAV_INFO_ALIGNED8 : 0u, TAV_TYPE_BINARY, TAV_ELM_CMN_END_HDR_EYE_SIZE};
-  }
-  else
-  {
-    end.hdr32 = {static_cast<uint32_t>(pair.size()), TAV_TYPE_BINARY, TAV_ELM_CMN_END_HDR_EYE_SIZE};
-  }
-  putHeader(end);
+  putHeader(endElement(wide, form_.aligned));
   file_.append(std::span<const uint8_t>(pair));
 }
 

@@ -84,17 +84,8 @@ void Rebuilder::close()
   {
     ++endElements_;
     const bool wide = hasChildren64(group);
-    TAVHeader end{};
-    end.hdrType = wide ? TAV_HDR_64 : TAV_HDR_32;
-    if (wide)
-    {
-      end.hdr64 = {kEyeSizeLength, 0, TAV_TYPE_BINARY, TAV_ELM_CMN_END_HDR_EYE_SIZE};
-    }
-    else
-    {
-      end.hdr32 = {static_cast<uint32_t>(kEyeSizeLength), TAV_TYPE_BINARY, TAV_ELM_CMN_END_HDR_EYE_SIZE};
-    }
     const uint64_t before = out_.length() - start;
+    TAVHeader end = endElement(wide, form_.aligned);
     putHeader(end);
     out_.append(std::span<const uint8_t>(encodeEyeSize(groupDistance(before, wide), form_.swapped)));
   }

@@ -47,9 +47,9 @@ TEST_P(OverlappingPayload, ComesOutTheSameWhetherOrNotItIsTraced)
 {
   for (uint64_t from = 0; from + kPayload <= kRegion; ++from)
   {
-    const Bytes silent = written(from);
+    const Bytes fast = written(from);
     const TraceLog trace;
-    EXPECT_EQ(silent, written(from)) << "payload at " << from;
+    EXPECT_EQ(fast, written(from)) << "payload at " << from;
   }
 }
 

@@ -5,7 +5,8 @@
 #include <cstdint>
 #include <gtest/gtest.h>
 
-#include "api/nodeStep.h"
+#include "core/fastWay.h"
+#include "storage/cachedRun.h"
 #include "support/byteRows.h"
 #include "support/reading.h"
 #include "support/streams.h"
@@ -151,7 +152,7 @@ TEST_F(Peek, WhereASeekLandsElsewhereTheRingIsAsked)
   fill(reader.handle());
   reader.vectorStorage().seekError = 1;
   Bytes got(16);
-  EXPECT_EQ(tav::inside::peekBytes(*reader.handle()->pCircularBuf, 0, got.data(), got.size()), tav::inside::kUnusual);
+  EXPECT_EQ(tav::inside::peekBytes(*reader.handle()->pCircularBuf, 0, got.data(), got.size()), tav::core::kNotHere);
 }
 
 TEST_F(Peek, WhereTheStorageDoesNotTellItsSizeTheRingIsAsked)

@@ -56,7 +56,7 @@ Printed printNode(uint64_t options, TAVHeaderData& node, bool open, bool body, b
 {
   CaughtStream stream;
   TAVPrintCtx ctx = printContext(stream.get(), options);
-  tav::inside::print::setDepth(ctx, depth);
+  ctx.depth = depth;
   ctx.attributeForm = attributes ? 1 : 0;
   uint64_t count = 0xBAD;
   const uint32_t rc = tavPrintNode(&ctx, &node, open, body, close, &count);

@@ -51,6 +51,18 @@ TEST(SinkToAStream, WritesEveryPieceBehindTheOther)
   EXPECT_EQ(ctx.bytesWritten, 7U);
 }
 
+TEST(SinkToAStream, TakesAPieceOfAnyLength)
+{
+  for (const size_t length : {size_t{510}, size_t{511}, size_t{512}, size_t{513}, size_t{100000}})
+  {
+    CaughtStream stream;
+    TAVPrintCtx ctx = printContext(stream.get());
+    const std::string text(length, 'x');
+    EXPECT_EQ(tavPrintf(&ctx, "%s", text.c_str()), length);
+    EXPECT_EQ(stream.text(), text);
+  }
+}
+
 TEST(SinkToAStream, LeavesTheBufferAlone)
 {
   CaughtStream stream;
@@ -149,33 +161,32 @@ TEST(SinkWithoutStreamAndBuffer, DoesNotLookAtTheBufferSize)
   EXPECT_EQ(out.text(), "whole text");
 }
 
-std::string formatAt(int64_t depth)
+/// The blanks before a line of XML.
+size_t blanksAt(int64_t depth)
 {
-  TAVPrintCtx ctx = printContext(nullptr);
-  tav::inside::print::setDepth(ctx, depth);
-  EXPECT_EQ(ctx.depth, depth);
-  return ctx.indentFormat.data();
+  CaughtStream stream;
+  TAVPrintCtx ctx = printContext(stream.get(), TAV_PRINT_XML);
+  ctx.depth = depth;
+  tav::inside::print::line(ctx, {"x"});
+  EXPECT_EQ(ctx.bytesWritten, stream.text().size());
+  return stream.text().find('x');
 }
 
 TEST(Indentation, IsThreeBlanksALevel)
 {
-  EXPECT_EQ(formatAt(1), "%3s%s");
-  EXPECT_EQ(formatAt(2), "%6s%s");
-  EXPECT_EQ(formatAt(100), "%300s%s");
-}
-
-TEST(Indentation, OfTheDeepestLevelFitsItsField)
-{
-  EXPECT_EQ(formatAt(4000), "%12000s%s");
+  EXPECT_EQ(blanksAt(1), 3U);
+  EXPECT_EQ(blanksAt(2), 6U);
+  EXPECT_EQ(blanksAt(100), 300U);
+  EXPECT_EQ(blanksAt(4000), 12000U);
 }
 
 TEST(Indentation, AtTheTopIsNone)
 {
   CaughtStream stream;
   TAVPrintCtx ctx = printContext(stream.get(), TAV_PRINT_XML);
-  tav::inside::print::setDepth(ctx, 1);
-  tav::inside::print::setDepth(ctx, 0);
-  tav::inside::print::line(ctx, "%s", "line\n");
+  ctx.depth = 1;
+  ctx.depth = 0;
+  tav::inside::print::line(ctx, {"line\n"});
   EXPECT_EQ(stream.text(), "line\n");
 }
 
@@ -185,8 +196,8 @@ TEST(Line, OfTextBeginsWithTheDepth)
   TAVPrintCtx ctx = printContext(stream.get());
   for (const int64_t depth : {0, 1, 10, 100, 1000})
   {
-    tav::inside::print::setDepth(ctx, depth);
-    tav::inside::print::line(ctx, "x%d\n", 1);
+    ctx.depth = depth;
+    tav::inside::print::line(ctx, {"x", "1\n"});
   }
   EXPECT_EQ(stream.text(), "  0|x1\n  1|   x1\n 10|" + std::string(30, ' ') + "x1\n100|" + std::string(300, ' ') +
                                "x1\n1000|" + std::string(3000, ' ') + "x1\n");
@@ -196,16 +207,16 @@ TEST(Line, OfXmlHasNoDepth)
 {
   CaughtStream stream;
   TAVPrintCtx ctx = printContext(stream.get(), TAV_PRINT_XML);
-  tav::inside::print::setDepth(ctx, 2);
-  tav::inside::print::line(ctx, "<%s>\n", "host");
+  ctx.depth = 2;
+  tav::inside::print::line(ctx, {"<", "host", ">\n"});
   EXPECT_EQ(stream.text(), "      <host>\n");
 }
 
 TEST(Line, OfTextIsAPieceBehindItsDepth)
 {
   BufferSink sink(16);
-  tav::inside::print::setDepth(sink.ctx, 1);
-  tav::inside::print::line(sink.ctx, "ab\n");
+  sink.ctx.depth = 1;
+  tav::inside::print::line(sink.ctx, {"ab\n"});
   EXPECT_EQ(sink.held(), "   ab\n");
   EXPECT_EQ(sink.ctx.bytesWritten, 10U);
 }
@@ -213,8 +224,8 @@ TEST(Line, OfTextIsAPieceBehindItsDepth)
 TEST(Line, IsCutPieceByPiece)
 {
   BufferSink sink(3);
-  tav::inside::print::setDepth(sink.ctx, 1);
-  tav::inside::print::line(sink.ctx, "ab\n");
+  sink.ctx.depth = 1;
+  tav::inside::print::line(sink.ctx, {"ab\n"});
   EXPECT_EQ(sink.held(), "  ");
   EXPECT_EQ(sink.ctx.bytesWritten, 4U); // two of "  1|", two of "   ab\n"
 }

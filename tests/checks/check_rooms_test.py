@@ -19,6 +19,8 @@ class CheckRooms(unittest.TestCase):
         for name, line in [
             ("api/writer.cpp", '#include "storage/circularBuf.h"'),
             ("api/writer.cpp", '#include "kor/traceFrame.h"'),
+            ("api/writer.cpp", '#include "core/append.h"'),
+            ("core/bytes.h", '#include "storage/cachedRun.h"'),
             ("storage/file.cpp", '#include "format/layout.h"'),
             ("dictionary/lookup.cpp", '#include "dictionary/dictionary.h"'),
             ("tools/main.cpp", '#include "tav/tav.h"'),
@@ -45,6 +47,9 @@ class CheckRooms(unittest.TestCase):
             ("kor/file.cpp", '#include "tav/tav.h"'),
             ("include/tav/kor.h", '#include "tav/tav.h"'),
             ("format/layout.h", '#include "storage/circularBuf.h"'),
+            ("core/step.h", '#include "api/rawWrite.h"'),
+            ("core/step.h", '#include "dictionary/dictionary.h"'),
+            ("storage/file.cpp", '#include "core/bytes.h"'),
             ("storage/file.cpp", '#include "api/reader.h"'),
             ("storage/file.cpp", '#include "dictionary/dictionary.h"'),
             ("dictionary/lookup.cpp", '#include "storage/circularBuf.h"'),
@@ -56,6 +61,13 @@ class CheckRooms(unittest.TestCase):
         ]:
             with self.subTest(name=name, line=line):
                 self.assertEqual(len(findings(name, line)), 1)
+
+    def test_keeps_tricks_with_the_compiler_in_one_file(self):
+        for line in ['__asm__("" ::: "memory");', "[[gnu::noinline, gnu::used]] void f();", "const volatile int& a = b;"]:
+            with self.subTest(line=line):
+                self.assertEqual(len(findings("include/tav/layout.hpp", line)), 1)
+                self.assertEqual(len(findings("core/step.h", line)), 1)
+                self.assertEqual(findings("core/word.h", line), [])
 
     def test_keeps_the_platform_in_kor(self):
         for name, line in [

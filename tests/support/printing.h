@@ -48,7 +48,7 @@ inline Printed printSubtree(uint64_t options, TAVHandle* handle, TAVHeaderData* 
 
 inline TAVPrintCtx printContext(FILE* stream, uint64_t options = 0, bool swap = false)
 {
-  return {nullptr, 0, stream, 0, tav::inside::print::kNoIndent, 0, swap ? uint8_t{1} : uint8_t{0}, options, 0, 0};
+  return {nullptr, 0, stream, 0, 0, swap ? uint8_t{1} : uint8_t{0}, options, 0, 0};
 }
 
 /// A pointer as the printer shows it.

@@ -166,9 +166,9 @@ private:
   static Group open(const detail::WriterRef& state, uint32_t outer, ElementId elm, const GroupOptions& options,
                     uint32_t& rc) noexcept
   {
-    const bool quick = state && state->quick == outer;
-    rc = quick ? TAV_RC_OK : state ? state->enter(outer)
-                                   : TAV_RC_BAD_PARAM;
+    const bool fast = state && state->fast == outer;
+    rc = fast ? TAV_RC_OK : state ? state->enter(outer)
+                                  : TAV_RC_BAD_PARAM;
     if (rc == TAV_RC_OK)
     {
       rc = state->openGroup(elm, options);
@@ -178,9 +178,9 @@ private:
       return Group(detail::WriterRef(nullptr), 0, 0);
     }
     state->innermost = state->depth();
-    if (quick && options.children == Width::bits64)
+    if (fast && options.children == Width::bits64)
     {
-      state->quick = state->innermost;
+      state->fast = state->innermost;
     }
     else
     {
@@ -239,21 +239,21 @@ private:
     if constexpr (detail::Addable<T>)
     {
       const auto write = [&](uint16_t type, const uint8_t* bytes, uint64_t size) {
-        return state_->appendQuickly(node, type, elm.id(), options, bytes, size);
+        return state_->appendFast(node, type, elm.id(), options, bytes, size);
       };
-      if (isQuick(elm, options)) [[likely]]
+      if (isFast(elm, options)) [[likely]]
       {
         return detail::withPayload(value, write);
       }
-      const NodeOptions kept(options); // so that the quick way needs none in memory
+      const NodeOptions kept(options); // so that the fast way needs none in memory
       return appendSlowly(node, elm, kept, [&value](auto& slow) { return detail::withPayload(value, slow); });
     }
   }
 
   /// Whether a data element can be added without a look at anything else.
-  [[gnu::always_inline]] bool isQuick(ElementId elm, const NodeOptions& options) const noexcept
+  [[gnu::always_inline]] bool isFast(ElementId elm, const NodeOptions& options) const noexcept
   {
-    return state_ && state_->quick == level_ && options.infoKey <= TAV_INFO_KEY_MASK && elm.isValid();
+    return state_ && state_->fast == level_ && options.infoKey <= TAV_INFO_KEY_MASK && elm.isValid();
   }
 
   /// When there is something to look at before. `give(write)` calls `write` with the payload.
@@ -282,13 +282,13 @@ private:
     if constexpr (detail::isIntegerTypeCode<Type> && StreamInteger<T>)
     {
       const auto write = [&](uint16_t type, const uint8_t* bytes, uint64_t size) {
-        return state_->appendQuickly(node, type, elm.id(), options, bytes, size);
+        return state_->appendFast(node, type, elm.id(), options, bytes, size);
       };
-      if (isQuick(elm, options)) [[likely]]
+      if (isFast(elm, options)) [[likely]]
       {
         return detail::withPayloadAs<Type>(value, write);
       }
-      const NodeOptions kept(options); // so that the quick way needs none in memory
+      const NodeOptions kept(options); // so that the fast way needs none in memory
       return appendSlowly(node, elm, kept, [&value](auto& slow) { return detail::withPayloadAs<Type>(value, slow); });
     }
   }
@@ -323,8 +323,8 @@ private:
 
   uint32_t end(uint64_t how) noexcept
   {
-    const bool quick = state_ && state_->quick == level_;
-    uint32_t rc = quick ? TAV_RC_OK : enter(how);
+    const bool fast = state_ && state_->fast == level_;
+    uint32_t rc = fast ? TAV_RC_OK : enter(how);
     if (rc == TAV_RC_OK)
     {
       rc = state_->endInnermost(how);
@@ -333,9 +333,9 @@ private:
     {
       level_ = 0;
       state_->innermost = outer_;
-      if (quick && outer_ != 0)
+      if (fast && outer_ != 0)
       {
-        state_->quick = outer_; // a group of 64-bit headers stands in one
+        state_->fast = outer_; // a group of 64-bit headers stands in one
       }
       else
       {

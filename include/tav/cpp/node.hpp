@@ -230,11 +230,11 @@ public:
   template<class T>
   [[nodiscard]] T as() const
   {
-    if constexpr (kIsUsual<T>)
+    if constexpr (kHasFastWay<T>)
     {
-      if (isQuick<T>()) [[likely]]
+      if (isFast<T>()) [[likely]]
       {
-        return readQuickly<T>();
+        return readFast<T>();
       }
     }
     if constexpr (detail::checkReadable<T>())
@@ -245,12 +245,12 @@ public:
   template<class T>
   [[nodiscard]] T as(std::error_code& ec) const
   {
-    if constexpr (kIsUsual<T>)
+    if constexpr (kHasFastWay<T>)
     {
-      if (isQuick<T>()) [[likely]]
+      if (isFast<T>()) [[likely]]
       {
         ec.clear();
-        return readQuickly<T>();
+        return readFast<T>();
       }
     }
     if constexpr (detail::checkReadable<T>())
@@ -301,27 +301,27 @@ private:
 
   /// A node of no known group.
   Node(detail::ReaderState& state, const TAVHeaderData& data) noexcept
-      : HeaderView(data), state_(&state), fetch_(state.fetches), isQuick_(state.isQuick)
+      : HeaderView(data), state_(&state), fetch_(state.fetches), isFast_(state.isFast)
   {
   }
   /// A node that a walk stands on: the walk moves it on.
   explicit Node(detail::ReaderState* state) noexcept
-      : state_(state), isQuick_(state != nullptr && state->isQuick)
+      : state_(state), isFast_(state != nullptr && state->isFast)
   {
   }
   /// Reads the node behind `reference`, which may be this one's own header, or the first one below the parent.
   [[gnu::always_inline]] uint32_t readNext(TAVHeader* parent, TAVHeader* reference) noexcept
   {
     detail::ReaderState& state = *state_;
-    if (!isQuick_) [[unlikely]]
+    if (!isFast_) [[unlikely]]
     {
       fetch_ = ++state.fetches;
     }
     return tavGetNextChild(0, state.handle, parent, reference, &data_);
   }
 
-  /// Surely no end element. A quick look: those have the largest ids.
-  [[nodiscard]] bool isUsual() const noexcept
+  /// Surely no end element, in one look: those have the largest ids.
+  [[nodiscard]] bool isSurelyNoEnd() const noexcept
   {
     return layout::is64(data_.header) && data_.header.hdr64.elm < TAV_ELM_CMN_END_HDR_MARKER;
   }
@@ -370,28 +370,28 @@ private:
     const uint32_t rc = refresh();
     return rc == TAV_RC_OK ? decode(detail::RawValue{type(), data_.pDataBuf, size(), state_->isSwapped()}) : rc;
   }
-  /// Types that are read without a look at anything else, from a quick stream and a 64-bit header.
+  /// Types that are read without a look at anything else, from a fast stream and a 64-bit header.
   template<class T>
-  static constexpr bool kIsUsual =
+  static constexpr bool kHasFastWay =
       StreamInteger<T> || std::same_as<T, TAVTimeStamp> || std::same_as<T, std::string_view>;
 
   /// Whether a value can be taken as it stands.
   template<class T>
-  [[gnu::always_inline]] bool isQuick() const noexcept
+  [[gnu::always_inline]] bool isFast() const noexcept
   {
     const TAVHeader64& header = data_.header.hdr64;
     if constexpr (std::same_as<T, std::string_view>)
     {
-      return layout::is64(data_.header) && header.type == TAV_TYPE_ASCII_STRING && isQuick_;
+      return layout::is64(data_.header) && header.type == TAV_TYPE_ASCII_STRING && isFast_;
     }
     else
     {
       return layout::is64(data_.header) && header.type == detail::fixedType<T>() && header.size == sizeof(T) &&
-             isQuick_;
+             isFast_;
     }
   }
   template<class T>
-  [[gnu::always_inline]] T readQuickly() const noexcept
+  [[gnu::always_inline]] T readFast() const noexcept
   {
     if constexpr (std::same_as<T, std::string_view>)
     {
@@ -404,7 +404,7 @@ private:
       return value;
     }
   }
-  /// Out of line for the usual types, which rarely come here.
+  /// Out of line for the types that have a fast way, which rarely come here.
   template<class T>
   [[gnu::noinline]] T readWhole() const
   {
@@ -452,7 +452,7 @@ private:
   mutable uint64_t fetch_ = 0;
   TAVHeader parent_{}; ///< header type 0: not known, or none
   bool isRoot_ = false;
-  bool isQuick_ = false; ///< of a stream that was quick when the node was read
+  bool isFast_ = false; ///< of a stream that was fast when the node was read
 };
 
 } // namespace tav

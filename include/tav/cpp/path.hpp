@@ -52,7 +52,7 @@ public:
   [[nodiscard]] std::optional<Node> findStraight(const Node& start) const noexcept
   {
     std::optional<Node> found;
-    if (!isStraight_ || start.state_ == nullptr || !start.state_->isQuick)
+    if (!isStraight_ || start.state_ == nullptr || !start.state_->isFast)
     {
       return found;
     }

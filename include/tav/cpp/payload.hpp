@@ -30,7 +30,7 @@ struct ReaderState
   std::unique_ptr<TAVSideStorage> owned;
   TAVHandle* handle = nullptr;
   uint64_t fetches = 0; ///< payload pointers into a ring last until the next one
-  bool isQuick = false; ///< over memory, in this machine's order; unknown once the handle was given away
+  bool isFast = false;  ///< over memory, in this machine's order; unknown once the handle was given away
 
   ReaderState() = default;
   ReaderState(const ReaderState&) = delete;
@@ -43,10 +43,10 @@ struct ReaderState
     }
   }
 
-  /// After opening: payloads of a quick stream stay where they are and are used as they stand.
+  /// After opening: payloads of a fast stream stay where they are and are used as they stand.
   void settle() noexcept
   {
-    isQuick = handle != nullptr && !isBuffered() && !isSwapped();
+    isFast = handle != nullptr && !isBuffered() && !isSwapped();
   }
 
   [[nodiscard]] bool isBuffered() const noexcept

@@ -146,7 +146,7 @@ private:
   [[gnu::always_inline]] bool advance()
   {
     const uint32_t rc = current_.readNext(&current_.parent_, &current_.data_.header);
-    return (rc == TAV_RC_OK && current_.isUsual()) || arriveElsewhere(rc);
+    return (rc == TAV_RC_OK && current_.isSurelyNoEnd()) || arriveElsewhere(rc);
   }
 
   /// After a step that led to no node, or perhaps to an end element.
@@ -217,7 +217,7 @@ private:
   [[gnu::always_inline]] bool advance()
   {
     const uint32_t rc = step();
-    return (rc == TAV_RC_OK && current_.isUsual()) || arriveElsewhere(rc);
+    return (rc == TAV_RC_OK && current_.isSurelyNoEnd()) || arriveElsewhere(rc);
   }
 
   /// Down into a group, else on to the sibling. Both lie ahead, whatever the bytes are.

@@ -201,7 +201,7 @@ public:
     {
       return nullptr;
     }
-    state_->isQuick = false; // a plain operation can give the handle another storage
+    state_->isFast = false; // a plain operation can give the handle another storage
     return use();
   }
 

@@ -60,7 +60,7 @@ struct WriterState
   std::unique_ptr<TAVSideStorage> owned;
   std::unique_ptr<GrowingBlock> block;
   Width root = Width::bits64;
-  uint32_t quick = kNoLevel;           ///< level of a group that takes 64-bit nodes without a further look
+  uint32_t fast = kNoLevel;            ///< level of a group that takes 64-bit nodes without a further look
   uint32_t innermost = 0;              ///< level of the innermost Group that is there and open; 1 for the root
   uint32_t orphans = 0;                ///< groups inside it that are still open, their Group objects gone
   uint32_t deferred = TAV_RC_OK;       ///< the first failure that a destructor could not report
@@ -100,7 +100,7 @@ struct WriterState
   void settle() noexcept
   {
     const bool plain = handle != nullptr && !isShared && deferred == TAV_RC_OK && orphans == 0 && innermost != 0;
-    quick = plain && block == nullptr && depth() == innermost && width() == Width::bits64 ? innermost : kNoLevel;
+    fast = plain && block == nullptr && depth() == innermost && width() == Width::bits64 ? innermost : kNoLevel;
   }
 
   /// Groups that are open in the stream.
@@ -196,10 +196,10 @@ struct WriterState
     return layout::addChecked(bytes, around) ? block->reserve(handle, handle->streamBytes, bytes) : TAV_RC_NO_MEMORY;
   }
 
-  /// Appends a data element to the quick group.
-  [[gnu::always_inline]] uint32_t appendQuickly(TAVHeaderData& node, uint16_t type, uint16_t elm,
-                                                const NodeOptions& options, const uint8_t* bytes,
-                                                uint64_t size) noexcept
+  /// Appends a data element to the group of the fast way.
+  [[gnu::always_inline]] uint32_t appendFast(TAVHeaderData& node, uint16_t type, uint16_t elm,
+                                             const NodeOptions& options, const uint8_t* bytes,
+                                             uint64_t size) noexcept
   {
     static constexpr uint8_t nothing = 0;
     fillHeader(node, true, type, elm, infoOf(options), size);
@@ -239,7 +239,7 @@ struct WriterState
     {
       return rc;
     }
-    const bool wide = quick != kNoLevel || width() == Width::bits64;
+    const bool wide = fast != kNoLevel || width() == Width::bits64;
     const auto type = static_cast<uint16_t>(wide ? options.children : Width::bits32);
     TAVHeaderData node{};
     fillHeader(node, wide, type, elm.id(), infoOf(options), wide ? TAV_SIZE_UNKNOWN : layout::kSizeUnknown32);

@@ -59,17 +59,17 @@ bool areEqual(const TAVHeader& one, const TAVHeader& other)
 class Twins
 {
 public:
-  Twins(TAVHandle* silent, TAVHandle* traced)
-      : handles_{silent, traced} {}
+  Twins(TAVHandle* fast, TAVHandle* traced)
+      : handles_{fast, traced} {}
 
   /// `call(handle, node)`, with a descriptor for each handle that begins as `node` and is what it became at the end.
   template<class Call>
   uint32_t take(const char* what, TAVHeaderData& node, Call call)
   {
     TAVHeaderData nodes[2] = {node, node};
-    const uint32_t silent = call(handles_[0], nodes[0]);
+    const uint32_t fast = call(handles_[0], nodes[0]);
     const uint32_t traced = traceOf([&] { return call(handles_[kTraced], nodes[kTraced]); });
-    same(silent == traced, what, ": ", nameOf(silent), " silent, ", nameOf(traced), " traced");
+    same(fast == traced, what, ": ", nameOf(fast), " fast, ", nameOf(traced), " traced");
     same(areEqual(nodes[0].header, nodes[1].header), what, ": headers differ");
     same(nodes[0].dataBufSize == nodes[1].dataBufSize && nodes[0].dataBufOffset == nodes[1].dataBufOffset, what,
          ": data of ", nodes[0].dataBufSize, " and ", nodes[1].dataBufSize);
@@ -77,12 +77,12 @@ public:
     same(callers || placeOf(*handles_[0], nodes[0].pDataBuf) == placeOf(*handles_[1], nodes[1].pDataBuf), what,
          ": data in other places");
     const std::vector<uint64_t> states[2] = {stateOf(*handles_[0]), stateOf(*handles_[1])};
-    same(states[0] == states[1], what, ": after ", nameOf(silent), " the handles are ", testing::PrintToString(states));
+    same(states[0] == states[1], what, ": after ", nameOf(fast), " the handles are ", testing::PrintToString(states));
     node = nodes[0];
-    return silent;
+    return fast;
   }
 
-  [[nodiscard]] TAVHandle* silent() const { return handles_[0]; }
+  [[nodiscard]] TAVHandle* fast() const { return handles_[0]; }
 
 private:
   template<class Call>
@@ -221,7 +221,7 @@ private:
                        if (own && !fresh) stack.push(&parent);
                        const uint32_t rc = tavFindElmInt(handle, &parent, 0, deepest, 0, elm, fresh ? nullptr : &resume,
                                                          own ? &stack : nullptr, &node);
-                       counts[handle == twins_.silent() ? 0 : 1] = stack.count;
+                       counts[handle == twins_.fast() ? 0 : 1] = stack.count;
                        return rc;
                      }),
          out);
@@ -252,7 +252,7 @@ private:
       TAVPrintParam param{0, nullptr, 0, stream.get()};
       uint64_t printed = 0;
       const uint32_t rc = tavPrintSubtree(options, handle, whole ? nullptr : &one, &param, &printed);
-      texts[handle == twins_.silent() ? 0 : 1] = stream.text() + std::to_string(printed);
+      texts[handle == twins_.fast() ? 0 : 1] = stream.text() + std::to_string(printed);
       return rc;
     });
     same(texts[0] == texts[1], "printed texts differ");
@@ -289,9 +289,9 @@ void readCase(uint64_t seed)
   const Tree tree = randomTree(seed, limits);
   const Form form = pickAccess(tree.form, random);
   const Bytes bytes = pickStream(tree, random, seed);
-  StreamReader silent(bytes, form);
+  StreamReader fast(bytes, form);
   StreamReader traced(bytes, form);
-  Twins twins(silent.handle(), traced.handle());
+  Twins twins(fast.handle(), traced.handle());
   Wanderer wanderer(twins, random, bytes.size());
   for (int i = 0; i < 60; ++i)
   {
@@ -316,7 +316,7 @@ Element pickNode(Random& random, bool wide, Bytes payload)
 
 void addNode(Twins& twins, Random& random, bool usual)
 {
-  const TAVHdrStack& stack = *twins.silent()->pHdrStack;
+  const TAVHdrStack& stack = *twins.fast()->pHdrStack;
   const bool wide = stack.count == 0 || tav::layout::typeOf(stack.pEntries[stack.count - 1]) == TAV_TYPE_HEADER64;
   constexpr uint64_t longest = 300;
   Bytes payload(random.oneIn(4) ? random.below(longest) : random.pick<uint64_t>({1, 4, 8, 16, 24, 33}));
@@ -346,9 +346,9 @@ void writeCase(uint64_t seed)
   form.align = random.oneIn(4);
   form.root32 = random.oneIn(8);
   const uint64_t block = random.oneIn(2) ? 0x4000 : random.below(2000);
-  StreamWriter silent(form, block);
+  StreamWriter fast(form, block);
   StreamWriter traced(form, block);
-  Twins twins(silent.handle(), traced.handle());
+  Twins twins(fast.handle(), traced.handle());
   for (int i = 0; i < 60; ++i)
   {
     if (random.oneIn(12))
@@ -361,7 +361,7 @@ void writeCase(uint64_t seed)
     }
     addNode(twins, random, !random.oneIn(6));
   }
-  const Bytes bytes = silent.bytes();
+  const Bytes bytes = fast.bytes();
   const Bytes others = traced.bytes();
   const auto difference = std::mismatch(bytes.begin(), bytes.end(), others.begin(), others.end());
   same(bytes == others, form, ": the streams differ at ", difference.first - bytes.begin(), " of ", bytes.size());
@@ -377,12 +377,12 @@ void forEachCase(void (*run)(uint64_t seed))
   }
 }
 
-TEST(SilentEqualsTraced, ForEveryStepThroughAStream)
+TEST(FastEqualsTraced, ForEveryStepThroughAStream)
 {
   forEachCase(readCase);
 }
 
-TEST(SilentEqualsTraced, ForEveryNodeThatIsAdded)
+TEST(FastEqualsTraced, ForEveryNodeThatIsAdded)
 {
   forEachCase(writeCase);
 }

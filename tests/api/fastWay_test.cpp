@@ -1,4 +1,4 @@
-/// What the ways that are taken without a trace leave to the others: the answer is the same with and without one.
+/// What the fast ways leave to the operations: the answer is the same with and without one.
 #include <cstdint>
 #include <cstdio>
 #include <functional>
@@ -26,10 +26,10 @@ constexpr uint32_t kStorageCode = 0x90000777; // no code of the library
 /// The code that a call gives, which must not depend on a trace.
 uint32_t codeOf(const std::function<uint32_t()>& call)
 {
-  const uint32_t silent = call();
+  const uint32_t fast = call();
   const TraceLog trace;
-  EXPECT_EQ(call(), silent) << "with a trace";
-  return silent;
+  EXPECT_EQ(call(), fast) << "with a trace";
+  return fast;
 }
 
 Bytes smallStream()
@@ -42,7 +42,7 @@ Bytes smallStream()
   return writer.bytes();
 }
 
-TEST(SilentSearch, NeedsAStackToGoOnWith)
+TEST(FastSearch, NeedsAStackToGoOnWith)
 {
   StreamReader reader(smallStream());
   TAVHeader root = headerAt(reader.handle(), 0);
@@ -52,7 +52,7 @@ TEST(SilentSearch, NeedsAStackToGoOnWith)
             TAV_RC_BAD_PARAM);
 }
 
-TEST(SilentSearch, NeedsAStackThatHoldsTheParentToGoOnWith)
+TEST(FastSearch, NeedsAStackThatHoldsTheParentToGoOnWith)
 {
   StreamReader reader(smallStream());
   TAVHeader root = headerAt(reader.handle(), 0);
@@ -63,7 +63,7 @@ TEST(SilentSearch, NeedsAStackThatHoldsTheParentToGoOnWith)
             TAV_RC_BAD_PARAM);
 }
 
-TEST(SilentSearch, FindsNothingInABlockThatIsNotThere)
+TEST(FastSearch, FindsNothingInABlockThatIsNotThere)
 {
   StreamReader reader(smallStream());
   TAVHeader root = headerAt(reader.handle(), 0);
@@ -73,7 +73,7 @@ TEST(SilentSearch, FindsNothingInABlockThatIsNotThere)
             TAV_RC_NOT_FOUND);
 }
 
-TEST(SilentSearch, FindsNothingBehindANodeOfTheOtherForm)
+TEST(FastSearch, FindsNothingBehindANodeOfTheOtherForm)
 {
   StreamReader reader(smallStream());
   TAVHeader root = headerAt(reader.handle(), 0);
@@ -86,7 +86,7 @@ TEST(SilentSearch, FindsNothingBehindANodeOfTheOtherForm)
   EXPECT_EQ(stack.count, 1U);
 }
 
-TEST(SilentStep, NeedsTheRingOfAHandleThatIsNotDirect)
+TEST(FastStep, NeedsTheRingOfAHandleThatIsNotDirect)
 {
   StreamReader reader(smallStream(), {.buffered = true});
   TAVHeader root = headerAt(reader.handle(), 0);
@@ -95,7 +95,7 @@ TEST(SilentStep, NeedsTheRingOfAHandleThatIsNotDirect)
   EXPECT_EQ(codeOf([&] { return tavGetNextChild(0, reader.handle(), &root, nullptr, &out); }), TAV_RC_NO_CIRCULAR_BUF);
 }
 
-TEST(SilentAdd, NeedsHandleAndDescriptor)
+TEST(FastAdd, NeedsHandleAndDescriptor)
 {
   for (const bool buffered : {false, true})
   {
@@ -108,7 +108,7 @@ TEST(SilentAdd, NeedsHandleAndDescriptor)
   EXPECT_EQ(codeOf([&] { return tavAddElement(0, nullptr, &data); }), TAV_RC_BAD_PARAM);
 }
 
-TEST(SilentAdd, NeedsTheRingOfAHandleThatIsNotDirect)
+TEST(FastAdd, NeedsTheRingOfAHandleThatIsNotDirect)
 {
   StreamWriter writer({.buffered = true});
   writer.add(group64(kRoot));
@@ -120,7 +120,7 @@ TEST(SilentAdd, NeedsTheRingOfAHandleThatIsNotDirect)
   }
 }
 
-TEST(SilentAdd, NeedsTheBlockOfADirectHandle)
+TEST(FastAdd, NeedsTheBlockOfADirectHandle)
 {
   StreamWriter writer;
   writer.add(group64(kRoot));
@@ -134,12 +134,12 @@ TEST(SilentAdd, NeedsTheBlockOfADirectHandle)
   writer.handle()->pDirectData = block;
 }
 
-TEST(SilentClose, NeedsAHandle)
+TEST(FastClose, NeedsAHandle)
 {
   EXPECT_EQ(codeOf([] { return tavCloseHeader(0, nullptr); }), TAV_RC_BAD_PARAM);
 }
 
-TEST(SilentAdd, IsRefusedByAReader)
+TEST(FastAdd, IsRefusedByAReader)
 {
   StreamReader reader(smallStream());
   Element node = u32(kOther, 1);
@@ -147,7 +147,7 @@ TEST(SilentAdd, IsRefusedByAReader)
   EXPECT_EQ(codeOf([&] { return tavAddElement(0, reader.handle(), &data); }), TAV_RC_WRONG_MODE);
 }
 
-TEST(SilentAdd, RefusesAHeaderOfNoKnownForm)
+TEST(FastAdd, RefusesAHeaderOfNoKnownForm)
 {
   StreamWriter writer;
   writer.add(group64(kRoot));
@@ -158,7 +158,7 @@ TEST(SilentAdd, RefusesAHeaderOfNoKnownForm)
   EXPECT_EQ(writer.length(), 16U);
 }
 
-TEST(SilentAdd, TakesNothingBeforeAnEmptyStackForTheOpenGroup)
+TEST(FastAdd, TakesNothingBeforeAnEmptyStackForTheOpenGroup)
 {
   for (const bool buffered : {false, true})
   {
@@ -213,7 +213,7 @@ std::string printed(const Bytes& bytes, uint64_t options)
   return text;
 }
 
-TEST(SilentPrint, IndentsDeepNodesAsTheTracedOne)
+TEST(FastPrint, IndentsDeepNodesAsTheTracedOne)
 {
   StreamWriter writer;
   constexpr int deep = 60;
@@ -225,9 +225,9 @@ TEST(SilentPrint, IndentsDeepNodesAsTheTracedOne)
   for (int i = 0; i < deep; ++i) writer.close();
   for (const uint64_t options : {0x7U, 0x45U, 0x47U, 0xC7U})
   {
-    const std::string silent = printed(writer.bytes(), options);
+    const std::string fast = printed(writer.bytes(), options);
     const TraceLog trace;
-    EXPECT_EQ(silent, printed(writer.bytes(), options));
+    EXPECT_EQ(fast, printed(writer.bytes(), options));
   }
 }
 
