@@ -258,7 +258,7 @@ public:
       T value{};
       detail::report(read(value), ec);
       return value;
-    // cppcheck-suppress missingReturn ; checkReadable() is false only where it does not compile
+      // cppcheck-suppress missingReturn ; checkReadable() is false only where it does not compile
     }
   }
 
