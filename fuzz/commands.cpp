@@ -120,6 +120,11 @@ int runCommand(std::string_view name, const std::vector<Option>& options, const 
     demand(!tav::tool::problemText(failure.problem).empty(), "a failure without a word");
     return failure.status;
   }
+  catch (const tav::inspect::Error& error)
+  {
+    demand(!tav::tool::problemText(error.problem()).empty(), "a failure without a word");
+    return error.trouble() == tav::inspect::Trouble::notFound ? tav::tool::kFindings : tav::tool::kTrouble;
+  }
 }
 
 } // namespace fuzz
