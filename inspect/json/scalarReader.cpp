@@ -16,7 +16,6 @@ namespace
 {
 
 constexpr size_t kLong = size_t{1024} * 1024; ///< bytes of a value that are kept before they are written
-constexpr size_t kBuffer = size_t{64} * 1024;
 
 template<class Number>
 Number wholeNumber(const std::string& name, const Scalar& value)

@@ -470,7 +470,7 @@ TEST(PrintValueArguments, FewerBytesThanTheNodeHasAreNotReadBeyond)
 
 TEST(PrintValueTrace, IsEntryArgumentsCharactersAndExit)
 {
-  PrintValue print(TAV_TYPE_UINT32, {7, 0, 0, 0}, false);
+  PrintValue print(TAV_TYPE_UINT32, {7, 7, 7, 7}, false); // 117901063 in either byte order
   CaughtStream stream;
   TAVPrintCtx ctx = printContext(stream.get());
   TraceLog trace;
@@ -478,7 +478,7 @@ TEST(PrintValueTrace, IsEntryArgumentsCharactersAndExit)
   EXPECT_THAT(trace.steps(),
               ElementsAre(Step{KOR_TRACE_ENTRY, probe::printValue, 0}, Step{KOR_TRACE_VAR, probe::printValue, 0},
                           Step{KOR_TRACE_VAR, probe::printValue, 100}, Step{KOR_TRACE_EXIT, probe::printValue, 0}));
-  EXPECT_THAT(trace.dump(probe::printValue, 100).items, ElementsAre(bytesOf(uint64_t{1})));
+  EXPECT_THAT(trace.dump(probe::printValue, 100).items, ElementsAre(bytesOf(uint64_t{9})));
   TAVPrintCtx* const pCtx = &ctx;
   EXPECT_THAT(trace.dump(probe::printValue, 0).items, ElementsAre(bytesOf(pCtx), bytesOf(print.node)));
 }
