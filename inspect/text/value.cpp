@@ -1,12 +1,12 @@
 #include "tav/inspect/value.hpp"
 
 #include <algorithm>
-#include <chrono>
 #include <cstdio>
 #include <cstring>
 #include <iterator>
 
 #include "inspect/walk/prober.h"
+#include "tav/cpp/valueText.hpp"
 #include "tav/inspect/problem.hpp"
 
 namespace tav::inspect
@@ -294,28 +294,7 @@ std::string hexText(std::span<const uint8_t> bytes)
 
 std::string dateText(const TAVTimeStamp& stamp)
 {
-  using namespace std::chrono;
-  constexpr uint64_t endOf9999 = 253402300800;
-  constexpr uint64_t million = 1'000'000;
-  // Each field holds more than its unit needs: what is above a second belongs to the seconds.
-  const uint64_t fraction = uint64_t{stamp.fractionA} * 1000 + stamp.fractionB;
-  const int64_t shift = static_cast<int64_t>(fraction / million) + int64_t{stamp.offsetMinutes} * 60;
-  if (stamp.seconds >= endOf9999 || static_cast<int64_t>(stamp.seconds) + shift >= static_cast<int64_t>(endOf9999))
-  {
-    return std::to_string(stamp.seconds) + " s";
-  }
-  const sys_seconds time{seconds(static_cast<int64_t>(stamp.seconds) + shift)};
-  const sys_days day = floor<days>(time);
-  const year_month_day date{day};
-  const hh_mm_ss<seconds> clock{time - day};
-  const unsigned minutesEast = static_cast<unsigned>(std::abs(int{stamp.offsetMinutes}));
-  char text[64];
-  std::snprintf(text, sizeof text, "%04d-%02u-%02uT%02d:%02d:%02d.%06u%c%02u:%02u", int{date.year()},
-                unsigned{date.month()}, unsigned{date.day()}, static_cast<int>(clock.hours().count()),
-                static_cast<int>(clock.minutes().count()), static_cast<int>(clock.seconds().count()),
-                static_cast<unsigned>(fraction % million), stamp.offsetMinutes < 0 ? '-' : '+', minutesEast / 60,
-                minutesEast % 60);
-  return text;
+  return detail::timeText(stamp);
 }
 
 std::string int128Text(std::span<const uint8_t> bytes, bool isSigned)
