@@ -93,7 +93,7 @@ check_documents()
 {
   mkdir -p build
   doxygen docs/Doxyfile
-  tests/docs/check_links.py .
+  tests/system/docs/check_links.py .
 }
 
 check_thread()
@@ -273,7 +273,7 @@ full()
   stage "fuzzing" fuzz/run.sh fixed
   stage "threads" check_thread
   stage "Debian packages" cmake/check-packages.sh
-  stage "binary interface" tests/abi/check.sh
+  stage "binary interface" tests/system/abi/check.sh
 }
 
 work=$(mktemp -d)

@@ -1,6 +1,6 @@
 # What is installed is hardened as Debian hardens its packages (`dpkg-buildflags` with hardening=+all), and with what later
 # releases of it add: checked stacks and copies, tables of addresses that are read-only once a program runs, and marks
-# for processors that check where jumps lead. tests/install/hardening.sh reads it back from the binaries.
+# for processors that check where jumps lead. tests/system/install/hardening.sh reads it back from the binaries.
 include(CheckCXXCompilerFlag)
 
 option(TAV_HARDEN "Harden the libraries and the program" ${PROJECT_IS_TOP_LEVEL})

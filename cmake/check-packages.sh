@@ -33,7 +33,7 @@ echo "== hardened"
 for flag in $(DEB_BUILD_MAINT_OPTIONS=hardening=+all dpkg-buildflags --export=cmdline | grep -oE -e '-(fstack-protector|fcf-protection|fstack-clash|D_FORTIFY_SOURCE|Wformat|Werror=format)[^ "]*|-Wl,-z,[a-z]+' | sort -u); do
   grep -qF -e "$flag" "$build/build.ninja" || { echo "dpkg-buildflags has $flag, the build has not"; exit 1; }
 done
-tests/install/hardening.py "$root/usr/bin/tav" "$libraries"/lib{kor,tav}.so.1
+tests/system/install/hardening.py "$root/usr/bin/tav" "$libraries"/lib{kor,tav}.so.1
 
 echo "== run"
 LD_LIBRARY_PATH=$libraries "$root/usr/bin/tav" --version
@@ -41,7 +41,7 @@ for page in $(LD_LIBRARY_PATH=$libraries "$root/usr/bin/tav" help json | grep -o
   [[ -s $root/usr/$page ]] || { echo "the package has no $page"; exit 1; }
 done
 read -ra flags <<<"$(PKG_CONFIG_PATH=$libraries/pkgconfig pkg-config --cflags --libs tav)"
-g++ -std=c++20 tests/install/outside/main.cpp -o "$work/outside" "${flags[@]}"
+g++ -std=c++20 tests/system/install/outside/main.cpp -o "$work/outside" "${flags[@]}"
 LD_LIBRARY_PATH=$libraries "$work/outside"
 
 echo "== remove"

@@ -1,5 +1,5 @@
 /// With TAV_TRACE_SEEN=<file>, a test program writes down which records its tests left: a line each of probe, kind,
-/// point and the number of items. tests/docs/trace_test.py holds docs/trace.md against them.
+/// point and the number of items. tests/system/docs/trace_test.py holds docs/trace.md against them.
 #include <array>
 #include <atomic>
 #include <cstdlib>

@@ -1,0 +1,90 @@
+#!/usr/bin/env python3
+"""Tells what the tests reach, folder by folder, from gcovr's JSON, and compares what they do not with a document.
+
+    tests/system/reach/coverage.py COVERAGE.json DOCUMENT.md
+
+In the document, each line of the rooms that is not reached stands in a table row: | `file` | `code` | reason |.
+"""
+import collections
+import json
+import pathlib
+import re
+import sys
+
+LEAST_LINES = 98.0
+LEAST_BRANCHES = 90.0
+# The layer is templates: each type that a test uses makes all branches and many lines of them anew, of which it takes
+# its own. So only its lines are held, and only in total.
+LAYER = "include"
+ROOT = pathlib.Path(__file__).resolve().parents[3]
+
+
+def percent(reached, all_of_them):
+    return 100.0 * reached / all_of_them if all_of_them else 100.0
+
+
+def count(files):
+    """Lines and branches of each folder: [lines reached, lines, branches reached, branches]."""
+    totals = collections.defaultdict(lambda: [0, 0, 0, 0])
+    for file in files:
+        for line in file["lines"]:
+            if line.get("gcovr/noncode"):
+                continue
+            room = file["file"].split("/")[0]
+            for name in (room,) if room == LAYER else (room, "rooms"):
+                total = totals[name]
+                total[0] += line["count"] > 0
+                total[1] += 1
+                total[2] += sum(branch["count"] > 0 for branch in line["branches"])
+                total[3] += len(line["branches"])
+    return totals
+
+
+def unreached(files):
+    """(file, code) of the lines that were never run, with their numbers."""
+    found = {}
+    for file in files:
+        if file["file"].startswith(f"{LAYER}/"):
+            continue
+        text = (ROOT / file["file"]).read_text().split("\n")
+        for line in file["lines"]:
+            if line["count"] == 0 and not line.get("gcovr/noncode"):
+                code = " ".join(text[line["line_number"] - 1].split())
+                found.setdefault((file["file"], code), []).append(line["line_number"])
+    return found
+
+
+def told(document):
+    """(file, code) of the document's rows."""
+    rows = re.findall(r"^\| `([^`]+)` \| `([^`]+)` \| [^|]*\w[^|]* \|$", document.replace("\\|", "\v"), flags=re.M)
+    return {(file, " ".join(code.replace("\v", "|").split())) for file, code in rows}
+
+
+def main():
+    files = json.loads(pathlib.Path(sys.argv[1]).read_text())["files"]
+    totals = count(files)
+    print(f"{'folder':12} {'lines':>7} {'reached':>8} {'branches':>9} {'reached':>8}")
+    for name in sorted(totals, key=lambda one: (one == LAYER, one == "rooms", one)):
+        lines_reached, lines, branches_reached, branches = totals[name]
+        print(f"{name:12} {lines:7} {percent(lines_reached, lines):7.2f}% {branches:9} "
+              f"{percent(branches_reached, branches):7.2f}%")
+    found = unreached(files)
+    rows = told(pathlib.Path(sys.argv[2]).read_text())
+    good = True
+    for (file, code), numbers in sorted(found.items()):
+        if (file, code) not in rows:
+            print(f"{file}:{','.join(map(str, numbers))}: not reached, and {sys.argv[2]} does not say why: {code}")
+            good = False
+    for file, code in sorted(rows - found.keys()):
+        print(f"{sys.argv[2]}: {file} is said not to be reached at, but is: {code}")
+        good = False
+    for name, total in totals.items():
+        if percent(total[0], total[1]) < LEAST_LINES or (
+                name != LAYER and percent(total[2], total[3]) < LEAST_BRANCHES):
+            print(f"{name}: below {LEAST_LINES:g} % of lines or {LEAST_BRANCHES:g} % of branches")
+            good = False
+    return 0 if good else 1
+
+
+if __name__ == "__main__":
+    sys.exit(main())
