@@ -76,7 +76,7 @@ build_and_test()
 check_tidy()
 {
   cmake --preset clang -DTAV_BUILD_TESTS=OFF -DTAV_BUILD_TOOLS=OFF >"$work/configure.log" || { cat "$work/configure.log"; return 1; }
-  find kor format storage dictionary api -name '*.cpp' ! -name '*Windows.cpp' -print0 |
+  find kor trace format storage dictionary api -name '*.cpp' ! -name '*Windows.cpp' -print0 |
     xargs -0 -n 2 -P "$(nproc)" clang-tidy --quiet -p build/clang 2>"$work/tidy.log" || { cat "$work/tidy.log"; return 1; }
 }
 
@@ -86,7 +86,7 @@ check_static_analysis()
   cppcheck --enable=warning,performance,portability --inconclusive --std=c++20 --language=c++ --inline-suppr --quiet \
     --error-exitcode=1 -j "$(nproc)" -I include -I . -DTAV_VERSION='""' \
     --template='{file}:{line}: {severity}: {id}: {message}' \
-    kor format storage dictionary core api include tools examples
+    kor trace format storage dictionary core api include tools examples
 }
 
 check_documents()
@@ -98,8 +98,8 @@ check_documents()
 
 check_thread()
 {
-  build tsan --target kor_tests threads_tests
-  run_tests tsan --label-regex '^(kor|threads)$'
+  build tsan --target kor_tests trace_tests threads_tests
+  run_tests tsan --label-regex '^(kor|trace|threads)$'
 }
 
 # run_shards PROGRAM: runs a test program in as many parts at a time as there are processors, or as the caller's
@@ -174,7 +174,7 @@ run_properties()
   GTEST_FILTER='-*RingEqualsDirect*' run_rooms "$@" property
 }
 
-rooms=(kor format storage dictionary core api golden cpp)
+rooms=(kor trace format storage dictionary core api golden cpp)
 
 # check_platform PRESET FOLDER ENDING EMULATOR ROOM...: rooms and properties on another platform, the exported symbols,
 # the program's behaviour that platforms tend to differ in, and the streams that cross from and to this one.
@@ -267,8 +267,8 @@ full()
   stage "static libraries" check_static
   stage "link-time optimisation" check_link_time
   # What touches bytes, files or the system; CI has no time for more.
-  stage "s390x, big-endian" check_s390x kor format storage core api golden
-  stage "Windows" check_windows kor format storage core api golden
+  stage "s390x, big-endian" check_s390x kor trace format storage core api golden
+  stage "Windows" check_windows kor trace format storage core api golden
   stage "address and undefined behaviour" check_sanitizers
   stage "fuzzing" fuzz/run.sh fixed
   stage "threads" check_thread

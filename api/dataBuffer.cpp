@@ -5,8 +5,8 @@
 #include "api/fetch.h"
 #include "api/rawWrite.h"
 #include "format/layout.h"
-#include "kor/traceFrame.h"
 #include "tav/probes.h"
+#include "trace/traceFrame.h"
 
 using namespace tav;
 using namespace tav::inside;

@@ -6,8 +6,8 @@
 #include "api/rawWrite.h"
 #include "format/eyeMatcher.h"
 #include "format/layout.h"
-#include "kor/traceFrame.h"
 #include "tav/probes.h"
+#include "trace/traceFrame.h"
 
 using namespace tav;
 using namespace tav::inside;

@@ -3,9 +3,9 @@
 #include <new>
 
 #include "api/ownedHandle.h"
-#include "kor/traceFrame.h"
 #include "tav/probes.h"
 #include "tav/tav.h"
+#include "trace/traceFrame.h"
 
 using namespace tav;
 using namespace tav::inside;

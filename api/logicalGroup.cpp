@@ -4,8 +4,8 @@
 #include "api/search.h"
 #include "api/walkGuard.h"
 #include "format/layout.h"
-#include "kor/traceFrame.h"
 #include "tav/probes.h"
+#include "trace/traceFrame.h"
 
 using namespace tav;
 using namespace tav::inside;

@@ -2,8 +2,8 @@
 #include "api/nextChild.h"
 #include "api/openGroup.h"
 #include "api/ownedHandle.h"
-#include "kor/traceFrame.h"
 #include "tav/probes.h"
+#include "trace/traceFrame.h"
 
 using namespace tav;
 using namespace tav::inside;

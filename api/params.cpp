@@ -1,7 +1,7 @@
 /// The parameter objects of handles.
-#include "kor/traceFrame.h"
 #include "tav/probes.h"
 #include "tav/tav.h"
+#include "trace/traceFrame.h"
 
 using namespace tav;
 using namespace tav::inside;

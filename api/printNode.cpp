@@ -2,8 +2,8 @@
 #include "api/printer.h"
 #include "dictionary/dictionary.h"
 #include "format/layout.h"
-#include "kor/traceFrame.h"
 #include "tav/probes.h"
+#include "trace/traceFrame.h"
 
 using namespace tav;
 using namespace tav::inside;

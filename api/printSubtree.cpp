@@ -8,8 +8,8 @@
 #include "api/printLeaves.h"
 #include "format/layout.h"
 #include "kor/lineBuffered.h"
-#include "kor/traceFrame.h"
 #include "tav/probes.h"
+#include "trace/traceFrame.h"
 
 using namespace tav;
 using namespace tav::inside;

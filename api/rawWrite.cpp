@@ -4,8 +4,8 @@
 #include <array>
 #include <cstring>
 
-#include "kor/traceFrame.h"
 #include "tav/probes.h"
+#include "trace/traceFrame.h"
 
 namespace tav::inside
 {

@@ -4,8 +4,8 @@
 
 #include "api/fetch.h"
 #include "core/step.h"
-#include "kor/traceFrame.h"
 #include "tav/probes.h"
+#include "trace/traceFrame.h"
 
 using namespace tav;
 using namespace tav::inside;

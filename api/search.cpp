@@ -7,8 +7,8 @@
 #include "api/search.h"
 #include "core/stack.h"
 #include "core/step.h"
-#include "kor/traceFrame.h"
 #include "tav/probes.h"
+#include "trace/traceFrame.h"
 
 using namespace tav;
 using namespace tav::inside;

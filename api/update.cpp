@@ -1,8 +1,8 @@
 /// Overwriting a data element's payload in place.
 #include "api/rawWrite.h"
 #include "format/layout.h"
-#include "kor/traceFrame.h"
 #include "tav/probes.h"
+#include "trace/traceFrame.h"
 
 using namespace tav;
 using namespace tav::inside;

@@ -1,8 +1,8 @@
 /// Appending strings, and runs of nodes that are encoded already.
 #include "api/rawWrite.h"
 #include "format/layout.h"
-#include "kor/traceFrame.h"
 #include "tav/probes.h"
+#include "trace/traceFrame.h"
 
 using namespace tav;
 using namespace tav::inside;

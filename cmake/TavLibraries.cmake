@@ -37,7 +37,7 @@ function(tav_add_library name alias)
 endfunction()
 
 include(GNUInstallDirs)
-tav_add_library(kor kor kor)
+tav_add_library(kor kor kor trace)
 target_link_libraries(kor PRIVATE Threads::Threads)
 tav_add_library(tav tav format storage dictionary api)
 target_link_libraries(tav PUBLIC kor)

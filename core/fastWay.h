@@ -6,8 +6,8 @@
 #include <cstdint>
 
 #include "kor/shared.h"
-#include "kor/traceFrame.h"
 #include "tav/codes.h"
+#include "trace/traceFrame.h"
 
 namespace tav::core
 {

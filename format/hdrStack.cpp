@@ -1,8 +1,8 @@
 #include <cstring>
 
-#include "kor/traceFrame.h"
 #include "tav/probes.h"
 #include "tav/tav.h"
+#include "trace/traceFrame.h"
 
 namespace tav::inside
 {

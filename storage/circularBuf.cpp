@@ -5,10 +5,10 @@
 #include <utility>
 
 #include "format/layout.h"
-#include "kor/traceFrame.h"
 #include "storage/cachedRun.h"
 #include "tav/probes.h"
 #include "tav/tav.h"
+#include "trace/traceFrame.h"
 
 using namespace tav;
 using namespace tav::inside;

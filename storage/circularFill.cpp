@@ -3,10 +3,10 @@
 #include <cstring>
 
 #include "format/layout.h"
-#include "kor/traceFrame.h"
 #include "storage/cachedRun.h"
 #include "storage/circularPiece.h"
 #include "tav/probes.h"
+#include "trace/traceFrame.h"
 
 using namespace tav;
 using namespace tav::inside;

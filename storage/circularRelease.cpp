@@ -1,8 +1,8 @@
 /// How pages leave the ring: the page-release step.
-#include "kor/traceFrame.h"
 #include "storage/cachedRun.h"
 #include "storage/circularPiece.h"
 #include "tav/probes.h"
+#include "trace/traceFrame.h"
 
 using namespace tav;
 using namespace tav::inside;

@@ -1,9 +1,9 @@
 #include <algorithm>
 #include <new>
 
-#include "kor/traceFrame.h"
 #include "tav/probes.h"
 #include "tav/tav.h"
+#include "trace/traceFrame.h"
 
 using namespace tav;
 using namespace tav::inside;

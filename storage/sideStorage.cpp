@@ -1,6 +1,6 @@
-#include "kor/traceFrame.h"
 #include "tav/probes.h"
 #include "tav/tav.h"
+#include "trace/traceFrame.h"
 
 using namespace tav;
 using namespace tav::inside;

@@ -18,9 +18,11 @@ class CheckRooms(unittest.TestCase):
     def test_accepts_what_points_down(self):
         for name, line in [
             ("api/writer.cpp", '#include "storage/circularBuf.h"'),
-            ("api/writer.cpp", '#include "kor/traceFrame.h"'),
+            ("api/writer.cpp", '#include "trace/traceFrame.h"'),
             ("api/writer.cpp", '#include "core/append.h"'),
             ("core/bytes.h", '#include "storage/cachedRun.h"'),
+            ("trace/trace.cpp", '#include "kor/lock.h"'),
+            ("trace/trace.cpp", '#include "tav/kor.h"'),
             ("storage/file.cpp", '#include "format/layout.h"'),
             ("dictionary/lookup.cpp", '#include "dictionary/dictionary.h"'),
             ("tools/main.cpp", '#include "tav/tav.h"'),
@@ -46,6 +48,9 @@ class CheckRooms(unittest.TestCase):
             ("kor/file.cpp", '#include "format/layout.h"'),
             ("kor/file.cpp", '#include "tav/tav.h"'),
             ("include/tav/kor.h", '#include "tav/tav.h"'),
+            ("kor/file.cpp", '#include "trace/traceFrame.h"'),
+            ("trace/traceFrame.h", '#include "format/layout.h"'),
+            ("trace/traceFrame.h", '#include "tav/probes.h"'),
             ("format/layout.h", '#include "storage/circularBuf.h"'),
             ("core/step.h", '#include "api/rawWrite.h"'),
             ("core/step.h", '#include "dictionary/dictionary.h"'),
@@ -93,7 +98,7 @@ class CheckRooms(unittest.TestCase):
     def test_leaves_the_users_names_to_the_installed_headers(self):
         for name, line in [
             ("api/nodeStep.h", "namespace tav"),
-            ("kor/traceFrame.h", "namespace tav {"),
+            ("trace/traceFrame.h", "namespace tav {"),
             ("tools/form.h", "namespace tav"),
         ]:
             with self.subTest(name=name, line=line):

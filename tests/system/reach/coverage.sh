@@ -6,7 +6,7 @@ cd "$(dirname "${BASH_SOURCE[0]}")/../../.."
 
 cmake/install-packages.sh build test coverage
 folder=build/coverage
-rooms=(kor format storage core dictionary api golden cpp faults threads disk)
+rooms=(kor trace format storage core dictionary api golden cpp faults threads disk)
 work=$(mktemp -d)
 trap 'rm -rf "$work"' EXIT
 
@@ -33,8 +33,9 @@ fi
 # The layer of include/ is templates and inline functions, so its counts are in the objects of its tests. Windows'
 # sources are not compiled here. For the compiler every call can throw, which makes a branch of it.
 gcovr --root . -j "$(nproc)" --json "$work/coverage.json" \
-  --filter 'api/' --filter 'core/' --filter 'format/' --filter 'storage/' --filter 'dictionary/' --filter 'kor/' \
+  --filter 'api/' --filter 'core/' --filter 'format/' --filter 'storage/' --filter 'dictionary/' --filter 'trace/' \
+  --filter 'kor/' \
   --filter 'include/' \
   --exclude-throw-branches --exclude-unreachable-branches \
-  "$folder"/{api,format,storage,dictionary,kor} "$folder"/tests/CMakeFiles/{core,cpp}_tests.dir
+  "$folder"/{api,format,storage,dictionary,trace,kor} "$folder"/tests/CMakeFiles/{core,cpp}_tests.dir
 tests/system/reach/coverage.py "$work/coverage.json" docs/coverage.md

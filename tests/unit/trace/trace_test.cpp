@@ -1,8 +1,8 @@
 #include "tav/kor.h"
 
-#include "kor/traceFrame.h"
 #include "support/failingNew.h"
 #include "support/traceLog.h"
+#include "trace/traceFrame.h"
 
 #include <array>
 #include <atomic>
