@@ -174,7 +174,7 @@ run_properties()
   GTEST_FILTER='-*RingEqualsDirect*' run_rooms "$@" property
 }
 
-rooms=(kor trace format storage dictionary core api golden cpp)
+rooms=(kor trace format storage dictionary core api golden cpp host)
 
 # check_platform PRESET FOLDER ENDING EMULATOR ROOM...: rooms and properties on another platform, the exported symbols,
 # the program's behaviour that platforms tend to differ in, and the streams that cross from and to this one.
@@ -267,8 +267,8 @@ full()
   stage "static libraries" check_static
   stage "link-time optimisation" check_link_time
   # What touches bytes, files or the system; CI has no time for more.
-  stage "s390x, big-endian" check_s390x kor trace format storage core api golden
-  stage "Windows" check_windows kor trace format storage core api golden
+  stage "s390x, big-endian" check_s390x kor trace format storage core api golden host
+  stage "Windows" check_windows kor trace format storage core api golden host
   stage "address and undefined behaviour" check_sanitizers
   stage "fuzzing" fuzz/run.sh fixed
   stage "threads" check_thread

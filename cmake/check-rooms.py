@@ -4,8 +4,9 @@
     check-rooms.py [ROOT]
 
 Includes point one way: tools -> inspect -> api -> core -> storage, dictionary -> format -> trace -> kor. The system, its headers and
-the byte order are kor's business, which has a file a platform: names that end in Posix or Windows. No other source
-asks for the platform, tests and examples included. What keeps a compiler from its work stands in one file.
+the byte order are kor's business, which has a file a platform: names that end in Posix or Windows. What the program
+alone asks of the system is in tools/host, by the same rule. No other source asks for the platform, tests and examples
+included. What keeps a compiler from its work stands in one file.
 
 Names in `tav` itself are those of the installed headers: what stays inside the library is in `tav::inside`, and the
 steps are in `tav::core`.
@@ -31,11 +32,11 @@ ROOMS = {
 KOR_ROOMS = {"kor", "trace"}
 KOR_PUBLIC = {"tav/kor.h", "tav/codes.h", "tav/byteOrder.h"}
 KOR_HEADERS = {f"include/{header}" for header in KOR_PUBLIC}
-# What kor has for the programs of this project, beside its public headers.
-FOR_TOOLS = {"kor/host.h"}
-# Who may know the platform: the public headers that declare exports and turn bytes, and kor's file of each platform.
+# What the program's own files of a platform may use of kor, beside its public headers.
+FOR_HOST = {"kor/systemError.h", "kor/wideText.h", "kor/windows.h"}
+# Who may know the platform: the public headers that declare exports and turn bytes, and the files of each platform.
 PLATFORM_HEADERS = ("include/tav/kor.h", "include/tav/byteOrder.h")
-PLATFORM_FILE = re.compile(r"^kor/(\w+(Posix|Windows)\.cpp|windows\.h)$")
+PLATFORM_FILE = re.compile(r"^(kor/(\w+(Posix|Windows)\.cpp|windows\.h)|tools/host/\w+(Posix|Windows)\.cpp)$")
 # Sources that are no room: they may include what they like, but must not ask for the platform.
 BESIDE = ("tests", "examples", "bench", "fuzz")
 # Libraries of others that a room may use.
@@ -83,7 +84,7 @@ def include_error(name, room, opening, path):
     if opening == '"':
         if "/" not in path:
             return f'"{path}" is named without its room'
-        if (first in ROOMS and first in ROOMS[room]) or (room == "tools" and path in FOR_TOOLS):
+        if (first in ROOMS and first in ROOMS[room]) or (room == "tools" and knows_platform(name) and path in FOR_HOST):
             return None
         return f"{room} must not include {path}"
     if path in STANDARD or knows_platform(name) or path.startswith(THIRD_PARTY.get(room, ())):

@@ -6,8 +6,8 @@
 #include <stdexcept>
 #include <system_error>
 
-#include "kor/host.h"
 #include "kor/windows.h"
+#include "tools/host/host.h"
 
 #include <psapi.h> // behind the system's main header
 
@@ -20,10 +20,10 @@ std::string makeFolder(const std::string& prefix)
   for (unsigned attempt = 0; attempt < 1'000'000; ++attempt)
   {
     const std::filesystem::path folder =
-        parent / (prefix + std::to_string(tav::kor::processId()) + "-" + std::to_string(attempt));
+        parent / (prefix + std::to_string(tav::host::processId()) + "-" + std::to_string(attempt));
     if (std::filesystem::create_directory(folder))
     {
-      return tav::kor::textOf(folder);
+      return tav::host::textOf(folder);
     }
   }
   throw std::runtime_error("no folder below " + parent.string());
@@ -41,7 +41,7 @@ FILE* temporaryStream()
   static std::atomic<unsigned> count{0};
   const std::filesystem::path path =
       std::filesystem::temp_directory_path() /
-      ("tav-stream-" + std::to_string(tav::kor::processId()) + "-" + std::to_string(count++));
+      ("tav-stream-" + std::to_string(tav::host::processId()) + "-" + std::to_string(count++));
   return _wfopen(path.c_str(), L"w+bD"); // D: it goes when it is closed
 }
 

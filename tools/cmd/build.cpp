@@ -1,8 +1,8 @@
 // tav build: a stream from JSON.
 #include <cstdio>
 
-#include "kor/host.h"
 #include "tav/inspect.hpp"
+#include "tools/host/host.h"
 #include "tools/shell/input.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
@@ -26,7 +26,7 @@ int run(const Invocation& invocation)
 {
   const std::string input = invocation.arguments().empty() ? "-" : invocation.arguments().front();
   const std::string output = invocation.text("--output", "-");
-  if (isStandardOutput(output) && kor::isTerminal(stdout))
+  if (isStandardOutput(output) && host::isTerminal(stdout))
   {
     throw Failure("build: a stream is no text for a terminal", "-o FILE writes it to a file");
   }

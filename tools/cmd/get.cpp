@@ -4,12 +4,12 @@
 
 #include <nlohmann/json.hpp>
 
-#include "kor/host.h"
 #include "tav/inspect/jsonText.hpp"
 #include "tav/inspect/locate.hpp"
 #include "tav/inspect/path.hpp"
 #include "tav/inspect/value.hpp"
 #include "tav/inspect/walker.hpp"
+#include "tools/host/host.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/progress.h"
@@ -41,7 +41,7 @@ class Getter
 public:
   explicit Getter(const Invocation& invocation)
       : stream_(openStream(invocation)), out_("-"), raw_(invocation.has("--raw")), json_(invocation.has("--json")),
-        all_(invocation.has("--all")), paths_(invocation.has("--paths")), terminal_(kor::isTerminal(stdout))
+        all_(invocation.has("--all")), paths_(invocation.has("--paths")), terminal_(host::isTerminal(stdout))
   {
     if (raw_ && terminal_)
     {

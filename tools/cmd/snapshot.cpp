@@ -2,8 +2,9 @@
 #include <filesystem>
 #include <memory>
 
-#include "kor/host.h"
 #include "tav/byteOrder.h"
+#include "tools/host/host.h"
+#include "tools/host/machine.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/report.h"
@@ -85,7 +86,7 @@ private:
   bool pairs_;
 };
 
-void describe(SnapshotWriter& writer, const kor::MachineFacts& facts)
+void describe(SnapshotWriter& writer, const host::MachineFacts& facts)
 {
   writer.open(TAV_ELM_CMN_SYSTEM);
   writer.open(TAV_ELM_CMN_HOST);
@@ -136,7 +137,7 @@ int run(const Invocation& invocation)
                   "only 64-bit headers can announce an eye/size pair");
   }
   Output out(invocation.text("--output", "-"), invocation.has("--force"));
-  if (isStandardOutput(invocation.text("--output", "-")) && kor::isTerminal(stdout))
+  if (isStandardOutput(invocation.text("--output", "-")) && host::isTerminal(stdout))
   {
     throw Failure("snapshot: a stream is no text for a terminal", "-o FILE writes it to a file");
   }
@@ -151,7 +152,7 @@ int run(const Invocation& invocation)
   const auto closing = [](TAVHandle* open) { tavTermHandle(&open); };
   const std::unique_ptr<TAVHandle, decltype(closing)> closer(handle, closing);
   SnapshotWriter writer(handle, narrow, invocation.has("--eye-size"));
-  describe(writer, kor::describeMachine());
+  describe(writer, host::describeMachine());
   out.write(std::span<const uint8_t>(block.get(), static_cast<size_t>(handle->streamBytes)));
   out.commit();
   return kFine;

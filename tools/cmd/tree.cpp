@@ -3,11 +3,11 @@
 #include <cstdio>
 #include <utility>
 
-#include "kor/host.h"
 #include "tav/inspect/locate.hpp"
 #include "tav/inspect/path.hpp"
 #include "tav/inspect/value.hpp"
 #include "tav/inspect/walker.hpp"
+#include "tools/host/host.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/progress.h"
@@ -39,7 +39,7 @@ class TreePrinter
 public:
   TreePrinter(const Invocation& invocation, Stream& stream)
       : stream_(stream), out_("-"), colours_(wantsColour(invocation) ? kOnTerminal : Colours{}),
-        width_(static_cast<size_t>(kor::terminalWidth().value_or(0))), paths_(invocation.has("--paths")),
+        width_(static_cast<size_t>(host::terminalWidth().value_or(0))), paths_(invocation.has("--paths")),
         maxDepth_(invocation.number("--depth").value_or(kNoOffset))
   {
     if (const auto width = invocation.number("--width"))

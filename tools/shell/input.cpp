@@ -4,8 +4,8 @@
 #include <filesystem>
 #include <vector>
 
-#include "kor/host.h"
 #include "tav/inspect.hpp"
+#include "tools/host/host.h"
 #include "tools/shell/report.h"
 
 namespace tav::tool
@@ -92,9 +92,9 @@ class Spool
 public:
   Spool()
   {
-    const kor::HeldInterrupts held;
-    path_ = openTemporary(file_, kor::processId());
-    kor::removeOnInterrupt(path_);
+    const host::HeldInterrupts held;
+    path_ = openTemporary(file_, host::processId());
+    host::removeOnInterrupt(path_);
   }
 
   ~Spool() { remove(); }
@@ -130,9 +130,9 @@ public:
   /// Where an open file can be removed it is gone from now on, however the program ends.
   void remove()
   {
-    if (!path_.empty() && kor::removeFile(path_))
+    if (!path_.empty() && host::removeFile(path_))
     {
-      kor::keepOnInterrupt(path_);
+      host::keepOnInterrupt(path_);
       path_.clear();
     }
   }
@@ -170,10 +170,10 @@ std::unique_ptr<ByteSource> openSource(const std::string& path, const InputLimit
   }
   using Kind = std::filesystem::file_type;
   std::error_code error;
-  const Kind kind = std::filesystem::status(kor::pathOf(path), error).type();
+  const Kind kind = std::filesystem::status(host::pathOf(path), error).type();
   const bool regular = kind == Kind::regular && !error;
   const bool pipe = !error && kind != Kind::regular && kind != Kind::directory && kind != Kind::not_found;
-  const uint64_t told = regular ? std::filesystem::file_size(kor::pathOf(path), error) : 0;
+  const uint64_t told = regular ? std::filesystem::file_size(host::pathOf(path), error) : 0;
   if (pipe || (regular && !error && tellsWrongSize(path, path, told)))
   {
     return openSpooled(path, path, limits, from);
@@ -192,7 +192,7 @@ public:
       : TextSource(path == "-" ? "standard input" : path)
   {
     uint32_t code = TAV_RC_OK;
-    file_ = path == "-" ? stdin : kor::openStream(path, "rb", code);
+    file_ = path == "-" ? stdin : host::openStream(path, "rb", code);
     if (file_ == nullptr)
     {
       failAt(name(), code);

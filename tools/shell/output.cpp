@@ -7,7 +7,7 @@
 #include <filesystem>
 #include <utility>
 
-#include "kor/host.h"
+#include "tools/host/host.h"
 #include "tools/shell/report.h"
 
 namespace tav::tool
@@ -29,7 +29,7 @@ std::string plainName(const std::string& path)
 bool isInPlace(const std::string& path, const std::filesystem::path& target)
 {
   std::error_code error;
-  const auto status = std::filesystem::status(kor::pathOf(path), error);
+  const auto status = std::filesystem::status(host::pathOf(path), error);
   const bool known = !error && std::filesystem::exists(status);
   return known && (!std::filesystem::is_regular_file(status) || std::filesystem::is_symlink(target, error));
 }
@@ -39,30 +39,30 @@ bool isInPlace(const std::string& path, const std::filesystem::path& target)
 std::string besideName(const std::filesystem::path& target, unsigned attempt)
 {
   constexpr size_t most = 100;
-  std::string name = kor::textOf(target.filename());
+  std::string name = host::textOf(target.filename());
   size_t end = std::min(most, name.size());
   while (end != 0 && end < name.size() && (static_cast<unsigned char>(name[end]) & 0xC0) == 0x80)
   {
     --end; // no character is divided
   }
   name.resize(end);
-  return kor::textOf(target.parent_path() /
-                     kor::pathOf(name + ".tav-" + std::to_string(kor::processId()) + "-" + std::to_string(attempt)));
+  return host::textOf(target.parent_path() /
+                      host::pathOf(name + ".tav-" + std::to_string(host::processId()) + "-" + std::to_string(attempt)));
 }
 
 /// Throws Failure when a file of this name is there and `force` is not given.
 void checkWritable(const std::string& path, bool force)
 {
   std::error_code error;
-  if (force || path == "-" || kor::ownFile(path))
+  if (force || path == "-" || host::ownFile(path))
   {
     return;
   }
-  if (std::filesystem::is_directory(kor::pathOf(path), error))
+  if (std::filesystem::is_directory(host::pathOf(path), error))
   {
     failAt(path, KOR_RC_IS_FOLDER);
   }
-  if (std::filesystem::is_regular_file(kor::pathOf(path), error))
+  if (std::filesystem::is_regular_file(host::pathOf(path), error))
   {
     failAt(path, KOR_RC_FILE_EXISTS, "--force replaces it");
   }
@@ -77,7 +77,7 @@ struct NamedOutput
 bool isSameFile(const std::string& first, const std::string& second)
 {
   std::error_code error;
-  if (first != "-" && std::filesystem::is_character_file(kor::pathOf(first), error))
+  if (first != "-" && std::filesystem::is_character_file(host::pathOf(first), error))
   {
     return false; // a terminal and /dev/null serve any number of ends
   }
@@ -85,8 +85,8 @@ bool isSameFile(const std::string& first, const std::string& second)
   {
     return plainName(first) == plainName(second);
   }
-  return std::filesystem::equivalent(kor::pathOf(first), kor::pathOf(second), error) ||
-         kor::targetOf(first) == kor::targetOf(second);
+  return std::filesystem::equivalent(host::pathOf(first), host::pathOf(second), error) ||
+         host::targetOf(first) == host::targetOf(second);
 }
 
 std::vector<NamedOutput> outputsOf(const Invocation& invocation)
@@ -121,7 +121,7 @@ std::vector<std::string> inputsOf(const Invocation& invocation)
 
 bool isStandardOutput(const std::string& path)
 {
-  return path == "-" || kor::ownFile(path) == 1;
+  return path == "-" || host::ownFile(path) == 1;
 }
 
 void checkOutputs(const Invocation& invocation)
@@ -180,7 +180,7 @@ bool wantsColour(const Invocation& invocation)
     const char* const value = std::getenv(name);
     return std::string(value == nullptr ? "" : value);
   };
-  return kor::isTerminal(stdout) && variable("NO_COLOR").empty() && variable("TERM") != "dumb";
+  return host::isTerminal(stdout) && variable("NO_COLOR").empty() && variable("TERM") != "dumb";
 }
 
 Output::Output(const std::string& path, bool force)
@@ -192,8 +192,8 @@ Output::Output(const std::string& path, bool force)
     return;
   }
   checkWritable(path_, force);
-  const std::filesystem::path target = kor::targetOf(path_);
-  target_ = kor::textOf(target);
+  const std::filesystem::path target = host::targetOf(path_);
+  target_ = host::textOf(target);
   std::error_code error;
   if (std::filesystem::is_symlink(target, error) && !std::filesystem::exists(target, error))
   {
@@ -205,15 +205,15 @@ Output::Output(const std::string& path, bool force)
 void Output::openInPlace()
 {
   uint32_t code = TAV_RC_OK;
-  if (kor::ownFile(path_))
+  if (host::ownFile(path_))
   {
-    stream_ = kor::openStream(path_, "wb", code);
+    stream_ = host::openStream(path_, "wb", code);
   }
   else
   {
     // Of another process's open file nothing that was in it stays behind the output.
     std::error_code error;
-    const bool regular = std::filesystem::is_regular_file(kor::pathOf(path_), error);
+    const bool regular = std::filesystem::is_regular_file(host::pathOf(path_), error);
     KORFileOpenParam param;
     param.pPath = path_.c_str();
     param.options = regular ? KOR_FILE_WRITE | KOR_FILE_TRUNCATE : KOR_FILE_WRITE;
@@ -229,17 +229,17 @@ void Output::openBeside()
 {
   for (unsigned attempt = 0;; ++attempt)
   {
-    const std::string name = besideName(kor::pathOf(target_), attempt);
+    const std::string name = besideName(host::pathOf(target_), attempt);
     KORFileOpenParam param;
     param.pPath = name.c_str();
     param.options = KOR_FILE_WRITE | KOR_FILE_CREATE | KOR_FILE_EXCLUSIVE;
     param.permissions = 0600; // until it has its name, it is nobody else's
-    const kor::HeldInterrupts held;
+    const host::HeldInterrupts held;
     const uint32_t code = file_.open(&param);
     if (code == TAV_RC_OK)
     {
       temporary_ = name;
-      kor::removeOnInterrupt(temporary_);
+      host::removeOnInterrupt(temporary_);
       return;
     }
     if (code != KOR_RC_FILE_EXISTS || attempt == 1000)
@@ -261,8 +261,8 @@ Output::~Output()
   file_.close();
   if (!temporary_.empty())
   {
-    kor::removeFile(temporary_);
-    kor::keepOnInterrupt(temporary_);
+    host::removeFile(temporary_);
+    host::keepOnInterrupt(temporary_);
   }
 }
 
@@ -343,11 +343,11 @@ void Output::commit()
   {
     return;
   }
-  if (const uint32_t code = kor::moveIntoPlace(temporary_, target_, force_); code != TAV_RC_OK)
+  if (const uint32_t code = host::moveIntoPlace(temporary_, target_, force_); code != TAV_RC_OK)
   {
     failAt(path_, code, code == KOR_RC_FILE_EXISTS ? "--force replaces it" : "");
   }
-  kor::keepOnInterrupt(temporary_);
+  host::keepOnInterrupt(temporary_);
   temporary_.clear();
 }
 

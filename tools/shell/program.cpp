@@ -4,7 +4,7 @@
 #include <new>
 #include <optional>
 
-#include "kor/host.h"
+#include "tools/host/host.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/report.h"
@@ -105,10 +105,10 @@ int dispatch(const std::vector<std::string>& words)
 
 int runProgram(int argc, char** argv)
 {
-  kor::prepareStandardStreams();
+  host::prepareStandardStreams();
   try
   {
-    return dispatch(kor::commandLine(argc, argv));
+    return dispatch(host::commandLine(argc, argv));
   }
   catch (const Failure& failure)
   {

@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <cstdio>
 
-#include "kor/host.h"
+#include "tools/host/host.h"
 #include "tools/shell/report.h"
 
 namespace tav::tool
@@ -14,7 +14,7 @@ constexpr std::chrono::milliseconds kPatience{500};
 constexpr std::chrono::milliseconds kPause{100};
 
 Progress::Progress(std::string what, uint64_t totalBytes)
-    : what_(std::move(what)), total_(totalBytes), active_(kor::isTerminal(stderr))
+    : what_(std::move(what)), total_(totalBytes), active_(host::isTerminal(stderr))
 {
 }
 

@@ -2,8 +2,8 @@
 
 #include <cstdio>
 
-#include "kor/host.h"
 #include "tav/inspect/value.hpp"
+#include "tools/host/host.h"
 
 namespace tav::tool
 {
@@ -49,7 +49,7 @@ void report(std::string_view sentence)
 
 std::string shown(std::string_view text, std::FILE* where)
 {
-  return kor::isTerminal(where) ? forTerminal(text) : std::string(text);
+  return host::isTerminal(where) ? forTerminal(text) : std::string(text);
 }
 
 Failure::Failure(Status exitStatus, Problem what)

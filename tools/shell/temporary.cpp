@@ -1,20 +1,20 @@
 #include "tools/shell/temporary.h"
 
-#include "kor/host.h"
+#include "tools/host/host.h"
 
 namespace tav::tool
 {
 
 Temporary::Temporary()
 {
-  const kor::HeldInterrupts held;
-  path_ = inspect::openTemporary(file_, kor::processId());
-  if (kor::removeFile(path_))
+  const host::HeldInterrupts held;
+  path_ = inspect::openTemporary(file_, host::processId());
+  if (host::removeFile(path_))
   {
     path_.clear();
     return;
   }
-  kor::removeOnInterrupt(path_);
+  host::removeOnInterrupt(path_);
 }
 
 Temporary::~Temporary()
@@ -22,8 +22,8 @@ Temporary::~Temporary()
   file_.close();
   if (!path_.empty())
   {
-    kor::removeFile(path_);
-    kor::keepOnInterrupt(path_);
+    host::removeFile(path_);
+    host::keepOnInterrupt(path_);
   }
 }
 

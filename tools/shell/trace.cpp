@@ -2,9 +2,9 @@
 
 #include <algorithm>
 
-#include "kor/host.h"
 #include "tav/kor.h"
 #include "tav/probes.h"
+#include "tools/host/host.h"
 #include "tools/shell/report.h"
 
 namespace tav::tool
@@ -61,7 +61,7 @@ TraceFile::TraceFile(const Invocation& invocation)
     return;
   }
   uint32_t code = TAV_RC_OK;
-  filter_.file = path == "-" ? stderr : kor::openStream(path, "wb", code);
+  filter_.file = path == "-" ? stderr : host::openStream(path, "wb", code);
   if (filter_.file == nullptr)
   {
     failAt(path, code);

@@ -9,11 +9,11 @@
 
 #include <gtest/gtest.h>
 
-#include "kor/host.h"
 #include "support/byteRows.h"
 #include "support/platform.h"
 #include "support/vectorStorage.h"
 #include "tav/tav.hpp"
+#include "tools/host/host.h"
 
 namespace test
 {
@@ -80,7 +80,7 @@ private:
   static std::string nextName()
   {
     static int count = 0;
-    return "tav-layer-" + std::to_string(tav::kor::processId()) + "-" + std::to_string(++count);
+    return "tav-layer-" + std::to_string(tav::host::processId()) + "-" + std::to_string(++count);
   }
 };
 

@@ -1,6 +1,6 @@
-#include "kor/host.h"
 #include "kor/testFiles.h"
 #include "tav/kor.h"
+#include "tools/host/host.h"
 
 #include <array>
 #include <filesystem>
@@ -58,7 +58,7 @@ TEST_F(File, APathMayHoldAnyUtf8)
   KORHFile file;
   ASSERT_EQ(openFile(file, path("gr\xC3\xBC\xC3\x9F \xE6\x96\x87"), kNewFile), TAV_RC_OK);
   EXPECT_EQ(file.close(), TAV_RC_OK);
-  EXPECT_TRUE(std::filesystem::exists(tav::kor::pathOf(path("gr\xC3\xBC\xC3\x9F \xE6\x96\x87"))));
+  EXPECT_TRUE(std::filesystem::exists(tav::host::pathOf(path("gr\xC3\xBC\xC3\x9F \xE6\x96\x87"))));
 }
 
 TEST_F(File, TransfersMoveThePosition)

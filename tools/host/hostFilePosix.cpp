@@ -5,12 +5,14 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include "kor/host.h"
 #include "kor/systemError.h"
 #include "tav/kor.h"
+#include "tools/host/host.h"
 
-namespace tav::kor
+namespace tav::host
 {
+using kor::codeOfSystemError;
+
 namespace
 {
 namespace fs = std::filesystem;
@@ -193,4 +195,4 @@ uint32_t moveIntoPlace(const std::string& from, const std::string& to, bool repl
   if (code == TAV_RC_OK) code = giveName(from, to, replace);
   return code == TAV_RC_OK ? syncFolderOf(to) : code;
 }
-} // namespace tav::kor
+} // namespace tav::host

@@ -1,13 +1,16 @@
 #include <cstdlib>
 
-#include "kor/host.h"
 #include "kor/systemError.h"
 #include "kor/wideText.h"
 #include "kor/windows.h"
 #include "tav/kor.h"
+#include "tools/host/host.h"
 
-namespace tav::kor
+namespace tav::host
 {
+using kor::codeOfSystemError;
+using kor::widen;
+
 namespace
 {
 /// Puts the bytes of a file on the disk.
@@ -65,4 +68,4 @@ uint32_t moveIntoPlace(const std::string& from, const std::string& to, bool repl
   const DWORD flags = MOVEFILE_WRITE_THROUGH | (replace ? MOVEFILE_REPLACE_EXISTING : 0);
   return MoveFileExW(wideFrom.c_str(), wideTo.c_str(), flags) != 0 ? TAV_RC_OK : codeOfSystemError(GetLastError());
 }
-} // namespace tav::kor
+} // namespace tav::host

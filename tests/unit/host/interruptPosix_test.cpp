@@ -6,12 +6,12 @@
 #include <sys/resource.h>
 #include <vector>
 
-#include "kor/host.h"
 #include "kor/testFiles.h"
+#include "tools/host/host.h"
 
 namespace
 {
-using namespace tav::kor;
+using namespace tav::host;
 
 void makeFileWhileInterrupted(const std::string& path)
 {

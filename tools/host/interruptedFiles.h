@@ -7,7 +7,7 @@
 #include <cstddef>
 #include <string>
 
-namespace tav::kor
+namespace tav::host
 {
 /// A program has few of them at a time: its output, and what it keeps of its input. One that finds no place stays.
 template<class Char>
@@ -48,4 +48,4 @@ private:
 
   Slot slots_[kSlots]{};
 };
-} // namespace tav::kor
+} // namespace tav::host

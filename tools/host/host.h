@@ -1,7 +1,6 @@
 /// @file host.h
-/// What the project's own programs ask of the operating system beside files: the terminal, standard streams, signals,
-/// names of files, and what the machine tells about itself. Texts and paths are UTF-8. Linked into the programs;
-/// libkor neither has nor exports it.
+/// What the program asks of the operating system beside libkor: the terminal, standard streams, signals, and names of
+/// files. Texts and paths are UTF-8.
 #pragma once
 
 #include <cstdint>
@@ -11,7 +10,7 @@
 #include <string>
 #include <vector>
 
-namespace tav::kor
+namespace tav::host
 {
 /// The words behind the program's name, in UTF-8.
 std::vector<std::string> commandLine(int argc, char** argv);
@@ -81,32 +80,4 @@ std::filesystem::path targetOf(const std::string& path);
 /// as far as the system lets; what it cannot have of the owner's group, that group may not do with it either. A new
 /// file gets the mode of new files. Returns a code of codes.h.
 uint32_t moveIntoPlace(const std::string& from, const std::string& to, bool replace);
-
-struct CpuFacts
-{
-  std::string vendor{}; ///< as the processor gives it; empty when unknown
-  std::string model{};
-  std::optional<uint64_t> configured{};
-  std::optional<uint64_t> online{};
-  std::optional<uint64_t> megahertz{};
-};
-
-/// What this machine tells about itself; what it does not tell is empty.
-struct MachineFacts
-{
-  std::string hostName{};
-  std::string machine{}; ///< kind of processor
-  std::string osName{};
-  std::string osRelease{};
-  std::string osVersion{};
-  CpuFacts cpu{};
-  std::optional<uint64_t> memTotal{}; ///< all in bytes
-  std::optional<uint64_t> memFree{};
-  std::optional<uint64_t> swapTotal{};
-  std::optional<uint64_t> swapFree{};
-  std::optional<uint64_t> bootSeconds{}; ///< since 1970
-  std::vector<double> loads{};           ///< of the last 1, 5 and 15 minutes
-};
-
-MachineFacts describeMachine();
-} // namespace tav::kor
+} // namespace tav::host

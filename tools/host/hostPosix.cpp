@@ -1,0 +1,85 @@
+#include <algorithm>
+#include <csignal>
+#include <sys/ioctl.h>
+#include <unistd.h>
+
+#include "tools/host/host.h"
+#include "tools/host/interruptedFiles.h"
+
+namespace tav::host
+{
+namespace
+{
+// What a signal's handler may look at.
+InterruptedFiles<char> filesToRemove;
+volatile std::sig_atomic_t held = 0;
+volatile std::sig_atomic_t waiting = 0; ///< the number of a signal that came while it was held
+
+extern "C" void endBySignal(int number)
+{
+  if (held != 0)
+  {
+    waiting = number;
+    return;
+  }
+  filesToRemove.each([](const char* path) { ::unlink(path); });
+  std::signal(number, SIG_DFL);
+  std::raise(number);
+}
+} // namespace
+
+std::vector<std::string> commandLine(int argc, char** argv)
+{
+  return {argv + std::min(argc, 1), argv + argc};
+}
+
+bool isTerminal(FILE* stream)
+{
+  return ::isatty(::fileno(stream)) != 0;
+}
+
+std::optional<unsigned> terminalWidth()
+{
+  if (!isTerminal(stdout)) return std::nullopt;
+  winsize size{};
+  if (::ioctl(::fileno(stdout), TIOCGWINSZ, &size) == 0 && size.ws_col != 0) return size.ws_col;
+  return 80;
+}
+
+void prepareStandardStreams()
+{
+  std::signal(SIGPIPE, SIG_IGN);
+  std::signal(SIGXFSZ, SIG_IGN);
+  for (const int number : {SIGINT, SIGTERM, SIGHUP, SIGQUIT})
+  {
+    // Who was told to ignore a signal (nohup) goes on ignoring it.
+    if (std::signal(number, endBySignal) == SIG_IGN) std::signal(number, SIG_IGN);
+  }
+}
+
+void removeOnInterrupt(const std::string& path)
+{
+  filesToRemove.add(path);
+}
+
+void keepOnInterrupt(const std::string& path)
+{
+  filesToRemove.drop(path);
+}
+
+HeldInterrupts::HeldInterrupts()
+{
+  held = 1;
+}
+
+HeldInterrupts::~HeldInterrupts()
+{
+  held = 0;
+  if (waiting != 0) endBySignal(waiting);
+}
+
+uint64_t processId()
+{
+  return static_cast<uint64_t>(::getpid());
+}
+} // namespace tav::host
