@@ -5,17 +5,13 @@
 #include <cstdint>
 #include <optional>
 #include <string>
-#include <vector>
 
 namespace tav::host
 {
 struct CpuFacts
 {
-  std::string vendor{}; ///< as the processor gives it; empty when unknown
-  std::string model{};
   std::optional<uint64_t> configured{};
   std::optional<uint64_t> online{};
-  std::optional<uint64_t> megahertz{};
 };
 
 /// What this machine tells about itself; what it does not tell is empty.
@@ -31,8 +27,6 @@ struct MachineFacts
   std::optional<uint64_t> memFree{};
   std::optional<uint64_t> swapTotal{};
   std::optional<uint64_t> swapFree{};
-  std::optional<uint64_t> bootSeconds{}; ///< since 1970
-  std::vector<double> loads{};           ///< of the last 1, 5 and 15 minutes
 };
 
 MachineFacts describeMachine();

@@ -24,17 +24,6 @@ std::optional<uint64_t> numberAfter(const std::string& text, const std::string& 
   return std::nullopt;
 }
 
-std::string textAfter(const std::string& text, const std::string& word)
-{
-  std::istringstream lines(text);
-  for (std::string line; std::getline(lines, line);)
-  {
-    const size_t colon = line.find(": ");
-    if (line.starts_with(word) && colon != std::string::npos) return line.substr(colon + 2);
-  }
-  return {};
-}
-
 std::string contentOf(const char* path)
 {
   const std::ifstream file(path, std::ios::binary);
@@ -64,10 +53,6 @@ void describeProcessors(CpuFacts& cpu)
   };
   cpu.configured = count(_SC_NPROCESSORS_CONF);
   cpu.online = count(_SC_NPROCESSORS_ONLN);
-  const std::string cpus = contentOf("/proc/cpuinfo");
-  cpu.vendor = textAfter(cpus, "vendor_id");
-  cpu.model = textAfter(cpus, "model name");
-  cpu.megahertz = numberAfter(cpus, "cpu MHz");
 }
 } // namespace
 
@@ -83,9 +68,6 @@ MachineFacts describeMachine()
     facts.osRelease = name.release;
     facts.osVersion = name.version;
   }
-  facts.bootSeconds = numberAfter(contentOf("/proc/stat"), "btime");
-  std::istringstream loads(contentOf("/proc/loadavg"));
-  for (double load = 0; facts.loads.size() < 3 && loads >> load;) facts.loads.push_back(load);
   describeProcessors(facts.cpu);
   describeMemory(facts);
   return facts;

@@ -20,7 +20,7 @@ std::string computerName()
   return narrow(name.c_str());
 }
 
-/// A value that the system keeps below the key of the first processor, or of the system's version.
+/// A value that the system keeps below a key.
 std::string registryText(const wchar_t* pKey, const wchar_t* pValue)
 {
   wchar_t text[256] = {};
@@ -30,20 +30,8 @@ std::string registryText(const wchar_t* pKey, const wchar_t* pValue)
   return status == ERROR_SUCCESS ? narrow(text) : std::string();
 }
 
-std::optional<uint64_t> registryNumber(const wchar_t* pKey, const wchar_t* pValue)
-{
-  DWORD number = 0;
-  DWORD bytes = sizeof number;
-  const LSTATUS status = RegGetValueW(HKEY_LOCAL_MACHINE, pKey, pValue, RRF_RT_REG_DWORD, nullptr, &number, &bytes);
-  return status == ERROR_SUCCESS ? std::optional<uint64_t>(number) : std::nullopt;
-}
-
 void describeProcessors(CpuFacts& cpu)
 {
-  constexpr const wchar_t* kKey = L"HARDWARE\\DESCRIPTION\\System\\CentralProcessor\\0";
-  cpu.vendor = registryText(kKey, L"VendorIdentifier");
-  cpu.model = registryText(kKey, L"ProcessorNameString");
-  cpu.megahertz = registryNumber(kKey, L"~MHz");
   SYSTEM_INFO system{};
   GetNativeSystemInfo(&system);
   cpu.configured = system.dwNumberOfProcessors;
@@ -72,11 +60,6 @@ MachineFacts describeMachine()
   facts.osName = "Windows";
   facts.osRelease = registryText(kVersion, L"CurrentVersion");
   facts.osVersion = registryText(kVersion, L"CurrentBuildNumber");
-  FILETIME now{};
-  GetSystemTimeAsFileTime(&now);
-  // In units of 100 ns since 1601.
-  const uint64_t units = (uint64_t{now.dwHighDateTime} << 32) | now.dwLowDateTime;
-  facts.bootSeconds = units / 10'000'000 - 11'644'473'600 - GetTickCount64() / 1000;
   describeProcessors(facts.cpu);
   describeMemory(facts);
   return facts;
