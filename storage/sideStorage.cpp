@@ -1,3 +1,4 @@
+#include "kor/shared.h"
 #include "tav/probes.h"
 #include "tav/tav.h"
 #include "trace/traceFrame.h"
@@ -28,7 +29,7 @@ TAVSideStorage::~TAVSideStorage()
 {
   const TraceFrame frame(probe::sideStorageEnd);
   // Whoever still holds the storage may ask it: the store is made although the object ends here.
-  static_cast<volatile uint32_t&>(status) = TAV_STATUS_DESTROYED;
+  kor::store(status, TAV_STATUS_DESTROYED);
 }
 
 uint32_t TAVSideStorage::getStatus() const
