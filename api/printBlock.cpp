@@ -1,48 +1,33 @@
 #include "api/printBlock.h"
 
-#include <algorithm>
-
-#include "api/printer.h"
-#include "dictionary/dictionary.h"
+#include <cstring>
 
 namespace tav::inside::print
 {
-namespace
-{
 
-template<size_t size>
-char* append(char* to, const char (&text)[size])
+uint64_t OutputBlock::add(size_t blanks, std::string_view text)
 {
-  return std::copy_n(text, size - 1, to);
-}
-
-} // namespace
-
-bool ReadyTags::make(ReadyTag& tag, uint16_t elm, int64_t depth)
-{
-  const std::string_view name = elementTagName(elm);
-  const size_t blanks = static_cast<size_t>(depth) * kBlanksPerLevel;
-  if (blanks + name.size() + 2 > ReadyTag::kLongestOpening || name.size() + 4 > ReadyTag::kLongestClosing)
+  const size_t length = blanks + text.size();
+  if (length > kSize) [[unlikely]]
   {
-    return false;
+    handOver();
+    const uint64_t taken = stopped_ ? 0 : putInStream(stream_, blanks, text);
+    taken_ += taken;
+    total_ += taken;
+    return taken;
   }
-  tag = {};
-  tag.key = keyOf(elm, depth);
-  char* end = std::fill_n(tag.opening.data(), blanks, ' ');
-  end = append(std::copy(name.begin(), name.end(), append(end, "<")), ">");
-  tag.openingLength = static_cast<uint32_t>(end - tag.opening.data());
-  end = append(tag.closing.data(), "</");
-  end = append(std::copy(name.begin(), name.end(), end), ">\n");
-  tag.closingLength = static_cast<uint32_t>(end - tag.closing.data());
-  return true;
+  if (length != 0)
+  {
+    char* const place = reserve(length);
+    std::memset(place, ' ', blanks);
+    std::memcpy(place + blanks, text.data(), text.size());
+    endPieces({length});
+  }
+  return length;
 }
 
 void OutputBlock::handOver()
 {
-  if (used_ == 0)
-  {
-    return;
-  }
   const size_t taken = stopped_ ? 0 : std::fwrite(text_.data(), 1, used_, stream_);
   if (taken == used_)
   {
@@ -80,19 +65,6 @@ uint64_t OutputBlock::settle(size_t taken)
     start = end;
   }
   return counted;
-}
-
-uint64_t OutputBlock::addLong(size_t blanks, std::string_view text)
-{
-  handOver();
-  if (stopped_)
-  {
-    return 0;
-  }
-  const uint64_t length = putInStream(stream_, blanks, text);
-  taken_ += length;
-  total_ += length;
-  return length;
 }
 
 } // namespace tav::inside::print

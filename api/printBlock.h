@@ -1,11 +1,9 @@
 /// Output of a walk on its way to a stream.
 #pragma once
 
-#include <algorithm>
 #include <array>
 #include <cstdint>
 #include <cstdio>
-#include <cstring>
 #include <string_view>
 
 namespace tav::inside::print
@@ -13,41 +11,8 @@ namespace tav::inside::print
 
 inline constexpr int64_t kBlanksPerLevel = 3;
 
-/// Opening and closing of a data element that stands on one line, ready to be copied.
-struct ReadyTag
-{
-  static constexpr size_t kLongestOpening = 96;
-  static constexpr size_t kLongestClosing = 64;
-
-  uint32_t key = ~uint32_t{0}; ///< depth and element id
-  uint32_t openingLength;
-  uint32_t closingLength;
-  std::array<char, kLongestOpening> opening; ///< with its indentation
-  std::array<char, kLongestClosing> closing;
-};
-
-/// The tags that a walk has seen last. Siblings have ids close to each other, so the id's low bits choose the place.
-class ReadyTags
-{
-public:
-  /// Null when the tag is too long or too deep to be kept.
-  const ReadyTag* find(uint16_t elm, int64_t depth)
-  {
-    ReadyTag& tag = tags_[elm % tags_.size()];
-    return tag.key == keyOf(elm, depth) || make(tag, elm, depth) ? &tag : nullptr;
-  }
-
-private:
-  /// A depth of 16 bits will do: much less of it makes a tag too long.
-  static uint32_t keyOf(uint16_t elm, int64_t depth)
-  {
-    return static_cast<uint32_t>(std::min<int64_t>(depth, 0xFFFE)) << 16U | elm;
-  }
-
-  static bool make(ReadyTag& tag, uint16_t elm, int64_t depth);
-
-  std::array<ReadyTag, 64> tags_;
-};
+/// Gives a stream one piece: blanks, then a text. Returns the characters that count, none when it refuses any.
+uint64_t putInStream(FILE* stream, size_t blanks, std::string_view text);
 
 /// Collects pieces and hands them to the stream together. What a stream then refuses is settled as if every piece had
 /// gone to it alone: a refused piece does not count, the next is tried, and a node of which no piece is taken ends the
@@ -68,7 +33,7 @@ public:
   OutputBlock(const OutputBlock&) = delete;
   OutputBlock& operator=(const OutputBlock&) = delete;
 
-  /// The place for a piece of up to `longest` characters, at most kSize.
+  /// The place for pieces of up to `longest` characters, at most kSize.
   char* reserve(size_t longest)
   {
     if (kSize - used_ < longest) [[unlikely]]
@@ -78,38 +43,19 @@ public:
     return text_.data() + used_;
   }
 
-  /// Ends the piece that was written to the reserved place; it is not empty.
-  void endPiece(size_t length)
+  /// Ends pieces that were written to the reserved place, one behind the other. At most one of three is empty.
+  template<size_t count>
+  void endPieces(const size_t (&lengths)[count])
   {
-    used_ += length;
-    ends_[endCount_++] = static_cast<uint16_t>(used_);
-    total_ += length;
-  }
-
-  /// A ready piece, copied in a fixed size.
-  template<size_t size>
-  void addReady(const std::array<char, size>& text, size_t length)
-  {
-    std::memcpy(reserve(size), text.data(), size);
-    endPiece(length);
-  }
-
-  /// A piece of any length: blanks, then a text without a NUL among them. Returns the characters that count.
-  uint64_t add(size_t blanks, std::string_view text)
-  {
-    const size_t length = blanks + text.size();
-    if (length > kSize) [[unlikely]]
+    size_t end = used_;
+    for (size_t at = 0; at < count; ++at)
     {
-      return addLong(blanks, text);
+      end += lengths[at];
+      ends_[endCount_ + at] = static_cast<uint16_t>(end);
     }
-    if (length != 0)
-    {
-      char* const place = reserve(length);
-      std::memset(place, ' ', blanks);
-      std::memcpy(place + blanks, text.data(), text.size());
-      endPiece(length);
-    }
-    return length;
+    endCount_ += count;
+    total_ += end - used_;
+    used_ = end;
   }
 
   /// Ends a node that has produced something, so far as is known.
@@ -125,19 +71,8 @@ public:
     nodeStart_ = used_;
   }
 
-  /// Ends a node of three pieces that were written to the reserved place; the second may be empty.
-  void endNodeOfThree(size_t first, size_t second, size_t third)
-  {
-    const size_t start = used_;
-    used_ = start + first + second + third;
-    total_ += used_ - start;
-    nodeStart_ = used_;
-    uint16_t* const ends = ends_.data() + endCount_;
-    ends[0] = static_cast<uint16_t>(start + first);
-    ends[1] = static_cast<uint16_t>(start + first + second);
-    ends[2] = static_cast<uint16_t>(used_ | kNodeEnd);
-    endCount_ += 3;
-  }
+  /// A piece of any length, without a NUL. Returns the characters that count.
+  uint64_t add(size_t blanks, std::string_view text);
 
   /// Gives the stream all there is.
   void handOver();
@@ -148,12 +83,9 @@ public:
     return stopped_;
   }
 
-  ReadyTags tags;
-
 private:
   static constexpr uint16_t kNodeEnd = 0x8000; ///< beside the end of a node's last piece
 
-  uint64_t addLong(size_t blanks, std::string_view text);
   uint64_t settle(size_t taken);
 
   FILE* stream_;
@@ -164,7 +96,7 @@ private:
   bool stopped_ = false;
   std::array<char, kSize> text_;
   size_t endCount_ = 0;
-  std::array<uint16_t, kSize + kSize / 2> ends_; ///< where each piece ends; of three together one may be empty
+  std::array<uint16_t, kSize + kSize / 2> ends_; ///< where each piece ends
 };
 
 } // namespace tav::inside::print

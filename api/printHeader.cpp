@@ -1,7 +1,7 @@
 /// Printing what a descriptor says: the header, and where the data lie.
-#include <algorithm>
-#include <bit>
+#include <array>
 
+#include "api/digits.h"
 #include "api/printer.h"
 #include "dictionary/dictionary.h"
 #include "format/layout.h"
@@ -11,36 +11,26 @@ namespace tav::inside::print
 namespace
 {
 
-/// The characters of a number.
-struct Characters
+/// The characters of a number, with zeros before it up to `width`.
+class Number
 {
-  std::array<char, digits::kLongest> text;
-  size_t length;
-
+public:
+  explicit Number(uint64_t value, unsigned base = 10, size_t width = 1)
+  {
+    for (; value != 0 || length_ < width; value /= base)
+    {
+      text_[text_.size() - ++length_] = digits::hexDigit(value % base);
+    }
+  }
   operator std::string_view() const // NOLINT(google-explicit-constructor): a text is what it is
   {
-    return {text.data(), length};
+    return {text_.data() + text_.size() - length_, length_};
   }
+
+private:
+  std::array<char, 20> text_; ///< at its end
+  size_t length_ = 0;
 };
-
-Characters decimal(uint64_t number)
-{
-  Characters result{};
-  result.length = static_cast<size_t>(digits::writeDecimal(result.text.data(), number) - result.text.data());
-  return result;
-}
-
-/// A number in hexadecimal digits, with zeros before it up to `width`.
-Characters hex(uint64_t number, size_t width)
-{
-  Characters result{};
-  result.length = std::max(width, (static_cast<size_t>(std::bit_width(number)) + 3) / 4);
-  for (size_t at = result.length; at != 0; number >>= 4U)
-  {
-    result.text[--at] = digits::hexDigit(number & 0xFU);
-  }
-  return result;
-}
 
 /// Records of fields in either form: "name = value" between braces, or elements.
 class Fields
@@ -68,23 +58,17 @@ public:
     row({indent(), "</", tag, ">\n"}, {indent(), "}\n"});
   }
 
-  /// A field whose name takes so many characters in the text form.
-  void value(std::string_view name, size_t width, std::string_view value)
+  /// A field whose name takes so many characters in the text form. Of a code that has a name XML shows the name alone.
+  void field(std::string_view name, size_t width, const Number& value, std::string_view codeName = {})
   {
-    row({indent(), "<", name, ">", value, "</", name, ">\n"},
-        {indent(), name, kBlanks.substr(0, width - name.size()), " = ", value, "\n"});
-  }
-
-  /// A code with a name; XML shows the name alone.
-  void code(std::string_view field, size_t width, uint16_t code, std::string_view name)
-  {
-    row({indent(), "<", field, ">", name, "</", field, ">\n"},
-        {indent(), field, kBlanks.substr(0, width - field.size()), " = ", decimal(code), " ( ", name, " )\n"});
+    const bool named = codeName.data() != nullptr;
+    row({indent(), "<", name, ">", named ? codeName : value, "</", name, ">\n"},
+        {indent(), name, kBlanks.substr(0, width - name.size()), " = ", value, named ? " ( " : "", codeName,
+         named ? " )\n" : "\n"});
   }
 
 private:
   static constexpr std::string_view kBlanks = "             ";
-  using Parts = std::initializer_list<std::string_view>;
 
   /// A line in the form that is asked for.
   void row(Parts xml, Parts text)
@@ -110,26 +94,25 @@ void header(TAVPrintCtx& ctx, const TAVHeader& header)
   Fields fields(ctx);
   fields.open("TAVHeader", "tavHeader");
   fields.open(wide ? "TAVHeader64" : "TAVHeader32", wide ? "tavHeader64" : "tavHeader32");
-  fields.value("size", 4, decimal(sizeOf(header)));
+  fields.field("size", 4, Number(sizeOf(header)));
   if (wide)
   {
-    fields.value("info", 4, hex(header.hdr64.info, 1));
+    fields.field("info", 4, Number(header.hdr64.info, 16));
   }
-  fields.code("type", 4, typeOf(header), typePrintName(typeOf(header)));
-  fields.code("elm", 4, elmOf(header), elementEnumName(elmOf(header)));
+  fields.field("type", 4, Number(typeOf(header)), typePrintName(typeOf(header)));
+  fields.field("elm", 4, Number(elmOf(header)), elementEnumName(elmOf(header)));
   fields.close(wide ? "tavHeader64" : "tavHeader32");
-  fields.code("hdrType", 10, header.hdrType, typePrintName(header.hdrType));
-  fields.value("nodeOffset", 10, decimal(header.nodeOffset));
+  fields.field("hdrType", 10, Number(header.hdrType), typePrintName(header.hdrType));
+  fields.field("nodeOffset", 10, Number(header.nodeOffset));
   fields.close("tavHeader");
 }
 
 void descriptor(TAVPrintCtx& ctx, const TAVHeaderData& node)
 {
-  constexpr size_t addressDigits = 16;
   Fields fields(ctx);
-  fields.value("pDataBuf", 13, hex(reinterpret_cast<uintptr_t>(node.pDataBuf), addressDigits));
-  fields.value("dataBufSize", 13, decimal(node.dataBufSize));
-  fields.value("dataBufOffset", 13, decimal(node.dataBufOffset));
+  fields.field("pDataBuf", 13, Number(reinterpret_cast<uintptr_t>(node.pDataBuf), 16, 16));
+  fields.field("dataBufSize", 13, Number(node.dataBufSize));
+  fields.field("dataBufOffset", 13, Number(node.dataBufOffset));
 }
 
 } // namespace tav::inside::print

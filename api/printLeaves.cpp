@@ -1,7 +1,10 @@
 #include "api/printLeaves.h"
 
+#include <algorithm>
+
 #include "api/printValue.h"
 #include "core/step.h"
+#include "dictionary/dictionary.h"
 
 namespace tav::inside::print
 {
@@ -25,6 +28,37 @@ bool isCommon(const HeaderFields& fields)
                         : fields.type == TAV_TYPE_ASCII_STRING && fields.size != 0 && fields.size <= kLongestText;
 }
 
+char* copy(char* to, std::string_view text)
+{
+  return std::copy(text.begin(), text.end(), to);
+}
+
+[[gnu::noinline]] bool make(ReadyTag& tag, uint32_t key, uint16_t elm, int64_t depth)
+{
+  const std::string_view name = elementTagName(elm);
+  const size_t blanks = static_cast<size_t>(depth) * kBlanksPerLevel;
+  if (blanks + name.size() + 2 > tag.opening.size() || name.size() + 4 > tag.closing.size())
+  {
+    return false;
+  }
+  tag = {};
+  tag.key = key;
+  char* const opened = copy(copy(copy(std::fill_n(tag.opening.data(), blanks, ' '), "<"), name), ">");
+  tag.openingLength = static_cast<uint32_t>(opened - tag.opening.data());
+  char* const closed = copy(copy(copy(tag.closing.data(), "</"), name), ">\n");
+  tag.closingLength = static_cast<uint32_t>(closed - tag.closing.data());
+  return true;
+}
+
+/// The tag of an element; null when it is too long or too deep to be kept. A depth of 16 bits will do: much less of it
+/// makes a tag too long.
+[[gnu::always_inline]] inline const ReadyTag* findTag(ReadyTags& tags, uint16_t elm, int64_t depth)
+{
+  const uint32_t key = static_cast<uint32_t>(std::min<int64_t>(depth, 0xFFFE)) << 16U | elm;
+  ReadyTag& tag = tags[elm % tags.size()];
+  return tag.key == key || make(tag, key, elm, depth) ? &tag : nullptr;
+}
+
 char* writeText(char* to, const uint8_t* data, uint64_t size)
 {
   const auto* text = reinterpret_cast<const char*>(data);
@@ -38,7 +72,7 @@ template<bool swap>
 [[gnu::always_inline]] inline void printLeaf(OutputBlock& block, const ReadyTag& tag, const HeaderFields& fields,
                                              const uint8_t* data)
 {
-  constexpr size_t room = ReadyTag::kLongestOpening + kLongestShort + ReadyTag::kLongestClosing;
+  constexpr size_t room = sizeof tag.opening + kLongestShort + sizeof tag.closing;
   const bool isText = fields.type == TAV_TYPE_ASCII_STRING;
   char* const line = block.reserve(isText ? room + kLongestText : room);
   std::memcpy(line, tag.opening.data(), tag.opening.size());
@@ -46,80 +80,62 @@ template<bool swap>
   char* const to = isText ? writeText(from, data, fields.size)
                           : writeShort(from, fields.type, Value(fields.type, data, fields.size, swap));
   std::memcpy(to, tag.closing.data(), tag.closing.size());
-  block.endNodeOfThree(tag.openingLength, static_cast<size_t>(to - from), tag.closingLength);
+  block.endPieces({tag.openingLength, static_cast<size_t>(to - from), tag.closingLength});
+  block.endNode();
 }
-
-/// Where a run goes on, and where it has come to.
-struct Run
-{
-  const core::Level& level;
-  const TAVHeader* previous; ///< null: the level's first child is next
-  WalkGuard& guard;
-  uint64_t count = 0;
-  uint64_t lastOffset = 0;
-};
 
 /// Steps to the next data elements and prints them. The level's children have 64-bit headers if `wide`, and their
 /// bytes are reversed if `swap`.
 template<bool wide, bool swap>
-void print(OutputBlock& output, int64_t depth, const TAVHandle& handle, Run& run)
+bool print(TAVPrintCtx& ctx, ReadyTags& tags, const TAVHandle& handle, const core::Level& below,
+           const TAVHeader* previous, WalkGuard& walk, TAVHeader& last)
 {
+  OutputBlock& block = *ctx.pBlock;
   core::BlockBytes<core::AnyForm> bytes(handle);
   bytes.form.swap = swap;
-  const core::Level level = run.level;
-  WalkGuard guard = run.guard;
-  bool first = run.previous == nullptr;
-  core::Node node = first ? core::Node{} : core::nodeOf(*run.previous);
+  const int64_t depth = ctx.depth;
+  const core::Level level = below;
+  WalkGuard guard = walk;
+  bool first = previous == nullptr;
+  core::Node node = first ? core::Node{} : core::nodeOf(*previous);
   core::Place place = bytes.nowhere();
-  uint64_t count = 0;
-  uint64_t lastOffset = 0;
-  while (!tracing() && !output.stopped() && core::step<wide>(bytes, level, first, node, place) == TAV_RC_OK &&
+  const uint8_t* printed = nullptr;
+  while (!tracing() && !block.stopped() && core::step<wide>(bytes, level, first, node, place) == TAV_RC_OK &&
          !node.group())
   {
-    const ReadyTag* const tag = isCommon(node.fields) ? output.tags.find(node.fields.elm, depth) : nullptr;
+    const ReadyTag* const tag = isCommon(node.fields) ? findTag(tags, node.fields.elm, depth) : nullptr;
     if (tag == nullptr || !guard.visit(node.place))
     {
       break; // a visit that is refused is refused again
     }
-    printLeaf<swap>(output, *tag, node.fields, place.header + core::lengthOfHeader(wide));
-    lastOffset = node.place;
-    ++count;
+    printLeaf<swap>(block, *tag, node.fields, place.header + core::lengthOfHeader(wide));
+    printed = place.header;
     first = false;
   }
-  run.guard = guard;
-  run.count = count;
-  run.lastOffset = lastOffset;
+  walk = guard;
+  if (printed != nullptr)
+  {
+    const auto offset = static_cast<uint64_t>(printed - bytes.base);
+    core::toHeader({offset, decodeFields(printed, wide, swap), wide}, last);
+  }
+  return printed != nullptr;
 }
 
 } // namespace
 
-bool printLeaves(TAVPrintCtx& ctx, const TAVHandle& handle, const TAVHeader& parent, const TAVHeader* previous,
-                 WalkGuard& guard, TAVHeader& last)
+bool printLeaves(TAVPrintCtx& ctx, ReadyTags& tags, const TAVHandle& handle, const TAVHeader& parent,
+                 const TAVHeader* previous, WalkGuard& guard, TAVHeader& last)
 {
-  using Bytes = core::BlockBytes<core::AnyForm>;
-  if (!isOneLine(ctx) || !core::isReadOnly(handle) || !Bytes::canRead(handle))
+  if (ctx.pBlock == nullptr || !isOneLine(ctx) || !core::isReadOnly(handle) ||
+      !core::BlockBytes<core::AnyForm>::canRead(handle))
   {
     return false;
   }
-  const Bytes bytes(handle);
   const core::Level level = core::levelBelow(core::nodeOf(parent));
-  Run run{level, previous, guard};
-  if (level.wide)
-  {
-    bytes.form.swap ? print<true, true>(*ctx.pBlock, ctx.depth, handle, run)
-                    : print<true, false>(*ctx.pBlock, ctx.depth, handle, run);
-  }
-  else
-  {
-    bytes.form.swap ? print<false, true>(*ctx.pBlock, ctx.depth, handle, run)
-                    : print<false, false>(*ctx.pBlock, ctx.depth, handle, run);
-  }
-  if (run.count != 0)
-  {
-    const HeaderFields fields = decodeFields(bytes.base + run.lastOffset, level.wide, bytes.form.swap);
-    core::toHeader({run.lastOffset, fields, level.wide}, last);
-  }
-  return run.count != 0;
+  const bool swap = handle.swapBytes != 0;
+  const auto run = level.wide ? (swap ? print<true, true> : print<true, false>)
+                              : (swap ? print<false, true> : print<false, false>);
+  return run(ctx, tags, handle, level, previous, guard, last);
 }
 
 } // namespace tav::inside::print

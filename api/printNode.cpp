@@ -7,36 +7,28 @@
 
 using namespace tav;
 using namespace tav::inside;
-using tav::inside::print::has;
-using tav::inside::print::line;
-using tav::inside::print::piece;
-using tav::inside::print::ReadyTag;
+using namespace tav::inside::print;
 
 namespace
 {
 
 /// Which parts of a node a call prints.
-struct Parts
+struct Asked
 {
   bool open;
   bool body;
   bool close;
 };
 
-bool hasValue(const TAVHeaderData& node)
-{
-  return !isGroup(node.header) && sizeOf(node.header) != 0;
-}
-
 /// What stands where a node's data does; XML wraps it where anything else stands beside it.
 uint32_t printData(TAVPrintCtx& ctx, TAVHeaderData& node)
 {
   if (has(ctx, TAV_PRINT_DESCRIPTORS))
   {
-    tav::inside::print::descriptor(ctx, node);
+    descriptor(ctx, node);
   }
   const bool xml = has(ctx, TAV_PRINT_XML);
-  const bool value = hasValue(node);
+  const bool value = !isGroup(node.header) && sizeOf(node.header) != 0;
   const bool wrapped = xml ? has(ctx, TAV_PRINT_HEADERS | TAV_PRINT_DESCRIPTORS) : value;
   if (wrapped)
   {
@@ -45,122 +37,77 @@ uint32_t printData(TAVPrintCtx& ctx, TAVHeaderData& node)
   const uint32_t rc = value ? tavPrintValue(&ctx, &node) : TAV_RC_OK;
   if (rc == TAV_RC_OK && wrapped)
   {
-    piece(ctx, xml ? "</tavData>\n" : "\n");
+    piece(ctx, {xml ? "</tavData>\n" : "\n"});
   }
   return rc;
 }
 
+/// The opening of a node. That of an element stands on the line of its value, unless more than a value follows.
+void printOpening(TAVPrintCtx& ctx, uint16_t elm, const Asked& asked)
+{
+  if (!has(ctx, TAV_PRINT_XML))
+  {
+    line(ctx, {elementEnumName(elm), "\n"});
+    line(ctx, {"{\n"});
+    return;
+  }
+  line(ctx, {"<", elementTagName(elm), ctx.attributeForm != 0 ? "" : ">"});
+  if (ctx.attributeForm == 0 && (!asked.close || has(ctx, TAV_PRINT_HEADERS)))
+  {
+    piece(ctx, {"\n"});
+  }
+}
+
 uint32_t printBody(TAVPrintCtx& ctx, TAVHeaderData& node)
 {
-  if (has(ctx, TAV_PRINT_BARE))
+  const bool attribute = has(ctx, TAV_PRINT_XML) && ctx.attributeForm != 0;
+  if (attribute)
+  {
+    piece(ctx, {" ", elementTagName(elmOf(node.header)), "="});
+  }
+  if (attribute || has(ctx, TAV_PRINT_BARE))
   {
     return tavPrintValue(&ctx, &node);
   }
   if (has(ctx, TAV_PRINT_HEADERS))
   {
-    tav::inside::print::header(ctx, node.header);
+    header(ctx, node.header);
   }
   return has(ctx, TAV_PRINT_DATA) ? printData(ctx, node) : TAV_RC_OK;
 }
 
-uint32_t nodeText(TAVPrintCtx& ctx, TAVHeaderData& node, const Parts& parts)
-{
-  if (parts.open)
-  {
-    line(ctx, {elementEnumName(elmOf(node.header)), "\n"});
-    line(ctx, {"{\n"});
-  }
-  const uint32_t rc = parts.body ? printBody(ctx, node) : TAV_RC_OK;
-  if (rc == TAV_RC_OK && parts.close)
-  {
-    line(ctx, {"}\n"});
-  }
-  return rc;
-}
-
-/// The tags of a node that is one line, when the block has them ready.
-const ReadyTag* readyTag(const TAVPrintCtx& ctx, const TAVHeaderData& node, const Parts& parts)
-{
-  const bool oneLine = parts.open && parts.close && !has(ctx, TAV_PRINT_HEADERS);
-  return oneLine && ctx.pBlock != nullptr ? ctx.pBlock->tags.find(elmOf(node.header), ctx.depth) : nullptr;
-}
-
-void openXml(TAVPrintCtx& ctx, const TAVHeaderData& node, const Parts& parts)
-{
-  line(ctx, {"<", elementTagName(elmOf(node.header)), ">"});
-  if (!parts.close || has(ctx, TAV_PRINT_HEADERS))
-  {
-    piece(ctx, "\n");
-  }
-}
-
-void closeXml(TAVPrintCtx& ctx, const TAVHeaderData& node, const Parts& parts)
-{
-  const char* const tag = elementTagName(elmOf(node.header));
-  if (has(ctx, TAV_PRINT_HEADERS) || (!parts.open && !parts.body))
-  {
-    line(ctx, {"</", tag, ">\n"});
-  }
-  else
-  {
-    tavPrintf(&ctx, "</%s>\n", tag); // behind the value, on its line
-  }
-}
-
-uint32_t nodeXml(TAVPrintCtx& ctx, TAVHeaderData& node, const Parts& parts)
-{
-  const ReadyTag* const ready = readyTag(ctx, node, parts);
-  if (ready != nullptr)
-  {
-    ctx.pBlock->addReady(ready->opening, ready->openingLength);
-  }
-  else if (parts.open)
-  {
-    openXml(ctx, node, parts);
-  }
-  const uint32_t rc = parts.body ? printBody(ctx, node) : TAV_RC_OK;
-  if (rc != TAV_RC_OK || !parts.close)
-  {
-    return rc;
-  }
-  if (ready != nullptr)
-  {
-    ctx.pBlock->addReady(ready->closing, ready->closingLength);
-  }
-  else
-  {
-    closeXml(ctx, node, parts);
-  }
-  return rc;
-}
-
-uint32_t nodeAttributes(TAVPrintCtx& ctx, TAVHeaderData& node, const Parts& parts)
-{
-  const char* const tag = elementTagName(elmOf(node.header));
-  if (parts.open)
-  {
-    line(ctx, {"<", tag});
-  }
-  uint32_t rc = TAV_RC_OK;
-  if (parts.body)
-  {
-    tavPrintf(&ctx, " %s=", tag);
-    rc = tavPrintValue(&ctx, &node);
-  }
-  if (rc == TAV_RC_OK && parts.close)
-  {
-    piece(ctx, ">\n");
-  }
-  return rc;
-}
-
-uint32_t printParts(TAVPrintCtx& ctx, TAVHeaderData& node, const Parts& parts)
+void printClosing(TAVPrintCtx& ctx, uint16_t elm, const Asked& asked)
 {
   if (!has(ctx, TAV_PRINT_XML))
   {
-    return nodeText(ctx, node, parts);
+    line(ctx, {"}\n"});
   }
-  return ctx.attributeForm != 0 ? nodeAttributes(ctx, node, parts) : nodeXml(ctx, node, parts);
+  else if (ctx.attributeForm != 0)
+  {
+    piece(ctx, {">\n"});
+  }
+  else if (has(ctx, TAV_PRINT_HEADERS) || (!asked.open && !asked.body))
+  {
+    line(ctx, {"</", elementTagName(elm), ">\n"});
+  }
+  else
+  {
+    piece(ctx, {"</", elementTagName(elm), ">\n"}); // behind the value, on its line
+  }
+}
+
+uint32_t printParts(TAVPrintCtx& ctx, TAVHeaderData& node, const Asked& asked)
+{
+  if (asked.open)
+  {
+    printOpening(ctx, elmOf(node.header), asked);
+  }
+  const uint32_t rc = asked.body ? printBody(ctx, node) : TAV_RC_OK;
+  if (rc == TAV_RC_OK && asked.close)
+  {
+    printClosing(ctx, elmOf(node.header), asked);
+  }
+  return rc;
 }
 
 } // namespace

@@ -1,8 +1,10 @@
 #include <algorithm>
+#include <array>
 #include <cstdarg>
 #include <memory>
 #include <new>
 
+#include "api/digits.h"
 #include "api/printer.h"
 #include "kor/lineBuffered.h"
 
@@ -31,17 +33,16 @@ uint64_t putInBuffer(TAVPrintCtx& ctx, size_t blanks, std::string_view text)
 /// A stream that pads by itself takes blanks a few at a time.
 bool writeBlanks(FILE* stream, size_t blanks)
 {
-  constexpr size_t most = 512;
-  std::array<char, most> some;
+  std::array<char, 512> some;
   some.fill(' ');
-  while (blanks != 0)
+  size_t length = 0;
+  for (; blanks != 0; blanks -= length)
   {
-    const size_t length = std::min(blanks, most);
+    length = std::min(blanks, some.size());
     if (std::fwrite(some.data(), 1, length, stream) != length)
     {
       return false;
     }
-    blanks -= length;
   }
   return true;
 }
@@ -60,33 +61,25 @@ bool writeWhole(FILE* stream, std::string_view text)
 uint64_t tavPrintf(TAVPrintCtx* ctx, const char* format, ...)
 {
   std::array<char, kLongestLine> line;
-  std::unique_ptr<char[]> longer;
-  char* text = line.data();
   va_list arguments;
+  va_list again;
   va_start(arguments, format);
-  const int length = vsnprintf(text, line.size(), format, arguments);
-  va_end(arguments);
-  if (length >= static_cast<int>(line.size()))
+  va_copy(again, arguments);
+  const int length = vsnprintf(line.data(), line.size(), format, arguments);
+  const size_t needed = length < 0 ? 0 : static_cast<size_t>(length) + 1;
+  const std::unique_ptr<char[]> longer(needed > line.size() ? new (std::nothrow) char[needed] : nullptr);
+  char* const text = needed > line.size() ? longer.get() : line.data();
+  if (text == longer.get() && text != nullptr)
   {
-    longer.reset(new (std::nothrow) char[static_cast<size_t>(length) + 1]);
-    text = longer.get();
-    if (text != nullptr)
-    {
-      va_start(arguments, format);
-      vsnprintf(text, static_cast<size_t>(length) + 1, format, arguments);
-      va_end(arguments);
-    }
+    vsnprintf(text, needed, format, again);
   }
-  return text != nullptr && length >= 0 ? put(*ctx, 0, {text, static_cast<size_t>(length)}) : 0;
+  va_end(again);
+  va_end(arguments);
+  return text != nullptr && needed != 0 ? put(*ctx, 0, {text, needed - 1}) : 0;
 }
 
 namespace tav::inside::print
 {
-
-FILE* streamOf(const TAVPrintCtx& ctx)
-{
-  return ctx.pStream != nullptr ? ctx.pStream : stdout;
-}
 
 uint64_t putInStream(FILE* stream, size_t blanks, std::string_view text)
 {
@@ -99,31 +92,35 @@ uint64_t put(TAVPrintCtx& ctx, size_t blanks, std::string_view text)
   {
     return ctx.pBlock->add(blanks, text);
   }
-  const bool toBuffer = ctx.pStream == nullptr && ctx.pBuffer != nullptr;
-  const uint64_t count = toBuffer ? putInBuffer(ctx, blanks, text) : putInStream(streamOf(ctx), blanks, text);
+  const uint64_t count = isToBuffer(ctx) ? putInBuffer(ctx, blanks, text) : putInStream(streamOf(ctx), blanks, text);
   ctx.bytesWritten += count;
   return count;
 }
 
-void line(TAVPrintCtx& ctx, std::initializer_list<std::string_view> parts)
+void piece(TAVPrintCtx& ctx, Parts parts, size_t blanks)
+{
+  std::array<char, kLongestLine> text;
+  char* end = text.data();
+  for (const std::string_view part : parts)
+  {
+    const auto room = static_cast<size_t>(text.data() + text.size() - end);
+    end = std::copy_n(part.data(), std::min(part.size(), room), end);
+  }
+  put(ctx, blanks, {text.data(), static_cast<size_t>(end - text.data())});
+}
+
+void line(TAVPrintCtx& ctx, Parts parts)
 {
   if (!has(ctx, TAV_PRINT_XML)) // the depth stands before it, a piece of its own
   {
     constexpr size_t width = 4;
     std::array<char, digits::kLongest> depth;
-    char* end = digits::writeDecimal(depth.data(), static_cast<uint64_t>(ctx.depth));
-    *end++ = '|';
-    const auto length = static_cast<size_t>(end - depth.data());
+    char* const end = digits::writeDecimal(depth.data(), static_cast<uint64_t>(ctx.depth));
+    *end = '|';
+    const auto length = static_cast<size_t>(end + 1 - depth.data());
     put(ctx, width - std::min(length, width), {depth.data(), length});
   }
-  std::array<char, kLongestLine> text;
-  char* end = text.data();
-  for (const std::string_view part : parts)
-  {
-    const auto room = static_cast<size_t>(text.data() + text.size() - 1 - end);
-    end = std::copy_n(part.data(), std::min(part.size(), room), end);
-  }
-  put(ctx, static_cast<size_t>(ctx.depth * kBlanksPerLevel), {text.data(), static_cast<size_t>(end - text.data())});
+  piece(ctx, parts, static_cast<size_t>(ctx.depth * kBlanksPerLevel));
 }
 
 } // namespace tav::inside::print

@@ -13,8 +13,7 @@
 
 using namespace tav;
 using namespace tav::inside;
-using tav::inside::print::has;
-using tav::inside::print::OutputBlock;
+using namespace tav::inside::print;
 
 namespace
 {
@@ -23,9 +22,9 @@ namespace
 constexpr std::array<uint16_t, 3> kKeyedGroups{SQLM_ELM_DBASE, SQLM_ELM_NODE, TAV_ELM_CMN_HOST};
 constexpr std::array<uint16_t, 3> kKeyElements{SQLM_ELM_NODE_NUMBER, SQLM_ELM_DB_NAME, TAV_ELM_CMN_HOST_NAME};
 
-bool isAmong(const std::array<uint16_t, 3>& ids, uint16_t elm)
+bool isAmong(const std::array<uint16_t, 3>& ids, const TAVHeader& header)
 {
-  return std::find(ids.begin(), ids.end(), elm) != ids.end();
+  return std::find(ids.begin(), ids.end(), elmOf(header)) != ids.end();
 }
 
 /// Lets the output go on piece by piece: what the block holds goes out, and nothing is put into it any more.
@@ -47,157 +46,127 @@ uint32_t endNode(TAVPrintCtx& ctx)
   return block.stopped() ? TAV_RC_NO_MEMORY : TAV_RC_OK;
 }
 
-/// Prints parts of a node that must produce something.
-uint32_t printSome(TAVPrintCtx& ctx, TAVHeaderData& node, bool open, bool body, bool close)
+/// A walk below a group. Its steps return whether to go on; where not, the walk's code says why.
+class Walk
 {
-  uint64_t count = 0;
-  const uint32_t rc = tavPrintNode(&ctx, &node, open, body, close, &count);
-  if (rc != TAV_RC_OK)
+public:
+  Walk(TAVPrintCtx& ctx, TAVHandle& handle, TAVHdrStack& stack, const TAVHeader& start)
+      : ctx_(ctx), handle_(handle), stack_(stack), nodes_(start), keys_(start)
   {
-    return rc;
   }
-  if (count == 0)
-  {
-    return TAV_RC_NO_MEMORY;
-  }
-  return ctx.pBlock != nullptr ? endNode(ctx) : TAV_RC_OK;
-}
 
-/// The key elements of a group, each as an attribute.
-uint32_t printKeys(TAVPrintCtx& ctx, TAVHandle& handle, TAVHeader& group, ChildGuard& guard)
-{
-  std::array<TAVHeaderData, 2> slots{};
-  TAVHeader* previous = nullptr;
-  for (size_t current = 0;; current ^= 1U)
+  uint32_t run(const TAVHeader& start)
   {
-    TAVHeaderData& child = slots[current];
-    uint32_t rc = tavGetNextChild(0, &handle, &group, previous, &child);
-    if (rc == TAV_RC_NO_MORE_CHILDREN)
+    const OwnPairs pairs(handle_);
+    std::array<TAVHeaderData, 2> slots{};
+    TAVHeader passed{};
+    TAVHeader* previous = nullptr;
+    bool goesOn = enter(start);
+    for (size_t current = 0; goesOn && stack_.count != 0; current ^= 1U)
     {
-      return TAV_RC_OK;
+      if (printLeaves(ctx_, tags_, handle_, stack_.pEntries[stack_.count - 1], previous, nodes_, passed))
+      {
+        previous = &passed;
+      }
+      TAVHeaderData& child = slots[current];
+      const uint32_t rc = tavGetNextChild(0, &handle_, stack_.top(), previous, &child);
+      const bool inward = rc == TAV_RC_OK && isGroup(child.header);
+      goesOn = rc == TAV_RC_NO_MORE_CHILDREN
+                   ? leave(child)
+                   : isOk(rc) && visit(nodes_, child) && print(child) && (!inward || enter(child.header));
+      previous = inward ? nullptr : &child.header;
     }
-    if (rc == TAV_RC_OK && !guard.visit(child.header.nodeOffset))
-    {
-      rc = TAV_RC_OUTSIDE_PARENT;
-    }
-    if (rc == TAV_RC_OK && isAmong(kKeyElements, elmOf(child.header)))
-    {
-      rc = printSome(ctx, child, false, true, false);
-    }
-    if (rc != TAV_RC_OK)
-    {
-      return rc;
-    }
-    previous = &child.header;
+    return code_;
   }
-}
 
-/// A group's opening with its keys as attributes. Its children, the keys among them, are walked afterwards all the
-/// same.
-uint32_t printWithKeys(TAVPrintCtx& ctx, TAVHandle& handle, TAVHeaderData& group, ChildGuard& guard)
-{
-  ctx.attributeForm = 1;
-  uint32_t rc = printSome(ctx, group, true, false, false);
-  if (rc == TAV_RC_OK)
+private:
+  bool isOk(uint32_t code)
   {
-    rc = printKeys(ctx, handle, group.header, guard);
+    code_ = code;
+    return code == TAV_RC_OK;
   }
-  TAVHeaderData again{};
-  if (rc == TAV_RC_OK)
+
+  template<class Guard>
+  bool visit(Guard& guard, const TAVHeaderData& node)
+  {
+    return isOk(guard.visit(node.header.nodeOffset) ? TAV_RC_OK : TAV_RC_OUTSIDE_PARENT);
+  }
+
+  bool enter(const TAVHeader& group)
+  {
+    ++ctx_.depth;
+    return isOk(stack_.push(&group));
+  }
+
+  /// Leaves the innermost group and prints its closing; `closed` receives its header.
+  bool leave(TAVHeaderData& closed)
+  {
+    closed = {};
+    const uint32_t rc = stack_.pop(&closed.header);
+    --ctx_.depth;
+    return isOk(rc) && printSome(closed, false, false, true);
+  }
+
+  bool print(TAVHeaderData& child)
+  {
+    const bool group = isGroup(child.header);
+    const bool keyed = group && has(ctx_, TAV_PRINT_XML) && has(ctx_, TAV_PRINT_ATTRIBUTES) &&
+                       isAmong(kKeyedGroups, child.header);
+    return keyed ? printWithKeys(child) : printSome(child, true, true, !group);
+  }
+
+  /// Prints parts of a node that must produce something.
+  bool printSome(TAVHeaderData& node, bool open, bool body, bool close)
+  {
+    uint64_t count = 0;
+    return isOk(tavPrintNode(&ctx_, &node, open, body, close, &count)) &&
+           isOk(count != 0 ? TAV_RC_OK : TAV_RC_NO_MEMORY) && (ctx_.pBlock == nullptr || isOk(endNode(ctx_)));
+  }
+
+  /// A group's opening with its keys as attributes. Its children, the keys among them, are walked afterwards all the
+  /// same.
+  bool printWithKeys(TAVHeaderData& group)
   {
     const uint64_t width = is64(group.header) ? 0x1 : 0x2;
-    rc = tavFindNodeFromIndex(width, &handle, group.header.nodeOffset, 0, &again);
+    TAVHeaderData again{};
+    ctx_.attributeForm = 1;
+    const bool opened = printSome(group, true, false, false) && printKeys(group.header) &&
+                        isOk(tavFindNodeFromIndex(width, &handle_, group.header.nodeOffset, 0, &again)) &&
+                        printSome(again, false, false, true);
+    ctx_.attributeForm = 0;
+    return opened && (!has(ctx_, TAV_PRINT_HEADERS) || printSome(again, false, true, true));
   }
-  if (rc == TAV_RC_OK)
+
+  /// The key elements of a group, each as an attribute.
+  bool printKeys(TAVHeader& group)
   {
-    rc = printSome(ctx, again, false, false, true);
-  }
-  ctx.attributeForm = 0;
-  if (rc == TAV_RC_OK && has(ctx, TAV_PRINT_HEADERS))
-  {
-    rc = printSome(ctx, again, false, true, true);
-  }
-  return rc;
-}
-
-uint32_t printChild(TAVPrintCtx& ctx, TAVHandle& handle, TAVHeaderData& child, ChildGuard& keys)
-{
-  const bool group = isGroup(child.header);
-  const bool keyed = group && has(ctx, TAV_PRINT_XML) && has(ctx, TAV_PRINT_ATTRIBUTES) &&
-                     isAmong(kKeyedGroups, elmOf(child.header));
-  return keyed ? printWithKeys(ctx, handle, child, keys) : printSome(ctx, child, true, true, !group);
-}
-
-/// Leaves the innermost group and prints its closing; `closed` receives its header.
-uint32_t leaveGroup(TAVPrintCtx& ctx, TAVHdrStack& stack, TAVHeaderData& closed)
-{
-  closed = {};
-  const uint32_t rc = stack.pop(&closed.header);
-  --ctx.depth;
-  return rc == TAV_RC_OK ? printSome(ctx, closed, false, false, true) : rc;
-}
-
-uint32_t enterGroup(TAVPrintCtx& ctx, TAVHdrStack& stack, const TAVHeader& group)
-{
-  ++ctx.depth;
-  return stack.push(&group);
-}
-
-uint32_t walk(TAVPrintCtx& ctx, TAVHandle& handle, TAVHdrStack& stack)
-{
-  std::array<TAVHeaderData, 2> slots{};
-  TAVHeader* previous = nullptr;
-  TAVHeader passed{};
-  WalkGuard guard(stack.pEntries[0]);
-  ChildGuard keys(stack.pEntries[0]);
-  const OwnPairs pairs(handle);
-  for (size_t current = 0; stack.count != 0; current ^= 1U)
-  {
-    if (ctx.pBlock != nullptr &&
-        print::printLeaves(ctx, handle, stack.pEntries[stack.count - 1], previous, guard, passed))
+    std::array<TAVHeaderData, 2> slots{};
+    TAVHeader* previous = nullptr;
+    for (size_t current = 0;; current ^= 1U)
     {
-      previous = &passed;
-      if (ctx.pBlock->stopped())
+      TAVHeaderData& child = slots[current];
+      const uint32_t rc = tavGetNextChild(0, &handle_, &group, previous, &child);
+      if (rc == TAV_RC_NO_MORE_CHILDREN)
       {
-        return TAV_RC_NO_MEMORY;
+        return true;
       }
-    }
-    TAVHeaderData& child = slots[current];
-    uint32_t rc = tavGetNextChild(0, &handle, stack.top(), previous, &child);
-    previous = &child.header;
-    if (rc == TAV_RC_NO_MORE_CHILDREN)
-    {
-      rc = leaveGroup(ctx, stack, child);
-    }
-    else if (rc == TAV_RC_OK)
-    {
-      rc = guard.visit(child.header.nodeOffset) ? printChild(ctx, handle, child, keys) : TAV_RC_OUTSIDE_PARENT;
-      if (rc == TAV_RC_OK && isGroup(child.header))
+      if (!isOk(rc) || !visit(keys_, child) ||
+          (isAmong(kKeyElements, child.header) && !printSome(child, false, true, false)))
       {
-        rc = enterGroup(ctx, stack, child.header);
-        previous = nullptr;
+        return false;
       }
-    }
-    if (rc != TAV_RC_OK)
-    {
-      return rc;
+      previous = &child.header;
     }
   }
-  return TAV_RC_OK;
-}
 
-/// A walk whose output goes to a stream in blocks.
-uint32_t walkInBlocks(TAVPrintCtx& ctx, TAVHandle& handle, TAVHdrStack& stack)
-{
-  OutputBlock block(print::streamOf(ctx), ctx.bytesWritten);
-  ctx.pBlock = &block;
-  const uint32_t rc = walk(ctx, handle, stack);
-  if (ctx.pBlock != nullptr)
-  {
-    leaveBlock(ctx);
-  }
-  return block.stopped() ? TAV_RC_NO_MEMORY : rc;
-}
+  TAVPrintCtx& ctx_;
+  TAVHandle& handle_;
+  TAVHdrStack& stack_;
+  WalkGuard nodes_;
+  ChildGuard keys_;
+  ReadyTags tags_;
+  uint32_t code_ = TAV_RC_OK;
+};
 
 uint32_t printBelow(TAVPrintCtx& ctx, TAVHandle* handle, const TAVHeader& start)
 {
@@ -210,15 +179,18 @@ uint32_t printBelow(TAVPrintCtx& ctx, TAVHandle* handle, const TAVHeader& start)
   {
     return TAV_RC_NO_HDR_STACK;
   }
-  const uint32_t rc = enterGroup(ctx, *stack, start);
-  if (rc != TAV_RC_OK)
-  {
-    return rc;
-  }
-  const bool toBuffer = ctx.pStream == nullptr && ctx.pBuffer != nullptr;
+  Walk walk(ctx, *handle, *stack, start);
   // Which lines a line-buffered stream refuses can only be told when they go out one by one.
-  const bool alone = toBuffer || tracing() || kor::isLineBuffered(print::streamOf(ctx));
-  return alone ? walk(ctx, *handle, *stack) : walkInBlocks(ctx, *handle, *stack);
+  if (isToBuffer(ctx) || tracing() || kor::isLineBuffered(streamOf(ctx)))
+  {
+    return walk.run(start);
+  }
+  OutputBlock block(streamOf(ctx), ctx.bytesWritten);
+  ctx.pBlock = &block;
+  const uint32_t rc = walk.run(start);
+  block.handOver();
+  ctx.pBlock = nullptr;
+  return block.stopped() ? TAV_RC_NO_MEMORY : rc;
 }
 
 uint32_t printAll(TAVPrintCtx& ctx, TAVHandle* handle, TAVHeaderData& start)
@@ -237,13 +209,6 @@ uint32_t printAll(TAVPrintCtx& ctx, TAVHandle* handle, TAVHeaderData& start)
   return rc == TAV_RC_OK && below ? printBelow(ctx, handle, start.header) : rc;
 }
 
-TAVPrintCtx* makeContext(uint64_t options, const TAVHandle* handle, const TAVPrintParam& param)
-{
-  const uint8_t swapBytes = handle != nullptr ? handle->swapBytes : uint8_t{0};
-  return new (std::nothrow) TAVPrintCtx{param.pBuffer, param.bufferSize, param.pStream, 0, 0,
-                                        swapBytes, options, 0, 0, nullptr};
-}
-
 } // namespace
 
 uint32_t tavPrintSubtree(uint64_t options, TAVHandle* handle, TAVHeaderData* start, TAVPrintParam* param,
@@ -259,7 +224,9 @@ uint32_t tavPrintSubtree(uint64_t options, TAVHandle* handle, TAVHeaderData* sta
       frame.require(30, param != nullptr, TAV_RC_BAD_PARAM) &&
       (!fromRoot || frame.step(40, tavGetNextChild(0, handle, nullptr, nullptr, &first))))
   {
-    const std::unique_ptr<TAVPrintCtx> ctx(makeContext(options, handle, *param));
+    const uint8_t swapBytes = handle != nullptr ? handle->swapBytes : uint8_t{0};
+    const std::unique_ptr<TAVPrintCtx> ctx(new (std::nothrow) TAVPrintCtx{
+        param->pBuffer, param->bufferSize, param->pStream, 0, 0, swapBytes, options, 0, 0});
     if (frame.require(50, ctx != nullptr, TAV_RC_NO_MEMORY))
     {
       static_cast<void>(frame.step(60, printAll(*ctx, handle, fromRoot ? first : *start)));

@@ -10,12 +10,12 @@
 
 using namespace tav;
 using namespace tav::inside;
-using tav::inside::print::kUnboundedText;
-using tav::inside::print::shortPiece;
-using tav::inside::print::Value;
+using namespace tav::inside::print;
 
 namespace
 {
+
+constexpr uint64_t kUnboundedText = uint64_t{1} << 63U; ///< a text of this size ends at its NUL
 
 /// Characters up to a NUL or the size. Very many go in several pieces.
 void printString(TAVPrintCtx& ctx, const TAVHeaderData& node)
@@ -29,29 +29,24 @@ void printString(TAVPrintCtx& ctx, const TAVHeaderData& node)
   }
   do
   {
-    const uint64_t piece = std::min(length, longestPiece);
-    if (print::piece(ctx, {text, print::lengthOfText(text, piece)}) < piece)
+    const uint64_t some = std::min(length, longestPiece);
+    if (put(ctx, 0, {text, lengthOfText(text, some)}) < some)
     {
       return;
     }
-    text += piece;
-    length -= piece;
+    text += some;
+    length -= some;
   } while (length != 0);
 }
 
-void printHex(TAVPrintCtx& ctx, const Value& value)
+/// Prints units of a value, each a piece of its own that `write` puts at the place it is given.
+template<class Write>
+void printUnits(TAVPrintCtx& ctx, uint64_t size, uint64_t unit, const Write& write)
 {
-  for (uint64_t at = 0; at < value.size(); ++at)
+  for (uint64_t at = 0; at < size; at += unit)
   {
-    shortPiece(ctx, [&](char* to) { return digits::writeHex(to, value.byteAt(at)); });
-  }
-}
-
-void printWords(TAVPrintCtx& ctx, const Value& value)
-{
-  for (uint64_t at = 0; at < value.size(); at += sizeof(uint64_t))
-  {
-    shortPiece(ctx, [&](char* to) { return digits::writeDecimal(to, value.wordAt(at)); });
+    std::array<char, kLongestShort> place;
+    put(ctx, 0, {place.data(), static_cast<size_t>(write(place.data(), at) - place.data())});
   }
 }
 
@@ -61,17 +56,16 @@ void printByType(TAVPrintCtx& ctx, const TAVHeaderData& node, const Value& value
   switch (type)
   {
   case TAV_TYPE_ASCII_STRING:
-    printString(ctx, node);
-    break;
+    return printString(ctx, node);
   case TAV_TYPE_BINARY:
   case TAV_TYPE_UINT128:
-    printHex(ctx, value);
-    break;
+    return printUnits(ctx, value.size(), 1,
+                      [&](char* to, uint64_t at) { return digits::writeHex(to, value.byteAt(at)); });
   case TAV_TYPE_UINT64_ARRAY:
-    printWords(ctx, value);
-    break;
+    return printUnits(ctx, value.size(), sizeof(uint64_t),
+                      [&](char* to, uint64_t at) { return digits::writeDecimal(to, value.wordAt(at)); });
   default:
-    shortPiece(ctx, [&](char* to) { return print::writeShort(to, type, value); });
+    return printUnits(ctx, 1, 1, [&](char* to, uint64_t /*at*/) { return writeShort(to, type, value); });
   }
 }
 
@@ -81,6 +75,17 @@ bool hasItsBytes(const TAVHeaderData& node)
   const uint64_t size = sizeOf(node.header);
   const bool openText = typeOf(node.header) == TAV_TYPE_ASCII_STRING && size >= kUnboundedText;
   return node.dataBufSize == 0 || size <= node.dataBufSize || openText;
+}
+
+bool isPrintable(uint16_t type)
+{
+  return typeInfo(type).known && type != TAV_TYPE_UTF8_STRING && type != TAV_TYPE_SINT128;
+}
+
+bool isSizeOfType(uint16_t type, uint64_t size)
+{
+  const uint8_t exact = typeInfo(type).valueSize;
+  return (exact == 0 || size == exact) && (type != TAV_TYPE_UINT64_ARRAY || size % 8 == 0);
 }
 
 } // namespace
@@ -99,8 +104,8 @@ uint32_t tavPrintValue(TAVPrintCtx* ctx, TAVHeaderData* node)
   const uint16_t type = typeOf(node->header);
   const Value value(type, node->pDataBuf, sizeOf(node->header), ctx->swapBytes != 0);
   if (frame.require(50, value.fits(), TAV_RC_OUTSIDE_PARENT) &&
-      frame.require(60, print::isPrintable(type), TAV_RC_NOT_SUPPORTED) &&
-      frame.require(70, print::isSizeOfType(type, value.size()), TAV_RC_OUTSIDE_PARENT))
+      frame.require(60, isPrintable(type), TAV_RC_NOT_SUPPORTED) &&
+      frame.require(70, isSizeOfType(type, value.size()), TAV_RC_OUTSIDE_PARENT))
   {
     printByType(*ctx, *node, value);
     frame.dump(100, ctx->bytesWritten);

@@ -1,10 +1,10 @@
 /// One value: its bytes in host order, and its characters where they are one short piece.
 #pragma once
 
-#include <algorithm>
 #include <array>
 #include <cstdint>
 #include <cstring>
+#include <utility>
 
 #include "api/digits.h"
 #include "format/layout.h"
@@ -13,7 +13,7 @@
 namespace tav::inside::print
 {
 
-inline constexpr uint64_t kUnboundedText = uint64_t{1} << 63U; ///< a text of this size ends at its NUL
+inline constexpr size_t kLongestShort = 64; ///< room for a value of a type that has one size
 
 /// A value in host order: its first bytes reversed where the stream is in the other order.
 class Value
@@ -70,17 +70,6 @@ private:
   std::array<uint8_t, 16> first_{};
 };
 
-inline bool isPrintable(uint16_t type)
-{
-  return typeInfo(type).known && type != TAV_TYPE_UTF8_STRING && type != TAV_TYPE_SINT128;
-}
-
-inline bool isSizeOfType(uint16_t type, uint64_t size)
-{
-  const uint8_t exact = typeInfo(type).valueSize;
-  return (exact == 0 || size == exact) && (type != TAV_TYPE_UINT64_ARRAY || size % 8 == 0);
-}
-
 /// The characters before a NUL, all when there is none.
 inline uint64_t lengthOfText(const char* text, uint64_t size)
 {
@@ -88,23 +77,18 @@ inline uint64_t lengthOfText(const char* text, uint64_t size)
   return nul != nullptr ? static_cast<uint64_t>(static_cast<const char*>(nul) - text) : size;
 }
 
-/// A part of a date that has two digits, behind a mark.
-inline char* writePart(char* to, char mark, uint16_t number)
-{
-  *to = mark;
-  return digits::writeTwo(to + 1, number);
-}
-
 [[gnu::noinline]] inline char* writeTimestamp(char* to, const TAVTimeStamp& timestamp)
 {
   TAVDate date{};
   tavTimeStampToDateInt(timestamp, &date);
   to = digits::writePadded(to, date.year, 4);
-  to = writePart(to, '-', date.month);
-  to = writePart(to, '-', date.day);
-  to = writePart(to, '-', date.hour);
-  to = writePart(to, '.', date.minute);
-  to = writePart(to, '.', date.second);
+  const std::pair<char, uint16_t> parts[] = {
+      {'-', date.month}, {'-', date.day}, {'-', date.hour}, {'.', date.minute}, {'.', date.second}};
+  for (const auto& [mark, number] : parts)
+  {
+    *to = mark;
+    to = digits::writeTwo(to + 1, number);
+  }
   *to = '.';
   to = digits::writePadded(to + 1, date.fractionA / 1000 + date.fractionB, 6);
   return digits::writePadded(to, timestamp.offsetMinutes, 4);
