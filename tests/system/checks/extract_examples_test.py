@@ -5,7 +5,7 @@ import tempfile
 import unittest
 
 ROOT = pathlib.Path(__file__).resolve().parents[3]
-SPEC = importlib.util.spec_from_file_location("extract_examples", ROOT / "tests" / "docs" / "extract_examples.py")
+SPEC = importlib.util.spec_from_file_location("extract_examples", ROOT / "tests" / "system" / "docs" / "extract_examples.py")
 extract_examples = importlib.util.module_from_spec(SPEC)
 SPEC.loader.exec_module(extract_examples)
 
