@@ -11,9 +11,6 @@ namespace tav::inside::print
 
 inline constexpr int64_t kBlanksPerLevel = 3;
 
-/// Gives a stream one piece: blanks, then a text. Returns the characters that count, none when it refuses any.
-uint64_t putInStream(FILE* stream, size_t blanks, std::string_view text);
-
 /// Collects pieces and hands them to the stream together. What a stream then refuses is settled as if every piece had
 /// gone to it alone: a refused piece does not count, the next is tried, and a node of which no piece is taken ends the
 /// output.

@@ -28,25 +28,25 @@ bool isCommon(const HeaderFields& fields)
                         : fields.type == TAV_TYPE_ASCII_STRING && fields.size != 0 && fields.size <= kLongestText;
 }
 
-char* copy(char* to, std::string_view text)
-{
-  return std::copy(text.begin(), text.end(), to);
-}
-
 [[gnu::noinline]] bool make(ReadyTag& tag, uint32_t key, uint16_t elm, int64_t depth)
 {
   const std::string_view name = elementTagName(elm);
   const size_t blanks = static_cast<size_t>(depth) * kBlanksPerLevel;
-  if (blanks + name.size() + 2 > tag.opening.size() || name.size() + 4 > tag.closing.size())
+  const size_t opening = blanks + name.size() + 2;
+  const size_t closing = name.size() + 4;
+  if (opening > ReadyTag::kLongestOpening || closing > ReadyTag::kLongestClosing)
   {
     return false;
   }
-  tag = {};
   tag.key = key;
-  char* const opened = copy(copy(copy(std::fill_n(tag.opening.data(), blanks, ' '), "<"), name), ">");
-  tag.openingLength = static_cast<uint32_t>(opened - tag.opening.data());
-  char* const closed = copy(copy(copy(tag.closing.data(), "</"), name), ">\n");
-  tag.closingLength = static_cast<uint32_t>(closed - tag.closing.data());
+  tag.openingLength = static_cast<uint32_t>(opening);
+  tag.closingLength = static_cast<uint32_t>(closing);
+  char* end = std::fill_n(tag.text.data(), blanks, ' ');
+  for (const std::string_view part :
+       {std::string_view("<"), name, std::string_view("></"), name, std::string_view(">\n")})
+  {
+    end = std::copy(part.begin(), part.end(), end);
+  }
   return true;
 }
 
@@ -72,14 +72,14 @@ template<bool swap>
 [[gnu::always_inline]] inline void printLeaf(OutputBlock& block, const ReadyTag& tag, const HeaderFields& fields,
                                              const uint8_t* data)
 {
-  constexpr size_t room = sizeof tag.opening + kLongestShort + sizeof tag.closing;
+  constexpr size_t room = sizeof tag.text + kLongestShort;
   const bool isText = fields.type == TAV_TYPE_ASCII_STRING;
   char* const line = block.reserve(isText ? room + kLongestText : room);
-  std::memcpy(line, tag.opening.data(), tag.opening.size());
+  std::memcpy(line, tag.text.data(), ReadyTag::kLongestOpening);
   char* const from = line + tag.openingLength;
   char* const to = isText ? writeText(from, data, fields.size)
-                          : writeShort(from, fields.type, Value(fields.type, data, fields.size, swap));
-  std::memcpy(to, tag.closing.data(), tag.closing.size());
+                          : writeShort(from, fields.type, data, swap);
+  std::memcpy(to, tag.text.data() + tag.openingLength, ReadyTag::kLongestClosing);
   block.endPieces({tag.openingLength, static_cast<size_t>(to - from), tag.closingLength});
   block.endNode();
 }

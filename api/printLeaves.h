@@ -7,14 +7,16 @@
 namespace tav::inside::print
 {
 
-/// Opening and closing of a data element that stands on one line, ready to be copied.
+/// Opening, with its indentation, and closing of a data element that stands on one line, ready to be copied.
 struct ReadyTag
 {
+  static constexpr size_t kLongestOpening = 96;
+  static constexpr size_t kLongestClosing = 64;
+
   uint32_t key = ~uint32_t{0}; ///< depth and element id
   uint32_t openingLength;
   uint32_t closingLength;
-  std::array<char, 96> opening; ///< with its indentation
-  std::array<char, 64> closing;
+  std::array<char, kLongestOpening + kLongestClosing> text; ///< both, one behind the other
 };
 
 /// The tags that a walk has seen last. Siblings have ids close to each other, so the id's low bits choose the place.

@@ -1,6 +1,8 @@
+/// Where pieces go: the caller's buffer, a stream, or a block on its way to one.
 #include <algorithm>
 #include <array>
 #include <cstdarg>
+#include <cstring>
 #include <memory>
 #include <new>
 
@@ -56,6 +58,12 @@ bool writeWhole(FILE* stream, std::string_view text)
              : std::fwrite(text.data(), 1, text.size(), stream) == text.size();
 }
 
+/// Gives a stream a piece, of which none counts when it refuses any.
+uint64_t putInStream(FILE* stream, size_t blanks, std::string_view text)
+{
+  return writeBlanks(stream, blanks) && writeWhole(stream, text) ? blanks + text.size() : 0;
+}
+
 } // namespace
 
 uint64_t tavPrintf(TAVPrintCtx* ctx, const char* format, ...)
@@ -66,25 +74,20 @@ uint64_t tavPrintf(TAVPrintCtx* ctx, const char* format, ...)
   va_start(arguments, format);
   va_copy(again, arguments);
   const int length = vsnprintf(line.data(), line.size(), format, arguments);
-  const size_t needed = length < 0 ? 0 : static_cast<size_t>(length) + 1;
-  const std::unique_ptr<char[]> longer(needed > line.size() ? new (std::nothrow) char[needed] : nullptr);
-  char* const text = needed > line.size() ? longer.get() : line.data();
-  if (text == longer.get() && text != nullptr)
+  const size_t room = length < 0 ? 0 : static_cast<size_t>(length) + 1;
+  const std::unique_ptr<char[]> longer(room > line.size() ? new (std::nothrow) char[room] : nullptr);
+  if (longer != nullptr)
   {
-    vsnprintf(text, needed, format, again);
+    vsnprintf(longer.get(), room, format, again);
   }
   va_end(again);
   va_end(arguments);
-  return text != nullptr && needed != 0 ? put(*ctx, 0, {text, needed - 1}) : 0;
+  const char* const text = room > line.size() ? longer.get() : line.data();
+  return text != nullptr && room != 0 ? put(*ctx, 0, {text, room - 1}) : 0;
 }
 
 namespace tav::inside::print
 {
-
-uint64_t putInStream(FILE* stream, size_t blanks, std::string_view text)
-{
-  return writeBlanks(stream, blanks) && writeWhole(stream, text) ? blanks + text.size() : 0;
-}
 
 uint64_t put(TAVPrintCtx& ctx, size_t blanks, std::string_view text)
 {
@@ -121,6 +124,68 @@ void line(TAVPrintCtx& ctx, Parts parts)
     put(ctx, width - std::min(length, width), {depth.data(), length});
   }
   piece(ctx, parts, static_cast<size_t>(ctx.depth * kBlanksPerLevel));
+}
+
+uint64_t OutputBlock::add(size_t blanks, std::string_view text)
+{
+  const size_t length = blanks + text.size();
+  if (length > kSize) [[unlikely]]
+  {
+    handOver();
+    const uint64_t taken = stopped_ ? 0 : putInStream(stream_, blanks, text);
+    taken_ += taken;
+    total_ += taken;
+    return taken;
+  }
+  if (length != 0)
+  {
+    char* const place = reserve(length);
+    std::memset(place, ' ', blanks);
+    std::memcpy(place + blanks, text.data(), text.size());
+    endPieces({length});
+  }
+  return length;
+}
+
+void OutputBlock::handOver()
+{
+  const size_t taken = stopped_ ? 0 : std::fwrite(text_.data(), 1, used_, stream_);
+  if (taken == used_)
+  {
+    taken_ = nodeStart_ != 0 ? used_ - nodeStart_ : taken_ + used_;
+  }
+  else
+  {
+    total_ -= used_ - settle(taken);
+  }
+  used_ = 0;
+  endCount_ = 0;
+  nodeStart_ = 0;
+}
+
+/// What counts of a block of which the stream took only the first bytes. The piece that it stopped in is refused; those
+/// behind it are tried one by one.
+uint64_t OutputBlock::settle(size_t taken)
+{
+  uint64_t counted = 0;
+  size_t start = 0;
+  for (size_t at = 0; at < endCount_ && !stopped_; ++at)
+  {
+    const size_t end = ends_[at] & ~kNodeEnd;
+    const size_t length = end - start;
+    if (end <= taken || (start > taken && std::fwrite(text_.data() + start, 1, length, stream_) == length))
+    {
+      counted += length;
+      taken_ += length;
+    }
+    if ((ends_[at] & kNodeEnd) != 0)
+    {
+      stopped_ = taken_ == 0;
+      taken_ = 0;
+    }
+    start = end;
+  }
+  return counted;
 }
 
 } // namespace tav::inside::print

@@ -27,13 +27,6 @@ bool isAmong(const std::array<uint16_t, 3>& ids, const TAVHeader& header)
   return std::find(ids.begin(), ids.end(), elmOf(header)) != ids.end();
 }
 
-/// Lets the output go on piece by piece: what the block holds goes out, and nothing is put into it any more.
-void leaveBlock(TAVPrintCtx& ctx)
-{
-  ctx.pBlock->handOver();
-  ctx.pBlock = nullptr;
-}
-
 /// Ends a node in the block. A trace that has begun may go where the output goes: then nothing is held back.
 uint32_t endNode(TAVPrintCtx& ctx)
 {
@@ -41,7 +34,8 @@ uint32_t endNode(TAVPrintCtx& ctx)
   block.endNode();
   if (tracing()) [[unlikely]]
   {
-    leaveBlock(ctx);
+    block.handOver();
+    ctx.pBlock = nullptr;
   }
   return block.stopped() ? TAV_RC_NO_MEMORY : TAV_RC_OK;
 }

@@ -50,22 +50,28 @@ void printUnits(TAVPrintCtx& ctx, uint64_t size, uint64_t unit, const Write& wri
   }
 }
 
-void printByType(TAVPrintCtx& ctx, const TAVHeaderData& node, const Value& value)
+void printByType(TAVPrintCtx& ctx, const TAVHeaderData& node)
 {
   const uint16_t type = typeOf(node.header);
+  const uint64_t size = sizeOf(node.header);
+  const uint8_t* const bytes = node.pDataBuf;
+  const bool swap = ctx.swapBytes != 0;
+  const uint64_t reversed = swap ? swappedPrefix(typeInfo(type).swapRule, size) : 0;
   switch (type)
   {
   case TAV_TYPE_ASCII_STRING:
     return printString(ctx, node);
   case TAV_TYPE_BINARY:
   case TAV_TYPE_UINT128:
-    return printUnits(ctx, value.size(), 1,
-                      [&](char* to, uint64_t at) { return digits::writeHex(to, value.byteAt(at)); });
+    return printUnits(ctx, size, 1, [&](char* to, uint64_t at) {
+      return digits::writeHex(to, bytes[at < reversed ? reversed - 1 - at : at]);
+    });
   case TAV_TYPE_UINT64_ARRAY:
-    return printUnits(ctx, value.size(), sizeof(uint64_t),
-                      [&](char* to, uint64_t at) { return digits::writeDecimal(to, value.wordAt(at)); });
+    return printUnits(ctx, size, sizeof(uint64_t), [&](char* to, uint64_t at) {
+      return digits::writeDecimal(to, valueAt<uint64_t>(bytes + at, swap));
+    });
   default:
-    return printUnits(ctx, 1, 1, [&](char* to, uint64_t /*at*/) { return writeShort(to, type, value); });
+    return printUnits(ctx, 1, 1, [&](char* to, uint64_t /*at*/) { return writeShort(to, type, bytes, swap); });
   }
 }
 
@@ -77,15 +83,10 @@ bool hasItsBytes(const TAVHeaderData& node)
   return node.dataBufSize == 0 || size <= node.dataBufSize || openText;
 }
 
-bool isPrintable(uint16_t type)
+/// Whether the size holds what is reversed.
+bool isReversible(const TypeInfo& type, uint64_t size)
 {
-  return typeInfo(type).known && type != TAV_TYPE_UTF8_STRING && type != TAV_TYPE_SINT128;
-}
-
-bool isSizeOfType(uint16_t type, uint64_t size)
-{
-  const uint8_t exact = typeInfo(type).valueSize;
-  return (exact == 0 || size == exact) && (type != TAV_TYPE_UINT64_ARRAY || size % 8 == 0);
+  return type.swapRule == SwapRule::all64 ? size % 8 == 0 : size >= swapUnitLength(type.swapRule);
 }
 
 } // namespace
@@ -101,13 +102,15 @@ uint32_t tavPrintValue(TAVPrintCtx* ctx, TAVHeaderData* node)
   {
     return frame.code();
   }
-  const uint16_t type = typeOf(node->header);
-  const Value value(type, node->pDataBuf, sizeOf(node->header), ctx->swapBytes != 0);
-  if (frame.require(50, value.fits(), TAV_RC_OUTSIDE_PARENT) &&
-      frame.require(60, isPrintable(type), TAV_RC_NOT_SUPPORTED) &&
-      frame.require(70, isSizeOfType(type, value.size()), TAV_RC_OUTSIDE_PARENT))
+  const uint16_t code = typeOf(node->header);
+  const TypeInfo& type = typeInfo(code);
+  const uint64_t size = sizeOf(node->header);
+  const bool printable = type.known && code != TAV_TYPE_UTF8_STRING && code != TAV_TYPE_SINT128;
+  const bool ofType = code == TAV_TYPE_UINT64_ARRAY ? size % 8 == 0 : type.valueSize == 0 || size == type.valueSize;
+  if (frame.require(50, ctx->swapBytes == 0 || isReversible(type, size), TAV_RC_OUTSIDE_PARENT) &&
+      frame.require(60, printable, TAV_RC_NOT_SUPPORTED) && frame.require(70, ofType, TAV_RC_OUTSIDE_PARENT))
   {
-    printByType(*ctx, *node, value);
+    printByType(*ctx, *node);
     frame.dump(100, ctx->bytesWritten);
   }
   return frame.code();

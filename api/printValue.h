@@ -1,9 +1,9 @@
-/// One value: its bytes in host order, and its characters where they are one short piece.
+/// A value in host order, and its characters where they are one short piece.
 #pragma once
 
-#include <array>
 #include <cstdint>
 #include <cstring>
+#include <type_traits>
 #include <utility>
 
 #include "api/digits.h"
@@ -15,60 +15,22 @@ namespace tav::inside::print
 
 inline constexpr size_t kLongestShort = 64; ///< room for a value of a type that has one size
 
-/// A value in host order: its first bytes reversed where the stream is in the other order.
-class Value
+/// A value of one size, or a unit of an array, from the bytes of a stream; `swap`: they are in the other order.
+template<class Value>
+[[gnu::always_inline]] inline Value valueAt(const uint8_t* bytes, bool swap)
 {
-public:
-  Value(uint16_t type, const uint8_t* bytes, uint64_t size, bool swap)
-      : bytes_(bytes), size_(size), rule_(typeInfo(type).swapRule), swap_(swap)
+  constexpr SwapRule rule = std::is_same_v<Value, TAVTimeStamp> ? SwapRule::timestamp : SwapRule::one64;
+  Value value;
+  if (swap)
   {
-    if (swap && rule_ != SwapRule::all64 && fits())
-    {
-      reversed_ = swappedPrefix(rule_, size_);
-      swapPayload(rule_, bytes_, first_.data(), reversed_);
-    }
+    swapPayload(rule, bytes, reinterpret_cast<uint8_t*>(&value), sizeof value);
   }
-
-  /// Whether the size holds what is reversed.
-  [[nodiscard]] bool fits() const
+  else
   {
-    return !swap_ || (rule_ == SwapRule::all64 ? size_ % 8 == 0 : size_ >= swapUnitLength(rule_));
+    std::memcpy(&value, bytes, sizeof value);
   }
-
-  [[nodiscard]] uint64_t size() const
-  {
-    return size_;
-  }
-
-  [[nodiscard]] uint8_t byteAt(uint64_t at) const
-  {
-    return at < reversed_ ? first_[at] : bytes_[at];
-  }
-
-  template<class Number>
-  [[nodiscard]] Number as() const
-  {
-    Number number;
-    std::memcpy(&number, reversed_ != 0 ? first_.data() : bytes_, sizeof number);
-    return number;
-  }
-
-  /// A unit of an array.
-  [[nodiscard]] uint64_t wordAt(uint64_t at) const
-  {
-    uint64_t word = 0;
-    std::memcpy(&word, bytes_ + at, sizeof word);
-    return swap_ ? kor::byteswap64(word) : word;
-  }
-
-private:
-  const uint8_t* bytes_;
-  uint64_t size_;
-  SwapRule rule_;
-  bool swap_;
-  uint64_t reversed_ = 0;
-  std::array<uint8_t, 16> first_{};
-};
+  return value;
+}
 
 /// The characters before a NUL, all when there is none.
 inline uint64_t lengthOfText(const char* text, uint64_t size)
@@ -94,32 +56,32 @@ inline uint64_t lengthOfText(const char* text, uint64_t size)
   return digits::writePadded(to, timestamp.offsetMinutes, 4);
 }
 
-/// Writes a value of a type that has one size, which is the value's too; returns its end. What is overwritten behind it
+/// Writes a value of a type that has one size from its bytes; returns its end. What is overwritten behind it
 /// is still within kLongestShort.
-[[gnu::always_inline]] inline char* writeShort(char* to, uint16_t type, const Value& value)
+[[gnu::always_inline]] inline char* writeShort(char* to, uint16_t type, const uint8_t* bytes, bool swap)
 {
   switch (type)
   {
   case TAV_TYPE_UINT8:
-    return digits::writeHex(to, value.byteAt(0));
+    return digits::writeHex(to, *bytes);
   case TAV_TYPE_SINT8:
   case TAV_TYPE_BYTE:
-    *to = static_cast<char>(value.byteAt(0)); // whatever it is: a NUL too
+    *to = static_cast<char>(*bytes); // whatever it is: a NUL too
     return to + 1;
   case TAV_TYPE_UINT16:
-    return digits::writeDecimal(to, value.as<uint16_t>());
+    return digits::writeDecimal(to, valueAt<uint16_t>(bytes, swap));
   case TAV_TYPE_SINT16:
-    return digits::writeSigned(to, value.as<int16_t>());
+    return digits::writeSigned(to, valueAt<int16_t>(bytes, swap));
   case TAV_TYPE_UINT32:
-    return digits::writeDecimal(to, value.as<uint32_t>());
+    return digits::writeDecimal(to, valueAt<uint32_t>(bytes, swap));
   case TAV_TYPE_SINT32:
-    return digits::writeSigned(to, value.as<int32_t>());
+    return digits::writeSigned(to, valueAt<int32_t>(bytes, swap));
   case TAV_TYPE_UINT64:
-    return digits::writeDecimal(to, value.as<uint64_t>());
+    return digits::writeDecimal(to, valueAt<uint64_t>(bytes, swap));
   case TAV_TYPE_SINT64:
-    return digits::writeSigned(to, value.as<int64_t>());
+    return digits::writeSigned(to, valueAt<int64_t>(bytes, swap));
   default:
-    return writeTimestamp(to, value.as<TAVTimeStamp>());
+    return writeTimestamp(to, valueAt<TAVTimeStamp>(bytes, swap));
   }
 }
 
