@@ -10,7 +10,7 @@
 
 #include <gtest/gtest.h>
 
-#include "api/dataBuffer.h"
+#include "api/uncalledOperations.h"
 #include "support/byteRows.h"
 #include "support/streams.h"
 #include "tav/tav.h"

@@ -30,17 +30,18 @@ LEAST = 0.95
 
 GROUPS = {
     "reader": [
-        "api/reader.cpp", "api/navigation.cpp", "api/nodeStep.h", "api/fetch.cpp", "api/fetch.h", "api/search.cpp",
-        "api/logicalGroup.cpp", "api/nodeFromIndex.cpp", "api/previousNode.cpp", "api/eyeScan.cpp",
-        "api/dataBuffer.cpp", "api/validation.cpp", "api/walkGuard.h",
+        "api/readNode.cpp", "api/stepForward.cpp", "core/node.h", "core/step.h", "api/fetchBytes.cpp",
+        "api/fetchBytes.h", "api/findElement.cpp", "api/findLogicalGroup.cpp", "api/findNodeFromIndex.cpp",
+        "api/stepBack.cpp", "api/findEyeCatcher.cpp", "api/uncalledOperations.cpp", "api/validateSubtree.cpp",
+        "api/walkGuard.h",
     ],
     "ring": [
         "storage/circularBuf.cpp", "storage/circularFill.cpp", "storage/circularRelease.cpp", "storage/cachedRun.cpp",
         "storage/cachedRun.h",
     ],
     "writer": [
-        "api/writer.cpp", "api/writerStrings.cpp", "api/rawWrite.cpp", "api/rawWrite.h", "api/closing.cpp",
-        "api/update.cpp",
+        "api/addNode.cpp", "api/addString.cpp", "api/rawWrite.cpp", "api/rawWrite.h", "api/closeGroup.cpp",
+        "api/updateElement.cpp",
     ],
 }
 # The test programs, in the order in which they are likely to notice, without the few tests that take seconds each.

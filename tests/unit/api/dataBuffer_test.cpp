@@ -1,4 +1,4 @@
-#include "api/dataBuffer.h"
+#include "api/uncalledOperations.h"
 
 #include <cstdint>
 #include <memory>

@@ -2,7 +2,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
-#include "api/fetch.h"
+#include "api/fetchBytes.h"
 #include "api/rawWrite.h"
 #include "storage/ringFixture.h"
 #include "support/streams.h"

@@ -1,5 +1,5 @@
 /// Judging nodes past the ring.
-#include "api/peek.h"
+#include "api/peekNode.h"
 
 #include <algorithm>
 #include <cstdint>

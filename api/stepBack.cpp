@@ -1,7 +1,7 @@
 /// Walking backward.
 #include <algorithm>
 
-#include "api/fetch.h"
+#include "api/fetchBytes.h"
 #include "api/rawWrite.h"
 #include "format/layout.h"
 #include "tav/probes.h"

@@ -1,5 +1,5 @@
 /// The exported step to the next child.
-#include "api/nextChild.h"
+#include "api/stepToChild.h"
 
 using namespace tav;
 using namespace tav::inside;

@@ -1,14 +1,14 @@
 /// The sibling of a group that was never closed.
-#include "api/openGroup.h"
+#include "api/stepPastOpenGroup.h"
 
 #include <algorithm>
 #include <array>
 #include <bit>
 
-#include "api/fetch.h"
-#include "api/nodeFromIndex.h"
+#include "api/fetchBytes.h"
+#include "api/findNodeFromIndex.h"
 #include "api/ownedHandle.h"
-#include "api/peek.h"
+#include "api/peekNode.h"
 #include "api/rawWrite.h"
 #include "core/fastWay.h"
 

@@ -1,7 +1,7 @@
 /// Following a path of groups.
+#include "api/findElement.h"
 #include "api/ownedHandle.h"
 #include "api/rawWrite.h"
-#include "api/search.h"
 #include "api/walkGuard.h"
 #include "format/layout.h"
 #include "tav/probes.h"

@@ -3,8 +3,8 @@
 #include <memory>
 #include <new>
 
+#include "api/findElement.h"
 #include "api/rawWrite.h"
-#include "api/search.h"
 #include "core/stack.h"
 #include "core/step.h"
 #include "tav/probes.h"

@@ -1,4 +1,4 @@
-#include "api/fetch.h"
+#include "api/fetchBytes.h"
 
 #include <algorithm>
 

@@ -1,7 +1,7 @@
 /// Walking forward: first children and siblings.
-#include "api/nextChild.h"
-#include "api/openGroup.h"
 #include "api/ownedHandle.h"
+#include "api/stepPastOpenGroup.h"
+#include "api/stepToChild.h"
 #include "tav/probes.h"
 #include "trace/traceFrame.h"
 

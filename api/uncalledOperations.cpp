@@ -1,8 +1,8 @@
-#include "api/dataBuffer.h"
+#include "api/uncalledOperations.h"
 
 #include <algorithm>
 
-#include "api/fetch.h"
+#include "api/fetchBytes.h"
 #include "api/rawWrite.h"
 #include "format/layout.h"
 #include "tav/probes.h"

@@ -2,7 +2,7 @@
 #include <algorithm>
 #include <array>
 
-#include "api/fetch.h"
+#include "api/fetchBytes.h"
 #include "api/rawWrite.h"
 #include "format/eyeMatcher.h"
 #include "format/layout.h"

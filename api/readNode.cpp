@@ -2,7 +2,7 @@
 #include <algorithm>
 #include <array>
 
-#include "api/fetch.h"
+#include "api/fetchBytes.h"
 #include "core/step.h"
 #include "tav/probes.h"
 #include "trace/traceFrame.h"

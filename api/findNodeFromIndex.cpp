@@ -1,8 +1,8 @@
 /// Finding a node from an arbitrary offset.
-#include "api/nodeFromIndex.h"
+#include "api/findNodeFromIndex.h"
 
 #include "api/ownedHandle.h"
-#include "api/peek.h"
+#include "api/peekNode.h"
 #include "api/rawWrite.h"
 #include "format/layout.h"
 #include "tav/probes.h"

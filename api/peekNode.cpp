@@ -1,10 +1,10 @@
-#include "api/peek.h"
+#include "api/peekNode.h"
 
 #include <algorithm>
 #include <array>
 #include <cstring>
 
-#include "api/fetch.h"
+#include "api/fetchBytes.h"
 #include "api/rawWrite.h"
 #include "core/fastWay.h"
 #include "tav/probes.h"
