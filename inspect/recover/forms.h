@@ -1,4 +1,4 @@
-/// @file recoveryForms.h
+/// @file forms.h
 /// Recovers a file in the form that brings back most of it.
 #pragma once
 

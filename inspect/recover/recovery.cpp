@@ -1,67 +1,38 @@
 #include "inspect/recover/recovery.h"
 
 #include <algorithm>
+#include <utility>
 
-#include "tav/inspect/problem.hpp"
+#include "inspect/recover/endings.h"
 
 namespace tav::inspect
 {
 
 using namespace tav::layout;
 
-namespace
-{
-
-constexpr uint64_t kMostNested = 4000; ///< groups that the library follows
-
-TAVHeader madeHeader(bool wideHeader, bool wideChildren, bool eye)
-{
-  TAVHeader header{};
-  const uint16_t type = wideChildren ? TAV_TYPE_HEADER64 : TAV_TYPE_HEADER32;
-  header.hdrType = wideHeader ? TAV_HDR_64 : TAV_HDR_32;
-  if (wideHeader)
-  {
-    header.hdr64 = {0, eye ? TAV_INFO_EYE_SIZE : 0, type, TAV_ELM_CMN_DOC_ROOT};
-  }
-  else
-  {
-    header.hdr32 = {0, type, TAV_ELM_CMN_DOC_ROOT};
-  }
-  return header;
-}
-
-} // namespace
-
 Recovery::Recovery(ByteSource& source, const Form& form, Rebuilder& rebuilder, uint64_t search, Sinks sinks)
-    : source_(source), form_(form), rebuilder_(rebuilder), prober_(source, form, kNoOffset), sinks_(std::move(sinks)),
-      search_(search)
+    : source_(source), form_(form), rebuilder_(rebuilder), prober_(source, form, kNoOffset),
+      place_(form, source.size()), judge_(source, form, place_), search_(source, form, place_, judge_, search),
+      ledger_(source, place_, std::move(sinks)), nesting_(form, place_, rebuilder, ledger_)
 {
-  Frame file;
-  file.limit = source.size();
-  file.wide = form.root64;
-  file.sure = true;
-  frames_.push_back(file);
 }
 
 bool Recovery::step()
 {
-  closeFinished();
-  if (position_ >= source_.size())
+  nesting_.closeFinished();
+  if (position() >= source_.size())
   {
-    while (frames_.size() > 1)
-    {
-      closeGroup();
-    }
+    nesting_.closeAll();
     return false;
   }
   if (enterEnding() || takeEnding())
   {
     return true;
   }
-  Candidate found = look(position_, frames_.back().wide);
+  Candidate found = judge_.look(position(), place_.top().wide);
   // What no reader knows cannot come back; a group whose type is damaged looks like that, too, and has nodes inside.
-  const bool known = isKnown(found.header()) && !isEndElement(elmOf(found.header()));
-  if (known && found.trust != Trust::none && believe(found, true))
+  const bool known = Judge::isKnown(found.header()) && !isEndElement(elmOf(found.header()));
+  if (known && found.trust != Trust::none && search_.believe(found, footing()))
   {
     take(found);
     return true;
@@ -73,121 +44,19 @@ bool Recovery::step()
   return true;
 }
 
+RecoveryTotals Recovery::totals() const
+{
+  RecoveryTotals totals = ledger_.totals();
+  totals.ends = rebuilder_.endElements();
+  return totals;
+}
+
 void Recovery::index(uint64_t from)
 {
   if (!indexed_)
   {
     indexed_ = true;
-    endings_ = findEndings(source_, form_, from);
-  }
-}
-
-Ending* Recovery::nextEnding()
-{
-  while (ending_ < endings_.size() && endings_[ending_].start < position_)
-  {
-    ++ending_;
-  }
-  return ending_ < endings_.size() ? &endings_[ending_] : nullptr;
-}
-
-void Recovery::closeFinished()
-{
-  while (frames_.size() > 1 && frames_.back().limit <= position_)
-  {
-    wouldReadAsOpen() ? keepOpen() : closeGroup();
-  }
-}
-
-/// Whether the innermost group, if it were closed now, would read as one that was never closed: a root of size 0 that
-/// something follows.
-bool Recovery::wouldReadAsOpen() const
-{
-  const Frame& top = frames_.back();
-  return frames_.size() == 2 && !top.hidden && top.wide == form_.root64 && position_ < source_.size() &&
-         rebuilder_.isEmpty();
-}
-
-/// Lets the innermost group take what comes behind it, up to the end of the file.
-void Recovery::keepOpen()
-{
-  Frame& top = frames_.back();
-  totals_.closed += top.open ? 0 : 1;
-  top.limit = source_.size();
-  top.open = true;
-  top.sure = false;
-  top.sureAt = 0;
-}
-
-RecoveryTotals Recovery::totals() const
-{
-  RecoveryTotals totals = totals_;
-  totals.ends = rebuilder_.endElements();
-  return totals;
-}
-
-/// A root that seemed to end too soon was right where nothing of it came back from behind its end.
-void Recovery::settleClaim()
-{
-  Frame& top = frames_.back();
-  totals_.closed += top.claim != 0 && keptTo_ > top.claim && !top.hidden ? 1 : 0;
-  top.claim = 0;
-}
-
-void Recovery::closeGroup()
-{
-  settleClaim();
-  if (!frames_.back().hidden)
-  {
-    rebuilder_.close();
-  }
-  frames_.pop_back();
-}
-
-void Recovery::openGroup(const Frame& frame, const TAVHeader& header)
-{
-  Frame inner = frame;
-  inner.sureAt = frame.sure ? frames_.size() : frames_.back().sureAt;
-  inner.heldAt = frame.wide || frame.sure || frame.fixed ? frames_.size() : frames_.back().heldAt;
-  frames_.push_back(inner);
-  if (rebuilder_.depth() >= kMostNested && hasChildren64(header) == rebuilder_.wideChildren())
-  {
-    frames_.back().hidden = true;
-    return;
-  }
-  rebuilder_.open(header);
-}
-
-/// Puts a group of its own around what has lost its own.
-void Recovery::makeParent(bool wide)
-{
-  const Frame around = frames_.back();
-  Frame frame;
-  frame.start = position_;
-  frame.limit = around.limit;
-  frame.wide = wide;
-  frame.open = true;
-  openGroup(frame, madeHeader(rebuilder_.wideChildren(), wide, false));
-  ++totals_.made;
-}
-
-/// Whether nodes with this header can stand here. Below a group of 32-bit headers there are no 64-bit ones.
-bool Recovery::canHold(bool wide) const
-{
-  return !wide || frames_[frames_.back().heldAt].wide;
-}
-
-/// Sees to it that the innermost group takes nodes with this header.
-void Recovery::fit(bool wide, bool isRoot)
-{
-  while (wide && !frames_.back().wide)
-  {
-    totals_.closed += frames_.back().hidden ? 0 : 1;
-    closeGroup();
-  }
-  if (frames_.back().wide != wide || (frames_.size() == 1 && (!isRoot || damaged_)))
-  {
-    makeParent(wide);
+    place_.expect(findEndings(source_, form_, from));
   }
 }
 
@@ -195,128 +64,101 @@ void Recovery::fit(bool wide, bool isRoot)
 bool Recovery::takeEnd(uint64_t offset, bool wide)
 {
   Ending ending;
-  if (!readEnding(source_, form_, offset, wide, sureLimit(), ending))
+  if (!readEnding(source_, form_, offset, wide, place_.sureLimit(), ending))
   {
     return false;
   }
-  const auto behind = std::upper_bound(frames_.begin() + 1, frames_.end(), ending.start,
-                                       [](uint64_t start, const Frame& frame) { return start < frame.start; });
-  const auto at = static_cast<size_t>(behind - frames_.begin()) - 1;
-  if (at == 0 || frames_[at].start != ending.start)
+  const size_t at = place_.groupAt(ending.start);
+  if (at == 0)
   {
-    lose(ending.end, "an end element whose group is lost");
+    ledger_.lose(ending.end, "an end element whose group is lost");
     return true;
   }
-  if (frames_[at].hidden)
+  if (place_.group(at).hidden)
   {
     loseNested(ending.end);
   }
   else
   {
-    totals_.kept += ending.end - offset;
-    position_ = ending.end;
+    ledger_.keep(ending.end);
   }
-  damaged_ = false;
-  while (frames_.size() > at)
-  {
-    Frame& top = frames_.back();
-    if (wouldReadAsOpen()) // of a root that asks for no end element none is kept
-    {
-      keepOpen();
-      break;
-    }
-    const bool right = top.claim != 0 ? top.claim == ending.end : !top.open && top.limit == ending.end;
-    totals_.closed += !top.hidden && !right ? 1 : 0;
-    top.claim = 0;
-    closeGroup();
-  }
+  ledger_.setDamaged(false);
+  nesting_.closeTo(at, ending.end);
   return true;
 }
 
 bool Recovery::takeEnding()
 {
-  const Frame& top = frames_.back();
-  if (takeEnd(position_, top.wide))
-  {
-    return true;
-  }
+  return takeEnd(position(), place_.top().wide) || takeDamagedEnd();
+}
+
+/// An end element whose pair is damaged, or a mark without one. It can end an open group only, and is made anew if it
+/// has to be.
+bool Recovery::takeDamagedEnd()
+{
+  const OpenGroup& top = place_.top();
   TAVHeader header{};
-  if (frames_.size() == 1 || !prober_.header(position_, top.wide, sureLimit(), header) ||
+  if (place_.inFile() || !prober_.header(position(), top.wide, place_.sureLimit(), header) ||
       !isEndElement(elmOf(header)) || !(typeOf(header) == TAV_TYPE_BINARY || sizeOf(header) == 0) ||
       sizeOf(header) > kEyeSizeLength)
   {
     return false;
   }
-  // One whose pair is damaged, or a mark without one. It can end an open group only; it is made anew if it has to be.
-  const uint64_t length = headerLength(header.hdrType);
-  const uint64_t end = std::min(source_.size(), position_ + length + sizeOf(header));
-  const uint64_t pair = firstSure(position_ + length, end, top.wide) - position_ - length;
-  const std::string before = reasonOfEnd(position_, top.wide);
+  const uint64_t start = position() + headerLength(header.hdrType);
+  const uint64_t end = std::min(source_.size(), start + sizeOf(header));
+  const uint64_t behind = search_.firstSure(start, end, top.wide);
+  const std::string before = reasonOfEnd(source_, form_, position(), top.wide);
   if (top.hidden)
   {
-    loseNested(position_ + length);
+    loseNested(start);
   }
   else
   {
-    totals_.kept += length;
-    totals_.pairs += 1;
-    position_ += length;
+    ledger_.keep(start);
+    ++ledger_.totals().pairs;
   }
-  if (pair != 0)
+  if (behind != start)
   {
-    lose(position_ + pair, before.empty() ? "a damaged pair of an end element" : before);
+    ledger_.lose(behind, before.empty() ? "a damaged pair of an end element" : before);
   }
-  if (top.open && wouldReadAsOpen())
+  if (top.open)
   {
-    keepOpen();
+    nesting_.closeOpen();
   }
-  else if (top.open)
-  {
-    totals_.closed += top.hidden ? 0 : 1;
-    closeGroup();
-  }
-  damaged_ = false;
+  ledger_.setDamaged(false);
   return true;
 }
 
 /// Where an end element says that a group begins whose header is damaged.
 bool Recovery::enterEnding()
 {
-  const Ending* const next = nextEnding();
-  if (next == nullptr || next->start != position_)
+  const Ending* const next = place_.lostGroup();
+  if (next == nullptr || next->start != position())
   {
     return false;
   }
   const Ending ending = *next;
-  ++ending_;
-  if (ending.end > sureLimit() || !canHold(true))
+  place_.passLostGroup();
+  if (ending.end > place_.sureLimit() || !place_.canHold(true))
   {
     return false;
   }
   TAVHeader header{};
-  const bool whole = prober_.header(position_, true, source_.size(), header) && isGroup(header) &&
+  const bool whole = prober_.header(position(), true, source_.size(), header) && isGroup(header) &&
                      Prober::isNamed(elmOf(header)) && hasChildren64(header) == ending.wide && hasEyeSize(header);
-  // What was open before and ends inside of it has a wrong size.
-  for (size_t i = frames_.size(); i-- > 1 && frames_[i].limit < ending.end;)
-  {
-    frames_[i].limit = ending.end;
-  }
-  fit(true, true);
-  Frame frame;
-  frame.start = position_;
-  frame.limit = ending.end;
-  frame.wide = ending.wide;
-  frame.sure = true;
-  openGroup(frame, whole ? header : madeHeader(true, ending.wide, true));
-  damaged_ = !whole;
+  place_.stretch(ending.end); // what was open before and ends inside of it has a wrong size
+  nesting_.fit(true, true);
+  nesting_.open({.start = position(), .limit = ending.end, .wide = ending.wide, .sure = true},
+                whole ? header : madeHeader(true, ending.wide, true));
+  ledger_.setDamaged(!whole);
   if (whole)
   {
-    totals_.closed += frames_.back().hidden ? 0 : 1;
+    nesting_.countClosed();
     keepHeader(header);
   }
   else
   {
-    totals_.made += frames_.back().hidden ? 0 : 1;
+    ledger_.totals().made += place_.top().hidden ? 0 : 1;
     // Its first bytes are searched, too: the distance can be the damaged part.
     gap();
   }
@@ -326,30 +168,15 @@ bool Recovery::enterEnding()
 /// A damaged pair is not where a node begins.
 void Recovery::trimPair(Candidate& found)
 {
-  index(position_);
+  index(position());
   const uint64_t start = found.end - found.pairBytes;
-  const Ending* const ending = nextEnding();
-  if ((ending != nullptr && ending->start > position_ && ending->start < found.end) ||
-      firstSure(start, found.end, is64(found.header())) < found.end)
+  const Ending* const lost = place_.lostGroup();
+  if ((lost != nullptr && lost->start > position() && lost->start < found.end) ||
+      search_.firstSure(start, found.end, is64(found.header())) < found.end)
   {
     found.end = start;
     found.pairBytes = 0;
     found.pairMissing = true;
-  }
-}
-
-/// A node that goes on beyond a size that nothing confirms contradicts it.
-void Recovery::contradict(uint64_t end)
-{
-  const bool beyond = frames_.back().limit < end;
-  for (size_t i = 1; beyond && i < frames_.size(); ++i)
-  {
-    if (frames_[i].limit < end)
-    {
-      totals_.closed += frames_[i].open || frames_[i].hidden ? 0 : 1;
-      frames_[i].limit = frames_[i - 1].limit;
-      frames_[i].open = true;
-    }
   }
 }
 
@@ -359,33 +186,30 @@ void Recovery::take(Candidate found)
   {
     trimPair(found);
   }
-  fit(is64(found.header()), found.isGroup());
-  contradict(found.isGroup() ? position_ + headerLength(found.header().hdrType) : found.end);
-  last_ = found.header();
-  lastTold_ = false;
-  if (damaged_)
-  {
-    doubt(last_);
-  }
+  const TAVHeader& header = found.header();
+  nesting_.fit(is64(header), found.isGroup());
+  // A node that goes on beyond a size that nothing confirms contradicts it.
+  ledger_.totals().closed +=
+      place_.contradict(found.isGroup() ? position() + headerLength(header.hdrType) : found.end);
+  ledger_.comesBack(header);
   if (found.isGroup())
   {
     takeGroup(found);
-    damaged_ = false;
-    keptTo_ = position_;
+    ledger_.setDamaged(false);
+    ledger_.cameBackTo(position());
     return;
   }
-  ++totals_.nodes;
-  damaged_ = false;
-  keptTo_ = found.end - found.pairBytes;
+  const uint64_t end = found.end - found.pairBytes;
+  ++ledger_.totals().nodes;
+  ledger_.cameBackTo(end);
   rebuilder_.add(found.data);
-  totals_.kept += found.end - found.pairBytes - position_;
-  totals_.pairs += found.pairBytes != 0 || found.pairMissing ? 1 : 0;
-  position_ = found.end - found.pairBytes;
+  ledger_.keep(end);
+  ledger_.totals().pairs += found.pairBytes != 0 || found.pairMissing ? 1 : 0;
   if (found.pairBytes != 0)
   {
-    lose(found.end, "a damaged pair");
-    damaged_ = false;
+    ledger_.lose(found.end, "a damaged pair");
   }
+  ledger_.setDamaged(false);
 }
 
 void Recovery::takeGroup(const Candidate& found)
@@ -393,103 +217,143 @@ void Recovery::takeGroup(const Candidate& found)
   const TAVHeader& header = found.header();
   if (hasEyeSize(header) && found.trust != Trust::paired && !indexed_)
   {
-    index(position_);
+    index(position());
     if (enterEnding()) // its size is damaged; its end element knows
     {
       return;
     }
   }
-  Frame frame;
-  frame.start = position_;
-  frame.wide = hasChildren64(header);
-  frame.sure = found.trust == Trust::paired;
-  frame.fixed = frames_.size() == 1 && !damaged_;
-  const uint64_t around = frames_.back().limit;
+  OpenGroup group{.start = position(), .wide = hasChildren64(header), .sure = found.trust == Trust::paired};
+  group.fixed = place_.inFile() && !ledger_.isDamaged();
+  const uint64_t around = place_.top().limit;
   const bool repaired = found.open || found.end > around;
-  frame.claim = !repaired && frames_.size() == 1 && !frame.sure && endsTooSoon(found.end) ? found.end : 0;
-  frame.open = repaired || frame.claim != 0;
-  frame.limit = frame.open ? around : found.end;
-  if (frame.sure && found.end > around)
+  group.claim = !repaired && place_.inFile() && !group.sure && endsTooSoon(found.end) ? found.end : 0;
+  group.open = repaired || group.claim != 0;
+  group.limit = group.open ? around : found.end;
+  if (group.sure && found.end > around)
   {
-    for (size_t i = frames_.size(); i-- > 1 && frames_[i].limit < found.end;)
-    {
-      frames_[i].limit = found.end;
-    }
-    frame.limit = found.end;
-    frame.open = false;
+    place_.stretch(found.end);
+    group.limit = found.end;
+    group.open = false;
   }
-  if (rebuilder_.depth() >= kMostNested && frame.wide != rebuilder_.wideChildren())
+  if (nesting_.isTooDeep(group.wide))
   {
-    loseNested(frame.limit); // the group around cannot hold its nodes
+    loseNested(group.limit); // the group around cannot hold its nodes
     return;
   }
-  openGroup(frame, header);
-  totals_.closed += repaired && !frames_.back().hidden ? 1 : 0;
+  nesting_.open(group, header);
+  ledger_.totals().closed += repaired && !place_.top().hidden ? 1 : 0;
   keepHeader(header);
 }
 
 /// Accounts for the header of the group that was opened last.
 void Recovery::keepHeader(const TAVHeader& header)
 {
-  const uint64_t length = headerLength(header.hdrType);
-  if (frames_.back().hidden)
+  const uint64_t end = position() + headerLength(header.hdrType);
+  if (place_.top().hidden)
   {
-    loseNested(position_ + length);
+    loseNested(end);
     return;
   }
-  ++totals_.nodes;
-  totals_.kept += length;
-  position_ += length;
+  ++ledger_.totals().nodes;
+  ledger_.keep(end);
 }
 
 /// Of a group that is too deep, nothing is written but the nodes in it.
 void Recovery::loseNested(uint64_t to)
 {
-  lose(to, "of a group nested more than " + std::to_string(kMostNested) +
-               " deep; nodes in it go to the group around it");
-  damaged_ = false;
+  ledger_.lose(to, "of a group nested more than " + std::to_string(kMostNested) +
+                       " deep; nodes in it go to the group around it");
+  ledger_.setDamaged(false);
+}
+
+/// A node that no reader takes but that is no damage goes alone: what follows it can have a name that nobody knows, and
+/// no search finds that.
+bool Recovery::loseStranger(const TAVHeader& header)
+{
+  uint64_t end = 0;
+  if (ledger_.isDamaged() || !search_.isStranger(header, end))
+  {
+    return false;
+  }
+  ledger_.lose(end, Judge::isKnown(header) ? "a node of a size that its type does not have"
+                                           : "a node of an unknown type");
+  ledger_.setDamaged(false);
+  return true;
 }
 
 /// Whether more than zeros stands where a root ends by its size, and no other root begins.
 bool Recovery::endsTooSoon(uint64_t end)
 {
   bool gaveUp = false;
-  return end < source_.size() && !goesOn(end, form_.root64) && !prober_.zerosToEnd(end, gaveUp);
+  return end < source_.size() && !judge_.goesOn(end, form_.root64) && !prober_.zerosToEnd(end, gaveUp);
 }
 
 bool Recovery::mayEndInZeros() const
 {
-  const Frame& top = frames_.back();
-  return top.limit == source_.size() && (top.open || frames_.size() == 1);
+  const OpenGroup& top = place_.top();
+  return top.limit == source_.size() && (top.open || place_.inFile());
 }
 
 bool Recovery::endByZeros()
 {
   bool gaveUp = false;
-  if (!mayEndInZeros() || !prober_.zerosToEnd(position_, gaveUp))
+  if (!mayEndInZeros() || !prober_.zerosToEnd(position(), gaveUp))
   {
     return false;
   }
-  totals_.zeros = source_.size() - position_;
-  totals_.kept += totals_.zeros;
-  position_ = source_.size();
+  ledger_.keepZeros();
   return true;
 }
 
-void Recovery::lose(uint64_t to, std::string reason)
+/// Passes over damaged bytes, and takes what begins behind them.
+void Recovery::gap()
 {
-  if (!lastTold_ && keptTo_ == position_)
+  index(position());
+  if (enterEnding())
   {
-    doubt(last_);
+    return;
   }
-  totals_.lost += to - position_;
-  ++totals_.losses;
-  if (sinks_.loss)
+  const uint64_t from = position();
+  const uint64_t to = endOfGap();
+  Candidate found;
+  if (!search_.findNext(from, to, found))
   {
-    sinks_.loss({position_, to - position_, std::move(reason)});
+    search_.gaveUp() ? ledger_.leaveUnread() : loseGap(to);
+    return;
   }
-  position_ = to;
-  damaged_ = true;
+  const uint64_t place = found.header().nodeOffset;
+  if (place > from)
+  {
+    ledger_.lose(place, reasonAt(source_, form_, from));
+  }
+  nesting_.closeFinished();
+  if (!takeEnd(place, is64(found.header())))
+  {
+    take(found);
+  }
+}
+
+/// Where the next node has to begin at the latest: a group ends there, or one begins whose header is lost.
+uint64_t Recovery::endOfGap() const
+{
+  const OpenGroup& top = place_.top();
+  const uint64_t sure = place_.sureLimit();
+  const uint64_t to = top.sure || top.open ? std::min(sure, top.limit) : sure;
+  const Ending* const lost = place_.lostGroup();
+  const bool byEnding = lost != nullptr && lost->start > position() && lost->start < to && lost->end <= sure;
+  return byEnding ? lost->start : to;
+}
+
+/// Gives up what was searched in vain, but for the zeros that the file ends in.
+void Recovery::loseGap(uint64_t to)
+{
+  const uint64_t from = position();
+  if (to == source_.size() && mayEndInZeros())
+  {
+    to = std::max(from, prober_.zerosStart(from));
+  }
+  ledger_.lose(std::max(to, from + (to == from ? 1 : 0)), reasonAt(source_, form_, from));
 }
 
 } // namespace tav::inspect

@@ -50,7 +50,7 @@ bool Prober::isNamed(uint16_t elm)
   return named[elm];
 }
 
-bool Prober::header(uint64_t offset, bool wide, uint64_t limit, TAVHeader& out)
+bool Prober::header(uint64_t offset, bool wide, uint64_t limit, TAVHeader& out) const
 {
   const uint64_t length = wide ? kHeaderSize64 : kHeaderSize32;
   if (offset > limit || limit - offset < length)
@@ -114,13 +114,13 @@ Belief Prober::judgeHeader(const TAVHeader& header, uint64_t limit) const
   return isNamed(elmOf(header)) ? Belief::named : Belief::typed;
 }
 
-bool Prober::isFollowedAt(uint64_t offset, bool wide, uint64_t limit)
+bool Prober::isFollowedAt(uint64_t offset, bool wide, uint64_t limit) const
 {
   TAVHeader next{};
   return offset == limit || (header(offset, wide, limit, next) && judgeHeader(next, limit) >= Belief::named);
 }
 
-bool Prober::isFollowed(const TAVHeader& node, uint64_t limit)
+bool Prober::isFollowed(const TAVHeader& node, uint64_t limit) const
 {
   const bool wide = is64(node);
   const uint64_t start = node.nodeOffset + headerLength(node.hdrType);
@@ -147,7 +147,7 @@ bool Prober::isFollowed(const TAVHeader& node, uint64_t limit)
          (typeOf(node) == TAV_TYPE_UTF8_STRING && end < limit && isFollowedAt(end + 2, wide, limit));
 }
 
-bool Prober::isChain(uint64_t offset, bool wide, uint64_t limit, bool toTheEnd)
+bool Prober::isChain(uint64_t offset, bool wide, uint64_t limit, bool toTheEnd) const
 {
   constexpr int kEnough = 16;
   for (int i = 0; i < kEnough && offset != limit; ++i)
@@ -176,7 +176,7 @@ bool Prober::isChain(uint64_t offset, bool wide, uint64_t limit, bool toTheEnd)
   return !toTheEnd || offset == limit;
 }
 
-Belief Prober::judge(uint64_t offset, bool wide, uint64_t limit)
+Belief Prober::judge(uint64_t offset, bool wide, uint64_t limit) const
 {
   TAVHeader node{};
   if (!header(offset, wide, limit, node))
@@ -187,7 +187,7 @@ Belief Prober::judge(uint64_t offset, bool wide, uint64_t limit)
   return belief == Belief::named && isFollowed(node, limit) ? Belief::followed : belief;
 }
 
-bool Prober::pairAt(uint64_t offset, uint64_t limit, uint64_t& distance)
+bool Prober::pairAt(uint64_t offset, uint64_t limit, uint64_t& distance) const
 {
   EyeSizeBytes bytes{};
   if (offset > limit || limit - offset < bytes.size() || source_.read(offset, bytes) != bytes.size())
@@ -206,7 +206,7 @@ bool Prober::pairAt(uint64_t offset, uint64_t limit, uint64_t& distance)
   return false;
 }
 
-bool Prober::pairEnds(uint64_t offset, uint64_t limit, const TAVHeader& group)
+bool Prober::pairEnds(uint64_t offset, uint64_t limit, const TAVHeader& group) const
 {
   uint64_t distance = 0;
   // The distance of a 64-bit group of type 1 is 8 short, as the writer makes it.

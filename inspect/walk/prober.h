@@ -36,19 +36,19 @@ public:
   Prober(ByteSource& source, const Form& form, uint64_t budget);
 
   /// Reads a header; false when it does not lie before `limit`.
-  bool header(uint64_t offset, bool wide, uint64_t limit, TAVHeader& out);
+  bool header(uint64_t offset, bool wide, uint64_t limit, TAVHeader& out) const;
 
   /// What speaks for a node at `offset` that ends at `limit` at the latest.
-  Belief judge(uint64_t offset, bool wide, uint64_t limit);
+  Belief judge(uint64_t offset, bool wide, uint64_t limit) const;
 
   /// Whether a header is as a writer makes it: a known type, a size that suits it and lies before `limit`.
   Belief judgeHeader(const TAVHeader& header, uint64_t limit) const;
 
   /// Whether an eye catcher of either byte order stands at `offset`; then also its distance, in that order.
-  bool pairAt(uint64_t offset, uint64_t limit, uint64_t& distance);
+  bool pairAt(uint64_t offset, uint64_t limit, uint64_t& distance) const;
 
   /// Whether the eye/size pair at `offset` ends the group at `group`.
-  bool pairEnds(uint64_t offset, uint64_t limit, const TAVHeader& group);
+  bool pairEnds(uint64_t offset, uint64_t limit, const TAVHeader& group) const;
 
   /// Bytes from the end of a data element's header to the place behind its payload and padding.
   uint64_t paddedSize(const TAVHeader& data) const;
@@ -64,12 +64,12 @@ public:
   uint64_t zerosStart(uint64_t from);
 
   /// Whether what stands behind a node is another node, or the bounds end there.
-  bool isFollowed(const TAVHeader& node, uint64_t limit);
+  bool isFollowed(const TAVHeader& node, uint64_t limit) const;
 
   /// Whether nodes of any kind follow one another from `offset` on, by their sizes alone, up to the limit, to an open
   /// group that a node follows, or many of them. Says something of nodes with types and elements that nobody knows.
   /// With `toTheEnd`, only up to the limit will do.
-  bool isChain(uint64_t offset, bool wide, uint64_t limit, bool toTheEnd = false);
+  bool isChain(uint64_t offset, bool wide, uint64_t limit, bool toTheEnd = false) const;
 
   /// Whether the dictionary has an element.
   static bool isNamed(uint16_t elm);
@@ -79,7 +79,7 @@ public:
 
 private:
   bool suits(const TAVHeader& header) const;
-  bool isFollowedAt(uint64_t offset, bool wide, uint64_t limit);
+  bool isFollowedAt(uint64_t offset, bool wide, uint64_t limit) const;
   bool restartAt(const uint8_t* bytes, uint64_t offset, bool wide, uint64_t limit);
   bool restartByPair(const uint8_t* bytes, uint64_t offset, uint64_t from, uint64_t limit, Restart& restart);
   bool pairLeadsTo(uint64_t eye, uint64_t distance, uint64_t from, uint64_t limit, uint64_t& start);

@@ -162,64 +162,6 @@ TEST(Diff, LeavesOutWhatIsIgnoredAndWhatIsNear)
   EXPECT_FALSE(differences(a, {}, b, {}, options).different);
 }
 
-TEST(Recover, BringsASoundStreamBackByteForByte)
-{
-  for (uint64_t seed = 0; seed < 200; ++seed)
-  {
-    SCOPED_TRACE(seed);
-    const tav::inspect::Form form{.swapped = seed % 2 == 0, .aligned = seed % 4 < 2};
-    const Bytes bytes = test::namedStream(seed, form.swapped, form.aligned);
-    ByteSource source("x", std::span<const uint8_t>(bytes));
-    test::Made made;
-    const RecoveryTotals totals = recover(source, form, made.file());
-    EXPECT_EQ(totals.lost + totals.unread, 0U);
-    EXPECT_EQ(totals.kept, bytes.size());
-    EXPECT_TRUE(made.bytes() == bytes);
-  }
-}
-
-TEST(Recover, AccountsForEveryByteAndLeavesASoundStream)
-{
-  const auto structure = [](RuleId id) {
-    return id == RuleId::damaged || id == RuleId::pastParent || id == RuleId::pastFile || id == RuleId::headerCut ||
-           id == RuleId::groupOpen || id == RuleId::groupSize || id == RuleId::behindStream;
-  };
-  for (uint64_t seed = 0; seed < 600; ++seed)
-  {
-    SCOPED_TRACE(seed);
-    const test::Tree tree = test::randomTree(seed);
-    const Bytes bytes = test::damaged(test::bytesOfTree(tree), seed);
-    const tav::inspect::Form form = test::readForm(tree.form);
-    ByteSource source("x", std::span<const uint8_t>(bytes));
-    test::Made made;
-    uint64_t lost = 0;
-    const RecoveryTotals totals =
-        recover(source, form, made.file(), {.lost = [&](const Loss& loss) { lost += loss.length; }});
-    EXPECT_EQ(totals.kept + totals.lost + totals.unread, bytes.size());
-    EXPECT_EQ(totals.lost, lost);
-    const Bytes sound = made.bytes();
-    ByteSource result("y", std::span<const uint8_t>(sound));
-    Checker checker(result, form, structure, [](const Finding& finding) {
-      ADD_FAILURE() << ruleOf(finding.rule).id << " at " << finding.offset << ": " << finding.sentence;
-    });
-    while (checker.step())
-    {
-    }
-  }
-}
-
-TEST(Recover, ClosesAGroupThatWasLeftOpen)
-{
-  Bytes bytes = hostStream("ada", 8);
-  std::fill_n(bytes.begin(), 8, uint8_t{0xFF}); // the root's size
-  ByteSource source("x", std::span<const uint8_t>(bytes));
-  test::Made made;
-  const RecoveryTotals totals = recover(source, {}, made.file());
-  EXPECT_EQ(totals.closed, 1U);
-  EXPECT_EQ(totals.nodes, 4U);
-  EXPECT_EQ(made.bytes(), hostStream("ada", 8));
-}
-
 TEST(Path, LeadsToTheNodesThatItNames)
 {
   const Bytes bytes = bytesOfJson("{\"system\": {\"host\": [{\"hostName\": \"ada\"}, {\"hostName\": \"bob\"}]}}");

@@ -1,0 +1,285 @@
+#include <tuple>
+#include <vector>
+
+#include <gmock/gmock.h>
+
+#include "inspect/recover/judge.h"
+#include "inspect/streams.h"
+#include "support/byteRows.h"
+
+using namespace tav::inspect;
+using test::ByteRows;
+using test::Bytes;
+
+namespace
+{
+
+constexpr uint32_t kEye = TAV_INFO_EYE_SIZE;
+constexpr uint16_t kUnknownType = 77;
+constexpr uint16_t kUnknownElement = 12345;
+
+/// Bytes, the place that they are judged from, and the judge.
+class Judged
+{
+public:
+  Judged(Bytes bytes, const tav::inspect::Form& form)
+      : bytes_(std::move(bytes)), source_("x", std::span<const uint8_t>(bytes_)), place(form, bytes_.size()),
+        judge(source_, form, place) {}
+
+private:
+  Bytes bytes_;
+  ByteSource source_;
+
+public:
+  Place place;
+  Judge judge;
+};
+
+/// Everything that a judge says of the node at an offset.
+auto answer(const Judge& judge, uint64_t offset, bool wide)
+{
+  const Candidate found = judge.look(offset, wide);
+  return std::tuple(found.trust, found.end, found.pairBytes, found.pairMissing, found.open, found.data.extra,
+                    found.data.otherOrder, judge.goesOn(offset, wide), judge.isBoundary(offset),
+                    judge.isRun(offset, wide), judge.isConfirmed(found));
+}
+
+} // namespace
+
+/// What is judged in this machine's byte order and in the other one.
+class Judging : public testing::TestWithParam<bool>
+{
+protected:
+  ByteRows rows{GetParam()};
+  tav::inspect::Form form{.swapped = GetParam()};
+
+  /// A value of four bytes, without a pair.
+  void number(uint16_t elm = TAV_ELM_CMN_CPU_ONLINE, uint32_t info = 0)
+  {
+    rows.h64(4, info, TAV_TYPE_UINT32, elm).number(9, 4);
+  }
+  Candidate lookAtFirst() { return Judged(rows.bytes, form).judge.look(0, true); }
+};
+
+INSTANTIATE_TEST_SUITE_P(Swapped, Judging, testing::Bool());
+
+TEST_P(Judging, ANodeThatAnotherFollowsIsWorthMoreThanOneAlone)
+{
+  number();
+  const uint64_t end = rows.at();
+  rows.fill(40, 0x5A);
+  EXPECT_EQ(lookAtFirst().trust, Trust::alone);
+  rows.bytes.resize(end);
+  number();
+  const Candidate found = lookAtFirst();
+  EXPECT_EQ(found.trust, Trust::followed);
+  EXPECT_EQ(found.end, end);
+  EXPECT_FALSE(found.isGroup());
+}
+
+TEST_P(Judging, APairThatLeadsBackIsWorthMost)
+{
+  number(TAV_ELM_CMN_CPU_ONLINE, kEye);
+  rows.pair(20);
+  rows.fill(40, 0x5A);
+  const Candidate found = lookAtFirst();
+  EXPECT_EQ(found.trust, Trust::paired);
+  EXPECT_EQ(found.end, 36U);
+  EXPECT_EQ(found.pairBytes, 0U);
+  EXPECT_FALSE(found.data.otherOrder);
+}
+
+TEST_P(Judging, APairWithAnotherDistanceIsADamagedOne)
+{
+  number(TAV_ELM_CMN_CPU_ONLINE, kEye);
+  rows.pair(21);
+  const Candidate found = lookAtFirst();
+  EXPECT_EQ(found.trust, Trust::followed);
+  EXPECT_EQ(found.end, 36U);
+  EXPECT_EQ(found.pairBytes, 16U);
+}
+
+TEST_P(Judging, WhereTheNextNodeStandsTellsThatAPairIsMissing)
+{
+  number(TAV_ELM_CMN_CPU_ONLINE, kEye);
+  number();
+  number();
+  const Candidate found = lookAtFirst();
+  EXPECT_EQ(found.trust, Trust::followed);
+  EXPECT_EQ(found.end, 20U);
+  EXPECT_TRUE(found.pairMissing);
+}
+
+TEST_P(Judging, WhereTheNextNodeStandsTellsOfTwoBytesBehindAText)
+{
+  for (const uint64_t extra : {uint64_t{0}, uint64_t{2}})
+  {
+    rows = ByteRows(GetParam());
+    rows.h64(5, 0, TAV_TYPE_UTF8_STRING, TAV_ELM_CMN_HOST_NAME).number(65001, 2).fill(3, 'a').fill(extra, 0x11);
+    number();
+    number();
+    const Candidate found = lookAtFirst();
+    EXPECT_EQ(found.trust, Trust::followed);
+    EXPECT_EQ(found.end, 21 + extra);
+    EXPECT_EQ(found.data.extra, extra != 0);
+  }
+}
+
+TEST_P(Judging, NothingSpeaksForHeadersThatNoNodeHas)
+{
+  rows.h64(4, 0, kUnknownType, TAV_ELM_CMN_CPU_ONLINE).fill(4);
+  EXPECT_EQ(lookAtFirst().trust, Trust::none);
+  rows = ByteRows(GetParam());
+  rows.h64(5, 0, TAV_TYPE_UINT32, TAV_ELM_CMN_CPU_ONLINE).fill(5); // no size of this type
+  EXPECT_EQ(lookAtFirst().trust, Trust::none);
+  rows = ByteRows(GetParam());
+  rows.h64(1000, 0, TAV_TYPE_BINARY, TAV_ELM_CMN_CPU_ONLINE).fill(5); // claims more than there is
+  EXPECT_EQ(lookAtFirst().trust, Trust::none);
+  rows = ByteRows(GetParam());
+  rows.fill(40);
+  EXPECT_EQ(lookAtFirst().trust, Trust::none);
+}
+
+TEST_P(Judging, AGroupIsWorthMostWhereItsEndElementLeadsBack)
+{
+  rows.h64(20 + 32, kEye, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+  number();
+  const ByteRows open = rows;
+  rows.end64(16 + 20 + 16);
+  const Candidate found = lookAtFirst();
+  EXPECT_EQ(found.trust, Trust::paired);
+  EXPECT_EQ(found.end, rows.at());
+  EXPECT_FALSE(found.open);
+  rows = open;
+  const Candidate cut = lookAtFirst();
+  EXPECT_EQ(cut.trust, Trust::followed);
+  EXPECT_TRUE(cut.open);
+}
+
+TEST_P(Judging, ASizeThatIsConfirmedEndsAGroupAndAnyOtherOnlyWhereNodesGoOn)
+{
+  number();
+  number();
+  rows.fill(30, 0x5A);
+  Judged it(rows.bytes, form);
+  it.place.enter({.start = 0, .limit = 20, .wide = true});
+  EXPECT_TRUE(it.judge.isBoundary(20));
+  it.place.leave();
+  it.place.enter({.start = 0, .limit = 45, .wide = true});
+  EXPECT_FALSE(it.judge.isBoundary(45));
+  EXPECT_FALSE(it.judge.isBoundary(44));
+  it.place.leave();
+  it.place.enter({.start = 0, .limit = 45, .wide = true, .sure = true});
+  EXPECT_TRUE(it.judge.isBoundary(45));
+  EXPECT_TRUE(it.judge.isBoundary(rows.at()));
+}
+
+TEST_P(Judging, AGroupWhoseHeaderIsLostEndsWhatStandsBeforeIt)
+{
+  rows.fill(50, 0x5A);
+  Judged it(rows.bytes, form);
+  EXPECT_FALSE(it.judge.isBoundary(30));
+  it.place.expect({{.start = 10, .end = 20, .wide = true}, {.start = 30, .end = 40, .wide = true}});
+  EXPECT_FALSE(it.judge.isBoundary(30)); // the one before it is next
+  EXPECT_TRUE(it.judge.isBoundary(10));
+  it.place.moveTo(11);
+  EXPECT_TRUE(it.judge.isBoundary(30));
+  it.place.passLostGroup();
+  EXPECT_FALSE(it.judge.isBoundary(30));
+}
+
+TEST_P(Judging, NodesLeadOnlyToWhereOneOfThemEnds)
+{
+  number();
+  number(TAV_ELM_CMN_CPU_ONLINE, kEye);
+  rows.pair(20);
+  number();
+  rows.fill(20, 0x5A);
+  const Judged it(rows.bytes, form);
+  EXPECT_TRUE(it.judge.leadsTo(0, true, 20));
+  EXPECT_TRUE(it.judge.leadsTo(0, true, 56));
+  EXPECT_TRUE(it.judge.leadsTo(0, true, 76));
+  EXPECT_FALSE(it.judge.leadsTo(0, true, 40));
+  EXPECT_FALSE(it.judge.leadsTo(1, true, 20));
+  EXPECT_TRUE(it.judge.isRun(0, true));
+  EXPECT_TRUE(it.judge.holdsRun(0, 1));
+  EXPECT_FALSE(it.judge.holdsRun(1, 20));
+}
+
+TEST_P(Judging, AnElementThatNobodyKnowsCountsWhereANodeFollows)
+{
+  number(kUnknownElement);
+  const uint64_t end = rows.at();
+  number();
+  EXPECT_EQ(Judged(rows.bytes, form).judge.beliefAt(0, true, rows.at()), Belief::named);
+  rows.bytes.resize(end);
+  rows.fill(30, 0x5A);
+  EXPECT_EQ(Judged(rows.bytes, form).judge.beliefAt(0, true, rows.at()), Belief::typed);
+}
+
+TEST_P(Judging, NothingIsTriedWhoseTypeOrElementNobodyKnows)
+{
+  number(kUnknownElement);
+  number();
+  const Judged it(rows.bytes, form);
+  Candidate found;
+  EXPECT_FALSE(it.judge.tryAt(rows.bytes.data(), 0, true, found));
+  EXPECT_TRUE(it.judge.tryAt(rows.bytes.data() + 20, 20, true, found));
+  EXPECT_EQ(found.header().nodeOffset, 20U);
+}
+
+TEST_P(Judging, ANodeOfAnUnknownTypeEndsByItsSize)
+{
+  rows.h64(8, 0, kUnknownType, TAV_ELM_CMN_CPU_ONLINE).fill(8, 0x5A);
+  rows.h64(8, kEye, kUnknownType, TAV_ELM_CMN_CPU_ONLINE).fill(8, 0x5A).pair(24);
+  rows.h64(8, kEye, kUnknownType, TAV_ELM_CMN_CPU_ONLINE).fill(8, 0x5A).pair(23);
+  const Judged it(rows.bytes, form);
+  uint64_t end = 0;
+  EXPECT_TRUE(it.judge.endOfStranger(it.judge.look(0, true).header(), rows.at(), end));
+  EXPECT_EQ(end, 24U);
+  EXPECT_TRUE(it.judge.endOfStranger(it.judge.look(24, true).header(), rows.at(), end));
+  EXPECT_EQ(end, 64U);
+  EXPECT_FALSE(it.judge.endOfStranger(it.judge.look(64, true).header(), rows.at(), end)); // its pair is another node's
+}
+
+TEST_P(Judging, OnlyBytesAndArraysMayHoldNodes)
+{
+  for (const uint16_t type : {TAV_TYPE_BINARY, TAV_TYPE_UINT64_ARRAY, TAV_TYPE_ASCII_STRING, TAV_TYPE_UTF8_STRING})
+  {
+    rows = ByteRows(GetParam());
+    rows.h64(8, 0, type, TAV_ELM_CMN_HOST_NAME).fill(8, 'a');
+    number();
+    Candidate found = lookAtFirst();
+    ASSERT_EQ(found.trust, Trust::followed) << type;
+    EXPECT_FALSE(Judge::isExact(found.header()));
+    EXPECT_EQ(Judge::mayHoldNodes(found), type == TAV_TYPE_BINARY || type == TAV_TYPE_UINT64_ARRAY);
+    found.pairMissing = true;
+    EXPECT_FALSE(Judge::mayHoldNodes(found));
+  }
+}
+
+TEST(Judge, KeepsNothingOfWhatItWasAsked)
+{
+  size_t nodes = 0;
+  for (uint64_t seed = 0; seed < 60; ++seed)
+  {
+    SCOPED_TRACE(seed);
+    const bool swap = seed % 2 != 0;
+    const Bytes bytes = test::damaged(test::namedStream(seed, swap, seed % 4 > 1), seed);
+    const tav::inspect::Form form{.swapped = swap, .aligned = seed % 4 > 1};
+    const Judged asked(bytes, form);
+    std::vector<decltype(answer(asked.judge, 0, true))> answers;
+    for (uint64_t at = 0; at < bytes.size(); ++at)
+    {
+      answers.push_back(answer(asked.judge, at, true));
+      answers.push_back(answer(asked.judge, at, false));
+      nodes += std::get<0>(answers.back()) != Trust::none ? 1 : 0;
+    }
+    for (uint64_t at = bytes.size(); at-- > 0;)
+    {
+      ASSERT_EQ(answer(asked.judge, at, false), answers[2 * at + 1]) << at;
+      ASSERT_EQ(answer(Judged(bytes, form).judge, at, true), answers[2 * at]) << at;
+    }
+  }
+  EXPECT_GT(nodes, 100U);
+}

@@ -1,0 +1,280 @@
+#include <string>
+#include <vector>
+
+#include <gmock/gmock.h>
+
+#include "inspect/recover/recovery.h"
+#include "inspect/streams.h"
+#include "support/byteRows.h"
+
+using namespace tav::inspect;
+using test::ByteRows;
+using test::Bytes;
+
+namespace
+{
+
+Bytes hostStream()
+{
+  tav::Writer writer;
+  {
+    tav::Group system = writer.group(TAV_ELM_CMN_SYSTEM);
+    tav::Group host = system.group(TAV_ELM_CMN_HOST);
+    host.add(TAV_ELM_CMN_HOST_NAME, "ada");
+    host.add(TAV_ELM_CMN_CPU_ONLINE, uint32_t{8});
+  }
+  writer.finish();
+  const auto bytes = writer.bytes();
+  const auto* const first = reinterpret_cast<const uint8_t*>(bytes.data());
+  return {first, first + bytes.size()};
+}
+
+/// What a recovery brings back, and what it says of the rest.
+struct Recovered
+{
+  Recovered(const Bytes& bytes, const tav::inspect::Form& form, uint64_t search = kNoOffset)
+  {
+    ByteSource source("x", std::span<const uint8_t>(bytes));
+    test::Made made;
+    Rebuilder rebuilder(source, form, made.file(), [](uint64_t) {});
+    Recovery recovery(source, form, rebuilder, search,
+                      {.loss = [&](const Loss& loss) { losses.push_back(loss); },
+                       .doubt = [&](const Doubt& doubt) { doubts.push_back(doubt); }});
+    uint64_t before = 0;
+    while (recovery.step())
+    {
+      EXPECT_GE(recovery.position(), before);
+      before = recovery.position();
+    }
+    EXPECT_EQ(recovery.position(), bytes.size());
+    EXPECT_EQ(rebuilder.depth(), 0U);
+    totals = recovery.totals();
+    stream = made.bytes();
+  }
+
+  std::vector<Loss> losses;
+  std::vector<Doubt> doubts;
+  RecoveryTotals totals;
+  Bytes stream;
+};
+
+} // namespace
+
+/// What is recovered in this machine's byte order and in the other one.
+class Recovering : public testing::TestWithParam<bool>
+{
+protected:
+  ByteRows rows{GetParam()};
+  tav::inspect::Form form{.swapped = GetParam()};
+
+  void number() { rows.h64(4, 0, TAV_TYPE_UINT32, TAV_ELM_CMN_CPU_ONLINE).number(9, 4); }
+};
+
+INSTANTIATE_TEST_SUITE_P(Swapped, Recovering, testing::Bool());
+
+TEST_P(Recovering, LeavesOutTheBytesBetweenNodesAndSetsTheSizeRight)
+{
+  rows.h64(60, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+  number();
+  number();
+  number();
+  const Bytes whole = rows.bytes;
+  ByteRows damaged(GetParam());
+  damaged.h64(79, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+  damaged.data({whole.begin() + 16, whole.begin() + 36}).fill(19, 0x5A).data({whole.begin() + 36, whole.end()});
+  const Recovered back(damaged.bytes, form);
+  EXPECT_EQ(back.stream, whole);
+  ASSERT_EQ(back.losses.size(), 1U);
+  EXPECT_EQ(back.losses[0].offset, 36U);
+  EXPECT_EQ(back.losses[0].length, 19U);
+  EXPECT_EQ(back.losses[0].reason, "no node is whole");
+  EXPECT_EQ(back.totals.kept, whole.size());
+  EXPECT_EQ(back.totals.nodes, 4U);
+}
+
+TEST_P(Recovering, AGroupThatHasLostItsHeaderComesBackByItsEndElement)
+{
+  rows.h64(20 + 68 + 20 + 32, TAV_INFO_EYE_SIZE, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+  number();
+  const uint64_t lost = rows.at();
+  rows.fill(16, 0x5A); // the header of a group of a number and an end element
+  number();
+  rows.end64(16 + 20 + 16);
+  number();
+  rows.end64(16 + 20 + 68 + 20 + 16);
+  const Recovered back(rows.bytes, form);
+  EXPECT_EQ(back.totals.made, 1U);
+  EXPECT_EQ(back.totals.ends, 2U);
+  EXPECT_EQ(back.totals.nodes, 4U);
+  ASSERT_EQ(back.losses.size(), 1U);
+  EXPECT_EQ(back.losses[0].offset, lost);
+  EXPECT_EQ(back.losses[0].length, 16U);
+  Bytes expected = rows.bytes;
+  const Bytes header = ByteRows(GetParam()).h64(52, TAV_INFO_EYE_SIZE, TAV_TYPE_HEADER64, TAV_ELM_CMN_DOC_ROOT).bytes;
+  std::copy(header.begin(), header.end(), expected.begin() + static_cast<ptrdiff_t>(lost));
+  EXPECT_EQ(back.stream, expected);
+}
+
+TEST_P(Recovering, NodesThatHaveLostAllGroupsGetOne)
+{
+  rows.fill(23, 0x5A);
+  number();
+  number();
+  const Recovered back(rows.bytes, form);
+  EXPECT_EQ(back.totals.made, 1U);
+  EXPECT_EQ(back.totals.nodes, 2U);
+  EXPECT_EQ(back.stream.size(), 16U + 40U);
+  EXPECT_EQ(back.totals.lost, 23U);
+}
+
+TEST_P(Recovering, ADamagedPairIsMadeAnew)
+{
+  rows.h64(72, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+  rows.h64(4, TAV_INFO_EYE_SIZE, TAV_TYPE_UINT32, TAV_ELM_CMN_CPU_ONLINE).number(9, 4);
+  const uint64_t pair = rows.at();
+  rows.pair(20);
+  rows.h64(4, TAV_INFO_EYE_SIZE, TAV_TYPE_UINT32, TAV_ELM_CMN_CPU_ONLINE).number(9, 4).pair(20);
+  Bytes damaged = rows.bytes;
+  damaged[pair] ^= 0x40; // in the eye catcher
+  const Recovered back(damaged, form);
+  EXPECT_EQ(back.stream, rows.bytes);
+  EXPECT_EQ(back.totals.pairs, 1U);
+  EXPECT_EQ(back.totals.lost, 16U);
+}
+
+TEST_P(Recovering, ZerosBehindTheStreamAreKeptInTheAccountAndNotWritten)
+{
+  rows.h64(20, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+  number();
+  const Bytes whole = rows.bytes;
+  rows.fill(100);
+  const Recovered back(rows.bytes, form);
+  EXPECT_EQ(back.stream, whole);
+  EXPECT_EQ(back.totals.zeros, 100U);
+  EXPECT_EQ(back.totals.kept, rows.at());
+  EXPECT_TRUE(back.losses.empty());
+}
+
+TEST_P(Recovering, WhatIsNotSearchedIsUnread)
+{
+  rows.h64(20, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+  number();
+  rows.fill(50'000, 0x5A);
+  number();
+  number();
+  const Recovered back(rows.bytes, form, 1000);
+  EXPECT_GT(back.totals.unread, 0U);
+  EXPECT_EQ(back.totals.nodes, 2U);
+  EXPECT_EQ(back.totals.kept + back.totals.lost + back.totals.unread, rows.at());
+}
+
+TEST_P(Recovering, ANodeOfAnUnknownTypeGoesAlone)
+{
+  rows.h64(64, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+  number();
+  rows.h64(8, 0, 77, TAV_ELM_CMN_CPU_ONLINE).fill(8, 0x5A);
+  number();
+  const Recovered back(rows.bytes, form);
+  ASSERT_EQ(back.losses.size(), 1U);
+  EXPECT_EQ(back.losses[0].offset, 36U);
+  EXPECT_EQ(back.losses[0].length, 24U);
+  EXPECT_EQ(back.losses[0].reason, "a node of an unknown type");
+  EXPECT_EQ(back.totals.nodes, 3U);
+}
+
+TEST_P(Recovering, SaysWhichNodesBesideLostBytesMayBeNone)
+{
+  rows.h64(56 + 19, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+  number();
+  rows.h64(4, TAV_INFO_EYE_SIZE, TAV_TYPE_UINT32, 12345).number(9, 4).pair(20); // an element that nobody knows
+  rows.fill(19, 0x5A);
+  const Recovered back(rows.bytes, form);
+  ASSERT_EQ(back.doubts.size(), 1U);
+  EXPECT_EQ(back.doubts[0].offset, 36U);
+  EXPECT_EQ(back.doubts[0].length, 20U);
+  EXPECT_EQ(back.totals.doubts, 1U);
+}
+
+TEST(Recovery, TellsOfLossesInTheirOrder)
+{
+  size_t losses = 0;
+  for (uint64_t seed = 0; seed < 300; ++seed)
+  {
+    SCOPED_TRACE(seed);
+    const Bytes bytes = test::damaged(test::namedStream(seed), seed);
+    const Recovered back(bytes, {});
+    uint64_t end = 0;
+    uint64_t lost = 0;
+    for (const Loss& loss : back.losses)
+    {
+      EXPECT_GE(loss.offset, end);
+      EXPECT_GT(loss.length, 0U);
+      EXPECT_FALSE(loss.reason.empty());
+      end = loss.offset + loss.length;
+      lost += loss.length;
+    }
+    EXPECT_EQ(lost, back.totals.lost);
+    EXPECT_EQ(back.losses.size(), back.totals.losses);
+    EXPECT_EQ(back.totals.kept + lost, bytes.size());
+    losses += back.losses.size();
+  }
+  EXPECT_GT(losses, 100U);
+}
+
+TEST(Recover, BringsASoundStreamBackByteForByte)
+{
+  for (uint64_t seed = 0; seed < 200; ++seed)
+  {
+    SCOPED_TRACE(seed);
+    const tav::inspect::Form form{.swapped = seed % 2 == 0, .aligned = seed % 4 < 2};
+    const Bytes bytes = test::namedStream(seed, form.swapped, form.aligned);
+    ByteSource source("x", std::span<const uint8_t>(bytes));
+    test::Made made;
+    const RecoveryTotals totals = recover(source, form, made.file());
+    EXPECT_EQ(totals.lost + totals.unread, 0U);
+    EXPECT_EQ(totals.kept, bytes.size());
+    EXPECT_TRUE(made.bytes() == bytes);
+  }
+}
+
+TEST(Recover, AccountsForEveryByteAndLeavesASoundStream)
+{
+  const auto structure = [](RuleId id) {
+    return id == RuleId::damaged || id == RuleId::pastParent || id == RuleId::pastFile || id == RuleId::headerCut ||
+           id == RuleId::groupOpen || id == RuleId::groupSize || id == RuleId::behindStream;
+  };
+  for (uint64_t seed = 0; seed < 600; ++seed)
+  {
+    SCOPED_TRACE(seed);
+    const test::Tree tree = test::randomTree(seed);
+    const Bytes bytes = test::damaged(test::bytesOfTree(tree), seed);
+    const tav::inspect::Form form = test::readForm(tree.form);
+    ByteSource source("x", std::span<const uint8_t>(bytes));
+    test::Made made;
+    uint64_t lost = 0;
+    const RecoveryTotals totals =
+        recover(source, form, made.file(), {.lost = [&](const Loss& loss) { lost += loss.length; }});
+    EXPECT_EQ(totals.kept + totals.lost + totals.unread, bytes.size());
+    EXPECT_EQ(totals.lost, lost);
+    const Bytes sound = made.bytes();
+    ByteSource result("y", std::span<const uint8_t>(sound));
+    Checker checker(result, form, structure, [](const Finding& finding) {
+      ADD_FAILURE() << ruleOf(finding.rule).id << " at " << finding.offset << ": " << finding.sentence;
+    });
+    while (checker.step())
+    {
+    }
+  }
+}
+
+TEST(Recover, ClosesAGroupThatWasLeftOpen)
+{
+  Bytes bytes = hostStream();
+  std::fill_n(bytes.begin(), 8, uint8_t{0xFF}); // the root's size
+  ByteSource source("x", std::span<const uint8_t>(bytes));
+  test::Made made;
+  const RecoveryTotals totals = recover(source, {}, made.file());
+  EXPECT_EQ(totals.closed, 1U);
+  EXPECT_EQ(totals.nodes, 4U);
+  EXPECT_EQ(made.bytes(), hostStream());
+}

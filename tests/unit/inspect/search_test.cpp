@@ -1,0 +1,196 @@
+#include <random>
+#include <vector>
+
+#include <gmock/gmock.h>
+
+#include "inspect/recover/search.h"
+#include "inspect/streams.h"
+#include "support/byteRows.h"
+
+using namespace tav::inspect;
+using test::ByteRows;
+using test::Bytes;
+
+namespace
+{
+
+/// A search over bytes, from the root level of a file.
+class Searched
+{
+public:
+  Searched(Bytes bytes, const tav::inspect::Form& form, uint64_t budget = kNoOffset)
+      : bytes_(std::move(bytes)), source_("x", std::span<const uint8_t>(bytes_)), place(form, bytes_.size()),
+        judge(source_, form, place), search(source_, form, place, judge, budget) {}
+
+private:
+  Bytes bytes_;
+  ByteSource source_;
+
+public:
+  Place place;
+  Judge judge;
+  Search search;
+};
+
+} // namespace
+
+/// What is searched in this machine's byte order and in the other one.
+class Searching : public testing::TestWithParam<bool>
+{
+protected:
+  ByteRows rows{GetParam()};
+  tav::inspect::Form form{.swapped = GetParam()};
+
+  void number() { rows.h64(4, 0, TAV_TYPE_UINT32, TAV_ELM_CMN_CPU_ONLINE).number(9, 4); }
+
+  /// A header that claims two numbers, which are all of its payload.
+  void around(uint16_t type)
+  {
+    rows.h64(40, 0, type, TAV_ELM_CMN_HOST_NAME);
+    number();
+    number();
+  }
+};
+
+INSTANTIATE_TEST_SUITE_P(Swapped, Searching, testing::Bool());
+
+TEST_P(Searching, FindsTheFirstNodeBehindNoise)
+{
+  rows.fill(33, 0x5A);
+  number();
+  number();
+  Searched it(rows.bytes, form);
+  Candidate found;
+  ASSERT_TRUE(it.search.findNext(0, rows.at(), found));
+  EXPECT_EQ(found.header().nodeOffset, 33U);
+  EXPECT_EQ(found.trust, Trust::followed);
+  EXPECT_EQ(it.search.firstSure(0, rows.at(), true), 33U);
+  ASSERT_TRUE(it.search.findNext(34, rows.at(), found));
+  EXPECT_EQ(found.header().nodeOffset, 53U);
+  EXPECT_FALSE(it.search.findNext(0, 33, found));
+  EXPECT_EQ(it.search.firstSure(0, 33, true), 33U);
+  EXPECT_FALSE(it.search.gaveUp());
+}
+
+TEST_P(Searching, FindsNodesWithTheOtherHeadersWhereSeveralFollowOneAnother)
+{
+  rows.fill(21, 0x5A);
+  for (int i = 0; i < 3; ++i)
+  {
+    rows.h32(4, TAV_TYPE_UINT32, TAV_ELM_CMN_CPU_ONLINE).number(9, 4);
+  }
+  Searched it(rows.bytes, form);
+  Candidate found;
+  ASSERT_TRUE(it.search.findNext(0, rows.at(), found));
+  EXPECT_EQ(found.header().nodeOffset, 21U);
+  EXPECT_EQ(found.header().hdrType, TAV_HDR_32);
+}
+
+TEST_P(Searching, GivesUpWhenItsBudgetIsUsedUp)
+{
+  rows.fill(40'000, 0x5A);
+  number();
+  number();
+  Searched it(rows.bytes, form, 1000);
+  Candidate found;
+  EXPECT_FALSE(it.search.findNext(0, rows.at(), found));
+  EXPECT_TRUE(it.search.gaveUp());
+}
+
+TEST_P(Searching, ATextThatNodesFillIsNotBelieved)
+{
+  around(TAV_TYPE_ASCII_STRING);
+  number();
+  Searched it(rows.bytes, form);
+  Candidate found = it.judge.look(0, true);
+  ASSERT_EQ(found.trust, Trust::followed);
+  EXPECT_FALSE(it.search.believe(found, Footing::sound));
+}
+
+TEST_P(Searching, BytesThatNodesFillAreBelieved)
+{
+  around(TAV_TYPE_BINARY);
+  number();
+  Searched it(rows.bytes, form);
+  Candidate found = it.judge.look(0, true);
+  ASSERT_EQ(found.trust, Trust::followed);
+  EXPECT_TRUE(it.search.believe(found, Footing::sound));
+  EXPECT_TRUE(it.search.believe(found, Footing::searched));
+}
+
+TEST_P(Searching, AClaimThatCoversNodesIsBelievedWhereNothingInItIsSurer)
+{
+  rows.h64(24, 0, TAV_TYPE_ASCII_STRING, TAV_ELM_CMN_HOST_NAME).fill(24, 'a').fill(20, 0x5A);
+  Searched sound(rows.bytes, form);
+  Candidate found = sound.judge.look(0, true);
+  ASSERT_EQ(found.trust, Trust::alone);
+  EXPECT_TRUE(sound.search.believe(found, Footing::damaged));
+  // The same with a node in the payload that goes on beyond its end.
+  rows = ByteRows(GetParam());
+  rows.h64(24, 0, TAV_TYPE_ASCII_STRING, TAV_ELM_CMN_HOST_NAME).fill(8, 'a');
+  number();
+  number();
+  rows.fill(20, 0x5A);
+  Searched covering(rows.bytes, form);
+  found = covering.judge.look(0, true);
+  ASSERT_EQ(found.trust, Trust::alone);
+  EXPECT_FALSE(covering.search.believe(found, Footing::damaged));
+}
+
+TEST_P(Searching, PaddingThatIsNotThereIsTakenAway)
+{
+  rows.h64(4, TAV_INFO_ALIGNED8, TAV_TYPE_BINARY, TAV_ELM_CMN_HOST_NAME).fill(4, 0xAA); // no padding follows
+  number();
+  number();
+  Searched it(rows.bytes, form);
+  Candidate found = it.judge.look(0, true);
+  ASSERT_EQ(found.end, 24U);
+  ASSERT_TRUE(it.search.believe(found, Footing::sound));
+  EXPECT_EQ(found.end, 20U);
+}
+
+TEST_P(Searching, ANodeOfAnUnknownTypeBetweenOthersIsAStranger)
+{
+  number();
+  rows.h64(12, 0, 77, TAV_ELM_CMN_CPU_ONLINE).fill(12, 0x5A);
+  number();
+  number();
+  Searched it(rows.bytes, form);
+  uint64_t end = 0;
+  EXPECT_TRUE(it.search.isStranger(it.judge.look(20, true).header(), end));
+  EXPECT_EQ(end, 48U);
+  EXPECT_FALSE(it.search.isStranger(it.judge.look(0, true).header(), end)); // its type is known
+}
+
+TEST_P(Searching, AGroupWhoseTypeIsDamagedIsNoStranger)
+{
+  rows.h64(40, 0, 77, TAV_ELM_CMN_SYSTEM);
+  number();
+  number();
+  number();
+  Searched it(rows.bytes, form);
+  uint64_t end = 0;
+  EXPECT_FALSE(it.search.isStranger(it.judge.look(0, true).header(), end));
+}
+
+TEST(Search, RemembersWhatItFoundAndNothingElse)
+{
+  size_t found = 0;
+  for (uint64_t seed = 0; seed < 40; ++seed)
+  {
+    SCOPED_TRACE(seed);
+    const Bytes bytes = test::damaged(test::namedStream(seed), seed);
+    Searched remembering(bytes, {});
+    std::mt19937_64 random(seed);
+    for (int i = 0; i < 30; ++i)
+    {
+      const uint64_t from = random() % bytes.size();
+      const uint64_t to = from + random() % (bytes.size() - from + 1);
+      const bool wide = random() % 4 != 0;
+      const uint64_t sure = remembering.search.firstSure(from, to, wide);
+      ASSERT_EQ(sure, Searched(bytes, {}).search.firstSure(from, to, wide)) << from << " to " << to;
+      found += sure < to ? 1 : 0;
+    }
+  }
+  EXPECT_GT(found, 200U);
+}
