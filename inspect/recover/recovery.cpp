@@ -25,7 +25,7 @@ bool Recovery::step()
     nesting_.closeAll();
     return false;
   }
-  if (enterEnding() || takeEnding())
+  if (enterLost() || takeEnding())
   {
     return true;
   }
@@ -129,19 +129,31 @@ bool Recovery::takeDamagedEnd()
   return true;
 }
 
+/// Enters the group that begins here by what its end element says, and searches its first bytes where its header is
+/// damaged; false when there is none.
+bool Recovery::enterLost()
+{
+  const Entered entered = enterEnding();
+  if (entered == Entered::headless)
+  {
+    gap();
+  }
+  return entered != Entered::none;
+}
+
 /// Where an end element says that a group begins whose header is damaged.
-bool Recovery::enterEnding()
+Recovery::Entered Recovery::enterEnding()
 {
   const Ending* const next = place_.lostGroup();
   if (next == nullptr || next->start != position())
   {
-    return false;
+    return Entered::none;
   }
   const Ending ending = *next;
   place_.passLostGroup();
   if (ending.end > place_.sureLimit() || !place_.canHold(true))
   {
-    return false;
+    return Entered::none;
   }
   TAVHeader header{};
   const bool whole = prober_.header(position(), true, source_.size(), header) && isGroup(header) &&
@@ -151,18 +163,14 @@ bool Recovery::enterEnding()
   nesting_.open({.start = position(), .limit = ending.end, .wide = ending.wide, .sure = true},
                 whole ? header : madeHeader(true, ending.wide, true));
   ledger_.setDamaged(!whole);
-  if (whole)
-  {
-    nesting_.countClosed();
-    keepHeader(header);
-  }
-  else
+  if (!whole)
   {
     ledger_.totals().made += place_.top().hidden ? 0 : 1;
-    // Its first bytes are searched, too: the distance can be the damaged part.
-    gap();
+    return Entered::headless;
   }
-  return true;
+  nesting_.countClosed();
+  keepHeader(header);
+  return Entered::whole;
 }
 
 /// A damaged pair is not where a node begins.
@@ -218,7 +226,7 @@ void Recovery::takeGroup(const Candidate& found)
   if (hasEyeSize(header) && found.trust != Trust::paired && !indexed_)
   {
     index(position());
-    if (enterEnding()) // its size is damaged; its end element knows
+    if (enterLost()) // its size is damaged; its end element knows
     {
       return;
     }
@@ -310,7 +318,12 @@ bool Recovery::endByZeros()
 void Recovery::gap()
 {
   index(position());
-  if (enterEnding())
+  Entered entered = Entered::headless;
+  while (entered == Entered::headless) // any number of end elements may lead here
+  {
+    entered = enterEnding();
+  }
+  if (entered == Entered::whole)
   {
     return;
   }

@@ -43,12 +43,21 @@ public:
   RecoveryTotals totals() const;
 
 private:
+  /// What was entered by an end element that leads back to the place.
+  enum class Entered : uint8_t
+  {
+    none,
+    whole,   ///< a group whose header is right but for its size
+    headless ///< a group whose header is lost; its bytes are searched, too: the distance can be the damaged part
+  };
+
   Footing footing() const { return ledger_.isDamaged() ? Footing::damaged : Footing::sound; }
   void index(uint64_t from);
   bool takeEnding();
   bool takeEnd(uint64_t offset, bool wide);
   bool takeDamagedEnd();
-  bool enterEnding();
+  bool enterLost();
+  Entered enterEnding();
   void trimPair(Candidate& found);
   void take(Candidate found);
   void takeGroup(const Candidate& found);

@@ -115,6 +115,21 @@ TEST_P(Recovering, AGroupThatHasLostItsHeaderComesBackByItsEndElement)
   EXPECT_EQ(back.stream, expected);
 }
 
+TEST_P(Recovering, AnyNumberOfEndElementsMayLeadToOnePlace)
+{
+  constexpr uint64_t kEnds = 100'000;
+  rows.h64(TAV_SIZE_UNKNOWN, TAV_INFO_EYE_SIZE, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+  const uint64_t lost = rows.at();
+  rows.fill(24, 0x5A);
+  for (uint64_t i = 0; i < kEnds; ++i)
+  {
+    rows.end64(rows.at() + 16 - lost);
+  }
+  const Recovered back(rows.bytes, form);
+  EXPECT_GT(back.totals.made, 3000U); // as deep as readers follow
+  EXPECT_EQ(back.totals.kept + back.totals.lost, rows.at());
+}
+
 TEST_P(Recovering, NodesThatHaveLostAllGroupsGetOne)
 {
   rows.fill(23, 0x5A);
