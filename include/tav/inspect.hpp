@@ -29,3 +29,4 @@
 #include "tav/inspect/textSource.hpp"
 #include "tav/inspect/value.hpp"
 #include "tav/inspect/walker.hpp"
+#include "tav/inspect/xml.hpp"

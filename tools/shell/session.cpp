@@ -1,5 +1,7 @@
 #include "tools/shell/session.h"
 
+#include <utility>
+
 #include "tav/dictionary.hpp"
 #include "tav/inspect.hpp"
 #include "tools/shell/input.h"
@@ -92,14 +94,17 @@ Stream openStream(const Invocation& invocation, bool lenient)
 }
 
 DamageNotices::DamageNotices(Stream& stream)
-    : stream_(stream), watch_(stream.bytes(), stream.form(), [this](PassedOver passed) {
-        ++places_;
-        if (passed_.size() < kMostLines)
-        {
-          passed_.push_back(std::move(passed));
-        }
-      })
+    : stream_(stream), watch_(stream.bytes(), stream.form(), [this](PassedOver passed) { add(std::move(passed)); })
 {
+}
+
+void DamageNotices::add(PassedOver passed)
+{
+  ++places_;
+  if (passed_.size() < kMostLines)
+  {
+    passed_.push_back(std::move(passed));
+  }
 }
 
 Status DamageNotices::tell() const

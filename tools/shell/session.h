@@ -50,7 +50,10 @@ public:
   DamageNotices(const DamageNotices&) = delete;
   DamageNotices& operator=(const DamageNotices&) = delete;
 
+  /// To be given every event of the command's own walk,
   void see(const Walker& walker, const Event& event) { watch_.see(walker, event); }
+  /// or what a walk of the library has passed over.
+  void add(PassedOver passed);
 
   /// Prints the lines; kFindings when there are some, else kFine.
   Status tell() const;
