@@ -22,6 +22,7 @@ namespace tav
 class ChildRange;
 class DescendantRange;
 class Path;
+class RootRange;
 namespace detail
 {
 class Printer;
@@ -297,6 +298,7 @@ private:
   friend class ChildRange;
   friend class DescendantRange;
   friend class Path;
+  friend class RootRange;
   friend class detail::Printer;
 
   /// A node of no known group.

@@ -15,6 +15,7 @@
 
 #include "tav/cpp/path.hpp"
 #include "tav/cpp/print.hpp"
+#include "tav/cpp/roots.hpp"
 
 namespace tav
 {
@@ -88,6 +89,19 @@ public:
   }
   Node root() const&& = delete;
   Node root(std::error_code& ec) const&& = delete;
+
+  /// The roots of all streams in the file, one behind another: see RootRange.
+  [[nodiscard]] RootRange roots() const&
+  {
+    return {state_.get(), nullptr};
+  }
+  [[nodiscard]] RootRange roots(std::error_code& ec) const& noexcept
+  {
+    ec.clear();
+    return {state_.get(), &ec};
+  }
+  RootRange roots() const&& = delete;
+  RootRange roots(std::error_code& ec) const&& = delete;
 
   /// The node at an offset. Nothing in the stream tells which header form stands there.
   [[nodiscard]] Node at(uint64_t offset, Width width = Width::bits64) const&
