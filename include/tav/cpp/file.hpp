@@ -18,12 +18,22 @@
 namespace tav
 {
 
+/// What becomes of a root that a killed writer left open, when another writer appends to its file.
+enum class OpenRoot : uint8_t
+{
+  close,  ///< it is closed behind its last whole node
+  resume, ///< it is gone on with: Writer::resumed
+  refuse  ///< TAV_RC_NOT_SUPPORTED, and the file stays as it is
+};
+
 /// How a file is written.
 struct FileOptions
 {
-  bool overwrite = false; ///< replace an existing file instead of refusing it; it stays as it is until finish()
-  bool inPlace = false;   ///< with overwrite: empty the file and write into it, whatever becomes of the writer
-  bool lock = true;       ///< refuse a file that another writer has locked, and lock it; false where there are no locks
+  bool overwrite = false;              ///< replace an existing file instead of refusing it; it stays as it is until finish()
+  bool inPlace = false;                ///< with overwrite: empty the file and write into it, whatever becomes of the writer
+  bool lock = true;                    ///< refuse a file that another writer has locked, and lock it; false where there are no locks
+  bool append = false;                 ///< go on behind the last stream of an existing file; begin a new one where there is none
+  OpenRoot openRoot = OpenRoot::close; ///< with append
 };
 
 namespace detail
@@ -33,7 +43,7 @@ namespace detail
 struct FileOutcome
 {
   uint32_t code = TAV_RC_OK;
-  const char* sentence = nullptr;
+  std::string sentence{};
 };
 
 /// A file's name in UTF-8, as it is opened and as messages show it.
@@ -59,7 +69,7 @@ inline uint32_t openFile(const std::filesystem::path& path, uint64_t options, st
 /// What there is to say when a file could not be opened.
 inline Told tellFile(const std::filesystem::path& path, const FileOutcome& outcome)
 {
-  return {fileText(path), outcome.sentence != nullptr ? outcome.sentence : ""};
+  return {fileText(path), outcome.sentence};
 }
 
 /// Whether a path leads to something that is no file: a device, a pipe.
@@ -161,7 +171,7 @@ public:
         temporary_ = std::move(beside);
       }
     }
-    return {rc, rc == TAV_RC_OK ? nullptr : "a file beside it cannot be made; FileOptions::inPlace needs none"};
+    return {rc, rc == TAV_RC_OK ? "" : "a file beside it cannot be made; FileOptions::inPlace needs none"};
   }
 
   /// Everything is written: makes sure of it, and gives the file its rights. It is open still.
@@ -228,7 +238,7 @@ inline FileOutcome openForWriting(const std::filesystem::path& path, const FileO
   if (!options.overwrite)
   {
     const FileOutcome fresh = openLocked(path, made | KOR_FILE_EXCLUSIVE, options.lock, storage);
-    if (fresh.sentence != nullptr && fresh.code != KOR_RC_LOCKED && fresh.code != KOR_RC_BUSY)
+    if (!fresh.sentence.empty() && fresh.code != KOR_RC_LOCKED && fresh.code != KOR_RC_BUSY)
     {
       std::error_code ignored;
       std::filesystem::remove(path, ignored); // it was made, and cannot be locked

@@ -9,6 +9,7 @@
 #include <span>
 #include <utility>
 
+#include "tav/cpp/append.hpp"
 #include "tav/cpp/group.hpp"
 #include "tav/cpp/updater.hpp"
 
@@ -47,16 +48,28 @@ public:
   /// Into a file, through a ring. An existing file is refused unless it is to be overwritten, and one that another
   /// writer has locked with KOR_RC_LOCKED. Until finish() a file that is overwritten stays as it is: the stream is
   /// written beside it, and takes its place, its mode and, where that is allowed, its owner. See FileOptions.
-  explicit Writer(const std::filesystem::path& path, const FileOptions& file = {}, const StreamOptions& options = {})
+  /// With FileOptions::append it goes on behind the last stream of an existing file, in that file's form: options that
+  /// are given must agree with it. A file of another form, a damaged one or one that is no stream is refused, and stays
+  /// as it is. See docs/producers.md for what is looked at, and what that costs.
+  explicit Writer(const std::filesystem::path& path, const FileOptions& file = {})
       : Writer(Unopened::state)
   {
-    const detail::FileOutcome opened = openPath(path, file, options);
-    detail::demand(opened.code, "opening for writing", [&] { return detail::tellFile(path, opened); });
+    demandPath(path, file, nullptr);
+  }
+  explicit Writer(const std::filesystem::path& path, const FileOptions& file, const StreamOptions& options)
+      : Writer(Unopened::state)
+  {
+    demandPath(path, file, &options);
+  }
+  Writer(const std::filesystem::path& path, const FileOptions& file, std::error_code& ec)
+      : Writer(Unopened::state)
+  {
+    detail::report(openPath(path, file, nullptr).code, ec);
   }
   Writer(const std::filesystem::path& path, const FileOptions& file, const StreamOptions& options, std::error_code& ec)
       : Writer(Unopened::state)
   {
-    detail::report(openPath(path, file, options).code, ec);
+    detail::report(openPath(path, file, &options).code, ec);
   }
 
   /// Into any storage, which outlives the writer.
@@ -76,6 +89,8 @@ public:
   {
     Writer former(std::move(*this)); // ends here, with its handle
     state_ = std::move(other.state_);
+    isResumed_ = other.isResumed_;
+    isAppended_ = other.isAppended_;
     return *this;
   }
   Writer(const Writer&) = delete;
@@ -107,6 +122,23 @@ public:
   {
     return group(elm, GroupOptions{}, ec);
   }
+  /// The root that OpenRoot::resume found open, to go on in it; a closed group when there is none. Without this call it
+  /// is closed by the next group() or by finish().
+  Group resumed() & noexcept
+  {
+    const bool isThere = isResumed_ && state_ && state_->handle != nullptr && state_->orphans == 1;
+    isResumed_ = false;
+    if (!isThere || state_->innermost != 0)
+    {
+      return Group(detail::WriterRef(nullptr), 0, 0);
+    }
+    state_->orphans = 0;
+    state_->innermost = 1;
+    state_->settle();
+    return Group(state_, 1, 0);
+  }
+  Group resumed() && = delete;
+
   Group group(ElementId, const GroupOptions& = {}) && = delete;
   Group group(ElementId, const GroupOptions&, std::error_code&) && = delete;
   Group group(ElementId, std::error_code&) && = delete;
@@ -197,9 +229,49 @@ private:
     return block.empty() ? TAV_RC_BAD_PARAM : open(state_->owned.get(), options);
   }
 
-  detail::FileOutcome openPath(const std::filesystem::path& path, const FileOptions& file,
-                               const StreamOptions& options)
+  void demandPath(const std::filesystem::path& path, const FileOptions& file, const StreamOptions* options)
   {
+    const detail::FileOutcome opened = openPath(path, file, options);
+    detail::demand(opened.code, "opening for writing", [&] { return detail::tellFile(path, opened); });
+  }
+
+  /// Behind the last stream of a file.
+  detail::FileOutcome openEnd(const std::filesystem::path& path, const FileOptions& file, const StreamOptions* given)
+  {
+    std::unique_ptr<TAVSSFile> storage;
+    detail::FileEnd found = detail::openToAppend(path, file, given, storage);
+    state_->owned = std::move(storage);
+    if (found.outcome.code != TAV_RC_OK)
+    {
+      return found.outcome;
+    }
+    StreamOptions options = given != nullptr ? *given : StreamOptions{};
+    options.byteOrder = found.form.swapped ? ByteOrder::swapped : ByteOrder::native;
+    options.root = found.form.wide ? Width::bits64 : Width::bits32;
+    options.align8 = found.form.aligned;
+    found.outcome.code = open(state_->owned.get(), options);
+    isResumed_ = file.openRoot == OpenRoot::resume && !found.open.empty();
+    if (found.outcome.code == TAV_RC_OK)
+    {
+      found.outcome.code = detail::continueAt(*state_->handle, found, isResumed_ ? 1 : 0);
+    }
+    if (found.outcome.code != TAV_RC_OK)
+    {
+      state_->letGo();
+      return found.outcome;
+    }
+    state_->orphans = isResumed_ ? 1 : 0;
+    isAppended_ = true;
+    return found.outcome;
+  }
+
+  detail::FileOutcome openPath(const std::filesystem::path& path, const FileOptions& file, const StreamOptions* given)
+  {
+    if (file.append)
+    {
+      return openEnd(path, file, given);
+    }
+    const StreamOptions options = given != nullptr ? *given : StreamOptions{};
     std::unique_ptr<TAVSSFile> storage;
     const detail::FileOutcome opened = detail::openForWriting(path, file, storage, state_->replacement);
     state_->owned = std::move(storage);
@@ -220,6 +292,10 @@ private:
     if (rc == TAV_RC_OK && state_->handle->pCircularBuf != nullptr)
     {
       rc = state_->handle->pCircularBuf->reset(); // tavTermHandle would hide a failure
+    }
+    if (rc == TAV_RC_OK && isAppended_)
+    {
+      rc = static_cast<TAVSSFile&>(*state_->owned).pFile->setSize(state_->handle->streamBytes);
     }
     if (rc == TAV_RC_OK && state_->replacement != nullptr)
     {
@@ -262,6 +338,8 @@ private:
   }
 
   detail::WriterRef state_;
+  bool isResumed_ = false;
+  bool isAppended_ = false; ///< to a file, which ends with the stream
 };
 
 } // namespace tav
