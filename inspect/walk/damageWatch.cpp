@@ -25,8 +25,10 @@ void DamageWatch::see(const Walker& walker, const Event& event)
 void DamageWatch::seeDamage(const Walker& walker, const Event& event)
 {
   PassedOver passed{.offset = event.offset, .length = event.length, .path = walker.path(event, PathStyle::brief)};
+  passed.reason = event.reason;
   passed.sentence = "passed over " + counted(event.length, "byte") + ": " + event.reason;
   passed.code = event.code;
+  passed.rule = event.code == TAV_RC_NO_MEMORY ? RuleId::headerCut : RuleId::damaged;
   if (event.depth == 0 && otherStreamAt(source_, form_, event.offset))
   {
     passed.sentence += "; " + fromText(source_, event.offset) + " reads it";
@@ -52,11 +54,14 @@ void DamageWatch::seeEnd(const Event& event)
   const bool file = cut.limit == source_.size();
   if (event.end != End::byEndElement && !(file && missing == paddingCut_))
   {
+    const std::string reason =
+        "ends " + counted(missing, "byte") + " past " + (file ? "the end of the file" : "its parent");
     sink_({.offset = cut.offset,
            .path = std::move(cut.path),
-           .sentence = "ends " + counted(missing, "byte") + " past " + (file ? "the end of the file" : "its parent") +
-                       ": what it lacks was passed over",
-           .code = file ? uint32_t{TAV_RC_DATA_TOO_LARGE} : uint32_t{TAV_RC_OUTSIDE_PARENT}});
+           .reason = reason,
+           .sentence = reason + ": what it lacks was passed over",
+           .code = file ? uint32_t{TAV_RC_DATA_TOO_LARGE} : uint32_t{TAV_RC_OUTSIDE_PARENT},
+           .rule = file ? RuleId::pastFile : RuleId::pastParent});
   }
 }
 

@@ -5,8 +5,11 @@
 #include <string>
 #include <vector>
 
+#include "tav/dictionary.hpp"
+#include "tav/inspect/form.hpp"
 #include "tav/inspect/jsonText.hpp"
 #include "tav/inspect/value.hpp"
+#include "tav/inspect/walker.hpp"
 
 namespace tav::inspect
 {
@@ -88,6 +91,15 @@ std::optional<FileKind> fileKindOf(ByteSource& source)
   const bool whole = bytes.size() == source.size();
   start = whole ? start : start.substr(0, cutAtCharacter(start, start.size() - std::min<size_t>(4, start.size())));
   return !start.empty() && isPlainText(start) ? std::optional(kindOfText(start)) : std::nullopt;
+}
+
+std::optional<FileKind> otherKindOf(ByteSource& source, const Recognition& found)
+{
+  Walker walker(source, found.form);
+  Event event;
+  const bool isRoot = found.isStream && walker.next(event) && event.what == What::nodeBegin && event.node.isGroup() &&
+                      !event.node.has(kOverrun) && !dictionary::nameOf(event.node.elm()).empty();
+  return isRoot ? std::nullopt : fileKindOf(source);
 }
 
 } // namespace tav::inspect

@@ -106,6 +106,16 @@ std::unique_ptr<ByteSource> ByteSource::open(const std::string& path, uint64_t r
   return std::make_unique<ByteSource>(path, std::move(file), ringBytes, from);
 }
 
+std::unique_ptr<ByteSource> ByteSource::window(uint64_t from, uint64_t ringBytes)
+{
+  from = std::min(from, size_);
+  if (!memory_.empty())
+  {
+    return std::make_unique<ByteSource>(name_, memory_.subspan(static_cast<size_t>(from)));
+  }
+  return std::make_unique<ByteSource>(name_, std::make_unique<StorageWindow>(*storage_, from_ + from), ringBytes);
+}
+
 ByteSource::Page& ByteSource::slotFor(uint64_t number)
 {
   size_t place = pages_.size();

@@ -4,9 +4,13 @@
 
 namespace tav::inspect
 {
-}
+struct Node;
+class Path;
+} // namespace tav::inspect
 
 namespace tav::tool
 {
 using namespace inspect;
-}
+using inspect::Node; // and not the C++ layer's
+using inspect::Path;
+} // namespace tav::tool

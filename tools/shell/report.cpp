@@ -11,25 +11,12 @@ namespace tav::tool
 std::string problemText(const Problem& problem, std::FILE* where)
 {
   const auto part = [where](const std::string& text) { return shown(text, where); };
-  std::string text = "tav: ";
-  if (!problem.file.empty())
+  Problem parts = problem;
+  for (std::string* const each : {&parts.file, &parts.path, &parts.sentence})
   {
-    text += part(problem.file) + ": ";
+    *each = part(*each);
   }
-  if (problem.offset)
-  {
-    text += hexOffset(*problem.offset);
-    text += problem.path.empty() ? ": " : " ";
-  }
-  if (!problem.path.empty())
-  {
-    text += part(problem.path) + ": ";
-  }
-  text += part(problem.sentence);
-  if (problem.code != TAV_RC_OK)
-  {
-    text += std::string(" (") + korCodeName(problem.code) + ")";
-  }
+  std::string text = "tav: " + problemLine(parts);
   if (!problem.hint.empty())
   {
     text += "\n     " + part(problem.hint);

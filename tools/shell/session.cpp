@@ -2,28 +2,12 @@
 
 #include <utility>
 
-#include "tav/dictionary.hpp"
 #include "tav/inspect.hpp"
 #include "tools/shell/input.h"
 #include "tools/shell/report.h"
 
 namespace tav::tool
 {
-
-namespace
-{
-
-/// Whether the first bytes are the header of a group that the dictionary knows and the file has room for: then they are
-/// nothing else, whatever they look like.
-bool beginsWithRoot(Stream& stream)
-{
-  Walker walker(stream.bytes(), stream.form());
-  Event event;
-  return stream.recognition.isStream && walker.next(event) && event.what == What::nodeBegin && event.node.isGroup() &&
-         !event.node.has(kOverrun) && !dictionary::nameOf(event.node.elm()).empty();
-}
-
-} // namespace
 
 FormChoice formChoice(const Invocation& invocation)
 {
@@ -60,9 +44,9 @@ Stream openStream(const Invocation& invocation, const std::string& path, uint64_
   const FormChoice choice = formChoice(invocation);
   stream.recognition = recognise(*stream.source, choice);
   const bool formGiven = choice.swapped || choice.root64 || choice.aligned;
-  if (!formGiven && !beginsWithRoot(stream))
+  if (!formGiven)
   {
-    stream.kind = fileKindOf(*stream.source);
+    stream.kind = otherKindOf(*stream.source, stream.recognition);
   }
   if (!stream.isStream() && !lenient)
   {

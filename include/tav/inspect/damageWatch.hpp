@@ -9,6 +9,7 @@
 
 #include "tav/inspect/api.hpp"
 #include "tav/inspect/form.hpp"
+#include "tav/inspect/rules.hpp"
 #include "tav/inspect/walker.hpp"
 
 namespace tav::inspect
@@ -18,10 +19,12 @@ namespace tav::inspect
 struct PassedOver
 {
   uint64_t offset = 0;
-  uint64_t length = 0; ///< of the bytes that are there; 0: none are
-  std::string path{};  ///< of the group around them, or of the group that claims them; shortened
-  std::string sentence{};
+  uint64_t length = 0;    ///< of the bytes that are there; 0: none are
+  std::string path{};     ///< of the group around them, or of the group that claims them; shortened
+  std::string reason{};   ///< why it could not be read
+  std::string sentence{}; ///< the same, and what became of it
   uint32_t code = TAV_RC_OK;
+  RuleId rule = RuleId::damaged;
 };
 
 /// Follows a walk and tells what it passes over: bytes that are no node, streams in another form, and groups that end

@@ -18,8 +18,14 @@ struct FileKind
   std::string_view hint; ///< what leads to a stream from there; empty: nothing does
 };
 
+struct Recognition;
+
 /// What the first bytes say that a file is; nothing when they say nothing. They alone do not rule out a stream: the
 /// size of its root can be any bytes.
 TAV_INSPECT_API std::optional<FileKind> fileKindOf(ByteSource& source);
+
+/// The same for a file whose form was found out and not given. Nothing when the first bytes are the header of a group
+/// that the dictionary knows and the file has room for: then they are nothing else, whatever they look like.
+TAV_INSPECT_API std::optional<FileKind> otherKindOf(ByteSource& source, const Recognition& found);
 
 } // namespace tav::inspect

@@ -24,6 +24,9 @@ struct Problem
   std::string hint{};               ///< what to do next; a line of its own
 };
 
+/// The problem as one line, without its hint.
+TAV_INSPECT_API std::string problemLine(const Problem& problem);
+
 /// Why a piece of work cannot go on.
 enum class Trouble : uint8_t
 {

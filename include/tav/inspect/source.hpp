@@ -52,12 +52,18 @@ public:
   /// Bytes from there on, as many as there were when it was opened.
   uint64_t size() const { return size_; }
 
+  /// Whether they lie in memory, where `view` gives all from an offset on for as long as they are there.
+  bool isMemory() const { return !memory_.empty(); }
+
   /// Copies bytes; fewer than asked only at the end. Throws Error when they cannot be read.
   TAV_INSPECT_API size_t read(uint64_t offset, std::span<uint8_t> to);
 
   /// The bytes from `offset` on as far as they are at hand, at least one unless `offset` is at or behind the end.
   /// Valid until the next call of any function of this object.
   TAV_INSPECT_API std::span<const uint8_t> view(uint64_t offset);
+
+  /// The same bytes from an offset on, through pages of its own. This object outlives it.
+  TAV_INSPECT_API std::unique_ptr<ByteSource> window(uint64_t from, uint64_t ringBytes = kDefaultRing);
 
   /// Names who is told, by offset, of each piece that is fetched while reading goes straight on; nobody when empty.
   void tellOfPieces(std::function<void(uint64_t)> told) { told_ = std::move(told); }

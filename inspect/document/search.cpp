@@ -1,0 +1,126 @@
+#include "inspect/document/search.h"
+
+#include <utility>
+
+#include "tav/inspect/phrases.hpp"
+
+namespace tav::inspect
+{
+
+namespace
+{
+
+Path pathOf(std::string_view text)
+{
+  Path path(text);
+  path.requireNames();
+  return path;
+}
+
+WalkStart startAt(const TAVHeader& node)
+{
+  return {.offset = node.nodeOffset, .wide = layout::is64(node)};
+}
+
+Form formOf(const SearchStart& start)
+{
+  Form form = start.form;
+  form.root64 = layout::is64(start.node); // which a walk from the first byte on takes from the form
+  return form;
+}
+
+} // namespace
+
+Search::Search(DocumentState& state, std::string_view path, OnDamage onDamage)
+    : Search(state, {}, false, path, onDamage)
+{
+}
+
+Search::Search(DocumentState& state, const SearchStart& start, std::string_view path, OnDamage onDamage)
+    : Search(state, start, !path.starts_with('/'), path, onDamage)
+{
+}
+
+Search::Search(DocumentState& state, const SearchStart& start, bool isBelow, std::string_view path, OnDamage onDamage)
+    : state_(state), path_(pathOf(path)), matcher_(path_), onDamage_(onDamage),
+      walk_(
+          *state.source, isBelow ? formOf(start) : state.recognition.form,
+          [this](const PassedOver& passed) { passOver(passed); }, isBelow ? startAt(start.node) : WalkStart{}),
+      isBelow_(isBelow)
+{
+}
+
+void Search::passOver(const PassedOver& passed)
+{
+  if (onDamage_ == OnDamage::skip)
+  {
+    state_.add(passed);
+    return;
+  }
+  throw Error(Problem{.file = state_.source->name(),
+                      .offset = passed.offset,
+                      .path = passed.path,
+                      .sentence = passed.reason,
+                      .code = passed.code});
+}
+
+bool Search::next()
+{
+  while (!isDone_ && walk_.next(event_))
+  {
+    const bool isOuter = isBelow_ && event_.depth == 0;
+    if (event_.what == What::nodeEnd && isOuter)
+    {
+      break; // what stands behind the node is not searched
+    }
+    if (event_.what != What::nodeBegin)
+    {
+      continue;
+    }
+    if (event_.depth == 0 && !isBelow_)
+    {
+      state_.learn(event_.offset, form());
+    }
+    const auto depth = static_cast<size_t>(event_.depth);
+    around_.resize(depth);
+    around_.push_back(event_.node.header);
+    if (!isOuter && isMatch())
+    {
+      return true;
+    }
+    if (!isOuter && event_.node.isGroup() && !matcher_.reachesBelow())
+    {
+      walk_.skip();
+    }
+  }
+  isDone_ = true;
+  return false;
+}
+
+bool Search::isMatch()
+{
+  Node node = event_.node;
+  node.depth -= isBelow_ ? 1 : 0;
+  return matcher_.matches(node);
+}
+
+tav::Node Search::read()
+{
+  std::error_code ec;
+  const Node& node = found();
+  const tav::Node read = state_.readerOf(form()).at(node.offset(), node.is64() ? Width::bits64 : Width::bits32, ec);
+  if (ec)
+  {
+    const uint32_t code = codeOf(ec);
+    const bool isLarge = code == TAV_RC_DATA_TOO_LARGE;
+    throw Error(Problem{.file = state_.source->name(),
+                        .offset = node.offset(),
+                        .path = walk_.walker().path(event_, PathStyle::brief),
+                        .sentence = std::string(codeSentence(code)),
+                        .code = code,
+                        .hint = isLarge ? "DocumentOptions::ringBytes is the most that a data element can have" : ""});
+  }
+  return read;
+}
+
+} // namespace tav::inspect

@@ -1,0 +1,42 @@
+/// What a document and its ranges share.
+#pragma once
+
+#include <array>
+#include <map>
+#include <memory>
+#include <vector>
+
+#include "tav/inspect/damageWatch.hpp"
+#include "tav/inspect/document.hpp"
+
+namespace tav::inspect
+{
+
+struct DocumentState
+{
+  static constexpr size_t kMostDamages = size_t{1} << 20U;
+
+  /// The state inside a document, for those who stand on one.
+  static DocumentState& of(const Document& document) { return *document.state_; }
+
+  /// The reader for streams of a form. Which header the first node has is told with each node.
+  tav::Reader& readerOf(const Form& form);
+
+  /// Enters what was passed over into the account.
+  void add(const PassedOver& passed);
+
+  /// The form of the stream that a node stands in which a walk has handed out.
+  Form formAt(uint64_t offset) const;
+
+  /// Remembers that a stream of this form begins at an offset.
+  void learn(uint64_t offset, const Form& form);
+
+  std::unique_ptr<ByteSource> source{};
+  Recognition recognition{};
+  uint64_t ringBytes = kDefaultRing;
+  std::vector<Damage> damage{};     ///< by offset, each place once
+  std::map<uint64_t, Form> forms{}; ///< where streams begin that are in another form than the one before
+  std::array<std::unique_ptr<tav::Reader>, 4> readers{};
+};
+
+} // namespace tav::inspect
