@@ -30,12 +30,15 @@ ROOMS = {
 }
 # libkor knows nothing of libtav.
 KOR_ROOMS = {"kor", "trace"}
-KOR_PUBLIC = {"tav/kor.h", "tav/codes.h", "tav/byteOrder.h"}
+KOR_PUBLIC = {"tav/kor.h", "tav/codes.h", "tav/byteOrder.h", "tav/decl.h"}
 KOR_HEADERS = {f"include/{header}" for header in KOR_PUBLIC}
+# What C programs may include, too, and the headers that it has for that.
+C_PUBLIC = ("include/tav/codes.h", "include/tav/elements.h", "include/tav/types.h", "include/tav/tav_c.h")
+C_HEADERS = {"stddef.h", "stdint.h"}
 # What the program's own files of a platform may use of kor, beside its public headers.
 FOR_HOST = {"kor/systemError.h", "kor/wideText.h", "kor/windows.h"}
 # Who may know the platform: the public headers that declare exports and turn bytes, and the files of each platform.
-PLATFORM_HEADERS = ("include/tav/kor.h", "include/tav/byteOrder.h")
+PLATFORM_HEADERS = ("include/tav/decl.h", "include/tav/kor.h", "include/tav/byteOrder.h")
 PLATFORM_FILE = re.compile(r"^(kor/(\w+(Posix|Windows)\.cpp|windows\.h)|tools/host/\w+(Posix|Windows)\.cpp)$")
 # Sources that are no room: they may include what they like, but must not ask for the platform.
 BESIDE = ("tests", "examples", "bench", "fuzz")
@@ -87,6 +90,8 @@ def include_error(name, room, opening, path):
         if (first in ROOMS and first in ROOMS[room]) or (room == "tools" and knows_platform(name) and path in FOR_HOST):
             return None
         return f"{room} must not include {path}"
+    if name in C_PUBLIC and path in C_HEADERS:
+        return None
     if path in STANDARD or knows_platform(name) or path.startswith(THIRD_PARTY.get(room, ())):
         return None
     return f"<{path}> is no header of the standard library; the system is reached through kor"

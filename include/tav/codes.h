@@ -1,9 +1,15 @@
 /// @file codes.h
 /// Every return code of the system with its name and its sentence, once. The constants, the names
-/// that `korCodeName` gives and the messages of the C++ layer all come from the list below.
+/// that `korCodeName` gives and the messages of the C++ layer all come from the list below. C and C++.
 #pragma once
 
+#if defined(__cplusplus)
 #include <cstdint>
+#else
+#include <stdint.h>
+#endif
+
+#include "tav/decl.h"
 
 // clang-format off
 // CODE(name, value, sentence)
@@ -50,6 +56,6 @@
   CODE(TAV_RC_NO_MORE_DATA,    0x900005A0, "all data of the node has been handed out")
 // clang-format on
 
-#define TAV_DEFINE_CODE(name, value, sentence) inline constexpr uint32_t name = value; ///< sentence
+#define TAV_DEFINE_CODE(name, value, sentence) TAV_CONSTANT uint32_t name = value; ///< sentence
 TAV_CODE_LIST(TAV_DEFINE_CODE)
 #undef TAV_DEFINE_CODE

@@ -7,14 +7,7 @@
 #include <cstdio>
 
 #include "tav/codes.h"
-
-#if defined(_WIN32)
-#define KOR_DECL_EXPORT __declspec(dllexport)
-#define KOR_DECL_IMPORT __declspec(dllimport)
-#else
-#define KOR_DECL_EXPORT __attribute__((visibility("default")))
-#define KOR_DECL_IMPORT __attribute__((visibility("default")))
-#endif
+#include "tav/decl.h"
 
 #if defined(KOR_STATIC)
 #define KOR_API

@@ -9,6 +9,7 @@
 
 #include "tav/elements.h"
 #include "tav/kor.h"
+#include "tav/types.h"
 
 static_assert(sizeof(void*) == 8, "libtav builds for 64-bit platforms");
 
@@ -35,29 +36,6 @@ inline constexpr uint8_t TAV_BYTE_ORDER_SWAPPED = 3; ///< `byteOrder` of a strea
 
 inline constexpr uint16_t TAV_HDR_32 = 1; ///< `hdrType` of a TAVHeader32
 inline constexpr uint16_t TAV_HDR_64 = 2; ///< `hdrType` of a TAVHeader64
-
-inline constexpr uint16_t TAV_TYPE_HEADER32 = 1; ///< a group whose children have 32-bit headers
-inline constexpr uint16_t TAV_TYPE_HEADER64 = 2; ///< a group whose children have 64-bit headers
-inline constexpr uint16_t TAV_TYPE_ASCII_STRING = 50;
-inline constexpr uint16_t TAV_TYPE_UINT8 = 51;
-inline constexpr uint16_t TAV_TYPE_SINT8 = 52;
-inline constexpr uint16_t TAV_TYPE_UINT16 = 53;
-inline constexpr uint16_t TAV_TYPE_SINT16 = 54;
-inline constexpr uint16_t TAV_TYPE_UINT32 = 55;
-inline constexpr uint16_t TAV_TYPE_SINT32 = 56;
-inline constexpr uint16_t TAV_TYPE_UINT64 = 57;
-inline constexpr uint16_t TAV_TYPE_SINT64 = 58;
-inline constexpr uint16_t TAV_TYPE_UTC_TIMESTAMP = 100;
-inline constexpr uint16_t TAV_TYPE_BINARY = 101;
-inline constexpr uint16_t TAV_TYPE_UTF8_STRING = 102; ///< a 16-bit code page, then the bytes
-inline constexpr uint16_t TAV_TYPE_UINT128 = 103;
-inline constexpr uint16_t TAV_TYPE_SINT128 = 104;
-inline constexpr uint16_t TAV_TYPE_BYTE = 105;
-inline constexpr uint16_t TAV_TYPE_UINT64_ARRAY = 106;
-
-inline constexpr uint32_t TAV_INFO_ALIGNED8 = 0x00100000; ///< the payload is padded to a multiple of 8
-inline constexpr uint32_t TAV_INFO_EYE_SIZE = 0x00400000; ///< the node ends with an eye/size pair
-inline constexpr uint32_t TAV_INFO_KEY_MASK = 0x7FF;      ///< the bits of `info` that searches compare
 
 inline constexpr uint64_t TAV_EYE_CATCHER = 0xC0DED5EEDDEC0DED; ///< first word of an eye/size pair
 inline constexpr uint64_t TAV_SIZE_UNKNOWN = ~uint64_t{0};      ///< `size` of an open group with a 64-bit header
