@@ -23,6 +23,7 @@
 #include "tav/inspect/problem.hpp"
 #include "tav/inspect/recover.hpp"
 #include "tav/inspect/rules.hpp"
+#include "tav/inspect/schema.hpp"
 #include "tav/inspect/scratch.hpp"
 #include "tav/inspect/similar.hpp"
 #include "tav/inspect/sink.hpp"
