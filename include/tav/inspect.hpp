@@ -7,6 +7,7 @@
 #pragma once
 
 #include "tav/inspect/checker.hpp"
+#include "tav/inspect/collect.hpp"
 #include "tav/inspect/damageWatch.hpp"
 #include "tav/inspect/diff.hpp"
 #include "tav/inspect/document.hpp"

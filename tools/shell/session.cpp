@@ -39,9 +39,14 @@ uint64_t ringBytes(const Invocation& invocation)
 
 Stream openStream(const Invocation& invocation, const std::string& path, uint64_t from, bool lenient)
 {
+  return openStream(invocation, path, from, formChoice(invocation), lenient);
+}
+
+Stream openStream(const Invocation& invocation, const std::string& path, uint64_t from, const FormChoice& choice,
+                  bool lenient)
+{
   const InputLimits limits{ringBytes(invocation), invocation.number("--spool-limit").value_or(kDefaultSpool)};
   Stream stream{openSource(path, limits, from), {}};
-  const FormChoice choice = formChoice(invocation);
   stream.recognition = recognise(*stream.source, choice);
   const bool formGiven = choice.swapped || choice.root64 || choice.aligned;
   if (!formGiven)

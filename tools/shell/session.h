@@ -39,6 +39,10 @@ uint64_t ringBytes(const Invocation& invocation);
 /// is no stream. With `lenient`, such a file is handed out all the same, with the most likely form.
 Stream openStream(const Invocation& invocation, const std::string& path, uint64_t from, bool lenient = false);
 
+/// The same with another choice of the form than that of the options.
+Stream openStream(const Invocation& invocation, const std::string& path, uint64_t from, const FormChoice& choice,
+                  bool lenient = false);
+
 /// The one FILE argument of most commands, from --from on.
 Stream openStream(const Invocation& invocation, bool lenient = false);
 

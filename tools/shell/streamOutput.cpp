@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <vector>
 
+#include "kor/host.h"
 #include "tools/shell/report.h"
 
 namespace tav::tool
@@ -20,6 +21,21 @@ void require(uint32_t code)
 }
 
 } // namespace
+
+std::string requireStreamOutput(const Invocation& invocation)
+{
+  const std::string& command = invocation.command().name;
+  std::string output = invocation.text("--output");
+  if (output.empty())
+  {
+    throw Failure(command + ": -o OUT is missing", "- is standard output");
+  }
+  if (isStandardOutput(output) && kor::isTerminal(stdout))
+  {
+    throw Failure(command + ": a stream is no text for a terminal", "-o FILE writes it to a file");
+  }
+  return output;
+}
 
 StreamOutput::StreamOutput(Output& out)
     : out_(out)

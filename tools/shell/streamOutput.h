@@ -11,6 +11,9 @@
 namespace tav::tool
 {
 
+/// The OUT of -o, which must be given. Throws Failure when it is missing, or standard output is a terminal.
+std::string requireStreamOutput(const Invocation& invocation);
+
 /// What goes to a file is written into it directly; what goes to standard output, a device or a pipe is kept in a
 /// temporary file until it is complete.
 class StreamOutput

@@ -92,7 +92,8 @@ COMMANDS = {"get": ("get", "{}", "--all", "**/cpuOnline"), "get --paths": ("get"
             "info --json": ("info", "{}", "--json"), "info --full": ("info", "{}", "--full"), "xml": ("xml", "{}"),
             "json": ("json", "{}"), "json --lines": ("json", "{}", "--lines"), "hex": ("hex", "{}"),
             "print": ("print", "{}"), "print --xml": ("print", "{}", "--xml"), "diff": ("diff", "{}", "{}"),
-            "diff --json": ("diff", "{}", "{}", "--json"), "schema": ("schema", "{}"), "schema --json": ("schema", "{}", "--json")}
+            "diff --json": ("diff", "{}", "{}", "--json"), "cat": ("cat", "{}", "-o", "-"),
+            "schema": ("schema", "{}"), "schema --json": ("schema", "{}", "--json")}
 
 
 class Damage(ToolTest):

@@ -1,0 +1,112 @@
+#include <string>
+#include <vector>
+
+#include <gmock/gmock.h>
+
+#include "inspect/streams.h"
+
+using namespace tav::inspect;
+using test::Bytes;
+
+namespace
+{
+
+bool differ(const Bytes& a, const tav::inspect::Form& formA, const Bytes& b, const tav::inspect::Form& formB)
+{
+  ByteSource first("a", std::span<const uint8_t>(a));
+  ByteSource second("b", std::span<const uint8_t>(b));
+  return diff({first, formA}, {second, formB}, {}, [](const Difference& difference) {
+    ADD_FAILURE() << (difference.before ? difference.before->path : difference.after->path) << "  "
+                  << difference.sentence;
+  });
+}
+
+Bytes empties(size_t count, bool wide)
+{
+  tav::Writer writer({.root = wide ? tav::Width::bits64 : tav::Width::bits32});
+  for (size_t i = 0; i < count; ++i)
+  {
+    const tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM);
+  }
+  writer.finish();
+  const auto view = writer.bytes();
+  const auto* const first = reinterpret_cast<const uint8_t*>(view.data());
+  return {first, first + view.size()};
+}
+
+} // namespace
+
+class CollectInAForm : public testing::TestWithParam<std::tuple<bool, bool, bool>>
+{
+};
+
+INSTANTIATE_TEST_SUITE_P(Forms, CollectInAForm, testing::Combine(testing::Bool(), testing::Bool(), testing::Bool()));
+
+TEST_P(CollectInAForm, KeepsNodesAndValues)
+{
+  const auto [swap, align, wide] = GetParam();
+  const tav::inspect::Form form{.swapped = swap, .root64 = wide, .aligned = align};
+  for (uint64_t seed = 1; seed < 40; ++seed)
+  {
+    const bool otherSwap = seed % 2 == 0;
+    const bool otherAlign = seed % 3 == 0;
+    const Bytes bytes = test::namedStream(seed, otherSwap, otherAlign);
+    const tav::inspect::Form own{.swapped = otherSwap, .root64 = true, .aligned = otherAlign};
+    ByteSource source("x", std::span<const uint8_t>(bytes));
+    test::Made made;
+    Collector collector(made.file(), {.form = {.swapped = swap, .root64 = wide, .aligned = align}});
+    collector.add(source, own);
+    collector.finish();
+    EXPECT_EQ(collector.roots(), 1U);
+    EXPECT_FALSE(differ(bytes, own, made.bytes(), form)) << seed;
+  }
+}
+
+TEST(Collect, TakesTheFormOfTheFirstSource)
+{
+  const Bytes first = test::namedStream(3, true, true);
+  const Bytes second = test::namedStream(4);
+  ByteSource a("a", std::span<const uint8_t>(first));
+  ByteSource b("b", std::span<const uint8_t>(second));
+  test::Made made;
+  Collector collector(made.file());
+  collector.add(a, {.swapped = true, .root64 = true, .aligned = true});
+  const uint64_t behind = made.file().length();
+  collector.add(b, {});
+  collector.finish();
+  const Bytes all = made.bytes();
+  EXPECT_EQ(Bytes(all.begin(), all.begin() + static_cast<ptrdiff_t>(behind)), first);
+  EXPECT_FALSE(differ(second, {}, {all.begin() + static_cast<ptrdiff_t>(behind), all.end()},
+                      {.swapped = true, .root64 = true, .aligned = true}));
+}
+
+TEST(Collect, GivesAnEmptyRootAnEndElementWhereAnotherFollows)
+{
+  const Bytes one = empties(1, true);
+  ByteSource source("x", std::span<const uint8_t>(one));
+  test::Made made;
+  Collector collector(made.file());
+  collector.add(source, {});
+  collector.add(source, {});
+  collector.finish();
+  const Bytes bytes = made.bytes();
+  EXPECT_EQ(bytes.size(), 16U + 32U + 16U);
+  ByteSource again("y", std::span<const uint8_t>(bytes));
+  Walker walker(again, {});
+  uint64_t roots = 0;
+  for (Event event; walker.next(event);)
+  {
+    roots += event.what == What::nodeBegin && event.depth == 0 ? 1 : 0;
+  }
+  EXPECT_EQ(roots, 2U);
+}
+
+TEST(Collect, RefusesAnEmptyNarrowRootBeforeAnother)
+{
+  const Bytes one = empties(1, false);
+  ByteSource source("x", std::span<const uint8_t>(one));
+  test::Made made;
+  Collector collector(made.file());
+  collector.add(source, {.root64 = false});
+  EXPECT_THROW(collector.add(source, {.root64 = false}), Error);
+}
