@@ -11,6 +11,7 @@
 #include "tav/inspect/damageWatch.hpp"
 #include "tav/inspect/diff.hpp"
 #include "tav/inspect/document.hpp"
+#include "tav/inspect/edit.hpp"
 #include "tav/inspect/fileKind.hpp"
 #include "tav/inspect/form.hpp"
 #include "tav/inspect/json.hpp"

@@ -12,7 +12,7 @@ import unittest
 from ctypes import POINTER, byref, c_char, c_char_p, c_int, c_int32, c_int64, c_size_t, c_uint8, c_uint16, c_uint32, \
     c_uint64, c_void_p
 
-HEADER = pathlib.Path(__file__).resolve().parents[2] / "include/tav/tav_c.h"
+HEADER = pathlib.Path(__file__).resolve().parents[3] / "include/tav/tav_c.h"
 OK, NO_MORE_CHILDREN, NOT_FOUND, BAD_PARAM = 0, 0x90000596, 0x9000059B, 0x9000000C
 
 

@@ -31,7 +31,8 @@ class Outputs(ToolTest):
         document.write_text(tav("json", self.path).out, encoding="utf-8")
         limit = lambda: resource.setrlimit(resource.RLIMIT_FSIZE, (16, 16))  # noqa: E731
         for arguments in (["snapshot"], ["build", document], ["recover", self.path], ["extract", self.path, "/system"],
-                          ["cat", self.path]):
+                          ["cat", self.path],
+                          ["set", self.path, "/system/host/hostName", "longer-than-before"]):
             with self.subTest(arguments[0]):
                 error = self.refused(*arguments, "-o", self.folder / "y.tav", preexec_fn=limit)
                 self.assertIn("KOR_RC_FILE_TOO_LARGE", error)
@@ -52,6 +53,7 @@ class Outputs(ToolTest):
                           ("build", self.path, "-o", self.path), ("diff", self.path, self.path, "--trace", self.path),
                           ("recover", self.path, "-o", self.folder / "saved", "--report", self.path),
                           ("extract", self.path, "/system", "-o", self.path), ("cat", self.path, "-o", self.path),
+                          ("set", self.path, "/system/host/hostName", "x", "-o", self.path),
                           ("tree", self.path, "--trace", self.folder / "." / "x.tav")):
             for force in ((), ("--force",)):
                 with self.subTest(arguments=arguments, force=force):
