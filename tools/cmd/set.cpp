@@ -1,8 +1,8 @@
 // tav set: other values for nodes.
 #include <filesystem>
 
-#include "kor/host.h"
 #include "tav/inspect.hpp"
+#include "tools/host/host.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/progress.h"
@@ -80,7 +80,7 @@ void writeInPlace(const std::string& path, Editor& editor)
 void requirePlace(const std::string& path)
 {
   std::error_code error;
-  if (path == "-" || !std::filesystem::is_regular_file(kor::pathOf(path), error))
+  if (path == "-" || !std::filesystem::is_regular_file(host::pathOf(path), error))
   {
     throw Failure("set: only a file can be changed where it is", "-o OUT writes a new one");
   }

@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <vector>
 
-#include "kor/host.h"
+#include "tools/host/host.h"
 #include "tools/shell/report.h"
 
 namespace tav::tool
@@ -30,7 +30,7 @@ std::string requireStreamOutput(const Invocation& invocation)
   {
     throw Failure(command + ": -o OUT is missing", "- is standard output");
   }
-  if (isStandardOutput(output) && kor::isTerminal(stdout))
+  if (isStandardOutput(output) && host::isTerminal(stdout))
   {
     throw Failure(command + ": a stream is no text for a terminal", "-o FILE writes it to a file");
   }
