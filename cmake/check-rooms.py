@@ -67,8 +67,9 @@ PLATFORM_TEST = re.compile(
     r"__BYTE_ORDER__|__BYTE_ORDER|__ORDER_\w+_ENDIAN__|__(?:BIG|LITTLE)_ENDIAN__|WORDS_BIGENDIAN|"
     r"std::endian|htonl|htons|ntohl|ntohs|hto[bl]e(?:16|32|64)|[bl]e(?:16|32|64)toh)\b"
 )
-# Tricks with the compiler, and the one file of the libraries that may hold them.
-TRICK = re.compile(r"__asm__|\basm\b|gnu::used|\bconst volatile\b")
+# Tricks with the compiler, and the one file of the libraries that may hold them. What a signal's handler looks at has
+# to be volatile, which is none.
+TRICK = re.compile(r"__asm__|\basm\b|gnu::used|\bvolatile\b(?! std::sig_atomic_t)")
 TRICK_FILE = "core/word.h"
 COMMENT = re.compile(r"//.*$")
 

@@ -71,11 +71,17 @@ class CheckRooms(unittest.TestCase):
                 self.assertEqual(len(findings(name, line)), 1)
 
     def test_keeps_tricks_with_the_compiler_in_one_file(self):
-        for line in ['__asm__("" ::: "memory");', "[[gnu::noinline, gnu::used]] void f();", "const volatile int& a = b;"]:
+        for line in [
+            '__asm__("" ::: "memory");',
+            "[[gnu::noinline, gnu::used]] void f();",
+            "const volatile int& a = b;",
+            "static_cast<volatile int&>(a) = b;",
+        ]:
             with self.subTest(line=line):
                 self.assertEqual(len(findings("include/tav/layout.hpp", line)), 1)
                 self.assertEqual(len(findings("core/step.h", line)), 1)
                 self.assertEqual(findings("core/word.h", line), [])
+        self.assertEqual(findings("tools/host/host.cpp", "volatile std::sig_atomic_t held = 0;"), [])
 
     def test_keeps_the_platform_in_kor(self):
         for name, line in [
