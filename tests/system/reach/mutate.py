@@ -40,8 +40,8 @@ GROUPS = {
         "storage/cachedRun.h",
     ],
     "writer": [
-        "api/addNode.cpp", "api/addString.cpp", "api/rawWrite.cpp", "api/rawWrite.h", "api/closeGroup.cpp",
-        "api/updateElement.cpp",
+        "api/addNode.cpp", "api/addStream.cpp", "api/addString.cpp", "api/rawWrite.cpp", "api/rawWrite.h",
+        "api/closeGroup.cpp", "api/updateElement.cpp",
     ],
 }
 # The test programs, in the order in which they are likely to notice, without the few tests that take seconds each.
