@@ -3,10 +3,11 @@
 
     check-rooms.py [ROOT]
 
-Includes point one way: tools -> inspect -> api -> core -> storage, dictionary -> format -> trace -> kor. The system, its headers and
-the byte order are kor's business, which has a file a platform: names that end in Posix or Windows. What the program
-alone asks of the system is in tools/host, by the same rule. No other source asks for the platform, tests and examples
-included. What keeps a compiler from its work stands in one file.
+Includes point one way: tools -> inspect -> api -> core -> storage, dictionary -> format -> trace -> kor. The system, its
+headers and the byte order are kor's business, which has a file a platform: names that end in Posix or Windows. What the
+program alone asks of the system is in tools/host, by the same rule. No other source asks for the platform, tests and
+examples included. What keeps a compiler from its work stands in one file. The inspection library names no option of the
+program.
 
 Names in `tav` itself are those of the installed headers: what stays inside the library is in `tav::inside`, and the
 steps are in `tav::core`.
@@ -71,6 +72,10 @@ PLATFORM_TEST = re.compile(
 # to be volatile, which is none.
 TRICK = re.compile(r"__asm__|\basm\b|gnu::used|\bvolatile\b(?! std::sig_atomic_t)")
 TRICK_FILE = "core/word.h"
+# A text of the inspection library that names an option of the program: each program has its own.
+TEXT = re.compile(r'"(?:[^"\\]|\\.)*"')
+OPTION = re.compile(r"(?<![-\w])--[a-z][a-z-]*")
+INSPECT = ("inspect/", "include/tav/inspect")
 COMMENT = re.compile(r"//.*$")
 
 
@@ -112,6 +117,9 @@ def check_text(name, text):
         trick = TRICK.search(COMMENT.sub("", line))
         if trick and name != TRICK_FILE:
             yield number, f"{trick[0]}: tricks with the compiler stand in {TRICK_FILE}"
+        option = name.startswith(INSPECT) and OPTION.search(" ".join(TEXT.findall(line)))
+        if option:
+            yield number, f"{option[0]}: options are the program's; a Remedy tells it what helps"
         if match:
             error = include_error(name, room, match["open"], match["path"])
             if error:

@@ -61,11 +61,11 @@ Checker::Checker(ByteSource& source, const Form& form, std::function<bool(RuleId
   groups_.push_back(file);
 }
 
-void Checker::found(RuleId rule, uint64_t offset, uint64_t length, std::string sentence)
+void Checker::found(RuleId rule, uint64_t offset, uint64_t length, std::string sentence, bool otherStream)
 {
   if (wanted_(rule))
   {
-    sink_({rule, offset, length, path(), std::move(sentence)});
+    sink_({rule, offset, length, path(), std::move(sentence), otherStream});
   }
 }
 
@@ -461,8 +461,8 @@ void Checker::checkDamage()
     const auto other = otherStreamAt(source_, form_, event_.offset);
     found(RuleId::behindStream, event_.offset, event_.length,
           counted(event_.length, "byte") + " behind the stream" +
-              (other ? ": " + otherStreamText(*other) + "; " + fromText(source_, event_.offset) + " reads it"
-                     : " that are no node"));
+              (other ? ": " + otherStreamText(*other) : " that are no node"),
+          other.has_value());
     return;
   }
   if (checkCutHeader())

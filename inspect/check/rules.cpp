@@ -8,10 +8,11 @@ namespace tav::inspect
 namespace
 {
 
-constexpr std::string_view k32 = "--byte-order little --root 32 --no-align";
-constexpr std::string_view k64 = "--byte-order little --root 64 --no-align";
-constexpr std::string_view k32Padded = "--byte-order little --root 32 --align";
-constexpr std::string_view k64Padded = "--byte-order little --root 64 --align";
+constexpr bool kSwapped = !kor::isLittleEndian; ///< the examples are little-endian
+constexpr Form k32{.swapped = kSwapped, .root64 = false};
+constexpr Form k64{.swapped = kSwapped};
+constexpr Form k32Padded{.swapped = kSwapped, .root64 = false, .aligned = true};
+constexpr Form k64Padded{.swapped = kSwapped, .aligned = true};
 
 constexpr std::array<Rule, static_cast<size_t>(RuleId::count)> kRules{{
     {RuleId::headerCut, "header-cut", false, TAV_RC_NO_MEMORY, "The file ends inside a header.",
@@ -43,8 +44,7 @@ constexpr std::array<Rule, static_cast<size_t>(RuleId::count)> kRules{{
      "A root has to be a group; the library refuses to write anything else.", k32, "01000000 3300 C7EA 07", 0},
     {RuleId::groupOpen, "group-open", false, TAV_RC_NOT_FOUND,
      "A group was never closed: its size is all ones, or 0 although it has children, and no end element ends it.",
-     "Readers take all that follows for its children, or see none. A writer that was stopped leaves this; tav recover "
-     "closes it.",
+     "Readers take all that follows for its children, or see none. A writer that was stopped leaves this.",
      k32, "FFFFFFFF 0100 1400 01000000 3300 C7EA 07", 0},
     {RuleId::sizeUnknown, "size-unknown", true, TAV_RC_OK, "A group's size is all ones; its end element ends it.",
      "It reads, but to step over it every byte has to be searched for the end element.", k64,

@@ -18,7 +18,7 @@ void StreamEncoder::setForm(const Form& form)
   reorder_ = form_.swapped != form.swapped;
   if (conversion_.eyeSize && !form_.root64)
   {
-    throw Error("build: eye/size pairs need 64-bit headers", "--root 64 makes them");
+    throw Error(Problem{.sentence = "eye/size pairs need 64-bit headers", .remedy = Remedy::makeWide});
   }
 }
 

@@ -49,8 +49,8 @@ void goToOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offse
     Problem problem{source.name(), offset};
     problem.sentence = "no node begins there";
     problem.code = TAV_RC_NOT_FOUND;
-    problem.hint = (before->empty() ? "" : *before + "\n     ") + "'tav hex --at " + hexOffset(offset) +
-                   "' shows the bytes there";
+    problem.hint = *before;
+    problem.remedy = Remedy::showBytes;
     throw Error(problem, Trouble::notFound);
   }
 }

@@ -92,8 +92,9 @@ void Rebuilder::close()
   const uint64_t size = out_.length() - start;
   if (!is64(group) && size >= kSizeUnknown32)
   {
-    throw Error("a group with a 32-bit header would get more than 4 GiB",
-                "the stream was no 32-bit one; --root 64 reads it otherwise");
+    throw Error(Problem{.sentence = "a group with a 32-bit header would get more than 4 GiB",
+                        .hint = "the stream was no 32-bit one",
+                        .remedy = Remedy::readWide});
   }
   is64(group) ? void(group.hdr64.size = size) : void(group.hdr32.size = static_cast<uint32_t>(size));
   std::array<uint8_t, kHeaderSize64> bytes{};

@@ -29,10 +29,7 @@ void DamageWatch::seeDamage(const Walker& walker, const Event& event)
   passed.sentence = "passed over " + counted(event.length, "byte") + ": " + event.reason;
   passed.code = event.code;
   passed.rule = event.code == TAV_RC_NO_MEMORY ? RuleId::headerCut : RuleId::damaged;
-  if (event.depth == 0 && otherStreamAt(source_, form_, event.offset))
-  {
-    passed.sentence += "; " + fromText(source_, event.offset) + " reads it";
-  }
+  passed.otherStream = event.depth == 0 && otherStreamAt(source_, form_, event.offset).has_value();
   sink_(std::move(passed));
 }
 

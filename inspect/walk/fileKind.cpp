@@ -26,18 +26,18 @@ struct Magic
 };
 
 constexpr std::array<Magic, 10> kMagics{{
-    {"\x1F\x8B\x08"sv, {"gzip", "a gzip file", "'gzip -dc FILE | tav info -' looks into what it holds"}},
-    {"PK\x03\x04"sv, {"zip", "a zip file", "'unzip -p FILE NAME | tav info -' looks into what it holds"}},
-    {"PK\x05\x06"sv, {"zip", "a zip file", "it is empty"}},
-    {"PK\x07\x08"sv, {"zip", "a zip file", "'unzip -p FILE NAME | tav info -' looks into what it holds"}},
-    {"\x28\xB5\x2F\xFD"sv, {"zstd", "a zstd file", "'zstd -dc FILE | tav info -' looks into what it holds"}},
+    {"\x1F\x8B\x08"sv, {"gzip", "a gzip file"}},
+    {"PK\x03\x04"sv, {"zip", "a zip file"}},
+    {"PK\x05\x06"sv, {"zip", "a zip file", true}},
+    {"PK\x07\x08"sv, {"zip", "a zip file"}},
+    {"\x28\xB5\x2F\xFD"sv, {"zstd", "a zstd file"}},
     {"\x7F"
      "ELF"sv,
-     {"elf", "an ELF file", ""}},
-    {"SQLite format 3\0"sv, {"sqlite", "an SQLite database", ""}},
-    {"PAR1"sv, {"parquet", "a Parquet file", ""}},
-    {"\xFF\xFE<\0"sv, {"xml", "XML in UTF-16", ""}},
-    {"\xFE\xFF\0<"sv, {"xml", "XML in UTF-16", ""}},
+     {"elf", "an ELF file"}},
+    {"SQLite format 3\0"sv, {"sqlite", "an SQLite database"}},
+    {"PAR1"sv, {"parquet", "a Parquet file"}},
+    {"\xFF\xFE<\0"sv, {"xml", "XML in UTF-16"}},
+    {"\xFE\xFF\0<"sv, {"xml", "XML in UTF-16"}},
 }};
 
 constexpr size_t kLook = size_t{64} * 1024;
@@ -61,16 +61,16 @@ FileKind kindOfText(std::string_view text)
   const char next = second == std::string_view::npos ? '\0' : text[second + 1];
   if (text.starts_with('{') && (next == '"' || next == '}' || next == '\0'))
   {
-    return {"json", "JSON", "'tav build FILE -o OUT' makes a stream of what 'tav json' wrote"};
+    return {"json", "JSON"};
   }
   const bool value = next == '[' || next == '{' || next == '"' || next == ']' || next == '-' || next == 't' ||
                      next == 'f' || next == 'n' || (next >= '0' && next <= '9');
   if (text.starts_with('[') && value)
   {
-    return {"json", "JSON", "'tav build FILE -o OUT' makes a stream of what 'tav json' wrote"};
+    return {"json", "JSON"};
   }
   const bool letter = (next >= 'a' && next <= 'z') || (next >= 'A' && next <= 'Z') || next == '?' || next == '!';
-  return text.starts_with('<') && letter ? FileKind{"xml", "XML", ""} : FileKind{"text", "text", ""};
+  return text.starts_with('<') && letter ? FileKind{"xml", "XML"} : FileKind{"text", "text"};
 }
 
 } // namespace

@@ -406,18 +406,18 @@ std::vector<Form> notRefuted(const ByteSource& source, const std::vector<Trial>&
   return forms;
 }
 
-void explainPadding(const std::vector<Trial>& trials, std::vector<std::string>& because)
+void explainPadding(const std::vector<Trial>& trials, std::vector<Reason>& because)
 {
   const Trial& best = trials.front();
   if (best.alignBits != 0)
   {
-    because.push_back(std::to_string(best.alignBits) + " of " + counted(best.wide, "64-bit header") +
-                      " announce padding to 8");
+    because.push_back({std::to_string(best.alignBits) + " of " + counted(best.wide, "64-bit header") +
+                       " announce padding to 8"});
     return;
   }
   if (best.wide != 0 && !best.form.aligned)
   {
-    because.emplace_back("no 64-bit header announces padding");
+    because.push_back({"no 64-bit header announces padding"});
     return;
   }
   const auto other = std::find_if(trials.begin(), trials.end(), [&](const Trial& t) {
@@ -429,45 +429,44 @@ void explainPadding(const std::vector<Trial>& trials, std::vector<std::string>& 
     return;
   }
   const bool same = other->signature == best.signature;
-  because.emplace_back(same                ? "with and without padding to 8 the same nodes are found"
-                       : best.form.aligned ? "nodes are found on the way only when payloads are padded to 8"
-                                           : "nodes are found on the way only when payloads are not padded");
+  because.push_back({same                ? "with and without padding to 8 the same nodes are found"
+                     : best.form.aligned ? "nodes are found on the way only when payloads are padded to 8"
+                                         : "nodes are found on the way only when payloads are not padded"});
 }
 
-std::vector<std::string> explain(const ByteSource& source, const std::vector<Trial>& trials, const Recognition& result)
+std::vector<Reason> explain(const std::vector<Trial>& trials, const Recognition& result)
 {
   const Trial& best = trials.front();
-  std::vector<std::string> because;
+  std::vector<Reason> because;
   if (result.damagedStart)
   {
-    because.push_back("the first node is damaged; the first whole one is at " + hexOffset(best.first.offset()));
+    because.push_back({"the first node is damaged; the first whole one is at " + hexOffset(best.first.offset())});
   }
   else
   {
-    because.push_back("the first header, read as " + std::string(best.form.root64 ? "64" : "32") + "-bit " +
-                      orderText(best.form) + ", is that of a group, " + elementText(best.first.elm()));
+    because.push_back({"the first header, read as " + std::string(best.form.root64 ? "64" : "32") + "-bit " +
+                       orderText(best.form) + ", is that of a group, " + elementText(best.first.elm())});
   }
-  because.push_back(std::to_string(best.named) + " of the first " + counted(best.nodes, "node") +
-                    " have an element of the dictionary and a size that suits the type");
+  because.push_back({std::to_string(best.named) + " of the first " + counted(best.nodes, "node") +
+                     " have an element of the dictionary and a size that suits the type"});
   if (best.damages != 0)
   {
-    because.push_back(counted(best.damages, "place") + " among them cannot be read in any way");
+    because.push_back({counted(best.damages, "place") + " among them cannot be read in any way"});
   }
   if (best.eyes + best.otherEyes != 0)
   {
-    because.push_back(counted(best.eyes, "eye catcher") + " in this byte order, " + std::to_string(best.otherEyes) +
-                      " in the other");
+    because.push_back({counted(best.eyes, "eye catcher") + " in this byte order, " + std::to_string(best.otherEyes) +
+                       " in the other"});
   }
   if (best.otherAt != 0)
   {
-    because.push_back("at " + hexOffset(best.otherAt) + " " + otherStreamText(best.otherForm) + "; " +
-                      fromText(source, best.otherAt) + " reads it");
+    because.push_back({"at " + hexOffset(best.otherAt) + " " + otherStreamText(best.otherForm), best.otherAt});
   }
   explainPadding(trials, because);
   if (best.extras + best.plainStrings != 0)
   {
-    because.push_back(std::to_string(best.extras) + " of " + counted(best.extras + best.plainStrings, "UTF-8 string") +
-                      " have two uncounted bytes behind them");
+    because.push_back({std::to_string(best.extras) + " of " + counted(best.extras + best.plainStrings, "UTF-8 string") +
+                       " have two uncounted bytes behind them"});
   }
   return because;
 }
@@ -505,8 +504,8 @@ Recognition recognise(ByteSource& source, const FormChoice& choice)
     result.form.swapped = choice.swapped.value_or(false);
     result.form.root64 = choice.root64.value_or(true);
     result.form.aligned = choice.aligned.value_or(false);
-    result.because.emplace_back(source.size() == 0 ? "the file is empty"
-                                                   : "no node is found, whichever way it is read");
+    result.because.push_back({source.size() == 0 ? "the file is empty"
+                                                 : "no node is found, whichever way it is read"});
     return result;
   }
   const Trial& best = trials.front();
@@ -534,7 +533,7 @@ Recognition recognise(ByteSource& source, const FormChoice& choice)
       result.possible.push_back(formOf(other));
     }
   }
-  result.because = explain(source, trials, result);
+  result.because = explain(trials, result);
   return result;
 }
 

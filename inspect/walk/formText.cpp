@@ -12,11 +12,6 @@ std::string otherStreamText(const Form& form)
          "-bit root header";
 }
 
-std::string fromText(const ByteSource& source, uint64_t offset)
-{
-  return "--from " + hexOffset(source.from() + offset);
-}
-
 std::string orderText(const Form& form)
 {
   return form.swapped != kor::isLittleEndian ? "little-endian" : "big-endian";

@@ -71,7 +71,10 @@ void ByteSource::startAt()
 {
   if (from_ >= size_)
   {
-    throw Error(Problem{.file = name_, .offset = from_, .sentence = "--from: lies behind the end of the file"});
+    throw Error(Problem{.file = name_,
+                        .offset = from_,
+                        .sentence = "lies behind the end of the file",
+                        .remedy = Remedy::beginBefore});
   }
   name_ += " from " + hexOffset(from_);
   size_ -= from_;

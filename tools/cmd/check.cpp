@@ -6,6 +6,7 @@
 #include "tav/inspect/checker.hpp"
 #include "tav/inspect/rules.hpp"
 #include "tools/cmd/ruleTexts.h"
+#include "tools/shell/hints.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/progress.h"
@@ -82,7 +83,7 @@ public:
       return;
     }
     Problem problem{stream_.source->name(), finding.offset, finding.path};
-    problem.sentence = (counts ? "" : "note: ") + finding.sentence + " [" + std::string(rule.id) + "]";
+    problem.sentence = (counts ? "" : "note: ") + sentenceOf(finding) + " [" + std::string(rule.id) + "]";
     problem.code = rule.code;
     out_.write(problemText(problem) + "\n");
   }
@@ -118,6 +119,11 @@ private:
     return nlohmann::json(text).dump(-1, ' ', false, nlohmann::json::error_handler_t::replace);
   }
 
+  std::string sentenceOf(const Finding& finding) const
+  {
+    return finding.sentence + (finding.otherStream ? readsFrom(*stream_.source, finding.offset) : "");
+  }
+
   void putJson(const Finding& finding, const Rule& rule, bool counts)
   {
     nlohmann::ordered_json object;
@@ -130,7 +136,7 @@ private:
     }
     object["path"] = finding.path;
     object["code"] = korCodeName(rule.code);
-    object["sentence"] = finding.sentence;
+    object["sentence"] = sentenceOf(finding);
     out_.write((defects_ + notes_ == 1 ? "\n  " : ",\n  ") +
                object.dump(-1, ' ', false, nlohmann::json::error_handler_t::replace));
   }

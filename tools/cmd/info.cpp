@@ -7,6 +7,7 @@
 #include <nlohmann/json.hpp>
 
 #include "tav/inspect.hpp"
+#include "tools/shell/hints.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/progress.h"
@@ -300,7 +301,8 @@ Json infoJson(const Stream& stream, const Counts* counts)
           {{"element", elementText(elm)}, {"id", elm}, {"nodes", tally.nodes}, {"bytes", tally.bytes}});
     }
   }
-  object["because"] = stream.isStream() ? found.because : std::vector<std::string>{noStream(stream).sentence};
+  object["because"] =
+      stream.isStream() ? reasonTexts(*stream.source, found) : std::vector<std::string>{noStream(stream).sentence};
   return object;
 }
 
@@ -322,7 +324,7 @@ void printText(const Stream& stream, const Counts* counts, bool full, Output& ou
   print.tallies("type", counts->types, typeName, full ? ~size_t{0} : 20);
   print.tallies("element", counts->elements, elementText, full ? ~size_t{0} : 12);
   out.write("\n");
-  for (const std::string& reason : found.because)
+  for (const std::string& reason : reasonTexts(*stream.source, found))
   {
     print.line("because", reason);
   }

@@ -3,6 +3,7 @@
 #include <nlohmann/json.hpp>
 
 #include "tav/inspect.hpp"
+#include "tools/shell/hints.h"
 #include "tools/shell/names.h"
 
 namespace tav::tool
@@ -22,6 +23,18 @@ std::string spaced(std::string_view bytes)
     column = wrap ? 0 : column + 1;
   }
   return text;
+}
+
+/// What a rule means to a reader, with the command that mends what broke it.
+std::string whyOf(const Rule& rule)
+{
+  std::string why(rule.why);
+  if (rule.rule == RuleId::groupOpen)
+  {
+    why.back() = ';';
+    why += " tav recover closes it.";
+  }
+  return why;
 }
 
 } // namespace
@@ -44,9 +57,9 @@ std::string rulesMarkdown()
   }
   for (const Rule& rule : rules())
   {
-    text += "\n## " + std::string(rule.id) + "\n\n" + std::string(rule.what) + " " + std::string(rule.why) +
+    text += "\n## " + std::string(rule.id) + "\n\n" + std::string(rule.what) + " " + whyOf(rule) +
             "\n\n```text\n" + spaced(rule.bytes) + "\n```\n\n`tav check --rule " + std::string(rule.id) + " " +
-            std::string(rule.form) + " x.tav` finds it at " + hexOffset(rule.offset) + ".\n";
+            formOptions(rule.form) + " x.tav` finds it at " + hexOffset(rule.offset) + ".\n";
   }
   return text;
 }
@@ -61,8 +74,8 @@ std::string rulesJson()
     object["note"] = rule.note;
     object["code"] = korCodeName(rule.code);
     object["what"] = rule.what;
-    object["why"] = rule.why;
-    object["form"] = rule.form;
+    object["why"] = whyOf(rule);
+    object["form"] = formOptions(rule.form);
     object["bytes"] = rule.bytes;
     object["offset"] = rule.offset;
     list.push_back(std::move(object));

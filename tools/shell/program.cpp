@@ -5,6 +5,7 @@
 #include <optional>
 
 #include "tools/host/host.h"
+#include "tools/shell/hints.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/report.h"
@@ -117,7 +118,7 @@ int runProgram(int argc, char** argv)
   }
   catch (const Error& error)
   {
-    report(error.problem());
+    report(withHint(error.problem()));
     return error.trouble() == Trouble::notFound ? kFindings : kTrouble;
   }
   catch (const ClosedPipe&)

@@ -3,6 +3,7 @@
 #include <utility>
 
 #include "tav/inspect.hpp"
+#include "tools/shell/hints.h"
 #include "tools/shell/input.h"
 #include "tools/shell/report.h"
 
@@ -66,7 +67,7 @@ Problem noStream(const Stream& stream)
   if (stream.kind)
   {
     problem.sentence = "this is " + std::string(stream.kind->text) + ", no stream";
-    problem.hint = stream.kind->hint;
+    problem.hint = hintOf(*stream.kind);
     return problem;
   }
   problem.sentence =
@@ -92,6 +93,7 @@ void DamageNotices::add(PassedOver passed)
   ++places_;
   if (passed_.size() < kMostLines)
   {
+    passed.sentence += passed.otherStream ? readsFrom(*stream_.source, passed.offset) : "";
     passed_.push_back(std::move(passed));
   }
 }

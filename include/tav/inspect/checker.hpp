@@ -20,7 +20,8 @@ struct Finding
   uint64_t offset = 0;
   uint64_t length = 0; ///< bytes concerned; 0: no run of bytes is meant
   std::string path{};
-  std::string sentence{}; ///< starts with a lower-case letter, no full stop
+  std::string sentence{};   ///< starts with a lower-case letter, no full stop
+  bool otherStream = false; ///< a stream in another form seems to begin there
 };
 
 /// Walks a stream once, in memory that grows with the depth alone. Findings come in the order in which they are
@@ -59,7 +60,7 @@ private:
     bool damagedTail = false; ///< damage since the last child
   };
 
-  void found(RuleId rule, uint64_t offset, uint64_t length, std::string sentence);
+  void found(RuleId rule, uint64_t offset, uint64_t length, std::string sentence, bool otherStream = false);
   void beginNode();
   void beginGroup();
   void endNode();

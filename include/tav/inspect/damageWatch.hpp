@@ -25,6 +25,7 @@ struct PassedOver
   std::string sentence{}; ///< the same, and what became of it
   uint32_t code = TAV_RC_OK;
   RuleId rule = RuleId::damaged;
+  bool otherStream = false; ///< a stream in another form seems to begin there
 };
 
 /// Follows a walk and tells what it passes over: bytes that are no node, streams in another form, and groups that end

@@ -15,7 +15,7 @@ struct FileKind
 {
   std::string_view name; ///< "gzip", as scripts read it
   std::string_view text; ///< "a gzip file", as people do
-  std::string_view hint; ///< what leads to a stream from there; empty: nothing does
+  bool isEmpty = false;  ///< an archive that holds nothing
 };
 
 struct Recognition;

@@ -22,6 +22,13 @@ struct FormChoice
   std::optional<bool> aligned{};
 };
 
+/// Why a file is read as it is.
+struct Reason
+{
+  std::string sentence{};          ///< starts with a lower-case letter, no full stop
+  std::optional<uint64_t> other{}; ///< where a stream in another form seems to begin, of which it tells
+};
+
 struct Recognition
 {
   Form form{};
@@ -31,8 +38,8 @@ struct Recognition
   /// Ways to try where bytes are lost, likelier ones first: all that nothing refutes where the start is damaged, else
   /// the next best one where the best leaves a doubt and it is not far off.
   std::vector<Form> possible{};
-  std::vector<std::string> because{}; ///< why, one reason a line
-  uint64_t looked = 0;                ///< bytes that the judgement rests on
+  std::vector<Reason> because{}; ///< why
+  uint64_t looked = 0;           ///< bytes that the judgement rests on
 
   bool ambiguous() const { return !alternatives.empty(); }
 };
@@ -46,9 +53,6 @@ TAV_INSPECT_API std::optional<Form> otherStreamAt(ByteSource& source, const Form
 
 /// What to say of it.
 TAV_INSPECT_API std::string otherStreamText(const Form& form);
-
-/// The option that reads a file from an offset of this source on: "--from 0x1a40".
-TAV_INSPECT_API std::string fromText(const ByteSource& source, uint64_t offset);
 
 /// "little-endian", "big-endian"
 TAV_INSPECT_API std::string orderText(const Form& form);

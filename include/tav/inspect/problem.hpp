@@ -12,6 +12,16 @@
 namespace tav::inspect
 {
 
+/// What helps with a problem. A program says it in its own words: how it is asked for what helps is its business.
+enum class Remedy : uint8_t
+{
+  none,
+  readWide,    ///< reading the file as a stream with a 64-bit root header
+  makeWide,    ///< making a stream with a 64-bit root header
+  beginBefore, ///< beginning to read at a lower offset
+  showBytes    ///< looking at the bytes at the problem's offset
+};
+
 /// One thing that is wrong. As a line: `x.tav: 0x1a40 /system/node[3]: ends 12 bytes past its parent
 /// (TAV_RC_OUTSIDE_PARENT)`
 struct Problem
@@ -22,6 +32,7 @@ struct Problem
   std::string sentence{};           ///< starts with a lower-case letter, no full stop
   uint32_t code = TAV_RC_OK;        ///< TAV_RC_OK: no code says it
   std::string hint{};               ///< what to do next; a line of its own
+  Remedy remedy = Remedy::none;     ///< and what helps
 };
 
 /// The problem as one line, without its hint.

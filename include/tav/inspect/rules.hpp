@@ -1,5 +1,5 @@
 /// @file rules.hpp
-/// What `tav check` looks for: the one table of rules.
+/// What a check looks for: the one table of rules.
 #pragma once
 
 #include <cstdint>
@@ -9,6 +9,7 @@
 
 #include "tav/codes.h"
 #include "tav/inspect/api.hpp"
+#include "tav/inspect/node.hpp"
 
 namespace tav::inspect
 {
@@ -56,7 +57,7 @@ struct Rule
   uint32_t code;         ///< what the library answers, or would say of it
   std::string_view what; ///< one sentence
   std::string_view why;  ///< what it does to a reader
-  std::string_view form; ///< options to read the example with
+  Form form;             ///< of the example, which is little-endian
   std::string_view
       bytes;       ///< the smallest file that breaks it: hexadecimal; "00*9" is nine zeros, "(...)*9" a run nine times
   uint64_t offset; ///< where the finding in it is

@@ -26,8 +26,8 @@ TAV_INSPECT_API std::vector<uint8_t> payloadBytes(ByteSource& source, const Form
 /// bytes of the payload are read; " ..." tells that there are more. A group has no value: empty.
 TAV_INSPECT_API std::string valueText(ByteSource& source, const Form& form, const Node& node, uint64_t most);
 
-/// The value as `get` prints it: a string is its characters as they are, the rest as in valueText. Only for values that
-/// fit in memory; nothing for a value of more than `most` bytes, which is to be copied piece by piece.
+/// The value as plain text: a string is its characters as they are, the rest as in valueText. Only for values that fit
+/// in memory; nothing for a value of more than `most` bytes, which is to be copied piece by piece.
 TAV_INSPECT_API std::optional<std::string> plainText(ByteSource& source, const Form& form, const Node& node,
                                                      uint64_t most);
 

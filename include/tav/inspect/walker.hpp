@@ -100,8 +100,8 @@ public:
   /// is not what should.
   TAV_INSPECT_API bool skip();
 
-  /// The path of the event's node, which must be the event returned last (or one of the same node before). Every
-  /// command takes a whole one as input: steps are tags, or ids where a tag is not unique, and the place among the
+  /// The path of the event's node, which must be the event returned last (or one of the same node before). A whole
+  /// one leads back to the node as a Path: steps are tags, or ids where a tag is not unique, and the place among the
   /// siblings of that name.
   TAV_INSPECT_API std::string path(const Event& event, PathStyle style = PathStyle::whole) const;
 

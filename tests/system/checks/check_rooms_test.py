@@ -83,6 +83,16 @@ class CheckRooms(unittest.TestCase):
                 self.assertEqual(findings("core/word.h", line), [])
         self.assertEqual(findings("tools/host/host.cpp", "volatile std::sig_atomic_t held = 0;"), [])
 
+    def test_keeps_options_of_the_program_out_of_the_inspection_library(self):
+        for line in ['return "--from " + text;', 'hint = "a 32-bit stream; --root 64 reads it";', 'Error("x", "--align");']:
+            with self.subTest(line=line):
+                self.assertEqual(len(findings("inspect/walk/source.cpp", line)), 1)
+                self.assertEqual(len(findings("include/tav/inspect/form.hpp", line)), 1)
+                self.assertEqual(findings("tools/shell/hints.cpp", line), [])
+        for line in ['text = "a -- b";', "--count; // as --from", 'x = "a"; --count;']:
+            with self.subTest(line=line):
+                self.assertEqual(findings("inspect/walk/source.cpp", line), [])
+
     def test_keeps_the_platform_in_kor(self):
         for name, line in [
             ("format/swap.cpp", "#include <endian.h>"),

@@ -74,14 +74,6 @@ Bytes bytesOfExample(std::string_view text)
   return bytes;
 }
 
-tav::inspect::Form formOfExample(std::string_view options)
-{
-  const bool little = options.find("--byte-order little") != std::string_view::npos;
-  return {.swapped = little == test::kBigEndianHost,
-          .root64 = options.find("--root 64") != std::string_view::npos,
-          .aligned = options.find("--align") != std::string_view::npos};
-}
-
 } // namespace
 
 TEST(Checker, FindsEachRuleInItsExampleAtItsOffset)
@@ -91,7 +83,7 @@ TEST(Checker, FindsEachRuleInItsExampleAtItsOffset)
     SCOPED_TRACE(rule.id);
     const Bytes bytes = bytesOfExample(rule.bytes);
     const auto found =
-        findings(bytes, formOfExample(rule.form), [&](RuleId wanted) { return wanted == rule.rule; });
+        findings(bytes, rule.form, [&](RuleId wanted) { return wanted == rule.rule; });
     ASSERT_EQ(found.size(), 1U);
     EXPECT_EQ(found.front().rule, rule.rule);
     EXPECT_EQ(found.front().offset, rule.offset);
@@ -135,6 +127,18 @@ TEST(Checker, FindsSomethingWrongWhereAHeaderIsOverwritten)
     std::fill_n(bytes.begin() + static_cast<ptrdiff_t>(at), tree.root.children.front().wide ? 16 : 8, uint8_t{0xEE});
     EXPECT_FALSE(findings(bytes, test::readForm(tree.form), all).empty());
   }
+}
+
+TEST(Checker, TellsOfAStreamInAnotherFormBehindTheStream)
+{
+  Bytes bytes = test::namedStream(1);
+  const size_t second = bytes.size();
+  const Bytes other = test::namedStream(2, true);
+  bytes.insert(bytes.end(), other.begin(), other.end());
+  const auto found = findings(bytes, {}, [](RuleId id) { return id == RuleId::behindStream; });
+  ASSERT_FALSE(found.empty());
+  EXPECT_EQ(found[0].offset, second);
+  EXPECT_TRUE(found[0].otherStream);
 }
 
 TEST(Rules, AreFoundByTheirIds)

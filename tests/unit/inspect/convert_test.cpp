@@ -104,6 +104,20 @@ TEST(Json, ConvertsToAnotherForm)
   EXPECT_FALSE(differences(little, {}, other, {.swapped = true, .aligned = true}).different);
 }
 
+TEST(Json, SaysThatPairsTakeWideHeaders)
+{
+  try
+  {
+    bytesOfJson("{\"system\": {}}", {.root64 = false, .eyeSize = true});
+    FAIL() << "no 32-bit header announces a pair";
+  }
+  catch (const Error& error)
+  {
+    EXPECT_EQ(error.problem().remedy, Remedy::makeWide);
+    EXPECT_EQ(error.problem().sentence, "eye/size pairs need 64-bit headers");
+  }
+}
+
 TEST(Json, SaysWhereADocumentIsWrong)
 {
   const Problem problem = refusal("{\"system\":\n {\"hostNam\": 1}}");

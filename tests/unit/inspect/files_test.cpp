@@ -195,3 +195,48 @@ TEST(Scratch, TakesTheNextNameWhenOneIsTaken)
   EXPECT_TRUE(std::filesystem::remove(one));
   EXPECT_TRUE(std::filesystem::remove(two));
 }
+
+TEST(SourceOfAFile, HasToBeginInsideOfIt)
+{
+  const std::vector<uint8_t> bytes = counting(100);
+  try
+  {
+    ByteSource("bytes", std::make_unique<test::VectorStorage>(64, bytes), kDefaultRing, 100);
+    FAIL() << "there is nothing from there on";
+  }
+  catch (const Error& error)
+  {
+    EXPECT_EQ(error.problem().remedy, Remedy::beginBefore);
+    EXPECT_EQ(error.problem().offset, 100U);
+    EXPECT_EQ(error.problem().sentence, "lies behind the end of the file");
+  }
+}
+
+TEST(FileKinds, AreToldByTheirFirstBytes)
+{
+  using namespace std::string_view_literals;
+  struct Row
+  {
+    std::string_view bytes;
+    std::string_view name;
+    bool isEmpty;
+  };
+  for (const Row& row : {Row{"\x1F\x8B\x08rest"sv, "gzip", false}, Row{"PK\x03\x04rest"sv, "zip", false},
+                         Row{"PK\x05\x06rest"sv, "zip", true}, Row{"\x28\xB5\x2F\xFDrest"sv, "zstd", false},
+                         Row{"{\"system\": {}}"sv, "json", false}, Row{"[1]"sv, "json", false},
+                         Row{"<tav/>"sv, "xml", false}, Row{"hello"sv, "text", false}, Row{"\x7F"
+                                                                                           "ELF"sv,
+                                                                                           "elf", false}})
+  {
+    SCOPED_TRACE(row.bytes);
+    ByteSource source("x", std::span(reinterpret_cast<const uint8_t*>(row.bytes.data()), row.bytes.size()));
+    const auto kind = fileKindOf(source);
+    ASSERT_TRUE(kind);
+    EXPECT_EQ(kind->name, row.name);
+    EXPECT_EQ(kind->isEmpty, row.isEmpty);
+    EXPECT_FALSE(kind->text.empty());
+  }
+  const std::vector<uint8_t> bytes = counting(100);
+  ByteSource source("x", std::span<const uint8_t>(bytes));
+  EXPECT_FALSE(fileKindOf(source));
+}

@@ -178,6 +178,60 @@ TEST(Recognise, FindsTheFormOfSoundStreams)
   EXPECT_GT(streams, 50U);
 }
 
+TEST(Recognise, TellsWhereAStreamInAnotherFormBegins)
+{
+  Bytes bytes = test::namedStream(1);
+  const size_t second = bytes.size();
+  const Bytes other = test::namedStream(2, true);
+  bytes.insert(bytes.end(), other.begin(), other.end());
+  ByteSource source("x", std::span<const uint8_t>(bytes));
+  size_t told = 0;
+  for (const Reason& reason : recognise(source).because)
+  {
+    EXPECT_EQ(reason.other.value_or(second), second);
+    told += reason.other ? 1 : 0;
+  }
+  EXPECT_EQ(told, 1U);
+}
+
+TEST(DamageWatch, TellsOfAStreamInAnotherForm)
+{
+  Bytes bytes = test::namedStream(1);
+  const size_t second = bytes.size();
+  const Bytes other = test::namedStream(2, true);
+  bytes.insert(bytes.end(), other.begin(), other.end());
+  ByteSource source("x", std::span<const uint8_t>(bytes));
+  std::vector<PassedOver> passed;
+  Walker walker(source, {});
+  DamageWatch watch(source, {}, [&](PassedOver one) { passed.push_back(std::move(one)); });
+  for (Event event; walker.next(event);)
+  {
+    watch.see(walker, event);
+  }
+  ASSERT_FALSE(passed.empty());
+  EXPECT_EQ(passed[0].offset, second);
+  EXPECT_TRUE(passed[0].otherStream);
+}
+
+TEST(Locate, SaysThatTheBytesCanBeShownWhereNoNodeBegins)
+{
+  const Bytes bytes = test::namedStream(1);
+  ByteSource source("x", std::span<const uint8_t>(bytes));
+  Walker walker(source, {});
+  Event event;
+  try
+  {
+    goToOffset(source, walker, event, 3);
+    FAIL() << "no node begins there";
+  }
+  catch (const Error& error)
+  {
+    EXPECT_EQ(error.problem().remedy, Remedy::showBytes);
+    EXPECT_EQ(error.problem().offset, 3U);
+    EXPECT_EQ(error.problem().hint, "the node before it begins at 0x0: /system");
+  }
+}
+
 TEST(Recognise, TakesWhatIsGiven)
 {
   const test::Tree tree = test::randomTree(5, {.forget = false});
