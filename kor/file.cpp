@@ -165,6 +165,11 @@ uint32_t KORHFile::sync()
   return native_ == kNoFile ? KOR_RC_NOT_OPEN : syncNative(native_);
 }
 
+uint32_t KORHFile::syncData()
+{
+  return native_ == kNoFile ? KOR_RC_NOT_OPEN : syncDataNative(native_);
+}
+
 uint32_t KORHFile::copyRights(const KORHFile& from)
 {
   const bool open = native_ != kNoFile && from.native_ != kNoFile;
@@ -183,4 +188,9 @@ uint32_t KORHFile::replaceBy(const char* pFrom, const char* pPath)
   const uint32_t code = renameNative(pFrom, pPath);
   if (code == TAV_RC_OK && native_ != kNoFile) close(); // nobody reaches it by the path any more
   return code;
+}
+
+uint32_t korSyncFolderOf(const char* pPath)
+{
+  return pPath != nullptr ? syncFolderNative(pPath) : TAV_RC_BAD_PARAM;
 }

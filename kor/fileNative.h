@@ -47,6 +47,8 @@ uint32_t unlockNative(intptr_t file);
 uint32_t sizeNative(intptr_t file, uint64_t& size);
 uint32_t setSizeNative(intptr_t file, int64_t size);
 uint32_t syncNative(intptr_t file);
+uint32_t syncDataNative(intptr_t file);
+uint32_t syncFolderNative(const char* pPath);
 uint32_t copyRightsNative(intptr_t from, intptr_t to);
 bool isAtNative(intptr_t file, const char* pPath);
 

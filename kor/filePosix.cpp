@@ -1,6 +1,9 @@
 #include <cerrno>
 #include <cstdio>
+#include <cstring>
 #include <fcntl.h>
+#include <memory>
+#include <new>
 #include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -143,7 +146,36 @@ uint32_t setSizeNative(intptr_t file, int64_t size)
 
 uint32_t syncNative(intptr_t file)
 {
+#if defined(F_FULLFSYNC)
+  // There fsync leaves the bytes in the device's cache. Not every file system knows the other one.
+  if (uninterrupted([&] { return ::fcntl(descriptor(file), F_FULLFSYNC); }) == 0) return TAV_RC_OK;
+#endif
   return uninterrupted([&] { return ::fsync(descriptor(file)); }) == 0 ? TAV_RC_OK : codeOfSystemError(errno);
+}
+
+uint32_t syncDataNative(intptr_t file)
+{
+#if defined(F_FULLFSYNC)
+  return syncNative(file);
+#else
+  return uninterrupted([&] { return ::fdatasync(descriptor(file)); }) == 0 ? TAV_RC_OK : codeOfSystemError(errno);
+#endif
+}
+
+uint32_t syncFolderNative(const char* pPath)
+{
+  const char* const slash = std::strrchr(pPath, '/');
+  const std::size_t length = slash != nullptr ? static_cast<std::size_t>(slash - pPath) + 1 : 0;
+  const std::unique_ptr<char[]> folder(new (std::nothrow) char[length + 2]);
+  if (folder == nullptr) return TAV_RC_NO_MEMORY;
+  std::memcpy(folder.get(), pPath, length);
+  std::strcpy(folder.get() + length, length == 0 ? "." : "");
+  const int opened = uninterrupted([&] { return ::open(folder.get(), O_RDONLY | O_DIRECTORY | O_CLOEXEC); });
+  if (opened < 0) return codeOfSystemError(errno);
+  const int error = syncNative(opened) == TAV_RC_OK ? 0 : errno;
+  ::close(opened);
+  const bool cannot = error == EINVAL || error == EROFS || error == ENOSYS || error == EOPNOTSUPP;
+  return error == 0 || cannot ? TAV_RC_OK : codeOfSystemError(error);
 }
 
 uint32_t copyRightsNative(intptr_t from, intptr_t to)

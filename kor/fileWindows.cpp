@@ -158,6 +158,16 @@ uint32_t syncNative(intptr_t file)
   return FlushFileBuffers(handleOf(file)) ? TAV_RC_OK : codeOfSystemError(GetLastError());
 }
 
+uint32_t syncDataNative(intptr_t file)
+{
+  return syncNative(file);
+}
+
+uint32_t syncFolderNative(const char* /*pPath*/)
+{
+  return TAV_RC_OK; // the file system's log has the names
+}
+
 uint32_t copyRightsNative(intptr_t /*from*/, intptr_t /*to*/)
 {
   return TAV_RC_OK;

@@ -241,6 +241,8 @@ public:
   uint32_t setSize(uint64_t size);
   /// Returns when all that was written is on the device.
   uint32_t sync();
+  /// As sync, but for what reading the bytes does not need: the time of the change, for instance.
+  uint32_t syncData();
   /// Gives this file the mode of another open one, and its owner and group as far as the process may; without the
   /// owner the bits go that let a program run as him. Nothing on Windows, where rights come from the folder.
   uint32_t copyRights(const KORHFile& from);
@@ -255,4 +257,10 @@ private:
   intptr_t native_; ///< descriptor or system handle; -1 when closed
   bool locked_;
 };
+
+extern "C" {
+/// Returns when the name of a file that was made, renamed or removed is on the device, too: syncs the folder that the
+/// file at `pPath` (UTF-8) lies in. Nothing where the system does that by itself, and on file systems that cannot.
+KOR_API uint32_t korSyncFolderOf(const char* pPath);
+}
 /// @}

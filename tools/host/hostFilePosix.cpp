@@ -137,9 +137,8 @@ uint32_t giveName(const std::string& from, const std::string& to, bool replace)
 
 uint32_t syncFolderOf(const std::string& path)
 {
-  const Descriptor folder(::open(stepOf(path).folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  // A folder may be open to writers alone.
-  return folder.number() < 0 ? TAV_RC_OK : synced(folder.number());
+  const uint32_t code = korSyncFolderOf(path.c_str());
+  return code == KOR_RC_NO_PERMISSION ? TAV_RC_OK : code; // a folder may be open to writers alone
 }
 } // namespace
 

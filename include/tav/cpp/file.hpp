@@ -29,11 +29,12 @@ enum class OpenRoot : uint8_t
 /// How a file is written.
 struct FileOptions
 {
-  bool overwrite = false;              ///< replace an existing file instead of refusing it; it stays as it is until finish()
-  bool inPlace = false;                ///< with overwrite: empty the file and write into it, whatever becomes of the writer
-  bool lock = true;                    ///< refuse a file that another writer has locked, and lock it; false where there are no locks
-  bool append = false;                 ///< go on behind the last stream of an existing file; begin a new one where there is none
-  OpenRoot openRoot = OpenRoot::close; ///< with append
+  bool overwrite = false; ///< replace an existing file instead of refusing it; it stays as it is until finish()
+  bool inPlace = false;   ///< with overwrite: empty the file and write into it, whatever becomes of the writer
+  bool lock = true;       ///< refuse a file that another writer has locked, and lock it; false where there are no locks
+  bool append = false;    ///< go on behind the last stream of an existing file; begin a new one where there is none
+  /// With append: a root that was never closed.
+  OpenRoot openRoot = OpenRoot::close;
 };
 
 namespace detail

@@ -10,6 +10,7 @@
 #include <utility>
 
 #include "tav/cpp/append.hpp"
+#include "tav/cpp/durable.hpp"
 #include "tav/cpp/group.hpp"
 #include "tav/cpp/updater.hpp"
 
@@ -91,6 +92,7 @@ public:
     state_ = std::move(other.state_);
     isResumed_ = other.isResumed_;
     isAppended_ = other.isAppended_;
+    durable_ = std::move(other.durable_);
     return *this;
   }
   Writer(const Writer&) = delete;
@@ -155,6 +157,34 @@ public:
   void update(const HeaderView& node, const T& value, std::error_code& ec) noexcept
   {
     detail::report(detail::updateValue(state_ ? state_->handle : nullptr, node, value), ec);
+  }
+
+  /// Returns when the system has all nodes that were added so far, also in groups that are open: they outlive this
+  /// process, but not the machine. What a destructor could not report comes up here, too.
+  void flush()
+  {
+    detail::demand(pushOut(), "flushing a stream", [this] { return tellPushing(); });
+  }
+  void flush(std::error_code& ec) noexcept
+  {
+    detail::report(pushOut(), ec);
+  }
+
+  /// Returns when the device has all nodes that were added so far, and the name of a file that is new. From then on
+  /// `tav recover` brings them back whatever becomes of the machine; those in closed groups are read without it.
+  /// TAV_RC_NOT_SUPPORTED where there is no file. After a failure all further ones fail. See docs/producers.md.
+  void sync()
+  {
+    const uint32_t rc = makeDurable();
+    detail::demand(rc, "syncing a stream", [&] {
+      detail::Told told = tellPushing();
+      told.sentence = told.sentence.empty() ? durable_.refusal(rc) : told.sentence;
+      return told;
+    });
+  }
+  void sync(std::error_code& ec) noexcept
+  {
+    detail::report(makeDurable(), ec);
   }
 
   /// Ends the stream: reports what a destructor could not, writes what a ring still holds, and lets the storage go;
@@ -262,6 +292,7 @@ private:
     }
     state_->orphans = isResumed_ ? 1 : 0;
     isAppended_ = true;
+    durable_.name(path);
     return found.outcome;
   }
 
@@ -275,7 +306,41 @@ private:
     std::unique_ptr<TAVSSFile> storage;
     const detail::FileOutcome opened = detail::openForWriting(path, file, storage, state_->replacement);
     state_->owned = std::move(storage);
+    if (state_->replacement == nullptr)
+    {
+      durable_.name(path);
+    }
     return opened.code != TAV_RC_OK ? opened : detail::FileOutcome{open(state_->owned.get(), options)};
+  }
+
+  uint32_t pushOut() noexcept
+  {
+    if (!state_ || state_->handle == nullptr)
+    {
+      return TAV_RC_BAD_PARAM;
+    }
+    detail::WriterState& state = *state_;
+    state.toldDeferred = state.deferred != TAV_RC_OK;
+    if (state.toldDeferred)
+    {
+      const uint32_t rc = std::exchange(state.deferred, TAV_RC_OK);
+      state.settle();
+      return rc;
+    }
+    return state.handle->pCircularBuf != nullptr ? state.handle->pCircularBuf->reset() : TAV_RC_OK;
+  }
+
+  uint32_t makeDurable() noexcept
+  {
+    const uint32_t rc = pushOut();
+    return rc == TAV_RC_OK ? durable_.sync(*state_->handle->pSideStorage) : rc;
+  }
+
+  [[nodiscard]] detail::Told tellPushing() const
+  {
+    const bool isGone = !state_ || state_->handle == nullptr || state_->toldDeferred;
+    return {{}, !isGone ? "" : state_ ? state_->refusal(0)
+                                      : "the writer was moved from"};
   }
 
   uint32_t end()
@@ -340,6 +405,7 @@ private:
   detail::WriterRef state_;
   bool isResumed_ = false;
   bool isAppended_ = false; ///< to a file, which ends with the stream
+  detail::Durable durable_;
 };
 
 } // namespace tav

@@ -440,6 +440,14 @@ TEST_F(File, IsCutAndFilledUpToASizeAndKeepsItsPosition)
   EXPECT_EQ(readText(file, 9), std::string(2, '\0'));
   EXPECT_EQ(file.setSize(uint64_t{1} << 63U), TAV_RC_BAD_PARAM);
   EXPECT_EQ(file.sync(), TAV_RC_OK);
+  EXPECT_EQ(file.syncData(), TAV_RC_OK);
+}
+
+TEST_F(File, ItsFolderIsSyncedByItsPath)
+{
+  EXPECT_EQ(korSyncFolderOf(path("a").c_str()), TAV_RC_OK) << "whether the file is there or not";
+  EXPECT_EQ(korSyncFolderOf("name"), TAV_RC_OK) << "in the folder that the process is in";
+  EXPECT_EQ(korSyncFolderOf(nullptr), TAV_RC_BAD_PARAM);
 }
 
 TEST_F(File, IsAtItsPathUntilAnotherTakesThat)
@@ -478,6 +486,7 @@ TEST_F(File, ThatIsNotOpenHasNoSizeToSetAndNoRights)
   ASSERT_EQ(openFile(open, path("a"), kNewFile), TAV_RC_OK);
   EXPECT_EQ(closed.setSize(0), KOR_RC_NOT_OPEN);
   EXPECT_EQ(closed.sync(), KOR_RC_NOT_OPEN);
+  EXPECT_EQ(closed.syncData(), KOR_RC_NOT_OPEN);
   EXPECT_EQ(closed.copyRights(open), KOR_RC_NOT_OPEN);
   EXPECT_EQ(open.copyRights(closed), KOR_RC_NOT_OPEN);
   EXPECT_FALSE(closed.isAt(path("a").c_str()));
