@@ -19,20 +19,23 @@ def page(*infos_and_bodies):
 class ExtractExamples(unittest.TestCase):
     def test_takes_programs_with_their_line(self):
         found = list(extract_examples.programs(page(("sh", "./demo.sh\n"), ("cpp", PROGRAM))))
-        self.assertEqual(found, [(8, PROGRAM)])
+        self.assertEqual(found, [(8, PROGRAM, ".cpp")])
+
+    def test_takes_programs_in_c_as_such(self):
+        self.assertEqual(list(extract_examples.programs(page(("c", PROGRAM)))), [(4, PROGRAM, ".c")])
 
     def test_passes_over_fragments_and_other_languages(self):
-        text = page(("cpp fragment", "f(x);\n"), ("cpp-fragment", "f(x);\n"), ("", "int main()\n"), ("text", "x\n"))
+        text = page(("cpp fragment", "f(x);\n"), ("cpp-fragment", "f(x);\n"), ("c fragment", "f(x);\n"), ("", "int main()\n"), ("text", "x\n"))
         self.assertEqual(list(extract_examples.programs(text)), [])
 
     def test_refuses_what_is_not_a_program(self):
-        for text in (page(("cpp", "f(x);\n")), page(("c++", PROGRAM)), page(("cpp snippet", PROGRAM)), "```cpp\nint main()\n"):
+        for text in (page(("cpp", "f(x);\n")), page(("c++", PROGRAM)), page(("cpp snippet", PROGRAM)), page(("c", "f(x);\n")), "```cpp\nint main()\n"):
             with self.subTest(text=text), self.assertRaises(extract_examples.BadBlock):
                 list(extract_examples.programs(text))
 
     def test_takes_a_longer_fence_whole(self):
         text = "````cpp\n// ```\n" + PROGRAM + "````\n"
-        self.assertEqual(list(extract_examples.programs(text)), [(2, "// ```\n" + PROGRAM)])
+        self.assertEqual(list(extract_examples.programs(text)), [(2, "// ```\n" + PROGRAM, ".cpp")])
 
     def test_writes_and_cleans_the_folder(self):
         with tempfile.TemporaryDirectory() as folder:

@@ -1,10 +1,11 @@
 #!/usr/bin/env python3
-"""Takes the C++ programs out of Markdown files.
+"""Takes the C++ and C programs out of Markdown files.
 
     extract_examples.py OUTPUT_FOLDER FILE.md...
 
-Every fenced block marked `cpp` has to be a complete program; it is written to OUTPUT_FOLDER under the name of its
-page and a running number, and the paths are printed. What is not meant to be compiled is marked `cpp fragment`.
+Every fenced block marked `cpp` or `c` has to be a complete program; it is written to OUTPUT_FOLDER under the name of its
+page and a running number, and the paths are printed. What is not meant to be compiled is marked `cpp fragment` or
+`c fragment`.
 """
 import pathlib
 import re
@@ -36,16 +37,17 @@ def blocks(text):
 
 
 def programs(text):
-    """Yields (line number, source) of each complete program."""
+    """Yields (line number, source, suffix) of each complete program."""
     for info, first, lines in blocks(text):
-        if info == ["cpp", "fragment"] or not info or info[0] not in ("cpp", "c++", "cxx"):
+        if not info or info[0] not in ("c", "cpp", "c++", "cxx") or info in (["cpp", "fragment"], ["c", "fragment"]):
             continue
-        if info != ["cpp"]:
+        if info not in (["cpp"], ["c"]):
             raise BadBlock(f"{first - 1}: '{' '.join(info)}' is neither 'cpp' nor 'cpp fragment'")
         source = "\n".join(lines) + "\n"
         if not MAIN.search(source):
-            raise BadBlock(f"{first - 1}: a cpp block without main: make it a program, or mark it 'cpp fragment'")
-        yield first, source
+            raise BadBlock(f"{first - 1}: a {info[0]} block without main: make it a program, or mark it "
+                           f"'{info[0]} fragment'")
+        yield first, source, "." + info[0]
 
 
 def write_if_changed(path, text):
@@ -60,15 +62,15 @@ def extract(folder, pages):
     written = []
     for page in pages:
         try:
-            for count, (line, source) in enumerate(programs(page.read_text(encoding="utf-8")), start=1):
-                path = folder / f"{page.stem}_{count}.cpp"
+            for count, (line, source, suffix) in enumerate(programs(page.read_text(encoding="utf-8")), start=1):
+                path = folder / f"{page.stem}_{count}{suffix}"
                 write_if_changed(path, f'#line {line} "{page.name}"\n{source}')
                 written.append(path)
         except BadBlock as error:
             raise BadBlock(f"{page}:{error}") from None
     if len(set(written)) != len(written):
         raise BadBlock("two pages have the same name")
-    for path in set(folder.glob("*.cpp")) - set(written):
+    for path in {*folder.glob("*.cpp"), *folder.glob("*.c")} - set(written):
         path.unlink()
     return written
 

@@ -70,6 +70,13 @@ for part in tav:main kor:kor; do
   "$program"
 done
 
+if ((${#mode[@]} == 0)) && command -v cc >/dev/null; then
+  echo "== C"
+  read -ra flags <<<"$(pkg-config --cflags --libs tav-inspect)"
+  cc -std=c99 -Wall -Wextra -Wpedantic -Werror "$here/outside/c.c" -o "$work/c" "${flags[@]}"
+  "$work/c"
+fi
+
 if ((${#mode[@]} == 0)); then
   echo "== shared libraries find each other"
   unset LD_LIBRARY_PATH
