@@ -13,6 +13,7 @@
 #include "tav/inspect/document.hpp"
 #include "tav/inspect/edit.hpp"
 #include "tav/inspect/fileKind.hpp"
+#include "tav/inspect/folding.hpp"
 #include "tav/inspect/form.hpp"
 #include "tav/inspect/json.hpp"
 #include "tav/inspect/jsonText.hpp"

@@ -80,7 +80,7 @@ void Collector::Work::begin(ByteSource& source, const Form& form)
 void Collector::Work::add(const Event& event, uint64_t top)
 {
   const bool begins = event.what == What::nodeBegin;
-  if (!(begins || event.what == What::nodeEnd) || isEndElement(event.node.elm()))
+  if (!(begins || event.what == What::nodeEnd) || isEndPiece(event))
   {
     return;
   }

@@ -63,7 +63,7 @@ void requireText(std::string_view text, uint16_t type, uint16_t codePage)
   const auto isHigh = [](char c) { return static_cast<uint8_t>(c) >= 0x80; };
   if (type == TAV_TYPE_ASCII_STRING && std::any_of(text.begin(), text.end(), isHigh))
   {
-    refuse(text, type, ", which ends at 127; --type 'UTF8 String' takes it");
+    refuse(text, type, ", which ends at 127; a UTF8 String takes it");
   }
   if (type == TAV_TYPE_UTF8_STRING && codePage == kUsualCodePage && !isUtf8(text))
   {

@@ -70,7 +70,7 @@ void Schema::add(ByteSource& source, const Form& form, const std::function<void(
     {
       seen(walker, event);
     }
-    if (event.what == What::nodeBegin && (options_.ends || !layout::isEndElement(event.node.elm())))
+    if (event.what == What::nodeBegin && (options_.ends || !isEndPiece(event)))
     {
       addNode(source, form, event.node);
     }

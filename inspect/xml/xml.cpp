@@ -353,7 +353,10 @@ bool toXml(ByteSource& source, const Form& form, Sink& out, const ToXmlOptions& 
       options.progress(event.offset);
     }
     damaged = damaged || event.what == What::damaged || event.what == What::unread;
-    writer.add(event);
+    if (options.ends || !isEndPiece(event))
+    {
+      writer.add(event);
+    }
   }
   writer.end();
   return damaged;

@@ -59,7 +59,12 @@ struct Counts
 void countNode(const Node& node, Counts& counts)
 {
   const bool end = layout::isEndElement(node.elm());
+  counts.pairs += node.elm() == TAV_ELM_CMN_END_HDR_EYE_SIZE ? 1 : 0;
   (end ? counts.ends : counts.nodes) += 1;
+  if (end)
+  {
+    return;
+  }
   counts.groups += node.isGroup() ? 1 : 0;
   counts.wide += node.is64() ? 1 : 0;
   counts.roots += node.depth == 0 ? 1 : 0;
@@ -68,11 +73,6 @@ void countNode(const Node& node, Counts& counts)
   counts.cut += node.has(kOverrun) ? 1 : 0;
   counts.extras += node.has(kExtra) ? 1 : 0;
   counts.depth = std::max(counts.depth, node.depth + 1);
-  counts.pairs += node.elm() == TAV_ELM_CMN_END_HDR_EYE_SIZE ? 1 : 0;
-  if (end)
-  {
-    return;
-  }
   const uint64_t bytes = node.headerLength() + (node.isGroup() ? 0 : node.size());
   for (Tally* const tally : {&counts.types[node.type()], &counts.elements[node.elm()]})
   {
@@ -204,7 +204,7 @@ std::string openText(const Counts& counts)
 
 void printCounts(Printer& print, const Counts& counts, uint64_t fileBytes)
 {
-  const uint64_t narrow = counts.nodes + counts.ends - counts.wide;
+  const uint64_t narrow = counts.nodes - counts.wide;
   const std::string mixed = std::to_string(counts.wide) + " 64-bit, " + std::to_string(narrow) + " 32-bit";
   print.line("headers", counts.wide == 0 ? "32-bit" : narrow == 0 ? "64-bit"
                                                                   : mixed);

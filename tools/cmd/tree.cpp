@@ -1,8 +1,10 @@
 // tav tree: one line a node.
 #include <algorithm>
 #include <cstdio>
+#include <optional>
 #include <utility>
 
+#include "tav/inspect/folding.hpp"
 #include "tav/inspect/locate.hpp"
 #include "tav/inspect/path.hpp"
 #include "tav/inspect/value.hpp"
@@ -40,7 +42,7 @@ public:
   TreePrinter(const Invocation& invocation, Stream& stream)
       : stream_(stream), out_("-"), colours_(wantsColour(invocation) ? kOnTerminal : Colours{}),
         width_(static_cast<size_t>(host::terminalWidth().value_or(0))), paths_(invocation.has("--paths")),
-        maxDepth_(invocation.number("--depth").value_or(kNoOffset))
+        maxDepth_(invocation.number("--depth").value_or(kNoOffset)), ends_(invocation.has("--ends"))
   {
     if (const auto width = invocation.number("--width"))
     {
@@ -58,12 +60,15 @@ public:
       }
       only_.insert(only_.end(), ids.begin(), ids.end());
     }
+    setFolding(invocation);
   }
 
   /// Prints what `walker` hands out from `event` on; `base` is the depth that is not indented.
   void print(Walker& walker, Event& event, uint64_t base, bool oneNode, DamageNotices& notices)
   {
     Progress progress("tree", stream_.bytes());
+    base_ = base;
+    named_ = oneNode ? event.offset : kNoOffset;
     bool seen = oneNode; // on the way to it
     do
     {
@@ -72,7 +77,10 @@ public:
       {
         notices.see(walker, event);
       }
-      line(walker, event, base);
+      if (!folding_ || folding_->shows(event))
+      {
+        line(walker, event, base);
+      }
       if (event.what == What::nodeBegin && event.node.isGroup() && event.depth - base >= maxDepth_)
       {
         walker.skip();
@@ -82,12 +90,20 @@ public:
         break;
       }
     } while (walker.next(event));
+    if (folding_)
+    {
+      folding_->finish();
+    }
     out_.commit();
   }
 
   bool printedNothing() const { return lines_ == 0; }
 
 private:
+  void setFolding(const Invocation& invocation);
+  bool isLeftOut(const Node& node) const;
+  void fold(const Folded& folded);
+  static std::string indent(uint64_t level);
   void line(const Walker& walker, const Event& event, uint64_t base);
   std::string label(const Walker& walker, const Event& event, uint64_t level) const;
   std::string remarks(const Node& node) const;
@@ -101,9 +117,52 @@ private:
   bool strict_ = false; ///< also offsets, names and paths are cut, not only values
   bool paths_;
   uint64_t maxDepth_;
+  bool ends_;
+  std::optional<Folding> folding_{};
+  uint64_t base_ = 0;
+  uint64_t named_ = kNoOffset; ///< the one node that was asked for
   std::vector<uint16_t> only_{};
   uint64_t lines_ = 0;
 };
+
+std::string TreePrinter::indent(uint64_t level)
+{
+  std::string text(static_cast<size_t>(std::min(level, kMaxIndent)) * 2, ' ');
+  return level > kMaxIndent ? text + "(" + std::to_string(level) + ") " : text;
+}
+
+/// Repetitions are folded where a person looks, unless something else is asked for.
+void TreePrinter::setFolding(const Invocation& invocation)
+{
+  const bool all = invocation.has("--all");
+  if (all && invocation.has("--fold"))
+  {
+    throw Failure("tree: --all and --fold exclude each other");
+  }
+  if (!all && only_.empty() && (invocation.has("--fold") || host::isTerminal(stdout)))
+  {
+    folding_.emplace([this](const Folded& folded) { fold(folded); });
+  }
+}
+
+/// "… 997 more like this"
+void TreePrinter::fold(const Folded& folded)
+{
+  const uint64_t level = folded.depth - std::min(base_, folded.depth);
+  if (level <= maxDepth_)
+  {
+    const std::string text = "\xE2\x80\xA6 " + std::to_string(folded.count) + " more like this";
+    put(folded.offset, "", (paths_ ? "" : indent(level)) + text, "", "", "");
+  }
+}
+
+/// What only ends a group is shown where it is asked for.
+bool TreePrinter::isLeftOut(const Node& node) const
+{
+  const bool end = layout::isEndElement(node.elm()) && !ends_ && node.offset() != named_;
+  const bool named = std::find(only_.begin(), only_.end(), node.elm()) != only_.end();
+  return only_.empty() ? end : !named;
+}
 
 std::string TreePrinter::label(const Walker& walker, const Event& event, uint64_t level) const
 {
@@ -111,16 +170,7 @@ std::string TreePrinter::label(const Walker& walker, const Event& event, uint64_
   {
     return walker.path(event, PathStyle::brief);
   }
-  std::string text;
-  if (level > kMaxIndent)
-  {
-    text.assign(static_cast<size_t>(kMaxIndent) * 2, ' ');
-    text += "(" + std::to_string(level) + ") ";
-  }
-  else
-  {
-    text.assign(static_cast<size_t>(level) * 2, ' ');
-  }
+  std::string text = indent(level);
   if (event.what == What::nodeBegin)
   {
     std::string step;
@@ -164,7 +214,7 @@ void TreePrinter::line(const Walker& walker, const Event& event, uint64_t base)
     return;
   }
   const Node& node = event.node;
-  if (!only_.empty() && std::find(only_.begin(), only_.end(), node.elm()) == only_.end())
+  if (isLeftOut(node))
   {
     return;
   }
@@ -233,9 +283,13 @@ const Registration registration{{
     .name = "tree",
     .arguments = "FILE",
     .summary = "one line a node: offset, size, name, type, value",
-    .description = "Lists every node in the order of the stream, indented by its level. Bytes that are no node are\n"
-                   "listed as damaged, with the reason; then the exit status is 1. On a terminal values are cut to\n"
-                   "its width, and lines are coloured unless NO_COLOR is set or TERM is dumb.",
+    .description =
+        "Lists every node in the order of the stream, indented by its level. Bytes that are no node are\n"
+        "listed as damaged, with the reason; then the exit status is 1. Elements that only end a group are\n"
+        "left out. On a terminal values are cut to its width, lines are coloured unless NO_COLOR is set or\n"
+        "TERM is dumb, and of siblings of one name that follow one another three are shown, with a line that\n"
+        "counts the others; damage among them is always shown. Where the output is no terminal, and with\n"
+        "--only, every node has its line, unless --fold asks for the short form.",
     .options =
         {{.names = "--depth", .kind = ValueKind::number, .value = "N", .help = "no node deeper than N levels"},
          {.names = "--at", .kind = ValueKind::number, .value = "OFFSET", .help = "the node at OFFSET and all below it"},
@@ -244,6 +298,9 @@ const Registration registration{{
           .value = "NAME",
           .help = "only these elements, by name or id, with their paths",
           .many = true},
+         {.names = "--all", .help = "every node has its line, on a terminal, too"},
+         {.names = "--fold", .help = "fold repetitions also where the output is no terminal"},
+         {.names = "--ends", .help = "also elements that only end a group"},
          {.names = "--paths", .help = "paths instead of indented names"},
          {.names = "--width", .kind = ValueKind::number, .value = "N", .help = "cut lines to N columns; 0: never"},
          {.names = "--color",

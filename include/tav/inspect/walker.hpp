@@ -52,6 +52,12 @@ struct Event
   std::string reason{};      ///< of damaged
 };
 
+/// Whether a piece belongs to an element that only ends a group, which is structure and no content.
+inline bool isEndPiece(const Event& event)
+{
+  return event.node.header.hdrType != 0 && layout::isEndElement(event.node.elm());
+}
+
 /// How a path is written. A text with a whole path for each node grows with the square of the depth.
 enum class PathStyle : uint8_t
 {

@@ -16,13 +16,14 @@ namespace tav::inspect
 
 struct ToXmlOptions
 {
+  bool ends = false;                        ///< also elements that only end a group
   DamageWatch::Sink passedOver{};           ///< is told of what has no node, and of groups that were cut
   std::function<void(uint64_t)> progress{}; ///< is told by offset how far the work is
 };
 
 /// Writes a whole stream; true when some bytes of it are no node. Texts are escaped; what XML cannot hold, bytes, and
-/// values whose size their type does not have are hexadecimal, with `encoding="hex"`. End elements, paddings and pairs
-/// are told with what they belong to. Throws Error, and what the sink throws.
+/// values whose size their type does not have are hexadecimal, with `encoding="hex"`. Paddings and pairs are told with
+/// what they belong to, end elements are left out unless asked for. Throws Error, and what the sink throws.
 TAV_INSPECT_API bool toXml(ByteSource& source, const Form& form, Sink& out, const ToXmlOptions& options = {});
 
 } // namespace tav::inspect

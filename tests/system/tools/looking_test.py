@@ -1,4 +1,5 @@
 """What the commands that look into a stream tell where there is less to see than was asked for."""
+import json
 import struct
 import unittest
 
@@ -117,6 +118,100 @@ class Tree(ToolTest):
                     self.assertEqual(len(lines), 16)
                     self.assertLessEqual(max(map(len, lines)), width)
                     self.assertTrue(any(line.endswith("..."[:width]) for line in lines))
+
+
+def group(elm, *children):
+    content = b"".join(children)
+    return header(len(content), 2, elm) + content
+
+
+def number(value, elm=60111):
+    return header(8, 57, elm) + struct.pack("<Q", value)
+
+
+class Repetitions(ToolTest):
+    def write(self, content):
+        path = self.folder / "many.tav"
+        path.write_bytes(content)
+        return path
+
+    def folded(self, content, *options):
+        """The names, types and values that are shown, without offsets and sizes, and the status."""
+        result = tav("tree", self.write(content), "--fold", *options)
+        return [line[21:] for line in result.out.splitlines()], result.status
+
+    def test_repetitions_are_folded(self):
+        content = group(60100, *[group(60102, number(i)) for i in range(1000)], number(7))
+        host = [line for i in range(3) for line in ("  host" + (f"[{i + 1}]" if i else "") + "  group",
+                                                    f"    cpuOnline  Uint64  {i}")]
+        self.assertEqual(self.folded(content), (["system  group", *host, "  \u2026 997 more like this", "  cpuOnline  Uint64  7"], 0))
+        line = tav("tree", self.write(content), "--fold").out.splitlines()[-2]
+        self.assertEqual(int(line.split()[0], 16), 16 + 3 * 40)
+
+    def test_only_siblings_that_follow_one_another_are_folded(self):
+        lines, _ = self.folded(group(60100, *[number(i, 60111 + i % 2) for i in range(20)]))
+        self.assertEqual(len(lines), 21)
+        lines, _ = self.folded(group(60100, *[group(60102, number(1), number(2)) for _ in range(3)]))
+        self.assertEqual(len(lines), 10)
+        lines, _ = self.folded(group(60100, *[number(1)] * 4))
+        self.assertEqual(lines[-1], "  \u2026 1 more like this")
+
+    def test_every_node_has_its_line_where_no_terminal_is(self):
+        path = self.write(group(60100, *[number(i) for i in range(1000)]))
+        whole = tav("tree", path)
+        self.assertEqual(len(whole.out.splitlines()), 1001)
+        self.assertEqual(tav("tree", path, "--all").out, whole.out)
+        self.assertEqual(len(tav("tree", path, "--fold", "--only", "cpuOnline").out.splitlines()), 1000)
+        self.assertEqual(tav("tree", path, "--fold", "--all").status, 2)
+
+    def test_damage_among_repetitions_is_shown(self):
+        hosts = [group(60102, number(i)) for i in range(100)]
+        hosts[50] = b"\xee" * 40
+        lines, status = self.folded(group(60100, *hosts))
+        damaged = next(i for i, line in enumerate(lines) if line.startswith("  damaged"))
+        self.assertEqual((status, lines[damaged - 1]), (1, "  \u2026 47 more like this"))
+        self.assertEqual((lines[damaged + 1].split("[")[0], lines[-1]), ("  host", "  \u2026 46 more like this"))
+        inside = [group(60102, number(i)) for i in range(100)]
+        inside[50] = group(60102, b"\xee" * 24)
+        lines, status = self.folded(group(60100, *inside))
+        damaged = next(i for i, line in enumerate(lines) if "damaged" in line)
+        self.assertEqual((status, lines[damaged - 1], lines[-1]), (1, "  \u2026 48 more like this", "  \u2026 46 more like this"))
+
+    def test_levels_and_one_subtree_are_folded_as_the_whole(self):
+        content = group(60100, group(60102, *[number(i) for i in range(10)]))
+        self.assertEqual(self.folded(content, "--depth", "1")[0], ["system  group", "  host  group"])
+        self.assertEqual(self.folded(content, "--at", "16")[0][-1], "  \u2026 7 more like this")
+        self.assertEqual(self.folded(content, "--paths")[0][-1], "\u2026 7 more like this")
+
+
+class EndElements(ToolTest):
+    """What only ends a group is structure: shown where it is asked for, counted nowhere else."""
+
+    def setUp(self):
+        super().setUp()
+        self.path = self.snapshot("--eye-size")
+
+    def test_tree_and_xml_show_them_when_asked(self):
+        for command in ("tree", "xml"):
+            self.assertNotIn("endHdr", tav(command, self.path).out)
+            self.assertEqual(tav(command, self.path, "--ends").out.count("endHdrEyeSize") // (2 if command == "xml" else 1), 5)
+        self.assertEqual(len(tav("tree", self.path).out.splitlines()), 16)
+        self.assertEqual(len(tav("tree", self.path, "--only", "endHdrEyeSize").out.splitlines()), 5)
+        offset = tav("tree", self.path, "--only", "endHdrEyeSize").out.split()[0]
+        self.assertIn("endHdrEyeSize", tav("tree", self.path, "--at", offset).out)
+        self.assertIn("endHdrEyeSize", tav("json", self.path, "--lines").out)
+
+    def test_info_counts_widths_of_nodes_alone(self):
+        for options, wide, narrow in (((), 16, 0), (("--hdr32",), 0, 16)):
+            path = self.snapshot(*options) if options else self.path
+            counted = json.loads(tav("info", path, "--json").out)["counted"]
+            self.assertEqual((counted["nodes"], counted["headers64"], counted["headers32"]), (16, wide, narrow))
+
+    def test_an_end_element_is_no_level(self):
+        end = header(16, 101, 65001) + struct.pack("<QQ", 0xC0DED5EEDDEC0DED, 32)
+        path = self.folder / "one.tav"
+        path.write_bytes(struct.pack("<QIHH", 32, 0x00400000, 2, 60100) + end)
+        self.assertEqual(json.loads(tav("info", path, "--json").out)["counted"]["depth"], 1)
 
 
 class Snapshot(ToolTest):

@@ -86,6 +86,14 @@ class Terminal(TerminalTest):
             self.assertEqual(max(map(len, lines)), width)
         self.assertGreater(max(map(len, tav("tree", path).out.split("\n"))), 60)
 
+    def test_a_tree_on_a_terminal_is_folded(self):
+        path = self.folder / "many.tav"
+        number = struct.pack("<QIHH", 8, 0, 57, 60111) + bytes(8)
+        path.write_bytes(struct.pack("<QIHH", len(number) * 1000, 0, 2, 60100) + number * 1000)
+        lines = self.on_terminal("tree", path, "--color", "never").rstrip().split("\r\n")
+        self.assertEqual((len(lines), lines[-1].split(None, 1)[1]), (5, "\u2026 997 more like this"))
+        self.assertEqual(len(self.on_terminal("tree", path, "--all").rstrip().split("\r\n")), 1001)
+
     def test_a_tree_is_coloured_unless_the_user_wants_none(self):
         path = self.snapshot()
         self.assertRegex(self.on_terminal("tree", path), ESCAPE)
