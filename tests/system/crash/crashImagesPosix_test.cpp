@@ -9,7 +9,7 @@
 #include <gmock/gmock.h>
 
 #include "crash/loggedFile.h"
-#include "kor/host.h"
+#include "tools/host/host.h"
 #include "tav/inspect.hpp"
 #include "tav/tav.hpp"
 
@@ -57,8 +57,8 @@ class Recorded
 {
 public:
   Recorded(const Style& style, uint64_t seed)
-      : style_(style), random_(seed), path_(tav::kor::textOf(std::filesystem::temp_directory_path()) + "/tav-crash-" +
-                                            std::to_string(tav::kor::processId()) + "-" + std::to_string(seed))
+      : style_(style), random_(seed), path_(tav::host::textOf(std::filesystem::temp_directory_path()) + "/tav-crash-" +
+                                            std::to_string(tav::host::processId()) + "-" + std::to_string(seed))
   {
     recording_.options = {.align8 = style.align,
                           .root = style.narrow ? tav::Width::bits32 : tav::Width::bits64,
@@ -275,8 +275,8 @@ std::vector<Style> styles()
 
 TEST(Sync, WaitsForTheFileAndOnceForItsFolder)
 {
-  const std::string path = tav::kor::textOf(std::filesystem::temp_directory_path()) + "/tav-crash-folder-" +
-                           std::to_string(tav::kor::processId());
+  const std::string path = tav::host::textOf(std::filesystem::temp_directory_path()) + "/tav-crash-folder-" +
+                           std::to_string(tav::host::processId());
   tav::Writer writer(path);
   crash::watch(path);
   tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM);
@@ -304,8 +304,8 @@ TEST(Sync, WaitsForTheFileAndOnceForItsFolder)
 
 TEST(Sync, ThatFailedMakesAllLaterOnesFail)
 {
-  const std::string path = tav::kor::textOf(std::filesystem::temp_directory_path()) + "/tav-crash-failed-" +
-                           std::to_string(tav::kor::processId());
+  const std::string path = tav::host::textOf(std::filesystem::temp_directory_path()) + "/tav-crash-failed-" +
+                           std::to_string(tav::host::processId());
   tav::Writer writer(path);
   crash::watch(path);
   tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM);
