@@ -21,7 +21,6 @@ namespace
   problem.sentence = kind                 ? "this is " + std::string(kind->text) + ", no stream"
                      : source.size() == 0 ? "the file is empty, no stream"
                                           : "this is no stream, or nothing of it is whole";
-  problem.hint = kind ? std::string(kind->hint) : std::string();
   throw Error(std::move(problem), Trouble::notFound);
 }
 
