@@ -11,6 +11,36 @@ namespace tav::inside::print
 
 inline constexpr int64_t kBlanksPerLevel = 3;
 
+/// Opening, with its indentation, and closing of a data element that stands on one line, ready to be copied.
+struct ReadyTag
+{
+  static constexpr size_t kLongestOpening = 96;
+  static constexpr size_t kLongestClosing = 64;
+
+  std::string_view opening() const { return {text.data(), openingLength}; }
+  std::string_view closing() const { return {text.data() + openingLength, closingLength}; }
+
+  uint32_t key = ~uint32_t{0}; ///< depth and element id
+  uint32_t openingLength;
+  uint32_t closingLength;
+  std::array<char, kLongestOpening + kLongestClosing> text; ///< both, one behind the other
+};
+
+/// The tags that a walk has seen last. Siblings have ids close to each other, so the id's low bits choose the place.
+using ReadyTags = std::array<ReadyTag, 64>;
+
+/// Makes a tag ready; false when it is too long or too deep to be kept.
+bool makeTag(ReadyTag& tag, uint32_t key, uint16_t elm, int64_t depth);
+
+/// The tag of an element; null when it cannot be kept. A depth of 16 bits will do: much less of it makes a tag too
+/// long.
+[[gnu::always_inline]] inline const ReadyTag* findTag(ReadyTags& tags, uint16_t elm, int64_t depth)
+{
+  const uint32_t key = static_cast<uint32_t>(depth < 0xFFFE ? depth : 0xFFFE) << 16U | elm;
+  ReadyTag& tag = tags[elm % tags.size()];
+  return tag.key == key || makeTag(tag, key, elm, depth) ? &tag : nullptr;
+}
+
 /// Collects pieces and hands them to the stream together. What a stream then refuses is settled as if every piece had
 /// gone to it alone: a refused piece does not count, the next is tried, and a node of which no piece is taken ends the
 /// output.
@@ -79,6 +109,8 @@ public:
   {
     return stopped_;
   }
+
+  ReadyTags tags;
 
 private:
   static constexpr uint16_t kNodeEnd = 0x8000; ///< beside the end of a node's last piece

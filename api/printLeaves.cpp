@@ -1,10 +1,7 @@
 #include "api/printLeaves.h"
 
-#include <algorithm>
-
 #include "api/printValue.h"
 #include "core/step.h"
-#include "dictionary/dictionary.h"
 
 namespace tav::inside::print
 {
@@ -26,37 +23,6 @@ bool isCommon(const HeaderFields& fields)
   const uint8_t valueSize = typeInfo(fields.type).valueSize;
   return valueSize != 0 ? fields.size == valueSize
                         : fields.type == TAV_TYPE_ASCII_STRING && fields.size != 0 && fields.size <= kLongestText;
-}
-
-[[gnu::noinline]] bool make(ReadyTag& tag, uint32_t key, uint16_t elm, int64_t depth)
-{
-  const std::string_view name = elementTagName(elm);
-  const size_t blanks = static_cast<size_t>(depth) * kBlanksPerLevel;
-  const size_t opening = blanks + name.size() + 2;
-  const size_t closing = name.size() + 4;
-  if (opening > ReadyTag::kLongestOpening || closing > ReadyTag::kLongestClosing)
-  {
-    return false;
-  }
-  tag.key = key;
-  tag.openingLength = static_cast<uint32_t>(opening);
-  tag.closingLength = static_cast<uint32_t>(closing);
-  char* end = std::fill_n(tag.text.data(), blanks, ' ');
-  for (const std::string_view part :
-       {std::string_view("<"), name, std::string_view("></"), name, std::string_view(">\n")})
-  {
-    end = std::copy(part.begin(), part.end(), end);
-  }
-  return true;
-}
-
-/// The tag of an element; null when it is too long or too deep to be kept. A depth of 16 bits will do: much less of it
-/// makes a tag too long.
-[[gnu::always_inline]] inline const ReadyTag* findTag(ReadyTags& tags, uint16_t elm, int64_t depth)
-{
-  const uint32_t key = static_cast<uint32_t>(std::min<int64_t>(depth, 0xFFFE)) << 16U | elm;
-  ReadyTag& tag = tags[elm % tags.size()];
-  return tag.key == key || make(tag, key, elm, depth) ? &tag : nullptr;
 }
 
 char* writeText(char* to, const uint8_t* data, uint64_t size)
@@ -87,7 +53,7 @@ template<bool swap>
 /// Steps to the next data elements and prints them. The level's children have 64-bit headers if `wide`, and their
 /// bytes are reversed if `swap`.
 template<bool wide, bool swap>
-bool print(TAVPrintCtx& ctx, ReadyTags& tags, const TAVHandle& handle, const core::Level& below,
+bool print(TAVPrintCtx& ctx, const TAVHandle& handle, const core::Level& below,
            const TAVHeader* previous, WalkGuard& walk, TAVHeader& last)
 {
   OutputBlock& block = *ctx.pBlock;
@@ -103,7 +69,7 @@ bool print(TAVPrintCtx& ctx, ReadyTags& tags, const TAVHandle& handle, const cor
   while (!tracing() && !block.stopped() && core::step<wide>(bytes, level, first, node, place) == TAV_RC_OK &&
          !node.group())
   {
-    const ReadyTag* const tag = isCommon(node.fields) ? findTag(tags, node.fields.elm, depth) : nullptr;
+    const ReadyTag* const tag = isCommon(node.fields) ? findTag(block.tags, node.fields.elm, depth) : nullptr;
     if (tag == nullptr || !guard.visit(node.place))
     {
       break; // a visit that is refused is refused again
@@ -123,8 +89,8 @@ bool print(TAVPrintCtx& ctx, ReadyTags& tags, const TAVHandle& handle, const cor
 
 } // namespace
 
-bool printLeaves(TAVPrintCtx& ctx, ReadyTags& tags, const TAVHandle& handle, const TAVHeader& parent,
-                 const TAVHeader* previous, WalkGuard& guard, TAVHeader& last)
+bool printLeaves(TAVPrintCtx& ctx, const TAVHandle& handle, const TAVHeader& parent, const TAVHeader* previous,
+                 WalkGuard& guard, TAVHeader& last)
 {
   if (ctx.pBlock == nullptr || !isOneLine(ctx) || !core::isReadOnly(handle) ||
       !core::BlockBytes<core::AnyForm>::canRead(handle))
@@ -135,7 +101,7 @@ bool printLeaves(TAVPrintCtx& ctx, ReadyTags& tags, const TAVHandle& handle, con
   const bool swap = handle.swapBytes != 0;
   const auto run = level.wide ? (swap ? print<true, true> : print<true, false>)
                               : (swap ? print<false, true> : print<false, false>);
-  return run(ctx, tags, handle, level, previous, guard, last);
+  return run(ctx, handle, level, previous, guard, last);
 }
 
 } // namespace tav::inside::print

@@ -43,7 +43,7 @@ uint32_t printData(TAVPrintCtx& ctx, TAVHeaderData& node)
 }
 
 /// The opening of a node. That of an element stands on the line of its value, unless more than a value follows.
-void printOpening(TAVPrintCtx& ctx, uint16_t elm, const Asked& asked)
+void printOpening(TAVPrintCtx& ctx, uint16_t elm, std::string_view tag, const Asked& asked)
 {
   if (!has(ctx, TAV_PRINT_XML))
   {
@@ -51,19 +51,19 @@ void printOpening(TAVPrintCtx& ctx, uint16_t elm, const Asked& asked)
     line(ctx, {"{\n"});
     return;
   }
-  line(ctx, {"<", elementTagName(elm), ctx.attributeForm != 0 ? "" : ">"});
+  line(ctx, {"<", tag, ctx.attributeForm != 0 ? "" : ">"});
   if (ctx.attributeForm == 0 && (!asked.close || has(ctx, TAV_PRINT_HEADERS)))
   {
     piece(ctx, {"\n"});
   }
 }
 
-uint32_t printBody(TAVPrintCtx& ctx, TAVHeaderData& node)
+uint32_t printBody(TAVPrintCtx& ctx, TAVHeaderData& node, std::string_view tag)
 {
   const bool attribute = has(ctx, TAV_PRINT_XML) && ctx.attributeForm != 0;
   if (attribute)
   {
-    piece(ctx, {" ", elementTagName(elmOf(node.header)), "="});
+    piece(ctx, {" ", tag, "="});
   }
   if (attribute || has(ctx, TAV_PRINT_BARE))
   {
@@ -76,7 +76,7 @@ uint32_t printBody(TAVPrintCtx& ctx, TAVHeaderData& node)
   return has(ctx, TAV_PRINT_DATA) ? printData(ctx, node) : TAV_RC_OK;
 }
 
-void printClosing(TAVPrintCtx& ctx, uint16_t elm, const Asked& asked)
+void printClosing(TAVPrintCtx& ctx, std::string_view tag, const Asked& asked)
 {
   if (!has(ctx, TAV_PRINT_XML))
   {
@@ -88,24 +88,35 @@ void printClosing(TAVPrintCtx& ctx, uint16_t elm, const Asked& asked)
   }
   else if (has(ctx, TAV_PRINT_HEADERS) || (!asked.open && !asked.body))
   {
-    line(ctx, {"</", elementTagName(elm), ">\n"});
+    line(ctx, {"</", tag, ">\n"});
   }
   else
   {
-    piece(ctx, {"</", elementTagName(elm), ">\n"}); // behind the value, on its line
+    piece(ctx, {"</", tag, ">\n"}); // behind the value, on its line
   }
+}
+
+/// The tags of an element that is one line, when the block has them ready.
+const ReadyTag* readyTag(const TAVPrintCtx& ctx, uint16_t elm, const Asked& asked)
+{
+  const bool oneLine = ctx.attributeForm == 0 && asked.open && asked.close &&
+                       (ctx.options & (TAV_PRINT_XML | TAV_PRINT_HEADERS)) == TAV_PRINT_XML;
+  return oneLine && ctx.pBlock != nullptr ? findTag(ctx.pBlock->tags, elm, ctx.depth) : nullptr;
 }
 
 uint32_t printParts(TAVPrintCtx& ctx, TAVHeaderData& node, const Asked& asked)
 {
+  const uint16_t elm = elmOf(node.header);
+  const ReadyTag* const ready = readyTag(ctx, elm, asked);
+  const std::string_view tag = has(ctx, TAV_PRINT_XML) && ready == nullptr ? elementTagName(elm) : "";
   if (asked.open)
   {
-    printOpening(ctx, elmOf(node.header), asked);
+    ready != nullptr ? piece(ctx, {ready->opening()}) : printOpening(ctx, elm, tag, asked);
   }
-  const uint32_t rc = asked.body ? printBody(ctx, node) : TAV_RC_OK;
+  const uint32_t rc = asked.body ? printBody(ctx, node, tag) : TAV_RC_OK;
   if (rc == TAV_RC_OK && asked.close)
   {
-    printClosing(ctx, elmOf(node.header), asked);
+    ready != nullptr ? piece(ctx, {ready->closing()}) : printClosing(ctx, tag, asked);
   }
   return rc;
 }

@@ -8,6 +8,7 @@
 
 #include "api/digits.h"
 #include "api/printer.h"
+#include "dictionary/dictionary.h"
 #include "kor/lineBuffered.h"
 
 using namespace tav::inside::print;
@@ -102,6 +103,11 @@ uint64_t put(TAVPrintCtx& ctx, size_t blanks, std::string_view text)
 
 void piece(TAVPrintCtx& ctx, Parts parts, size_t blanks)
 {
+  if (parts.size() == 1)
+  {
+    put(ctx, blanks, *parts.begin());
+    return;
+  }
   std::array<char, kLongestLine> text;
   char* end = text.data();
   for (const std::string_view part : parts)
@@ -124,6 +130,28 @@ void line(TAVPrintCtx& ctx, Parts parts)
     put(ctx, width - std::min(length, width), {depth.data(), length});
   }
   piece(ctx, parts, static_cast<size_t>(ctx.depth * kBlanksPerLevel));
+}
+
+bool makeTag(ReadyTag& tag, uint32_t key, uint16_t elm, int64_t depth)
+{
+  const std::string_view name = elementTagName(elm);
+  const size_t blanks = static_cast<size_t>(depth) * kBlanksPerLevel;
+  const size_t opening = blanks + name.size() + 2;
+  const size_t closing = name.size() + 4;
+  if (opening > ReadyTag::kLongestOpening || closing > ReadyTag::kLongestClosing)
+  {
+    return false;
+  }
+  tag.key = key;
+  tag.openingLength = static_cast<uint32_t>(opening);
+  tag.closingLength = static_cast<uint32_t>(closing);
+  char* end = std::fill_n(tag.text.data(), blanks, ' ');
+  for (const std::string_view part :
+       {std::string_view("<"), name, std::string_view("></"), name, std::string_view(">\n")})
+  {
+    end = std::copy(part.begin(), part.end(), end);
+  }
+  return true;
 }
 
 uint64_t OutputBlock::add(size_t blanks, std::string_view text)

@@ -58,7 +58,7 @@ public:
     bool goesOn = enter(start);
     for (size_t current = 0; goesOn && stack_.count != 0; current ^= 1U)
     {
-      if (printLeaves(ctx_, tags_, handle_, stack_.pEntries[stack_.count - 1], previous, nodes_, passed))
+      if (printLeaves(ctx_, handle_, stack_.pEntries[stack_.count - 1], previous, nodes_, passed))
       {
         previous = &passed;
       }
@@ -158,7 +158,6 @@ private:
   TAVHdrStack& stack_;
   WalkGuard nodes_;
   ChildGuard keys_;
-  ReadyTags tags_;
   uint32_t code_ = TAV_RC_OK;
 };
 
