@@ -6,6 +6,7 @@
 
 #include "inspect/text/scan.h"
 #include "inspect/walk/prober.h"
+#include "inspect/walk/sizeSuits.h"
 #include "tav/inspect/form.hpp"
 #include "tav/inspect/phrases.hpp"
 #include "tav/inspect/value.hpp"
@@ -20,20 +21,6 @@ namespace
 
 constexpr uint64_t kMostZeros = uint64_t{2} * 1024 * 1024; ///< two of the largest pages that a file is written in
 constexpr uint64_t kMostNested = 4000;                     ///< groups that the library can have open at a time
-
-bool sizeSuits(const TAVHeader& header)
-{
-  const uint64_t size = sizeOf(header);
-  switch (typeOf(header))
-  {
-  case TAV_TYPE_UTF8_STRING: return size >= 2;
-  case TAV_TYPE_UINT64_ARRAY: return size % 8 == 0;
-  case TAV_TYPE_UINT128:
-  case TAV_TYPE_SINT128: return size == 16;
-  default:
-    return typeInfo(typeOf(header)).valueSize == 0 || typeInfo(typeOf(header)).valueSize == size;
-  }
-}
 
 bool isDataType(const TAVHeader& header)
 {
@@ -157,7 +144,7 @@ void Checker::checkHeader()
   {
     found(RuleId::typeUnknown, offset, length, "type " + std::to_string(node.type()) + " is unknown");
   }
-  else if (!node.isGroup() && !sizeSuits(node.header))
+  else if (!node.isGroup() && !sizeSuits(node.type(), node.size()))
   {
     found(RuleId::sizeType, offset, length, sizeSentence(node.header));
   }
@@ -495,7 +482,7 @@ void Checker::checkDamage()
   {
     found(RuleId::typeUnknown, event_.offset, event_.length, "type " + std::to_string(typeOf(header)) + " is unknown");
   }
-  else if (named && isDataType(header) && !sizeSuits(header))
+  else if (named && isDataType(header) && !sizeSuits(typeOf(header), sizeOf(header)))
   {
     found(RuleId::sizeType, event_.offset, event_.length, sizeSentence(header));
   }

@@ -3,6 +3,7 @@
 #include <cstring>
 #include <utility>
 
+#include "inspect/text/bytes.h"
 #include "tav/inspect/jsonText.hpp"
 #include "tav/inspect/jsonWriter.hpp"
 #include "tav/inspect/value.hpp"
@@ -18,11 +19,6 @@ namespace
 constexpr size_t kPiece = size_t{48} * 1024;   ///< bytes of a payload in one string
 constexpr size_t kBlock = size_t{4} * 1024;    ///< zeros are counted by blocks of this length
 constexpr uint64_t kExact = uint64_t{1} << 53; ///< whole numbers up to here are exact in a double
-
-std::string_view asText(std::span<const uint8_t> bytes)
-{
-  return {reinterpret_cast<const char*>(bytes.data()), bytes.size()};
-}
 
 bool isZero(std::span<const uint8_t> bytes)
 {

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <utility>
 
+#include "inspect/text/bytes.h"
 #include "tav/inspect/jsonText.hpp"
 #include "tav/inspect/path.hpp"
 #include "tav/inspect/value.hpp"
@@ -17,11 +18,6 @@ namespace
 
 constexpr size_t kMaxIndent = 32;  ///< levels, so that deep nests do not become mostly blanks
 constexpr uint64_t kMaxSteps = 64; ///< deeper nodes are named by their offset, so that a line stays a line
-
-std::string_view asText(std::span<const uint8_t> bytes)
-{
-  return {reinterpret_cast<const char*>(bytes.data()), bytes.size()};
-}
 
 } // namespace
 

@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <array>
-#include <cstring>
 #include <span>
 
 #include "inspect/recover/endings.h"
@@ -120,13 +119,7 @@ bool Judge::isPlausible(uint64_t offset, bool wide, uint64_t limit) const
 
 bool Judge::tryAt(const uint8_t* bytes, uint64_t offset, bool wide, Candidate& found) const
 {
-  uint16_t type = 0;
-  uint16_t elm = 0;
-  std::memcpy(&type, bytes + (wide ? 12 : 4), sizeof type);
-  std::memcpy(&elm, bytes + (wide ? 14 : 6), sizeof elm);
-  type = form_.swapped ? kor::byteswap16(type) : type;
-  elm = form_.swapped ? kor::byteswap16(elm) : elm;
-  if ((!isGroupType(type) && !typeInfo(type).known) || !Prober::isNamed(elm))
+  if (!prober_.isNamedHeader(bytes, wide))
   {
     return false;
   }

@@ -3,9 +3,11 @@
 #include <algorithm>
 #include <cstdio>
 #include <cstring>
-#include <iterator>
 
+#include "inspect/text/bytes.h"
 #include "inspect/walk/prober.h"
+#include "inspect/walk/sizeSuits.h"
+#include "tav/cpp/text.hpp"
 #include "tav/cpp/valueText.hpp"
 #include "tav/inspect/problem.hpp"
 
@@ -23,36 +25,6 @@ Number load(std::span<const uint8_t> bytes)
   Number value{};
   std::memcpy(&value, bytes.data(), sizeof value);
   return value;
-}
-
-std::string_view textOf(std::span<const uint8_t> bytes)
-{
-  return {reinterpret_cast<const char*>(bytes.data()), bytes.size()};
-}
-
-/// Length of the well-formed UTF-8 character at the start of a text, 0 when there is none.
-size_t characterLength(std::string_view text)
-{
-  const auto byteAt = [&](size_t i) { return i < text.size() ? static_cast<uint8_t>(text[i]) : uint8_t{0}; };
-  const uint8_t first = byteAt(0);
-  if (first < 0x80)
-  {
-    return 1;
-  }
-  const size_t length = first >= 0xF0 && first <= 0xF4 ? 4 : first >= 0xE0 && first < 0xF0 ? 3
-                                                         : first >= 0xC2 && first < 0xE0   ? 2
-                                                                                           : 0;
-  for (size_t i = 1; i < length; ++i)
-  {
-    if ((byteAt(i) & 0xC0) != 0x80)
-    {
-      return 0;
-    }
-  }
-  const uint8_t second = byteAt(1);
-  const bool wrong = (first == 0xE0 && second < 0xA0) || (first == 0xED && second > 0x9F) ||
-                     (first == 0xF0 && second < 0x90) || (first == 0xF4 && second > 0x8F);
-  return wrong ? 0 : length;
 }
 
 void appendEscape(std::string& out, uint8_t byte)
@@ -97,7 +69,7 @@ std::string escaped(std::string_view text, std::string_view more)
   std::string out;
   while (!text.empty())
   {
-    const size_t length = characterLength(text);
+    const size_t length = detail::characterLength(text);
     const size_t count = std::max<size_t>(length, 1);
     const std::string_view character = text.substr(0, count);
     if (length == 0 || steers(character) || more.find(character) != std::string_view::npos)
@@ -113,23 +85,6 @@ std::string escaped(std::string_view text, std::string_view more)
   return out;
 }
 
-bool sizeSuits(uint16_t type, uint64_t size)
-{
-  const TypeInfo& info = typeInfo(type);
-  switch (type)
-  {
-  case TAV_TYPE_UINT128:
-  case TAV_TYPE_SINT128:
-    return size == 16;
-  case TAV_TYPE_UTF8_STRING:
-    return size >= 2;
-  case TAV_TYPE_UINT64_ARRAY:
-    return size % 8 == 0;
-  default:
-    return info.valueSize == 0 || info.valueSize == size;
-  }
-}
-
 std::string arrayText(std::span<const uint8_t> bytes)
 {
   std::string text = "[";
@@ -142,7 +97,7 @@ std::string arrayText(std::span<const uint8_t> bytes)
 
 std::string utf8Text(std::span<const uint8_t> bytes, bool quote)
 {
-  const std::string_view text = textOf(bytes.subspan(2));
+  const std::string_view text = asText(bytes.subspan(2));
   return quote ? quoted(text) : std::string(text);
 }
 
@@ -151,7 +106,7 @@ std::string scalarText(uint16_t type, std::span<const uint8_t> bytes, bool quote
 {
   switch (type)
   {
-  case TAV_TYPE_ASCII_STRING: return quote ? quoted(textOf(bytes)) : std::string(textOf(bytes));
+  case TAV_TYPE_ASCII_STRING: return quote ? quoted(asText(bytes)) : std::string(asText(bytes));
   case TAV_TYPE_UTF8_STRING: return utf8Text(bytes, quote);
   case TAV_TYPE_UINT8: return std::to_string(bytes[0]);
   case TAV_TYPE_SINT8: return std::to_string(static_cast<int8_t>(bytes[0]));
@@ -247,16 +202,7 @@ std::string typeText(uint16_t type)
 
 bool isUtf8(std::string_view text)
 {
-  while (!text.empty())
-  {
-    const size_t length = characterLength(text);
-    if (length == 0)
-    {
-      return false;
-    }
-    text.remove_prefix(length);
-  }
-  return true;
+  return detail::isUtf8(text);
 }
 
 std::string quoted(std::string_view text)
@@ -299,35 +245,11 @@ std::string dateText(const TAVTimeStamp& stamp)
 
 std::string int128Text(std::span<const uint8_t> bytes, bool isSigned)
 {
-  // Base 2^32, the highest digit first; divided by ten until nothing is left.
-  uint32_t words[4];
-  for (size_t i = 0; i < 4; ++i)
-  {
-    words[kor::isLittleEndian ? 3 - i : i] = load<uint32_t>(bytes.subspan(i * 4));
-  }
-  const bool negative = isSigned && (words[0] & 0x80000000u) != 0;
-  uint64_t carry = 1;
-  for (auto word = std::rbegin(words); negative && word != std::rend(words); ++word)
-  {
-    carry += static_cast<uint32_t>(~*word);
-    *word = static_cast<uint32_t>(carry);
-    carry >>= 32;
-  }
-  std::string text;
-  do
-  {
-    uint64_t rest = 0;
-    for (uint32_t& word : words)
-    {
-      rest = rest << 32 | word;
-      word = static_cast<uint32_t>(rest / 10);
-      rest %= 10;
-    }
-    text += static_cast<char>('0' + rest);
-  } while (std::any_of(std::begin(words), std::end(words), [](uint32_t word) { return word != 0; }));
-  text += negative ? "-" : "";
-  std::reverse(text.begin(), text.end());
-  return text;
+  const auto first = load<uint64_t>(bytes);
+  const auto second = load<uint64_t>(bytes.subspan(sizeof first));
+  const uint64_t high = kor::isLittleEndian ? second : first;
+  const uint64_t low = kor::isLittleEndian ? first : second;
+  return isSigned ? detail::longText({.high = static_cast<int64_t>(high), .low = low}) : detail::digitsOf(high, low);
 }
 
 std::string cutToWidth(std::string_view text, size_t columns)
@@ -345,7 +267,7 @@ std::string cutToWidth(std::string_view text, size_t columns)
     {
       return std::string(text.substr(0, cutAt)) + std::string("...").substr(0, std::min<size_t>(3, columns));
     }
-    at += std::max<size_t>(1, characterLength(text.substr(at)));
+    at += std::max<size_t>(1, detail::characterLength(text.substr(at)));
     ++width;
   }
   return std::string(text);

@@ -4,6 +4,7 @@
 #include <array>
 #include <cstring>
 
+#include "inspect/walk/sizeSuits.h"
 #include "tav/dictionary.hpp"
 
 namespace tav::inspect
@@ -77,26 +78,11 @@ uint64_t Prober::paddedSize(const TAVHeader& data) const
   return size;
 }
 
-bool Prober::suits(const TAVHeader& header) const
+bool Prober::suits(const TAVHeader& header)
 {
   const uint16_t type = typeOf(header);
-  const uint64_t size = sizeOf(header);
-  switch (type)
-  {
-  case TAV_TYPE_HEADER32:
-    return true;
-  case TAV_TYPE_HEADER64:
-    return is64(header);
-  case TAV_TYPE_UTF8_STRING:
-    return size >= 2;
-  case TAV_TYPE_UINT64_ARRAY:
-    return size % 8 == 0;
-  case TAV_TYPE_UINT128:
-  case TAV_TYPE_SINT128:
-    return size == 16;
-  default:
-    return typeInfo(type).known && (typeInfo(type).valueSize == 0 || typeInfo(type).valueSize == size);
-  }
+  return isGroupType(type) ? type == TAV_TYPE_HEADER32 || is64(header)
+                           : typeInfo(type).known && sizeSuits(type, sizeOf(header));
 }
 
 Belief Prober::judgeHeader(const TAVHeader& header, uint64_t limit) const
@@ -214,17 +200,22 @@ bool Prober::pairEnds(uint64_t offset, uint64_t limit, const TAVHeader& group) c
   return pairAt(offset, limit, distance) && offset - group.nodeOffset == addSaturated(distance, missing);
 }
 
-bool Prober::restartAt(const uint8_t* bytes, uint64_t offset, bool wide, uint64_t limit)
+bool Prober::isNamedHeader(const uint8_t* bytes, bool wide) const
 {
   const uint8_t* const tail = bytes + (wide ? 12 : 4);
-  if (!isKnownType(load16(tail, form_.swapped)) || !isNamed(load16(tail + 2, form_.swapped)))
+  return isKnownType(load16(tail, form_.swapped)) && isNamed(load16(tail + 2, form_.swapped));
+}
+
+bool Prober::restartAt(const uint8_t* bytes, uint64_t offset, bool wide, uint64_t limit)
+{
+  if (!isNamedHeader(bytes, wide))
   {
     return false;
   }
   const Belief belief = judge(offset, wide, limit);
   // A size that is exactly its type's says enough where what follows is damaged as well.
   return belief == Belief::followed ||
-         (belief == Belief::named && typeInfo(load16(tail, form_.swapped)).valueSize != 0);
+         (belief == Belief::named && typeInfo(load16(bytes + (wide ? 12 : 4), form_.swapped)).valueSize != 0);
 }
 
 bool Prober::pairLeadsTo(uint64_t eye, uint64_t distance, uint64_t from, uint64_t limit, uint64_t& start)

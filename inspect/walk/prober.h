@@ -44,6 +44,9 @@ public:
   /// Whether a header is as a writer makes it: a known type, a size that suits it and lies before `limit`.
   Belief judgeHeader(const TAVHeader& header, uint64_t limit) const;
 
+  /// Whether the bytes of a header have a known type and an element of the dictionary.
+  bool isNamedHeader(const uint8_t* bytes, bool wide) const;
+
   /// Whether an eye catcher of either byte order stands at `offset`; then also its distance, in that order.
   bool pairAt(uint64_t offset, uint64_t limit, uint64_t& distance) const;
 
@@ -78,7 +81,7 @@ public:
   uint64_t spent() const { return spent_; }
 
 private:
-  bool suits(const TAVHeader& header) const;
+  static bool suits(const TAVHeader& header);
   bool isFollowedAt(uint64_t offset, bool wide, uint64_t limit) const;
   bool restartAt(const uint8_t* bytes, uint64_t offset, bool wide, uint64_t limit);
   bool restartByPair(const uint8_t* bytes, uint64_t offset, uint64_t from, uint64_t limit, Restart& restart);

@@ -6,6 +6,8 @@
 #include <utility>
 #include <vector>
 
+#include "inspect/text/bytes.h"
+#include "tav/cpp/valueText.hpp"
 #include "tav/dictionary.hpp"
 #include "tav/inspect/jsonText.hpp"
 #include "tav/inspect/path.hpp"
@@ -22,19 +24,6 @@ namespace
 constexpr size_t kPiece = size_t{48} * 1024;
 constexpr uint64_t kMaxIndent = 32;
 constexpr uint64_t kMaxNumber = 64; ///< bytes of the longest value that is one number or date
-
-std::string_view asText(std::span<const uint8_t> bytes)
-{
-  return {reinterpret_cast<const char*>(bytes.data()), bytes.size()};
-}
-
-/// Whether XML can hold the text: no control characters but tab and line ends, no U+FFFE and U+FFFF.
-bool isXmlText(std::string_view text)
-{
-  const auto allowed = [](char c) { return static_cast<uint8_t>(c) >= 0x20 || c == '\t' || c == '\n' || c == '\r'; };
-  return isUtf8(text) && std::all_of(text.begin(), text.end(), allowed) &&
-         text.find("\xEF\xBF\xBE") == std::string_view::npos && text.find("\xEF\xBF\xBF") == std::string_view::npos;
-}
 
 std::string escaped(std::string_view text, bool attribute)
 {
@@ -156,7 +145,7 @@ void XmlWriter::eachPiece(uint64_t from, uint64_t end, Action action)
 bool XmlWriter::isText(uint64_t from, uint64_t end)
 {
   bool text = true;
-  eachPiece(from, end, [&](std::string_view bytes) { return text = isXmlText(bytes); });
+  eachPiece(from, end, [&](std::string_view bytes) { return text = detail::isXmlText(bytes); });
   return text;
 }
 

@@ -149,19 +149,11 @@ private:
   uint64_t notes_ = 0;
 };
 
-int printRules(bool json)
-{
-  Output out("-");
-  out.write(json ? rulesJson() : rulesMarkdown());
-  out.commit();
-  return kFine;
-}
-
 int run(const Invocation& invocation)
 {
   if (invocation.has("--rules"))
   {
-    return printRules(invocation.has("--json"));
+    return printText(invocation.has("--json") ? rulesJson() : rulesMarkdown());
   }
   if (invocation.arguments().empty())
   {

@@ -9,30 +9,22 @@ namespace tav::tool
 namespace
 {
 
-int print(const std::string& text)
-{
-  Output out("-");
-  out.write(text);
-  out.commit();
-  return kFine;
-}
-
 int help(const Invocation& invocation)
 {
   if (invocation.has("--man"))
   {
-    return print(manualPage());
+    return printText(manualPage());
   }
   if (invocation.arguments().empty())
   {
-    return print(helpText());
+    return printText(helpText());
   }
   const Command* const command = findCommand(invocation.arguments().front());
   if (command == nullptr)
   {
     failUnknownCommand(invocation.arguments().front());
   }
-  return print(helpText(*command));
+  return printText(helpText(*command));
 }
 
 int complete(const Invocation& invocation)
@@ -43,7 +35,7 @@ int complete(const Invocation& invocation)
     throw Failure("there is no completion for '" + invocation.arguments().front() + "'",
                   "the shells are bash, zsh and fish");
   }
-  return print(text);
+  return printText(text);
 }
 
 const Registration helpRegistration{{

@@ -132,9 +132,7 @@ void putReport(const Invocation& invocation, const std::string& output, const st
     std::fputs(text.c_str(), stderr);
     return;
   }
-  Output out("-");
-  out.write(text);
-  out.commit();
+  printText(text);
 }
 
 int run(const Invocation& invocation)

@@ -160,6 +160,14 @@ uint32_t codeOfWrite(int error)
 
 } // namespace
 
+Status printText(std::string_view text)
+{
+  Output out("-");
+  out.write(text);
+  out.commit();
+  return kFine;
+}
+
 void failAtStandardOutput(int error)
 {
   if (error == EPIPE)

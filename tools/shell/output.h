@@ -11,6 +11,7 @@
 #include "tav/inspect/sink.hpp"
 #include "tav/kor.h"
 #include "tools/shell/options.h"
+#include "tools/shell/report.h"
 
 namespace tav::tool
 {
@@ -61,6 +62,9 @@ private:
   std::string buffer_{};
   uint64_t written_ = 0;
 };
+
+/// Writes a text to standard output, where it is a command's whole result: kFine.
+Status printText(std::string_view text);
 
 /// Throws what a failed write to standard output stands for, by its errno: ClosedPipe or Failure.
 [[noreturn]] void failAtStandardOutput(int error);

@@ -21,14 +21,6 @@ namespace tav::tool
 namespace
 {
 
-int print(const std::string& text)
-{
-  Output out("-");
-  out.write(text);
-  out.commit();
-  return kFine;
-}
-
 int runCommand(const Command& command, const std::vector<std::string>& words)
 {
   std::optional<Invocation> invocation;
@@ -47,7 +39,7 @@ int runCommand(const Command& command, const std::vector<std::string>& words)
   }
   if (!invocation || invocation->has("--help"))
   {
-    return print(helpText(command));
+    return printText(helpText(command));
   }
   checkOutputs(*invocation);
   const TraceFile trace(*invocation);
@@ -79,11 +71,11 @@ int dispatch(const std::vector<std::string>& words)
   const std::string& first = words.front();
   if (first == "--version")
   {
-    return print("tav " TAV_VERSION "\n");
+    return printText("tav " TAV_VERSION "\n");
   }
   if (first == "-h" || first == "--help")
   {
-    return print(helpText());
+    return printText(helpText());
   }
   // Options that all commands take may stand before the command's name.
   size_t at = 0;

@@ -14,11 +14,11 @@ namespace tav::detail
 
 inline constexpr size_t kLongestMisspelt = 64;
 
-/// Characters to change, add or leave out between two texts; the case of letters does not count.
-inline size_t editDistance(std::string_view left, std::string_view right) noexcept
+/// Characters to change, add or leave out between two texts; the case of letters does not count. `row` has room for one
+/// number more than `left` has characters.
+inline size_t editDistance(std::string_view left, std::string_view right, size_t* row) noexcept
 {
   const auto lower = [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c + ('a' - 'A')) : c; };
-  std::array<size_t, kLongestMisspelt + 1> row{};
   for (size_t i = 0; i <= left.size(); ++i)
   {
     row[i] = i;
@@ -37,16 +37,23 @@ inline size_t editDistance(std::string_view left, std::string_view right) noexce
   return row[left.size()];
 }
 
+/// The most changes of a word that still count as a slip of the fingers.
+constexpr size_t mostSlips(std::string_view word) noexcept
+{
+  return 1 + word.size() / 4;
+}
+
 /// The tag that comes nearest to a name that no element has; empty when none is near.
 inline std::string_view nearestTag(std::string_view name) noexcept
 {
   std::string_view nearest;
   if (name.size() <= kLongestMisspelt)
   {
-    size_t least = 2 + name.size() / 4;
+    std::array<size_t, kLongestMisspelt + 1> row{};
+    size_t least = mostSlips(name) + 1;
     for (const dictionary::Entry& entry : dictionary::entries())
     {
-      const size_t distance = entry.constant == "INVALID_ELEMENT" ? least : editDistance(name, entry.tag);
+      const size_t distance = entry.constant == "INVALID_ELEMENT" ? least : editDistance(name, entry.tag, row.data());
       if (distance < least)
       {
         least = distance;

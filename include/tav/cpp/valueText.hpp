@@ -105,17 +105,9 @@ inline std::string timeText(const TAVTimeStamp& stamp)
   return text.data();
 }
 
-/// The digits of a 128-bit number.
-inline std::string longText(const Sint128& number)
+/// The digits of a 128-bit number without a sign.
+inline std::string digitsOf(uint64_t high, uint64_t low)
 {
-  const bool negative = number.high < 0;
-  auto high = static_cast<uint64_t>(number.high);
-  uint64_t low = number.low;
-  if (negative)
-  {
-    low = ~low + 1;
-    high = ~high + (low == 0 ? 1 : 0);
-  }
   std::array<uint32_t, 4> words{static_cast<uint32_t>(high >> 32U), static_cast<uint32_t>(high),
                                 static_cast<uint32_t>(low >> 32U), static_cast<uint32_t>(low)};
   std::string text;
@@ -133,7 +125,19 @@ inline std::string longText(const Sint128& number)
     }
     text.insert(text.begin(), static_cast<char>('0' + remainder));
   } while (left != 0);
-  return negative ? '-' + text : text;
+  return text;
+}
+
+/// The digits of a 128-bit number with one.
+inline std::string longText(const Sint128& number)
+{
+  const auto high = static_cast<uint64_t>(number.high);
+  if (number.high >= 0)
+  {
+    return digitsOf(high, number.low);
+  }
+  const uint64_t low = ~number.low + 1;
+  return '-' + digitsOf(~high + (low == 0 ? 1 : 0), low);
 }
 
 /// A value as it is printed.
