@@ -6,10 +6,16 @@ endif()
 include(GNUInstallDirs)
 include(CMakePackageConfigHelpers)
 
-install(TARGETS kor tav tav_inspect
+# The inspection library changes more often than libtav, which most programs need alone: a component of its own.
+install(TARGETS kor tav
   EXPORT tavTargets
   RUNTIME COMPONENT runtime
   LIBRARY COMPONENT runtime NAMELINK_COMPONENT development
+  ARCHIVE COMPONENT development)
+install(TARGETS tav_inspect
+  EXPORT tavTargets
+  RUNTIME COMPONENT inspection
+  LIBRARY COMPONENT inspection NAMELINK_COMPONENT development
   ARCHIVE COMPONENT development)
 install(DIRECTORY include/tav
   DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}

@@ -1,4 +1,5 @@
-# Debian packages: libtav1 (both libraries), libtav-dev (headers, CMake package, pkg-config), tav-tools (the program).
+# Debian packages: libtav1 (libtav and libkor), libtav-inspect1 (the inspection library), libtav-dev (headers, CMake
+# package, pkg-config of all three), tav-tools (the program).
 #   cmake --preset package && cmake --build --preset package && cpack --config build/package/CPackConfig.cmake
 # cmake/check-packages.sh does that, and installs, runs and removes them in a fresh root.
 if(NOT TAV_INSTALL OR NOT TAV_LIBRARY_TYPE STREQUAL "SHARED")
@@ -19,7 +20,7 @@ set(CPACK_PACKAGE_FILE_NAME tav)
 set(CPACK_PACKAGING_INSTALL_PREFIX /usr)
 set(CPACK_STRIP_FILES ON)
 set(CPACK_DEB_COMPONENT_INSTALL ON)
-set(CPACK_COMPONENTS_ALL runtime development tools)
+set(CPACK_COMPONENTS_ALL runtime inspection development tools)
 set(CPACK_COMPONENTS_GROUPING ONE_PER_GROUP)
 set(CPACK_INSTALL_DEFAULT_DIRECTORY_PERMISSIONS
   OWNER_READ OWNER_WRITE OWNER_EXECUTE GROUP_READ GROUP_EXECUTE WORLD_READ WORLD_EXECUTE)
@@ -39,14 +40,23 @@ set(CPACK_DEBIAN_PACKAGE_GENERATE_SHLIBS ON)
 set(CPACK_DEBIAN_RUNTIME_PACKAGE_CONTROL_EXTRA "${PROJECT_SOURCE_DIR}/packaging/triggers")
 set(CPACK_COMPONENT_RUNTIME_DESCRIPTION "${about}This package has the shared libraries.")
 
+set(CPACK_DEBIAN_INSPECTION_PACKAGE_NAME libtav-inspect${TAV_ABI_VERSION})
+set(CPACK_DEBIAN_INSPECTION_PACKAGE_SECTION libs)
+set(CPACK_DEBIAN_INSPECTION_PACKAGE_CONTROL_EXTRA "${PROJECT_SOURCE_DIR}/packaging/triggers")
+set(CPACK_DEBIAN_INSPECTION_PACKAGE_DEPENDS "libtav${TAV_ABI_VERSION} (= ${PROJECT_VERSION}-1)")
+set(CPACK_COMPONENT_INSPECTION_DESCRIPTION "${about}This package has the shared library that looks into streams of unknown form,\n\
+checks, converts, compares and recovers them.")
+
 set(CPACK_DEBIAN_DEVELOPMENT_PACKAGE_NAME libtav-dev)
 set(CPACK_DEBIAN_DEVELOPMENT_PACKAGE_SECTION libdevel)
-set(CPACK_DEBIAN_DEVELOPMENT_PACKAGE_DEPENDS "libtav${TAV_ABI_VERSION} (= ${PROJECT_VERSION}-1)")
+set(CPACK_DEBIAN_DEVELOPMENT_PACKAGE_DEPENDS
+  "libtav${TAV_ABI_VERSION} (= ${PROJECT_VERSION}-1), libtav-inspect${TAV_ABI_VERSION} (= ${PROJECT_VERSION}-1)")
 set(CPACK_COMPONENT_DEVELOPMENT_DESCRIPTION "${about}This package has the headers, the CMake package and the pkg-config\nfiles.")
 
 set(CPACK_DEBIAN_TOOLS_PACKAGE_NAME tav-tools)
 set(CPACK_DEBIAN_TOOLS_PACKAGE_SECTION utils)
-set(CPACK_DEBIAN_TOOLS_PACKAGE_DEPENDS "libtav${TAV_ABI_VERSION} (= ${PROJECT_VERSION}-1)")
+set(CPACK_DEBIAN_TOOLS_PACKAGE_DEPENDS
+  "libtav${TAV_ABI_VERSION} (= ${PROJECT_VERSION}-1), libtav-inspect${TAV_ABI_VERSION} (= ${PROJECT_VERSION}-1)")
 set(CPACK_COMPONENT_TOOLS_DESCRIPTION "${about}This package has the program tav, which looks into streams, checks,\n\
 converts and recovers them, its man page and its completions.")
 
@@ -58,7 +68,8 @@ add_custom_command(OUTPUT "${history}.gz"
   DEPENDS "${history}"
   VERBATIM)
 add_custom_target(package_history ALL DEPENDS "${history}.gz")
-foreach(pair IN ITEMS "runtime;libtav${TAV_ABI_VERSION}" "development;libtav-dev" "tools;tav-tools")
+foreach(pair IN ITEMS "runtime;libtav${TAV_ABI_VERSION}" "inspection;libtav-inspect${TAV_ABI_VERSION}"
+    "development;libtav-dev" "tools;tav-tools")
   list(GET pair 0 component)
   list(GET pair 1 package)
   install(FILES packaging/copyright "${history}.gz"

@@ -15,7 +15,7 @@ quietly cmake -S . -B "$build" -G Ninja -DCMAKE_CXX_COMPILER=g++ -DCMAKE_BUILD_T
 quietly cmake --build "$build" --parallel "$(nproc)"
 quietly cpack --config "$build/CPackConfig.cmake" -B "$work/packages"
 mapfile -t packages < <(find "$work/packages" -maxdepth 1 -name '*.deb' | sort)
-((${#packages[@]} == 3)) || { echo "expected three packages, got: ${packages[*]}"; exit 1; }
+((${#packages[@]} == 4)) || { echo "expected four packages, got: ${packages[*]}"; exit 1; }
 
 echo "== lintian"
 lintian --fail-on error --suppress-tags initial-upload-closes-no-bugs "${packages[@]}"
@@ -28,24 +28,40 @@ dpkg_here() { dpkg --root="$root" --log=/dev/null --force-depends --force-not-ro
 quietly dpkg_here --install "${packages[@]}"
 libraries=$(dirname "$(find "$root/usr/lib" -name 'libtav.so.1')")
 
+echo "== each library in its package"
+# libraries_of PACKAGE LIBRARY...: the package has these, and says so to the builds of others.
+libraries_of()
+{
+  local package=$1 library
+  shift
+  [[ $(dpkg_here --listfiles "$package" | grep -cE '/lib[a-z-]+\.so\.[0-9]+$') == "$#" ]] || { echo "$package has other libraries than $*"; exit 1; }
+  for library in "$@"; do
+    grep -qE "^$library 1 $package " "$root/var/lib/dpkg/info/$package"*.shlibs || { echo "$package does not tell of $library"; exit 1; }
+  done
+}
+libraries_of libtav1 libkor libtav
+libraries_of libtav-inspect1 libtav-inspect
+
 echo "== hardened"
 # What Debian's own builds are given for it, the build has, too.
 for flag in $(DEB_BUILD_MAINT_OPTIONS=hardening=+all dpkg-buildflags --export=cmdline | grep -oE -e '-(fstack-protector|fcf-protection|fstack-clash|D_FORTIFY_SOURCE|Wformat|Werror=format)[^ "]*|-Wl,-z,[a-z]+' | sort -u); do
   grep -qF -e "$flag" "$build/build.ninja" || { echo "dpkg-buildflags has $flag, the build has not"; exit 1; }
 done
-tests/system/install/hardening.py "$root/usr/bin/tav" "$libraries"/lib{kor,tav}.so.1
+tests/system/install/hardening.py "$root/usr/bin/tav" "$libraries"/lib{kor,tav,tav-inspect}.so.1
 
 echo "== run"
 LD_LIBRARY_PATH=$libraries "$root/usr/bin/tav" --version
 for page in $(LD_LIBRARY_PATH=$libraries "$root/usr/bin/tav" help json | grep -oE '[[:alnum:]/._-]+\.md'); do
   [[ -s $root/usr/$page ]] || { echo "the package has no $page"; exit 1; }
 done
-read -ra flags <<<"$(PKG_CONFIG_PATH=$libraries/pkgconfig pkg-config --cflags --libs tav)"
-g++ -std=c++20 tests/system/install/outside/main.cpp -o "$work/outside" "${flags[@]}"
-LD_LIBRARY_PATH=$libraries "$work/outside"
+for part in tav:main tav-inspect:inspect; do
+  read -ra flags <<<"$(PKG_CONFIG_PATH=$libraries/pkgconfig pkg-config --cflags --libs "${part%%:*}")"
+  g++ -std=c++20 "tests/system/install/outside/${part##*:}.cpp" -o "$work/outside" "${flags[@]}"
+  LD_LIBRARY_PATH=$libraries "$work/outside"
+done
 
 echo "== remove"
-quietly dpkg_here --purge tav-tools libtav-dev libtav1
+quietly dpkg_here --purge tav-tools libtav-dev libtav-inspect1 libtav1
 left=$(find "$root" -type f -not -path "$root/var/lib/dpkg/*")
 [[ -z $left ]] || { echo "left behind: $left"; exit 1; }
 echo "the packages install, run and go without a trace"

@@ -9,7 +9,7 @@ work=$(mktemp -d)
 trap 'rm -rf "$work"' EXIT
 
 tests/system/abi/dump.sh "$work"
-for library in tav kor; do
+for library in tav tav-inspect kor; do
   abidiff --no-added-syms --suppressions tests/system/abi/padding.suppr "tests/system/abi/lib$library.abi" "$work/lib$library.abi"
 done
 echo "the binary interfaces are those of the last release"

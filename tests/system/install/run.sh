@@ -50,6 +50,7 @@ cmake -S "$here/outside" -B "$work/outside" -DCMAKE_PREFIX_PATH="$prefix" -DCMAK
 grep -q "tav_DIR:PATH=$prefix/" "$work/outside/CMakeCache.txt"
 cmake --build "$work/outside"
 "$work/outside/outside"
+"$work/outside/outside_inspect"
 "$work/outside/outside_kor"
 
 echo "== pkg-config"
@@ -63,7 +64,7 @@ else
   export LD_LIBRARY_PATH
 fi
 pkg-config --print-errors --exact-version="$(sed -n 's/^CMAKE_PROJECT_VERSION:STATIC=//p' "$build/CMakeCache.txt")" tav
-for part in tav:main kor:kor; do
+for part in tav:main tav-inspect:inspect kor:kor; do
   read -ra flags <<<"$(pkg-config "${mode[@]}" --cflags --libs "${part%%:*}")"
   program=$work/${part##*:}
   "$compiler" -std=c++20 -Wall -Wextra -Werror "$here/outside/${part##*:}.cpp" -o "$program" "${flags[@]}"
