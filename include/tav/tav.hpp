@@ -10,6 +10,7 @@
 
 #include "tav/cpp/error.hpp"
 #include "tav/cpp/reader.hpp"
+#include "tav/cpp/recorder.hpp"
 #include "tav/cpp/updater.hpp"
 #include "tav/cpp/writer.hpp"
 #include "tav/tav.h"

@@ -500,6 +500,11 @@ inline FileEnd openToAppend(const std::filesystem::path& path, const FileOptions
   {
     return found;
   }
+  if (isDevice(path))
+  {
+    found.outcome = {KOR_RC_NOT_SEEKABLE, "a device has no end to go on behind"};
+    return found;
+  }
   found = findEnd(*storage->pFile, given);
   storage->needSeek = 1;
   if (found.outcome.code == TAV_RC_OK && !found.open.empty() && options.openRoot == OpenRoot::refuse)

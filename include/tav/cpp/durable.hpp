@@ -42,6 +42,11 @@ public:
     return failed_;
   }
 
+  [[nodiscard]] bool hasFailed() const noexcept
+  {
+    return failed_ != TAV_RC_OK;
+  }
+
   /// What there is to say of a code that sync() gave; empty when it says all.
   [[nodiscard]] const char* refusal(uint32_t code) const noexcept
   {

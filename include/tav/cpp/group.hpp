@@ -340,6 +340,7 @@ private:
       else
       {
         state_->settle();
+        rc = outer_ == 0 && state_->watch != nullptr ? state_->watch->afterRoot() : TAV_RC_OK;
       }
     }
     return rc;
@@ -356,7 +357,7 @@ private:
       return;
     }
     state.deferred = rc;
-    if (last)
+    if (last && level_ != 0) // what came after the closing can fail, too
     {
       ++state.orphans;
       state.innermost = outer_;

@@ -17,6 +17,11 @@
 namespace tav
 {
 
+namespace detail
+{
+class Recording;
+}
+
 /// Writes one stream. Owns its handle, its file or its buffer; used by one thread at a time. Move-only.
 /// Call finish() at the end: a writer that is merely destroyed cannot tell that its last pages could not be written.
 class Writer
@@ -231,6 +236,8 @@ public:
   }
 
 private:
+  friend class detail::Recording;
+
   enum class Unopened : uint8_t
   {
     state

@@ -49,6 +49,21 @@ uint32_t infoOf(const Options& options) noexcept
   return code == TAV_RC_BAD_PARAM && cause != TAV_RC_OK ? cause : code;
 }
 
+/// Who is asked before anything is done in an open group, and told when a root is closed. What they answer is what the
+/// operation does.
+class Watch
+{
+public:
+  virtual uint32_t beforeAdding() noexcept = 0;
+  virtual uint32_t afterRoot() noexcept = 0;
+
+protected:
+  Watch() = default;
+  Watch(const Watch&) = default;
+  Watch& operator=(const Watch&) = default;
+  ~Watch() = default;
+};
+
 /// Kept by a plain count: a writer and its groups belong to one thread.
 struct WriterState
 {
@@ -69,6 +84,7 @@ struct WriterState
   uint64_t finishedSize = 0;
   bool isFinished = false;
   uint32_t unclosed = TAV_RC_OK; ///< what closing the file answered
+  Watch* watch = nullptr;        ///< then nothing takes the fast way
   bool isShared = false;         ///< the handle was given away: plain operations can open and close groups
 
   WriterState() = default;
@@ -99,7 +115,8 @@ struct WriterState
   /// After whatever `enter` and `width` look at has changed: nodes are added by the dozen in between.
   void settle() noexcept
   {
-    const bool plain = handle != nullptr && !isShared && deferred == TAV_RC_OK && orphans == 0 && innermost != 0;
+    const bool plain =
+        handle != nullptr && !isShared && deferred == TAV_RC_OK && orphans == 0 && innermost != 0 && watch == nullptr;
     fast = plain && block == nullptr && depth() == innermost && width() == Width::bits64 ? innermost : kNoLevel;
   }
 
@@ -153,7 +170,7 @@ struct WriterState
         --orphans;
         settle();
       }
-    return TAV_RC_OK;
+    return watch != nullptr && level != 0 ? watch->beforeAdding() : TAV_RC_OK;
   }
 
   /// Why `enter` has refused an operation on the group at a level, or on the stream; empty when it has not.

@@ -28,6 +28,12 @@ uint64_t imagesWanted()
   return wanted != nullptr ? std::strtoull(wanted, nullptr, 10) : 400;
 }
 
+std::string pathFor(const std::string& name)
+{
+  return tav::host::textOf(std::filesystem::temp_directory_path()) + "/tav-crash-" +
+         std::to_string(tav::host::processId()) + "-" + name;
+}
+
 /// What a program has to rely on from a place in the log on.
 struct Promise
 {
@@ -57,8 +63,7 @@ class Recorded
 {
 public:
   Recorded(const Style& style, uint64_t seed)
-      : style_(style), random_(seed), path_(tav::host::textOf(std::filesystem::temp_directory_path()) + "/tav-crash-" +
-                                            std::to_string(tav::host::processId()) + "-" + std::to_string(seed))
+      : style_(style), random_(seed), path_(pathFor(std::to_string(seed)))
   {
     recording_.options = {.align8 = style.align,
                           .root = style.narrow ? tav::Width::bits32 : tav::Width::bits64,
@@ -268,15 +273,21 @@ std::string missing(const std::set<uint32_t>& found, uint32_t due)
 
 std::vector<Style> styles()
 {
-  return {{0, true, false, false, 3}, {0, false, true, false, 2}, {0, false, false, true, 2}, {512, true, false, false, 1}, {512, false, false, false, 1}, {4096, true, true, false, 1}, {64, false, false, true, 1}, {4096, false, false, false, 1}};
+  return {{0, true, false, false, 3},    // as the layer opens files
+          {0, false, true, false, 2},    //
+          {0, false, false, true, 2},    //
+          {512, true, false, false, 1},  // with pages that come and go
+          {512, false, false, false, 1}, //
+          {4096, true, true, false, 1},  //
+          {64, false, false, true, 1},   //
+          {4096, false, false, false, 1}};
 }
 
 } // namespace
 
 TEST(Sync, WaitsForTheFileAndOnceForItsFolder)
 {
-  const std::string path = tav::host::textOf(std::filesystem::temp_directory_path()) + "/tav-crash-folder-" +
-                           std::to_string(tav::host::processId());
+  const std::string path = pathFor("folder");
   tav::Writer writer(path);
   crash::watch(path);
   tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM);
@@ -304,8 +315,7 @@ TEST(Sync, WaitsForTheFileAndOnceForItsFolder)
 
 TEST(Sync, ThatFailedMakesAllLaterOnesFail)
 {
-  const std::string path = tav::host::textOf(std::filesystem::temp_directory_path()) + "/tav-crash-failed-" +
-                           std::to_string(tav::host::processId());
+  const std::string path = pathFor("failed");
   tav::Writer writer(path);
   crash::watch(path);
   tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM);

@@ -131,4 +131,43 @@ TEST(LayerOnAFullDisk, LeavesTheFileThatItWasToReplace)
   EXPECT_EQ(std::distance(Iterator(folder.path()), Iterator()), 1);
 }
 
+TEST(LayerOnAFullDisk, ARecorderTellsItAtTheCallThatMeetsItAndLosesNothing)
+{
+  const TestFolder folder;
+  tav::Recorder recorder(folder / "x-%n.tav", {.maxBytes = 3U << 20U, .syncEvery = std::chrono::nanoseconds(0)},
+                         {.ringBytes = 2U << 20U});
+  auto limit = std::make_unique<SizeLimit>(uint64_t{5} << 19U);
+  uint64_t failures = 0;
+  constexpr uint32_t roots = 60;
+  for (uint32_t i = 0; i < roots; ++i)
+  {
+    tav::Group root = recorder.group(TAV_ELM_CMN_SYSTEM);
+    root.add(TAV_ELM_CMN_CPU_ONLINE, i);
+    root.add(TAV_ELM_CMN_HOST_NAME, std::string(100'000, 'x'));
+    std::error_code ec;
+    root.close(ec);
+    EXPECT_FALSE(root.isOpen()) << "it is closed; what failed is to put it on the device";
+    if (ec)
+    {
+      ++failures;
+      EXPECT_EQ(tav::codeOf(ec), KOR_RC_FILE_TOO_LARGE) << ec.message();
+      limit.reset();
+      recorder.sync();
+    }
+  }
+  recorder.finish();
+  EXPECT_EQ(failures, 1U);
+  uint32_t next = 0;
+  for (int file = 1; file <= 2; ++file)
+  {
+    const tav::Reader reader(folder / ("x-" + std::to_string(file) + ".tav"));
+    for (const tav::Node& root : reader.roots())
+    {
+      tav::ChildRange children = root.children();
+      EXPECT_EQ((*children.begin()).as<uint32_t>(), next++);
+    }
+  }
+  EXPECT_EQ(next, roots);
+}
+
 } // namespace

@@ -1,0 +1,352 @@
+/// @file recorder.hpp
+/// Recording for weeks: roots one after another, in files that change.
+#pragma once
+
+#include <algorithm>
+#include <charconv>
+#include <chrono>
+#include <cstdint>
+#include <filesystem>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <system_error>
+#include <utility>
+#include <vector>
+
+#include "tav/cpp/writer.hpp"
+
+namespace tav
+{
+
+/// When a recorder changes files, and what it does for those that it has written.
+struct RecorderOptions
+{
+  uint64_t maxBytes = 0;              ///< a file that has as many takes no further root; 0: any number
+  uint64_t keep = 0;                  ///< files that stay, the newest ones; older ones are removed. 0: all
+  std::chrono::nanoseconds maxAge{0}; ///< a file that was opened so long ago takes no further root; 0: any time
+  /// Syncs when a root is closed and the last sync was so long ago, and within a root that takes longer when something
+  /// is added to it; 0: whenever a root is closed. Unset: never by itself.
+  std::optional<std::chrono::nanoseconds> syncEvery{};
+};
+
+namespace detail
+{
+
+/// The files that a recorder's path stands for: "day-%n.tav" for day-1.tav, day-2.tav, and so on.
+class NumberedFiles
+{
+public:
+  explicit NumberedFiles(const std::filesystem::path& path)
+      : path_(path)
+  {
+    const std::string name = fileText(path.filename());
+    const size_t at = name.find("%n");
+    isNumbered_ = at != std::string::npos;
+    before_ = name.substr(0, at);
+    behind_ = isNumbered_ ? name.substr(at + 2) : "";
+  }
+
+  [[nodiscard]] bool isNumbered() const noexcept
+  {
+    return isNumbered_;
+  }
+  [[nodiscard]] std::filesystem::path at(uint64_t number) const
+  {
+    if (!isNumbered_)
+    {
+      return path_;
+    }
+    const std::string name = before_ + std::to_string(number) + behind_;
+    return path_.parent_path() / std::filesystem::path(std::u8string(name.begin(), name.end()));
+  }
+
+  /// The numbers of the files that are there, in rising order.
+  uint32_t list(std::vector<uint64_t>& numbers) const
+  {
+    numbers.clear();
+    std::error_code error;
+    const std::filesystem::path folder = path_.has_parent_path() ? path_.parent_path() : std::filesystem::path(".");
+    std::filesystem::directory_iterator entry(folder, error);
+    for (; !error && entry != std::filesystem::directory_iterator(); entry.increment(error))
+    {
+      uint64_t number = 0;
+      if (numberOf(fileText(entry->path().filename()), number))
+      {
+        numbers.push_back(number);
+      }
+    }
+    std::sort(numbers.begin(), numbers.end());
+    return error == std::errc::no_such_file_or_directory ? KOR_RC_NO_SUCH_FILE
+           : error == std::errc::permission_denied       ? KOR_RC_NO_PERMISSION
+           : error                                       ? KOR_RC_IO_ERROR
+                                                         : TAV_RC_OK;
+  }
+
+  /// Removes all files but the last ones. Goes on over one that cannot be removed.
+  uint32_t removeAllBut(uint64_t count) const
+  {
+    std::vector<uint64_t> numbers;
+    uint32_t rc = list(numbers);
+    for (size_t i = 0; i + count < numbers.size(); ++i)
+    {
+      std::error_code error;
+      std::filesystem::remove(at(numbers[i]), error);
+      rc = error == std::errc::permission_denied ? KOR_RC_NO_PERMISSION
+           : error                               ? KOR_RC_IO_ERROR
+                                                 : rc;
+    }
+    return rc;
+  }
+
+private:
+  bool numberOf(std::string_view name, uint64_t& number) const noexcept
+  {
+    if (name.size() <= before_.size() + behind_.size() || !name.starts_with(before_) || !name.ends_with(behind_))
+    {
+      return false;
+    }
+    name = name.substr(before_.size(), name.size() - before_.size() - behind_.size());
+    const auto [end, failure] = std::from_chars(name.data(), name.data() + name.size(), number);
+    return failure == std::errc() && end == name.data() + name.size() && name.front() != '0';
+  }
+
+  std::filesystem::path path_;
+  std::string before_;
+  std::string behind_;
+  bool isNumbered_ = false;
+};
+
+/// A recorder's files and times; at one place as long as it lives, since its writer's groups ask it.
+class Recording final : public Watch
+{
+public:
+  using Clock = std::chrono::steady_clock;
+
+  Recording(const std::filesystem::path& path, const RecorderOptions& options, const StreamOptions& stream)
+      : files_(path), options_(options), stream_(stream)
+  {
+  }
+
+  /// Opens the last file that is there, to go on in it, or the first one.
+  FileOutcome open()
+  {
+    const bool changes = options_.maxBytes != 0 || options_.maxAge.count() != 0 || options_.keep != 0;
+    if (!files_.isNumbered() && changes)
+    {
+      return {TAV_RC_BAD_PARAM, "the file's name needs a %n, where the number of each file comes"};
+    }
+    std::vector<uint64_t> numbers;
+    if (const uint32_t rc = files_.isNumbered() ? files_.list(numbers) : TAV_RC_OK; rc != TAV_RC_OK)
+    {
+      return {rc};
+    }
+    number_ = numbers.empty() ? 1 : numbers.back();
+    FileOutcome outcome = openFile({.append = true});
+    const bool isLeft = outcome.code == TAV_RC_NOT_FOUND || outcome.code == TAV_RC_BAD_OPTIONS ||
+                        outcome.code == TAV_RC_OUTSIDE_PARENT;
+    return isLeft && files_.isNumbered() ? openNext() : outcome;
+  }
+
+  /// What stands before a root: another file, when this one has had its time or has its size.
+  FileOutcome prepare()
+  {
+    if (isFinished_)
+    {
+      return {TAV_RC_BAD_PARAM, "the recording is finished"};
+    }
+    FileOutcome outcome;
+    if (writer_ && isDue())
+    {
+      outcome = endFile();
+    }
+    if (outcome.code == TAV_RC_OK && !writer_)
+    {
+      outcome = openNext();
+    }
+    opened_ = Clock::now();
+    return outcome;
+  }
+
+  FileOutcome finish()
+  {
+    const FileOutcome outcome = writer_ ? endFile() : FileOutcome{};
+    isFinished_ = outcome.code == TAV_RC_OK;
+    return outcome;
+  }
+
+  uint32_t syncNow() noexcept
+  {
+    const uint32_t rc = writer_ ? writer_->makeDurable() : TAV_RC_BAD_PARAM;
+    synced_ = rc == TAV_RC_OK ? Clock::now() : synced_;
+    return rc;
+  }
+
+  uint32_t beforeAdding() noexcept override
+  {
+    const bool looks = options_.syncEvery && options_.syncEvery->count() > 0;
+    return looks && Clock::now() - std::max(synced_, opened_) >= *options_.syncEvery ? syncNow() : TAV_RC_OK;
+  }
+  uint32_t afterRoot() noexcept override
+  {
+    return options_.syncEvery && Clock::now() - synced_ >= *options_.syncEvery ? syncNow() : TAV_RC_OK;
+  }
+
+  std::optional<Writer>& writer() noexcept
+  {
+    return writer_;
+  }
+  [[nodiscard]] std::filesystem::path path() const
+  {
+    return files_.at(number_);
+  }
+
+private:
+  [[nodiscard]] bool isDue() const noexcept
+  {
+    const bool isFull = options_.maxBytes != 0 && writer_->size() >= options_.maxBytes;
+    const bool isOld = options_.maxAge.count() != 0 && Clock::now() - begun_ >= options_.maxAge;
+    return writer_->size() != 0 && files_.isNumbered() && (isFull || isOld || writer_->durable_.hasFailed());
+  }
+
+  FileOutcome openFile(const FileOptions& options)
+  {
+    std::error_code ec;
+    FileOutcome outcome;
+    writer_ = Writer(Writer::Unopened::state);
+    outcome = writer_->openPath(path(), options, &stream_);
+    if (outcome.code != TAV_RC_OK)
+    {
+      writer_.reset();
+      return outcome;
+    }
+    writer_->state_->watch = options_.syncEvery ? this : nullptr;
+    writer_->state_->settle();
+    begun_ = synced_ = Clock::now();
+    return outcome;
+  }
+
+  /// The file behind this one. Older ones go when it is there.
+  FileOutcome openNext()
+  {
+    ++number_;
+    const FileOutcome outcome = openFile({});
+    if (outcome.code != TAV_RC_OK)
+    {
+      --number_;
+      return outcome;
+    }
+    const uint32_t rc = options_.keep != 0 ? files_.removeAllBut(options_.keep) : TAV_RC_OK;
+    return {rc, rc == TAV_RC_OK ? "" : "older files cannot be removed; the recording can go on"};
+  }
+
+  FileOutcome endFile()
+  {
+    uint32_t rc = options_.syncEvery && !writer_->durable_.hasFailed() ? syncNow() : TAV_RC_OK;
+    rc = rc == TAV_RC_OK ? writer_->end() : rc;
+    if (rc != TAV_RC_OK)
+    {
+      return {rc, writer_->state_->refusal(0)};
+    }
+    writer_.reset();
+    return {};
+  }
+
+  NumberedFiles files_;
+  RecorderOptions options_;
+  StreamOptions stream_;
+  std::optional<Writer> writer_;
+  uint64_t number_ = 1;
+  Clock::time_point begun_{};  ///< when the file was opened
+  Clock::time_point opened_{}; ///< the last root
+  Clock::time_point synced_{};
+  bool isFinished_ = false;
+};
+
+} // namespace detail
+
+/// Records roots one after another into files that change between them, and goes on in the last one after a crash. In a
+/// path like "day-%n.tav" %n is the number of the file; without it there is one file, which grows. A last file that
+/// cannot be gone on with, being damaged or of another form, stays as it is, and the next number begins; so it does
+/// behind a sync that failed, after which nothing is sure of the file. It has no
+/// thread: times are looked at by the calls, and by those of its groups. A failure comes up at the call that meets it.
+/// Used by one thread at a time. Move-only.
+class Recorder
+{
+public:
+  explicit Recorder(const std::filesystem::path& path, const RecorderOptions& options = {},
+                    const StreamOptions& stream = {})
+      : recording_(std::make_unique<detail::Recording>(path, options, stream))
+  {
+    const detail::FileOutcome outcome = recording_->open();
+    detail::demand(outcome.code, "recording into", [&] { return detail::tellFile(path, outcome); });
+  }
+  Recorder(const std::filesystem::path& path, const RecorderOptions& options, const StreamOptions& stream,
+           std::error_code& ec)
+      : recording_(std::make_unique<detail::Recording>(path, options, stream))
+  {
+    detail::report(recording_->open().code, ec);
+  }
+  Recorder(Recorder&&) noexcept = default;
+  Recorder& operator=(Recorder&&) noexcept = default;
+
+  /// Opens a root, in another file when it is time for one.
+  Group group(ElementId elm, const GroupOptions& options = {}) &
+  {
+    const detail::FileOutcome outcome = prepare();
+    detail::demand(outcome.code, "recording into", [&] { return detail::tellFile(path(), outcome); });
+    return recording_->writer()->group(elm, options);
+  }
+  Group group(ElementId elm, const GroupOptions& options, std::error_code& ec) &
+  {
+    const uint32_t rc = prepare().code;
+    detail::report(rc, ec);
+    Writer none;
+    return rc == TAV_RC_OK ? recording_->writer()->group(elm, options, ec) : none.resumed();
+  }
+  Group group(ElementId, const GroupOptions& = {}) && = delete;
+  Group group(ElementId, const GroupOptions&, std::error_code&) && = delete;
+
+  /// As Writer::flush and Writer::sync.
+  void flush()
+  {
+    current("flushing a recording").flush();
+  }
+  void sync()
+  {
+    current("syncing a recording").sync();
+  }
+
+  /// Ends the recording, of which syncEvery syncs the last bytes. TAV_RC_BAD_PARAM while a group is open.
+  void finish()
+  {
+    const detail::FileOutcome outcome = recording_ ? recording_->finish() : detail::FileOutcome{TAV_RC_BAD_PARAM};
+    detail::demand(outcome.code, "finishing", [&] { return detail::tellFile(path(), outcome); });
+  }
+  void finish(std::error_code& ec)
+  {
+    detail::report(recording_ ? recording_->finish().code : TAV_RC_BAD_PARAM, ec);
+  }
+
+  /// The file that the last root went to, or the next one does.
+  [[nodiscard]] std::filesystem::path path() const
+  {
+    return recording_ ? recording_->path() : std::filesystem::path();
+  }
+
+private:
+  detail::FileOutcome prepare()
+  {
+    return recording_ ? recording_->prepare() : detail::FileOutcome{TAV_RC_BAD_PARAM, "the recorder was moved from"};
+  }
+  Writer& current(const char* what)
+  {
+    detail::demand(recording_ && recording_->writer() ? TAV_RC_OK : TAV_RC_BAD_PARAM, what);
+    return *recording_->writer();
+  }
+
+  std::unique_ptr<detail::Recording> recording_;
+};
+
+} // namespace tav
