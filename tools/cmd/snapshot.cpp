@@ -1,8 +1,12 @@
 // tav snapshot: describes this machine as a stream.
-#include <filesystem>
 #include <memory>
+#include <span>
+#include <string>
+#include <vector>
 
 #include "tav/byteOrder.h"
+#include "tav/tav.hpp"
+#include "tools/cmd/snapshotSeries.h"
 #include "tools/host/host.h"
 #include "tools/host/machine.h"
 #include "tools/shell/options.h"
@@ -121,9 +125,38 @@ bool isSwapped(const Invocation& invocation)
   return order == "swapped" || order == (kor::isLittleEndian ? "big" : "little");
 }
 
+/// The stream of this machine as it is now.
+std::vector<uint8_t> makeSnapshot(const SnapshotForm& form)
+{
+  constexpr size_t room = size_t{256} * 1024;
+  std::vector<uint8_t> block(room); // zeroed: padding is skipped and not written, and shows what was there
+  TAVSSMemory memory(block.data(), room);
+  const bool narrow = form.stream.root == Width::bits32;
+  const uint64_t options = TAV_OPT_WRITE | (narrow ? TAV_OPT_ROOT32 : 0);
+  TAVInitParam param(&memory, options, kDefaultRing, 0,
+                     form.stream.byteOrder == ByteOrder::swapped ? TAV_BYTE_ORDER_SWAPPED : uint8_t{0},
+                     form.stream.align8 ? uint8_t{1} : uint8_t{0});
+  TAVHandle* handle = nullptr;
+  check(tavInitHandle(&handle, &param), "tavInitHandle");
+  const auto closing = [](TAVHandle* open) { tavTermHandle(&open); };
+  const std::unique_ptr<TAVHandle, decltype(closing)> closer(handle, closing);
+  SnapshotWriter writer(handle, narrow, form.pairs);
+  describe(writer, host::describeMachine());
+  block.resize(static_cast<size_t>(handle->streamBytes));
+  return block;
+}
+
+/// What stands below the root, without what ends it.
+std::span<const std::byte> nodesOf(const std::vector<uint8_t>& snapshot, const SnapshotForm& form)
+{
+  const bool wide = form.stream.root == Width::bits64;
+  const uint64_t header = layout::headerLength(wide ? TAV_HDR_64 : TAV_HDR_32);
+  const uint64_t end = form.pairs ? layout::endElementLength(wide) : 0;
+  return std::as_bytes(std::span(snapshot)).subspan(header, snapshot.size() - header - end);
+}
+
 int run(const Invocation& invocation)
 {
-  constexpr uint64_t room = uint64_t{256} * 1024;
   const std::string root = invocation.text("--root");
   if (root == "64" && invocation.has("--hdr32"))
   {
@@ -136,24 +169,22 @@ int run(const Invocation& invocation)
                       " and --eye-size exclude each other",
                   "only 64-bit headers can announce an eye/size pair");
   }
+  const SnapshotForm form{{.byteOrder = isSwapped(invocation) ? ByteOrder::swapped : ByteOrder::native,
+                           .align8 = invocation.has("--align"),
+                           .root = narrow ? Width::bits32 : Width::bits64},
+                          invocation.has("--eye-size")};
+  if (invocation.has("--append"))
+  {
+    return appendSnapshots(invocation, form, [&form](const auto& take) { take(nodesOf(makeSnapshot(form), form)); });
+  }
+  refuseSeries(invocation);
   Output out(invocation.text("--output", "-"), invocation.has("--force"));
   if (isStandardOutput(invocation.text("--output", "-")) && host::isTerminal(stdout))
   {
     throw Failure("snapshot: a stream is no text for a terminal", "-o FILE writes it to a file");
   }
-  // Zeroed: padding is skipped and not written, and shows what was there.
-  const auto block = std::make_unique<uint8_t[]>(room);
-  TAVSSMemory memory(block.get(), room);
-  const uint64_t options = TAV_OPT_WRITE | (narrow ? TAV_OPT_ROOT32 : 0);
-  TAVInitParam param(&memory, options, kDefaultRing, 0, isSwapped(invocation) ? TAV_BYTE_ORDER_SWAPPED : uint8_t{0},
-                     invocation.has("--align") ? uint8_t{1} : uint8_t{0});
-  TAVHandle* handle = nullptr;
-  check(tavInitHandle(&handle, &param), "tavInitHandle");
-  const auto closing = [](TAVHandle* open) { tavTermHandle(&open); };
-  const std::unique_ptr<TAVHandle, decltype(closing)> closer(handle, closing);
-  SnapshotWriter writer(handle, narrow, invocation.has("--eye-size"));
-  describe(writer, host::describeMachine());
-  out.write(std::span<const uint8_t>(block.get(), static_cast<size_t>(handle->streamBytes)));
+  const std::vector<uint8_t> bytes = makeSnapshot(form);
+  out.write(std::span<const uint8_t>(bytes));
   out.commit();
   return kFine;
 }
@@ -163,16 +194,34 @@ const Registration registration{{
     .name = "snapshot",
     .arguments = "",
     .summary = "describes this machine as a stream",
-    .description = "Writes a stream with the host's name, operating system, processors and memory (in bytes).",
-    .options = {{.names = "-o,--output",
-                 .kind = ValueKind::file,
-                 .value = "FILE",
-                 .help = "where to; standard output unless given"},
-                {.names = "--eye-size", .help = "end every node with an eye/size pair"},
-                {.names = "--hdr32", .help = "32-bit headers, as with --root 32"}},
+    .description =
+        "Writes a stream with the host's name, operating system, processors and memory (in bytes).\n\n"
+        "With --append the snapshot goes behind the last stream of a file, which must have the form that the "
+        "options say; a root that a killed program left open is closed first. A file that another program "
+        "records into is refused.",
+    .options =
+        {{.names = "-o,--output",
+          .kind = ValueKind::file,
+          .value = "FILE",
+          .help = "where to; standard output unless given"},
+         {.names = "--append",
+          .help = "go on at the end of FILE, with the time of the snapshot; it is on the device when the "
+                  "command ends"},
+         {.names = "--every",
+          .kind = ValueKind::text,
+          .value = "TIME",
+          .help = "with --append: a snapshot every 500ms, 5s, 1m, 2h, until interrupted"},
+         {.names = "--count", .kind = ValueKind::number, .value = "N", .help = "with --every: end after so many"},
+         {.names = "--rotate",
+          .kind = ValueKind::number,
+          .value = "SIZE",
+          .help = "with --append: change the file when it has SIZE bytes; %n in FILE is its number"},
+         {.names = "--eye-size", .help = "end every node with an eye/size pair"},
+         {.names = "--hdr32", .help = "32-bit headers, as with --root 32"}},
     .concerns = kForm | kCalls,
     .examples = {{"tav snapshot -o x.tav", "write one"},
                  {"tav snapshot --byte-order big --align -o y.tav", "in another form"},
+                 {"tav snapshot --append --every 5s --rotate 64M -o day-%n.tav", "record this machine"},
                  {"tav snapshot | tav tree -", "look at this machine"}},
     .run = run,
 }};

@@ -117,6 +117,14 @@ std::vector<std::string> inputsOf(const Invocation& invocation)
   return inputs;
 }
 
+/// Whether a command goes on at the end of its output, so that an existing one is not replaced.
+bool appends(const Invocation& invocation)
+{
+  const std::vector<OptionSpec>& options = invocation.command().options;
+  const auto isIt = [](const OptionSpec& option) { return longName(option) == "--append"; };
+  return std::any_of(options.begin(), options.end(), isIt) && invocation.has("--append");
+}
+
 } // namespace
 
 bool isStandardOutput(const std::string& path)
@@ -144,7 +152,8 @@ void checkOutputs(const Invocation& invocation)
       throw Failure(command + ": " + output->option + " '" + output->path + "' is a file that is read",
                     "write to another one; --force does not replace what is being read");
     }
-    checkWritable(output->path, invocation.has("--force"));
+    const bool stays = output->option == "--output" && appends(invocation);
+    checkWritable(output->path, stays || invocation.has("--force"));
   }
 }
 
