@@ -38,6 +38,8 @@ C_PUBLIC = ("include/tav/codes.h", "include/tav/elements.h", "include/tav/types.
 C_HEADERS = {"stddef.h", "stdint.h"}
 # What the program's own files of a platform may use of kor, beside its public headers.
 FOR_HOST = {"kor/systemError.h", "kor/wideText.h", "kor/windows.h"}
+# And what it has for the inspection library.
+FOR_INSPECT = {"kor/fileWatch.h"}
 # Who may know the platform: the public headers that declare exports and turn bytes, and the files of each platform.
 PLATFORM_HEADERS = ("include/tav/decl.h", "include/tav/kor.h", "include/tav/byteOrder.h")
 PLATFORM_FILE = re.compile(r"^(kor/(\w+(Posix|Windows)\.cpp|windows\.h)|tools/host/\w+(Posix|Windows)\.cpp)$")
@@ -93,7 +95,8 @@ def include_error(name, room, opening, path):
     if opening == '"':
         if "/" not in path:
             return f'"{path}" is named without its room'
-        if (first in ROOMS and first in ROOMS[room]) or (room == "tools" and knows_platform(name) and path in FOR_HOST):
+        if (first in ROOMS and first in ROOMS[room]) or (room == "inspect" and path in FOR_INSPECT) or \
+                (room == "tools" and knows_platform(name) and path in FOR_HOST):
             return None
         return f"{room} must not include {path}"
     if name in C_PUBLIC and path in C_HEADERS:

@@ -44,16 +44,21 @@ std::string nameOf(const std::filesystem::path& path)
 
 } // namespace
 
+StreamOptions streamOptions(const Form& form, uint64_t ringBytes)
+{
+  StreamOptions options;
+  options.byteOrder = form.swapped ? ByteOrder::swapped : ByteOrder::native;
+  options.align8 = form.aligned;
+  options.ringBytes = ringBytes;
+  return options;
+}
+
 tav::Reader& DocumentState::readerOf(const Form& form)
 {
   auto& reader = readers[(form.swapped ? 1U : 0U) + (form.aligned ? 2U : 0U)];
   if (reader == nullptr)
   {
-    StreamOptions options;
-    options.byteOrder = form.swapped ? ByteOrder::swapped : ByteOrder::native;
-    options.align8 = form.aligned;
-    options.ringBytes = ringBytes;
-    reader = std::make_unique<tav::Reader>(source->storage(), options);
+    reader = std::make_unique<tav::Reader>(source->storage(), streamOptions(form, options.ringBytes));
   }
   return *reader;
 }
@@ -109,6 +114,7 @@ bool NodeRange::advance()
 Document::Document(const std::filesystem::path& path, const DocumentOptions& options)
 {
   open(ByteSource::open(nameOf(path), options.ringBytes, options.from), options);
+  state_->path = options.from == 0 ? nameOf(path) : std::string();
 }
 
 Document::Document(std::span<const std::byte> bytes, const DocumentOptions& options)
@@ -136,7 +142,7 @@ void Document::open(std::unique_ptr<ByteSource> source, const DocumentOptions& o
   state_ = std::make_unique<DocumentState>();
   DocumentState& state = *state_;
   state.source = std::move(source);
-  state.ringBytes = options.ringBytes;
+  state.options = options;
   state.recognition = recognise(*state.source, options.form);
   const FormChoice& given = options.form;
   const bool isGiven = given.swapped || given.root64 || given.aligned;

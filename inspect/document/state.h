@@ -4,6 +4,7 @@
 #include <array>
 #include <map>
 #include <memory>
+#include <string>
 #include <vector>
 
 #include "tav/inspect/damageWatch.hpp"
@@ -11,6 +12,9 @@
 
 namespace tav::inspect
 {
+
+/// How the exact reader is told of a form.
+StreamOptions streamOptions(const Form& form, uint64_t ringBytes);
 
 struct DocumentState
 {
@@ -33,7 +37,8 @@ struct DocumentState
 
   std::unique_ptr<ByteSource> source{};
   Recognition recognition{};
-  uint64_t ringBytes = kDefaultRing;
+  DocumentOptions options{};
+  std::string path{};               ///< of a file that was opened by it, from its first byte on
   std::vector<Damage> damage{};     ///< by offset, each place once
   std::map<uint64_t, Form> forms{}; ///< where streams begin that are in another form than the one before
   std::array<std::unique_ptr<tav::Reader>, 4> readers{};

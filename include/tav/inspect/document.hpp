@@ -2,12 +2,15 @@
 /// Documents: reading files that come from somewhere.
 #pragma once
 
+#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <filesystem>
+#include <functional>
 #include <memory>
 #include <ranges>
 #include <span>
+#include <stop_token>
 #include <string_view>
 #include <utility>
 
@@ -40,6 +43,21 @@ struct DocumentOptions
   FormChoice form{};                 ///< what is known of the form; the rest is found out
   uint64_t ringBytes = kDefaultRing; ///< memory for a file's pages, once for walks and once for nodes
   uint64_t from = 0;                 ///< what stands before it in a file is left out, and offsets count from there
+};
+
+/// How a file is followed.
+struct FollowOptions
+{
+  std::stop_token stop{};               ///< ends it, at the latest after a tenth of a second
+  std::chrono::milliseconds timeout{0}; ///< ends it when no node has come for so long; 0: nothing does
+  bool existing = true;                 ///< begins with what is there already
+};
+
+/// Why following has ended.
+enum class FollowEnd : uint8_t
+{
+  stopped,
+  timedOut
 };
 
 struct DocumentState;
@@ -113,6 +131,19 @@ public:
   TAV_INSPECT_API NodeRange find(const tav::Node& from, std::string_view path,
                                  OnDamage onDamage = OnDamage::stop) const&;
   NodeRange find(const tav::Node& from, std::string_view path, OnDamage onDamage = OnDamage::stop) const&& = delete;
+
+  /// Calls `onNode` with each node of the file, and then with each that is written, in stream order: a group when it
+  /// was opened, a data element when it is whole. A node is valid during the call. Elements that only end a group are
+  /// left out, and damaged places are passed over.
+  ///
+  /// The path is followed, not the file: when another file takes its place, the rest of the old one comes first, then
+  /// all of the new one; a file that is missing is waited for; one that was made shorter, or emptied and begun with
+  /// another root, is read from its start again. What a writer took back may have been told. Looks when the system
+  /// tells of a change, and ten times a second.
+  /// @throws Error TAV_RC_NOT_SUPPORTED for a document that was not opened by a path, or not from its first byte on;
+  ///         TAV_RC_DATA_TOO_LARGE for a data element that is larger than the ring; and what `onNode` throws
+  TAV_INSPECT_API FollowEnd follow(const std::function<void(const tav::Node&)>& onNode,
+                                   const FollowOptions& options = {}) const;
 
   /// What walks have passed over so far, by offset, each place once: the first 1,048,576 of them. Valid until a range
   /// of the document moves on.

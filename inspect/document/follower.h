@@ -1,0 +1,73 @@
+/// Reads a file while it grows.
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <optional>
+#include <stop_token>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "tav/inspect/document.hpp"
+
+namespace tav::inspect
+{
+
+/// Walks a growing file as far as it is written, and goes on from there when it is asked again. In memory are the
+/// groups around the place and what is read at a time. The exact reader's steps lead from node to node.
+class Follower
+{
+public:
+  using OnNode = std::function<void(const tav::Node&)>;
+
+  Follower(std::string path, const DocumentOptions& options, const OnNode& onNode, std::stop_token stop)
+      : path_(std::move(path)), options_(options), onNode_(onNode), stop_(std::move(stop)) {}
+
+  /// Reads all that is there now, also of a file that took the place. Returns how many nodes were new. With `quiet`
+  /// they are passed over. Throws Error, and what the callback throws.
+  uint64_t goOn(bool quiet = false);
+
+private:
+  /// A group around the place.
+  struct Level
+  {
+    TAVHeader group{};
+    TAVHeader before{}; ///< the child of the group around that stands before this one; header type 0: none
+    TAVHeader last{};   ///< the child that was read last; header type 0: none
+  };
+
+  bool open();
+  void beginAnew();
+  void readOn();
+  bool findForm();
+  bool isSame();
+  bool nextRoot();
+  bool nextChild();
+  bool takeChild(const TAVHeader& child);
+  bool waits(bool isLarge);
+  void arrive(const TAVHeader& node, const TAVHeader& before);
+  bool refresh();
+  FormChoice choiceNow();
+  bool readHeader(const TAVHeader& like, bool swapped, TAVHeader& header);
+  void leave();
+  tav::Reader& reader();
+
+  std::string path_;
+  DocumentOptions options_;
+  const OnNode& onNode_;
+  std::stop_token stop_;
+  bool quiet_ = false;
+  std::unique_ptr<ByteSource> file_{};    ///< whose storage sees the file as it is at any time
+  std::unique_ptr<ByteSource> now_{};     ///< the file as it was when reading began this time
+  std::unique_ptr<tav::Reader> reader_{}; ///< of this time, too: what it has cached may change
+  std::optional<Form> former_{};          ///< the last form that was read
+  std::optional<Form> form_{};            ///< of the present stream; nothing before one is recognised
+  TAVHeader root_{};                      ///< the present root, or the last one; header type 0: none yet
+  std::vector<Level> levels_{};           ///< from the present root on; empty between roots
+  uint64_t reached_ = 0;                  ///< behind the header of the last node
+  uint64_t count_ = 0;
+};
+
+} // namespace tav::inspect

@@ -1,0 +1,23 @@
+#include "kor/fileWatch.h"
+
+#include "kor/windows.h"
+
+namespace tav::kor
+{
+
+FileWatch::FileWatch(const std::string& path)
+    : path_(path)
+{
+}
+
+FileWatch::~FileWatch() = default;
+
+void FileWatch::watchFile() {}
+
+/// What the system tells of a folder's changes comes late for a file that is kept open: looking is as soon.
+void FileWatch::wait(uint32_t milliseconds)
+{
+  Sleep(milliseconds);
+}
+
+} // namespace tav::kor

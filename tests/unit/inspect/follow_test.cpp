@@ -1,0 +1,284 @@
+#include <atomic>
+#include <chrono>
+#include <filesystem>
+#include <fstream>
+#include <stop_token>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include <gmock/gmock.h>
+
+#include "cpp/layer.h"
+#include "inspect/document/follower.h"
+#include "inspect/streams.h"
+#include "tav/inspect/document.hpp"
+
+using namespace tav::inspect;
+using namespace std::chrono_literals;
+using test::Bytes;
+using testing::ElementsAre;
+using testing::IsEmpty;
+
+namespace
+{
+
+/// A file that is written piece by piece, and a follower that is asked after each.
+class Follow : public testing::Test
+{
+protected:
+  void append(const Bytes& bytes, const std::filesystem::path& path)
+  {
+    std::ofstream(path, std::ios::binary | std::ios::app)
+        .write(reinterpret_cast<const char*>(bytes.data()), static_cast<std::streamsize>(bytes.size()));
+  }
+  void append(const Bytes& bytes) { append(bytes, file_.path); }
+
+  /// Writes over bytes that are there.
+  void patch(uint64_t offset, const Bytes& bytes)
+  {
+    std::fstream file(file_.path, std::ios::binary | std::ios::in | std::ios::out);
+    file.seekp(static_cast<std::streamoff>(offset));
+    file.write(reinterpret_cast<const char*>(bytes.data()), static_cast<std::streamsize>(bytes.size()));
+  }
+
+  /// What is new: elements, with the value of those that are Uint32.
+  std::vector<std::string> news()
+  {
+    told_.clear();
+    follower_.goOn();
+    return told_;
+  }
+
+  static Bytes part(const Bytes& bytes, size_t from, size_t to)
+  {
+    return {bytes.begin() + static_cast<ptrdiff_t>(from), bytes.begin() + static_cast<ptrdiff_t>(to)};
+  }
+
+  const test::TemporaryPath file_;
+  const test::TemporaryPath other_;
+  std::vector<std::string> told_;
+  std::stop_source stop_;
+  const std::function<void(const tav::Node&)> onNode_ = [this](const tav::Node& node) {
+    std::string text(node.tag());
+    if (node.type() == TAV_TYPE_UINT32)
+    {
+      text += ' ' + std::to_string(node.as<uint32_t>());
+    }
+    told_.push_back(text);
+  };
+  Follower follower_{tav::detail::fileText(file_.path), DocumentOptions{}, onNode_, stop_.get_token()};
+};
+
+Bytes numbers(std::initializer_list<uint32_t> all, bool swap = false, uint16_t root = TAV_ELM_CMN_SYSTEM)
+{
+  tav::Writer writer({.byteOrder = swap ? tav::ByteOrder::swapped : tav::ByteOrder::native});
+  {
+    tav::Group system = writer.group(root);
+    for (const uint32_t number : all)
+    {
+      system.add(TAV_ELM_CMN_CPU_ONLINE, number);
+    }
+  }
+  writer.finish();
+  return test::bytesOf(writer.bytes());
+}
+
+/// The header of a group as a writer leaves it while the group is open.
+Bytes openHeader(uint16_t elm)
+{
+  test::ByteRows rows;
+  rows.h64(TAV_SIZE_UNKNOWN, 0, TAV_TYPE_HEADER64, elm);
+  return rows.bytes;
+}
+
+Bytes number(uint32_t value)
+{
+  test::ByteRows rows;
+  rows.h64(4, 0, TAV_TYPE_UINT32, TAV_ELM_CMN_CPU_ONLINE);
+  rows.number(value, 4);
+  return rows.bytes;
+}
+
+Bytes sizeBytes(uint64_t size)
+{
+  test::ByteRows rows;
+  rows.number(size, 8);
+  return rows.bytes;
+}
+
+} // namespace
+
+TEST_F(Follow, TellsOfRootsAsTheyCome)
+{
+  EXPECT_THAT(news(), IsEmpty()) << "there is no file yet";
+  append({});
+  EXPECT_THAT(news(), IsEmpty());
+  append(numbers({1, 2, 3}));
+  EXPECT_THAT(news(), ElementsAre("system", "cpuOnline 1", "cpuOnline 2", "cpuOnline 3"));
+  EXPECT_THAT(news(), IsEmpty());
+  append(Bytes(100, 0));
+  EXPECT_THAT(news(), IsEmpty());
+  append(numbers({4}));
+  EXPECT_THAT(news(), ElementsAre("system", "cpuOnline 4"));
+  append(numbers({5, 6, 7, 8, 9}, true, TAV_ELM_CMN_HOST));
+  EXPECT_THAT(news(), ElementsAre("host", "cpuOnline 5", "cpuOnline 6", "cpuOnline 7", "cpuOnline 8", "cpuOnline 9"));
+}
+
+TEST_F(Follow, TellsOfTheChildrenOfAGroupThatIsStillOpen)
+{
+  append(openHeader(TAV_ELM_CMN_SYSTEM));
+  append(number(1));
+  append(number(2));
+  EXPECT_THAT(news(), ElementsAre("system", "cpuOnline 1", "cpuOnline 2"));
+  append(openHeader(TAV_ELM_CMN_HOST));
+  append(part(number(3), 0, 18));
+  EXPECT_THAT(news(), ElementsAre("host")) << "the number is not whole";
+  append(part(number(3), 18, 20));
+  EXPECT_THAT(news(), ElementsAre("cpuOnline 3"));
+  // The host is closed, and what stands behind it is a child of the system.
+  patch(16 + 20 + 20, sizeBytes(20));
+  append(number(4));
+  EXPECT_THAT(news(), ElementsAre("cpuOnline 4"));
+  patch(0, sizeBytes(20 + 20 + 36 + 20));
+  append(numbers({5}));
+  EXPECT_THAT(news(), ElementsAre("system", "cpuOnline 5"));
+}
+
+TEST_F(Follow, WaitsForWhatIsNotWrittenYet)
+{
+  append(openHeader(TAV_ELM_CMN_SYSTEM));
+  append(number(1));
+  append(number(2));
+  append(Bytes(4096, 0)); // a page that is not filled
+  EXPECT_THAT(news(), ElementsAre("system", "cpuOnline 1", "cpuOnline 2"));
+  patch(16 + 40, number(3));
+  EXPECT_THAT(news(), ElementsAre("cpuOnline 3"));
+  EXPECT_THAT(news(), IsEmpty());
+}
+
+TEST_F(Follow, CutAnywhereItTellsTheSameInTheEnd)
+{
+  const Bytes bytes = numbers({1, 2, 3});
+  for (size_t cut = 0; cut <= bytes.size(); ++cut)
+  {
+    SCOPED_TRACE(cut);
+    std::filesystem::remove(file_.path);
+    Follower follower(tav::detail::fileText(file_.path), {.form = {.swapped = false}}, onNode_, stop_.get_token());
+    append(part(bytes, 0, cut));
+    told_.clear();
+    follower.goOn();
+    append(part(bytes, cut, bytes.size()));
+    follower.goOn();
+    EXPECT_THAT(told_, ElementsAre("system", "cpuOnline 1", "cpuOnline 2", "cpuOnline 3"));
+  }
+}
+
+TEST_F(Follow, GoesOverToAFileThatTakesThePlace)
+{
+  append(numbers({1, 2}));
+  EXPECT_THAT(news(), ElementsAre("system", "cpuOnline 1", "cpuOnline 2"));
+  append(numbers({3}));
+  std::filesystem::rename(file_.path, other_.path);
+  EXPECT_THAT(news(), ElementsAre("system", "cpuOnline 3"));
+  append(numbers({4}), other_.path);
+  EXPECT_THAT(news(), ElementsAre("system", "cpuOnline 4")) << "nothing else has come yet";
+  append(numbers({5}), other_.path);
+  append(numbers({6, 7}));
+  EXPECT_THAT(news(), ElementsAre("system", "cpuOnline 5", "system", "cpuOnline 6", "cpuOnline 7"));
+}
+
+TEST_F(Follow, BeginsAnewInAFileThatWasEmptied)
+{
+  append(numbers({1, 2, 3}));
+  EXPECT_THAT(news(), testing::SizeIs(4));
+  std::filesystem::resize_file(file_.path, 0);
+  EXPECT_THAT(news(), IsEmpty());
+  append(numbers({4, 5}));
+  EXPECT_THAT(news(), ElementsAre("system", "cpuOnline 4", "cpuOnline 5"));
+  std::filesystem::resize_file(file_.path, 0);
+  append(numbers({6, 7, 8, 9}, false, TAV_ELM_CMN_HOST));
+  EXPECT_THAT(news(), ElementsAre("host", "cpuOnline 6", "cpuOnline 7", "cpuOnline 8", "cpuOnline 9"));
+}
+
+TEST_F(Follow, FollowsAGroupThatWasTakenBack)
+{
+  append(openHeader(TAV_ELM_CMN_SYSTEM));
+  append(number(1));
+  append(openHeader(TAV_ELM_CMN_HOST));
+  EXPECT_THAT(news(), ElementsAre("system", "cpuOnline 1", "host"));
+  patch(16 + 20, number(2));
+  append(part(number(2), 16, 20));
+  patch(16 + 20, number(2));
+  EXPECT_THAT(news(), ElementsAre("cpuOnline 2"));
+}
+
+TEST_F(Follow, EndsWhereDamageEndsAGroup)
+{
+  Bytes bytes = numbers({1, 2, 3});
+  bytes[16 + 20] = 0xFF; // the size of the second number
+  bytes[16 + 21] = 0xFF;
+  append(numbers({0, 0, 0}));
+  append(bytes);
+  append(numbers({4}));
+  EXPECT_THAT(news(), ElementsAre("system", "cpuOnline 0", "cpuOnline 0", "cpuOnline 0", "system", "cpuOnline 1",
+                                  "system", "cpuOnline 4"));
+}
+
+TEST_F(Follow, TellsWhatAWriterWritesWhileItWrites)
+{
+  constexpr uint32_t roots = 60;
+  append(numbers({1, 2, 3}));
+  const Document document(file_.path);
+  std::thread writer([this] {
+    for (uint32_t root = 0; root < roots; ++root)
+    {
+      append(numbers({root}));
+      if (root % 20 == 10)
+      {
+        std::filesystem::rename(file_.path, other_.path);
+      }
+      std::this_thread::sleep_for(2ms);
+    }
+  });
+  std::vector<uint32_t> seen;
+  std::stop_source stop;
+  const FollowEnd end = document.follow(
+      [&](const tav::Node& node) {
+        if (node.type() == TAV_TYPE_UINT32)
+        {
+          seen.push_back(node.as<uint32_t>());
+        }
+        if (seen.size() == roots)
+        {
+          stop.request_stop();
+        }
+      },
+      {.stop = stop.get_token(), .timeout = 20s, .existing = false});
+  writer.join();
+  EXPECT_EQ(end, FollowEnd::stopped);
+  std::vector<uint32_t> expected(roots);
+  for (uint32_t root = 0; root < roots; ++root)
+  {
+    expected[root] = root;
+  }
+  EXPECT_EQ(seen, expected);
+}
+
+TEST_F(Follow, EndsWhenNothingComes)
+{
+  append(numbers({1, 2, 3}));
+  const Document document(file_.path);
+  EXPECT_EQ(document.follow(onNode_, {.timeout = 50ms}), FollowEnd::timedOut);
+  EXPECT_THAT(told_, testing::SizeIs(4));
+  std::stop_source stopped;
+  stopped.request_stop();
+  EXPECT_EQ(document.follow(onNode_, {.stop = stopped.get_token()}), FollowEnd::stopped);
+}
+
+TEST_F(Follow, NeedsAPath)
+{
+  const Bytes bytes = numbers({1, 2, 3});
+  const Document document(test::spanOf(bytes));
+  EXPECT_EQ(test::thrownBy([&] { static_cast<void>(document.follow(onNode_)); }), TAV_RC_NOT_SUPPORTED);
+}
