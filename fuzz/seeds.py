@@ -39,6 +39,11 @@ def seeds_of(name, made, swapped, aligned):
             yield "read", form + bytes((parts, 1)) + made
         yield "layer", bytes((0,)) + form + b"\x0a*/*[2]/cpu" + b"\x10" + made
         yield "layer", bytes((0,)) + form + b"\x02**" + b"\x20" + made
+    order = 2 if swapped != BIG else 1
+    form = order + 3 * (1 if name.startswith("nested32") else 2) + 9 * (2 if aligned else 1)
+    for choice in (0, form):
+        for path in (b"\x0a*/*[2]/cpu", b"\x02**", b"\x09/system/*"):
+            yield "c", bytes((choice,)) + path + made
     yield "recover", bytes((flags,)) + made
     yield "recover", bytes((flags,)) + made[:len(made) * 2 // 3]
     for choice in range(4):
