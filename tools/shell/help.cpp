@@ -11,6 +11,7 @@ namespace
 
 constexpr size_t kColumn = 28;
 constexpr size_t kWidth = 96;
+constexpr int kAboutTheProgram = 200; ///< the place of commands that have to do with no stream
 
 /// "  left    right", the right part wrapped and indented.
 std::string entry(const std::string& left, const std::string& right, size_t column)
@@ -57,13 +58,17 @@ std::string optionText(const OptionSpec& option)
 
 std::string helpText()
 {
-  std::string text = "usage: tav COMMAND [options] FILE ...\n\n"
+  std::string text = "usage: tav COMMAND [options] FILE ...   or   tav --version\n"
                      "Looks into tav streams, whole or damaged. - is standard input or output.\n\n";
   for (const Command* command : commands())
   {
-    text += entry(command->name, command->summary, 14);
+    if (command->place < kAboutTheProgram)
+    {
+      text += entry(command->name, command->summary, 14);
+    }
   }
-  text += "\n'tav COMMAND --help' tells more, with examples. 'tav --version' prints the version.\n"
+  // A terminal has 24 lines: what is about the program itself stands in one.
+  text += "\n'tav help COMMAND' tells more, with examples; 'tav completion SHELL' is for bash, zsh and fish.\n"
           "Exit status: 0 fine; 1 findings, differences or no match; 2 wrong usage or trouble with\n"
           "the system; 3 too damaged to go on.\n";
   return text;
