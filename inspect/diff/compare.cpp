@@ -25,7 +25,7 @@ bool holds(const Tolerance& tolerance, uint64_t difference, uint64_t larger)
 
 DiffIndex indexOf(const DiffInput& input, const DiffOptions& options)
 {
-  return {input.source, input.form, options.ignored, options.makeFile, [&](const Walker& walker, const Event& event) {
+  return {input, options, [&](const Walker& walker, const Event& event) {
             if (options.seen)
             {
               options.seen(input.source, walker, event);
@@ -39,8 +39,8 @@ public:
   Comparer(DiffIndex& a, DiffIndex& b, const DiffOptions& options, const std::function<void(const Difference&)>& found)
       : a_(a), b_(b), options_(options), tell_(found) {}
 
-  /// Compares everything; true when there is a difference.
-  bool run();
+  /// Compares everything; true when there is a difference. `subtrees`: the first rows stand for each other.
+  bool run(bool subtrees);
 
 private:
   struct Level
@@ -59,6 +59,7 @@ private:
   bool samePayload(const Row& a, const Row& b);
   bool near(const Row& a, const Row& b);
   DiffSide side(DiffIndex& index, uint64_t number) const;
+  void tellOne(DiffIndex& index, Change change, uint64_t number);
   void tell(Change change, uint64_t first, uint64_t second, std::string sentence);
 
   DiffIndex& a_;
@@ -69,9 +70,9 @@ private:
   std::vector<Level> levels_{};
 };
 
-bool Comparer::run()
+bool Comparer::run(bool subtrees)
 {
-  levels_.push_back({0, a_.rows(), 0, b_.rows()});
+  subtrees&& a_.rows() != 0 && b_.rows() != 0 ? compare(0, 0) : levels_.push_back({0, a_.rows(), 0, b_.rows()});
   while (!levels_.empty())
   {
     Level& level = levels_.back();
@@ -119,7 +120,7 @@ void Comparer::compare(uint64_t first, uint64_t second)
   if (first == kNoRow || second == kNoRow)
   {
     const bool removed = second == kNoRow;
-    tell(removed ? Change::removed : Change::added, first, second, removed ? a_.text(first) : b_.text(second));
+    tellOne(removed ? a_ : b_, removed ? Change::removed : Change::added, removed ? first : second);
     return;
   }
   const Row a = a_.row(first);
@@ -128,7 +129,7 @@ void Comparer::compare(uint64_t first, uint64_t second)
   {
     tell(Change::changed, first, second, "info  " + hexOffset(a.info) + " -> " + hexOffset(b.info));
   }
-  if (a.isGroup())
+  if (a.isGroup() && b.isGroup())
   {
     levels_.push_back({first + 1, a.next, second + 1, b.next});
     return;
@@ -197,6 +198,17 @@ DiffSide Comparer::side(DiffIndex& index, uint64_t number) const
   return side;
 }
 
+/// Of a group the one line counts its nodes; where the contents are wanted, too, each of them has its own.
+void Comparer::tellOne(DiffIndex& index, Change change, uint64_t number)
+{
+  const bool removed = change == Change::removed;
+  const uint64_t end = options_.contents ? index.row(number).next : number + 1;
+  for (; number < end; ++number)
+  {
+    tell(change, removed ? number : kNoRow, removed ? kNoRow : number, index.text(number));
+  }
+}
+
 void Comparer::tell(Change change, uint64_t first, uint64_t second, std::string sentence)
 {
   found_ = true;
@@ -218,7 +230,7 @@ bool diff(DiffInput a, DiffInput b, const DiffOptions& options, const std::funct
 {
   DiffIndex indexA = indexOf(a, options);
   DiffIndex indexB = indexOf(b, options);
-  return Comparer(indexA, indexB, options, found).run();
+  return Comparer(indexA, indexB, options, found).run(a.path && b.path);
 }
 
 } // namespace tav::inspect

@@ -3,7 +3,9 @@
 #include <algorithm>
 #include <cstring>
 
+#include "inspect/path/selection.h"
 #include "tav/inspect/phrases.hpp"
+#include "tav/inspect/problem.hpp"
 #include "tav/inspect/value.hpp"
 
 namespace tav::inspect
@@ -41,22 +43,60 @@ Node nodeOf(const Row& row)
 
 } // namespace
 
-DiffIndex::DiffIndex(ByteSource& source, const Form& form, const std::vector<Path>& ignored,
-                     const ScratchMaker& makeFile, const std::function<void(const Walker&, const Event&)>& seen)
-    : source_(source), form_(form), scratch_(makeFile()), file_(scratch_->file())
+DiffIndex::DiffIndex(const DiffInput& input, const DiffOptions& options,
+                     const std::function<void(const Walker&, const Event&)>& seen)
+    : source_(input.source), form_(input.form), scratch_(options.makeFile()), file_(scratch_->file()),
+      keys_(options.keys.empty() ? std::vector<uint16_t>(kKeys.begin(), kKeys.end()) : options.keys)
 {
-  std::vector<PathMatcher> matchers;
-  matchers.reserve(ignored.size());
-  for (const Path& path : ignored)
+  walk(input, options, seen);
+}
+
+void DiffIndex::walk(const DiffInput& input, const DiffOptions& options,
+                     const std::function<void(const Walker&, const Event&)>& seen)
+{
+  Selection ignored(options.ignored);
+  std::optional<Selection> wanted;
+  if (input.path)
   {
-    matchers.emplace_back(path);
+    wanted.emplace(std::span(&*input.path, 1));
   }
-  Walker walker(source, form);
-  Event event;
-  while (walker.next(event))
+  std::optional<uint64_t> top; // depth of the node that the path leads to
+  Walker walker(source_, form_);
+  for (Event event; walker.next(event);)
   {
     seen(walker, event);
-    add(event, matchers);
+    const bool begins = event.what == What::nodeBegin && ignoredDepth_ == kNoRow;
+    const bool ignore = begins && ignored.at(event.node).has_value();
+    if (wanted && !top)
+    {
+      if (!begins || !wanted->at(event.node))
+      {
+        begins&& event.node.isGroup() && !wanted->reachesBelow() ? void(walker.skip()) : void();
+        continue;
+      }
+      top = event.depth;
+      begin(walker, event);
+    }
+    add(event, ignore);
+    if (top && event.what == What::nodeEnd && event.depth == *top)
+    {
+      return;
+    }
+  }
+  if (wanted && !top)
+  {
+    throw Error(input.path->noMatch(source_.name()), Trouble::notFound);
+  }
+}
+
+/// The first row is inside of groups that are none.
+void DiffIndex::begin(const Walker& walker, const Event& event)
+{
+  prefixSteps_ = event.depth;
+  if (prefixSteps_ <= kMaxSteps)
+  {
+    prefix_ = walker.path(event);
+    prefix_.resize(prefix_.rfind('/'));
   }
 }
 
@@ -79,7 +119,7 @@ Row DiffIndex::rowOf(const Event& event) const
   return row;
 }
 
-void DiffIndex::add(const Event& event, std::vector<PathMatcher>& matchers)
+void DiffIndex::add(const Event& event, bool ignore)
 {
   if (ignoredDepth_ != kNoRow)
   {
@@ -98,11 +138,6 @@ void DiffIndex::add(const Event& event, std::vector<PathMatcher>& matchers)
   {
     return;
   }
-  bool ignore = false;
-  for (PathMatcher& matcher : matchers)
-  {
-    ignore = matcher.matches(event.node) || ignore;
-  }
   // End elements say nothing but where a group ends.
   if (ignore || isEndElement(event.node.elm()))
   {
@@ -117,6 +152,7 @@ void DiffIndex::add(const Event& event, std::vector<PathMatcher>& matchers)
   Open open;
   open.row = rowOf(event);
   open.number = count_;
+  open.keys.resize(keys_.size());
   open_.push_back(open);
   append(open.row);
 }
@@ -129,10 +165,10 @@ void DiffIndex::addData(const Row& given)
   if (!open_.empty())
   {
     mix(open_.back().row.hash, row.hash);
-    for (size_t i = 0; i < kKeys.size(); ++i)
+    for (size_t i = 0; i < keys_.size(); ++i)
     {
       uint64_t& key = open_.back().keys[i];
-      key = row.elm == kKeys[i] && !row.isDamaged() && key == 0 ? row.hash : key;
+      key = row.elm == keys_[i] && !row.isDamaged() && key == 0 ? row.hash : key;
     }
   }
   append(row);
@@ -233,8 +269,8 @@ std::string DiffIndex::path(uint64_t number)
     at = row(at.parent);
     steps.push_back(at);
   }
-  std::string text;
-  if (steps.size() > kMaxSteps)
+  std::string text = prefix_;
+  if (steps.size() + prefixSteps_ > kMaxSteps)
   {
     steps.resize(1);           // damaged bytes: the group around them
     steps.front().ordinal = 0; // makes it be named by its offset

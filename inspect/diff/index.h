@@ -8,6 +8,7 @@
 #include <string>
 #include <vector>
 
+#include "tav/inspect/diff.hpp"
 #include "tav/inspect/patchFile.hpp"
 #include "tav/inspect/path.hpp"
 #include "tav/inspect/scratch.hpp"
@@ -39,9 +40,9 @@ struct Row
 class DiffIndex
 {
 public:
-  /// Walks the stream. Nodes that a path of `ignored` leads to are left out, with all below them. Rows are kept in a
-  /// file of `makeFile`; `seen` is told of every event.
-  DiffIndex(ByteSource& source, const Form& form, const std::vector<Path>& ignored, const ScratchMaker& makeFile,
+  /// Walks the stream, or what the input's path leads to. Nodes that a path of the options' `ignored` leads to are left
+  /// out, with all below them. Rows are kept in a file of `makeFile`; `seen` is told of every event.
+  DiffIndex(const DiffInput& input, const DiffOptions& options,
             const std::function<void(const Walker&, const Event&)>& seen);
 
   uint64_t rows() const { return count_; }
@@ -62,10 +63,13 @@ private:
   {
     Row row{};
     uint64_t number = 0;
-    std::array<uint64_t, 3> keys{};
+    std::vector<uint64_t> keys{}; ///< the hash of each key's first value; 0: there was none
   };
 
-  void add(const Event& event, std::vector<PathMatcher>& matchers);
+  void walk(const DiffInput& input, const DiffOptions& options,
+            const std::function<void(const Walker&, const Event&)>& seen);
+  void begin(const Walker& walker, const Event& event);
+  void add(const Event& event, bool ignore);
   void addData(const Row& given);
   void endGroup();
   Row rowOf(const Event& event) const;
@@ -78,6 +82,9 @@ private:
   std::unique_ptr<Scratch> scratch_;
   PatchFile file_;
   uint64_t count_ = 0;
+  std::vector<uint16_t> keys_;
+  std::string prefix_{}; ///< the path of the group around the first row
+  uint64_t prefixSteps_ = 0;
   uint64_t ignoredDepth_ = kNoRow; ///< of the node that is being left out
   std::vector<Open> open_{};
   std::vector<Row> window_{}; ///< rows at hand, from `windowStart_` on

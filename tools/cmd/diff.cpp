@@ -95,10 +95,44 @@ std::vector<Path> ignoredPaths(const Invocation& invocation)
   return ignored;
 }
 
+std::vector<uint16_t> keysOf(const Invocation& invocation)
+{
+  std::vector<uint16_t> keys;
+  for (const std::string& name : invocation.all("--key"))
+  {
+    const std::vector<uint16_t> ids = requireIds("--key", name);
+    keys.insert(keys.end(), ids.begin(), ids.end());
+  }
+  return keys;
+}
+
+/// The subtrees to compare: a path that is given for one side alone is that of the other, too.
+struct Subtrees
+{
+  explicit Subtrees(const Invocation& invocation)
+  {
+    const std::string pathA = invocation.text("--path-a", invocation.text("--path-b"));
+    if (!pathA.empty())
+    {
+      a.emplace(pathA);
+      b.emplace(invocation.text("--path-b", pathA));
+    }
+  }
+
+  std::optional<Path> a{};
+  std::optional<Path> b{};
+};
+
 int run(const Invocation& invocation)
 {
-  const std::string& nameA = invocation.arguments().at(0);
-  const std::string& nameB = invocation.arguments().at(1);
+  const Subtrees subtrees(invocation);
+  const std::string& nameA = invocation.arguments().front();
+  const std::string& nameB = invocation.arguments().back();
+  if (invocation.arguments().size() == 1 && !subtrees.a && !(invocation.has("--from-a") || invocation.has("--from-b")))
+  {
+    throw Failure("diff: an argument is missing: tav diff A B",
+                  "of one file, --path-a PATH and --path-b PATH name what to compare");
+  }
   if (nameA == "-" && nameB == "-")
   {
     throw Failure("diff: only one of the two can be standard input");
@@ -106,6 +140,8 @@ int run(const Invocation& invocation)
   const bool json = invocation.has("--json");
   DiffOptions options;
   options.ignored = ignoredPaths(invocation);
+  options.keys = keysOf(invocation);
+  options.contents = invocation.has("--contents");
   options.tolerance = parseTolerance(invocation.text("--tolerance", "0"));
   options.mostValue = json ? options.mostValue : 0;
   options.makeFile = Temporary::make;
@@ -129,10 +165,11 @@ int run(const Invocation& invocation)
   };
   Output out("-");
   const bool colour = !json && wantsColour(invocation);
-  const bool different = diff({a.bytes(), a.form()}, {b.bytes(), b.form()}, options, [&](const Difference& difference) {
-    progress.reset();
-    out.write(json ? jsonOf(difference) : lineOf(difference, colour));
-  });
+  const bool different = diff({a.bytes(), a.form(), subtrees.a}, {b.bytes(), b.form(), subtrees.b}, options,
+                              [&](const Difference& difference) {
+                                progress.reset();
+                                out.write(json ? jsonOf(difference) : lineOf(difference, colour));
+                              });
   out.commit();
   tellStatistics(invocation, a.bytes());
   tellStatistics(invocation, b.bytes());
@@ -144,16 +181,18 @@ int run(const Invocation& invocation)
 const Registration registration{{
     .place = 120,
     .name = "diff",
-    .arguments = "A B",
+    .arguments = "A [B]",
     .inputs = 2,
     .summary = "what two streams do not have in common, by path",
     .description =
         "Lists what B lacks (-), has in addition (+) or has with another value (~). Byte order, header widths,\n"
         "padding, pairs and end elements are no difference; types, values, info bits and damaged bytes are.\n"
-        "Groups of one name are matched by their keys (node_number, db_name, hostName) where they have\n"
+        "Groups of one name are matched by their keys (node_number, db_name, hostName; --key) where they have\n"
         "some; other elements of one name by what is equal in their order, and else one after the other.\n"
         "The order of elements with different names is no difference. Exit status 1: there are some,\n"
-        "or damage was passed over, which is told on standard error.\n\n"
+        "or damage was passed over, which is told on standard error; also where a path leads nowhere.\n\n"
+        "With --path-a and --path-b two subtrees are compared, of one file, too; B is then A unless given. The two\n"
+        "nodes stand for each other whatever their names.\n\n"
         "Nodes are listed in a temporary file; in memory are only the children of the groups on the way\n"
         "to the place that is compared. Of a group with more than 200,000 children, 200,000 at a time\n"
         "are compared, so that what moved farther is told as removed and added.",
@@ -166,6 +205,20 @@ const Registration registration{{
                  .kind = ValueKind::text,
                  .value = "N",
                  .help = "numbers may differ by N, or by N% of the larger one"},
+                {.names = "--path-a",
+                 .kind = ValueKind::text,
+                 .value = "PATH",
+                 .help = "of A, compare the first node that PATH leads to, with all below it"},
+                {.names = "--path-b",
+                 .kind = ValueKind::text,
+                 .value = "PATH",
+                 .help = "the same for B; the path of the other side unless given"},
+                {.names = "--key",
+                 .kind = ValueKind::text,
+                 .value = "NAME",
+                 .help = "match groups of one name by the value of this element, instead of the usual ones",
+                 .many = true},
+                {.names = "--contents", .help = "tell each node of a group that only one of them has"},
                 {.names = "--from-a",
                  .kind = ValueKind::number,
                  .value = "OFFSET",
@@ -178,6 +231,7 @@ const Registration registration{{
                  .help = "colour the output",
                  .choices = {"auto", "always", "never"}}},
     .examples = {{"tav diff yesterday.tav today.tav", "what changed"},
+                 {"tav diff week.tav --path-a '/system[1]' --path-b '/system[2]'", "two snapshots of one file"},
                  {"tav diff a.tav b.tav --ignore '**/memory' --tolerance 1%", "without what always changes"}},
     .run = run,
 }};

@@ -51,13 +51,7 @@ public:
     }
     for (const std::string& name : invocation.all("--only"))
     {
-      const std::vector<uint16_t> ids = idsOf(name);
-      if (ids.empty())
-      {
-        const std::string similar = similarNames(name);
-        throw Failure("--only: no element has the name '" + name + "'",
-                      similar.empty() ? "'tav elements' lists the names" : "did you mean " + similar + "?");
-      }
+      const std::vector<uint16_t> ids = requireIds("--only", name);
       only_.insert(only_.end(), ids.begin(), ids.end());
     }
     setFolding(invocation);

@@ -33,6 +33,18 @@ FormChoice formChoice(const Invocation& invocation)
   return choice;
 }
 
+std::vector<uint16_t> requireIds(const std::string& option, const std::string& name)
+{
+  std::vector<uint16_t> ids = idsOf(name);
+  if (ids.empty())
+  {
+    const std::string similar = similarNames(name);
+    throw Failure(option + ": no element has the name '" + name + "'",
+                  similar.empty() ? "'tav elements' lists the names" : "did you mean " + similar + "?");
+  }
+  return ids;
+}
+
 uint64_t ringBytes(const Invocation& invocation)
 {
   return invocation.number("--ring").value_or(kDefaultRing);

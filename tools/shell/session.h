@@ -32,6 +32,9 @@ Problem noStream(const Stream& stream);
 /// What the options say of the form: --byte-order, --root, --align, --no-align.
 FormChoice formChoice(const Invocation& invocation);
 
+/// The ids of an element that an option names. Throws Failure when no element has the name.
+std::vector<uint16_t> requireIds(const std::string& option, const std::string& name);
+
 /// Bytes of memory for pages: --ring.
 uint64_t ringBytes(const Invocation& invocation);
 

@@ -28,12 +28,16 @@ struct DiffInput
 {
   ByteSource& source;
   Form form{};
+  std::optional<Path> path{}; ///< compare only the first node that it leads to, with all below it
 };
 
 struct DiffOptions
 {
   std::vector<Path> ignored{}; ///< nodes that one of them leads to are left out, with all below them
   Tolerance tolerance{};
+  /// Elements by whose values groups of one name are matched; none: 307 (node_number), 321 (db_name) and the host name.
+  std::vector<uint16_t> keys{};
+  bool contents = false;                    ///< tell each node of a group that only one side has
   uint64_t mostValue = uint64_t{64} * 1024; ///< bytes of a payload that a side's value shows
   ScratchMaker makeFile = makeScratch;      ///< for the nodes of either stream
   /// Is told of every event while either stream is read, the first one first.
@@ -69,7 +73,8 @@ struct Difference
 /// and end elements are none; nor is the order of elements with different names. Groups of one name are matched by
 /// their keys where they have some; other elements of one name by what is equal in their order, and else one after the
 /// other. In memory are only the children of the groups on the way to the place that is compared, 200,000 of a group
-/// at a time. Throws Error.
+/// at a time. Throws Error, with Trouble::notFound where
+/// the path of an input leads nowhere. Where both have paths, the two nodes stand for each other whatever their names.
 TAV_INSPECT_API bool diff(DiffInput a, DiffInput b, const DiffOptions& options,
                           const std::function<void(const Difference&)>& found);
 

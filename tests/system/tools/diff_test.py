@@ -153,6 +153,61 @@ class Diff(Folder):
         self.assertEqual(len(result.out.splitlines()), 1)
         self.assertTrue(result.out.startswith("~ /system/hostName[15001]  Uint32  15000 -> "), result.out)
 
+    def test_subtrees_of_one_file_are_compared(self):
+        week = {"system": [{"host": {"hostName": "ada", "cpuOnline": 8}}, {"host": {"hostName": "ada", "cpuOnline": 9}}]}
+        path = self.stream({"nodes": [{"element": "system", "children": []}]})
+        days = [tav("build", stdin=json.dumps({"system": day}).encode()).raw for day in week["system"]]
+        path.write_bytes(b"".join(days))
+        result = tav("diff", path, "--path-a", "/system[1]", "--path-b", "/system[2]")
+        self.assertEqual((result.status, result.out, result.err),
+                         (1, "~ /system/host/cpuOnline (/system[2]/host/cpuOnline)  Uint32  8 -> 9\n", ""))
+        self.assertEqual(tav("diff", path, "--path-a", "/system[2]").status, 0)
+        self.assertEqual(tav("diff", path).status, 2)
+
+    def test_subtrees_stand_for_each_other_whatever_their_names(self):
+        a = {"system": {"host": {"hostName": "ada", "cpuOnline": 8}}}
+        b = {"system": {"appl": {"os": {"cpuOnline": 8, "hostName": "ada"}}, "cpuOnline": 8}}
+        self.assertEqual(self.rows(a, b, "--path-a", "/system/host", "--path-b", "/system/appl/os"), [])
+        self.assertEqual(self.rows(a, b, "--path-a", "/system/host", "--path-b", "/system/appl/os", "--ignore", "**/cpuOnline"), [])
+        self.assertEqual(self.rows(a, b, "--path-a", "**/host/cpuOnline", "--path-b", "/system/cpuOnline"), [])
+        self.assertEqual(self.rows(a, b, "--path-a", "**/host", "--path-b", "/system/cpuOnline"),
+                         ["~ /system/host (/system/cpuOnline)  group of 2 nodes -> Uint32  8"])
+        self.assertEqual(self.rows(a, b, "--path-a", "/system/host", "--path-b", "/system"),
+                         ["- /system/host/hostName  ASCII String  \"ada\"", "+ /system/appl  group of 3 nodes"])
+
+    def test_a_path_that_leads_nowhere_is_told(self):
+        document = {"system": {"cpuOnline": 8}}
+        for options in (("--path-a", "/system/host"), ("--path-a", "/system", "--path-b", "/sytem")):
+            result = self.diff(document, document, *options)
+            self.assertEqual((result.status, result.out), (1, ""))
+            self.assertIn("no match", result.err)
+        self.assertEqual(self.diff(document, document, "--path-a", "/system[").status, 2)
+
+    def test_deep_subtrees_are_compared(self):
+        deep = '{"system": ' * 80 + '{"cpuOnline": %d}' + "}" * 80
+        path = "/".join([""] + ["system"] * 70)
+        rows = self.rows(json.loads(deep % 8), json.loads(deep % 9), "--path-a", path)
+        self.assertEqual(len(rows), 1)
+        self.assertRegex(rows[0], r"^~ /\*\*/cpuOnline\[@0x[0-9a-f]+\]  Uint32  8 -> 9$")
+        self.assertEqual(self.rows(json.loads(deep % 8), json.loads(deep % 8), "--path-a", path), [])
+
+    def test_groups_are_matched_by_the_keys_that_are_named(self):
+        a = {"system": {"host": [{"osName": "x", "cpuOnline": 1}, {"osName": "y", "cpuOnline": 2}]}}
+        b = {"system": {"host": [{"osName": "y", "cpuOnline": 2}, {"osName": "z", "cpuOnline": 7}, {"osName": "x", "cpuOnline": 9}]}}
+        self.assertEqual(self.rows(a, b, "--key", "osName"),
+                         ["~ /system/host/cpuOnline (/system/host[3]/cpuOnline)  Uint32  1 -> 9", "+ /system/host[2]  group of 2 nodes"])
+        self.assertNotEqual(self.rows(a, b), self.rows(a, b, "--key", "osName"))
+        result = self.diff(a, b, "--key", "osNmae")
+        self.assertEqual(result.status, 2)
+        self.assertIn("did you mean osName", result.err)
+
+    def test_the_contents_of_what_one_side_has_are_told_when_asked(self):
+        a = {"system": {"host": {"os": {"osName": "x"}, "cpuOnline": 8}}}
+        rows = self.rows(a, {"system": {}}, "--contents")
+        self.assertEqual(rows, ["- /system/host  group of 3 nodes", "- /system/host/os  group of 1 node",
+                                '- /system/host/os/osName  ASCII String  "x"', "- /system/host/cpuOnline  Uint32  8"])
+        self.assertEqual([row.replace("-", "+", 1) for row in rows], self.rows({"system": {}}, a, "--contents"))
+
 
 if __name__ == "__main__":
     unittest.main()
