@@ -54,6 +54,10 @@ LD_LIBRARY_PATH=$libraries "$root/usr/bin/tav" --version
 for page in $(LD_LIBRARY_PATH=$libraries "$root/usr/bin/tav" help json | grep -oE '[[:alnum:]/._-]+\.md'); do
   [[ -s $root/usr/$page ]] || { echo "the package has no $page"; exit 1; }
 done
+LD_LIBRARY_PATH=$libraries "$root/usr/bin/tav" snapshot -o "$work/x.tav"
+[[ $(file -b -m "$root/usr/share/file/magic/tav:/usr/share/misc/magic" "$work/x.tav") == 'tav stream, '* ]] ||
+  { echo "file(1) does not know a stream by the package's entry"; exit 1; }
+[[ -s $root/usr/share/mime/packages/tav.xml ]] || { echo "the package has no MIME type"; exit 1; }
 for part in tav:main tav-inspect:inspect; do
   read -ra flags <<<"$(PKG_CONFIG_PATH=$libraries/pkgconfig pkg-config --cflags --libs "${part%%:*}")"
   g++ -std=c++20 "tests/system/install/outside/${part##*:}.cpp" -o "$work/outside" "${flags[@]}"

@@ -5,9 +5,9 @@ set -euo pipefail
 
 declare -A groups=(
   [build]="g++ cmake ninja-build nlohmann-json3-dev"
-  [test]="libgtest-dev libgmock-dev pkg-config python3 binutils jq libxml2-utils zsh fish"
+  [test]="libgtest-dev libgmock-dev pkg-config python3 binutils jq libxml2-utils zsh fish file shared-mime-info"
   [bench]="libbenchmark-dev libbson-dev libmsgpack-dev libcbor-dev libflatbuffers-dev libebml-dev rapidjson-dev libpugixml-dev pkg-config valgrind binutils python3 python3-matplotlib"
-  [full]="clang clang-format clang-tidy cppcheck libclang-rt-dev ccache doxygen lintian dpkg-dev file gzip abigail-tools valgrind"
+  [full]="clang clang-format clang-tidy cppcheck libclang-rt-dev ccache doxygen lintian dpkg-dev gzip abigail-tools valgrind"
   [coverage]="gcovr qemu-user-static"
   [platforms]="clang libc++-dev libc++abi-dev googletest ccache qemu-user-static g++-s390x-linux-gnu g++-mingw-w64-x86-64-posix wine64 wine"
 )
