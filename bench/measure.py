@@ -19,6 +19,8 @@ import sys
 import tempfile
 import time
 
+import compiling
+
 SMALL = "^(W[1-5](dom|mem|file)?|call)/([^_]|_[^t]|_t[^r])*$"
 TRACED = "_traced$"  # in a process of their own: one that has traced looks twice from then on
 # Which entries run interleaved with one another, how often, and for how many seconds each time at the least.
@@ -176,6 +178,7 @@ def main():
         "instructions": instructions(bench, 1 if quick else DOUBLINGS),
         "memory": memory(bench, folder, (16 << 20) if quick else (4 << 30)),
         "startup": startup(bench, 5 if quick else 200),
+        "compile": compiling.measured(1 if quick else compiling.ROUNDS),
         "library": {name: stripped_bytes(arguments.build, name) for name in ("libtav.so", "libkor.so")},
     }
     arguments.result.write_text(json.dumps(result, indent=1) + "\n")

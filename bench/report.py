@@ -146,6 +146,11 @@ def other_table(result):
     memory, start, counts = result["memory"], result["startup"], result["instructions"]
     times = result["times"]
     lines = []
+    compiled = result["compile"]
+    lines.append(["compiling the README's example with `g++ -c`, processor time", f"{compiled['program_s']:.2f} s",
+                  *limit(compiled["program_s"], "1 s", 1)])
+    lines.append(["of it `tav.hpp` alone", f"{compiled['header_s']:.2f} s", "", ""])
+    lines.append(["the same in lines after the preprocessor", f"{compiled['lines']:,}", "", ""])
     for part, ratio in counts["layer"].items():
         lines.append([f"instructions of the C++ layer, `{part}`, to the plain operations", f"{ratio:.3f}",
                       *limit(ratio, "1.05", 1.05)])

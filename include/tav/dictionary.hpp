@@ -3,11 +3,9 @@
 /// any thread may use it. The names are those that the printer shows.
 #pragma once
 
-#include <algorithm>
-#include <array>
 #include <cstddef>
 #include <cstdint>
-#include <iterator>
+#include <cstdlib>
 #include <optional>
 #include <span>
 #include <string_view>
@@ -83,22 +81,45 @@ struct Key
   }
 };
 
-using Keys = std::array<Key, 3 * std::size(kEntries)>;
+inline constexpr size_t kEntryCount = sizeof kEntries / sizeof kEntries[0];
 
-inline Keys sortedKeys()
+/// By their texts; of several alike the one with the lowest id comes first.
+struct SortedKeys
 {
-  Keys keys{};
-  for (size_t i = 0; i < keys.size(); ++i)
+  Key keys[3 * kEntryCount];
+
+  SortedKeys()
   {
-    keys[i] = {static_cast<uint16_t>(i / 3), static_cast<uint16_t>(i % 3)};
+    for (size_t i = 0; i < 3 * kEntryCount; ++i)
+    {
+      keys[i] = {static_cast<uint16_t>(i / 3), static_cast<uint16_t>(i % 3)};
+    }
+    std::qsort(keys, 3 * kEntryCount, sizeof keys[0], compare);
   }
-  std::sort(keys.begin(), keys.end(),
-            [](Key left, Key right) {
-              const int order = left.text().compare(right.text());
-              return order != 0 ? order < 0 : kEntries[left.entry].id < kEntries[right.entry].id;
-            });
-  return keys;
-}
+
+  /// The first key that does not come before a text; the end when all do.
+  const Key* find(std::string_view text) const
+  {
+    const Key* first = keys;
+    for (size_t count = 3 * kEntryCount; count != 0;)
+    {
+      const size_t half = count / 2;
+      const bool isBefore = first[half].text() < text;
+      first += isBefore ? half + 1 : 0;
+      count = isBefore ? count - half - 1 : half;
+    }
+    return first;
+  }
+
+private:
+  static int compare(const void* left, const void* right)
+  {
+    const Key& one = *static_cast<const Key*>(left);
+    const Key& other = *static_cast<const Key*>(right);
+    const int order = one.text().compare(other.text());
+    return order != 0 ? order : kEntries[one.entry].id - kEntries[other.entry].id;
+  }
+};
 
 } // namespace detail
 
@@ -113,14 +134,14 @@ constexpr std::span<const Entry> entries()
 constexpr std::string_view nameOf(uint16_t id)
 {
   const size_t place = detail::placeOf(id);
-  return place < std::size(detail::kEntries) ? detail::kEntries[place].name : std::string_view();
+  return place < detail::kEntryCount ? detail::kEntries[place].name : std::string_view();
 }
 
 /// The tag name of an id, empty when it has no entry. Cost: as `nameOf`.
 constexpr std::string_view tagOf(uint16_t id)
 {
   const size_t place = detail::placeOf(id);
-  return place < std::size(detail::kEntries) ? detail::kEntries[place].tag : std::string_view();
+  return place < detail::kEntryCount ? detail::kEntries[place].tag : std::string_view();
 }
 
 /// The id of an element by its enum name, its constant or its tag name, letter case included.
@@ -130,11 +151,9 @@ constexpr std::string_view tagOf(uint16_t id)
 inline std::optional<uint16_t> idOf(std::string_view enumNameOrTag)
 {
   // Sorted when first asked: sorted at compile time it would cost every source file that includes this header.
-  static const detail::Keys keys = detail::sortedKeys();
-  const detail::Keys::const_iterator found =
-      std::lower_bound(keys.begin(), keys.end(), enumNameOrTag,
-                       [](detail::Key key, std::string_view text) { return key.text() < text; });
-  if (found == keys.end() || found->text() != enumNameOrTag)
+  static const detail::SortedKeys sorted;
+  const detail::Key* const found = sorted.find(enumNameOrTag);
+  if (found == std::end(sorted.keys) || found->text() != enumNameOrTag)
   {
     return std::nullopt;
   }

@@ -79,6 +79,9 @@ KOR_API uint32_t korOneTimeOnly(void);
 /// The calling thread's id as the operating system numbers it; not a code.
 KOR_API uint64_t korThreadID(void);
 
+/// Nanoseconds of a clock that never goes back, from a start of its own: for times between two calls.
+KOR_API int64_t korSteadyTime(void);
+
 /// Formats into `pBuffer`, never past `bufferSize` bytes, and ends the text with NUL when bufferSize is not 0.
 /// @retval TAV_RC_NO_MEMORY  the text does not fit: what fits is stored
 /// @retval TAV_RC_BAD_PARAM  no buffer, no format, or one that fails: an empty text is stored where there is room
@@ -262,5 +265,40 @@ extern "C" {
 /// Returns when the name of a file that was made, renamed or removed is on the device, too: syncs the folder that the
 /// file at `pPath` (UTF-8) lies in. Nothing where the system does that by itself, and on file systems that cannot.
 KOR_API uint32_t korSyncFolderOf(const char* pPath);
+
+/// The characters behind which the last part of a path can begin.
+#if defined(_WIN32)
+#define KOR_PATH_SEPARATORS "/\\:"
+#else
+#define KOR_PATH_SEPARATORS "/"
+#endif
+
+/// Whether a path (UTF-8) leads to something that is no file and no folder: a device, a pipe. Links are followed; false
+/// for a path that leads nowhere.
+KOR_API bool korIsDevice(const char* pPath);
+
+/// Makes a path (UTF-8) absolute and follows the symbolic links at its end, also one that leads to nothing yet.
+///
+/// @param[out] pTarget     where it leads, with a NUL; touched after success only
+/// @param      targetSize  bytes at `pTarget`
+/// @param[out] pNameAt     where in `pTarget` the name behind the last folder starts
+/// @retval TAV_RC_BAD_PARAM      a pointer is null
+/// @retval TAV_RC_NO_MEMORY      the text does not fit, or there is no memory
+/// @retval TAV_RC_NOT_SUPPORTED  a link in the system's own folders (/dev/stdout is one): what is behind it can be
+///                               written to, and not replaced
+KOR_API uint32_t korFollowLinks(const char* pPath, char* pTarget, uint64_t targetSize, uint64_t* pNameAt);
+
+/// Removes a closed file, or a link itself, by its path (UTF-8).
+/// @retval TAV_RC_BAD_PARAM      the path is null
+/// @retval KOR_RC_NO_SUCH_FILE   there is none
+KOR_API uint32_t korRemoveFile(const char* pPath);
+
+/// Takes the name of an entry of a folder, in UTF-8; valid during the call.
+typedef void (*KORFileNameVisit)(const char* pName, void* context);
+
+/// Calls `visit` with the name of each entry of a folder (UTF-8), in no order, without "." and "..".
+/// @retval TAV_RC_BAD_PARAM      the path or `visit` is null
+/// @retval KOR_RC_NO_SUCH_FILE   there is no such folder
+KOR_API uint32_t korListFolder(const char* pPath, KORFileNameVisit visit, void* context);
 }
 /// @}

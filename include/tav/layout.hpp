@@ -3,7 +3,6 @@
 /// library and the tools read and write by; everything here is a pure function of its arguments.
 #pragma once
 
-#include <algorithm>
 #include <array>
 #include <bit>
 #include <cstddef>
@@ -370,7 +369,10 @@ inline void reverseUnits(const uint8_t* from, uint8_t* to, uint64_t length, uint
 {
   for (uint64_t at = 0; at < length; at += unit)
   {
-    std::reverse_copy(from + at, from + at + unit, to + at);
+    for (uint64_t i = 0; i < unit; ++i)
+    {
+      to[at + i] = from[at + unit - 1 - i];
+    }
   }
 }
 

@@ -2,12 +2,10 @@
 /// Where a file's last stream ends, for a writer that goes on behind it.
 #pragma once
 
-#include <algorithm>
 #include <array>
 #include <charconv>
 #include <cstddef>
 #include <cstdint>
-#include <memory>
 #include <string>
 #include <utility>
 #include <vector>
@@ -130,7 +128,7 @@ private:
   uint32_t follow(const StreamForm& form, const TAVHeader& root, bool& fits)
   {
     constexpr int enough = 1000;
-    const uint64_t end = std::min(endOfGroup(root), bytes_.size());
+    const uint64_t end = lesser(endOfGroup(root), bytes_.size());
     uint64_t at = layout::kHeaderSize32;
     fits = true;
     for (int i = 0; i < enough && at < end && fits; ++i)
@@ -251,7 +249,7 @@ private:
     std::array<uint8_t, step> piece;
     for (content_ = bytes_.size(); content_ != 0;)
     {
-      const uint64_t length = std::min(step, content_);
+      const uint64_t length = lesser(step, content_);
       uint64_t got = 0;
       const uint32_t rc = bytes_.read(content_ - length, piece.data(), length, got);
       if (rc != TAV_RC_OK || got != length)
@@ -305,7 +303,7 @@ private:
     uint32_t rc = readHeader(bytes_, found_.form, wide, start, element, there);
     rc = rc == TAV_RC_OK ? bytes_.read(end - pair.size(), pair.data(), pair.size(), got) : rc;
     const layout::EyeSize eye = layout::decodeEyeSize(pair, found_.form.swapped);
-    const uint64_t payload = layout::sizeOf(group) - std::min(layout::sizeOf(group), layout::endElementLength(wide));
+    const uint64_t payload = layout::sizeOf(group) - lesser(layout::sizeOf(group), layout::endElementLength(wide));
     whole = there && got == pair.size() && layout::elmOf(element) == TAV_ELM_CMN_END_HDR_EYE_SIZE &&
             eye.eye == TAV_EYE_CATCHER && eye.distance == layout::groupDistance(payload, wide);
     return rc;
@@ -398,7 +396,7 @@ private:
     }
     if (rc == TAV_RC_OK && !whole)
     {
-      levels_.push_back(Level{group, end, std::min(end, levels_.back().limit)});
+      levels_.push_back(Level{group, end, lesser(end, levels_.back().limit)});
     }
     at = whole ? end : at + layout::headerLength(group.hdrType);
     return rc;
@@ -486,8 +484,8 @@ inline FileEnd findEnd(KORHFile& file, const StreamOptions* given)
 
 /// Opens a file to go on behind its last stream. Nothing in it changes before all is known to be well; then it ends
 /// where that stream does.
-inline FileEnd openToAppend(const std::filesystem::path& path, const FileOptions& options, const StreamOptions* given,
-                            std::unique_ptr<TAVSSFile>& storage)
+inline FileEnd openToAppend(const FilePath& path, const FileOptions& options, const StreamOptions* given,
+                            Owner<TAVSSFile>& storage)
 {
   FileEnd found;
   if (options.overwrite)
@@ -500,7 +498,7 @@ inline FileEnd openToAppend(const std::filesystem::path& path, const FileOptions
   {
     return found;
   }
-  if (isDevice(path))
+  if (korIsDevice(path.c_str()))
   {
     found.outcome = {KOR_RC_NOT_SEEKABLE, "a device has no end to go on behind"};
     return found;

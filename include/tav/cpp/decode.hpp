@@ -2,9 +2,7 @@
 /// Payloads as C++ values.
 #pragma once
 
-#include <algorithm>
 #include <array>
-#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
@@ -105,25 +103,9 @@ uint32_t decode(const RawValue& raw, T& out) noexcept
   }
 }
 
-/// False for seconds that a clock of this precision cannot show.
-template<class Duration>
-bool fromTimeStamp(const TAVTimeStamp& stamp, std::chrono::sys_time<Duration>& time) noexcept
-{
-  using namespace std::chrono;
-  constexpr double most = std::min(9.2e12, duration<double>(Duration::max()).count()); // in microseconds: 63 bits
-  constexpr double fractions = 100;                                                    // can add a minute
-  if (!(static_cast<double>(stamp.seconds) < most - fractions))
-  {
-    return false;
-  }
-  const sys_seconds whole{seconds(static_cast<int64_t>(stamp.seconds))};
-  time = floor<Duration>(whole + milliseconds(stamp.fractionA) + microseconds(stamp.fractionB));
-  return true;
-}
-
 /// The moment. The time zone of the stamp is for showing it and moves nothing.
-template<class Duration>
-uint32_t decode(const RawValue& raw, std::chrono::sys_time<Duration>& out) noexcept
+template<SysTime Time>
+uint32_t decode(const RawValue& raw, Time& out) noexcept
 {
   TAVTimeStamp stamp{};
   const uint32_t rc = decode(raw, stamp);

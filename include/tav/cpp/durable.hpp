@@ -3,7 +3,6 @@
 #pragma once
 
 #include <cstdint>
-#include <filesystem>
 #include <string>
 
 #include "tav/cpp/file.hpp"
@@ -16,9 +15,9 @@ class Durable
 {
 public:
   /// The path of a file whose name may not be on the device yet.
-  void name(const std::filesystem::path& path)
+  void name(const FilePath& path)
   {
-    path_ = fileText(path);
+    path_ = path.text();
   }
 
   /// Waits until a storage's bytes are on the device, and the name of its file. A failure stays: the system may have

@@ -2,17 +2,15 @@
 /// C++ values as payloads.
 #pragma once
 
-#include <algorithm>
 #include <array>
-#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
-#include <memory>
 #include <new>
 #include <utility>
 
 #include "tav/cpp/text.hpp"
+#include "tav/cpp/time.hpp"
 #include "tav/cpp/values.hpp"
 
 namespace tav::detail
@@ -42,25 +40,6 @@ using IntegerOf = typename decltype(makeIntegerOf<Type>())::type;
 constexpr std::array<uint64_t, 2> joinHalves(uint64_t high, uint64_t low) noexcept
 {
   return kor::isLittleEndian ? std::array<uint64_t, 2>{low, high} : std::array<uint64_t, 2>{high, low};
-}
-
-/// Fraction A holds the milliseconds, fraction B the microseconds of the millisecond. False for a time that seconds
-/// since 1970 in 64 bits cannot tell.
-template<class Duration>
-bool toTimeStamp(std::chrono::sys_time<Duration> time, TAVTimeStamp& stamp) noexcept
-{
-  using namespace std::chrono;
-  constexpr double tooLate = 9.2e12; // the same in microseconds still fits 63 bits
-  const double about = duration<double>(time.time_since_epoch()).count();
-  if (!(about >= 0 && about < tooLate))
-  {
-    return false;
-  }
-  const auto whole = floor<seconds>(time);
-  const auto fraction = duration_cast<microseconds>(time - whole).count();
-  stamp = {static_cast<uint64_t>(whole.time_since_epoch().count()), static_cast<uint16_t>(fraction / 1000),
-           static_cast<uint16_t>(fraction % 1000), 0, 0};
-  return true;
 }
 
 template<class T>
@@ -98,20 +77,20 @@ uint32_t withUtf8Payload(std::string_view text, uint16_t codePage, Write& write)
 {
   std::array<uint8_t, 256> room;
   const size_t size = sizeof codePage + text.size();
-  std::unique_ptr<uint8_t[]> larger;
-  uint8_t* bytes = room.data();
-  if (size > room.size())
-  {
-    larger.reset(new (std::nothrow) uint8_t[size]);
-    bytes = larger.get();
-  }
+  auto* const larger = size > room.size() ? static_cast<uint8_t*>(::operator new(size, std::nothrow)) : nullptr;
+  uint8_t* const bytes = size > room.size() ? larger : room.data();
   if (bytes == nullptr)
   {
     return TAV_RC_NO_MEMORY;
   }
   std::memcpy(bytes, &codePage, sizeof codePage);
-  std::copy(text.begin(), text.end(), bytes + sizeof codePage);
-  return write(TAV_TYPE_UTF8_STRING, bytes, uint64_t{size});
+  if (!text.empty())
+  {
+    std::memcpy(bytes + sizeof codePage, text.data(), text.size());
+  }
+  const uint32_t rc = write(TAV_TYPE_UTF8_STRING, bytes, uint64_t{size});
+  ::operator delete(larger);
+  return rc;
 }
 
 /// Calls `write(type, bytes, size)` with a 128-bit value.
@@ -200,7 +179,7 @@ uint32_t withPayload(const T& value, Write&& write) noexcept
   {
     return write(TAV_TYPE_UTC_TIMESTAMP, bytesOf(&value), uint64_t{sizeof value});
   }
-  else if constexpr (isSysTime<T>)
+  else if constexpr (SysTime<T>)
   {
     TAVTimeStamp stamp;
     return toTimeStamp(value, stamp) ? withPayload(stamp, write) : TAV_RC_OUTSIDE_PARENT;
@@ -233,7 +212,7 @@ uint32_t withPayloadFor(uint16_t type, const T& value, Write&& write) noexcept
 template<class T>
 const char* refusalOf(const T& value, uint32_t code) noexcept
 {
-  if constexpr (isSysTime<T>)
+  if constexpr (SysTime<T>)
   {
     return code == TAV_RC_OUTSIDE_PARENT ? "a time before 1970, or too late for a timestamp" : nullptr;
   }

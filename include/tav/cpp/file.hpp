@@ -2,17 +2,16 @@
 /// Files as readers and writers open them: locks, and results that take a file's place when they are complete.
 #pragma once
 
-#include <chrono>
 #include <cstdint>
-#include <filesystem>
-#include <memory>
+#include <ctime>
 #include <new>
 #include <string>
 #include <string_view>
-#include <system_error>
 #include <utility>
 
 #include "tav/cpp/error.hpp"
+#include "tav/cpp/filePath.hpp"
+#include "tav/cpp/owner.hpp"
 #include "tav/tav.h"
 
 namespace tav
@@ -47,19 +46,10 @@ struct FileOutcome
   std::string sentence{};
 };
 
-/// A file's name in UTF-8, as it is opened and as messages show it.
-inline std::string fileText(const std::filesystem::path& path)
+inline uint32_t openFile(const FilePath& path, uint64_t options, Owner<TAVSSFile>& storage, uint32_t permissions = 0666)
 {
-  const std::u8string name = path.u8string(); // string() throws where a locale lacks a letter
-  return std::string(name.begin(), name.end());
-}
-
-inline uint32_t openFile(const std::filesystem::path& path, uint64_t options, std::unique_ptr<TAVSSFile>& storage,
-                         uint32_t permissions = 0666)
-{
-  const std::string name = fileText(path);
   KORFileOpenParam param;
-  param.pPath = name.c_str();
+  param.pPath = path.c_str();
   param.options = options;
   param.permissions = permissions;
   uint32_t rc = TAV_RC_OK;
@@ -68,36 +58,25 @@ inline uint32_t openFile(const std::filesystem::path& path, uint64_t options, st
 }
 
 /// What there is to say when a file could not be opened.
-inline Told tellFile(const std::filesystem::path& path, const FileOutcome& outcome)
+inline Told tellFile(const FilePath& path, const FileOutcome& outcome)
 {
-  return {fileText(path), outcome.sentence};
-}
-
-/// Whether a path leads to something that is no file: a device, a pipe.
-inline bool isDevice(const std::filesystem::path& path) noexcept
-{
-  std::error_code error;
-  const std::filesystem::file_status status = std::filesystem::status(path, error);
-  return !error && std::filesystem::exists(status) && !std::filesystem::is_regular_file(status) &&
-         !std::filesystem::is_directory(status);
+  return {path.text(), outcome.sentence};
 }
 
 /// Opens a file and takes its lock before anything in it changes. A file that lost its path to another one while the
 /// lock was waited for is not the one that was meant.
-inline FileOutcome openLocked(const std::filesystem::path& path, uint64_t options, bool lock,
-                              std::unique_ptr<TAVSSFile>& storage)
+inline FileOutcome openLocked(const FilePath& path, uint64_t options, bool lock, Owner<TAVSSFile>& storage)
 {
   constexpr int attempts = 100;
-  const std::string name = fileText(path);
   for (int attempt = 0; attempt < attempts; ++attempt)
   {
     const uint32_t opened = openFile(path, options, storage);
-    if (opened != TAV_RC_OK || !lock || isDevice(path))
+    if (opened != TAV_RC_OK || !lock || korIsDevice(path.c_str()))
     {
       return {opened};
     }
     const uint32_t locked = storage->lock(0);
-    if (locked == TAV_RC_OK && storage->pFile->isAt(name.c_str()))
+    if (locked == TAV_RC_OK && storage->pFile->isAt(path.c_str()))
     {
       return {};
     }
@@ -114,23 +93,26 @@ inline FileOutcome openLocked(const std::filesystem::path& path, uint64_t option
   return {KOR_RC_BUSY, "the file is replaced again and again"};
 }
 
-/// A path with the symbolic links at its end followed, also one that leads to nothing yet. False for a link into the
-/// system's own folders (/dev/stdout is one): what is behind it is written to, and not replaced.
-inline bool followLinks(std::filesystem::path& path)
+/// The absolute path of a file, the symbolic links at its end followed.
+struct FileTarget
 {
-  constexpr int mostLinks = 40;
-  std::error_code error;
-  path = std::filesystem::absolute(path, error);
-  for (int i = 0; i < mostLinks && std::filesystem::is_symlink(path, error); ++i)
+  std::string path;
+  uint64_t nameAt = 0; ///< where the name behind the last folder starts
+};
+
+/// As korFollowLinks.
+inline uint32_t followLinks(const FilePath& path, FileTarget& target)
+{
+  constexpr size_t usual = 4096;
+  constexpr size_t most = usual << 8U;
+  uint32_t rc = TAV_RC_NO_MEMORY;
+  for (size_t room = usual; rc == TAV_RC_NO_MEMORY && room <= most; room *= 4)
   {
-    const std::string name = fileText(path);
-    if (name.starts_with("/proc/") || name.starts_with("/dev/"))
-    {
-      return false;
-    }
-    path = path.parent_path() / std::filesystem::read_symlink(path, error);
+    target.path.resize(room);
+    rc = korFollowLinks(path.c_str(), target.path.data(), room, &target.nameAt);
   }
-  return true;
+  target.path.resize(rc == TAV_RC_OK ? target.path.find('\0') : 0);
+  return rc;
 }
 
 /// A file that is written beside another one, whose place it takes when it is complete. Without that it is removed.
@@ -144,16 +126,15 @@ public:
   {
     if (!temporary_.empty())
     {
-      std::error_code ignored;
-      std::filesystem::remove(temporary_, ignored);
+      korRemoveFile(temporary_.c_str());
     }
   }
 
   /// Locks the file at `target`, when there is one, and opens `storage` beside it: for nobody else to read, until it
   /// gets the rights of the file that it replaces.
-  FileOutcome open(const std::filesystem::path& target, bool lock, std::unique_ptr<TAVSSFile>& storage)
+  FileOutcome open(const FileTarget& target, bool lock, Owner<TAVSSFile>& storage)
   {
-    target_ = target;
+    target_ = target.path;
     lock_ = lock;
     const FileOutcome held = hold();
     if (held.code != TAV_RC_OK)
@@ -165,7 +146,7 @@ public:
     uint32_t rc = KOR_RC_FILE_EXISTS;
     for (int attempt = 0; attempt < attempts && rc == KOR_RC_FILE_EXISTS; ++attempt)
     {
-      std::filesystem::path beside = target.parent_path() / nextName();
+      std::string beside = target.path.substr(0, static_cast<size_t>(target.nameAt)) + nameOf(attempt);
       rc = openFile(beside, fresh, storage, former_ != nullptr ? 0600 : 0666);
       if (rc == TAV_RC_OK)
       {
@@ -189,10 +170,8 @@ public:
   /// The file, closed by now, takes the place.
   uint32_t commit()
   {
-    const std::string from = fileText(temporary_);
-    const std::string to = fileText(target_);
     KORHFile none;
-    const uint32_t rc = (former_ != nullptr ? *former_->pFile : none).replaceBy(from.c_str(), to.c_str());
+    const uint32_t rc = (former_ != nullptr ? *former_->pFile : none).replaceBy(temporary_.c_str(), target_.c_str());
     if (rc == TAV_RC_OK)
     {
       temporary_.clear();
@@ -211,11 +190,15 @@ private:
     return held.code == KOR_RC_NO_SUCH_FILE ? FileOutcome{} : held;
   }
 
-  /// Short, so that it fits where the name that is replaced does.
-  static std::string nextName()
+  /// Short, so that it fits where the name that is replaced does. Nobody else has it in all likelihood: the object's
+  /// place tells the threads of a process apart, the thread's number the processes.
+  [[nodiscard]] std::string nameOf(int attempt) const
   {
-    const auto now = std::chrono::steady_clock::now().time_since_epoch().count();
-    uint64_t number = static_cast<uint64_t>(now) * 0x9E3779B97F4A7C15U ^ korThreadID();
+    constexpr uint64_t spread = 0x9E3779B97F4A7C15U;
+    uint64_t number = static_cast<uint64_t>(std::time(nullptr)) + static_cast<uint64_t>(attempt);
+    number = number * spread ^ static_cast<uint64_t>(std::clock());
+    number = number * spread ^ korThreadID();
+    number = number * spread ^ static_cast<uint64_t>(reinterpret_cast<uintptr_t>(this));
     std::string name = ".tav-";
     for (int digit = 0; digit < 16; ++digit, number >>= 4U)
     {
@@ -224,16 +207,16 @@ private:
     return name;
   }
 
-  std::filesystem::path target_;
-  std::filesystem::path temporary_; ///< empty: nothing to remove
-  std::unique_ptr<TAVSSFile> former_;
+  std::string target_;
+  std::string temporary_; ///< empty: nothing to remove
+  Owner<TAVSSFile> former_;
   bool lock_ = true;
 };
 
 /// Opens a file for a stream of its own. `replacement` is set when the file at the path stays until the stream is
 /// complete.
-inline FileOutcome openForWriting(const std::filesystem::path& path, const FileOptions& options,
-                                  std::unique_ptr<TAVSSFile>& storage, std::unique_ptr<Replacement>& replacement)
+inline FileOutcome openForWriting(const FilePath& path, const FileOptions& options, Owner<TAVSSFile>& storage,
+                                  Owner<Replacement>& replacement)
 {
   constexpr uint64_t made = KOR_FILE_UPDATE | KOR_FILE_CREATE;
   if (!options.overwrite)
@@ -241,20 +224,23 @@ inline FileOutcome openForWriting(const std::filesystem::path& path, const FileO
     const FileOutcome fresh = openLocked(path, made | KOR_FILE_EXCLUSIVE, options.lock, storage);
     if (!fresh.sentence.empty() && fresh.code != KOR_RC_LOCKED && fresh.code != KOR_RC_BUSY)
     {
-      std::error_code ignored;
-      std::filesystem::remove(path, ignored); // it was made, and cannot be locked
+      korRemoveFile(path.c_str()); // it was made, and cannot be locked
     }
     return fresh;
   }
-  std::filesystem::path target = path;
-  const bool replaces = followLinks(target) && !options.inPlace && !isDevice(target);
-  if (replaces)
+  FileTarget target;
+  const uint32_t followed = options.inPlace ? TAV_RC_NOT_SUPPORTED : followLinks(path, target);
+  if (followed != TAV_RC_OK && followed != TAV_RC_NOT_SUPPORTED)
   {
-    replacement = std::make_unique<Replacement>();
+    return {followed};
+  }
+  if (followed == TAV_RC_OK && !korIsDevice(target.path.c_str()))
+  {
+    replacement.reset(new Replacement);
     return replacement->open(target, options.lock, storage);
   }
   const FileOutcome opened = openLocked(path, made, options.lock, storage);
-  const bool emptied = opened.code == TAV_RC_OK && !isDevice(path);
+  const bool emptied = opened.code == TAV_RC_OK && !korIsDevice(path.c_str());
   return emptied ? FileOutcome{storage->pFile->setSize(0)} : opened;
 }
 

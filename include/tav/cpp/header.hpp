@@ -2,11 +2,11 @@
 /// What a node's header says.
 #pragma once
 
-#include <charconv>
 #include <cstdint>
 #include <string>
 #include <string_view>
 
+#include "tav/cpp/text.hpp"
 #include "tav/cpp/values.hpp"
 #include "tav/dictionary.hpp"
 
@@ -109,9 +109,7 @@ inline std::string elementText(ElementId elm)
 /// "hostName (60104) at 0x28"
 inline std::string placeText(const HeaderView& node)
 {
-  char digits[16];
-  const std::to_chars_result end = std::to_chars(digits, digits + sizeof digits, node.offset(), 16);
-  return elementText(node.elm()) + " at 0x" + std::string(digits, end.ptr);
+  return elementText(node.elm()) + " at 0x" + hexDigits(node.offset(), "0123456789abcdef");
 }
 
 /// "hostName (60104) at 0x28, type 50, 3 bytes"

@@ -2,7 +2,6 @@
 /// The name that a misspelt one may have meant.
 #pragma once
 
-#include <algorithm>
 #include <array>
 #include <cstddef>
 #include <string_view>
@@ -31,7 +30,8 @@ inline size_t editDistance(std::string_view left, std::string_view right, size_t
     {
       const size_t changed = diagonal + (lower(left[i - 1]) == lower(right[j - 1]) ? 0 : 1);
       diagonal = row[i];
-      row[i] = std::min({row[i] + 1, row[i - 1] + 1, changed});
+      const size_t oneMore = 1 + (row[i] < row[i - 1] ? row[i] : row[i - 1]);
+      row[i] = changed < oneMore ? changed : oneMore;
     }
   }
   return row[left.size()];

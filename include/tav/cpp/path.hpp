@@ -2,8 +2,6 @@
 /// Paths: finding nodes by the names on the way. Always ends.
 #pragma once
 
-#include <algorithm>
-#include <charconv>
 #include <cstddef>
 #include <cstdint>
 #include <optional>
@@ -14,6 +12,7 @@
 
 #include "tav/cpp/nearest.hpp"
 #include "tav/cpp/ranges.hpp"
+#include "tav/cpp/stack.hpp"
 
 namespace tav
 {
@@ -39,12 +38,7 @@ public:
   template<class Visit>
   void visitBelow(const Node& start, Visit&& visit, std::error_code& ec) const
   {
-    ec.clear();
-    if (!steps_.empty())
-    {
-      uint64_t farthest = start.offset();
-      search(start, 0, visit, farthest, ec);
-    }
+    visitFrom(0, start, visit, ec);
   }
 
   /// The first match below `start`, when the first match of every step leads there; else null, which tells nothing.
@@ -87,16 +81,17 @@ public:
   /// Whether a node is what the path's first step asks for, so that the rest can be searched below it.
   [[nodiscard]] bool beginsWith(const Node& node) const noexcept
   {
-    return !steps_.empty() && steps_.front().matches(node.elm()) && steps_.front().nth <= 1;
+    return !steps_.empty() && matches(steps_[0], node.elm()) && steps_[0].nth <= 1;
   }
 
   /// The path without its first step; empty for a path of one.
   [[nodiscard]] Path rest() const
   {
     Path path;
-    if (!steps_.empty())
+    path.ids_ = ids_;
+    for (size_t i = 1; i < steps_.size(); ++i)
     {
-      path.steps_.assign(steps_.begin() + 1, steps_.end());
+      path.steps_.push(steps_[i]);
     }
     path.isStraight_ = path.areStraight();
     return path;
@@ -113,24 +108,45 @@ private:
 
   struct Step
   {
-    std::vector<uint16_t> ids; ///< empty: any
-    uint64_t nth = 0;          ///< 0: every match
-    uint16_t only = 0;         ///< the id, when there is one
-
-    [[nodiscard]] bool matches(uint16_t elm) const noexcept
-    {
-      return ids.empty() || std::find(ids.begin(), ids.end(), elm) != ids.end();
-    }
+    size_t firstId = 0; ///< in ids_
+    size_t idCount = 0; ///< 0: any
+    uint64_t nth = 0;   ///< 0: every match
+    uint16_t only = 0;  ///< the id, when there is one
   };
 
   Path() = default;
 
+  [[nodiscard]] bool matches(const Step& step, uint16_t elm) const noexcept
+  {
+    bool isMatch = step.idCount == 0;
+    for (size_t i = 0; i < step.idCount && !isMatch; ++i)
+    {
+      isMatch = ids_[step.firstId + i] == elm;
+    }
+    return isMatch;
+  }
+
   /// Whether each step asks for the first child with one id. Elements that end a group are no children of it here.
   [[nodiscard]] bool areStraight() const noexcept
   {
-    return !steps_.empty() && std::all_of(steps_.begin(), steps_.end(), [](const Step& step) {
-      return step.ids.size() == 1 && step.nth <= 1 && !layout::isEndElement(step.only);
-    });
+    bool areAll = !steps_.empty();
+    for (const Step& step : steps_)
+    {
+      areAll = areAll && step.idCount == 1 && step.nth <= 1 && !layout::isEndElement(step.only);
+    }
+    return areAll;
+  }
+
+  /// visitBelow with the steps from one on; nothing when there are none.
+  template<class Visit>
+  void visitFrom(size_t level, const Node& start, Visit&& visit, std::error_code& ec) const
+  {
+    ec.clear();
+    if (level < steps_.size())
+    {
+      uint64_t farthest = start.offset();
+      search(start, level, visit, farthest, ec);
+    }
   }
 
   /// One recursion a step: the path is the caller's, the stream's depth does not matter. False: enough. Only damage
@@ -148,7 +164,7 @@ private:
         return false;
       }
       farthest = child.offset();
-      if (!step.matches(child.elm()) || (step.nth != 0 && ++count != step.nth))
+      if (!matches(step, child.elm()) || (step.nth != 0 && ++count != step.nth))
       {
         continue;
       }
@@ -184,9 +200,12 @@ private:
     {
       if (fault != nullptr)
       {
-        const std::string_view before = path.substr(0, at + behind);
-        const auto column = std::count_if(before.begin(), before.end(), [](char c) { return (c & 0xC0) != 0x80; });
-        *fault = "column " + std::to_string(column + 1) + ": " + what;
+        size_t column = 1;
+        for (const char c : path.substr(0, at + behind))
+        {
+          column += (c & 0xC0) != 0x80 ? 1 : 0;
+        }
+        *fault = "column " + std::to_string(column) + ": " + what;
       }
       return false;
     }
@@ -199,28 +218,37 @@ private:
     {
       const size_t slash = path.find('/', at);
       more = slash != std::string_view::npos;
-      Step step;
+      Step step{.firstId = ids_.size()};
       if (!parseStep(path.substr(at, slash - at), Spot{path, at, fault}, step))
       {
         steps_.clear();
         return TAV_RC_BAD_PARAM;
       }
-      step.only = step.ids.size() == 1 ? step.ids.front() : uint16_t{0};
-      steps_.push_back(std::move(step));
+      steps_.push(step);
       at = slash + 1;
     }
     isStraight_ = areStraight();
     return TAV_RC_OK;
   }
 
-  template<class Number>
-  static bool parseNumber(std::string_view text, Number& number) noexcept
+  /// Decimal digits and nothing else.
+  static bool parseNumber(std::string_view text, uint64_t most, uint64_t& number) noexcept
   {
-    const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), number);
-    return error == std::errc() && end == text.data() + text.size();
+    uint64_t sum = 0;
+    for (const char c : text)
+    {
+      const auto digit = static_cast<uint64_t>(c - '0');
+      if (c < '0' || c > '9' || sum > (most - digit) / 10)
+      {
+        return false;
+      }
+      sum = sum * 10 + digit;
+    }
+    number = sum;
+    return !text.empty();
   }
 
-  static bool parseStep(std::string_view text, const Spot& spot, Step& step)
+  bool parseStep(std::string_view text, const Spot& spot, Step& step)
   {
     const size_t bracket = text.find('[');
     const std::string_view name = text.substr(0, bracket);
@@ -228,7 +256,7 @@ private:
     {
       return spot.fail(0, "a step is empty");
     }
-    if (name != "*" && !parseName(name, spot, step.ids))
+    if (name != "*" && !parseName(name, spot, step))
     {
       return false;
     }
@@ -241,7 +269,7 @@ private:
       return spot.fail(bracket, "a [ without a ] at the end of its step");
     }
     const std::string_view place = text.substr(bracket + 1, text.size() - bracket - 2);
-    const bool isPlace = parseNumber(place, step.nth) && step.nth != 0;
+    const bool isPlace = parseNumber(place, UINT64_MAX, step.nth) && step.nth != 0;
     return isPlace || spot.fail(bracket + 1, "'" + std::string(place) + "' is no place; the first is [1]");
   }
 
@@ -258,22 +286,29 @@ private:
            trimmed(entry.name) == text;
   }
 
-  static bool parseName(std::string_view text, const Spot& spot, std::vector<uint16_t>& ids)
+  bool parseName(std::string_view text, const Spot& spot, Step& step)
   {
-    uint16_t id = 0;
-    if (parseNumber(text.substr(text.front() == '#' ? 1 : 0), id))
+    uint64_t id = 0;
+    if (parseNumber(text.substr(text.front() == '#' ? 1 : 0), UINT16_MAX, id))
     {
-      ids.push_back(id);
+      addId(static_cast<uint16_t>(id), step);
       return true;
     }
     for (const dictionary::Entry& entry : dictionary::entries()) // several elements can share a tag
     {
       if (isNameOf(entry, text) && entry.constant != "INVALID_ELEMENT")
       {
-        ids.push_back(entry.id);
+        addId(entry.id, step);
       }
     }
-    return !ids.empty() || failName(text, spot);
+    return step.idCount != 0 || failName(text, spot);
+  }
+
+  void addId(uint16_t id, Step& step)
+  {
+    ids_.push(id);
+    ++step.idCount;
+    step.only = step.idCount == 1 ? id : uint16_t{0};
   }
 
   [[gnu::noinline, gnu::cold]] static bool failName(std::string_view text, const Spot& spot)
@@ -292,8 +327,9 @@ private:
                             (nearest.empty() ? "" : "; did you mean " + std::string(nearest) + "?"));
   }
 
-  std::vector<Step> steps_;
-  bool isStraight_ = false; ///< findStraight can find it
+  detail::Stack<Step> steps_;
+  detail::Stack<uint16_t> ids_; ///< of all steps
+  bool isStraight_ = false;     ///< findStraight can find it
 };
 
 inline std::vector<Node> Node::all(const Path& path, std::error_code& ec) const

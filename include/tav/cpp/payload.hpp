@@ -4,8 +4,7 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <memory>
-#include <ranges>
+#include <span>
 #include <stdexcept>
 
 #include "tav/cpp/storage.hpp"
@@ -27,7 +26,7 @@ namespace detail
 
 struct ReaderState
 {
-  std::unique_ptr<TAVSideStorage> owned;
+  Owner<TAVSideStorage> owned;
   TAVHandle* handle = nullptr;
   uint64_t fetches = 0; ///< payload pointers into a ring last until the next one
   bool isFast = false;  ///< over memory, in this machine's order; unknown once the handle was given away

@@ -2,16 +2,14 @@
 /// Printing of streams, as Reader::print does it: the forms of tavPrintSubtree for every value that can be written.
 #pragma once
 
-#include <algorithm>
 #include <array>
-#include <charconv>
 #include <cstdint>
 #include <cstdio>
 #include <string>
 #include <string_view>
-#include <vector>
 
 #include "tav/cpp/ranges.hpp"
+#include "tav/cpp/stack.hpp"
 #include "tav/cpp/valueText.hpp"
 
 namespace tav
@@ -62,7 +60,7 @@ public:
     uint32_t rc = TAV_RC_OK;
     if (below)
     {
-      open_.push_back(start.elm());
+      open_.push(start.elm());
       rc = printBelow(start);
     }
     else if (tags)
@@ -105,7 +103,7 @@ private:
       }
       if (node.isGroup())
       {
-        open_.push_back(node.elm());
+        open_.push(node.elm());
       }
       if (text_.size() >= kBlock)
       {
@@ -124,7 +122,7 @@ private:
     while (open_.size() > depth)
     {
       close(open_.back(), open_.size() - 1, false);
-      open_.pop_back();
+      open_.pop();
     }
   }
 
@@ -281,7 +279,7 @@ private:
     }
     if (!options_.xml && raw.type == TAV_TYPE_ASCII_STRING)
     {
-      value.text.resize(std::min(value.text.find('\0'), value.text.size()));
+      value.text = value.text.substr(0, value.text.find('\0'));
     }
     return value;
   }
@@ -311,12 +309,23 @@ private:
     }
   }
 
+  template<size_t Size>
+  static size_t placeIn(const std::array<uint16_t, Size>& ids, uint16_t id) noexcept
+  {
+    size_t place = 0;
+    while (place < Size && ids[place] != id)
+    {
+      ++place;
+    }
+    return place;
+  }
+
   /// The key elements of a group as attributes, of several alike the first. They are printed below it as well.
   void appendKeys(const Node& group, size_t depth)
   {
     constexpr std::array<uint16_t, 3> keyed{SQLM_ELM_DBASE, SQLM_ELM_NODE, TAV_ELM_CMN_HOST};
     constexpr std::array<uint16_t, 3> keys{SQLM_ELM_NODE_NUMBER, SQLM_ELM_DB_NAME, TAV_ELM_CMN_HOST_NAME};
-    if (!options_.attributes || depth == 0 || std::find(keyed.begin(), keyed.end(), group.elm()) == keyed.end())
+    if (!options_.attributes || depth == 0 || placeIn(keyed, group.elm()) == keyed.size())
     {
       return;
     }
@@ -324,7 +333,7 @@ private:
     std::error_code ec; // which the walk below the group meets again
     for (const Node& child : group.children(ec))
     {
-      const auto place = static_cast<size_t>(std::find(keys.begin(), keys.end(), child.elm()) - keys.begin());
+      const size_t place = placeIn(keys, child.elm());
       if (place == keys.size() || seen[place] || child.isGroup())
       {
         continue;
@@ -377,11 +386,7 @@ private:
 
   static std::string hexNumber(uint64_t number, size_t width)
   {
-    std::array<char, 17> digits{};
-    const auto end = std::to_chars(digits.data(), digits.data() + digits.size(), number, 16).ptr;
-    std::string text(digits.data(), end);
-    std::transform(text.begin(), text.end(), text.begin(),
-                   [](char c) { return c >= 'a' ? static_cast<char>(c - 'a' + 'A') : c; });
+    const std::string text = hexDigits(number, "0123456789ABCDEF");
     return std::string(width > text.size() ? width - text.size() : 0, '0') + text;
   }
 
@@ -428,7 +433,7 @@ private:
   PrintOptions options_;
   bool swapped_;
   std::string text_; ///< that the stream has not got yet
-  std::vector<uint16_t> open_;
+  Stack<uint16_t> open_;
   ValueText value_; ///< of the data element whose tag is open
   uint64_t count_ = 0;
   bool failed_ = false;

@@ -6,11 +6,11 @@
 #include <cstdint>
 #include <iterator>
 #include <optional>
-#include <ranges>
+#include <span>
 #include <utility>
-#include <vector>
 
 #include "tav/cpp/node.hpp"
+#include "tav/cpp/stack.hpp"
 
 namespace tav
 {
@@ -85,7 +85,7 @@ private:
 } // namespace detail
 
 /// Children of a group. A single pass; the range holds the place of the walk, so an iterator must not outlive it.
-class ChildRange : public std::ranges::view_base
+class ChildRange
 {
 public:
   ChildRange(ChildRange&&) = default;
@@ -174,7 +174,7 @@ private:
 };
 
 /// All nodes below a group, depth first. A single pass; the range holds the place of the walk, 32 bytes a level.
-class DescendantRange : public std::ranges::view_base
+class DescendantRange
 {
 public:
   DescendantRange(DescendantRange&&) = default;
@@ -235,7 +235,7 @@ private:
   {
     if (depth_ != 0)
     {
-      outer_.push_back(current_.parent_);
+      outer_.push(current_.parent_);
     }
     ++depth_;
     current_.parent_ = current_.data_.header;
@@ -274,21 +274,34 @@ private:
     {
       TAVHeader ended = current_.parent_;
       current_.parent_ = outer_.back();
-      outer_.pop_back();
+      outer_.pop();
       --depth_;
       rc = current_.readNext(&current_.parent_, &ended);
     }
     return rc == TAV_RC_OK && current_.offset() <= last ? TAV_RC_OUTSIDE_PARENT : rc;
   }
 
-  Node current_;                 ///< knows the group that is walked
-  std::vector<TAVHeader> outer_; ///< the groups around that one
-  size_t depth_ = 0;             ///< 0: still at the start
+  Node current_;                   ///< knows the group that is walked
+  detail::Stack<TAVHeader> outer_; ///< the groups around that one
+  size_t depth_ = 0;               ///< 0: still at the start
   std::error_code* ec_;
   EndElements endElements_;
   bool begun_ = false;
   bool done_ = false;
 };
+
+} // namespace tav
+
+/// @cond  Views, as std::ranges::view_base would make them: <ranges> costs a small program more than all of this, and
+/// the variables come with <span>, too.
+template<>
+inline constexpr bool std::ranges::enable_view<tav::ChildRange> = true;
+template<>
+inline constexpr bool std::ranges::enable_view<tav::DescendantRange> = true;
+/// @endcond
+
+namespace tav
+{
 
 inline ChildRange Node::children(EndElements endElements) const
 {

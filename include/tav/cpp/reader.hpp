@@ -4,8 +4,6 @@
 
 #include <cstdint>
 #include <cstdio>
-#include <filesystem>
-#include <memory>
 #include <new>
 #include <optional>
 #include <span>
@@ -26,7 +24,7 @@ namespace detail
 /// Bytes in an object that ends with the call: a stream over them could not be read.
 template<class T>
 concept TemporaryBytes = !std::is_lvalue_reference_v<T> && BytesView<std::remove_cvref_t<T>> &&
-                         !std::ranges::borrowed_range<T>;
+                         !std::ranges::enable_borrowed_range<std::remove_cvref_t<T>>;
 
 } // namespace detail
 
@@ -51,12 +49,12 @@ public:
   Reader(T&& bytes, const StreamOptions& options, std::error_code& ec) = delete;
 
   /// Over a file, through a ring.
-  explicit Reader(const std::filesystem::path& path, const StreamOptions& options = {})
+  explicit Reader(const FilePath& path, const StreamOptions& options = {})
       : Reader()
   {
-    detail::demand(openPath(path, options), "opening for reading", [&path] { return detail::fileText(path); });
+    detail::demand(openPath(path, options), "opening for reading", [&path] { return path.text(); });
   }
-  Reader(const std::filesystem::path& path, const StreamOptions& options, std::error_code& ec)
+  Reader(const FilePath& path, const StreamOptions& options, std::error_code& ec)
       : Reader()
   {
     detail::report(openPath(path, options), ec);
@@ -221,7 +219,7 @@ public:
 
 private:
   Reader()
-      : state_(std::make_unique<detail::ReaderState>())
+      : state_(new detail::ReaderState)
   {
   }
 
@@ -252,13 +250,13 @@ private:
   {
     static constexpr std::byte none{};
     auto* const block = const_cast<std::byte*>(bytes.empty() ? &none : bytes.data()); // reading writes nothing
-    state_->owned = std::make_unique<TAVSSMemory>(block, bytes.size());
+    state_->owned.reset(new TAVSSMemory(block, bytes.size()));
     return open(state_->owned.get(), options);
   }
 
-  uint32_t openPath(const std::filesystem::path& path, const StreamOptions& options)
+  uint32_t openPath(const FilePath& path, const StreamOptions& options)
   {
-    std::unique_ptr<TAVSSFile> storage;
+    detail::Owner<TAVSSFile> storage;
     const uint32_t rc = detail::openFile(path, KOR_FILE_READ, storage);
     state_->owned = std::move(storage);
     return rc != TAV_RC_OK ? rc : open(state_->owned.get(), options);
@@ -348,13 +346,12 @@ private:
     {
       return;
     }
-    const Path rest = path.rest();
-    if (rest.empty())
+    if (path.steps_.size() == 1)
     {
       keep(first);
       return;
     }
-    rest.visitBelow(first, keep, ec);
+    path.visitFrom(1, first, keep, ec);
   }
 
   uint32_t printNode(FILE* stream, const Node& node, const PrintOptions& options, uint64_t& characters) const noexcept
@@ -387,7 +384,7 @@ private:
     return rc == TAV_RC_OK ? tavValidateHierarchy(0, use(), &header) : rc;
   }
 
-  std::unique_ptr<detail::ReaderState> state_;
+  detail::Owner<detail::ReaderState> state_;
 };
 
 } // namespace tav

@@ -2,12 +2,10 @@
 /// Recording for weeks: roots one after another, in files that change.
 #pragma once
 
-#include <algorithm>
 #include <charconv>
-#include <chrono>
+#include <concepts>
 #include <cstdint>
-#include <filesystem>
-#include <memory>
+#include <limits>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -20,15 +18,48 @@
 namespace tav
 {
 
+/// A length of time. Any std::chrono::duration makes one, of which a program that has one knows the header; the longest
+/// that there is, some 292 years, stands for all longer ones.
+class Interval
+{
+public:
+  constexpr Interval() noexcept = default;
+  template<class Duration>
+  requires requires(const Duration& length)
+  {
+    length.count();
+    Duration::period::num;
+    Duration::period::den;
+  }
+  // NOLINTNEXTLINE(google-explicit-constructor): times are given as they are at hand
+  constexpr Interval(const Duration& length) noexcept
+  {
+    constexpr double most = 9.2e18; // 63 bits
+    using Period = typename Duration::period;
+    const double about = static_cast<double>(length.count()) * 1e9 * static_cast<double>(Period::num) /
+                         static_cast<double>(Period::den);
+    const bool isLong = !(about < most);
+    nanoseconds_ = isLong ? std::numeric_limits<int64_t>::max() : static_cast<int64_t>(about);
+  }
+
+  [[nodiscard]] constexpr int64_t nanoseconds() const noexcept
+  {
+    return nanoseconds_;
+  }
+
+private:
+  int64_t nanoseconds_ = 0;
+};
+
 /// When a recorder changes files, and what it does for those that it has written.
 struct RecorderOptions
 {
-  uint64_t maxBytes = 0;              ///< a file that has as many takes no further root; 0: any number
-  uint64_t keep = 0;                  ///< files that stay, the newest ones; older ones are removed. 0: all
-  std::chrono::nanoseconds maxAge{0}; ///< a file that was opened so long ago takes no further root; 0: any time
+  uint64_t maxBytes = 0; ///< a file that has as many takes no further root; 0: any number
+  uint64_t keep = 0;     ///< files that stay, the newest ones; older ones are removed. 0: all
+  Interval maxAge{};     ///< a file that was opened so long ago takes no further root; 0: any time
   /// Syncs when a root is closed and the last sync was so long ago, and within a root that takes longer when something
   /// is added to it; 0: whenever a root is closed. Unset: never by itself.
-  std::optional<std::chrono::nanoseconds> syncEvery{};
+  std::optional<Interval> syncEvery{};
 };
 
 namespace detail
@@ -38,10 +69,13 @@ namespace detail
 class NumberedFiles
 {
 public:
-  explicit NumberedFiles(const std::filesystem::path& path)
+  explicit NumberedFiles(const FilePath& path)
       : path_(path)
   {
-    const std::string name = fileText(path.filename());
+    const std::string& text = path.text();
+    const size_t folder = text.find_last_of(KOR_PATH_SEPARATORS);
+    folder_ = text.substr(0, folder == std::string::npos ? 0 : folder + 1);
+    const std::string name = text.substr(folder_.size());
     const size_t at = name.find("%n");
     isNumbered_ = at != std::string::npos;
     before_ = name.substr(0, at);
@@ -52,36 +86,17 @@ public:
   {
     return isNumbered_;
   }
-  [[nodiscard]] std::filesystem::path at(uint64_t number) const
+  [[nodiscard]] FilePath at(uint64_t number) const
   {
-    if (!isNumbered_)
-    {
-      return path_;
-    }
-    const std::string name = before_ + std::to_string(number) + behind_;
-    return path_.parent_path() / std::filesystem::path(std::u8string(name.begin(), name.end()));
+    return isNumbered_ ? FilePath(folder_ + before_ + std::to_string(number) + behind_) : path_;
   }
 
   /// The numbers of the files that are there, in rising order.
   uint32_t list(std::vector<uint64_t>& numbers) const
   {
     numbers.clear();
-    std::error_code error;
-    const std::filesystem::path folder = path_.has_parent_path() ? path_.parent_path() : std::filesystem::path(".");
-    std::filesystem::directory_iterator entry(folder, error);
-    for (; !error && entry != std::filesystem::directory_iterator(); entry.increment(error))
-    {
-      uint64_t number = 0;
-      if (numberOf(fileText(entry->path().filename()), number))
-      {
-        numbers.push_back(number);
-      }
-    }
-    std::sort(numbers.begin(), numbers.end());
-    return error == std::errc::no_such_file_or_directory ? KOR_RC_NO_SUCH_FILE
-           : error == std::errc::permission_denied       ? KOR_RC_NO_PERMISSION
-           : error                                       ? KOR_RC_IO_ERROR
-                                                         : TAV_RC_OK;
+    Listing listing{*this, numbers};
+    return korListFolder(folder_.empty() ? "." : folder_.c_str(), &NumberedFiles::take, &listing);
   }
 
   /// Removes all files but the last ones. Goes on over one that cannot be removed.
@@ -91,16 +106,31 @@ public:
     uint32_t rc = list(numbers);
     for (size_t i = 0; i + count < numbers.size(); ++i)
     {
-      std::error_code error;
-      std::filesystem::remove(at(numbers[i]), error);
-      rc = error == std::errc::permission_denied ? KOR_RC_NO_PERMISSION
-           : error                               ? KOR_RC_IO_ERROR
-                                                 : rc;
+      const uint32_t removed = korRemoveFile(at(numbers[i]).c_str());
+      rc = removed == TAV_RC_OK || removed == KOR_RC_NO_SUCH_FILE ? rc : removed;
     }
     return rc;
   }
 
 private:
+  struct Listing
+  {
+    const NumberedFiles& files;
+    std::vector<uint64_t>& numbers;
+  };
+
+  static void take(const char* name, void* context)
+  {
+    auto& [files, numbers] = *static_cast<Listing*>(context);
+    uint64_t number = 0;
+    if (files.numberOf(name, number))
+    {
+      auto place = numbers.end(); // few files, and most systems list them as they were made
+      while (place != numbers.begin() && *(place - 1) > number) --place;
+      numbers.insert(place, number);
+    }
+  }
+
   bool numberOf(std::string_view name, uint64_t& number) const noexcept
   {
     if (name.size() <= before_.size() + behind_.size() || !name.starts_with(before_) || !name.ends_with(behind_))
@@ -112,7 +142,8 @@ private:
     return failure == std::errc() && end == name.data() + name.size() && name.front() != '0';
   }
 
-  std::filesystem::path path_;
+  FilePath path_;
+  std::string folder_; ///< with the separator at its end; empty: the working folder
   std::string before_;
   std::string behind_;
   bool isNumbered_ = false;
@@ -122,9 +153,7 @@ private:
 class Recording final : public Watch
 {
 public:
-  using Clock = std::chrono::steady_clock;
-
-  Recording(const std::filesystem::path& path, const RecorderOptions& options, const StreamOptions& stream)
+  Recording(const FilePath& path, const RecorderOptions& options, const StreamOptions& stream)
       : files_(path), options_(options), stream_(stream)
   {
   }
@@ -132,7 +161,7 @@ public:
   /// Opens the last file that is there, to go on in it, or the first one.
   FileOutcome open()
   {
-    const bool changes = options_.maxBytes != 0 || options_.maxAge.count() != 0 || options_.keep != 0;
+    const bool changes = options_.maxBytes != 0 || options_.maxAge.nanoseconds() != 0 || options_.keep != 0;
     if (!files_.isNumbered() && changes)
     {
       return {TAV_RC_BAD_PARAM, "the file's name needs a %n, where the number of each file comes"};
@@ -165,7 +194,7 @@ public:
     {
       outcome = openNext();
     }
-    opened_ = Clock::now();
+    opened_ = korSteadyTime();
     return outcome;
   }
 
@@ -179,25 +208,26 @@ public:
   uint32_t syncNow() noexcept
   {
     const uint32_t rc = writer_ ? writer_->makeDurable() : TAV_RC_BAD_PARAM;
-    synced_ = rc == TAV_RC_OK ? Clock::now() : synced_;
+    synced_ = rc == TAV_RC_OK ? korSteadyTime() : synced_;
     return rc;
   }
 
   uint32_t beforeAdding() noexcept override
   {
-    const bool looks = options_.syncEvery && options_.syncEvery->count() > 0;
-    return looks && Clock::now() - std::max(synced_, opened_) >= *options_.syncEvery ? syncNow() : TAV_RC_OK;
+    const int64_t last = synced_ > opened_ ? synced_ : opened_;
+    const bool looks = options_.syncEvery && options_.syncEvery->nanoseconds() > 0;
+    return looks && korSteadyTime() - last >= options_.syncEvery->nanoseconds() ? syncNow() : TAV_RC_OK;
   }
   uint32_t afterRoot() noexcept override
   {
-    return options_.syncEvery && Clock::now() - synced_ >= *options_.syncEvery ? syncNow() : TAV_RC_OK;
+    return options_.syncEvery && korSteadyTime() - synced_ >= options_.syncEvery->nanoseconds() ? syncNow() : TAV_RC_OK;
   }
 
   std::optional<Writer>& writer() noexcept
   {
     return writer_;
   }
-  [[nodiscard]] std::filesystem::path path() const
+  [[nodiscard]] FilePath path() const
   {
     return files_.at(number_);
   }
@@ -206,7 +236,7 @@ private:
   [[nodiscard]] bool isDue() const noexcept
   {
     const bool isFull = options_.maxBytes != 0 && writer_->size() >= options_.maxBytes;
-    const bool isOld = options_.maxAge.count() != 0 && Clock::now() - begun_ >= options_.maxAge;
+    const bool isOld = options_.maxAge.nanoseconds() != 0 && korSteadyTime() - begun_ >= options_.maxAge.nanoseconds();
     return writer_->size() != 0 && files_.isNumbered() && (isFull || isOld || writer_->durable_.hasFailed());
   }
 
@@ -223,7 +253,7 @@ private:
     }
     writer_->state_->watch = options_.syncEvery ? this : nullptr;
     writer_->state_->settle();
-    begun_ = synced_ = Clock::now();
+    begun_ = synced_ = korSteadyTime();
     return outcome;
   }
 
@@ -258,9 +288,9 @@ private:
   StreamOptions stream_;
   std::optional<Writer> writer_;
   uint64_t number_ = 1;
-  Clock::time_point begun_{};  ///< when the file was opened
-  Clock::time_point opened_{}; ///< the last root
-  Clock::time_point synced_{};
+  int64_t begun_ = 0;  ///< when the file was opened
+  int64_t opened_ = 0; ///< the last root
+  int64_t synced_ = 0;
   bool isFinished_ = false;
 };
 
@@ -275,16 +305,16 @@ private:
 class Recorder
 {
 public:
-  explicit Recorder(const std::filesystem::path& path, const RecorderOptions& options = {},
+  explicit Recorder(const FilePath& path, const RecorderOptions& options = {},
                     const StreamOptions& stream = {})
-      : recording_(std::make_unique<detail::Recording>(path, options, stream))
+      : recording_(new detail::Recording(path, options, stream))
   {
     const detail::FileOutcome outcome = recording_->open();
     detail::demand(outcome.code, "recording into", [&] { return detail::tellFile(path, outcome); });
   }
-  Recorder(const std::filesystem::path& path, const RecorderOptions& options, const StreamOptions& stream,
+  Recorder(const FilePath& path, const RecorderOptions& options, const StreamOptions& stream,
            std::error_code& ec)
-      : recording_(std::make_unique<detail::Recording>(path, options, stream))
+      : recording_(new detail::Recording(path, options, stream))
   {
     detail::report(recording_->open().code, ec);
   }
@@ -330,9 +360,9 @@ public:
   }
 
   /// The file that the last root went to, or the next one does.
-  [[nodiscard]] std::filesystem::path path() const
+  [[nodiscard]] FilePath path() const
   {
-    return recording_ ? recording_->path() : std::filesystem::path();
+    return recording_ ? recording_->path() : FilePath("");
   }
 
 private:
@@ -346,7 +376,7 @@ private:
     return *recording_->writer();
   }
 
-  std::unique_ptr<detail::Recording> recording_;
+  detail::Owner<detail::Recording> recording_;
 };
 
 } // namespace tav

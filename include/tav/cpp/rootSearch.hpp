@@ -2,13 +2,13 @@
 /// Where the streams in a file begin: one root behind another, with zeros between them where a page was not full.
 #pragma once
 
-#include <algorithm>
 #include <array>
 #include <cstddef>
 #include <cstdint>
-#include <memory>
+#include <cstring>
 #include <new>
 
+#include "tav/cpp/owner.hpp"
 #include "tav/layout.hpp"
 
 namespace tav::detail
@@ -22,6 +22,12 @@ struct StreamForm
   bool aligned = false;
 };
 
+/// As std::min, whose header holds a hundred other algorithms.
+constexpr uint64_t lesser(uint64_t a, uint64_t b) noexcept
+{
+  return b < a ? b : a;
+}
+
 /// The bytes of an open file by offset, through a window: headers that stand near each other cost one read.
 class FileBytes
 {
@@ -33,7 +39,7 @@ public:
 
   uint32_t open() noexcept
   {
-    window_.reset(new (std::nothrow) uint8_t[kWindow]);
+    window_.reset(new (std::nothrow) Window);
     return window_ != nullptr ? file_.getSize(&size_) : TAV_RC_NO_MEMORY;
   }
   [[nodiscard]] uint64_t size() const noexcept
@@ -56,7 +62,7 @@ public:
         return rc;
       }
     }
-    bytes = window_.get() + (offset - from_);
+    bytes = window_->data() + (offset - from_);
     length = filled_ - (offset - from_);
     return TAV_RC_OK;
   }
@@ -75,8 +81,8 @@ public:
       {
         break;
       }
-      there = std::min(there, length - got);
-      std::copy_n(bytes, there, to + got);
+      there = lesser(there, length - got);
+      std::memcpy(to + got, bytes, static_cast<size_t>(there));
       got += there;
     }
     return rc;
@@ -84,6 +90,7 @@ public:
 
 private:
   static constexpr size_t kWindow = size_t{16} * 1024;
+  using Window = std::array<uint8_t, kWindow>;
 
   uint32_t fill(uint64_t offset) noexcept
   {
@@ -94,13 +101,13 @@ private:
     KORFileReadParam read;
     read.length = kWindow;
     uint32_t rc = file_.seek(&seek, nullptr);
-    rc = rc == TAV_RC_OK ? file_.read(&read, window_.get(), &filled_) : rc;
-    size_ = rc == TAV_RC_END_OF_STORAGE ? std::min(size_, offset + filled_) : size_;
+    rc = rc == TAV_RC_OK ? file_.read(&read, window_->data(), &filled_) : rc;
+    size_ = rc == TAV_RC_END_OF_STORAGE ? lesser(size_, offset + filled_) : size_;
     return rc == TAV_RC_END_OF_STORAGE ? TAV_RC_OK : rc;
   }
 
   KORHFile& file_;
-  std::unique_ptr<uint8_t[]> window_;
+  Owner<Window> window_;
   uint64_t size_ = 0;
   uint64_t from_ = 0;
   uint64_t filled_ = 0;
@@ -161,9 +168,10 @@ uint32_t skipZeros(Bytes& bytes, uint64_t offset, uint64_t& found) noexcept
       found = offset;
       return rc;
     }
-    const uint8_t* const first = std::find_if(piece, piece + length, [](uint8_t byte) { return byte != 0; });
-    offset += static_cast<uint64_t>(first - piece);
-    if (first != piece + length)
+    uint64_t zeros = 0;
+    while (zeros < length && piece[zeros] == 0) ++zeros;
+    offset += zeros;
+    if (zeros != length)
     {
       found = offset;
       return TAV_RC_OK;
@@ -291,7 +299,7 @@ private:
     uint64_t length = 0;
     rc = rc == TAV_RC_OK ? bytes_.view(first, rest, length) : rc;
     followed = rc == TAV_RC_OK && length == 0;
-    const uint64_t places = std::min(layout::kHeaderSize64, first - offset + 1);
+    const uint64_t places = lesser(layout::kHeaderSize64, first - offset + 1);
     for (uint64_t back = 0; rc == TAV_RC_OK && !followed && back < places; ++back)
     {
       TAVHeader root;

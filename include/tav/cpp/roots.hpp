@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstdint>
+#include <cstring>
 #include <system_error>
 #include <utility>
 
@@ -52,7 +53,7 @@ public:
       const uint8_t* bytes = nullptr;
       rc = view(offset + got, bytes, there);
       there = std::min(there, length - got);
-      std::copy_n(bytes, there, to + got);
+      std::memcpy(to + got, bytes, static_cast<size_t>(there));
     }
     return rc;
   }

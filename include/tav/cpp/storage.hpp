@@ -2,11 +2,9 @@
 /// What readers and writers sit on: options, handles, and a block that grows.
 #pragma once
 
-#include <algorithm>
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
-#include <memory>
 #include <new>
 #include <utility>
 
@@ -86,7 +84,8 @@ private:
     {
       return TAV_RC_NO_MEMORY;
     }
-    const uint64_t size = std::max(more, 2 * storage_.bufferSize);
+    const uint64_t twice = 2 * storage_.bufferSize;
+    const uint64_t size = more > twice ? more : twice;
     auto* const block = static_cast<uint8_t*>(::operator new(static_cast<size_t>(size), std::nothrow));
     if (block == nullptr)
     {

@@ -5,6 +5,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
+#include <string>
 #include <string_view>
 
 namespace tav::detail
@@ -73,6 +74,21 @@ inline bool isUtf8(std::string_view text) noexcept
     text.remove_prefix(length);
   }
   return true;
+}
+
+/// A number in hexadecimal, its digits of the caller's case.
+inline std::string hexDigits(uint64_t number, const char* digits)
+{
+  std::string text;
+  for (unsigned shift = 64; shift != 0; shift -= 4)
+  {
+    const uint64_t rest = number >> (shift - 4);
+    if (rest != 0 || shift == 4)
+    {
+      text += digits[rest & 0xFU];
+    }
+  }
+  return text;
 }
 
 } // namespace tav::detail

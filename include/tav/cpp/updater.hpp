@@ -4,8 +4,6 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <filesystem>
-#include <memory>
 #include <span>
 
 #include "tav/cpp/encode.hpp"
@@ -91,16 +89,16 @@ public:
   /// In a file, through a ring: a change is in the file after finish(), and a reader that has a ring of its own may
   /// show the old value until it is opened again. An element larger than the ring gives TAV_RC_DATA_TOO_LARGE.
   /// A file that a writer has locked is refused with KOR_RC_LOCKED; of the file options `lock` counts.
-  explicit Updater(const std::filesystem::path& path, const StreamOptions& options = {}, const FileOptions& file = {})
+  explicit Updater(const FilePath& path, const StreamOptions& options = {}, const FileOptions& file = {})
   {
     const detail::FileOutcome opened = openPath(path, options, file);
     detail::demand(opened.code, "opening for updating", [&] { return detail::tellFile(path, opened); });
   }
-  Updater(const std::filesystem::path& path, const StreamOptions& options, std::error_code& ec)
+  Updater(const FilePath& path, const StreamOptions& options, std::error_code& ec)
       : Updater(path, options, FileOptions{}, ec)
   {
   }
-  Updater(const std::filesystem::path& path, const StreamOptions& options, const FileOptions& file,
+  Updater(const FilePath& path, const StreamOptions& options, const FileOptions& file,
           std::error_code& ec)
   {
     detail::report(openPath(path, options, file).code, ec);
@@ -169,14 +167,14 @@ private:
 
   uint32_t openBlock(std::span<std::byte> block, const StreamOptions& options)
   {
-    owned_ = std::make_unique<TAVSSMemory>(block.data(), block.size());
+    owned_.reset(new TAVSSMemory(block.data(), block.size()));
     return block.empty() ? TAV_RC_BAD_PARAM : open(owned_.get(), options);
   }
 
-  detail::FileOutcome openPath(const std::filesystem::path& path, const StreamOptions& options,
+  detail::FileOutcome openPath(const FilePath& path, const StreamOptions& options,
                                const FileOptions& file)
   {
-    std::unique_ptr<TAVSSFile> storage;
+    detail::Owner<TAVSSFile> storage;
     const detail::FileOutcome opened = detail::openLocked(path, KOR_FILE_UPDATE, file.lock, storage);
     owned_ = std::move(storage);
     return opened.code != TAV_RC_OK ? opened : detail::FileOutcome{open(owned_.get(), options)};
@@ -191,7 +189,7 @@ private:
     return handle_->pCircularBuf != nullptr ? handle_->pCircularBuf->reset() : TAV_RC_OK;
   }
 
-  std::unique_ptr<TAVSideStorage> owned_;
+  detail::Owner<TAVSideStorage> owned_;
   TAVHandle* handle_ = nullptr;
 };
 

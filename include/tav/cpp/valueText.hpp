@@ -3,7 +3,6 @@
 #pragma once
 
 #include <array>
-#include <chrono>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -82,7 +81,6 @@ inline void appendHex(std::string& to, const uint8_t* bytes, size_t size)
 /// A moment with the offset of its time zone: "2024-05-01T12:20:30.123456+02:00"; of a year beyond 9999 the seconds.
 inline std::string timeText(const TAVTimeStamp& stamp)
 {
-  using namespace std::chrono;
   constexpr uint64_t endOf9999 = 253402300800;
   constexpr uint64_t million = 1'000'000;
   // Each fraction holds more than its unit needs: what is above a second belongs to the seconds.
@@ -92,15 +90,15 @@ inline std::string timeText(const TAVTimeStamp& stamp)
   {
     return std::to_string(stamp.seconds) + " s";
   }
-  const sys_seconds time{seconds(static_cast<int64_t>(stamp.seconds) + shift)};
-  const sys_days day = floor<days>(time);
-  const year_month_day date{day};
-  const hh_mm_ss<seconds> clock{time - day};
+  constexpr int64_t daySeconds = 24 * 60 * 60;
+  const int64_t seconds = static_cast<int64_t>(stamp.seconds) + shift;
+  const int64_t days = (seconds >= 0 ? seconds : seconds - (daySeconds - 1)) / daySeconds;
+  const auto clock = static_cast<uint32_t>(seconds - days * daySeconds);
+  const Date date = dateOf(days);
   const auto east = static_cast<unsigned>(std::abs(int{stamp.offsetMinutes}));
   std::array<char, 64> text{};
-  std::snprintf(text.data(), text.size(), "%04d-%02u-%02uT%02d:%02d:%02d.%06u%c%02u:%02u", int{date.year()},
-                unsigned{date.month()}, unsigned{date.day()}, static_cast<int>(clock.hours().count()),
-                static_cast<int>(clock.minutes().count()), static_cast<int>(clock.seconds().count()),
+  std::snprintf(text.data(), text.size(), "%04d-%02u-%02uT%02u:%02u:%02u.%06u%c%02u:%02u", static_cast<int>(date.year),
+                date.month, date.day, clock / 3600, clock / 60 % 60, clock % 60,
                 static_cast<unsigned>(fraction % million), stamp.offsetMinutes < 0 ? '-' : '+', east / 60, east % 60);
   return text.data();
 }
@@ -159,11 +157,11 @@ std::string numberText(const RawValue& raw)
 
 inline std::string wordsText(const RawValue& raw)
 {
-  std::vector<uint64_t> words;
-  static_cast<void>(decode(raw, words));
   std::string text;
-  for (const uint64_t word : words)
+  for (uint64_t at = 0; at < raw.size; at += sizeof(uint64_t))
   {
+    uint64_t word = 0;
+    static_cast<void>(decode(RawValue{TAV_TYPE_UINT64, raw.bytes + at, sizeof word, raw.swap}, word));
     text += std::to_string(word);
   }
   return text;

@@ -2,7 +2,6 @@
 /// Values of the stream as C++ types.
 #pragma once
 
-#include <chrono>
 #include <compare>
 #include <concepts>
 #include <cstddef>
@@ -12,6 +11,7 @@
 #include <string_view>
 #include <type_traits>
 
+#include "tav/cpp/time.hpp"
 #include "tav/layout.hpp"
 
 namespace tav
@@ -129,11 +129,6 @@ concept StreamInteger = std::integral<T> && !std::same_as<T, bool> && !detail::C
 namespace detail
 {
 
-template<class T>
-inline constexpr bool isSysTime = false;
-template<class Duration>
-inline constexpr bool isSysTime<std::chrono::sys_time<Duration>> = true;
-
 // A null pointer constant converts to every view.
 template<class T>
 concept Text = std::convertible_to<const T&, std::string_view> && !std::same_as<T, std::nullptr_t>;
@@ -147,7 +142,7 @@ concept WordsView = std::convertible_to<const T&, std::span<const uint64_t>>;
 /// What can be added.
 template<class T>
 concept Addable = StreamInteger<T> || std::same_as<T, std::byte> || std::same_as<T, Utf8> ||
-    std::same_as<T, Utf8Text> || Integer128<T> || std::same_as<T, TAVTimeStamp> || isSysTime<T> || Text<T> ||
+    std::same_as<T, Utf8Text> || Integer128<T> || std::same_as<T, TAVTimeStamp> || SysTime<T> || Text<T> ||
     Utf8View<T> || BytesView<T> || WordsView<T>;
 
 /// Whether a value leads into memory that is not its own.

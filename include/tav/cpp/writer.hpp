@@ -4,8 +4,6 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <filesystem>
-#include <memory>
 #include <span>
 #include <utility>
 
@@ -57,22 +55,22 @@ public:
   /// With FileOptions::append it goes on behind the last stream of an existing file, in that file's form: options that
   /// are given must agree with it. A file of another form, a damaged one or one that is no stream is refused, and stays
   /// as it is. See docs/producers.md for what is looked at, and what that costs.
-  explicit Writer(const std::filesystem::path& path, const FileOptions& file = {})
+  explicit Writer(const FilePath& path, const FileOptions& file = {})
       : Writer(Unopened::state)
   {
     demandPath(path, file, nullptr);
   }
-  explicit Writer(const std::filesystem::path& path, const FileOptions& file, const StreamOptions& options)
+  explicit Writer(const FilePath& path, const FileOptions& file, const StreamOptions& options)
       : Writer(Unopened::state)
   {
     demandPath(path, file, &options);
   }
-  Writer(const std::filesystem::path& path, const FileOptions& file, std::error_code& ec)
+  Writer(const FilePath& path, const FileOptions& file, std::error_code& ec)
       : Writer(Unopened::state)
   {
     detail::report(openPath(path, file, nullptr).code, ec);
   }
-  Writer(const std::filesystem::path& path, const FileOptions& file, const StreamOptions& options, std::error_code& ec)
+  Writer(const FilePath& path, const FileOptions& file, const StreamOptions& options, std::error_code& ec)
       : Writer(Unopened::state)
   {
     detail::report(openPath(path, file, &options).code, ec);
@@ -255,27 +253,27 @@ private:
 
   uint32_t openBuffer(const StreamOptions& options)
   {
-    state_->block = std::make_unique<detail::GrowingBlock>();
+    state_->block.reset(new detail::GrowingBlock);
     const uint32_t rc = state_->block->reserve(nullptr, 0, 0);
     return rc != TAV_RC_OK ? rc : open(&state_->block->storage(), options);
   }
 
   uint32_t openBlock(std::span<std::byte> block, const StreamOptions& options)
   {
-    state_->owned = std::make_unique<TAVSSMemory>(block.data(), block.size());
+    state_->owned.reset(new TAVSSMemory(block.data(), block.size()));
     return block.empty() ? TAV_RC_BAD_PARAM : open(state_->owned.get(), options);
   }
 
-  void demandPath(const std::filesystem::path& path, const FileOptions& file, const StreamOptions* options)
+  void demandPath(const FilePath& path, const FileOptions& file, const StreamOptions* options)
   {
     const detail::FileOutcome opened = openPath(path, file, options);
     detail::demand(opened.code, "opening for writing", [&] { return detail::tellFile(path, opened); });
   }
 
   /// Behind the last stream of a file.
-  detail::FileOutcome openEnd(const std::filesystem::path& path, const FileOptions& file, const StreamOptions* given)
+  detail::FileOutcome openEnd(const FilePath& path, const FileOptions& file, const StreamOptions* given)
   {
-    std::unique_ptr<TAVSSFile> storage;
+    detail::Owner<TAVSSFile> storage;
     detail::FileEnd found = detail::openToAppend(path, file, given, storage);
     state_->owned = std::move(storage);
     if (found.outcome.code != TAV_RC_OK)
@@ -303,14 +301,14 @@ private:
     return found.outcome;
   }
 
-  detail::FileOutcome openPath(const std::filesystem::path& path, const FileOptions& file, const StreamOptions* given)
+  detail::FileOutcome openPath(const FilePath& path, const FileOptions& file, const StreamOptions* given)
   {
     if (file.append)
     {
       return openEnd(path, file, given);
     }
     const StreamOptions options = given != nullptr ? *given : StreamOptions{};
-    std::unique_ptr<TAVSSFile> storage;
+    detail::Owner<TAVSSFile> storage;
     const detail::FileOutcome opened = detail::openForWriting(path, file, storage, state_->replacement);
     state_->owned = std::move(storage);
     if (state_->replacement == nullptr)

@@ -4,7 +4,6 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <memory>
 #include <span>
 #include <utility>
 
@@ -71,9 +70,9 @@ struct WriterState
 
   uint32_t users = 1;
   TAVHandle* handle = nullptr;
-  std::unique_ptr<Replacement> replacement; ///< a file that stays until the stream is complete
-  std::unique_ptr<TAVSideStorage> owned;
-  std::unique_ptr<GrowingBlock> block;
+  Owner<Replacement> replacement; ///< a file that stays until the stream is complete
+  Owner<TAVSideStorage> owned;
+  Owner<GrowingBlock> block;
   Width root = Width::bits64;
   uint32_t fast = kNoLevel;            ///< level of a group that takes 64-bit nodes without a further look
   uint32_t innermost = 0;              ///< level of the innermost Group that is there and open; 1 for the root
