@@ -174,7 +174,8 @@ TAV_CONSTANT uint32_t TAV_CREATE_OVERWRITE = 2; ///< take the place of a file, w
 ///
 /// @param[out] out  the writer, the caller's until tav_finish or tav_discard; null after a failure
 /// @retval TAV_RC_BAD_PARAM    a value in `form` that is none
-/// @retval TAV_RC_BAD_OPTIONS  other flags
+/// @retval TAV_RC_BAD_OPTIONS  other flags; a file to go on in that has another form
+/// @retval TAV_RC_NOT_FOUND    a file to go on in that is no stream; a damaged one has the code of its damage
 TAV_C_API uint32_t tav_create_file(const char* path, const tav_form* form, uint32_t flags, tav_writer** out);
 
 /// A stream in memory, which grows.

@@ -3,11 +3,9 @@
 #include <cstdlib>
 #include <cstring>
 #include <deque>
-#include <filesystem>
 #include <memory>
 #include <string_view>
 
-#include "inspect/c/durable.h"
 #include "inspect/c/reader.h"
 
 using namespace tav;
@@ -40,6 +38,11 @@ StreamOptions optionsOf(const FormChoice& form)
   options.root = form.root64.value_or(true) ? Width::bits64 : Width::bits32;
   options.align8 = form.aligned.value_or(false);
   return options;
+}
+
+bool isGiven(const tav_form* form)
+{
+  return form != nullptr && (form->byte_order != 0 || form->root_bits != 0 || form->aligned != 0);
 }
 
 /// Makes a writer with what `open` puts into it.
@@ -133,14 +136,11 @@ uint32_t tav_create_file(const char* path, const tav_form* form, uint32_t flags,
     {
       return uint32_t{TAV_RC_BAD_OPTIONS};
     }
-    const std::u8string name(path, path + std::strlen(path));
+    const FileOptions file{.overwrite = flags == TAV_CREATE_OVERWRITE, .append = flags == TAV_CREATE_APPEND};
     made.isFile = true;
-    if (flags == TAV_CREATE_APPEND)
-    {
-      return openToAppend(name, options, made.writer);
-    }
-    made.writer = std::make_unique<Writer>(std::filesystem::path(name),
-                                           FileOptions{.overwrite = flags == TAV_CREATE_OVERWRITE}, options);
+    // Without options a file that is gone on with has the form that it has.
+    made.writer = file.append && !isGiven(form) ? std::make_unique<Writer>(path, file)
+                                                : std::make_unique<Writer>(path, file, options);
     return uint32_t{TAV_RC_OK};
   });
 }
@@ -233,14 +233,22 @@ uint32_t tav_add_time(tav_writer* writer, uint16_t elm, int64_t nanoseconds)
 uint32_t tav_flush(tav_writer* writer)
 {
   return with(writer, [](tav_writer& open) {
-    return open.isFile ? flush(*open.writer) : uint32_t{TAV_RC_OK};
+    if (open.isFile)
+    {
+      open.writer->flush();
+    }
+    return uint32_t{TAV_RC_OK};
   });
 }
 
 uint32_t tav_sync(tav_writer* writer)
 {
   return with(writer, [](tav_writer& open) {
-    return open.isFile ? sync(*open.writer) : uint32_t{TAV_RC_OK};
+    if (open.isFile)
+    {
+      open.writer->sync();
+    }
+    return uint32_t{TAV_RC_OK};
   });
 }
 

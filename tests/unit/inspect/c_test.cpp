@@ -41,7 +41,7 @@ void writeFile(const std::filesystem::path& path, const Bytes& bytes)
 Reader openFile(const std::filesystem::path& path, const tav_form* form = nullptr)
 {
   tav_reader* reader = nullptr;
-  EXPECT_EQ(tav_open_file(tav::detail::fileText(path).c_str(), form, &reader), TAV_RC_OK);
+  EXPECT_EQ(tav_open_file(tav::FilePath(path).text().c_str(), form, &reader), TAV_RC_OK);
   return {reader, &tav_close};
 }
 
@@ -468,7 +468,7 @@ TEST(C, RefusesToOpenWhatIsNoStream)
     EXPECT_EQ(tav_create_file("x", &bad, 0, &writer), TAV_RC_BAD_PARAM);
   }
   const test::TemporaryPath file;
-  EXPECT_EQ(tav_open_file(tav::detail::fileText(file.path).c_str(), nullptr, &reader), KOR_RC_NO_SUCH_FILE);
+  EXPECT_EQ(tav_open_file(tav::FilePath(file.path).text().c_str(), nullptr, &reader), KOR_RC_NO_SUCH_FILE);
 }
 
 TEST(C, ReadsElementsThatAreLargerThanTheWindow)
@@ -476,7 +476,7 @@ TEST(C, ReadsElementsThatAreLargerThanTheWindow)
   const test::TemporaryPath file;
   const std::string large(size_t{11} << 20U, 'a');
   tav_writer* writer = nullptr;
-  ASSERT_EQ(tav_create_file(tav::detail::fileText(file.path).c_str(), nullptr, 0, &writer), TAV_RC_OK);
+  ASSERT_EQ(tav_create_file(tav::FilePath(file.path).text().c_str(), nullptr, 0, &writer), TAV_RC_OK);
   EXPECT_EQ(tav_begin(writer, TAV_ELM_CMN_SYSTEM, 0), TAV_RC_OK);
   EXPECT_EQ(tav_add_text(writer, TAV_ELM_CMN_HOST_NAME, large.data(), large.size()), TAV_RC_OK);
   EXPECT_EQ(tav_add_u32(writer, TAV_ELM_CMN_CPU_ONLINE, 7), TAV_RC_OK);
@@ -571,7 +571,7 @@ TEST(C, KeepsAFileThatIsNotToBeOverwritten)
 {
   const test::TemporaryPath file;
   writeFile(file.path, {1, 2, 3});
-  const std::string path = tav::detail::fileText(file.path);
+  const std::string path = tav::FilePath(file.path).text();
   tav_writer* writer = nullptr;
   EXPECT_EQ(tav_create_file(path.c_str(), nullptr, 0, &writer), KOR_RC_FILE_EXISTS);
   EXPECT_EQ(writer, nullptr);
@@ -589,6 +589,33 @@ TEST(C, KeepsAFileThatIsNotToBeOverwritten)
   EXPECT_EQ(bytes, nullptr);
   EXPECT_EQ(size, 0U);
   EXPECT_NE(openFile(file.path), nullptr);
+}
+
+TEST(C, GoesOnInAFileInTheFormThatItHas)
+{
+  const test::TemporaryPath file;
+  const std::string path = tav::FilePath(file.path).text();
+  const tav_form narrow{test::kBigEndianHost ? uint8_t{1} : uint8_t{2}, 32, 1};
+  tav_writer* writer = nullptr;
+  for (const tav_form* const form : {&narrow, static_cast<const tav_form*>(nullptr), &narrow})
+  {
+    ASSERT_EQ(tav_create_file(path.c_str(), form, TAV_CREATE_APPEND, &writer), TAV_RC_OK);
+    EXPECT_EQ(tav_begin(writer, TAV_ELM_CMN_SYSTEM, 0), TAV_RC_OK);
+    EXPECT_EQ(tav_add_u32(writer, TAV_ELM_CMN_CPU_ONLINE, 8), TAV_RC_OK);
+    EXPECT_EQ(tav_flush(writer), TAV_RC_OK) << tav_writer_message(writer);
+    EXPECT_EQ(tav_sync(writer), TAV_RC_OK) << tav_writer_message(writer);
+    EXPECT_EQ(tav_end(writer), TAV_RC_OK);
+    ASSERT_EQ(tav_finish(&writer, nullptr, nullptr), TAV_RC_OK);
+  }
+  const auto written = std::filesystem::file_size(file.path);
+  EXPECT_EQ(tav_create_file(path.c_str(), &kNative, TAV_CREATE_APPEND, &writer), TAV_RC_BAD_OPTIONS);
+  EXPECT_EQ(std::filesystem::file_size(file.path), written);
+
+  const Reader reader = openFile(file.path, &narrow);
+  tav_node root{};
+  unsigned roots = 0;
+  for (const tav_node* last = nullptr; tav_next_root(reader.get(), last, &root) == TAV_RC_OK; last = &root) ++roots;
+  EXPECT_EQ(roots, 3U);
 }
 
 TEST(C, KnowsTheNames)
