@@ -40,7 +40,8 @@ typedef struct tav_reader tav_reader;
 typedef struct tav_writer tav_writer;
 
 /// How a stream is laid out. All zeros: a reader finds it out; a writer writes in this machine's byte order with a
-/// 64-bit root header and no padding, and goes on in a file in the form that the file has.
+/// 64-bit root header and no padding, and goes on in a file in the form that the file has; a form that is given at all
+/// has to agree with that as a whole.
 typedef struct tav_form
 {
   uint8_t byte_order; ///< 1 little-endian, 2 big-endian

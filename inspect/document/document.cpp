@@ -120,7 +120,6 @@ Document::Document(const std::filesystem::path& path, const DocumentOptions& opt
 Document::Document(std::span<const std::byte> bytes, const DocumentOptions& options)
 {
   const std::span<const uint8_t> all(reinterpret_cast<const uint8_t*>(bytes.data()), bytes.size());
-  const ByteSource whole("memory", all);
   if (options.from > all.size())
   {
     throw Error(Problem{.file = "memory", .offset = options.from, .sentence = "lies behind the end of the bytes"});

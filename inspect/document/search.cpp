@@ -10,7 +10,7 @@ namespace tav::inspect
 namespace
 {
 
-Path pathOf(std::string_view text)
+Path parsed(std::string_view text)
 {
   Path path(text);
   path.requireNames();
@@ -42,7 +42,7 @@ Search::Search(DocumentState& state, const SearchStart& start, std::string_view 
 }
 
 Search::Search(DocumentState& state, const SearchStart& start, bool isBelow, std::string_view path, OnDamage onDamage)
-    : state_(state), path_(pathOf(path)), matcher_(path_), onDamage_(onDamage),
+    : state_(state), path_(parsed(path)), matcher_(path_), onDamage_(onDamage),
       walk_(
           *state.source, isBelow ? formOf(start) : state.recognition.form,
           [this](const PassedOver& passed) { passOver(passed); }, isBelow ? startAt(start.node) : WalkStart{}),

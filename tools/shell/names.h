@@ -2,11 +2,8 @@
 /// The program is a shell around the inspection library and uses its names as its own.
 #pragma once
 
-namespace tav::inspect
-{
-struct Node;
-class Path;
-} // namespace tav::inspect
+#include "tav/inspect/node.hpp"
+#include "tav/inspect/path.hpp"
 
 namespace tav::tool
 {

@@ -129,7 +129,7 @@ TEST(C, KeepsAFileThatIsNotToBeOverwritten)
   EXPECT_NE(openFile(file.path), nullptr);
 }
 
-TEST(CWriter, GoesOnInAFileInTheFormThatItHas)
+TEST(C, GoesOnInAFileInTheFormThatItHas)
 {
   const test::TemporaryPath file;
   const std::string path = tav::FilePath(file.path).text();
@@ -149,7 +149,7 @@ TEST(CWriter, GoesOnInAFileInTheFormThatItHas)
   EXPECT_EQ(tav_create_file(path.c_str(), &kNative, TAV_CREATE_APPEND, &writer), TAV_RC_BAD_OPTIONS);
   EXPECT_EQ(std::filesystem::file_size(file.path), written);
 
-  const Reader reader = openFile(file.path, &narrow);
+  const CReader reader = openFile(file.path, &narrow);
   tav_node root{};
   unsigned roots = 0;
   for (const tav_node* last = nullptr; tav_next_root(reader.get(), last, &root) == TAV_RC_OK; last = &root) ++roots;

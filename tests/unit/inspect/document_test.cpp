@@ -200,6 +200,19 @@ TEST_P(TestDocument, ReadsEveryStreamInItsOwnForm)
   }
 }
 
+TEST_P(TestDocument, LeavesOutWhatStandsBefore)
+{
+  const Document document = open(Bytes(100, 0xAB) + hosts({{"ada", 8}, {"grace", 16}}), {.from = 100});
+  std::vector<uint64_t> places;
+  for (const tav::Node& root : document.roots())
+  {
+    places.push_back(root.offset());
+  }
+  EXPECT_THAT(places, ElementsAre(0));
+  EXPECT_THAT(texts(document.find("/system/host/hostName")), ElementsAre("ada", "grace"));
+  EXPECT_EQ(problemOf([&] { static_cast<void>(open(Bytes(10), {.from = 11})); }).code, TAV_RC_BAD_PARAM);
+}
+
 TEST_P(TestDocument, FindsFromANodeInItsStreamsForm)
 {
   const Bytes first = hosts({{"ada", 8}});
