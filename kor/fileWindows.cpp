@@ -42,6 +42,16 @@ HANDLE createFile(const std::wstring& path, const OpenMode& mode)
   return CreateFileW(path.c_str(), access, sharing, nullptr, disposition, FILE_ATTRIBUTE_NORMAL, nullptr);
 }
 
+/// What is locked: one byte that no file has. Here a lock keeps others from reading what it covers, and readers of a
+/// file that is written need none. It meets the locks of all bytes that came before it.
+OVERLAPPED lockedPlace()
+{
+  OVERLAPPED place{};
+  place.Offset = ULONG_MAX - 1;
+  place.OffsetHigh = LONG_MAX;
+  return place;
+}
+
 DWORD transferSize(std::size_t length)
 {
   return length < ULONG_MAX ? static_cast<DWORD>(length) : ULONG_MAX;
@@ -123,16 +133,15 @@ uint32_t lockNative(intptr_t file, bool exclusive, bool wait, bool held)
     const uint32_t code = unlockNative(file);
     if (code != TAV_RC_OK) return code;
   }
-  OVERLAPPED start{};
+  OVERLAPPED place = lockedPlace();
   const DWORD flags = (exclusive ? LOCKFILE_EXCLUSIVE_LOCK : 0) | (wait ? 0 : LOCKFILE_FAIL_IMMEDIATELY);
-  return LockFileEx(handleOf(file), flags, 0, ULONG_MAX, ULONG_MAX, &start) ? TAV_RC_OK
-                                                                            : codeOfSystemError(GetLastError());
+  return LockFileEx(handleOf(file), flags, 0, 1, 0, &place) ? TAV_RC_OK : codeOfSystemError(GetLastError());
 }
 
 uint32_t unlockNative(intptr_t file)
 {
-  OVERLAPPED start{};
-  return UnlockFileEx(handleOf(file), 0, ULONG_MAX, ULONG_MAX, &start) ? TAV_RC_OK : codeOfSystemError(GetLastError());
+  OVERLAPPED place = lockedPlace();
+  return UnlockFileEx(handleOf(file), 0, 1, 0, &place) ? TAV_RC_OK : codeOfSystemError(GetLastError());
 }
 
 uint32_t sizeNative(intptr_t file, uint64_t& size)

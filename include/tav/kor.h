@@ -234,7 +234,7 @@ public:
   uint32_t write(const KORFileWriteParam* pParam, uint64_t* pDone);
   /// Positions the file; `*pNewPosition` (may be null) tells where it stands.
   uint32_t seek(const KORFileSeekParam* pParam, uint64_t* pNewPosition);
-  /// Locks the whole file against other processes and other open files.
+  /// Locks the file against the locks of other processes and other open files. Nobody is kept from reading it.
   uint32_t lock(const KORFileLockParam* pParam);
   /// Gives the lock back. @retval KOR_RC_NOT_LOCKED
   uint32_t unlock();

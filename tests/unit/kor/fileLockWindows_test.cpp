@@ -39,6 +39,13 @@ TEST_F(FileLock, KeepsAnotherOpenFileOut)
   EXPECT_EQ(lockFile(other_, kShared, kDoNotWait), KOR_RC_LOCKED);
 }
 
+TEST_F(FileLock, LetsOthersReadAndTheOwnerWrite)
+{
+  ASSERT_EQ(lockFile(file_, kExclusive, kDoNotWait), TAV_RC_OK);
+  EXPECT_EQ(writeFile(file_, "content"), (Transfer{TAV_RC_OK, 7}));
+  EXPECT_EQ(readText(other_, 7), "content");
+}
+
 TEST_F(FileLock, UnlockLetsAnotherOpenFileIn)
 {
   ASSERT_EQ(lockFile(file_, kExclusive, kDoNotWait), TAV_RC_OK);
