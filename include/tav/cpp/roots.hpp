@@ -52,7 +52,7 @@ public:
     {
       const uint8_t* bytes = nullptr;
       rc = view(offset + got, bytes, there);
-      there = std::min(there, length - got);
+      there = lesser(there, length - got);
       std::memcpy(to + got, bytes, static_cast<size_t>(there));
     }
     return rc;
