@@ -209,7 +209,7 @@ TEST_P(LayerAppend, ClosesWhatAKilledWriterLeftWhereverItWasCut)
   const Bytes before = bytesOf(whole.bytes());
   for (size_t size = 1; size <= all.size(); size += size + 40 < all.size() ? 5 : 1)
   {
-    for (const size_t zeros : {0, 1, 5000})
+    for (const size_t zeros : std::initializer_list<size_t>{0, 1, 5000})
     {
       if (zeros != 0 && size != all.size())
       {

@@ -102,7 +102,7 @@ TEST_P(LayerRoots, OfNothingAreNone)
 TEST_P(LayerRoots, FollowEachOtherWithAnyNumberOfZerosBetween)
 {
   const std::vector<size_t> payloads{1, 0, 2, 240, 256, 65536, 131074 - 16, 131074 - 8, 0, 512};
-  for (const size_t zeros : {0, 1, 7, 8, 12, 13, 16, 100, 5000})
+  for (const size_t zeros : std::initializer_list<size_t>{0, 1, 7, 8, 12, 13, 16, 100, 5000})
   {
     SCOPED_TRACE(zeros);
     content_.clear();
