@@ -82,10 +82,11 @@ void ByteSource::startAt()
 }
 
 ByteSource::ByteSource(std::string name, std::span<const uint8_t> bytes)
-    : name_(std::move(name)), memory_(bytes), size_(bytes.size()), maxPages_(0)
+    : name_(std::move(name)),
+      // It takes bytes that can be written; a handle that reads leaves them alone.
+      storage_(std::make_unique<TAVSSMemory>(const_cast<uint8_t*>(bytes.data()), bytes.size())),
+      memory_(bytes), size_(bytes.size()), maxPages_(0)
 {
-  // A storage over memory takes bytes that can be written; a handle that reads leaves them alone.
-  storage_ = std::make_unique<TAVSSMemory>(const_cast<uint8_t*>(bytes.data()), bytes.size());
 }
 
 ByteSource::~ByteSource() = default;
