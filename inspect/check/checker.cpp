@@ -8,7 +8,6 @@
 #include "inspect/text/scan.h"
 #include "inspect/walk/prober.h"
 #include "inspect/walk/sizeSuits.h"
-#include "tav/inspect/form.hpp"
 #include "tav/inspect/phrases.hpp"
 #include "tav/inspect/value.hpp"
 

@@ -171,7 +171,7 @@ std::string JsonParser::readString()
   std::string text;
   for (int c = peek(); c != '"'; c = peek())
   {
-    if (c == Traits::eof() || c < 0x20)
+    if (c < 0x20) // a control character, or the end, which is below zero
     {
       fail(c == Traits::eof() ? "the end of a string"
                               : "a character of a string; control characters are written as \\u00..");
@@ -199,7 +199,8 @@ void JsonParser::readEscape(std::string& text)
   static constexpr std::string_view letters = "\"\\/bfnrt";
   static constexpr std::string_view characters = "\"\\/\b\f\n\r\t";
   const int c = peek();
-  if (const size_t at = c == Traits::eof() ? letters.npos : letters.find(Traits::to_char_type(c)); at != letters.npos)
+  constexpr size_t none = std::string_view::npos;
+  if (const size_t at = c == Traits::eof() ? none : letters.find(Traits::to_char_type(c)); at != none)
   {
     text_.sbumpc();
     text += characters[at];
