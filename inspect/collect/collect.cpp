@@ -245,7 +245,7 @@ void Collector::addFound(ByteSource& source, const Form& form, const Path& path,
     }
     if (!top && event.what == What::nodeBegin)
     {
-      if (selection.at(event.node))
+      if (selection.at(walker, event))
       {
         requireGroup(source, walker, event);
         top = event.depth;
@@ -263,7 +263,7 @@ void Collector::addFound(ByteSource& source, const Form& form, const Path& path,
   }
   if (selection.found(0) == 0)
   {
-    throw Error(path.noMatch(source.name()), Trouble::notFound);
+    throw Error(noMatch(path, source.name()), Trouble::notFound);
   }
 }
 

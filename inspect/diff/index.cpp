@@ -66,10 +66,10 @@ void DiffIndex::walk(const DiffInput& input, const DiffOptions& options,
   {
     seen(walker, event);
     const bool begins = event.what == What::nodeBegin && ignoredDepth_ == kNoRow;
-    const bool ignore = begins && ignored.at(event.node).has_value();
+    const bool ignore = begins && ignored.at(walker, event).has_value();
     if (wanted && !top)
     {
-      if (!begins || !wanted->at(event.node))
+      if (!begins || !wanted->at(walker, event))
       {
         begins&& event.node.isGroup() && !wanted->reachesBelow() ? void(walker.skip()) : void();
         continue;
@@ -85,7 +85,7 @@ void DiffIndex::walk(const DiffInput& input, const DiffOptions& options,
   }
   if (wanted && !top)
   {
-    throw Error(input.path->noMatch(source_.name()), Trouble::notFound);
+    throw Error(noMatch(*input.path, source_.name()), Trouble::notFound);
   }
 }
 

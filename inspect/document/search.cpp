@@ -10,13 +10,6 @@ namespace tav::inspect
 namespace
 {
 
-Path parsed(std::string_view text)
-{
-  Path path(text);
-  path.requireNames();
-  return path;
-}
-
 WalkStart startAt(const TAVHeader& node)
 {
   return {.offset = node.nodeOffset, .wide = layout::is64(node)};
@@ -32,17 +25,27 @@ Form formOf(const SearchStart& start)
 } // namespace
 
 Search::Search(DocumentState& state, std::string_view path, OnDamage onDamage)
-    : Search(state, {}, false, path, onDamage)
+    : Search(state, {}, false, pathOf(path), PathMatcher(pathOf(path)), onDamage)
 {
 }
 
 Search::Search(DocumentState& state, const SearchStart& start, std::string_view path, OnDamage onDamage)
-    : Search(state, start, !path.starts_with('/'), path, onDamage)
+    : Search(state, start, pathOf(path), onDamage)
 {
 }
 
-Search::Search(DocumentState& state, const SearchStart& start, bool isBelow, std::string_view path, OnDamage onDamage)
-    : state_(state), path_(parsed(path)), matcher_(path_), onDamage_(onDamage),
+/// Most paths lead down: then the walk begins at the node.
+Search::Search(DocumentState& state, const SearchStart& start, Path path, OnDamage onDamage)
+    : Search(state, start, !PathMatcher::leavesStart(path), path,
+             PathMatcher::leavesStart(path) ? PathMatcher(path, *state.source, start.form, start.node.nodeOffset)
+                                            : PathMatcher::below(path),
+             onDamage)
+{
+}
+
+Search::Search(DocumentState& state, const SearchStart& start, bool isBelow, Path path, PathMatcher matcher,
+               OnDamage onDamage)
+    : state_(state), path_(std::move(path)), matcher_(std::move(matcher)), onDamage_(onDamage),
       walk_(
           *state.source, isBelow ? formOf(start) : state.recognition.form,
           [this](const PassedOver& passed) { passOver(passed); }, isBelow ? startAt(start.node) : WalkStart{}),
@@ -84,24 +87,17 @@ bool Search::next()
     const auto depth = static_cast<size_t>(event_.depth);
     around_.resize(depth);
     around_.push_back(event_.node.header);
-    if (!isOuter && isMatch())
+    if (matcher_.matches(walk_.walker(), event_))
     {
       return true;
     }
-    if (!isOuter && event_.node.isGroup() && !matcher_.reachesBelow())
+    if (event_.node.isGroup() && !matcher_.reachesBelow())
     {
       walk_.skip();
     }
   }
   isDone_ = true;
   return false;
-}
-
-bool Search::isMatch()
-{
-  Node node = event_.node;
-  node.depth -= isBelow_ ? 1 : 0;
-  return matcher_.matches(node);
 }
 
 tav::Node Search::read()

@@ -103,7 +103,7 @@ void Editor::Work::find(const std::vector<Path>& paths, const std::function<void
     {
       continue;
     }
-    if (const auto assignment = selection.at(event.node))
+    if (const auto assignment = selection.at(walker, event))
     {
       take(walker, event, *assignment);
     }
@@ -116,7 +116,7 @@ void Editor::Work::find(const std::vector<Path>& paths, const std::function<void
   {
     if (selection.found(i) == 0)
     {
-      throw Error(paths[i].noMatch(name_), Trouble::notFound);
+      throw Error(noMatch(paths[i], name_), Trouble::notFound);
     }
   }
 }

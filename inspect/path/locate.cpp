@@ -67,7 +67,7 @@ bool goToMatch(Walker& walker, PathMatcher& matcher, Event& event, const Seen& s
     {
       continue;
     }
-    if (matcher.matches(event.node))
+    if (matcher.matches(walker, event))
     {
       return true;
     }

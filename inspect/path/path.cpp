@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <charconv>
-#include <limits>
 #include <unordered_map>
 
 #include "tav/dictionary.hpp"
@@ -12,6 +11,8 @@
 
 namespace tav::inspect
 {
+
+namespace paths = detail::paths;
 
 namespace
 {
@@ -26,19 +27,6 @@ bool isCleanName(std::string_view text)
   return !text.empty() && !digitFirst && std::all_of(text.begin(), text.end(), clean);
 }
 
-std::string_view trimmed(std::string_view text)
-{
-  while (!text.empty() && text.front() == ' ')
-  {
-    text.remove_prefix(1);
-  }
-  while (!text.empty() && text.back() == ' ')
-  {
-    text.remove_suffix(1);
-  }
-  return text;
-}
-
 using Names = std::unordered_map<std::string_view, std::vector<uint16_t>>;
 
 /// Every name with the ids that bear it, as they stand and without the blanks around them.
@@ -48,15 +36,12 @@ const Names& names()
     Names made;
     for (const dictionary::Entry& entry : dictionary::entries())
     {
-      for (const std::string_view name : {entry.tag, entry.name, entry.constant})
+      for (const std::string_view name : paths::namesOf(entry))
       {
-        for (const std::string_view form : {name, trimmed(name)})
+        auto& ids = made[name];
+        if (paths::isElement(entry) && std::find(ids.begin(), ids.end(), entry.id) == ids.end())
         {
-          auto& ids = made[form];
-          if (entry.constant != "INVALID_ELEMENT" && std::find(ids.begin(), ids.end(), entry.id) == ids.end())
-          {
-            ids.push_back(entry.id);
-          }
+          ids.push_back(entry.id);
         }
       }
     }
@@ -158,185 +143,25 @@ std::string similarNames(std::string_view name)
   return text;
 }
 
-void Path::fail(const std::string& sentence, std::string hint) const
+Path pathOf(std::string_view text)
 {
-  throw Error("path '" + text_ + "': " + sentence, std::move(hint));
+  PathFault fault;
+  Path path(text, fault);
+  if (fault.kind != PathFault::Kind::none)
+  {
+    throw pathError(text, fault);
+  }
+  return path;
 }
 
-Path::Path(std::string_view text)
-    : text_(text)
+Error pathError(std::string_view text, const PathFault& fault)
 {
-  if (text == "/")
-  {
-    steps_.push_back({.kind = Step::Kind::any});
-    return;
-  }
-  if (text.starts_with('/'))
-  {
-    text.remove_prefix(1);
-  }
-  if (text.empty())
-  {
-    fail("names no node", "a path looks like /system/host[2]/hostName");
-  }
-  while (true)
-  {
-    const size_t slash = text.find('/');
-    addStep(text.substr(0, slash));
-    if (slash == std::string_view::npos)
-    {
-      return;
-    }
-    text.remove_prefix(slash + 1);
-  }
-}
-
-void Path::requireNames() const
-{
-  if (!unknown_.empty())
-  {
-    fail(unknown_, hint_);
-  }
-}
-
-Problem Path::noMatch(const std::string& file) const
-{
-  return {.file = file,
-          .path = text_,
-          .sentence = unknown_.empty() ? "no match" : "no match: " + unknown_,
-          .hint = hint_};
-}
-
-void Path::addStep(std::string_view text)
-{
-  const std::string number = "step " + std::to_string(steps_.size() + 1);
-  const size_t bracket = text.find('[');
-  const std::string_view name = text.substr(0, bracket);
-  Step step;
-  if (name.empty())
-  {
-    fail(number + " is empty", "write one slash between two steps and none at the end");
-  }
-  if (name == "*" || name == "**")
-  {
-    step.kind = name == "*" ? Step::Kind::any : Step::Kind::anyLevels;
-  }
-  else
-  {
-    step.ids = idsOf(name);
-    if (step.ids.empty() && (name.front() == '#' || (name.front() >= '0' && name.front() <= '9')))
-    {
-      fail(number + ": '" + std::string(name) + "' is no id", "ids go from 0 to 65535");
-    }
-    if (step.ids.empty() && name.find(']') != std::string_view::npos)
-    {
-      fail(number + " has a ] without a [");
-    }
-    if (step.ids.empty() && unknown_.empty())
-    {
-      const std::string similar = similarNames(name);
-      unknown_ = "no element has the name '" + std::string(name) + "'";
-      hint_ =
-          similar.empty() ? "'tav elements' lists the names; #12345 stands for an id" : "did you mean " + similar + "?";
-    }
-  }
-  if (bracket != std::string_view::npos)
-  {
-    if (text.back() != ']')
-    {
-      fail(number + " has a [ without a ] at its end");
-    }
-    if (step.kind == Step::Kind::anyLevels)
-    {
-      fail(number + ": ** takes no index", "'**/name[2]' is the second of its name in each group");
-    }
-    addIndex(text.substr(bracket + 1, text.size() - bracket - 2), step);
-  }
-  steps_.push_back(std::move(step));
-}
-
-void Path::addIndex(std::string_view index, Step& step) const
-{
-  if (index.starts_with('@'))
-  {
-    const bool hexadecimal = index.starts_with("@0x") || index.starts_with("@0X");
-    if (!parseNumber(index.substr(hexadecimal ? 3 : 1), step.offset, hexadecimal ? 16 : 10))
-    {
-      fail("'" + std::string(index) + "' is no offset", "an offset looks like [@0x1a40]");
-    }
-    return;
-  }
-  if (!parseNumber(index, step.ordinal, 10) || step.ordinal == 0)
-  {
-    fail("'" + std::string(index) + "' is no index", "the first of its name is [1]");
-  }
-}
-
-PathMatcher::PathMatcher(const Path& path)
-    : steps_(path.steps())
-{
-  starts_.push_back(0);
-  bool match = false;
-  enter(0, match);
-}
-
-/// Adds a position to the level that is being made, and those that `**` reaches from it without a level of its own.
-void PathMatcher::enter(size_t state, bool& match)
-{
-  for (;; ++state)
-  {
-    if (state == steps_.size())
-    {
-      match = true;
-      return;
-    }
-    if (std::find(states_.begin() + static_cast<ptrdiff_t>(starts_.back()), states_.end(), state) != states_.end())
-    {
-      return;
-    }
-    states_.push_back(state);
-    counts_.push_back(0);
-    if (steps_[state].kind != Path::Step::Kind::anyLevels)
-    {
-      return;
-    }
-  }
-}
-
-bool PathMatcher::matches(const Node& node)
-{
-  // The positions of level d are those that the children at depth d are tried against.
-  const auto level = static_cast<size_t>(node.depth);
-  if (level + 1 < starts_.size())
-  {
-    states_.resize(starts_[level + 1]);
-    counts_.resize(states_.size());
-    starts_.resize(level + 1);
-  }
-  const size_t first = starts_.back();
-  const size_t last = states_.size();
-  starts_.push_back(last);
-  bool match = false;
-  for (size_t i = first; i < last; ++i)
-  {
-    const size_t state = states_[i];
-    const Path::Step& step = steps_[state];
-    const bool isNode = !layout::isEndElement(node.elm()); // what only ends a group counts where it is named
-    if (step.kind == Path::Step::Kind::anyLevels)
-    {
-      isNode ? enter(state, match) : void();
-      continue;
-    }
-    const bool named = (step.kind == Path::Step::Kind::any && isNode) ||
-                       std::find(step.ids.begin(), step.ids.end(), node.elm()) != step.ids.end();
-    counts_[i] += named ? 1 : 0;
-    if (named && (step.ordinal == 0 || step.ordinal == counts_[i]) &&
-        (step.offset == kNoOffset || step.offset == node.offset()))
-    {
-      enter(state + 1, match);
-    }
-  }
-  return match;
+  constexpr size_t most = 200;
+  const std::string shown = std::string(text.substr(0, most)) + (text.size() > most ? "..." : "");
+  const bool unknown = fault.kind == PathFault::Kind::unknownName;
+  Problem problem{.sentence = "path '" + shown + "': column " + std::to_string(fault.column) + ": " + fault.sentence};
+  problem.hint = unknown && fault.nearest.empty() ? "'tav elements' lists the names; #12345 stands for an id" : "";
+  return Error(problem, unknown ? Trouble::notFound : Trouble::refused);
 }
 
 } // namespace tav::inspect

@@ -26,14 +26,14 @@ public:
     }
   }
 
-  /// To be given the nodeBegin of every node of the walk whose parent was not skipped. The last of the paths that
+  /// To be given `event`, the nodeBegin of every node of the walk whose parent was not skipped. The last of the paths that
   /// lead to it; nothing when none does.
-  std::optional<size_t> at(const Node& node)
+  std::optional<size_t> at(const Walker& walker, const Event& event)
   {
     std::optional<size_t> last;
     for (size_t i = 0; i < matchers_.size(); ++i)
     {
-      if (matchers_[i].matches(node))
+      if (matchers_[i].matches(walker, event))
       {
         ++found_[i];
         last = i;

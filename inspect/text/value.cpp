@@ -8,8 +8,8 @@
 #include "inspect/walk/prober.h"
 #include "inspect/walk/sizeSuits.h"
 #include "tav/cpp/text.hpp"
-#include "tav/cpp/valueText.hpp"
 #include "tav/inspect/problem.hpp"
+#include "tav/path/valueText.hpp"
 
 namespace tav::inspect
 {
@@ -85,43 +85,13 @@ std::string escaped(std::string_view text, std::string_view more)
   return out;
 }
 
-std::string arrayText(std::span<const uint8_t> bytes)
-{
-  std::string text = "[";
-  for (size_t at = 0; at + 8 <= bytes.size(); at += 8)
-  {
-    text += (at == 0 ? "" : " ") + std::to_string(load<uint64_t>(bytes.subspan(at)));
-  }
-  return text + "]";
-}
-
-std::string utf8Text(std::span<const uint8_t> bytes, bool quote)
-{
-  const std::string_view text = asText(bytes.subspan(2));
-  return quote ? quoted(text) : std::string(text);
-}
-
-/// A value of the right size.
+/// A value of the right size, in host order.
 std::string scalarText(uint16_t type, std::span<const uint8_t> bytes, bool quote)
 {
-  switch (type)
-  {
-  case TAV_TYPE_ASCII_STRING: return quote ? quoted(asText(bytes)) : std::string(asText(bytes));
-  case TAV_TYPE_UTF8_STRING: return utf8Text(bytes, quote);
-  case TAV_TYPE_UINT8: return std::to_string(bytes[0]);
-  case TAV_TYPE_SINT8: return std::to_string(static_cast<int8_t>(bytes[0]));
-  case TAV_TYPE_UINT16: return std::to_string(load<uint16_t>(bytes));
-  case TAV_TYPE_SINT16: return std::to_string(load<int16_t>(bytes));
-  case TAV_TYPE_UINT32: return std::to_string(load<uint32_t>(bytes));
-  case TAV_TYPE_SINT32: return std::to_string(load<int32_t>(bytes));
-  case TAV_TYPE_UINT64: return std::to_string(load<uint64_t>(bytes));
-  case TAV_TYPE_SINT64: return std::to_string(load<int64_t>(bytes));
-  case TAV_TYPE_UTC_TIMESTAMP: return dateText(load<TAVTimeStamp>(bytes));
-  case TAV_TYPE_UINT128: return int128Text(bytes, false);
-  case TAV_TYPE_SINT128: return int128Text(bytes, true);
-  case TAV_TYPE_UINT64_ARRAY: return arrayText(bytes);
-  default: return hexText(bytes);
-  }
+  const size_t whole = type == TAV_TYPE_UINT64_ARRAY ? bytes.size() / 8 * 8 : bytes.size(); // of one that was cut
+  const std::string text = detail::paths::plainText({type, bytes.data(), whole, false});
+  const bool isText = type == TAV_TYPE_ASCII_STRING || type == TAV_TYPE_UTF8_STRING;
+  return quote && isText ? quoted(text) : text;
 }
 
 std::vector<uint8_t> storedBytes(ByteSource& source, const Node& node, uint64_t most)
@@ -227,15 +197,7 @@ std::optional<uint64_t> pairDistanceAt(ByteSource& source, const Form& form, uin
 
 std::string hexText(std::span<const uint8_t> bytes)
 {
-  static constexpr char digits[] = "0123456789abcdef";
-  std::string text;
-  text.reserve(bytes.size() * 2);
-  for (const uint8_t byte : bytes)
-  {
-    text += digits[byte >> 4];
-    text += digits[byte & 15];
-  }
-  return text;
+  return detail::paths::digitsOf(bytes.data(), bytes.size());
 }
 
 std::string dateText(const TAVTimeStamp& stamp)
@@ -249,7 +211,7 @@ std::string int128Text(std::span<const uint8_t> bytes, bool isSigned)
   const auto second = load<uint64_t>(bytes.subspan(sizeof first));
   const uint64_t high = kor::isLittleEndian ? second : first;
   const uint64_t low = kor::isLittleEndian ? first : second;
-  return isSigned ? detail::longText({.high = static_cast<int64_t>(high), .low = low}) : detail::digitsOf(high, low);
+  return isSigned ? detail::longText(Sint128{.high = static_cast<int64_t>(high), .low = low}) : detail::digitsOf(high, low);
 }
 
 std::string cutToWidth(std::string_view text, size_t columns)

@@ -77,6 +77,9 @@ public:
   /// Whether the dictionary has an element.
   static bool isNamed(uint16_t elm);
 
+  /// Bytes that may be looked through.
+  uint64_t budget() const { return budget_; }
+
   /// Bytes looked through so far.
   uint64_t spent() const { return spent_; }
 

@@ -44,6 +44,35 @@ Walker::Walker(ByteSource& source, const Form& form, WalkStart start)
   frames_.push_back(file);
 }
 
+Walker Walker::through(ByteSource& source, const Form& form, const Mark& mark)
+{
+  Walker walker(source, form, {.offset = mark.position, .budget = mark.budget});
+  walker.frames_ = {mark.file};
+  if (mark.depth != 0)
+  {
+    walker.frames_.push_back(mark.parent);
+    walker.above_ = mark.depth - 1;
+  }
+  walker.frames_.push_back(mark.group);
+  for (Frame& frame : walker.frames_)
+  {
+    frame.counts = 0;
+  }
+  return walker;
+}
+
+Walker::Mark Walker::mark() const
+{
+  Mark mark;
+  mark.file = frames_.front();
+  mark.parent = frames_[frames_.size() - 2];
+  mark.group = frames_.back();
+  mark.depth = mark.group.node.depth;
+  mark.position = position_;
+  mark.budget = prober_->budget() - std::min(prober_->budget(), prober_->spent());
+  return mark;
+}
+
 Walker::~Walker() = default;
 
 Walker::Walker(Walker&&) noexcept = default;
@@ -60,7 +89,7 @@ Event& Walker::queue(What what, uint64_t offset, uint64_t length)
   event.offset = offset;
   event.length = length;
   event.end = End::closed;
-  event.depth = frames_.size() - 1;
+  event.depth = frames_.size() - 1 + above_;
   event.code = TAV_RC_OK;
   event.reason.clear();
   return event;
@@ -174,7 +203,7 @@ void Walker::begin(TAVHeader& header)
   }
   Node node;
   node.header = header;
-  node.depth = frames_.size() - 1;
+  node.depth = frames_.size() - 1 + above_;
   node.parentOffset = frames_.size() > 1 ? top.node.offset() : kNoOffset;
   node.flags = std::exchange(afterDamage_, false) ? uint32_t{kAfterDamage} : 0;
   const uint64_t start = node.payloadOffset();

@@ -90,7 +90,7 @@ std::vector<Path> ignoredPaths(const Invocation& invocation)
     {
       throw Failure("diff: --ignore / leaves nothing to compare");
     }
-    ignored.emplace_back(path).requireNames();
+    ignored.push_back(pathOf(path));
   }
   return ignored;
 }

@@ -16,7 +16,7 @@ namespace
 int run(const Invocation& invocation)
 {
   const std::string output = requireStreamOutput(invocation);
-  const Path path(invocation.arguments().at(1));
+  const Path path = pathOf(invocation.arguments().at(1));
   Stream stream = openStream(invocation);
   DamageNotices notices(stream);
   try

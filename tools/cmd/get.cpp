@@ -1,6 +1,7 @@
 // tav get: values by path.
 #include <algorithm>
 #include <memory>
+#include <optional>
 
 #include <nlohmann/json.hpp>
 
@@ -29,10 +30,23 @@ constexpr uint64_t kMostSteps = 4000;                 ///< deeper nodes are name
 struct Wanted
 {
   explicit Wanted(const std::string& text)
-      : path(text), matcher(path) {}
+      : problem{.path = text, .sentence = "no match"}
+  {
+    PathFault fault;
+    const Path path(text, fault);
+    switch (fault.kind)
+    {
+    case PathFault::Kind::none: matcher.emplace(path); break;
+    case PathFault::Kind::malformed: throw pathError(text, fault);
+    default: // the other paths are followed all the same
+      problem.sentence += ": column " + std::to_string(fault.column) + ": " + fault.sentence;
+    }
+  }
 
-  Path path;
-  PathMatcher matcher;
+  bool isOpen(bool all) const { return matcher && (all || found == 0); }
+
+  std::optional<PathMatcher> matcher{}; ///< nothing for a name that no element has
+  Problem problem;                      ///< when it has led nowhere
   uint64_t found = 0;
 };
 
@@ -69,7 +83,8 @@ public:
       if (wanted->found == 0)
       {
         status = kFindings;
-        report(wanted->path.noMatch(stream_.bytes().name()));
+        wanted->problem.file = stream_.bytes().name();
+        report(wanted->problem);
       }
     }
     return status;
@@ -94,7 +109,7 @@ private:
 
   bool isDone() const
   {
-    return !all_ && std::all_of(wanted_.begin(), wanted_.end(), [](const auto& wanted) { return wanted->found != 0; });
+    return std::none_of(wanted_.begin(), wanted_.end(), [this](const auto& wanted) { return wanted->isOpen(all_); });
   }
 
   void visit(Walker& walker, const Event& event)
@@ -102,14 +117,16 @@ private:
     bool reaches = false;
     for (const auto& wanted : wanted_)
     {
-      const bool matches = wanted->matcher.matches(event.node);
-      const bool open = all_ || wanted->found == 0;
-      if (matches && open)
+      if (!wanted->isOpen(all_))
+      {
+        continue;
+      }
+      if (wanted->matcher->matches(walker, event))
       {
         ++wanted->found;
         put(walker, event);
       }
-      reaches = reaches || ((all_ || wanted->found == 0) && wanted->matcher.reachesBelow());
+      reaches = reaches || (wanted->isOpen(all_) && wanted->matcher->reachesBelow());
     }
     if (event.node.isGroup() && !reaches)
     {
@@ -247,18 +264,24 @@ const Registration registration{{
     .summary = "values by path",
     .description =
         "Prints the value of the first node that each path leads to, in the order of the stream, one a line:\n"
-        "texts as they are, numbers in decimal, bytes in hexadecimal. A path is made of tags, enum names or\n"
-        "ids (#12345); [2] is the second that a step finds in a group, * any one node, ** any number of\n"
-        "levels; / alone leads to the roots. Every path that a command prints whole is understood. On a terminal\n"
-        "control characters of texts are written as \\x1b, as 'tav tree' does. Exit status 1: a path leads nowhere,\n"
-        "also by a name that no element has, or damage was passed over, which is told on standard error; the other\n"
-        "values are printed. 2: a path is malformed.",
+        "texts as they are, numbers in decimal, bytes in hexadecimal. Paths are those of XPath 1.0 in its\n"
+        "abbreviated syntax, on the tree that 'tav xml' prints:\n"
+        "  /a/b  //b  ..  .  *                   from the roots; any number of levels; parent; itself; any\n"
+        "  a[2]  a[last()-1]  a[position() < 3]  places among what the step finds under the same parent\n"
+        "  a[b]  a[b='x' and not(c > 5)]         by what is in it, numbers exactly\n"
+        "  a[@type='Uint64']  a[contains(b,'x')] by attributes of the XML; by parts of texts\n"
+        "  a | b  **  a[-1]  *_time  #60103  /   either; any levels; the last; pattern; id; the roots\n"
+        "Every path that a command prints whole is understood. On a terminal control characters of texts are\n"
+        "written as \\x1b, as 'tav tree' does. Exit status 1: a path leads nowhere, also by a name that no\n"
+        "element has, or damage was passed over, which is told on standard error; the other values are printed.\n"
+        "2: a path is malformed.",
     .options = {{.names = "-a,--all", .help = "every node that a path leads to, not only the first"},
                 {.names = "--raw", .help = "the payload's bytes as they stand in the file, without line ends"},
                 {.names = "--json", .help = "one JSON object a match: path, offset, size, type, value"},
                 {.names = "--paths", .help = "each value behind its path and a tab"}},
     .examples = {{"tav get x.tav /system/host/hostName", "one value"},
-                 {"tav get x.tav --all --paths '**/hostName'", "every host name in the file, with its path"},
+                 {"tav get x.tav --all --paths //hostName", "every host name in the file, with its path"},
+                 {"tav get x.tav --all '//host[cpu/cpuOnline > 4]/hostName'", "those with many processors"},
                  {"tav get x.tav --raw '/system/host[2]/#60123' > bytes", "the bytes of a value"}},
     .run = run,
 }};

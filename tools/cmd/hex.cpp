@@ -223,12 +223,12 @@ int run(const Invocation& invocation)
   }
   else if (invocation.has("--path"))
   {
-    const Path path(invocation.text("--path"));
+    const Path path = pathOf(invocation.text("--path"));
     PathMatcher matcher(path);
     if (!goToMatch(walker, matcher, event, seen))
     {
       notices.tell();
-      throw Failure(kFindings, path.noMatch(stream.bytes().name()));
+      throw Failure(kFindings, Problem{.file = stream.bytes().name(), .path = path.text(), .sentence = "no match"});
     }
   }
   else

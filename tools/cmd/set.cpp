@@ -27,7 +27,7 @@ std::vector<Assignment> assignmentsOf(const Invocation& invocation)
   std::vector<Assignment> assignments;
   for (size_t i = 1; i < words.size(); i += 2)
   {
-    assignments.push_back({Path(words[i]), words[i + 1]});
+    assignments.push_back({pathOf(words[i]), words[i + 1]});
   }
   return assignments;
 }

@@ -119,6 +119,19 @@ inline std::string nodeText(const HeaderView& node)
   return placeText(node) + ", type " + std::to_string(node.type()) + ", " + size;
 }
 
+/// "Uint32"; empty for a type that nobody knows, and for groups.
+inline std::string_view typeName(uint16_t type)
+{
+  const layout::TypeInfo& known = layout::typeInfo(type);
+  if (!known.known || layout::isGroupType(type))
+  {
+    return {};
+  }
+  return known.printName != nullptr ? known.printName // two are printed without a name
+         : type == TAV_TYPE_BYTE    ? "Byte"
+                                    : "Uint64 array";
+}
+
 /// "a Uint32", "a group", "of type 7"
 inline std::string typeText(uint16_t type)
 {
@@ -126,15 +139,12 @@ inline std::string typeText(uint16_t type)
   {
     return "a group";
   }
-  const layout::TypeInfo& known = layout::typeInfo(type);
-  if (!known.known)
+  const std::string name(typeName(type));
+  if (name.empty())
   {
     return "of type " + std::to_string(type);
   }
-  const char* const name = known.printName != nullptr ? known.printName // two are printed without a name
-                           : type == TAV_TYPE_BYTE    ? "Byte"
-                                                      : "Uint64 array";
-  return (type == TAV_TYPE_ASCII_STRING ? "an " : "a ") + std::string(name);
+  return (type == TAV_TYPE_ASCII_STRING ? "an " : "a ") + name;
 }
 
 } // namespace detail

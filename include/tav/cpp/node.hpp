@@ -21,12 +21,14 @@ namespace tav
 
 class ChildRange;
 class DescendantRange;
+class FindRange;
 class Path;
 class RootRange;
 namespace detail
 {
 class Printer;
-}
+struct NodeTree;
+} // namespace detail
 
 /// Whether a walk shows the elements that only end a group (ids 65000 and 65001).
 enum class EndElements : uint8_t
@@ -197,8 +199,9 @@ public:
     return node;
   }
 
-  /// The first node below whose path matches: tags, enum names or ids, as "host/hostName", "os/60105", "host[2]/*".
-  /// Always ends. TAV_RC_BAD_PARAM for a path that is none.
+  /// The first node that a path leads to from here, as "host/hostName", "host[2]/*", "..//cpu[cpuOnline > 4]"; with a
+  /// leading slash from the stream's first node. See tav/path/path.hpp. Always ends. TAV_RC_BAD_PARAM for a path that
+  /// is none.
   [[nodiscard]] std::optional<Node> path(std::string_view path) const;
   [[nodiscard]] std::optional<Node> path(std::string_view path, std::error_code& ec) const;
   [[nodiscard]] std::optional<Node> path(const Path& path) const;
@@ -208,6 +211,12 @@ public:
   [[nodiscard]] std::vector<Node> all(std::string_view path, std::error_code& ec) const;
   [[nodiscard]] std::vector<Node> all(const Path& path) const;
   [[nodiscard]] std::vector<Node> all(const Path& path, std::error_code& ec) const;
+  /// The same one after the other, as a walk: `for (const tav::Node& cpu : node.find("host/cpu"))`. Damage on the way
+  /// throws, or ends the walk and sets `ec`, which outlives the range.
+  [[nodiscard]] FindRange find(std::string_view path) const;
+  [[nodiscard]] FindRange find(std::string_view path, std::error_code& ec) const;
+  [[nodiscard]] FindRange find(const Path& path) const;
+  [[nodiscard]] FindRange find(const Path& path, std::error_code& ec) const;
 
   /// The payload as it stands in the stream; empty for a group.
   [[nodiscard]] PayloadView payload() const
@@ -297,9 +306,9 @@ private:
   friend class Reader;
   friend class ChildRange;
   friend class DescendantRange;
-  friend class Path;
   friend class RootRange;
   friend class detail::Printer;
+  friend struct detail::NodeTree;
 
   /// A node of no known group.
   Node(detail::ReaderState& state, const TAVHeaderData& data) noexcept

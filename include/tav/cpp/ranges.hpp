@@ -70,7 +70,7 @@ private:
   Walk* walk_ = nullptr;
 };
 
-/// The end of a walk: kept for who asks, or thrown.
+/// The end of a walk: reported where somebody asks for the code, else thrown.
 [[gnu::noinline, gnu::cold]] inline void endWalk(uint32_t rc, std::error_code* ec, const char* what)
 {
   const uint32_t failure = rc == TAV_RC_NO_MORE_CHILDREN ? TAV_RC_OK : rc;
@@ -195,6 +195,12 @@ public:
     return std::default_sentinel;
   }
 
+  /// Leaves out what is below the present node: the walk goes on behind it, where its size says.
+  void skip() noexcept
+  {
+    skips_ = current_.isGroup();
+  }
+
   /// Levels between the start and the present node; its children are on level 1.
   [[nodiscard]] size_t depth() const noexcept
   {
@@ -233,6 +239,10 @@ private:
   /// To the first child of the present node.
   [[gnu::noinline]] uint32_t descend()
   {
+    if (std::exchange(skips_, false))
+    {
+      return current_.readNext(&current_.parent_, &current_.data_.header);
+    }
     if (depth_ != 0)
     {
       outer_.push(current_.parent_);
@@ -288,6 +298,7 @@ private:
   EndElements endElements_;
   bool begun_ = false;
   bool done_ = false;
+  bool skips_ = false; ///< the present group's children
 };
 
 } // namespace tav

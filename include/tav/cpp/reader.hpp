@@ -134,39 +134,70 @@ public:
   std::optional<Node> endingAfter(uint64_t offset) const&& = delete;
   std::optional<Node> endingAfter(uint64_t offset, std::error_code& ec) const&& = delete;
 
-  /// The first node whose path from the root, the root's own name first, matches: "/system/host/hostName".
+  /// The first node that a path leads to, from the stream's first node, its own name first: "/system/host/hostName".
+  /// See tav/path/path.hpp.
   [[nodiscard]] std::optional<Node> path(std::string_view path) const&
   {
-    std::error_code ec;
-    const Path parsed = parse(path, nullptr);
-    std::optional<Node> node = first(parsed, ec);
-    detail::demand(codeOf(ec), "searching", [path] { return std::string(path); });
-    return node;
+    return this->path(Path(path, "searching"));
   }
   [[nodiscard]] std::optional<Node> path(std::string_view path, std::error_code& ec) const&
   {
-    const Path parsed = parse(path, &ec);
-    return ec ? std::nullopt : first(parsed, ec);
+    const Path parsed(path, ec);
+    return ec ? std::nullopt : this->path(parsed, ec);
+  }
+  [[nodiscard]] std::optional<Node> path(const Path& path) const&
+  {
+    std::optional<Node> node = findStraight(path);
+    return node ? node : detail::firstOf(find(path));
+  }
+  [[nodiscard]] std::optional<Node> path(const Path& path, std::error_code& ec) const&
+  {
+    ec.clear();
+    std::optional<Node> node = findStraight(path);
+    return node ? node : detail::firstOf(find(path, ec));
   }
   std::optional<Node> path(std::string_view path) const&& = delete;
   std::optional<Node> path(std::string_view path, std::error_code& ec) const&& = delete;
+  std::optional<Node> path(const Path& path) const&& = delete;
+  std::optional<Node> path(const Path& path, std::error_code& ec) const&& = delete;
 
   /// All of them, in stream order.
   [[nodiscard]] std::vector<Node> all(std::string_view path) const&
   {
-    std::error_code ec;
-    const Path parsed = parse(path, nullptr);
-    std::vector<Node> nodes = every(parsed, ec);
-    detail::demand(codeOf(ec), "searching", [path] { return std::string(path); });
-    return nodes;
+    return detail::collect(find(path));
   }
   [[nodiscard]] std::vector<Node> all(std::string_view path, std::error_code& ec) const&
   {
-    const Path parsed = parse(path, &ec);
-    return ec ? std::vector<Node>() : every(parsed, ec);
+    return detail::collect(find(path, ec));
   }
   std::vector<Node> all(std::string_view path) const&& = delete;
   std::vector<Node> all(std::string_view path, std::error_code& ec) const&& = delete;
+
+  /// The same one after the other, as a walk: `for (const tav::Node& host : reader.find("//host[cpuOnline > 4]"))`.
+  /// Damage on the way throws, or ends the walk and sets `ec`, which outlives the range.
+  [[nodiscard]] FindRange find(std::string_view path) const&
+  {
+    return find(Path(path, "searching"));
+  }
+  [[nodiscard]] FindRange find(std::string_view path, std::error_code& ec) const&
+  {
+    const Path parsed(path, ec);
+    return ec ? FindRange() : find(parsed, ec);
+  }
+  [[nodiscard]] FindRange find(const Path& path) const&
+  {
+    detail::demand(use() == nullptr ? TAV_RC_BAD_PARAM : TAV_RC_OK, "searching", [&path] { return path.text(); });
+    return {*state_, path, nullptr};
+  }
+  [[nodiscard]] FindRange find(const Path& path, std::error_code& ec) const&
+  {
+    detail::report(use() == nullptr ? TAV_RC_BAD_PARAM : TAV_RC_OK, ec);
+    return ec ? FindRange() : FindRange(*state_, path, &ec);
+  }
+  FindRange find(std::string_view path) const&& = delete;
+  FindRange find(std::string_view path, std::error_code& ec) const&& = delete;
+  FindRange find(const Path& path) const&& = delete;
+  FindRange find(const Path& path, std::error_code& ec) const&& = delete;
 
   /// Prints the stream to a stream of the C library, standard output when null; returns the characters. Every value
   /// that a Group can add is printed, as tavPrintSubtree does it where it can: UTF-8 texts as they are, times with
@@ -309,49 +340,19 @@ private:
     return rc == TAV_RC_NOT_FOUND ? TAV_RC_OK : rc;
   }
 
-  /// Without `ec` a text that is no path throws.
-  static Path parse(std::string_view path, std::error_code* ec)
+  /// As NodeTree::findStraight, from the stream's first node on.
+  [[nodiscard]] std::optional<Node> findStraight(const Path& path) const noexcept
   {
-    return ec != nullptr ? Path(path, *ec) : Path(path, "searching");
-  }
-
-  [[nodiscard]] std::optional<Node> first(const Path& path, std::error_code& ec) const
-  {
-    std::optional<Node> found;
-    const auto keep = [&found](const Node& node) {
-      found = node;
-      return false;
-    };
-    visit(path, keep, ec);
-    return found;
-  }
-
-  [[nodiscard]] std::vector<Node> every(const Path& path, std::error_code& ec) const
-  {
-    std::vector<Node> found;
-    const auto keep = [&found](const Node& node) {
-      found.push_back(node);
-      return true;
-    };
-    visit(path, keep, ec);
-    return found;
-  }
-
-  /// Calls `keep(node)` for the matches of a path that begins with the root's name.
-  template<class Keep>
-  void visit(const Path& path, Keep& keep, std::error_code& ec) const
-  {
-    const Node first = root(ec);
-    if (ec || !path.beginsWith(first))
+    const detail::paths::Compiled& compiled = path.compiled();
+    Node root;
+    if (!compiled.isStraight || state_ == nullptr || !state_->isFast || readRoot(root) != TAV_RC_OK)
     {
-      return;
+      return std::nullopt;
     }
-    if (path.steps_.size() == 1)
-    {
-      keep(first);
-      return;
-    }
-    path.visitFrom(1, first, keep, ec);
+    const std::span<const detail::paths::Step> steps = compiled.routes[compiled.main.front()].steps;
+    return steps.size() > 1 && steps.front().matches(root.elm())
+               ? detail::NodeTree::findStraight(steps.subspan(1), root)
+               : std::nullopt;
   }
 
   uint32_t printNode(FILE* stream, const Node& node, const PrintOptions& options, uint64_t& characters) const noexcept

@@ -126,6 +126,11 @@ inline std::string digitsOf(uint64_t high, uint64_t low)
   return text;
 }
 
+inline std::string longText(const Uint128& number)
+{
+  return digitsOf(number.high, number.low);
+}
+
 /// The digits of a 128-bit number with one.
 inline std::string longText(const Sint128& number)
 {

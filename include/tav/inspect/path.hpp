@@ -1,18 +1,10 @@
 /// @file path.hpp
-/// Paths through a stream: `/system/host[2]/hostName`.
-///
-/// @code{.unparsed}
-///   step   = name | #id | * | **           name: an element's tag, enum name or constant
-///   index  = [n]                           the nth of those that the step finds under the same parent, from 1
-///          | [@offset]                     the one at this offset; 0x for hexadecimal
-///   path   = / | / { step [index] / }
-/// @endcode
-///
-/// `*` is any one node, `**` any number of levels; elements that only end a group are meant where they are named. The
-/// leading slash may be left out. A slash alone leads to the roots.
+/// Paths through a stream, by the grammar of tav/path/path.hpp: `/system/host[2]/hostName`. A leading slash may be left
+/// out: without a node at hand a path begins at the roots.
 #pragma once
 
 #include <cstdint>
+#include <memory>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -20,6 +12,7 @@
 #include "tav/inspect/api.hpp"
 #include "tav/inspect/problem.hpp"
 #include "tav/inspect/walker.hpp"
+#include "tav/path/path.hpp"
 
 namespace tav::inspect
 {
@@ -40,67 +33,68 @@ TAV_INSPECT_API std::vector<uint16_t> idsOf(std::string_view name);
 /// Up to three elements whose names are close to a misspelt one, for a hint; empty when there is none.
 TAV_INSPECT_API std::string similarNames(std::string_view name);
 
-class Path
-{
-public:
-  /// Throws Error, with the place of the error, when the text is no path. A name that no element has is none of
-  /// that: such a path leads to no node of any stream.
-  TAV_INSPECT_API explicit Path(std::string_view text);
+using tav::Path;
+using tav::PathFault;
 
-  struct Step
-  {
-    enum class Kind : uint8_t
-    {
-      ids,      ///< one of `ids`
-      any,      ///< *
-      anyLevels ///< **
-    };
-    Kind kind = Kind::ids;
-    std::vector<uint16_t> ids{};
-    uint64_t ordinal = 0;        ///< 0: any
-    uint64_t offset = kNoOffset; ///< kNoOffset: any
-  };
+/// Reads a path. Throws Error with the column: Trouble::notFound for a name that no element has, with the nearest one;
+/// Trouble::refused for a text that is no path.
+TAV_INSPECT_API Path pathOf(std::string_view text);
 
-  const std::string& text() const { return text_; }
-  const std::vector<Step>& steps() const { return steps_; }
+/// What pathOf throws.
+TAV_INSPECT_API Error pathError(std::string_view text, const PathFault& fault);
 
-  /// Throws Error when a step has a name that no element has.
-  TAV_INSPECT_API void requireNames() const;
-
-  /// What to report when the path has led to no node of a file.
-  TAV_INSPECT_API Problem noMatch(const std::string& file) const;
-
-private:
-  void addStep(std::string_view text);
-  void addIndex(std::string_view index, Step& step) const;
-  [[noreturn]] void fail(const std::string& sentence, std::string hint = {}) const;
-
-  std::string text_;
-  std::vector<Step> steps_{};
-  std::string unknown_{}; ///< the first name that no element has, as a sentence; empty: none
-  std::string hint_{};    ///< what may have been meant by it
-};
+/// What there is to say of a path that leads to no node of a file.
+TAV_INSPECT_API Problem noMatch(const Path& path, const std::string& file);
 
 /// Follows a walk and tells which nodes a path leads to. Give it the nodeBegin of every node of the walk whose parent
-/// was not skipped. Memory grows with the depth times the `**` of the path.
+/// was not skipped. What a condition asks for ahead of the walk is looked up in the source. Memory grows with the depth
+/// alone: by a state for each place in the path that a node can be at.
 class PathMatcher
 {
 public:
+  /// From the place above the roots, for a walk over the whole stream.
   TAV_INSPECT_API explicit PathMatcher(const Path& path);
+  /// From the node at an offset, for a walk over the whole stream, which may begin before the node: `..` leads there.
+  TAV_INSPECT_API PathMatcher(const Path& path, ByteSource& source, const Form& form, uint64_t offset);
+  /// From the first node that it is given, for a walk that begins there.
+  TAV_INSPECT_API static PathMatcher below(const Path& path);
 
-  /// Whether the path leads to this node.
-  TAV_INSPECT_API bool matches(const Node& node);
+  /// Whether a path can lead out of what is below the node that it begins at.
+  TAV_INSPECT_API static bool leavesStart(const Path& path);
+
+  TAV_INSPECT_API ~PathMatcher();
+  TAV_INSPECT_API PathMatcher(PathMatcher&&) noexcept;
+
+  /// Whether the path leads to this node, whose nodeBegin the walk has returned last.
+  TAV_INSPECT_API bool matches(const Walker& walker, const Event& event);
 
   /// Whether the path can lead to something below the node that was given last.
-  bool reachesBelow() const { return starts_.back() < states_.size(); }
+  TAV_INSPECT_API bool reachesBelow() const;
 
 private:
-  void enter(size_t state, bool& match);
+  struct State;
+  explicit PathMatcher(std::unique_ptr<State> state);
 
-  const std::vector<Path::Step>& steps_;
-  std::vector<size_t> states_{};   ///< positions in the path, level by level
-  std::vector<uint64_t> counts_{}; ///< what the step at each of them has found under the present parent
-  std::vector<size_t> starts_{};   ///< where a level's positions begin
+  std::unique_ptr<State> state_;
+};
+
+/// The nodes that a path leads to, in the order of the stream, each once, through damage as a Walker goes. Groups below
+/// which there can be none are skipped by their sizes. Used by one thread.
+class PathSearch
+{
+public:
+  /// `source` outlives the search.
+  TAV_INSPECT_API PathSearch(ByteSource& source, const Form& form, const Path& path);
+
+  /// Walks on to the next node; false behind the last. `event` is its nodeBegin.
+  TAV_INSPECT_API bool next(Event& event);
+
+  /// The walk that is searched: for the node's path, or to walk on from it.
+  Walker& walker() { return walker_; }
+
+private:
+  Walker walker_;
+  PathMatcher matcher_;
 };
 
 } // namespace tav::inspect

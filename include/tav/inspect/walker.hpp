@@ -93,8 +93,13 @@ class Prober;
 class Walker
 {
 public:
+  struct Mark;
+
   /// `source` outlives the walk.
   TAV_INSPECT_API Walker(ByteSource& source, const Form& form, WalkStart start = {});
+  /// A walk of its own through the group that a walk has marked: its pieces up to its nodeEnd, the same as there. It
+  /// knows no more than the node's parent, so that its paths are none.
+  TAV_INSPECT_API static Walker through(ByteSource& source, const Form& form, const Mark& mark);
   TAV_INSPECT_API ~Walker();
   TAV_INSPECT_API Walker(Walker&&) noexcept;
 
@@ -111,7 +116,11 @@ public:
   /// siblings of that name.
   TAV_INSPECT_API std::string path(const Event& event, PathStyle style = PathStyle::whole) const;
 
+  /// Directly after the nodeBegin of a group: what is needed to walk through it once more, at any time.
+  TAV_INSPECT_API Mark mark() const;
+
   const Form& form() const { return form_; }
+  ByteSource& source() const { return source_; }
   /// UTF-8 strings so far with and without the two extra bytes, where the bytes around told.
   uint64_t stringsWithExtra() const { return withExtra_; }
   uint64_t stringsWithoutExtra() const { return withoutExtra_; }
@@ -159,6 +168,7 @@ private:
   Form form_;
   std::unique_ptr<Prober> prober_;
   std::vector<Frame> frames_{}; ///< the first stands for the file
+  uint64_t above_ = 0;          ///< levels between the file and the second frame that are not there
   std::vector<Count> counts_{};
   uint64_t position_;
   uint64_t withExtra_ = 0;
@@ -170,6 +180,17 @@ private:
   std::array<Event, 8> queue_{};
   size_t queueHead_ = 0;
   size_t queueCount_ = 0;
+};
+
+/// A group that a walk came to, with what its bytes are judged by.
+struct Walker::Mark
+{
+  Frame file{};
+  Frame parent{}; ///< of a root: the file's
+  Frame group{};
+  uint64_t depth = 0;
+  uint64_t position = 0;
+  uint64_t budget = 0;
 };
 
 } // namespace tav::inspect

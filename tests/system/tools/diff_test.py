@@ -125,7 +125,7 @@ class Diff(Folder):
         self.assertEqual(tav("diff", path, self.folder / "none").status, 2)
         self.assertEqual(tav("diff", "-", "-").status, 2)
         self.assertEqual(tav("diff", path, path, "--tolerance", "much").status, 2)
-        self.assertEqual(tav("diff", path, path, "--ignore", "/nosuchname").status, 2)
+        self.assertEqual(tav("diff", path, path, "--ignore", "/nosuchname").status, 1)
         self.assertEqual(tav("diff", path, self.file(b"no stream at all\n")).status, 3)
         self.assertEqual(tav("diff", path, "-", stdin=path.read_bytes()).status, 0)
 

@@ -1,5 +1,7 @@
 """Every path that is printed leads back to its node; bad paths are explained."""
 import json
+import pathlib
+import shlex
 import struct
 import unittest
 
@@ -7,6 +9,14 @@ from support import ToolTest, generate, tav, tree_rows
 
 
 class Paths(ToolTest):
+    def stream(self, content):
+        """The bytes of a stream that is given as it stands in JSON."""
+        text, made = self.folder / "made.json", self.folder / "made.tav"
+        text.write_text(json.dumps(content))
+        result = tav("build", text, "-o", made, "--force")
+        self.assertEqual((result.status, result.err), (0, ""))
+        return made.read_bytes()
+
     def test_every_printed_path_leads_back_to_its_node(self):
         path = self.folder / "g.tav"
         for seed in range(6):
@@ -39,12 +49,15 @@ class Paths(ToolTest):
 
     def test_bad_paths_are_wrong_usage(self):
         path = self.snapshot()
-        for bad in ("", "//host", "/system/", "/system[0]", "/system[", "/system[x]",
-                    "/system[@]", "/**[2]", "/#70000", "/system]"):
+        for bad, column in (("", 1), ("///host", 3), ("/system/", 9), ("/system[0]", 9), ("/system[", 9),
+                            ("/system[host=]", 14), ("/system[@]", 10), ("/**[2]", 4), ("/#70000", 2), ("/system]", 8),
+                            ("//host[contains(hostName)]", 25), ("/nope[", 7), ("//host[/system]", 8)):
             with self.subTest(path=bad):
                 result = tav("get", path, bad)
                 self.assertEqual((result.status, result.out), (2, ""))
-                self.assertTrue(result.err.startswith("tav: path '"), result.err)
+                self.assertTrue(result.err.startswith(f"tav: path '{bad}': column {column}: "), result.err)
+                self.assertEqual(tav("hex", path, "--path", bad).status, 2)
+                self.assertEqual(tav("diff", path, path, "--ignore", bad).status, 2)
 
     def test_a_path_that_leads_nowhere_does_not_keep_the_others_back(self):
         path = self.snapshot()
@@ -58,9 +71,10 @@ class Paths(ToolTest):
 
     def test_a_difference_is_not_sought_with_a_name_that_no_element_has(self):
         path = self.snapshot()
-        for ignored in ("/nope", "/"):
+        for ignored, status in (("/nope", 1), ("/system/hots", 1), ("/", 2)):
             result = tav("diff", path, path, "--ignore", ignored)
-            self.assertEqual((result.status, result.out), (2, ""))
+            self.assertEqual((result.status, result.out), (status, ""))
+            self.assertEqual("no element is called" in result.err, status == 1)
 
     def test_a_slash_alone_leads_to_the_roots(self):
         path = self.folder / "roots.tav"
@@ -70,6 +84,63 @@ class Paths(ToolTest):
         self.assertEqual([(one["path"], one["offset"]) for one in found], [("/system", 0), ("/system[2]", 36)])
         self.assertEqual(tav("get", path, "/").out, "/system: group of 20 bytes\n")
         self.assertEqual(tav("hex", path, "--path", "/").raw, tav("hex", path, "--at", 0).raw)
+
+    def test_conditions_look_into_every_host(self):
+        path = self.folder / "hosts.tav"
+        hosts = [{"hostName": name, "cpu": {"cpuOnline": count}} for name, count in (("ada", 8), ("bob", 2), ("eve", 64))]
+        path.write_bytes(self.stream({"system": {"host": hosts}}))
+        for wanted, values in (("//host[cpu/cpuOnline > 4]/hostName", ["ada", "eve"]),
+                               ("//host[hostName='bob']/cpu/cpuOnline", ["2"]),
+                               ("//host[last()]/hostName", ["eve"]), ("//host[-1]/hostName", ["eve"]),
+                               ("//hostName[../cpu[cpuOnline < 8]]", ["bob"]),
+                               ("//cpuOnline[.='64']/../../hostName", ["eve"]),
+                               ("//host[position() <= 2]/hostName | //host[3]/cpu/cpuOnline", ["ada", "bob", "64"])):
+            with self.subTest(path=wanted):
+                self.assertEqual(tav("get", path, "-a", wanted).out.split(), values)
+        self.assertEqual(tav("get", path, "//host[hostName='nobody']").status, 1)
+        self.assertEqual(tav("diff", path, path, "--ignore", "//host[cpu/cpuOnline > 4]").status, 0)
+
+    def test_the_examples_of_the_documents_run(self):
+        page = (pathlib.Path(__file__).resolve().parents[2] / "docs" / "tav.md").read_text(encoding="utf-8")
+        lines = page.split("## Paths")[1].split("```sh\n")[1].split("```")[0].splitlines()
+        made = self.stream({"system": {"db_conn_time": 5, "host": [
+            {"hostName": "ada", "cpu": {"cpuOnline": 8}, "memory": {"memFree": 7, "memTotal": 2 ** 64}}]}})
+        for name in ("x.tav", "y.tav"):
+            (self.folder / name).write_bytes(made)
+        for line in lines:
+            with self.subTest(line=line):
+                words = shlex.split(line, comments=True)
+                result = tav(*words[1:], cwd=self.folder)
+                self.assertEqual((result.status, result.err), (0, ""))
+                self.assertEqual(result.out != "", words[1] == "get")
+
+    def test_several_paths_give_values_in_the_order_of_the_stream(self):
+        path = self.snapshot()
+        name, system = (tav("get", path, one).out for one in ("//hostName", "//osName"))
+        self.assertEqual(tav("get", path, "//osName", "//hostName").out, name + system)
+
+    def test_each_root_counts_and_damage_is_passed_over(self):
+        path = self.folder / "roots.tav"
+        roots = [self.stream({"system": {"host": [{"hostName": name}]}}) for name in ("ada", "bob", "eve")]
+        path.write_bytes(b"".join(roots))
+        self.assertEqual(tav("get", path, "-a", "/system[2]//hostName").out, "bob\n")
+        self.assertEqual(tav("get", path, "-a", "/system[last()]//hostName").out, "eve\n")
+        self.assertEqual(tav("get", path, "-a", "//hostName[../../..]").status, 1)
+        broken = bytearray(roots[0])
+        broken[32:48] = b"\xee" * 16
+        path.write_bytes(bytes(broken) + roots[1])
+        found = tav("get", path, "-a", "//host[hostName='bob']/hostName")
+        self.assertEqual((found.out, found.status), ("bob\n", 1))
+        self.assertIn("0x20", found.err)
+
+    def test_hostile_paths_end_in_a_sentence(self):
+        path = self.snapshot()
+        for hostile, status in (("/host" * 10000, 1), ("//*" * 5000, 1), ("[" * 100000, 2), ("host[" * 20000, 2),
+                                ("//*[.//*" * 30 + "]" * 30, 1), ("//.." * 100, 2), ("host[" + "(" * 100000, 2)):
+            with self.subTest(path=hostile[:20]):
+                result = tav("get", path, hostile)
+                self.assertEqual((result.status, result.out), (status, ""))
+                self.assertTrue(result.err.startswith("tav: "))
 
     def test_a_misspelt_name_gets_a_hint(self):
         self.assertIn("did you mean host?", tav("get", self.snapshot(), "/system/hostt").err)

@@ -114,6 +114,30 @@ TEST_F(LayerPath, PathBelowANodeBeginsWithItsChildren)
   EXPECT_EQ(root.all("host").size(), 2U);
 }
 
+TEST_F(LayerPath, PathWithALeadingSlashBeginsAtTheRootFromAnyNode)
+{
+  const tav::Node host = *reader.path("/system/host[2]");
+  EXPECT_EQ(host.path("/system/host/hostName")->as<std::string>(), "a");
+  EXPECT_FALSE(host.path("/hostName"));
+}
+
+TEST_F(LayerPath, FindsOneAfterTheOther)
+{
+  std::string names;
+  for (const tav::Node& name : reader.find("//hostName"))
+  {
+    names += name.as<std::string>();
+  }
+  EXPECT_EQ(names, "acd");
+  EXPECT_EQ(givenBy([&](std::error_code& ec) {
+              for (const tav::Node& node : reader.root().find("host[", ec))
+              {
+                ADD_FAILURE() << node.offset();
+              }
+            }),
+            TAV_RC_BAD_PARAM);
+}
+
 TEST_F(LayerPath, IsReadOnceAndUsedOften)
 {
   const tav::Path path("host/hostName");
@@ -127,8 +151,8 @@ TEST_F(LayerPath, IsReadOnceAndUsedOften)
 TEST_F(LayerPath, WhatIsNoPathIsRefused)
 {
   for (const char* const text :
-       {"", "/", "//host", "host//hostName", "host/", "noSuchElement", "host[0]", "host[", "host[x]", "host]", "[1]",
-        "host[1x]", "host[-1]", "65536", "#", "host[99999999999999999999]", "invalid_element"})
+       {"", "//", "///host", "host///hostName", "host/", "noSuchElement", "host[0]", "host[", "host[x]", "host]", "[1]",
+        "host[1x]", "65536", "#", "host[99999999999999999999]", "invalid_element"})
   {
     EXPECT_EQ(thrownBy([&] { const tav::Path path(text); }), TAV_RC_BAD_PARAM) << text;
     EXPECT_EQ(thrownBy([&] { static_cast<void>(reader.path(text)); }), TAV_RC_BAD_PARAM) << text;
@@ -161,7 +185,7 @@ TEST_F(LayerPath, MatchKnowsItsGroup)
   EXPECT_FALSE(name->next()) << "the last of its group";
 }
 
-TEST_F(LayerPath, ElementThatEndsAGroupIsNoMatch)
+TEST_F(LayerPath, ElementThatEndsAGroupIsFoundByItsNameAlone)
 {
   tav::Writer writer;
   {
@@ -171,8 +195,10 @@ TEST_F(LayerPath, ElementThatEndsAGroupIsNoMatch)
   writer.finish();
   const tav::Reader other(writer.bytes());
   EXPECT_TRUE(other.root().path("hostName"));
-  EXPECT_FALSE(other.root().path("65001"));
+  EXPECT_EQ(other.root().path("65001")->elm(), 65001);
+  EXPECT_TRUE(other.root().path("endHdrEyeSize[1]"));
   EXPECT_FALSE(other.root().path("65000"));
+  EXPECT_EQ(other.all("//*").size(), 2U);
 }
 
 TEST_F(LayerPath, MatchIsTheSameAfterTheHandleWasGivenAway)

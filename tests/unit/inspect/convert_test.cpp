@@ -181,14 +181,12 @@ TEST(Path, LeadsToTheNodesThatItNames)
   const Bytes bytes = bytesOfJson("{\"system\": {\"host\": [{\"hostName\": \"ada\"}, {\"hostName\": \"bob\"}]}}");
   const auto offsets = [&](const std::string& text) {
     ByteSource source("x", std::span<const uint8_t>(bytes));
-    const Path path(text);
-    PathMatcher matcher(path);
-    Walker walker(source, {});
+    PathSearch search(source, {}, pathOf(text));
     Event event;
     std::vector<std::string> found;
-    while (goToMatch(walker, matcher, event))
+    while (search.next(event))
     {
-      found.push_back(walker.path(event));
+      found.push_back(search.walker().path(event));
     }
     return found;
   };
@@ -202,9 +200,32 @@ TEST(Path, LeadsToTheNodesThatItNames)
 
 TEST(Path, IsRefusedWithItsText)
 {
-  for (const char* text : {"", "//", "/system[", "/system[x]", "/sys tem["})
+  for (const char* text : {"", "//", "/system[", "/system[x=]", "/sys tem["})
   {
-    EXPECT_THROW(Path path(text), Error) << text;
+    try
+    {
+      pathOf(text);
+      ADD_FAILURE() << text;
+    }
+    catch (const Error& error)
+    {
+      EXPECT_EQ(error.trouble(), Trouble::refused) << text;
+      EXPECT_THAT(error.problem().sentence, testing::StartsWith("path '" + std::string(text) + "': column "));
+    }
   }
-  EXPECT_THROW(Path("/system/hostNam").requireNames(), Error);
+}
+
+TEST(Path, NameThatNoElementHasIsNotFound)
+{
+  try
+  {
+    pathOf("/system/hostNam");
+    ADD_FAILURE();
+  }
+  catch (const Error& error)
+  {
+    EXPECT_EQ(error.trouble(), Trouble::notFound);
+    EXPECT_THAT(error.problem().sentence,
+                testing::HasSubstr("column 9: no element is called 'hostNam'; did you mean hostName?"));
+  }
 }

@@ -54,7 +54,7 @@ uint64_t defects(const Bytes& bytes, const tav::inspect::Form& form)
 
 std::vector<Assignment> assign(const std::string& path, const std::string& value)
 {
-  return {{Path(path), value}};
+  return {{pathOf(path), value}};
 }
 
 /// A file with given bytes, gone with the object.
@@ -141,7 +141,7 @@ TEST_P(EditInAForm, NothingIsWrittenIntoAFileThatHasChanged)
   const OnDisk disk(other);
   KORHFile file;
   disk.open(file);
-  const std::vector<Assignment> assignments{{Path("**/cpuOnline"), "4711"}, {Path("**/hostName"), "eva"}};
+  const std::vector<Assignment> assignments{{pathOf("**/cpuOnline"), "4711"}, {pathOf("**/hostName"), "eva"}};
   Editor editor(source, form, assignments);
   EXPECT_EQ(editor.changed(), 2U);
   EXPECT_THROW(editor.writeInto(file), Error);

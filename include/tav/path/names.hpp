@@ -1,0 +1,137 @@
+/// @file names.hpp
+/// Names of elements and attributes as paths write them.
+#pragma once
+
+#include <algorithm>
+#include <array>
+#include <cstddef>
+#include <cstdint>
+#include <iterator>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "tav/dictionary.hpp"
+#include "tav/layout.hpp"
+#include "tav/path/decimal.hpp"
+
+namespace tav::detail::paths
+{
+
+/// The names of an entry: as they stand, and without the blanks that a few have around them.
+inline std::array<std::string_view, 5> namesOf(const dictionary::Entry& entry) noexcept
+{
+  return {entry.tag, entry.name, entry.constant, withoutBlanks(entry.tag), withoutBlanks(entry.name)};
+}
+
+inline bool isElement(const dictionary::Entry& entry) noexcept
+{
+  return entry.constant != "INVALID_ELEMENT";
+}
+
+/// Whether a text is what a pattern describes: a star stands for any characters.
+inline bool isLike(std::string_view text, std::string_view pattern) noexcept
+{
+  constexpr size_t none = std::string_view::npos;
+  size_t at = 0;
+  size_t of = 0;
+  size_t star = none; ///< the last star met, which takes one character more when the rest does not fit
+  size_t taken = 0;
+  while (at < text.size())
+  {
+    if (of < pattern.size() && pattern[of] == '*')
+    {
+      star = of++;
+      taken = at;
+    }
+    else if (of < pattern.size() && pattern[of] == text[at])
+    {
+      ++at;
+      ++of;
+    }
+    else if (star != none)
+    {
+      of = star + 1;
+      at = ++taken;
+    }
+    else
+    {
+      return false;
+    }
+  }
+  return pattern.find_first_not_of('*', of) == none;
+}
+
+/// The ids that bear a name, ascending: several elements can share a tag. Empty when no element has it.
+inline std::vector<uint16_t> idsNamed(std::string_view name)
+{
+  std::vector<uint16_t> ids;
+  for (const dictionary::Entry& entry : dictionary::entries())
+  {
+    const std::array names = namesOf(entry);
+    if (isElement(entry) && std::find(names.begin(), names.end(), name) != names.end())
+    {
+      ids.push_back(entry.id);
+    }
+  }
+  std::sort(ids.begin(), ids.end());
+  ids.erase(std::unique(ids.begin(), ids.end()), ids.end());
+  return ids;
+}
+
+/// The ids whose tags a pattern describes, ascending; those of elements that only end a group where there is no other.
+inline std::vector<uint16_t> idsLike(std::string_view stars)
+{
+  std::string pattern; // where stars follow each other, one says the same
+  std::unique_copy(stars.begin(), stars.end(), std::back_inserter(pattern),
+                   [](char left, char right) { return left == '*' && right == '*'; });
+  std::vector<uint16_t> ids;
+  for (const dictionary::Entry& entry : dictionary::entries())
+  {
+    if (isElement(entry) && isLike(withoutBlanks(entry.tag), pattern))
+    {
+      ids.push_back(entry.id);
+    }
+  }
+  if (std::any_of(ids.begin(), ids.end(), [](uint16_t id) { return !layout::isEndElement(id); }))
+  {
+    ids.erase(std::remove_if(ids.begin(), ids.end(), layout::isEndElement), ids.end());
+  }
+  std::sort(ids.begin(), ids.end());
+  ids.erase(std::unique(ids.begin(), ids.end()), ids.end());
+  return ids;
+}
+
+/// What the XML form shows of a node as attributes.
+enum class Attribute : uint8_t
+{
+  none,
+  id,
+  name,
+  type,
+  header,
+  info,
+  eyeSize,
+  size,
+  extra,
+  encoding,
+  codePage,
+  seconds,
+  fractionA,
+  fractionB,
+  further,
+  offsetMinutes
+};
+
+inline constexpr std::array<std::string_view, 16> kAttributeNames = {
+    "", "id", "name", "type", "header", "info", "eyeSize", "size", "extra", "encoding", "codePage", "seconds",
+    "fractionA", "fractionB", "further", "offsetMinutes"};
+
+/// Attribute::none for a name that no attribute has.
+inline Attribute attributeNamed(std::string_view name) noexcept
+{
+  const auto found = std::find(kAttributeNames.begin() + 1, kAttributeNames.end(), name);
+  return found == kAttributeNames.end() ? Attribute::none : static_cast<Attribute>(found - kAttributeNames.begin());
+}
+
+} // namespace tav::detail::paths
