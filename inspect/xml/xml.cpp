@@ -1,16 +1,13 @@
 #include "tav/inspect/xml.hpp"
 
 #include <algorithm>
-#include <array>
-#include <cstring>
+#include <initializer_list>
 #include <utility>
 #include <vector>
 
 #include "inspect/text/bytes.h"
-#include "tav/cpp/valueText.hpp"
-#include "tav/dictionary.hpp"
+#include "tav/inspect/attributes.hpp"
 #include "tav/inspect/jsonText.hpp"
-#include "tav/inspect/path.hpp"
 #include "tav/inspect/phrases.hpp"
 #include "tav/inspect/value.hpp"
 #include "tav/inspect/walker.hpp"
@@ -20,6 +17,8 @@ namespace tav::inspect
 
 namespace
 {
+
+using detail::paths::Attribute;
 
 constexpr size_t kPiece = size_t{48} * 1024;
 constexpr uint64_t kMaxIndent = 32;
@@ -43,14 +42,6 @@ std::string escaped(std::string_view text, bool attribute)
     }
   }
   return out;
-}
-
-/// The name of a node's element in XML; "element" where the tag is not unique or no name in XML.
-std::string nameOf(uint16_t elm)
-{
-  const std::string text = elementText(elm);
-  const bool letter = (text[0] >= 'a' && text[0] <= 'z') || (text[0] >= 'A' && text[0] <= 'Z') || text[0] == '_';
-  return letter ? text : "element";
 }
 
 /// Writes the events of a walk as XML.
@@ -83,7 +74,7 @@ public:
       if (event.node.isGroup())
       {
         indent(event.depth);
-        out_.write("</" + nameOf(event.node.elm()) + ">\n");
+        out_.write("</" + xmlNameOf(event.node.elm()) + ">\n");
       }
       return;
     case What::damaged:
@@ -101,18 +92,19 @@ private:
     out_.write(" " + std::string(name) + "=\"" + escaped(value, true) + "\"");
   }
 
+  void attributes(const Node& node, std::initializer_list<Attribute> which);
   void beginTag(const Node& node);
-  void beginGroup(const Node& node);
+  void beginGroup(const Node& node)
+  {
+    beginTag(node);
+    out_.write(">\n");
+  }
   void putData(const Node& node);
-  void putDate(const Node& node);
   void putArray(const Node& node);
-  void putText(const Node& node, uint64_t skip);
+  void putText(uint64_t from, uint64_t end);
   void putHex(uint64_t from, uint64_t length);
   void putDamage(const Event& event);
-  bool isText(uint64_t from, uint64_t end);
   std::string_view piece(uint64_t from, uint64_t end);
-  template<class Action>
-  void eachPiece(uint64_t from, uint64_t end, Action action);
 
   ByteSource& source_;
   Form form_;
@@ -128,126 +120,47 @@ std::string_view XmlWriter::piece(uint64_t from, uint64_t end)
   return bytes.substr(0, cutAtCharacter(bytes, kPiece));
 }
 
-template<class Action>
-void XmlWriter::eachPiece(uint64_t from, uint64_t end, Action action)
+void XmlWriter::attributes(const Node& node, std::initializer_list<Attribute> which)
 {
-  while (from < end)
+  for (const Attribute one : which)
   {
-    const std::string_view bytes = piece(from, end);
-    if (bytes.empty() || !action(bytes))
+    if (const auto text = attributeText(source_, form_, node, one))
     {
-      return;
+      attribute(detail::paths::kAttributeNames[static_cast<size_t>(one)], *text);
     }
-    from += bytes.size();
   }
-}
-
-bool XmlWriter::isText(uint64_t from, uint64_t end)
-{
-  bool text = true;
-  eachPiece(from, end, [&](std::string_view bytes) { return text = detail::isXmlText(bytes); });
-  return text;
 }
 
 void XmlWriter::beginTag(const Node& node)
 {
-  const std::string name = nameOf(node.elm());
-  out_.write("<" + name);
-  if (name == "element")
-  {
-    attribute("id", std::to_string(node.elm()));
-    if (const std::string_view known = dictionary::nameOf(node.elm()); !known.empty())
-    {
-      attribute("name", known);
-    }
-  }
-  attribute("type", jsonTypeName(node.type()).value_or(std::to_string(node.type())));
-  if (node.depth == 0)
-  {
-    attribute("header", node.is64() ? "64" : "32");
-  }
-  const uint32_t usual = form_.aligned ? TAV_INFO_ALIGNED8 : 0;
-  if (node.is64() && (node.info() & ~uint32_t{TAV_INFO_EYE_SIZE}) != usual)
-  {
-    attribute("info", hexOffset(node.info()));
-  }
-  if (layout::hasEyeSize(node.header))
-  {
-    attribute("eyeSize", node.has(kNoPair) ? "missing" : node.has(kBadPair) ? "damaged"
-                                                                            : "true");
-  }
-}
-
-void XmlWriter::beginGroup(const Node& node)
-{
-  beginTag(node);
-  if (node.has(kOpen) || node.has(kOverrun))
-  {
-    attribute("size", layout::isSizeUnknown(node.header) ? "unknown" : std::to_string(node.size()));
-  }
-  out_.write(">\n");
+  out_.write("<" + xmlNameOf(node.elm()));
+  attributes(node, {Attribute::id, Attribute::name, Attribute::type, Attribute::header, Attribute::info,
+                    Attribute::eyeSize, Attribute::size, Attribute::extra});
 }
 
 void XmlWriter::putData(const Node& node)
 {
-  const uint16_t type = node.type();
   const uint64_t start = node.payloadOffset();
-  const uint64_t end = start + node.size();
-  const bool number =
-      (type >= TAV_TYPE_UINT8 && type <= TAV_TYPE_SINT64 && node.size() == layout::typeInfo(type).valueSize) ||
-      ((type == TAV_TYPE_UINT128 || type == TAV_TYPE_SINT128) && node.size() == 16);
   beginTag(node);
-  if (node.has(kExtra))
+  switch (xmlValueOf(source_, node))
   {
-    std::array<uint8_t, 2> extra{};
-    attribute("extra", hexText(std::span(extra).first(source_.read(end, extra))));
-  }
-  if (number)
-  {
+  case XmlValue::number: out_.write(">" + plainText(source_, form_, node, kMaxNumber).value_or("")); break;
+  case XmlValue::date:
+    attributes(node, {Attribute::seconds, Attribute::fractionA, Attribute::fractionB, Attribute::further,
+                      Attribute::offsetMinutes});
     out_.write(">" + plainText(source_, form_, node, kMaxNumber).value_or(""));
-  }
-  else if (type == TAV_TYPE_UTC_TIMESTAMP && node.size() == sizeof(TAVTimeStamp))
-  {
-    putDate(node);
-  }
-  else if (type == TAV_TYPE_ASCII_STRING && isText(start, end))
-  {
-    putText(node, 0);
-  }
-  else if (type == TAV_TYPE_UTF8_STRING && node.size() >= 2 && isText(start + 2, end))
-  {
-    putText(node, 2);
-  }
-  else if (type == TAV_TYPE_UINT64_ARRAY && node.size() % 8 == 0)
-  {
-    putArray(node);
-  }
-  else
-  {
+    break;
+  case XmlValue::text:
+    attributes(node, {Attribute::codePage});
+    putText(start + (node.type() == TAV_TYPE_UTF8_STRING ? 2 : 0), start + node.size());
+    break;
+  case XmlValue::array: putArray(node); break;
+  default:
     attribute("encoding", "hex");
     out_.write(">");
     putHex(start, node.size());
   }
-  out_.write("</" + nameOf(node.elm()) + ">\n");
-}
-
-void XmlWriter::putDate(const Node& node)
-{
-  TAVTimeStamp stamp{};
-  const std::vector<uint8_t> bytes = payloadBytes(source_, form_, node, sizeof stamp);
-  std::memcpy(&stamp, bytes.data(), std::min(bytes.size(), sizeof stamp));
-  const std::string text = dateText(stamp);
-  const auto back = parseDate(text);
-  if (!back || std::memcmp(&*back, &stamp, sizeof stamp) != 0)
-  {
-    // What the text does not tell.
-    attribute("seconds", std::to_string(stamp.seconds));
-    attribute("fractionA", std::to_string(stamp.fractionA));
-    attribute("fractionB", std::to_string(stamp.fractionB));
-    attribute("further", std::to_string(stamp.further));
-    attribute("offsetMinutes", std::to_string(stamp.offsetMinutes));
-  }
-  out_.write(">" + text);
+  out_.write("</" + xmlNameOf(node.elm()) + ">\n");
 }
 
 void XmlWriter::putArray(const Node& node)
@@ -263,24 +176,19 @@ void XmlWriter::putArray(const Node& node)
   }
 }
 
-void XmlWriter::putText(const Node& node, uint64_t skip)
+void XmlWriter::putText(uint64_t from, uint64_t end)
 {
-  const uint64_t start = node.payloadOffset();
-  if (skip != 0)
-  {
-    uint16_t codePage = 0;
-    source_.read(start, std::span(reinterpret_cast<uint8_t*>(&codePage), sizeof codePage));
-    codePage = form_.swapped ? kor::byteswap16(codePage) : codePage;
-    if (codePage != kUsualCodePage)
-    {
-      attribute("codePage", std::to_string(codePage));
-    }
-  }
   out_.write(">");
-  eachPiece(start + skip, start + node.size(), [&](std::string_view text) {
-    out_.write(escaped(text, false));
-    return true;
-  });
+  while (from < end)
+  {
+    const std::string_view bytes = piece(from, end);
+    if (bytes.empty())
+    {
+      return;
+    }
+    out_.write(escaped(bytes, false));
+    from += bytes.size();
+  }
 }
 
 void XmlWriter::putHex(uint64_t from, uint64_t length)
