@@ -44,6 +44,7 @@ def seeds_of(name, made, swapped, aligned):
     for choice in (0, form):
         for path in (b"\x0a*/*[2]/cpu", b"\x02**", b"\x09/system/*"):
             yield "c", bytes((choice,)) + path + made
+    yield "path", bytes((flags & 1,)) + b"//host[cpu/cpuOnline > 4]/*[last()]/.. | /system/*[2]"
     yield "recover", bytes((flags,)) + made
     yield "recover", bytes((flags,)) + made[:len(made) * 2 // 3]
     for choice in range(4):
