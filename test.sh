@@ -89,6 +89,13 @@ check_static_analysis()
     kor trace format storage dictionary core api inspect include tools examples
 }
 
+# The description of the format for other languages, compiled, finds what the library finds.
+check_kaitai()
+{
+  build release --target tav_tool
+  tests/system/kaitai/run.sh build/release/tools/tav
+}
+
 check_documents()
 {
   mkdir -p build
@@ -262,6 +269,7 @@ full()
   stage "cppcheck" check_static_analysis
   stage "documents" check_documents
   stage "demo" ./demo.sh
+  stage "Kaitai" check_kaitai
   stage "g++" build_and_test release
   stage "clang++" check_clang
   stage "static libraries" check_static

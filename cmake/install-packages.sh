@@ -1,6 +1,6 @@
 #!/usr/bin/env bash
 # Installs the Debian packages of the named groups that are missing. This is the one list of them.
-#   cmake/install-packages.sh GROUP...        groups: build, test, full, platforms, bench, coverage
+#   cmake/install-packages.sh GROUP...        groups: build, test, full, platforms, bench, coverage, kaitai
 set -euo pipefail
 
 declare -A groups=(
@@ -8,6 +8,7 @@ declare -A groups=(
   [test]="libgtest-dev libgmock-dev pkg-config python3 binutils jq libxml2-utils python3-lxml zsh fish file shared-mime-info"
   [bench]="libbenchmark-dev libbson-dev libmsgpack-dev libcbor-dev libflatbuffers-dev libebml-dev rapidjson-dev libpugixml-dev pkg-config valgrind binutils python3 python3-matplotlib"
   [full]="clang clang-format clang-tidy cppcheck libclang-rt-dev ccache doxygen lintian dpkg-dev gzip abigail-tools valgrind"
+  [kaitai]="nodejs npm"
   [coverage]="gcovr qemu-user-static"
   [platforms]="clang libc++-dev libc++abi-dev googletest ccache qemu-user-static g++-s390x-linux-gnu g++-mingw-w64-x86-64-posix wine64 wine"
 )

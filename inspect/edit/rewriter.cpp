@@ -114,7 +114,7 @@ void Rewriter::gather(const Event& event)
 
 void Rewriter::finishChanged(const Event& end)
 {
-  const Changed changed = std::move(*changed_);
+  const ChangedNode changed = std::move(*changed_);
   changed_.reset();
   const Node& node = end.node;
   const uint64_t size = changed.payload.size();

@@ -15,6 +15,16 @@
 namespace tav::inspect
 {
 
+/// A changed node while its pieces come.
+struct ChangedNode
+{
+  EditPlace place{};
+  std::string payload{};
+  bool extra = false;
+  std::optional<Event> padding{};
+  std::optional<Event> pair{};
+};
+
 class Rewriter
 {
 public:
@@ -33,16 +43,6 @@ private:
     uint64_t header = 0;  ///< in the new stream
     uint64_t payload = 0; ///< likewise
   };
-  /// A changed node while its pieces come.
-  struct Changed
-  {
-    EditPlace place{};
-    std::string payload{};
-    bool extra = false;
-    std::optional<Event> padding{};
-    std::optional<Event> pair{};
-  };
-
   void add(const Event& event);
   void copy(uint64_t offset, uint64_t length);
   void beginNode(const Event& event);
@@ -60,7 +60,7 @@ private:
   PatchFile& out_;
   uint64_t next_ = 0; ///< the place that comes next
   std::optional<EditPlace> place_{};
-  std::optional<Changed> changed_{};
+  std::optional<ChangedNode> changed_{};
   std::vector<Group> groups_{};
 };
 

@@ -107,9 +107,9 @@ class Schema(Folder):
                          "         2  /system/memTotal   Uint32  7\n")
 
     def test_times_are_ordered_by_what_they_stand_for(self):
-        early = {"$type": "UTC TimeStamp", "$value": {"seconds": 100, "fractionA": 999, "fractionB": 0, "further": 0,
+        early = {"$type": "UTC Timestamp", "$value": {"seconds": 100, "fractionA": 999, "fractionB": 0, "further": 0,
                                                       "offsetMinutes": 0}}
-        late = {"$type": "UTC TimeStamp", "$value": {"seconds": 99, "fractionA": 2001, "fractionB": 0, "further": 0,
+        late = {"$type": "UTC Timestamp", "$value": {"seconds": 99, "fractionA": 2001, "fractionB": 0, "further": 0,
                                                      "offsetMinutes": 60}}
         path = self.stream({"system": {"timestamp": [late, early]}})
         line = self.lines(path)[1]

@@ -104,7 +104,7 @@ INSTANTIATE_TEST_SUITE_P(Forms, EditInAForm, testing::Combine(testing::Bool(), t
 
 TEST_P(EditInAForm, ALongerValueKeepsTheStreamSound)
 {
-  for (const size_t length : {0, 1, 4, 8, 100, 300'000})
+  for (const size_t length : std::vector<size_t>{0, 1, 4, 8, 100, 300'000})
   {
     Editor editor(source, form, assign("/system/host/hostName", std::string(length, 'x')));
     EXPECT_EQ(editor.changed(), 1U);

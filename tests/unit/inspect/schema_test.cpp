@@ -116,7 +116,7 @@ TEST(SchemaOfValues, GivesUpCountingTextsAtItsBound)
   writer.finish();
   const auto view = writer.bytes();
   const auto* const first = reinterpret_cast<const uint8_t*>(view.data());
-  for (const uint64_t most : {2, 3, 4})
+  for (const uint64_t most : std::vector<uint64_t>{2, 3, 4})
   {
     Schema schema({.mostTexts = most});
     add(schema, {first, first + view.size()}, {});
