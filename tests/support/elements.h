@@ -42,6 +42,27 @@ struct Element
   }
 };
 
+/// Bytes of a type's value; 0 where values of several sizes have it.
+constexpr uint64_t valueSizeOf(uint16_t type)
+{
+  switch (type)
+  {
+  case 51:
+  case 52:
+  case 105: return 1;
+  case 53:
+  case 54: return 2;
+  case 55:
+  case 56: return 4;
+  case 57:
+  case 58: return 8;
+  case 100:
+  case 103:
+  case 104: return 16;
+  default: return 0;
+  }
+}
+
 inline TAVHeader header32(uint32_t size, uint16_t type, uint16_t elm, uint64_t offset = 0)
 {
   TAVHeader header{};

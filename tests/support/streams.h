@@ -39,6 +39,12 @@ inline Form lowFirst(Form form = {})
   return form;
 }
 
+/// A ring of one page of 16 bytes: a header fills it, and what is behind needs another read.
+inline Form onePage()
+{
+  return {.buffered = true, .pageBytes = 16, .ringBytes = 16};
+}
+
 /// Names for TEST_P instances over forms.
 inline std::string formName(const Form& form)
 {
@@ -94,24 +100,10 @@ private:
   TAVHandle* handle_ = nullptr;
 };
 
-/// A stream being written. Throws when a call fails that the test is not about.
-class StreamWriter
+/// A handle with its storage.
+class Stream
 {
 public:
-  explicit StreamWriter(const Form& form = {}, uint64_t blockBytes = 0x10000, uint64_t mode = TAV_OPT_WRITE)
-      : form_(form), block_(form.buffered ? 0 : blockBytes)
-  {
-    if (form.buffered)
-    {
-      storage_ = std::make_unique<VectorStorage>(form.pageBytes);
-    }
-    else
-    {
-      storage_ = std::make_unique<TAVSSMemory>(block_.data(), block_.size());
-    }
-    handle_ = std::make_unique<Handle>(*storage_, mode, form);
-  }
-
   TAVHandle* handle()
   {
     return handle_->get();
@@ -124,6 +116,38 @@ public:
   {
     return dynamic_cast<VectorStorage&>(*storage_);
   }
+
+protected:
+  explicit Stream(uint64_t blockBytes)
+      : size_(blockBytes), block_(new uint8_t[size_ != 0 ? size_ : 1]())
+  {
+  }
+
+  // In this order: the handle ends before what it is over.
+  uint64_t size_;
+  std::unique_ptr<uint8_t[]> block_;
+  std::unique_ptr<TAVSideStorage> storage_;
+  std::unique_ptr<Handle> handle_;
+};
+
+/// A stream being written. Throws when a call fails that the test is not about.
+class StreamWriter : public Stream
+{
+public:
+  explicit StreamWriter(const Form& form = {}, uint64_t blockBytes = 0x10000, uint64_t mode = TAV_OPT_WRITE)
+      : Stream(form.buffered ? 0 : blockBytes), form_(form)
+  {
+    if (form.buffered)
+    {
+      storage_ = std::make_unique<VectorStorage>(form.pageBytes);
+    }
+    else
+    {
+      storage_ = std::make_unique<TAVSSMemory>(block_.get(), size_);
+    }
+    handle_ = std::make_unique<Handle>(*storage_, mode, form);
+  }
+
   [[nodiscard]] const Form& form() const
   {
     return form_;
@@ -160,10 +184,10 @@ public:
   /// block's end, which the writer counts all the same, there is none.
   Bytes bytes()
   {
-    const uint64_t count = form_.buffered ? length() : std::min<uint64_t>(length(), block_.size());
+    const uint64_t count = form_.buffered ? length() : std::min<uint64_t>(length(), size_);
     if (!form_.buffered)
     {
-      return {block_.begin(), block_.begin() + static_cast<ptrdiff_t>(count)};
+      return {block_.get(), block_.get() + count};
     }
     check((*handle_)->pCircularBuf->reset(), "reset");
     const Bytes& all = vectorStorage().bytes;
@@ -172,22 +196,18 @@ public:
 
 private:
   Form form_;
-  Bytes block_;
-  std::unique_ptr<TAVSideStorage> storage_;
-  std::unique_ptr<Handle> handle_;
 };
 
 /// A handle for reading over bytes of a stream. Over memory the bytes lie in a heap block of exactly their size, so
 /// that a step outside is seen by the address sanitizer. `slack` adds zero bytes behind the stream: readers of direct
 /// memory do not see an eye/size pair that ends at the block's very end.
-class StreamReader
+class StreamReader : public Stream
 {
 public:
   explicit StreamReader(const Bytes& bytes, const Form& form = {}, uint64_t slack = 0)
-      : size_(bytes.size() + slack), block_(new uint8_t[size_ != 0 ? size_ : 1])
+      : Stream(bytes.size() + slack)
   {
     std::copy(bytes.begin(), bytes.end(), block_.get());
-    std::fill_n(block_.get() + bytes.size(), slack, uint8_t{0});
     if (form.buffered)
     {
       storage_ = std::make_unique<VectorStorage>(form.pageBytes, Bytes(block_.get(), block_.get() + size_),
@@ -200,25 +220,6 @@ public:
     }
     handle_ = std::make_unique<Handle>(*storage_, TAV_OPT_READ, form);
   }
-
-  TAVHandle* handle()
-  {
-    return handle_->get();
-  }
-  TAVSideStorage& storage()
-  {
-    return *storage_;
-  }
-  VectorStorage& vectorStorage()
-  {
-    return dynamic_cast<VectorStorage&>(*storage_);
-  }
-
-private:
-  uint64_t size_;
-  std::unique_ptr<uint8_t[]> block_;
-  std::unique_ptr<TAVSideStorage> storage_;
-  std::unique_ptr<Handle> handle_;
 };
 
 } // namespace test

@@ -7,11 +7,17 @@
 #include <string>
 #include <vector>
 
+#include <gmock/gmock.h>
+
 #include "tav/kor.h"
 #include "tav/probes.h"
 
 namespace test
 {
+
+// What is expected of a trace's failures, steps and dumps.
+using ::testing::ElementsAre;
+using ::testing::IsEmpty;
 
 /// A failure that a function reported: where, and with which code.
 struct Failure

@@ -15,6 +15,10 @@
 namespace test
 {
 
+inline constexpr uint16_t kRoot = 20;                // 0x0014
+inline constexpr uint16_t kBlob = 60001;             // 0xEA61
+inline constexpr uint32_t kStorageCode = 0x90000777; ///< no code of the library
+
 /// Direct and buffered, both byte orders, packed and aligned.
 inline std::vector<Form> allForms()
 {

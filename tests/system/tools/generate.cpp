@@ -191,24 +191,13 @@ private:
 
   uint64_t sizeOf(uint16_t type)
   {
-    switch (type)
+    const uint64_t exact = test::valueSizeOf(type);
+    if (exact != 0)
     {
-    case 51:
-    case 52:
-    case 105: return 1;
-    case 53:
-    case 54: return 2;
-    case 55:
-    case 56: return 4;
-    case 57:
-    case 58: return 8;
-    case 100:
-    case 103:
-    case 104: return 16;
-    case 106: return below(5) * 8;
-    case 102: return 2 + below(30);
-    default: return below(40);
+      return exact;
     }
+    return type == TAV_TYPE_UINT64_ARRAY ? below(5) * 8 : type == TAV_TYPE_UTF8_STRING ? 2 + below(30)
+                                                                                       : below(40);
   }
 
   void addData(bool wide)

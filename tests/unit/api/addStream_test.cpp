@@ -16,13 +16,6 @@ namespace
 using namespace tav;
 using namespace test;
 
-using ::testing::ElementsAre;
-using ::testing::IsEmpty;
-
-constexpr uint16_t kRoot = 20;
-constexpr uint16_t kBlob = 60001;
-constexpr uint32_t kStorageCode = 0x90000777; // no code of the library
-
 class AddStream : public ::testing::TestWithParam<Form>
 {
 };

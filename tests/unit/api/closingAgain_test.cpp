@@ -21,7 +21,6 @@ namespace
 using namespace tav;
 using namespace test;
 
-constexpr uint16_t kRoot = 20;
 constexpr uint16_t kGroup = 60102;
 constexpr uint16_t kValue = 60110;
 constexpr uint32_t kRefusal = 0x90000777; // no code of the library

@@ -16,11 +16,6 @@ namespace
 using namespace tav;
 using namespace test;
 
-using ::testing::ElementsAre;
-
-constexpr uint16_t kRoot = 20;    // 0x0014
-constexpr uint16_t kBlob = 60001; // 0xEA61
-
 TEST(CloseHeaderFailure, LeavesTheGroupOpenAndItsNewSizeInTheEntry)
 {
   StreamWriter writer;

@@ -19,12 +19,7 @@ namespace
 using namespace tav;
 using namespace test;
 
-using ::testing::ElementsAre;
-using ::testing::IsEmpty;
-
-constexpr uint16_t kRoot = 20;     // 0x0014
 constexpr uint16_t kGroup = 60100; // 0xEAC4
-constexpr uint16_t kBlob = 60001;  // 0xEA61
 
 class CloseHeader : public ::testing::TestWithParam<Form>
 {
@@ -197,39 +192,34 @@ TEST_P(CloseHeader, AbandonsAGroupAsIfItHadNotBeenOpened)
   EXPECT_EQ(writer.add(binary(kBlob, {9})).nodeOffset, group.nodeOffset);
 }
 
-TEST_P(CloseHeader, PutsTheOpeningSizeBackIntoAnAbandonedGroup)
+/// A group whose header was overwritten since, and which is abandoned then: its header is `bytes`.
+void expectSizePutBack(const Form& form, const Element& group, uint64_t headerBytes, const char* bytes)
 {
-  StreamWriter writer(GetParam());
-  writer.add(group64(kRoot, TAV_TYPE_HEADER64, 0, 0x1122334455667788));
+  StreamWriter writer(form);
+  writer.add(group);
   uint64_t position = 0;
-  const Bytes other(16, 0xEE);
+  const Bytes other(headerBytes, 0xEE);
   check(writer.handle()->pCircularBuf != nullptr
             ? writer.handle()->pCircularBuf->write(position, other.data(), other.size(), false)
             : (std::copy(other.begin(), other.end(), writer.handle()->pDirectData), TAV_RC_OK),
         "write");
   writer.abandon();
   EXPECT_EQ(writer.length(), 0U);
-  writer.handle()->streamBytes = 16;
-  EXPECT_EQ(toHex(writer.bytes()),
-            rows(isBigEndian(GetParam()) ? "11 22 33 44 55 66 77 88 EE EE EE EE EE EE EE EE"
-                                         : "88 77 66 55 44 33 22 11 EE EE EE EE EE EE EE EE"));
+  writer.handle()->streamBytes = headerBytes;
+  EXPECT_EQ(toHex(writer.bytes()), rows(bytes));
+}
+
+TEST_P(CloseHeader, PutsTheOpeningSizeBackIntoAnAbandonedGroup)
+{
+  expectSizePutBack(GetParam(), group64(kRoot, TAV_TYPE_HEADER64, 0, 0x1122334455667788), 16,
+                    isBigEndian(GetParam()) ? "11 22 33 44 55 66 77 88 EE EE EE EE EE EE EE EE"
+                                            : "88 77 66 55 44 33 22 11 EE EE EE EE EE EE EE EE");
 }
 
 TEST_P(CloseHeader, PutsFourBytesOfSizeBackIntoAnAbandoned32BitGroup)
 {
-  StreamWriter writer(GetParam());
-  writer.add(group32(kRoot, 0x11223344));
-  uint64_t position = 0;
-  const Bytes other(8, 0xEE);
-  check(writer.handle()->pCircularBuf != nullptr
-            ? writer.handle()->pCircularBuf->write(position, other.data(), other.size(), false)
-            : (std::copy(other.begin(), other.end(), writer.handle()->pDirectData), TAV_RC_OK),
-        "write");
-  writer.abandon();
-  EXPECT_EQ(writer.length(), 0U);
-  writer.handle()->streamBytes = 8;
-  EXPECT_EQ(toHex(writer.bytes()),
-            rows(isBigEndian(GetParam()) ? "11 22 33 44 EE EE EE EE" : "44 33 22 11 EE EE EE EE"));
+  expectSizePutBack(GetParam(), group32(kRoot, 0x11223344), 8,
+                    isBigEndian(GetParam()) ? "11 22 33 44 EE EE EE EE" : "44 33 22 11 EE EE EE EE");
 }
 
 TEST_P(CloseHeader, AllowsAnotherRootBehindTheFirst)
@@ -240,24 +230,23 @@ TEST_P(CloseHeader, AllowsAnotherRootBehindTheFirst)
   EXPECT_EQ(writer.add(group32(kRoot)).nodeOffset, 16U);
 }
 
-TEST(CloseHeaderSize, Of32BitsIsCut)
+TEST(CloseHeaderSize, IsCutTo32BitsInANarrowHeaderAlone)
 {
-  StreamWriter writer(lowFirst());
-  writer.add(group32(kRoot));
-  writer.handle()->streamBytes = 8 + 0x500000007;
-  EXPECT_EQ(tavCloseHeader(0, writer.handle()), TAV_RC_OK);
-  EXPECT_EQ(toHex(Bytes(writer.handle()->pDirectData, writer.handle()->pDirectData + 8)),
-            rows("07 00 00 00 01 00 14 00"));
-}
-
-TEST(CloseHeaderSize, Of64BitsIsNotCut)
-{
-  StreamWriter writer(lowFirst());
-  writer.add(group64(kRoot));
-  writer.handle()->streamBytes = 16 + 0x500000007;
-  EXPECT_EQ(tavCloseHeader(0, writer.handle()), TAV_RC_OK);
-  EXPECT_EQ(toHex(Bytes(writer.handle()->pDirectData, writer.handle()->pDirectData + 8)),
-            rows("07 00 00 00 05 00 00 00"));
+  struct Row
+  {
+    Element group;
+    uint64_t headerBytes;
+    const char* bytes;
+  };
+  for (const Row& row :
+       {Row{group32(kRoot), 8, "07 00 00 00 01 00 14 00"}, Row{group64(kRoot), 16, "07 00 00 00 05 00 00 00"}})
+  {
+    StreamWriter writer(lowFirst());
+    writer.add(row.group);
+    writer.handle()->streamBytes = row.headerBytes + 0x500000007;
+    EXPECT_EQ(tavCloseHeader(0, writer.handle()), TAV_RC_OK);
+    EXPECT_EQ(toHex(Bytes(writer.handle()->pDirectData, writer.handle()->pDirectData + 8)), rows(row.bytes));
+  }
 }
 
 TEST(CloseHeaderSize, StaysInTheEntryThatWasTakenOffTheStack)

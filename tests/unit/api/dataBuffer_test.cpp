@@ -19,8 +19,6 @@ namespace
 using namespace tav;
 using namespace test;
 
-using ::testing::ElementsAre;
-
 constexpr uint32_t kId = probe::getNextDataBuffer;
 constexpr uint32_t kRefused = 0x90000035;
 const Failure kNoMore{kId, 40, TAV_RC_NO_MORE_DATA};

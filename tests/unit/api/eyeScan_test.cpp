@@ -16,8 +16,6 @@ namespace
 using namespace tav;
 using namespace test;
 
-using ::testing::ElementsAre;
-
 constexpr uint32_t kRefused = 0x90000035;
 
 /// What a scan gave, beginning as something that no scan gives.
@@ -275,10 +273,7 @@ TEST(EyeScanOverPages, StopsAtTheLimitWhateverThePages)
 
 TEST(EyeScanOverPages, PassesTheCodeOfAnyFetchOn)
 {
-  Form form;
-  form.buffered = true;
-  form.pageBytes = 16;
-  form.ringBytes = 16;
+  const Form form = onePage();
   const Bytes bytes = ByteRows().fill(30, 0x33).pair(4).bytes;
   const std::pair<uint64_t, uint32_t> rows[] = {{1, 50}, {2, 60}, {3, 60}, {4, 0}};
   for (const auto& [nth, point] : rows)
@@ -302,10 +297,7 @@ TEST(EyeScanOverPages, PassesTheCodeOfAnyFetchOn)
 
 TEST(EyeScanOverPages, PassesTheCodeOfTheDistancesFetchOn)
 {
-  Form form;
-  form.buffered = true;
-  form.pageBytes = 16;
-  form.ringBytes = 16;
+  const Form form = onePage();
   StreamReader reader(ByteRows().fill(8, 0x33).pair(4).bytes, form);
   reader.vectorStorage().failAt(2, kRefused);
   TraceLog trace;

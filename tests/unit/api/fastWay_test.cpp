@@ -19,9 +19,8 @@ namespace
 
 using namespace test;
 
-constexpr uint16_t kRoot = 1000;
+constexpr uint16_t kStart = 1000;
 constexpr uint16_t kOther = 8;
-constexpr uint32_t kStorageCode = 0x90000777; // no code of the library
 
 /// The code that a call gives, which must not depend on a trace.
 uint32_t codeOf(const std::function<uint32_t()>& call)
@@ -35,7 +34,7 @@ uint32_t codeOf(const std::function<uint32_t()>& call)
 Bytes smallStream()
 {
   StreamWriter writer;
-  writer.add(group64(kRoot));
+  writer.add(group64(kStart));
   writer.add(u32(kOther, 1));
   writer.add(u32(kOther, 2));
   writer.close();
@@ -100,7 +99,7 @@ TEST(FastAdd, NeedsHandleAndDescriptor)
   for (const bool buffered : {false, true})
   {
     StreamWriter writer({.buffered = buffered});
-    writer.add(group64(kRoot));
+    writer.add(group64(kStart));
     EXPECT_EQ(codeOf([&] { return tavAddElement(0, writer.handle(), nullptr); }), TAV_RC_BAD_PARAM);
   }
   Element node = u32(kOther, 1);
@@ -111,7 +110,7 @@ TEST(FastAdd, NeedsHandleAndDescriptor)
 TEST(FastAdd, NeedsTheRingOfAHandleThatIsNotDirect)
 {
   StreamWriter writer({.buffered = true});
-  writer.add(group64(kRoot));
+  writer.add(group64(kStart));
   const WithoutRing without(writer.handle());
   for (Element node : {group64(kOther), u32(kOther, 1)})
   {
@@ -123,7 +122,7 @@ TEST(FastAdd, NeedsTheRingOfAHandleThatIsNotDirect)
 TEST(FastAdd, NeedsTheBlockOfADirectHandle)
 {
   StreamWriter writer;
-  writer.add(group64(kRoot));
+  writer.add(group64(kStart));
   uint8_t* const block = std::exchange(writer.handle()->pDirectData, nullptr);
   for (Element node : {group64(kOther), u32(kOther, 1)})
   {
@@ -150,7 +149,7 @@ TEST(FastAdd, IsRefusedByAReader)
 TEST(FastAdd, RefusesAHeaderOfNoKnownForm)
 {
   StreamWriter writer;
-  writer.add(group64(kRoot));
+  writer.add(group64(kStart));
   Element node = u32(kOther, 1);
   node.header.hdrType = 7;
   TAVHeaderData data = node.data();
@@ -164,7 +163,7 @@ TEST(FastAdd, TakesNothingBeforeAnEmptyStackForTheOpenGroup)
   {
     StreamWriter writer({.buffered = buffered});
     TAVHdrStack& stack = *writer.handle()->pHdrStack;
-    TAVHeader entries[2] = {group64(kRoot).header, {}};
+    TAVHeader entries[2] = {group64(kStart).header, {}};
     TAVHeader* const own = std::exchange(stack.pEntries, &entries[1]);
     Element node = u32(kOther, 1);
     TAVHeaderData data = node.data();
@@ -188,7 +187,7 @@ TEST(AddInPieces, EndsWithTheStoragesCodeAtAnyPiece)
   for (uint64_t nth = 1; code != TAV_RC_OK; ++nth)
   {
     StreamWriter writer({.buffered = true, .swap = true});
-    writer.add(group64(kRoot));
+    writer.add(group64(kStart));
     writer.vectorStorage().failAt(nth, kStorageCode);
     code = addTurned(writer);
     told += code == kStorageCode ? 1 : 0;

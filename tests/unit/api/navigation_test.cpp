@@ -20,9 +20,6 @@ namespace
 using namespace tav;
 using namespace test;
 
-using ::testing::ElementsAre;
-using ::testing::IsEmpty;
-
 constexpr uint32_t kId = probe::getNextChild;
 constexpr uint64_t kNear64 = ~uint64_t{0} - 7;
 
@@ -246,22 +243,22 @@ TEST_P(NextChild, AfterAnElementBeginsBehindItsDataPaddingAndPair)
   }
 }
 
-TEST_P(NextChild, EndsWhereTheParentEnds)
+TEST_P(NextChild, EndsWhereTheParentEndsAndLiesOutsideOneThatTheReferenceOverruns)
 {
+  struct Row
+  {
+    uint64_t size;
+    uint32_t point;
+    uint32_t code;
+  };
   rows.fill(80);
-  TAVHeader parent = header64(24, TAV_TYPE_HEADER64, 1);
-  TAVHeader child = header64(8, TAV_TYPE_BINARY, 2, 0, 16);
-  EXPECT_EQ(next(&parent, &child), TAV_RC_NO_MORE_CHILDREN);
-  EXPECT_EQ(failures(), one(120, TAV_RC_NO_MORE_CHILDREN));
-}
-
-TEST_P(NextChild, LiesOutsideAParentThatTheReferenceOverruns)
-{
-  rows.fill(80);
-  TAVHeader parent = header64(24, TAV_TYPE_HEADER64, 1);
-  TAVHeader child = header64(9, TAV_TYPE_BINARY, 2, 0, 16);
-  EXPECT_EQ(next(&parent, &child), TAV_RC_OUTSIDE_PARENT);
-  EXPECT_EQ(failures(), one(110, TAV_RC_OUTSIDE_PARENT));
+  for (const Row& row : {Row{8, 120, TAV_RC_NO_MORE_CHILDREN}, Row{9, 110, TAV_RC_OUTSIDE_PARENT}})
+  {
+    TAVHeader parent = header64(24, TAV_TYPE_HEADER64, 1);
+    TAVHeader child = header64(row.size, TAV_TYPE_BINARY, 2, 0, 16);
+    EXPECT_EQ(next(&parent, &child), row.code);
+    EXPECT_EQ(failures(), one(row.point, row.code));
+  }
 }
 
 TEST_P(NextChild, LiesOutsideWhenItWouldPass64Bits)

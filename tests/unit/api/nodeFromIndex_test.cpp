@@ -17,9 +17,6 @@ namespace
 using namespace tav;
 using namespace test;
 
-using ::testing::ElementsAre;
-using ::testing::IsEmpty;
-
 constexpr uint64_t kAfter = 0x4;
 constexpr uint32_t kId = probe::findNodeFromIndex;
 

@@ -26,10 +26,11 @@ TEST(PairMemory, KnowsWhatWasCovered)
 {
   PairMemory pairs;
   pairs.cover(100, 200);
-  EXPECT_EQ(endAt(pairs, 99), 0U);
-  EXPECT_EQ(endAt(pairs, 100), 200U);
-  EXPECT_EQ(endAt(pairs, 199), 200U);
-  EXPECT_EQ(endAt(pairs, 200), 0U);
+  const std::pair<uint64_t, uint64_t> ends[] = {{99, 0}, {100, 200}, {199, 200}, {200, 0}};
+  for (const auto& [place, end] : ends)
+  {
+    EXPECT_EQ(endAt(pairs, place), end) << place;
+  }
   EXPECT_EQ(nextFrom(pairs, 99), 100U);
   EXPECT_EQ(nextFrom(pairs, 100), ~uint64_t{0});
 }

@@ -18,44 +18,45 @@ std::string baseOf(const TAVSideStorage& storage)
   return bytesOf(storage);
 }
 
+/// What a parameter object holds behind its version.
+struct Fields
+{
+  const TAVSideStorage* storage = nullptr;
+  uint64_t options = 1;
+  uint64_t ringBytes = 0xA00000;
+  uint64_t auxSize = 0x20000;
+  uint8_t byteOrder = 0;
+  uint8_t alignMode = 0;
+};
+
+void expectFields(const TAVInitParam& param, const Fields& fields)
+{
+  EXPECT_EQ(param.version, 0x09050000U);
+  EXPECT_EQ(param.pSideStorage, fields.storage);
+  EXPECT_EQ(param.options, fields.options);
+  EXPECT_EQ(param.circularBufSize, fields.ringBytes);
+  EXPECT_EQ(param.auxSize, fields.auxSize);
+  EXPECT_EQ(param.byteOrder, fields.byteOrder);
+  EXPECT_EQ(param.alignMode, fields.alignMode);
+}
+
 TEST(InitParam, HasDefaults)
 {
-  const TAVInitParam param;
-  EXPECT_EQ(param.version, 0x09050000U);
-  EXPECT_EQ(param.pSideStorage, nullptr);
-  EXPECT_EQ(param.options, 1U);
-  EXPECT_EQ(param.circularBufSize, 0xA00000U);
-  EXPECT_EQ(param.auxSize, 0x20000U);
-  EXPECT_EQ(param.byteOrder, 0U);
-  EXPECT_EQ(param.alignMode, 0U);
+  expectFields(TAVInitParam(), {});
 }
 
 TEST(InitParam, TakesStorageAndOptions)
 {
   std::array<uint8_t, 8> block{};
   TAVSSMemory storage(block.data(), block.size());
-  const TAVInitParam param(&storage, 0x12);
-  EXPECT_EQ(param.version, 0x09050000U);
-  EXPECT_EQ(param.pSideStorage, &storage);
-  EXPECT_EQ(param.options, 0x12U);
-  EXPECT_EQ(param.circularBufSize, 0xA00000U);
-  EXPECT_EQ(param.auxSize, 0x20000U);
-  EXPECT_EQ(param.byteOrder, 0U);
-  EXPECT_EQ(param.alignMode, 0U);
+  expectFields(TAVInitParam(&storage, 0x12), {.storage = &storage, .options = 0x12});
 }
 
 TEST(InitParam, TakesEveryField)
 {
   std::array<uint8_t, 8> block{};
   TAVSSMemory storage(block.data(), block.size());
-  const TAVInitParam param(&storage, 4, 0x1111, 0x2222, 3, 1);
-  EXPECT_EQ(param.version, 0x09050000U);
-  EXPECT_EQ(param.pSideStorage, &storage);
-  EXPECT_EQ(param.options, 4U);
-  EXPECT_EQ(param.circularBufSize, 0x1111U);
-  EXPECT_EQ(param.auxSize, 0x2222U);
-  EXPECT_EQ(param.byteOrder, 3U);
-  EXPECT_EQ(param.alignMode, 1U);
+  expectFields(TAVInitParam(&storage, 4, 0x1111, 0x2222, 3, 1), {&storage, 4, 0x1111, 0x2222, 3, 1});
 }
 
 TEST(InitParam, GivesTheVersionThatItHolds)
@@ -66,23 +67,30 @@ TEST(InitParam, GivesTheVersionThatItHolds)
   EXPECT_EQ(param.getVersion(), 7U);
 }
 
-TEST(InitParamTrace, ShowsItsLife)
+/// The trace of an object that is made, asked for its version, and goes.
+template<class Param>
+void expectLife(uint32_t made, uint32_t asked, uint32_t gone)
 {
   TraceLog trace;
   {
-    const TAVInitParam param;
+    const Param param;
     param.getVersion();
-    EXPECT_THAT(trace.dump(0x88A0001, 100).items, ElementsAre(bytesOf(param)));
+    EXPECT_THAT(trace.dump(made, 100).items, ElementsAre(bytesOf(param)));
   }
-  EXPECT_THAT(trace.steps(), ElementsAre(Step{KOR_TRACE_ENTRY, 0x88A0001, 0}, Step{KOR_TRACE_VAR, 0x88A0001, 100},
-                                         Step{KOR_TRACE_EXIT, 0x88A0001, 0}, Step{KOR_TRACE_ENTRY, 0x88A0003, 0},
-                                         Step{KOR_TRACE_VAR, 0x88A0003, 100}, Step{KOR_TRACE_EXIT, 0x88A0003, 0},
-                                         Step{KOR_TRACE_ENTRY, 0x88A0002, 0}, Step{KOR_TRACE_EXIT, 0x88A0002, 0}));
-  EXPECT_THAT(trace.dump(0x88A0003, 100).items, ElementsAre(bytesOf(TAV_STRUCT_VERSION)));
+  EXPECT_THAT(trace.steps(), ElementsAre(Step{KOR_TRACE_ENTRY, made, 0}, Step{KOR_TRACE_VAR, made, 100},
+                                         Step{KOR_TRACE_EXIT, made, 0}, Step{KOR_TRACE_ENTRY, asked, 0},
+                                         Step{KOR_TRACE_VAR, asked, 100}, Step{KOR_TRACE_EXIT, asked, 0},
+                                         Step{KOR_TRACE_ENTRY, gone, 0}, Step{KOR_TRACE_EXIT, gone, 0}));
+  EXPECT_THAT(trace.dump(asked, 100).items, ElementsAre(bytesOf(TAV_STRUCT_VERSION)));
   for (const Record& record : trace.records())
   {
     EXPECT_EQ(record.code, 0U);
   }
+}
+
+TEST(InitParamTrace, ShowsItsLife)
+{
+  expectLife<TAVInitParam>(0x88A0001, 0x88A0003, 0x88A0002);
 }
 
 TEST(InitParamTrace, ShowsStorageAndOptions)
@@ -135,17 +143,7 @@ TEST(ResetParam, HasDefaultsAndAVersion)
 
 TEST(ResetParam, TracesItsLife)
 {
-  TraceLog trace;
-  {
-    const TAVResetParam param;
-    param.getVersion();
-    EXPECT_THAT(trace.dump(0x88A0004, 100).items, ElementsAre(bytesOf(param)));
-  }
-  EXPECT_THAT(trace.dump(0x88A0006, 100).items, ElementsAre(bytesOf(TAV_STRUCT_VERSION)));
-  EXPECT_THAT(trace.steps(), ElementsAre(Step{KOR_TRACE_ENTRY, 0x88A0004, 0}, Step{KOR_TRACE_VAR, 0x88A0004, 100},
-                                         Step{KOR_TRACE_EXIT, 0x88A0004, 0}, Step{KOR_TRACE_ENTRY, 0x88A0006, 0},
-                                         Step{KOR_TRACE_VAR, 0x88A0006, 100}, Step{KOR_TRACE_EXIT, 0x88A0006, 0},
-                                         Step{KOR_TRACE_ENTRY, 0x88A0005, 0}, Step{KOR_TRACE_EXIT, 0x88A0005, 0}));
+  expectLife<TAVResetParam>(0x88A0004, 0x88A0006, 0x88A0005);
 }
 
 } // namespace

@@ -19,9 +19,6 @@ namespace
 using namespace tav;
 using namespace test;
 
-using ::testing::ElementsAre;
-using ::testing::IsEmpty;
-
 constexpr uint32_t kId = probe::getPrevNode;
 constexpr uint32_t kRefused = 0x90000035;
 
@@ -243,15 +240,6 @@ TEST(PreviousNodeOverMemory, CountsFromTheBlocksOffset)
   TraceLog trace;
   EXPECT_EQ(tavGetPrevNode(0, reader.handle(), &reference, &out), TAV_RC_NO_MEMORY) << "the pair begins before";
   EXPECT_THAT(trace.failures(), ElementsAre(Failure{kId, 50, TAV_RC_NO_MEMORY}));
-}
-
-Form onePage()
-{
-  Form form;
-  form.buffered = true;
-  form.pageBytes = 16;
-  form.ringBytes = 16;
-  return form;
 }
 
 TEST(PreviousNodeThroughARing, NeedsTheRingBeforeAnythingElse)

@@ -144,23 +144,9 @@ private:
 
   uint64_t usualSize(uint16_t type)
   {
-    switch (type)
-    {
-    case 51:
-    case 52:
-    case 105: return 1;
-    case 53:
-    case 54: return 2;
-    case 55:
-    case 56: return 4;
-    case 57:
-    case 58: return 8;
-    case 100:
-    case 103:
-    case 104: return 16;
-    case 106: return 8 * below(4);
-    default: return below(30);
-    }
+    const uint64_t exact = valueSizeOf(type);
+    return exact != 0 ? exact : type == TAV_TYPE_UINT64_ARRAY ? 8 * below(4)
+                                                              : below(30);
   }
 
   std::mt19937_64 random_;

@@ -20,9 +20,6 @@ using namespace tav;
 using namespace tav::inside;
 using namespace test;
 
-using ::testing::ElementsAre;
-using ::testing::IsEmpty;
-
 const std::string kProlog = "<?xml version=\"1.0\" encoding=\"UTF-8\" ?>\n";
 
 Element anyGroup(bool wide, uint16_t elm)

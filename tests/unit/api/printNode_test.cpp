@@ -19,8 +19,6 @@ using namespace tav;
 using namespace tav::inside;
 using namespace test;
 
-using ::testing::ElementsAre;
-
 enum class Kind
 {
   element32,
@@ -208,69 +206,37 @@ TEST_P(NodeBody, IsEmptyWithDescriptorsAloneAndUnusedBits)
   }
 }
 
-TEST_P(NodeBody, AsTextIsItsHeader)
+TEST_P(NodeBody, IsWhatTheOptionsAskForInThisOrder)
 {
-  EXPECT_EQ(body(0x2), printed(TAV_RC_OK, GetParam().textHeader));
-}
-
-TEST_P(NodeBody, AsTextHasNoDescriptorsWithoutData)
-{
-  EXPECT_EQ(body(0xA), printed(TAV_RC_OK, GetParam().textHeader));
-}
-
-TEST_P(NodeBody, AsTextIsItsDataOnALineOfItsOwn)
-{
-  EXPECT_EQ(body(0x4), printed(TAV_RC_OK, GetParam().group ? "" : "  0|   A\n"));
-}
-
-TEST_P(NodeBody, AsTextIsHeaderThenData)
-{
-  EXPECT_EQ(body(0x6), printed(TAV_RC_OK, GetParam().textHeader + (GetParam().group ? "" : "  0|   A\n")));
-}
-
-TEST_P(NodeBody, AsTextHasDescriptorsBeforeTheData)
-{
-  EXPECT_EQ(body(0xC), printed(TAV_RC_OK, textDescriptor() + (GetParam().group ? "" : "  0|   A\n")));
-}
-
-TEST_P(NodeBody, AsTextHasAllThree)
-{
-  EXPECT_EQ(body(0xE),
-            printed(TAV_RC_OK, GetParam().textHeader + textDescriptor() + (GetParam().group ? "" : "  0|   A\n")));
-}
-
-TEST_P(NodeBody, AsXmlIsItsHeader)
-{
-  EXPECT_EQ(body(0x42), printed(TAV_RC_OK, GetParam().xmlHeader));
-}
-
-TEST_P(NodeBody, AsXmlHasNoDescriptorsWithoutData)
-{
-  EXPECT_EQ(body(0x4A), printed(TAV_RC_OK, GetParam().xmlHeader));
-}
-
-TEST_P(NodeBody, AsXmlIsItsDataWithoutDecoration)
-{
-  EXPECT_EQ(body(0x44), printed(TAV_RC_OK, GetParam().group ? "" : "A"));
-}
-
-TEST_P(NodeBody, AsXmlIsHeaderThenWrappedData)
-{
-  EXPECT_EQ(body(0x46), printed(TAV_RC_OK, GetParam().xmlHeader + (GetParam().group ? "   <tavData></tavData>\n"
-                                                                                    : "   <tavData>A</tavData>\n")));
-}
-
-TEST_P(NodeBody, AsXmlHasDescriptorsBeforeWrappedData)
-{
-  EXPECT_EQ(body(0x4C), printed(TAV_RC_OK, xmlDescriptor() + (GetParam().group ? "   <tavData></tavData>\n"
-                                                                               : "   <tavData>A</tavData>\n")));
-}
-
-TEST_P(NodeBody, AsXmlHasAllThree)
-{
-  EXPECT_EQ(body(0x4E),
-            printed(TAV_RC_OK, GetParam().xmlHeader + xmlDescriptor() +
-                                   (GetParam().group ? "   <tavData></tavData>\n" : "   <tavData>A</tavData>\n")));
+  struct Row
+  {
+    const char* name;
+    uint64_t options;
+    std::string text;
+  };
+  const std::string& textHeader = GetParam().textHeader;
+  const std::string& xmlHeader = GetParam().xmlHeader;
+  const std::string textData = GetParam().group ? "" : "  0|   A\n";
+  const std::string bareData = GetParam().group ? "" : "A";
+  const std::string xmlData = GetParam().group ? "   <tavData></tavData>\n" : "   <tavData>A</tavData>\n";
+  const Row rows[] = {
+      {"as text the header", 0x2, textHeader},
+      {"as text no descriptors without data", 0xA, textHeader},
+      {"as text the data on a line of its own", 0x4, textData},
+      {"as text the header, then the data", 0x6, textHeader + textData},
+      {"as text the descriptors before the data", 0xC, textDescriptor() + textData},
+      {"as text all three", 0xE, textHeader + textDescriptor() + textData},
+      {"as XML the header", 0x42, xmlHeader},
+      {"as XML no descriptors without data", 0x4A, xmlHeader},
+      {"as XML the data without decoration", 0x44, bareData},
+      {"as XML the header, then wrapped data", 0x46, xmlHeader + xmlData},
+      {"as XML the descriptors before wrapped data", 0x4C, xmlDescriptor() + xmlData},
+      {"as XML all three", 0x4E, xmlHeader + xmlDescriptor() + xmlData},
+  };
+  for (const Row& row : rows)
+  {
+    EXPECT_EQ(body(row.options), printed(TAV_RC_OK, row.text)) << row.name;
+  }
 }
 
 TEST_P(NodeBody, WithBareIsTheValueWhateverElseIsAsked)

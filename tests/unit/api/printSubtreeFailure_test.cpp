@@ -22,8 +22,6 @@ using namespace tav;
 using namespace tav::inside;
 using namespace test;
 
-using ::testing::ElementsAre;
-
 const std::string kProlog = "<?xml version=\"1.0\" encoding=\"UTF-8\" ?>\n";
 
 /// A root with one number.

@@ -18,9 +18,6 @@ using namespace tav;
 using namespace tav::inside;
 using namespace test;
 
-using ::testing::ElementsAre;
-using ::testing::IsEmpty;
-
 const std::string kProlog = "<?xml version=\"1.0\" encoding=\"UTF-8\" ?>\n";
 
 Element anyGroup(const Form& form, uint16_t elm)
@@ -482,23 +479,24 @@ const ArgumentsRow kArguments[] = {
 INSTANTIATE_TEST_SUITE_P(Misused, SubtreeArguments, ::testing::ValuesIn(kArguments),
                          [](const auto& row) { return std::string(row.param.name); });
 
+void expectNothingPrinted(TAVHandle* handle, uint32_t cause)
+{
+  TraceLog trace;
+  EXPECT_EQ(printSubtree(0x41, handle), printed(TAV_RC_NO_MEMORY, ""));
+  EXPECT_THAT(trace.failuresOf(probe::printSubtree), ElementsAre(Failure{probe::printSubtree, 40, cause}));
+}
+
 TEST(SubtreeFromTheRoot, OfAnEmptyStreamIsNothingPrinted)
 {
   StreamReader reader(Bytes{});
-  TraceLog trace;
-  EXPECT_EQ(printSubtree(0x41, reader.handle()), printed(TAV_RC_NO_MEMORY, ""));
-  EXPECT_THAT(trace.failuresOf(probe::printSubtree),
-              ElementsAre(Failure{probe::printSubtree, 40, TAV_RC_NO_MORE_CHILDREN}));
+  expectNothingPrinted(reader.handle(), TAV_RC_NO_MORE_CHILDREN);
 }
 
 TEST(SubtreeFromTheRoot, OfAHandleForWritingIsNothingPrinted)
 {
   StreamWriter writer;
   writer.add(group64(20));
-  TraceLog trace;
-  EXPECT_EQ(printSubtree(0x41, writer.handle()), printed(TAV_RC_NO_MEMORY, ""));
-  EXPECT_THAT(trace.failuresOf(probe::printSubtree),
-              ElementsAre(Failure{probe::printSubtree, 40, TAV_RC_WRONG_MODE}));
+  expectNothingPrinted(writer.handle(), TAV_RC_WRONG_MODE);
 }
 
 TEST(SubtreeOfAHandleForWriting, EndsBehindItsOpening)

@@ -23,9 +23,6 @@ using namespace tav::inside;
 using namespace test;
 using namespace std::string_literals;
 
-using ::testing::ElementsAre;
-using ::testing::IsEmpty;
-
 constexpr bool kLittle = std::endian::native == std::endian::little;
 
 /// A node over a heap block of exactly its bytes, and a context of either byte order.

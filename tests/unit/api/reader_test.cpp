@@ -16,21 +16,8 @@ namespace
 using namespace tav;
 using namespace test;
 
-using ::testing::ElementsAre;
-using ::testing::IsEmpty;
-
 constexpr uint16_t kElm = 0x1234;
 constexpr uint32_t kRefused = 0x90000035;
-
-/// A ring of one page of 16 bytes: a header fills it, and the data needs another read.
-Form onePage()
-{
-  Form form;
-  form.buffered = true;
-  form.pageBytes = 16;
-  form.ringBytes = 16;
-  return form;
-}
 
 class ReadNode : public ::testing::TestWithParam<Form>
 {
@@ -39,6 +26,14 @@ protected:
   TAVHeaderData out = untouched();
 
   [[nodiscard]] bool buffered() const { return GetParam().buffered; }
+
+  void expectNoData() const
+  {
+    EXPECT_EQ(out.header.nodeOffset, 0U);
+    EXPECT_EQ(out.pDataBuf, nullptr);
+    EXPECT_EQ(out.dataBufSize, 0U);
+    EXPECT_EQ(out.dataBufOffset, 0U);
+  }
 };
 
 TEST_P(ReadNode, FillsEveryFieldOfAWideGroupAndLeavesItsDataEmpty)
@@ -51,10 +46,7 @@ TEST_P(ReadNode, FillsEveryFieldOfAWideGroupAndLeavesItsDataEmpty)
   EXPECT_EQ(out.header.hdr64.info, 0x00400123U);
   EXPECT_EQ(out.header.hdr64.type, TAV_TYPE_HEADER64);
   EXPECT_EQ(out.header.hdr64.elm, kElm);
-  EXPECT_EQ(out.header.nodeOffset, 0U);
-  EXPECT_EQ(out.pDataBuf, nullptr);
-  EXPECT_EQ(out.dataBufSize, 0U);
-  EXPECT_EQ(out.dataBufOffset, 0U);
+  expectNoData();
 }
 
 TEST_P(ReadNode, TakesAWideHeaderOfType1ForAGroup)
@@ -75,10 +67,7 @@ TEST_P(ReadNode, FillsEveryFieldOfANarrowGroup)
   EXPECT_EQ(out.header.hdr32.size, 0x11223344U);
   EXPECT_EQ(out.header.hdr32.type, TAV_TYPE_HEADER32);
   EXPECT_EQ(out.header.hdr32.elm, kElm);
-  EXPECT_EQ(out.header.nodeOffset, 0U);
-  EXPECT_EQ(out.pDataBuf, nullptr);
-  EXPECT_EQ(out.dataBufSize, 0U);
-  EXPECT_EQ(out.dataBufOffset, 0U);
+  expectNoData();
 }
 
 TEST_P(ReadNode, PointsToTheDataOfAWideElementWithoutSwappingIt)

@@ -17,8 +17,6 @@ namespace
 using namespace tav;
 using namespace test;
 
-using ::testing::ElementsAre;
-
 /// What the caller had in the fields of a date: values that no conversion gives.
 constexpr uint16_t kBefore = 0xBEEF;
 

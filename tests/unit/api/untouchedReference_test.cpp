@@ -21,7 +21,6 @@ namespace
 
 using namespace test;
 
-constexpr uint16_t kRoot = 20;
 constexpr uint16_t kGroup = 60102;
 constexpr uint16_t kValue = 60110;
 constexpr uint16_t kLast = 60111;

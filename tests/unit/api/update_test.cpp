@@ -18,12 +18,7 @@ using namespace tav;
 using namespace tav::inside;
 using namespace test;
 
-using ::testing::ElementsAre;
-using ::testing::IsEmpty;
-
-constexpr uint16_t kRoot = 20;
-constexpr uint16_t kBlob = 60001; // 0xEA61
-constexpr uint16_t kCpu = 60110;  // 0xEACE
+constexpr uint16_t kCpu = 60110; // 0xEACE
 
 class UpdateElement : public ::testing::TestWithParam<Form>
 {
@@ -403,49 +398,55 @@ TEST(UpdateElementReading, WithoutSinkHandsTheReadersCodeUp)
                                             Failure{probe::updateElement, 60, TAV_RC_NO_CIRCULAR_BUF}));
 }
 
+/// A block whose last byte is a node's.
+struct FullBlock
+{
+  FullBlock(const Bytes& stream, const Form& form)
+      : bytes(stream), storage(bytes.data(), bytes.size()), handle(storage, TAV_OPT_UPDATE, form)
+  {
+  }
+  Bytes bytes;
+  TAVSSMemory storage;
+  Handle handle;
+};
+
 TEST(UpdateElementRoom, EndsBeforeTheLastByteOfTheBlock)
 {
   // The second node ends at the block's end: it can be read, not updated.
-  Bytes block = hex("02 00 00 00 35 00 CE EA 01 02 02 00 00 00 35 00 CE EA 03 04");
-  TAVSSMemory storage(block.data(), block.size());
-  Handle handle(storage, TAV_OPT_UPDATE, lowFirst());
+  FullBlock block(hex("02 00 00 00 35 00 CE EA 01 02 02 00 00 00 35 00 CE EA 03 04"), lowFirst());
   Bytes payload{9, 9};
   TAVHeaderData last{header32(2, TAV_TYPE_UINT16, kCpu, 10), payload.data(), 2, 0};
   TraceLog trace;
-  EXPECT_EQ(tavUpdateElement(0, handle.get(), &last), TAV_RC_END_OF_STORAGE);
+  EXPECT_EQ(tavUpdateElement(0, block.handle.get(), &last), TAV_RC_END_OF_STORAGE);
   EXPECT_THAT(trace.failures(), ElementsAre(Failure{probe::rawWrite, 30, TAV_RC_END_OF_STORAGE},
                                             Failure{probe::updateElement, 80, TAV_RC_END_OF_STORAGE}));
   TAVHeaderData first{header32(2, TAV_TYPE_UINT16, kCpu, 0), payload.data(), 2, 0};
-  EXPECT_EQ(tavUpdateElement(0, handle.get(), &first), TAV_RC_OK);
-  EXPECT_EQ(toHex(block), rows("02 00 00 00 35 00 CE EA 09 09 02 00 00 00 35 00 CE EA 03 04"));
+  EXPECT_EQ(tavUpdateElement(0, block.handle.get(), &first), TAV_RC_OK);
+  EXPECT_EQ(toHex(block.bytes), rows("02 00 00 00 35 00 CE EA 09 09 02 00 00 00 35 00 CE EA 03 04"));
 }
 
 TEST(UpdateElementRoom, IsAskedForAWholeArrayBeforeAnyOfItIsReversed)
 {
   constexpr uint64_t size = 4096;
   constexpr bool swap = true;
-  Bytes block(16 + size, 0xAA); // ends with the array
-  tav::layout::encodeHeader(header64(size, TAV_TYPE_UINT64_ARRAY, kBlob), swap, block.data());
-  const Bytes before = block;
-  TAVSSMemory storage(block.data(), block.size());
-  Handle handle(storage, TAV_OPT_UPDATE, {.swap = swap});
+  Bytes before(16 + size, 0xAA); // ends with the array
+  tav::layout::encodeHeader(header64(size, TAV_TYPE_UINT64_ARRAY, kBlob), swap, before.data());
+  FullBlock block(before, {.swap = swap});
   Bytes payload(size, 0x55);
   TAVHeaderData data{header64(size, TAV_TYPE_UINT64_ARRAY, kBlob), payload.data(), size, 0};
   const TraceLog trace;
-  EXPECT_EQ(tavUpdateElement(0, handle.get(), &data), TAV_RC_END_OF_STORAGE);
-  EXPECT_EQ(block, before);
+  EXPECT_EQ(tavUpdateElement(0, block.handle.get(), &data), TAV_RC_END_OF_STORAGE);
+  EXPECT_EQ(block.bytes, before);
   EXPECT_THAT(trace.failures(), ElementsAre(Failure{probe::rawWrite, 30, TAV_RC_END_OF_STORAGE},
                                             Failure{probe::updateElement, 80, TAV_RC_END_OF_STORAGE}));
 }
 
 TEST(UpdateElementRoom, IsNeededByANodeOfNoBytesToo)
 {
-  Bytes block = hex("00 00 00 00 65 00 61 EA");
-  TAVSSMemory storage(block.data(), block.size());
-  Handle handle(storage, TAV_OPT_UPDATE, lowFirst());
+  FullBlock block(hex("00 00 00 00 65 00 61 EA"), lowFirst());
   uint8_t nothing = 0;
   TAVHeaderData data{header32(0, TAV_TYPE_BINARY, kBlob), &nothing, 0, 0};
-  EXPECT_EQ(tavUpdateElement(0, handle.get(), &data), TAV_RC_END_OF_STORAGE);
+  EXPECT_EQ(tavUpdateElement(0, block.handle.get(), &data), TAV_RC_END_OF_STORAGE);
 }
 
 TEST(UpdateElementTrace, ShowsArgumentsAndThePosition)

@@ -16,12 +16,6 @@ namespace
 using namespace tav;
 using namespace test;
 
-using ::testing::ElementsAre;
-using ::testing::IsEmpty;
-
-constexpr uint16_t kRoot = 20;
-constexpr uint16_t kBlob = 60001; // 0xEA61
-
 class WriteNode : public ::testing::TestWithParam<Form>
 {
 };

@@ -16,13 +16,7 @@ namespace
 using namespace tav;
 using namespace test;
 
-using ::testing::ElementsAre;
-using ::testing::IsEmpty;
-
-constexpr uint16_t kRoot = 20;
-constexpr uint16_t kBlob = 60001;
 constexpr uint64_t kBefore = 0xABCDEF;
-constexpr uint32_t kStorageCode = 0x90000777; // no code of the library
 
 /// A call of tavAddElement that must fail: checks that neither the handle nor the descriptor's offset moved.
 uint32_t failToAdd(StreamWriter& writer, TAVHeader header, uint8_t* payload, uint64_t length, uint64_t options = 0)

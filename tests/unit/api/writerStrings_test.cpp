@@ -17,14 +17,9 @@ namespace
 using namespace tav;
 using namespace test;
 
-using ::testing::ElementsAre;
-using ::testing::IsEmpty;
-
-constexpr uint16_t kRoot = 20;
 constexpr uint16_t kName = 60103;    // 0xEAC7
 constexpr uint16_t kUtf8Page = 1208; // 0x04B8
 constexpr uint64_t kBefore = 0xABCDEF;
-constexpr uint32_t kStorageCode = 0x90000777; // no code of the library
 
 /// A pair with the distance of a string is in the order of the machine that wrote it.
 constexpr const char* kEye = kBigEndianHost ? "C0 DE D5 EE DD EC 0D ED" : "ED 0D EC DD EE D5 DE C0";
@@ -49,54 +44,56 @@ Bytes nodesBehindRoot(StreamWriter& writer, bool wide = true)
 
 class AddString : public ::testing::TestWithParam<Form>
 {
+protected:
+  StreamWriter writer{GetParam()};
+
+  /// The bytes of this form, packed and aligned, low byte first and high byte first.
+  [[nodiscard]] static std::string pick(const char* little, const char* littleAligned, const char* big,
+                                        const char* bigAligned)
+  {
+    const bool align = GetParam().align;
+    return isBigEndian(GetParam()) ? (align ? bigAligned : big) : (align ? littleAligned : little);
+  }
+
+  /// Adds a text below a root with headers of the same width; the descriptor as it is left.
+  TAVHeaderData add(const std::string& characters, const TAVHeader& header, uint16_t codePage)
+  {
+    fillStorage(writer, 0xEE);
+    writer.add(header.hdrType == TAV_HDR_64 ? group64(kRoot) : group32(kRoot));
+    Bytes text = bytesOfText(characters);
+    TAVHeaderData data = textOf(header, text);
+    EXPECT_EQ(tavAddString(0, writer.handle(), &data, codePage), TAV_RC_OK);
+    return data;
+  }
 };
 INSTANTIATE_TEST_SUITE_P(Forms, AddString, ::testing::ValuesIn(allForms()),
                          [](const auto& instance) { return formName(instance.param); });
 
 TEST_P(AddString, WritesAnAsciiStringAsItIs)
 {
-  StreamWriter writer(GetParam());
-  fillStorage(writer, 0xEE);
-  writer.add(group64(kRoot));
-  Bytes text = bytesOfText("abc");
-  TAVHeaderData data = textOf(header64(3, TAV_TYPE_ASCII_STRING, kName), text);
-  ASSERT_EQ(tavAddString(0, writer.handle(), &data, 437), TAV_RC_OK);
+  const TAVHeaderData data = add("abc", header64(3, TAV_TYPE_ASCII_STRING, kName), 437);
   EXPECT_EQ(data.header.hdr64.size, 3U);
-  const bool align = GetParam().align;
-  const std::string big = align ? "00 00 00 00 00 00 00 03 00 10 00 00 00 32 EA C7"
-                                : "00 00 00 00 00 00 00 03 00 00 00 00 00 32 EA C7";
-  const std::string little = align ? "03 00 00 00 00 00 00 00 00 00 10 00 32 00 C7 EA"
-                                   : "03 00 00 00 00 00 00 00 00 00 00 00 32 00 C7 EA";
-  EXPECT_EQ(toHex(nodesBehindRoot(writer)),
-            rows((isBigEndian(GetParam()) ? big : little) + "61 62 63" + (align ? "EE EE EE EE EE" : "")));
+  EXPECT_EQ(
+      toHex(nodesBehindRoot(writer)),
+      rows(pick("03 00 00 00 00 00 00 00 00 00 00 00 32 00 C7 EA", "03 00 00 00 00 00 00 00 00 00 10 00 32 00 C7 EA",
+                "00 00 00 00 00 00 00 03 00 00 00 00 00 32 EA C7", "00 00 00 00 00 00 00 03 00 10 00 00 00 32 EA C7") +
+           "61 62 63" + (GetParam().align ? "EE EE EE EE EE" : "")));
 }
 
 TEST_P(AddString, WritesTheCodePageAndTwoBytesMoreThanAUtf8StringCounts)
 {
-  StreamWriter writer(GetParam());
-  fillStorage(writer, 0xEE);
-  writer.add(group64(kRoot));
-  Bytes text = bytesOfText("abcde");
-  TAVHeaderData data = textOf(header64(3, TAV_TYPE_UTF8_STRING, kName), text);
-  ASSERT_EQ(tavAddString(0, writer.handle(), &data, kUtf8Page), TAV_RC_OK);
+  const TAVHeaderData data = add("abcde", header64(3, TAV_TYPE_UTF8_STRING, kName), kUtf8Page);
   EXPECT_EQ(data.header.hdr64.size, 5U);
-  const bool align = GetParam().align;
-  const std::string big = align ? "00 00 00 00 00 00 00 05 00 10 00 00 00 66 EA C7 04 B8"
-                                : "00 00 00 00 00 00 00 05 00 00 00 00 00 66 EA C7 04 B8";
-  const std::string little = align ? "05 00 00 00 00 00 00 00 00 00 10 00 66 00 C7 EA B8 04"
-                                   : "05 00 00 00 00 00 00 00 00 00 00 00 66 00 C7 EA B8 04";
-  EXPECT_EQ(toHex(nodesBehindRoot(writer)),
-            rows((isBigEndian(GetParam()) ? big : little) + "61 62 63 64 65" + (align ? "EE EE EE" : "")));
+  EXPECT_EQ(toHex(nodesBehindRoot(writer)), rows(pick("05 00 00 00 00 00 00 00 00 00 00 00 66 00 C7 EA B8 04",
+                                                      "05 00 00 00 00 00 00 00 00 00 10 00 66 00 C7 EA B8 04",
+                                                      "00 00 00 00 00 00 00 05 00 00 00 00 00 66 EA C7 04 B8",
+                                                      "00 00 00 00 00 00 00 05 00 10 00 00 00 66 EA C7 04 B8") +
+                                                 "61 62 63 64 65" + (GetParam().align ? "EE EE EE" : "")));
 }
 
 TEST_P(AddString, Writes32BitHeaders)
 {
-  StreamWriter writer(GetParam());
-  fillStorage(writer, 0xEE);
-  writer.add(group32(kRoot));
-  Bytes text = bytesOfText("abcdefgh");
-  TAVHeaderData data = textOf(header32(6, TAV_TYPE_UTF8_STRING, kName), text);
-  ASSERT_EQ(tavAddString(0, writer.handle(), &data, kUtf8Page), TAV_RC_OK);
+  const TAVHeaderData data = add("abcdefgh", header32(6, TAV_TYPE_UTF8_STRING, kName), kUtf8Page);
   EXPECT_EQ(data.header.hdr32.size, 8U); // needs no padding, though the node ends 2 bytes past a multiple of 8
   EXPECT_EQ(toHex(nodesBehindRoot(writer, false)),
             rows(isBigEndian(GetParam()) ? "00 00 00 08 00 66 EA C7 04 B8 61 62 63 64 65 66 67 68"
@@ -105,12 +102,7 @@ TEST_P(AddString, Writes32BitHeaders)
 
 TEST_P(AddString, EndsWithAPairInHostOrder)
 {
-  StreamWriter writer(GetParam());
-  fillStorage(writer, 0xEE);
-  writer.add(group64(kRoot));
-  Bytes text = bytesOfText("abcde");
-  TAVHeaderData data = textOf(header64(3, TAV_TYPE_UTF8_STRING, kName, TAV_INFO_EYE_SIZE), text);
-  ASSERT_EQ(tavAddString(0, writer.handle(), &data, kUtf8Page), TAV_RC_OK);
+  add("abcde", header64(3, TAV_TYPE_UTF8_STRING, kName, TAV_INFO_EYE_SIZE), kUtf8Page);
   const Bytes all = nodesBehindRoot(writer);
   const std::string padding = GetParam().align ? "EE EE EE" : "";
   EXPECT_EQ(toHex({all.begin() + 18, all.end()}), rows("61 62 63 64 65" + padding + kEye + hostWord("15")));
@@ -118,12 +110,7 @@ TEST_P(AddString, EndsWithAPairInHostOrder)
 
 TEST_P(AddString, EndsAnAsciiStringWithAPairInHostOrder)
 {
-  StreamWriter writer(GetParam());
-  fillStorage(writer, 0xEE);
-  writer.add(group64(kRoot));
-  Bytes text = bytesOfText("abcdefg");
-  TAVHeaderData data = textOf(header64(7, TAV_TYPE_ASCII_STRING, kName, TAV_INFO_EYE_SIZE), text);
-  ASSERT_EQ(tavAddString(0, writer.handle(), &data, 437), TAV_RC_OK);
+  add("abcdefg", header64(7, TAV_TYPE_ASCII_STRING, kName, TAV_INFO_EYE_SIZE), 437);
   const Bytes all = nodesBehindRoot(writer);
   const std::string padding = GetParam().align ? "EE" : "";
   EXPECT_EQ(toHex({all.begin() + 16, all.end()}), rows("61 62 63 64 65 66 67" + padding + kEye + hostWord("17")));
@@ -131,21 +118,13 @@ TEST_P(AddString, EndsAnAsciiStringWithAPairInHostOrder)
 
 TEST_P(AddString, LeavesTheNodeOffsetAlone)
 {
-  StreamWriter writer(GetParam());
-  writer.add(group64(kRoot));
-  Bytes text = bytesOfText("abc");
-  TAVHeaderData data = textOf(header64(3, TAV_TYPE_ASCII_STRING, kName), text);
-  ASSERT_EQ(tavAddString(0, writer.handle(), &data, 437), TAV_RC_OK);
+  const TAVHeaderData data = add("abc", header64(3, TAV_TYPE_ASCII_STRING, kName), 437);
   EXPECT_EQ(data.header.nodeOffset, kBefore);
 }
 
 TEST_P(AddString, IsFollowedByTheNextNodeBehindTheUncountedBytes)
 {
-  StreamWriter writer(GetParam());
-  writer.add(group64(kRoot));
-  Bytes text = bytesOfText("abcdefghij");
-  TAVHeaderData data = textOf(header64(6, TAV_TYPE_UTF8_STRING, kName), text);
-  ASSERT_EQ(tavAddString(0, writer.handle(), &data, kUtf8Page), TAV_RC_OK);
+  add("abcdefghij", header64(6, TAV_TYPE_UTF8_STRING, kName), kUtf8Page);
   EXPECT_EQ(writer.add(u32(kName, 1)).nodeOffset, 16U + 16 + 2 + 8);
 }
 

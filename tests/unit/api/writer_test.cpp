@@ -16,12 +16,7 @@ namespace
 using namespace tav;
 using namespace test;
 
-using ::testing::ElementsAre;
-using ::testing::IsEmpty;
-
-constexpr uint16_t kRoot = 20;    // 0x0014
-constexpr uint16_t kCpu = 60110;  // 0xEACE
-constexpr uint16_t kBlob = 60001; // 0xEA61
+constexpr uint16_t kCpu = 60110; // 0xEACE
 constexpr uint64_t kBefore = 0xABCDEF;
 
 std::string formOf(const ::testing::TestParamInfo<Form>& instance)

@@ -233,14 +233,20 @@ TEST(LayerErrors, NameTheColumnOfAPathThatIsNone)
     const std::string all = messageOf([&] { tav::Path{path}; });
     return all.substr(all.find("PARAM: ") + 7);
   };
-  EXPECT_EQ(said("/host/hostNam"), "column 7: no element is called 'hostNam'; did you mean hostName?");
-  EXPECT_EQ(said("/host/nothingLikeThisAtAll"), "column 7: no element is called 'nothingLikeThisAtAll'");
-  EXPECT_EQ(said("host/70000"), "column 6: '70000' is no id; they go from 0 to 65535");
-  EXPECT_EQ(said("host///hostName"), "column 7: a step is empty");
-  EXPECT_EQ(said(""), "column 1: a step is empty");
-  EXPECT_EQ(said("/host/hostName[1"), "column 15: a [ without a ]");
-  EXPECT_EQ(said("/host/hostName[2]x"), "column 18: 'x' does not belong here");
-  EXPECT_EQ(said("/host/hostName[x]"), "column 16: no element is called 'x'");
-  EXPECT_EQ(said("/host/hostName[0]"), "column 16: '0' is no place; the first is [1]");
-  EXPECT_EQ(said("/h\xC3\xB6st/\xC3\xA4"), "column 2: no element is called 'h\xC3\xB6st'; did you mean host?");
+  const std::pair<const char*, const char*> rows[] = {
+      {"/host/hostNam", "column 7: no element is called 'hostNam'; did you mean hostName?"},
+      {"/host/nothingLikeThisAtAll", "column 7: no element is called 'nothingLikeThisAtAll'"},
+      {"host/70000", "column 6: '70000' is no id; they go from 0 to 65535"},
+      {"host///hostName", "column 7: a step is empty"},
+      {"", "column 1: a step is empty"},
+      {"/host/hostName[1", "column 15: a [ without a ]"},
+      {"/host/hostName[2]x", "column 18: 'x' does not belong here"},
+      {"/host/hostName[x]", "column 16: no element is called 'x'"},
+      {"/host/hostName[0]", "column 16: '0' is no place; the first is [1]"},
+      {"/h\xC3\xB6st/\xC3\xA4", "column 2: no element is called 'h\xC3\xB6st'; did you mean host?"},
+  };
+  for (const auto& [path, what] : rows)
+  {
+    EXPECT_EQ(said(path), what);
+  }
 }

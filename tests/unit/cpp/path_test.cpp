@@ -1,3 +1,4 @@
+#include <utility>
 #include <vector>
 
 #include "cpp/layer.h"
@@ -53,16 +54,34 @@ protected:
     }
     return texts;
   }
+
+  /// Paths, each with what it leads to.
+  using Rows = std::vector<std::pair<const char*, const char*>>;
+
+  void expectFirst(const Rows& rows) const
+  {
+    for (const auto& [path, text] : rows)
+    {
+      EXPECT_EQ(first(path), text) << path;
+    }
+  }
+  void expectAll(const Rows& rows) const
+  {
+    for (const auto& [path, texts] : rows)
+    {
+      EXPECT_EQ(all(path), texts) << path;
+    }
+  }
 };
 
 } // namespace
 
 TEST_F(LayerPath, TagsEnumNamesConstantsAndIdsAllName)
 {
-  EXPECT_EQ(first("system/host/hostName"), "a");
-  EXPECT_EQ(first("TAV_ELM_CMN_SYSTEM/TAV_ELM_CMN_HOST/TAV_ELM_CMN_HOST_NAME"), "a");
-  EXPECT_EQ(first("system/60105"), "e");
-  EXPECT_EQ(first("system/#60105"), "e");
+  expectFirst({{"system/host/hostName", "a"},
+               {"TAV_ELM_CMN_SYSTEM/TAV_ELM_CMN_HOST/TAV_ELM_CMN_HOST_NAME", "a"},
+               {"system/60105", "e"},
+               {"system/#60105", "e"}});
 }
 
 TEST_F(LayerPath, SlashMayLead)
@@ -90,20 +109,20 @@ TEST_F(LayerPath, StarIsAnyNode)
 
 TEST_F(LayerPath, NumberInBracketsCountsTheMatchesAmongSiblings)
 {
-  EXPECT_EQ(first("system/host[2]/hostName"), "c");
-  EXPECT_EQ(first("system/host[2]/hostName[2]"), "d");
-  EXPECT_EQ(first("system/*[3]"), "e");
-  EXPECT_EQ(first("system/host[3]"), "nothing");
-  EXPECT_EQ(first("system[1]/host"), "group");
-  EXPECT_EQ(first("system[2]/host"), "nothing");
+  expectFirst({{"system/host[2]/hostName", "c"},
+               {"system/host[2]/hostName[2]", "d"},
+               {"system/*[3]", "e"},
+               {"system/host[3]", "nothing"},
+               {"system[1]/host", "group"},
+               {"system[2]/host", "nothing"}});
 }
 
 TEST_F(LayerPath, AllMatchesComeInStreamOrder)
 {
-  EXPECT_EQ(all("system/host/hostName"), "acd");
-  EXPECT_EQ(all("system/host[2]/hostName"), "cd");
-  EXPECT_EQ(all("system/host/hostName[1]"), "ac");
-  EXPECT_EQ(all("system/host/cpuOnline"), "");
+  expectAll({{"system/host/hostName", "acd"},
+             {"system/host[2]/hostName", "cd"},
+             {"system/host/hostName[1]", "ac"},
+             {"system/host/cpuOnline", ""}});
 }
 
 TEST_F(LayerPath, PathBelowANodeBeginsWithItsChildren)

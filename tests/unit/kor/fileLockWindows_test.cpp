@@ -11,83 +11,13 @@
 
 namespace
 {
-constexpr uint32_t kShared = 0;
-constexpr uint32_t kExclusive = 1;
-constexpr uint32_t kWait = 0;
-constexpr uint32_t kDoNotWait = 2;
-
-/// What is locked belongs to the handle, in this process and in others.
-class FileLock : public testing::Test
-{
-protected:
-  void SetUp() override
-  {
-    ASSERT_EQ(openFile(file_, path_, KOR_FILE_UPDATE | KOR_FILE_CREATE), TAV_RC_OK);
-    ASSERT_EQ(openFile(other_, path_, KOR_FILE_UPDATE), TAV_RC_OK);
-  }
-
-  TestFolder folder_;
-  std::string path_ = folder_ / "locked";
-  KORHFile file_;
-  KORHFile other_;
-};
-
-TEST_F(FileLock, KeepsAnotherOpenFileOut)
-{
-  ASSERT_EQ(lockFile(file_, kExclusive, kDoNotWait), TAV_RC_OK);
-  EXPECT_EQ(lockFile(other_, kExclusive, kDoNotWait), KOR_RC_LOCKED);
-  EXPECT_EQ(lockFile(other_, kShared, kDoNotWait), KOR_RC_LOCKED);
-}
+using FileLock = TwoOpenFiles;
 
 TEST_F(FileLock, LetsOthersReadAndTheOwnerWrite)
 {
   ASSERT_EQ(lockFile(file_, kExclusive, kDoNotWait), TAV_RC_OK);
   EXPECT_EQ(writeFile(file_, "content"), (Transfer{TAV_RC_OK, 7}));
   EXPECT_EQ(readText(other_, 7), "content");
-}
-
-TEST_F(FileLock, UnlockLetsAnotherOpenFileIn)
-{
-  ASSERT_EQ(lockFile(file_, kExclusive, kDoNotWait), TAV_RC_OK);
-  ASSERT_EQ(file_.unlock(), TAV_RC_OK);
-  EXPECT_EQ(lockFile(other_, kExclusive, kDoNotWait), TAV_RC_OK);
-}
-
-TEST_F(FileLock, CloseLetsAnotherOpenFileIn)
-{
-  ASSERT_EQ(lockFile(file_, kExclusive, kDoNotWait), TAV_RC_OK);
-  ASSERT_EQ(file_.close(), TAV_RC_OK);
-  EXPECT_EQ(lockFile(other_, kExclusive, kDoNotWait), TAV_RC_OK);
-}
-
-TEST_F(FileLock, SharedLocksStandBesideEachOther)
-{
-  ASSERT_EQ(lockFile(file_, kShared, kDoNotWait), TAV_RC_OK);
-  EXPECT_EQ(lockFile(other_, kShared, kDoNotWait), TAV_RC_OK);
-  EXPECT_EQ(lockFile(other_, kExclusive, kDoNotWait), KOR_RC_LOCKED);
-}
-
-TEST_F(FileLock, TheSecondLockReplacesTheFirst)
-{
-  ASSERT_EQ(lockFile(file_, kExclusive, kDoNotWait), TAV_RC_OK);
-  EXPECT_EQ(lockFile(file_, kShared, kDoNotWait), TAV_RC_OK);
-  EXPECT_EQ(lockFile(other_, kShared, kDoNotWait), TAV_RC_OK);
-  EXPECT_EQ(file_.unlock(), TAV_RC_OK);
-  EXPECT_EQ(file_.unlock(), KOR_RC_NOT_LOCKED);
-}
-
-TEST_F(FileLock, ARefusedReplacementLeavesNone)
-{
-  ASSERT_EQ(lockFile(other_, kShared, kDoNotWait), TAV_RC_OK);
-  ASSERT_EQ(lockFile(file_, kShared, kDoNotWait), TAV_RC_OK);
-  EXPECT_EQ(lockFile(file_, kExclusive, kDoNotWait), KOR_RC_LOCKED);
-  EXPECT_EQ(file_.unlock(), KOR_RC_NOT_LOCKED);
-  EXPECT_EQ(lockFile(other_, kExclusive, kDoNotWait), TAV_RC_OK);
-}
-
-TEST_F(FileLock, UnlockWithoutALockIsRefused)
-{
-  EXPECT_EQ(file_.unlock(), KOR_RC_NOT_LOCKED);
 }
 
 TEST_F(FileLock, AWaitingLockComesWhenTheOtherIsGone)

@@ -35,28 +35,21 @@ TEST(Print, FormatsWhatFits)
   EXPECT_TRUE(buffer.isUntouchedFrom(33));
 }
 
-TEST(Print, ATextThatFitsExactlyIsWhole)
+TEST(Print, ATextIsCutWhereTheRoomEnds)
 {
-  Buffer buffer;
-  EXPECT_EQ(korSnprintf(buffer.data(), 6, "%s", "12345"), TAV_RC_OK);
-  EXPECT_EQ(buffer.text(), "12345");
-  EXPECT_TRUE(buffer.isUntouchedFrom(6));
-}
-
-TEST(Print, ATextThatDoesNotFitIsCut)
-{
-  Buffer buffer;
-  EXPECT_EQ(korSnprintf(buffer.data(), 5, "%s", "12345"), TAV_RC_NO_MEMORY);
-  EXPECT_EQ(buffer.text(), "1234");
-  EXPECT_TRUE(buffer.isUntouchedFrom(5));
-}
-
-TEST(Print, RoomForTheEndAloneGivesAnEmptyText)
-{
-  Buffer buffer;
-  EXPECT_EQ(korSnprintf(buffer.data(), 1, "%s", "12345"), TAV_RC_NO_MEMORY);
-  EXPECT_EQ(buffer.text(), "");
-  EXPECT_TRUE(buffer.isUntouchedFrom(1));
+  struct Row
+  {
+    uint64_t room;
+    uint32_t code;
+    const char* text;
+  };
+  for (const Row& row : {Row{6, TAV_RC_OK, "12345"}, Row{5, TAV_RC_NO_MEMORY, "1234"}, Row{1, TAV_RC_NO_MEMORY, ""}})
+  {
+    Buffer buffer;
+    EXPECT_EQ(korSnprintf(buffer.data(), row.room, "%s", "12345"), row.code) << row.room;
+    EXPECT_EQ(buffer.text(), row.text);
+    EXPECT_TRUE(buffer.isUntouchedFrom(row.room)) << row.room;
+  }
 }
 
 TEST(Print, NoRoomAtAllWritesNothing)

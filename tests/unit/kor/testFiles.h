@@ -7,6 +7,8 @@
 #include <filesystem>
 #include <string>
 
+#include <gtest/gtest.h>
+
 #include "support/platform.h"
 #include "tav/kor.h"
 
@@ -97,3 +99,25 @@ inline uint32_t lockFile(KORHFile& file, uint32_t word1, uint32_t word2)
   param.word2 = word2;
   return file.lock(&param);
 }
+
+// Words of a lock.
+inline constexpr uint32_t kShared = 0;
+inline constexpr uint32_t kExclusive = 1;
+inline constexpr uint32_t kWait = 0;
+inline constexpr uint32_t kDoNotWait = 2;
+
+/// Two open files of one path. What is locked belongs to the open file, in this process and in others.
+class TwoOpenFiles : public testing::Test
+{
+protected:
+  void SetUp() override
+  {
+    ASSERT_EQ(openFile(file_, path_, KOR_FILE_UPDATE | KOR_FILE_CREATE), TAV_RC_OK);
+    ASSERT_EQ(openFile(other_, path_, KOR_FILE_UPDATE), TAV_RC_OK);
+  }
+
+  TestFolder folder_;
+  std::string path_ = folder_ / "locked";
+  KORHFile file_;
+  KORHFile other_;
+};

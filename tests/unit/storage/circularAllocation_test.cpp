@@ -71,26 +71,18 @@ TEST(RingAllocation, GivesTheRingBackWhenTheFlagsFail)
   EXPECT_EQ(allocations::live(), before);
 }
 
-TEST(RingAllocation, OfTheRingFailsOnceAndTheNextSizeServes)
+TEST(RingAllocation, OfTheRingOrOfItsFlagsFailsOnceAndTheNextSizeServes)
 {
-  VectorStorage storage(8);
-  uint32_t rc = 77;
-  const allocations::FailNth first(1);
-  const TAVCircularBuf ring(&storage, 80, &rc);
-  EXPECT_TRUE(first.happened());
-  EXPECT_EQ(rc, TAV_RC_OK);
-  EXPECT_EQ(ring.pageCount, 8U);
-}
-
-TEST(RingAllocation, OfTheFlagsFailsOnceAndTheNextSizeServes)
-{
-  VectorStorage storage(8);
-  uint32_t rc = 77;
-  const allocations::FailNth second(2);
-  const TAVCircularBuf ring(&storage, 80, &rc);
-  EXPECT_TRUE(second.happened());
-  EXPECT_EQ(rc, TAV_RC_OK);
-  EXPECT_EQ(ring.pageCount, 8U);
+  for (const uint64_t nth : {1U, 2U})
+  {
+    VectorStorage storage(8);
+    uint32_t rc = 77;
+    const allocations::FailNth failing(nth);
+    const TAVCircularBuf ring(&storage, 80, &rc);
+    EXPECT_TRUE(failing.happened()) << nth;
+    EXPECT_EQ(rc, TAV_RC_OK) << nth;
+    EXPECT_EQ(ring.pageCount, 8U) << nth;
+  }
 }
 
 TEST(RingAllocation, IsGivenBackAtTheEnd)

@@ -11,6 +11,7 @@
 
 #include "support/elements.h"
 #include "support/platform.h"
+#include "support/vectorStorage.h"
 #include "tav/tav.h"
 
 namespace
@@ -98,24 +99,12 @@ private:
 };
 
 /// Stands for a file: keeps its size and its cursor alone.
-class VerifyingStorage : public TAVSideStorage
+class VerifyingStorage : public VectorStorage
 {
 public:
   explicit VerifyingStorage(MadeStream& stream)
-      : stream_(stream), page_(kMiB)
+      : VectorStorage(kMiB), stream_(stream), page_(kMiB)
   {
-    attributes = TAV_ATTR_WRITABLE | TAV_ATTR_READ_FORWARD | TAV_ATTR_READ_BACKWARD | TAV_ATTR_SEEK;
-    ioUnit = kMiB;
-  }
-  uint32_t seek(uint64_t offset, uint64_t) override
-  {
-    position_ = offset;
-    return TAV_RC_OK;
-  }
-  uint32_t getPosition(uint64_t* pPosition) override
-  {
-    *pPosition = position_;
-    return TAV_RC_OK;
   }
   uint32_t getTotalSize(uint64_t* pSize) override
   {
@@ -124,40 +113,35 @@ public:
   }
   uint32_t read(uint64_t wanted, void** ppData, uint64_t bufSize, uint64_t* pRead, bool, bool) override
   {
-    *pRead = std::min({wanted, bufSize, position_ < size_ ? size_ - position_ : 0});
-    stream_.make(position_, static_cast<uint8_t*>(*ppData), *pRead);
-    position_ += *pRead;
+    *pRead = std::min({wanted, bufSize, position < size_ ? size_ - position : 0});
+    stream_.make(position, static_cast<uint8_t*>(*ppData), *pRead);
+    position += *pRead;
     bytesRead += *pRead;
     return *pRead < wanted ? TAV_RC_END_OF_STORAGE : TAV_RC_OK;
   }
   uint32_t write(const void* pData, uint64_t size, uint64_t* pWritten) override
   {
-    const auto* const bytes = static_cast<const uint8_t*>(pData);
-    gap = gap || position_ > size_;
+    const auto* const given = static_cast<const uint8_t*>(pData);
+    gap = gap || position > size_;
     for (uint64_t done = 0; done < size;)
     {
       const uint64_t length = std::min<uint64_t>(size - done, page_.size());
-      stream_.make(position_ + done, page_.data(), length);
-      wrong += std::memcmp(page_.data(), bytes + done, length) != 0 ? 1 : 0;
+      stream_.make(position + done, page_.data(), length);
+      wrong += std::memcmp(page_.data(), given + done, length) != 0 ? 1 : 0;
       done += length;
     }
-    position_ += size;
-    size_ = std::max(size_, position_);
+    position += size;
+    size_ = std::max(size_, position);
     *pWritten = size;
     return TAV_RC_OK;
   }
-  uint32_t getMemory(void**, uint64_t*) override { return TAV_RC_NOT_SUPPORTED; }
-  uint32_t lock(uint32_t) override { return TAV_RC_NOT_SUPPORTED; }
-  uint32_t unlock() override { return TAV_RC_NOT_SUPPORTED; }
 
   uint64_t wrong = 0; ///< writes of other bytes than belong there
   bool gap = false;   ///< a write left bytes out
-  uint64_t bytesRead = 0;
 
 private:
   MadeStream& stream_;
   std::vector<uint8_t> page_;
-  uint64_t position_ = 0;
   uint64_t size_ = 0;
 };
 

@@ -36,22 +36,22 @@ public:
   uint32_t unlock() override { return 107; }
 };
 
-TEST(SideStorage, BeginsUsableWithoutAttributes)
+void expectFresh(const Bare& storage, uint32_t kind, uint64_t attributes)
 {
-  const Bare storage;
-  EXPECT_EQ(storage.kind, 0U);
-  EXPECT_EQ(storage.attributes, 0U);
+  EXPECT_EQ(storage.kind, kind);
+  EXPECT_EQ(storage.attributes, attributes);
   EXPECT_EQ(storage.ioUnit, 0x10000U);
   EXPECT_EQ(storage.status, 0U);
 }
 
+TEST(SideStorage, BeginsUsableWithoutAttributes)
+{
+  expectFresh(Bare(), 0, 0);
+}
+
 TEST(SideStorage, TakesKindAndAttributes)
 {
-  const Bare storage(9, 0x123456789AB);
-  EXPECT_EQ(storage.kind, 9U);
-  EXPECT_EQ(storage.attributes, 0x123456789ABU);
-  EXPECT_EQ(storage.ioUnit, 0x10000U);
-  EXPECT_EQ(storage.status, 0U);
+  expectFresh(Bare(9, 0x123456789AB), 9, 0x123456789AB);
 }
 
 TEST(SideStorage, HasTheAttributesOfAMaskWhenAllAreThere)

@@ -248,26 +248,25 @@ void traceInside(void* context, const KORTraceRecord*)
   _wtraceEntry(kThread, kProbe + 1, 0, 0);
 }
 
-TEST(TraceSink, MayStopTheTrace)
+TEST(TraceSink, MayStopTheTraceAndStartAnother)
 {
-  Meddler meddler;
-  ASSERT_EQ(korTraceStart(stopInside, &meddler), TAV_RC_OK);
-  _wtraceEntry(kThread, kProbe, 0, 0);
-  _wtraceEntry(kThread, kProbe, 0, 0);
-  EXPECT_EQ(meddler.calls, 1);
-  EXPECT_EQ(meddler.stopCode, TAV_RC_OK);
-  EXPECT_EQ(korTraceStop(), KOR_RC_TRACE_INACTIVE);
-}
-
-TEST(TraceSink, MayStartAnotherTrace)
-{
-  Meddler meddler;
-  ASSERT_EQ(korTraceStart(restartInside, &meddler), TAV_RC_OK);
-  _wtraceEntry(kThread, kProbe, 0, 0);
-  _wtraceEntry(kThread, kProbe, 0, 0);
-  EXPECT_EQ(meddler.calls, 2);
-  EXPECT_EQ(meddler.startCode, TAV_RC_OK);
-  EXPECT_EQ(korTraceStop(), TAV_RC_OK);
+  struct Row
+  {
+    KORTraceSink sink;
+    int calls;
+    uint32_t atTheEnd; ///< what stopping gives
+  };
+  for (const Row& row : {Row{stopInside, 1, KOR_RC_TRACE_INACTIVE}, Row{restartInside, 2, TAV_RC_OK}})
+  {
+    Meddler meddler;
+    ASSERT_EQ(korTraceStart(row.sink, &meddler), TAV_RC_OK);
+    _wtraceEntry(kThread, kProbe, 0, 0);
+    _wtraceEntry(kThread, kProbe, 0, 0);
+    EXPECT_EQ(meddler.calls, row.calls);
+    EXPECT_EQ(meddler.stopCode, TAV_RC_OK);
+    EXPECT_EQ(meddler.startCode, TAV_RC_OK);
+    EXPECT_EQ(korTraceStop(), row.atTheEnd);
+  }
 }
 
 TEST(TraceSink, IsNotToldOfItsOwnCalls)
