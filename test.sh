@@ -76,7 +76,7 @@ build_and_test()
 check_tidy()
 {
   cmake --preset clang -DTAV_BUILD_TESTS=OFF -DTAV_BUILD_TOOLS=OFF >"$work/configure.log" || { cat "$work/configure.log"; return 1; }
-  find kor trace format storage dictionary api -name '*.cpp' ! -name '*Windows.cpp' -print0 |
+  find kor trace format storage dictionary api inspect -name '*.cpp' ! -name '*Windows.cpp' -print0 |
     xargs -0 -n 2 -P "$(nproc)" clang-tidy --quiet -p build/clang 2>"$work/tidy.log" || { cat "$work/tidy.log"; return 1; }
 }
 

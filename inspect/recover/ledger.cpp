@@ -119,7 +119,7 @@ std::string reasonAt(ByteSource& source, const Form& form, uint64_t offset)
   }
   for (const bool wide : {true, false})
   {
-    if (const std::string reason = reasonOfEnd(source, form, offset, wide); !reason.empty())
+    if (std::string reason = reasonOfEnd(source, form, offset, wide); !reason.empty())
     {
       return reason;
     }
