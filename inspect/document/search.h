@@ -40,7 +40,8 @@ public:
   DocumentState& state() { return state_; }
 
 private:
-  Search(DocumentState& state, const SearchStart& start, bool isBelow, Path path, PathMatcher matcher, OnDamage onDamage);
+  Search(DocumentState& state, const SearchStart& start, bool isBelow, Path path, PathMatcher matcher,
+         OnDamage onDamage);
   Search(DocumentState& state, const SearchStart& start, Path path, OnDamage onDamage);
   void passOver(const PassedOver& passed);
 

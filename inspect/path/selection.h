@@ -26,8 +26,8 @@ public:
     }
   }
 
-  /// To be given `event`, the nodeBegin of every node of the walk whose parent was not skipped. The last of the paths that
-  /// lead to it; nothing when none does.
+  /// To be given `event`, the nodeBegin of every node of the walk whose parent was not skipped. The last of the paths
+  /// that lead to it; nothing when none does.
   std::optional<size_t> at(const Walker& walker, const Event& event)
   {
     std::optional<size_t> last;

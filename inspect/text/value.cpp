@@ -211,7 +211,8 @@ std::string int128Text(std::span<const uint8_t> bytes, bool isSigned)
   const auto second = load<uint64_t>(bytes.subspan(sizeof first));
   const uint64_t high = kor::isLittleEndian ? second : first;
   const uint64_t low = kor::isLittleEndian ? first : second;
-  return isSigned ? detail::longText(Sint128{.high = static_cast<int64_t>(high), .low = low}) : detail::digitsOf(high, low);
+  return isSigned ? detail::longText(Sint128{.high = static_cast<int64_t>(high), .low = low})
+                  : detail::digitsOf(high, low);
 }
 
 std::string cutToWidth(std::string_view text, size_t columns)

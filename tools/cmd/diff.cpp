@@ -114,8 +114,8 @@ struct Subtrees
     const std::string pathA = invocation.text("--path-a", invocation.text("--path-b"));
     if (!pathA.empty())
     {
-      a.emplace(pathA);
-      b.emplace(invocation.text("--path-b", pathA));
+      a.emplace(pathOf(pathA));
+      b.emplace(pathOf(invocation.text("--path-b", pathA)));
     }
   }
 

@@ -9,9 +9,9 @@
 #include <gmock/gmock.h>
 
 #include "crash/loggedFile.h"
-#include "tools/host/host.h"
 #include "tav/inspect.hpp"
 #include "tav/tav.hpp"
+#include "tools/host/host.h"
 
 namespace
 {

@@ -10,8 +10,8 @@
 
 #include <gtest/gtest.h>
 
-#include "kor/host.h"
 #include "tav/tav.hpp"
+#include "tools/host/host.h"
 
 namespace
 {
@@ -115,8 +115,8 @@ void read(const Shared& shared, std::atomic<uint64_t>& walks)
 uint64_t runRound()
 {
   Shared shared;
-  shared.path = tav::kor::textOf(std::filesystem::temp_directory_path() /
-                                 ("tav-meanwhile-" + std::to_string(tav::kor::processId())));
+  shared.path = tav::host::textOf(std::filesystem::temp_directory_path() /
+                                  ("tav-meanwhile-" + std::to_string(tav::host::processId())));
   std::filesystem::remove(shared.path);
   std::atomic<uint64_t> walks{0};
   std::vector<std::thread> readers;

@@ -11,7 +11,7 @@ import xml.etree.ElementTree as ElementTree
 from json_test import GOLDEN, Folder, golden_bytes
 from support import EMULATOR, WINDOWS, tav
 
-PACKAGING = pathlib.Path(__file__).resolve().parents[2] / "packaging"
+PACKAGING = pathlib.Path(__file__).resolve().parents[3] / "packaging"
 MAGIC = PACKAGING / "tav.magic"
 MIME = PACKAGING / "tav-mime.xml"
 SYSTEM = pathlib.Path("/usr/share/misc/magic")

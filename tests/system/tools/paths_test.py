@@ -101,7 +101,7 @@ class Paths(ToolTest):
         self.assertEqual(tav("diff", path, path, "--ignore", "//host[cpu/cpuOnline > 4]").status, 0)
 
     def test_the_examples_of_the_documents_run(self):
-        page = (pathlib.Path(__file__).resolve().parents[2] / "docs" / "tav.md").read_text(encoding="utf-8")
+        page = (pathlib.Path(__file__).resolve().parents[3] / "docs" / "tav.md").read_text(encoding="utf-8")
         lines = page.split("## Paths")[1].split("```sh\n")[1].split("```")[0].splitlines()
         made = self.stream({"system": {"db_conn_time": 5, "host": [
             {"hostName": "ada", "cpu": {"cpuOnline": 8}, "memory": {"memFree": 7, "memTotal": 2 ** 64}}]}})

@@ -117,8 +117,8 @@ class Steering(TerminalTest):
         path = self.folder / ("x" + STEERING)
         path.write_bytes(self.snapshot().read_bytes()[:-9])
         for words in (("info", path), ("check", path), ("tree", path, "--stats", "--color", "never"),
-                      ("get", path, "/dbms"), ("recover", path, "-o", "/dev/null"), ("snapshot", "-o", path),
-                      ("print", path, "--at", "1"), ("tree", path, "--at", "1"), ("hex", path, "--path", "/dbms")):
+                      ("get", path, "/cpu"), ("recover", path, "-o", "/dev/null"), ("snapshot", "-o", path),
+                      ("print", path, "--at", "1"), ("tree", path, "--at", "1"), ("hex", path, "--path", "/cpu")):
             self.assertIn("x" + SEEN, self.harmless(*words))
         self.assertIn("x" + SEEN, self.harmless("recover", path, "-o", "-", terminal=("stderr",)))
 

@@ -125,7 +125,7 @@ TEST(SourceOverAFile, RefusesWhatIsMissingOrAFolder)
     return TAV_RC_OK;
   };
   EXPECT_EQ(codeOfOpening("no such file"), KOR_RC_NO_SUCH_FILE);
-  EXPECT_EQ(codeOfOpening("inspect"), KOR_RC_IS_FOLDER);
+  EXPECT_EQ(codeOfOpening("unit"), KOR_RC_IS_FOLDER);
 }
 
 TEST(PatchFile, HasWhatWasAppendedWithWhatReplacedIt)

@@ -67,7 +67,7 @@ protected:
     }
     told_.push_back(text);
   };
-  Follower follower_{tav::detail::fileText(file_.path), DocumentOptions{}, onNode_, stop_.get_token()};
+  Follower follower_{tav::FilePath(file_.path).text(), DocumentOptions{}, onNode_, stop_.get_token()};
 };
 
 Bytes numbers(std::initializer_list<uint32_t> all, bool swap = false, uint16_t root = TAV_ELM_CMN_SYSTEM)
@@ -164,7 +164,7 @@ TEST_F(Follow, CutAnywhereItTellsTheSameInTheEnd)
   {
     SCOPED_TRACE(cut);
     std::filesystem::remove(file_.path);
-    Follower follower(tav::detail::fileText(file_.path), {.form = {.swapped = false}}, onNode_, stop_.get_token());
+    Follower follower(tav::FilePath(file_.path).text(), {.form = {.swapped = false}}, onNode_, stop_.get_token());
     append(part(bytes, 0, cut));
     told_.clear();
     follower.goOn();
