@@ -177,10 +177,11 @@ class Diff(Folder):
 
     def test_a_path_that_leads_nowhere_is_told(self):
         document = {"system": {"cpuOnline": 8}}
-        for options in (("--path-a", "/system/host"), ("--path-a", "/system", "--path-b", "/sytem")):
+        for what, *options in (("no match", "--path-a", "/system/host"),
+                               ("no element is called 'sytem'", "--path-a", "/system", "--path-b", "/sytem")):
             result = self.diff(document, document, *options)
             self.assertEqual((result.status, result.out), (1, ""))
-            self.assertIn("no match", result.err)
+            self.assertIn(what, result.err)
         self.assertEqual(self.diff(document, document, "--path-a", "/system[").status, 2)
 
     def test_deep_subtrees_are_compared(self):
