@@ -8,8 +8,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include "kor/fileNative.h"
-#include "kor/systemError.h"
+#include "kor/port.h"
 
 namespace tav::kor
 {

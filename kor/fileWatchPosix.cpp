@@ -1,4 +1,4 @@
-#include "kor/fileWatch.h"
+#include "kor/port.h"
 
 #include <chrono>
 #include <thread>

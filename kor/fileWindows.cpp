@@ -1,8 +1,7 @@
 #include <climits>
 #include <string>
 
-#include "kor/fileNative.h"
-#include "kor/systemError.h"
+#include "kor/port.h"
 #include "kor/wideText.h"
 #include "kor/windows.h"
 

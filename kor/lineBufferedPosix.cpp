@@ -1,4 +1,4 @@
-#include "kor/lineBuffered.h"
+#include "kor/port.h"
 
 #if __has_include(<stdio_ext.h>)
 #include <stdio_ext.h>

@@ -1,4 +1,4 @@
-#include "kor/lineBuffered.h"
+#include "kor/port.h"
 
 namespace tav::kor
 {

@@ -1,4 +1,4 @@
-#include "kor/systemError.h"
+#include "kor/port.h"
 
 #include "kor/windows.h"
 #include "tav/kor.h"
