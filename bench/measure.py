@@ -28,7 +28,8 @@ GROUPS = [(SMALL, 15, 0.02), (TRACED, 5, 0.02), ("^W6", 7, 0.02), ("^W[125]cold/
 QUICK_GROUPS = [(SMALL, 3, 0.001), (TRACED, 1, 0.001), ("^W6cache/", 3, 0.001)]
 
 INSTRUCTIONS = [
-    "W1/floor", "W1/tavAddElement", "W1/layer", "W2/floor", "W2/tavGetNextChild", "W2/layer_children",
+    "W1/floor", "W1/tavAddElement", "W1/tavAddElement_kept_descriptor", "W1/tavAddElement_zeroed_descriptor",
+    "W1/tavAddElement_initialized_descriptor", "W1/layer", "W2/floor", "W2/tavGetNextChild", "W2/layer_children",
     "W2/layer_descendants", "W3/floor", "W3/tavFindElmInt", "W3/tavFindElmInt_own_stack", "W3/layer_path",
     "W4file/tavPrintSubtree_xml", "W5/floor", "W5/tavValidateHierarchy", "ring/tavAddElement", "ring/tavGetNextChild",
 ]

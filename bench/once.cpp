@@ -74,6 +74,12 @@ bool findLayer(Streams& streams, const std::vector<tav::Path>& paths)
   });
 }
 
+bool encodePlain(Streams& streams, library::Filling filling)
+{
+  return library::encodePlain(model(), streams.block.data(), streams.block.size(), filling, streams.hosts) ==
+         streams.encoded.size();
+}
+
 bool printXml(Streams& streams)
 {
   return library::printPlain(streams.encoded.data(), streams.encoded.size(), {0, nullptr, 0, devNull()},
@@ -95,10 +101,11 @@ bool stepThroughRing(Streams& streams)
 const std::map<std::string, std::function<bool(Streams&)>> kParts = {
     {"nothing", [](Streams&) { return true; }},
     {"W1/floor", [](Streams& s) { return floor0::encode(model(), s.block.data(), s.hosts) == s.encoded.size(); }},
-    {"W1/tavAddElement",
-     [](Streams& s) {
-       return library::encodePlain(model(), s.block.data(), s.block.size(), s.hosts) == s.encoded.size();
-     }},
+    {"W1/tavAddElement", [](Streams& s) { return encodePlain(s, library::Filling::sized); }},
+    {"W1/tavAddElement_kept_descriptor", [](Streams& s) { return encodePlain(s, library::Filling::kept); }},
+    {"W1/tavAddElement_zeroed_descriptor", [](Streams& s) { return encodePlain(s, library::Filling::zeroed); }},
+    {"W1/tavAddElement_initialized_descriptor",
+     [](Streams& s) { return encodePlain(s, library::Filling::initialized); }},
     {"W1/layer",
      [](Streams& s) {
        return library::encodeLayer(model(), std::as_writable_bytes(std::span(s.block))) == s.encoded.size();

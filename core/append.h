@@ -166,6 +166,12 @@ inline uint32_t openGroup(const Bytes& bytes, TAVHandle& handle, TAVHeader& head
   return TAV_RC_OK;
 }
 
+/// Whether the payload is all there. Most callers leave its size to the header.
+[[gnu::always_inline]] inline bool isComplete(uint64_t dataBufSize, uint64_t size)
+{
+  return dataBufSize >= size || dataBufSize == 0;
+}
+
 /// The fast way of appending a node with a 64-bit header if `Wide`.
 template<bool Wide, class Bytes>
 [[gnu::always_inline]] inline uint32_t append(const Bytes& bytes, TAVHandle& handle, TAVHeaderData& node)
@@ -177,7 +183,7 @@ template<bool Wide, class Bytes>
   const HeaderFields fields = loadFields<Wide>(node.header);
   if constexpr (Bytes::bare)
   {
-    const bool element = fields.type > TAV_TYPE_HEADER64 && node.dataBufSize >= fields.size &&
+    const bool element = fields.type > TAV_TYPE_HEADER64 && isComplete(node.dataBufSize, fields.size) &&
                          (fields.info & TAV_INFO_EYE_SIZE) == 0 && node.pDataBuf != nullptr;
     return element ? appendElement<Wide>(bytes, handle, node, fields) : kNotHere;
   }
@@ -185,8 +191,7 @@ template<bool Wide, class Bytes>
   {
     return openGroup<Wide>(bytes, handle, node.header, fields);
   }
-  const bool complete = node.dataBufSize >= fields.size || node.dataBufSize == 0;
-  return complete && node.pDataBuf != nullptr && fields.size <= kFarSize
+  return isComplete(node.dataBufSize, fields.size) && node.pDataBuf != nullptr && fields.size <= kFarSize
              ? appendElement<Wide>(bytes, handle, node, fields)
              : kNotHere;
 }

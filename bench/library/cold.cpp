@@ -54,7 +54,7 @@ BENCHMARK(encodeFloor)->Name("W1cold/floor");
 void encodeCold(benchmark::State& state)
 {
   perStream(state, [] {
-    return library::encodePlain(model(), cold().data(), cold().size(), kHosts) == kColdBytes;
+    return library::encodePlain(model(), cold().data(), cold().size(), library::Filling::sized, kHosts) == kColdBytes;
   });
 }
 BENCHMARK(encodeCold)->Name("W1cold/tavAddElement");

@@ -16,24 +16,72 @@ uint32_t openGroup(TAVHandle* handle, unsigned id)
   return tavAddElement(0, handle, &node);
 }
 
-/// The descriptor's other fields are the same for every leaf.
-uint32_t addLeaf(TAVHandle* handle, const Model& model, const Leaf& leaf, TAVHeaderData& node)
+/// A leaf's payload, which is only read.
+uint8_t* payloadOf(const Model& model, const Leaf& leaf)
 {
-  node.header.hdr64.size = leaf.size;
-  node.header.hdr64.type = floor0::typeOf(leaf.type);
-  node.header.hdr64.elm = leaf.id;
-  node.pDataBuf = static_cast<uint8_t*>(const_cast<void*>(model.payload(leaf))); // only read
-  node.dataBufSize = leaf.size;
-  return tavAddElement(0, handle, &node);
+  return static_cast<uint8_t*>(const_cast<void*>(model.payload(leaf)));
 }
 
+/// One descriptor for all leaves, of which each changes what is its own. `sized`: the payload's size is given, too.
+template<bool sized>
+class KeptDescriptor
+{
+public:
+  KeptDescriptor()
+  {
+    node_.header.hdr64.info = 0;
+    node_.header.hdrType = TAV_HDR_64;
+    node_.dataBufSize = 0;
+  }
+  uint32_t add(TAVHandle* handle, const Model& model, const Leaf& leaf)
+  {
+    node_.header.hdr64.size = leaf.size;
+    node_.header.hdr64.type = floor0::typeOf(leaf.type);
+    node_.header.hdr64.elm = leaf.id;
+    node_.pDataBuf = payloadOf(model, leaf);
+    if constexpr (sized)
+    {
+      node_.dataBufSize = leaf.size;
+    }
+    return tavAddElement(0, handle, &node_);
+  }
+
+private:
+  TAVHeaderData node_;
+};
+
+/// One for each leaf, zeroed and filled field by field.
+struct ZeroedDescriptor
+{
+  static uint32_t add(TAVHandle* handle, const Model& model, const Leaf& leaf)
+  {
+    TAVHeaderData node{};
+    node.header.hdr64.size = leaf.size;
+    node.header.hdr64.type = floor0::typeOf(leaf.type);
+    node.header.hdr64.elm = leaf.id;
+    node.header.hdrType = TAV_HDR_64;
+    node.pDataBuf = payloadOf(model, leaf);
+    return tavAddElement(0, handle, &node);
+  }
+};
+
+/// One for each leaf, all members at once.
+struct InitializedDescriptor
+{
+  static uint32_t add(TAVHandle* handle, const Model& model, const Leaf& leaf)
+  {
+    TAVHeaderData node{
+        {{.hdr64 = {leaf.size, 0, floor0::typeOf(leaf.type), leaf.id}}, TAV_HDR_64, 0}, payloadOf(model, leaf), 0, 0};
+    return tavAddElement(0, handle, &node);
+  }
+};
+
 /// The codes of all calls together: 0 when all worked.
+template<class Descriptor>
 uint32_t writeHost(TAVHandle* handle, const Model& model)
 {
   uint32_t rc = openGroup(handle, kHostId);
-  TAVHeaderData node;
-  node.header.hdr64.info = 0;
-  node.header.hdrType = TAV_HDR_64;
+  Descriptor descriptor;
   for (unsigned k = 0; k < kDatabases; ++k)
   {
     rc |= openGroup(handle, kDatabaseId + k);
@@ -43,7 +91,7 @@ uint32_t writeHost(TAVHandle* handle, const Model& model)
       const Leaf* leaf = model.application(k, j);
       for (unsigned m = 0; m < kMetrics; ++m, ++leaf)
       {
-        rc |= addLeaf(handle, model, *leaf, node);
+        rc |= descriptor.add(handle, model, *leaf);
       }
       rc |= tavCloseHeader(0, handle);
     }
@@ -51,6 +99,19 @@ uint32_t writeHost(TAVHandle* handle, const Model& model)
   }
   rc |= tavCloseHeader(0, handle);
   return rc;
+}
+
+template<class Descriptor>
+size_t encodeWith(const Model& model, void* block, uint64_t size, size_t hosts)
+{
+  const library::MemoryHandle handle(block, size, TAV_OPT_WRITE);
+  uint32_t rc = openGroup(handle.get(), kRootId);
+  for (size_t i = 0; i < hosts; ++i)
+  {
+    rc |= writeHost<Descriptor>(handle.get(), model);
+  }
+  rc |= tavCloseHeader(0, handle.get());
+  return rc == TAV_RC_OK ? handle.get()->streamBytes : 0;
 }
 
 uint64_t valueOf(const TAVHeaderData& leaf)
@@ -74,12 +135,15 @@ uint64_t sumBelow(TAVHandle* handle, TAVHeader* parent)
   return sum;
 }
 
-void encode(benchmark::State& state)
+void encode(benchmark::State& state, library::Filling filling)
 {
   std::vector<char> block(kBlockBytes);
-  perEncoding(state, block, [&] { return library::encodePlain(model(), block.data(), block.size()); });
+  perEncoding(state, block, [&] { return library::encodePlain(model(), block.data(), block.size(), filling); });
 }
-BENCHMARK(encode)->Name("W1/tavAddElement");
+BENCHMARK_CAPTURE(encode, sized, library::Filling::sized)->Name("W1/tavAddElement");
+BENCHMARK_CAPTURE(encode, kept, library::Filling::kept)->Name("W1/tavAddElement_kept_descriptor");
+BENCHMARK_CAPTURE(encode, zeroed, library::Filling::zeroed)->Name("W1/tavAddElement_zeroed_descriptor");
+BENCHMARK_CAPTURE(encode, initialized, library::Filling::initialized)->Name("W1/tavAddElement_initialized_descriptor");
 
 void walk(benchmark::State& state)
 {
@@ -116,16 +180,15 @@ BENCHMARK(validate)->Name("W5/tavValidateHierarchy");
 namespace library
 {
 
-size_t encodePlain(const Model& model, void* block, uint64_t size, size_t hosts)
+size_t encodePlain(const Model& model, void* block, uint64_t size, Filling filling, size_t hosts)
 {
-  const MemoryHandle handle(block, size, TAV_OPT_WRITE);
-  uint32_t rc = openGroup(handle.get(), kRootId);
-  for (size_t i = 0; i < hosts; ++i)
+  switch (filling)
   {
-    rc |= writeHost(handle.get(), model);
+  case Filling::kept: return encodeWith<KeptDescriptor<false>>(model, block, size, hosts);
+  case Filling::zeroed: return encodeWith<ZeroedDescriptor>(model, block, size, hosts);
+  case Filling::initialized: return encodeWith<InitializedDescriptor>(model, block, size, hosts);
+  default: return encodeWith<KeptDescriptor<true>>(model, block, size, hosts);
   }
-  rc |= tavCloseHeader(0, handle.get());
-  return rc == TAV_RC_OK ? handle.get()->streamBytes : 0;
 }
 
 uint64_t walkPlain(void* block, uint64_t size)

@@ -48,7 +48,17 @@ inline uint64_t encodedSize()
 
 /// @name The passes: one each. A size or a sum of 0 is a failure.
 /// @{
-size_t encodePlain(const snapshot::Model& model, void* block, uint64_t size, size_t hosts = 1);
+/// How callers fill their descriptors. Only the first gives a payload's size in `dataBufSize`: the others leave it to
+/// the header's.
+enum class Filling : uint8_t
+{
+  sized,       ///< one descriptor, kept and changed
+  kept,        ///< likewise
+  zeroed,      ///< one for each leaf, zeroed and assigned to
+  initialized, ///< one for each leaf, all members at once
+};
+size_t encodePlain(const snapshot::Model& model, void* block, uint64_t size, Filling filling = Filling::sized,
+                   size_t hosts = 1);
 uint64_t walkPlain(void* block, uint64_t size);
 /// `stack`: null, or an empty one that serves all searches.
 uint64_t findPlain(TAVHandle* handle, const snapshot::Path& path, TAVHdrStack* stack);

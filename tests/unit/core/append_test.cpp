@@ -104,6 +104,18 @@ TEST_P(FastAppend, LeavesAPayloadThatIsNotWholeToTheOperation)
   expectNotHere<tav::core::AnyForm>(node);
 }
 
+/// Most callers fill in the header alone: they pay no more than those who give the payload's size, too.
+TEST_P(FastAppend, TakesAPayloadWhoseSizeIsLeftToTheHeader)
+{
+  for (Element element : {u32(kChild, 7), u64(kChild, 8), ascii(kChild, "text")})
+  {
+    TAVHeaderData node = element.data();
+    node.dataBufSize = 0;
+    EXPECT_EQ(append<tav::core::HostForm>(*writer.handle(), node), TAV_RC_OK);
+    EXPECT_EQ(append<tav::core::AnyForm>(*writer.handle(), node), TAV_RC_OK);
+  }
+}
+
 TEST_P(FastAppend, LeavesANodeWithoutRoomToTheOperation)
 {
   for (const uint64_t size : {uint64_t{5000}, ~uint64_t{0} / 2, ~uint64_t{0} - 16, ~uint64_t{0}})
