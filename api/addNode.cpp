@@ -57,7 +57,7 @@ uint32_t writeBody(TAVHandle& handle, const TAVHeader& header, uint64_t& positio
   }
   if (handle.alignMode == 1)
   {
-    uint64_t padded = size; // the payload's size is rounded up, wherever the node stands
+    uint64_t padded = size; // the payload's size is rounded up, wherever the node is
     roundUp8Checked(padded);
     position = addSaturated(start, padded);
   }

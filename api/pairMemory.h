@@ -19,7 +19,7 @@
 namespace tav::inside
 {
 
-/// Allocates as the rest of the library does, by the form of `new` that tells of a failure; containers want it thrown.
+/// Allocates as the rest of the library does, by the form of `new` that reports a failure; containers want it thrown.
 template<class T>
 struct PairAllocator
 {

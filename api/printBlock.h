@@ -11,7 +11,7 @@ namespace tav::inside::print
 
 inline constexpr int64_t kBlanksPerLevel = 3;
 
-/// Opening, with its indentation, and closing of a data element that stands on one line, ready to be copied.
+/// Opening, with its indentation, and closing of a data element that is on one line, ready to be copied.
 struct ReadyTag
 {
   static constexpr size_t kLongestOpening = 96;

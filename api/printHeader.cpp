@@ -41,7 +41,7 @@ public:
   {
   }
 
-  /// Opens a record; what follows stands a step further in.
+  /// Opens a record; what follows is indented one step more.
   void open(std::string_view text, std::string_view tag)
   {
     row({indent(), "<", tag, ">\n"}, {indent(), text, "\n"});

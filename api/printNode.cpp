@@ -20,7 +20,7 @@ struct Asked
   bool close;
 };
 
-/// What stands where a node's data does; XML wraps it where anything else stands beside it.
+/// What is where a node's data does; XML wraps it where anything else is beside it.
 uint32_t printData(TAVPrintCtx& ctx, TAVHeaderData& node)
 {
   if (has(ctx, TAV_PRINT_DESCRIPTORS))
@@ -42,7 +42,7 @@ uint32_t printData(TAVPrintCtx& ctx, TAVHeaderData& node)
   return rc;
 }
 
-/// The opening of a node. That of an element stands on the line of its value, unless more than a value follows.
+/// The opening of a node. That of an element is on the line of its value, unless more than a value follows.
 void printOpening(TAVPrintCtx& ctx, uint16_t elm, std::string_view tag, const Asked& asked)
 {
   if (!has(ctx, TAV_PRINT_XML))

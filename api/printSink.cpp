@@ -120,7 +120,7 @@ void piece(TAVPrintCtx& ctx, Parts parts, size_t blanks)
 
 void line(TAVPrintCtx& ctx, Parts parts)
 {
-  if (!has(ctx, TAV_PRINT_XML)) // the depth stands before it, a piece of its own
+  if (!has(ctx, TAV_PRINT_XML)) // the depth is before it, a piece of its own
   {
     constexpr size_t width = 4;
     std::array<char, digits::kLongest> depth;

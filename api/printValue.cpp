@@ -75,7 +75,7 @@ void printByType(TAVPrintCtx& ctx, const TAVHeaderData& node)
   }
 }
 
-/// A descriptor that tells how many bytes it has must have the node's.
+/// A descriptor that says how many bytes it has must have the node's.
 bool hasItsBytes(const TAVHeaderData& node)
 {
   const uint64_t size = sizeOf(node.header);

@@ -11,7 +11,7 @@ using namespace tav::inside;
 namespace
 {
 
-/// The stream's first node. Whether the storage tells its size is not asked: the bound decides.
+/// The stream's first node. Whether the storage gives its size is not asked: the bound decides.
 core::Level levelOfRoot(const TAVHandle& handle)
 {
   uint64_t end = 0;

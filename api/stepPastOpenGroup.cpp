@@ -46,7 +46,7 @@ bool lookAt(TAVHandle& handle, uint64_t offset, uint8_t* to, uint64_t length)
   return true;
 }
 
-/// Whether the size of an open group stands at an offset: bytes that no eye catcher has.
+/// Whether the size of an open group is at an offset: bytes that no eye catcher has.
 bool hasOpenSize(TAVHandle& handle, uint64_t offset)
 {
   uint64_t size = 0;

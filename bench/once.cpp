@@ -17,7 +17,7 @@ using namespace snapshot;
 
 using Work = std::function<bool()>;
 
-/// Found by name by the counter: weak, so that no optimiser makes a copy of it under another name. What stands behind
+/// Found by name by the counter: weak, so that no optimiser makes a copy of it under another name. What is behind
 /// the call keeps it a call.
 extern "C" [[gnu::noinline, gnu::weak]] bool measuredWork(const Work& work)
 {

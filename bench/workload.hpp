@@ -1,5 +1,5 @@
 /// The "monitor snapshot" that the library and every peer encodes, walks, searches, prints and validates;
-/// docs/performance.md tells it in words.
+/// docs/performance.md describes it in words.
 #pragma once
 
 #include <cstddef>

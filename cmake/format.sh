@@ -1,5 +1,5 @@
 #!/usr/bin/env bash
-# Brings the sources into the project's form, or tells where they are not in it.
+# Brings the sources into the project's form, or says where they are not in it.
 #   format.sh             rewrites what needs it
 #   format.sh --check     fails when something does
 # Line breaks are the author's (see .clang-format); only a line of more than 120 columns is broken by the tool.

@@ -1,4 +1,4 @@
-/// What the steps know of a node and of the level that it stands on.
+/// What the steps know of a node and of the level that it is on.
 #pragma once
 
 #include <cstddef>
@@ -138,7 +138,7 @@ inline Level levelBelow(const Node& parent)
   return level;
 }
 
-/// Whether a sibling stands right behind a node's payload.
+/// Whether a sibling is right behind a node's payload.
 template<class AnyNode>
 [[gnu::always_inline]] inline bool isBare(const AnyNode& node)
 {

@@ -31,7 +31,7 @@ def flags_of(name, swapped, aligned):
 
 
 def seeds_of(name, made, swapped, aligned):
-    """Pairs of target and input. fuzz/input.h tells what the first bytes are."""
+    """Pairs of target and input. fuzz/input.h says what the first bytes are."""
     flags = flags_of(name, swapped, aligned)
     memory, ring = bytes((flags, 0, 0, 0)), bytes((flags, 24, 3, 7))
     for form in (memory, ring):

@@ -14,7 +14,7 @@ FileWatch::~FileWatch() = default;
 
 void FileWatch::watchFile() {}
 
-/// What the system tells of a folder's changes comes late for a file that is kept open: looking is as soon.
+/// What the system says of a folder's changes comes late for a file that is kept open: looking is as soon.
 void FileWatch::wait(uint32_t milliseconds)
 {
   Sleep(milliseconds);

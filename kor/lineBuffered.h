@@ -9,7 +9,7 @@ namespace tav::kor
 {
 
 /// Whether a stream to which something was written passes its buffer on at the end of each line. Where the system
-/// cannot tell, it does: who asks then takes the slower way that is right for all.
+/// cannot tell, it does: the caller then takes the slower way that is right for all.
 bool isLineBuffered(std::FILE* stream);
 
 } // namespace tav::kor

@@ -72,7 +72,7 @@ uint64_t findPage(const TAVCircularBuf& ring, uint64_t index)
   frame.dump(100, page);
   return page;
 }
-/// What came to the class later stands where there was padding: programs that know the class without it fit.
+/// What came to the class later is where there was padding: programs that know the class without it fit.
 static_assert(sizeof(TAVCircularBuf) == 88);
 
 /// The next smaller ring to try: a quarter less, and 1 page after 2 or 3.
@@ -211,7 +211,7 @@ uint32_t TAVCircularBuf::cutBackward(uint64_t offset, uint64_t index, uint64_t l
   }
   else if (head == index)
   {
-    contiguous = 1; // what stands before the first cached byte is not part of the stream
+    contiguous = 1; // what is before the first cached byte is not part of the stream
   }
   area.chunkLength = std::min(length, contiguous);
   first = pRing + (index + 1 - area.chunkLength);
@@ -313,7 +313,7 @@ uint32_t TAVCircularBuf::writeStraight(uint64_t offset, const uint8_t* data, uin
   return rc;
 }
 
-/// Brings the storage's cursor to an offset; a storage that stands there already is left alone. One that lands
+/// Brings the storage's cursor to an offset; a storage that is there already is left alone. One that lands
 /// elsewhere must be neither read nor written there.
 uint32_t TAVCircularBuf::seekStorage(uint64_t offset)
 {

@@ -181,7 +181,7 @@ uint32_t readBackward(TraceFrame& frame, TAVSSFile& storage, uint64_t wanted, ui
   uint8_t* const to = buffer != nullptr ? buffer + (bufSize - param.length) : nullptr;
   static_cast<void>(frame.step(50, storage.pFile->read(&param, to, &got)));
   storage.position = start;
-  storage.needSeek = 1; // the file now stands behind the bytes, the cursor before them
+  storage.needSeek = 1; // the file now is behind the bytes, the cursor before them
   if (bytesCount(frame.code()))
   {
     done = got;

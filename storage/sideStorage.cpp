@@ -28,7 +28,7 @@ TAVSideStorage::TAVSideStorage(uint32_t storageKind, uint64_t attributeBits)
 TAVSideStorage::~TAVSideStorage()
 {
   const TraceFrame frame(probe::sideStorageEnd);
-  // Whoever still holds the storage may ask it: the store is made although the object ends here.
+  // A caller that still holds the storage may ask it: the store is made although the object ends here.
   kor::store(status, TAV_STATUS_DESTROYED);
 }
 

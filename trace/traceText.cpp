@@ -105,7 +105,7 @@ std::string lineOf(const KORTraceRecord& record)
     korSnprintf(head, sizeof head, " code 0x%08" PRIX32 " %s", record.code, korCodeName(record.code));
     line += head;
   }
-  // The first item of an error is its code, which stands there already.
+  // The first item of an error is its code, which is there already.
   for (uint32_t i = record.kind == KOR_TRACE_ERROR ? 1 : 0; i < record.itemCount; ++i)
   {
     line += i == 0 || hasCode ? " " : ", ";

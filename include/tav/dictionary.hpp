@@ -123,7 +123,7 @@ private:
 
 } // namespace detail
 
-/// Every entry, range by range in the order in which the lookup asks them. Id 20 stands twice: as the document
+/// Every entry, range by range in the order in which the lookup asks them. Id 20 is listed twice: as the document
 /// root, which answers a lookup, and as SQLM_ELM_COLLECTED.
 constexpr std::span<const Entry> entries()
 {

@@ -104,7 +104,7 @@ struct KORTraceCB
   uint32_t enable;
 };
 
-/// What a trace record tells.
+/// What a trace record says.
 enum KORTraceKind : uint32_t
 {
   KOR_TRACE_ENTRY = 1, ///< a function was entered
@@ -228,11 +228,12 @@ public:
   /// Closes the file; a failure of the last delayed write comes up here. @retval KOR_RC_NOT_OPEN
   uint32_t close();
   /// Reads up to `length` bytes. At the end of the file: TAV_RC_END_OF_STORAGE with the bytes read so far in `*pDone`.
-  /// After a failure the file stands where it stood; one that cannot seek has lost the `*pDone` bytes read before it.
+  /// After a failure the file is positioned where it was; one that cannot seek has lost the `*pDone` bytes read before
+  /// it.
   uint32_t read(const KORFileReadParam* pParam, void* pBuffer, uint64_t* pDone);
   /// Writes all bytes, or fails with the number that got there in `*pDone`.
   uint32_t write(const KORFileWriteParam* pParam, uint64_t* pDone);
-  /// Positions the file; `*pNewPosition` (may be null) tells where it stands.
+  /// Positions the file; `*pNewPosition` (may be null) receives the new position.
   uint32_t seek(const KORFileSeekParam* pParam, uint64_t* pNewPosition);
   /// Locks the file against the locks of other processes and other open files. Nobody is kept from reading it.
   uint32_t lock(const KORFileLockParam* pParam);

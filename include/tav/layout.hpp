@@ -402,7 +402,7 @@ inline void swapPayload(SwapRule rule, const uint8_t* from, uint8_t* to, uint64_
 inline constexpr uint64_t kEyeLength = 8;
 inline constexpr uint64_t kEyeSizeLength = 16;
 
-/// The pair as it stands in the stream.
+/// The pair as stored in the stream.
 using EyeSizeBytes = std::array<uint8_t, kEyeSizeLength>;
 
 struct EyeSize

@@ -62,7 +62,7 @@ inline constexpr uint64_t TAV_PRINT_ATTRIBUTES = 0x80; ///< with XML and SUBTREE
 /// @name Records
 /// @{
 
-/// A node's header as it stands in the stream: 8 bytes. `size` counts the payload only.
+/// A node's header as stored in the stream: 8 bytes. `size` counts the payload only.
 struct TAVHeader32
 {
   uint32_t size;
@@ -524,7 +524,7 @@ TAV_API uint32_t tavUpdateElement(uint64_t options, TAVHandle* handle, TAVHeader
 /// Reads the node at an offset.
 ///
 /// @param options  ignored
-/// @param is64     which header form stands there; nothing in the stream tells
+/// @param is64     which header form is there; nothing in the stream says so
 /// @param[out] out the node. Over direct memory `dataBufSize` is the whole rest of the block.
 /// @retval TAV_RC_NO_MEMORY       the header does not lie in the block
 /// @retval TAV_RC_DATA_TOO_LARGE  the data does not lie in the block, or is larger than the ring
@@ -579,7 +579,7 @@ TAV_API uint32_t tavGetNextChild(uint64_t options, TAVHandle* handle, TAVHeader*
 /// can be reached, and not those whose pair does not count all that lies before it (padding, the extra bytes of
 /// tavAddString, the header of a 64-bit group of type 1). `out` may be `ref`. A failure leaves the header of `ref`
 /// untouched.
-/// @retval TAV_RC_NOT_FOUND  no eye catcher in the handle's byte order stands there
+/// @retval TAV_RC_NOT_FOUND  no eye catcher in the handle's byte order is there
 /// @retval TAV_RC_NO_MEMORY  the pair or the node would lie outside the stream
 /// Cost: two header fetches.
 TAV_API uint32_t tavGetPrevNode(uint64_t options, TAVHandle* handle, TAVHeaderData* ref, TAVHeaderData* out);
@@ -620,7 +620,7 @@ TAV_API uint32_t tavFindElmInt(TAVHandle* handle, TAVHeader* parent, uint32_t mi
 TAV_API uint32_t tavFindLogicalGroup(uint64_t options, TAVHandle* handle, TAVHeader* parent,
                                      TAVFindLogicalGroupParam* param, TAVHeaderData* out);
 
-/// Walks every node below a group and tells whether each can be reached and read.
+/// Walks every node below a group and reports whether each can be reached and read.
 /// @param options  bit 0 (containment) is refused here: see tavValidateSubtreeInt
 /// @retval TAV_RC_BAD_PARAM  null argument, or bit 0 set
 /// Codes of tavGetNextChild come up unchanged. 4,000 nested groups at the most: deeper gives TAV_RC_NO_MEMORY.
@@ -630,7 +630,7 @@ TAV_API uint32_t tavValidateHierarchy(uint64_t options, TAVHandle* handle, TAVHe
 /// The walk of tavValidateHierarchy. With bit 0 of `options` every child must lie inside its parent, else
 /// TAV_RC_OUTSIDE_PARENT; that check takes the parent's end without the length of its header, so it refuses some
 /// sound streams: an empty last child, the last child of a 64-bit group of type 1, and every group that was never
-/// closed unless it stands at offset 0.
+/// closed unless it is at offset 0.
 TAV_API uint32_t tavValidateSubtreeInt(uint64_t options, TAVHandle* handle, TAVHeader* header);
 /// @}
 

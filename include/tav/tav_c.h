@@ -59,7 +59,7 @@ typedef struct tav_node
   uint16_t elm;    ///< TAV_ELM_...
   uint8_t header_bits;
   uint8_t is_group;
-  /// As it stands in the file, in the file's byte order. Over memory it lives as long as the bytes, over a file until
+  /// As it is in the file, in the file's byte order. Over memory it lives as long as the bytes, over a file until
   /// the next call with the reader. Null for a group, and where it is larger than 10 MiB: tav_read.
   const uint8_t* payload;
   uint64_t payload_size; ///< of what is at `payload`
@@ -98,7 +98,7 @@ TAV_C_API const char* tav_last_message(const tav_reader* reader);
 
 /// The root behind another one: every stream in the file has one. `after` null: the first; it may be `out` itself.
 /// @retval TAV_RC_NO_MORE_CHILDREN  there is none
-/// @retval TAV_RC_OUTSIDE_PARENT, TAV_RC_DATA_TOO_LARGE ...  what stands between is damaged
+/// @retval TAV_RC_OUTSIDE_PARENT, TAV_RC_DATA_TOO_LARGE ...  what is between is damaged
 TAV_C_API uint32_t tav_next_root(tav_reader* reader, const tav_node* after, tav_node* out);
 
 /// The first child of a group. TAV_RC_NO_MORE_CHILDREN where it has none; a data element has none.
@@ -138,7 +138,7 @@ TAV_C_API uint32_t tav_get_time(const tav_reader* reader, const tav_node* node, 
 /// TAV_RC_DATA_TOO_LARGE where that is null: tav_read.
 TAV_C_API uint32_t tav_get_text(const tav_reader* reader, const tav_node* node, const char** text, size_t* size);
 
-/// The payload of any data element as it stands in the file. It lives as the payload. TAV_RC_DATA_TOO_LARGE where that
+/// The payload of any data element as in the file. It lives as the payload. TAV_RC_DATA_TOO_LARGE where that
 /// is null.
 TAV_C_API uint32_t tav_get_bytes(const tav_reader* reader, const tav_node* node, const void** bytes, size_t* size);
 

@@ -1,4 +1,4 @@
-/// What stands behind the handles of tav_c.h, and what keeps exceptions from going through it.
+/// What is behind the handles of tav_c.h, and what keeps exceptions from going through it.
 #pragma once
 
 #include <cstdint>

@@ -42,7 +42,7 @@ void Checker::found(RuleId rule, uint64_t offset, uint64_t length, std::string s
 
 std::string Checker::path() const
 {
-  // So deep, a whole path is longer than anyone reads; the offset tells the place.
+  // So deep, a whole path is longer than anyone reads; the offset gives the place.
   return style_ == PathStyle::whole && event_.depth > kMostNested ? std::string() : walker_.path(event_, style_);
 }
 

@@ -59,7 +59,7 @@ private:
   ByteSource* source_ = nullptr;
   Form form_{};                            ///< of the source
   std::optional<StreamEncoder> encoder_{}; ///< of one root
-  Problem place_{};                        ///< where in the source the root stands
+  Problem place_{};                        ///< where in the source the root is
   bool wide_ = false;                      ///< the root gets a 64-bit header
   bool narrows_ = false;                   ///< instead of one of 64 bits it gets one of 32
   bool paired_ = false;                    ///< it asks for an end element

@@ -35,7 +35,7 @@ Node nodeOf(const Row& row)
   Node node;
   node.header.hdrType = TAV_HDR_64;
   node.header.hdr64 = {row.size, 0, row.type, row.elm};
-  // So that the payload begins where it does, whatever header stands before it.
+  // So that the payload begins where it does, whatever header is before it.
   node.header.nodeOffset = row.payload - kHeaderSize64;
   node.limit = row.payload + row.size;
   return node;

@@ -135,7 +135,7 @@ bool Follower::findForm()
   return form_.has_value();
 }
 
-/// Of a few nodes, the last one cut, more than one padding can make sense: there the root's header tells.
+/// Of a few nodes, the last one cut, more than one padding can make sense: there the root's header says.
 FormChoice Follower::choiceNow()
 {
   constexpr uint64_t fewBytes = 4096;
@@ -341,7 +341,7 @@ void Follower::arrive(const TAVHeader& node, const TAVHeader& before)
 FollowEnd Document::follow(const std::function<void(const tav::Node&)>& onNode, const FollowOptions& options) const
 {
   using Clock = std::chrono::steady_clock;
-  constexpr std::chrono::milliseconds longestWait(100); // how long a stop, or what no watch tells of, can take
+  constexpr std::chrono::milliseconds longestWait(100); // how long a stop, or what no watch says of, can take
   if (state_->path.empty())
   {
     throw Error(Problem{.file = state_->source->name(),

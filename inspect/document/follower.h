@@ -34,7 +34,7 @@ private:
   struct Level
   {
     TAVHeader group{};
-    TAVHeader before{}; ///< the child of the group around that stands before this one; header type 0: none
+    TAVHeader before{}; ///< the child of the group around that is before this one; header type 0: none
     TAVHeader last{};   ///< the child that was read last; header type 0: none
   };
 

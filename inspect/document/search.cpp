@@ -74,7 +74,7 @@ bool Search::next()
     const bool isOuter = isBelow_ && event_.depth == 0;
     if (event_.what == What::nodeEnd && isOuter)
     {
-      break; // what stands behind the node is not searched
+      break; // what is behind the node is not searched
     }
     if (event_.what != What::nodeBegin)
     {

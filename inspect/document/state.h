@@ -29,7 +29,7 @@ struct DocumentState
   /// Enters what was passed over into the account.
   void add(const PassedOver& passed);
 
-  /// The form of the stream that a node stands in which a walk has handed out.
+  /// The form of the stream that a node is in which a walk has handed out.
   Form formAt(uint64_t offset) const;
 
   /// Remembers that a stream of this form begins at an offset.

@@ -17,7 +17,7 @@ namespace tav::inspect
 struct EditPlace
 {
   uint64_t offset = 0;
-  std::array<uint8_t, layout::kHeaderSize64> header{}; ///< as it stands in the stream
+  std::array<uint8_t, layout::kHeaderSize64> header{}; ///< as stored in the stream
   uint32_t headerLength = 0;
   uint32_t assignment = 0;
   uint16_t type = 0;     ///< that it gets

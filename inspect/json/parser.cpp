@@ -157,7 +157,7 @@ void JsonParser::readKey()
   {
     fail("a key");
   }
-  handler_.key(readString()); // so that what is said of a key tells its place
+  handler_.key(readString()); // so that what is said of a key gives its place
   if (peekBehindBlanks() != ':')
   {
     fail("a colon");

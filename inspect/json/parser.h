@@ -11,7 +11,7 @@
 namespace tav::inspect
 {
 
-/// Why a text is no JSON; the reading position stands behind the place.
+/// Why a text is no JSON; the reading position is behind the place.
 struct JsonSyntaxError : std::runtime_error
 {
   using std::runtime_error::runtime_error;

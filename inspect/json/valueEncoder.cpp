@@ -159,7 +159,7 @@ std::string payloadFor(const Draft& draft, uint16_t type, bool swapped, bool reo
   if (draft.given == Given::bytes)
   {
     std::string bytes = draft.value;
-    // Of a long value, what has a byte order stands in front, but for arrays.
+    // Of a long value, what has a byte order is in front, but for arrays.
     if (reorder && (!draft.begun || typeInfo(type).swapRule == SwapRule::all64))
     {
       reverseOrder(bytes, type);

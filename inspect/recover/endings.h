@@ -11,7 +11,7 @@
 namespace tav::inspect
 {
 
-/// A group as its end element tells it.
+/// A group as its end element describes it.
 struct Ending
 {
   uint64_t start = 0; ///< of the group's header, which has 64 bits

@@ -19,7 +19,7 @@
 namespace tav::inspect
 {
 
-/// Where the start of a file is damaged, nothing but the outcome tells the form: all that are not refuted are tried,
+/// Where the start of a file is damaged, nothing but the outcome shows the form: all that are not refuted are tried,
 /// and the one that keeps most is taken; of equals the likelier one. Behind a sound start, the next likely one is tried
 /// where it is not far off.
 class FormRecovery

@@ -244,14 +244,14 @@ void Judge::lookAtData(Candidate& found, uint64_t limit) const
   lookBehind(found, base, limit);
   if (found.trust == Trust::none)
   {
-    // Nothing tells what the bytes behind it are: a damaged pair is found to be lost when they are searched.
+    // Nothing says what the bytes behind it are: a damaged pair is found to be lost when they are searched.
     found.end = base;
     found.pairMissing = pair;
     found.trust = Trust::alone;
   }
 }
 
-/// Where the next node stands tells whether the two bytes behind a string and the damaged pair are there.
+/// Where the next node is shows whether the two bytes behind a string and the damaged pair are there.
 void Judge::lookBehind(Candidate& found, uint64_t base, uint64_t limit) const
 {
   const TAVHeader& header = found.header();

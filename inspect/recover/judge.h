@@ -55,7 +55,7 @@ public:
   /// is, as all around the place where a file was cut, counts by what is in it.
   Belief beliefAt(uint64_t offset, bool wide, uint64_t limit) const;
 
-  /// Whether a node stands at a place, in a group with these headers or behind its end.
+  /// Whether there is a node at a place, in a group with these headers or behind its end.
   bool goesOn(uint64_t offset, bool wide) const;
 
   /// Whether a group ends at a place, or one begins whose header is lost. What nothing confirms ends a group only where
@@ -71,7 +71,7 @@ public:
   /// Whether nodes follow one another from a place exactly to another one, into groups that end behind it.
   bool leadsTo(uint64_t from, bool wide, uint64_t end) const;
 
-  /// Whether a node stands at an offset beyond doubt, with headers of either width. `bytes` are those of the header.
+  /// Whether there is a node at an offset beyond doubt, with headers of either width. `bytes` are those of the header.
   bool isSure(const uint8_t* bytes, uint64_t offset, bool wide) const;
 
   /// Whether it is a node to be taken where one is searched for: what is left of a header, or a group that claims what

@@ -13,7 +13,7 @@
 namespace tav::inspect
 {
 
-/// A data element as it stands in the damaged stream.
+/// A data element as stored in the damaged stream.
 struct FoundData
 {
   TAVHeader header{};

@@ -290,7 +290,7 @@ bool Recovery::loseStranger(const TAVHeader& header)
   return true;
 }
 
-/// Whether more than zeros stands where a root ends by its size, and no other root begins.
+/// Whether there is more than zeros where a root ends by its size, and no other root begins.
 bool Recovery::endsTooSoon(uint64_t end)
 {
   bool gaveUp = false;

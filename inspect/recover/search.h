@@ -35,7 +35,7 @@ public:
   /// The first node between two places that is beyond doubt; `to` when there is none.
   uint64_t firstSure(uint64_t from, uint64_t to, bool wide);
 
-  /// Whether a node stands where it seems to. On the way from node to node its header is trusted; behind damage, all
+  /// Whether a node is where it seems to. On the way from node to node its header is trusted; behind damage, all
   /// its bytes are searched for something surer. Takes the padding away from one that has none.
   bool believe(Candidate& found, Footing footing);
 

@@ -47,7 +47,7 @@ public:
   /// Whether the bytes of a header have a known type and an element of the dictionary.
   bool isNamedHeader(const uint8_t* bytes, bool wide) const;
 
-  /// Whether an eye catcher of either byte order stands at `offset`; then also its distance, in that order.
+  /// Whether an eye catcher of either byte order is at `offset`; then also its distance, in that order.
   bool pairAt(uint64_t offset, uint64_t limit, uint64_t& distance) const;
 
   /// Whether the eye/size pair at `offset` ends the group at `group`.
@@ -66,7 +66,7 @@ public:
   /// Where the zeros begin that the file ends in, `from` at the earliest; the file's end when there are fewer than 8.
   uint64_t zerosStart(uint64_t from);
 
-  /// Whether what stands behind a node is another node, or the bounds end there.
+  /// Whether what is behind a node is another node, or the bounds end there.
   bool isFollowed(const TAVHeader& node, uint64_t limit) const;
 
   /// Whether nodes of any kind follow one another from `offset` on, by their sizes alone, up to the limit, to an open

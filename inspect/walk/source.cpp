@@ -12,7 +12,7 @@ namespace tav::inspect
 namespace
 {
 
-/// What stands in a storage from an offset on, for reading.
+/// What is in a storage from an offset on, for reading.
 class StorageWindow : public TAVSideStorage
 {
 public:

@@ -65,7 +65,7 @@ RootBelief judgeRoot(ByteSource& source, const Form& form);
 /// Whether a root's header is as writers make it.
 bool isUsualRoot(const TAVHeader& root);
 
-/// Reads the header of a root; false when what stands there can be none.
+/// Reads the header of a root; false when what is there can be none.
 bool readRoot(const Prober& prober, uint64_t offset, bool wide, uint64_t limit, TAVHeader& root);
 
 } // namespace tav::inspect

@@ -269,7 +269,7 @@ bool Walker::looksUnfinished(const Node& node, const Frame& parent)
   {
     return false;
   }
-  // Children that nobody knows count unless what stands there is surer as a sibling, with a header of the other width.
+  // Children that nobody knows count unless what is there is surer as a sibling, with a header of the other width.
   const uint64_t start = node.payloadOffset();
   const bool wide = hasChildren64(node.header);
   return prober_->judge(start, wide, parent.limit) >= Belief::typed ||
@@ -336,7 +336,7 @@ bool Walker::extraBehind(const Node& node, uint64_t base, uint64_t limit)
   }
   if (without == with && node.is64() && hasEyeSize(node.header))
   {
-    // Neither eye catcher is whole: what follows the pair tells where it stands.
+    // Neither eye catcher is whole: what follows the pair shows where it is.
     const auto follows = [&](uint64_t at) {
       return at == limit || prober_->judge(at, top.wide, limit) >= Belief::named;
     };

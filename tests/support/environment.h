@@ -1,5 +1,5 @@
 /// @file environment.h
-/// Numbers that whoever runs the tests may set.
+/// Numbers that the environment may set for a run of the tests.
 #pragma once
 
 #include <cstdint>

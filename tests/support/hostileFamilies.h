@@ -213,7 +213,7 @@ inline void wideWithElements(HostileRows& rows)
   rows.endOf(root);
 }
 
-/// Behind each end stands what cannot be read, so that the sibling is far behind.
+/// Behind each end is what cannot be read, so that the sibling is far behind.
 inline void endsBeforeUnreadable(HostileRows& rows)
 {
   const Groups groups = openMany(rows, rows.length() / 4);
@@ -234,7 +234,7 @@ inline void endsBeforeUnreadableFromOutside(HostileRows& rows)
   rows.pairTo(0).marker();
 }
 
-/// Behind each end stands an element of a size that a small ring cannot hold.
+/// Behind each end is an element of a size that a small ring cannot hold.
 inline void endsBeforeLarge(HostileRows& rows)
 {
   const Groups groups = openMany(rows, rows.length() / 4);

@@ -146,7 +146,7 @@ std::vector<uint8_t> makeSnapshot(const SnapshotForm& form)
   return block;
 }
 
-/// What stands below the root, without what ends it.
+/// What is below the root, without what ends it.
 std::span<const std::byte> nodesOf(const std::vector<uint8_t>& snapshot, const SnapshotForm& form)
 {
   const bool wide = form.stream.root == Width::bits64;

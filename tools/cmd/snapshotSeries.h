@@ -10,7 +10,7 @@
 namespace tav::tool
 {
 
-/// What stands below the root of one snapshot, in the form that the invocation asks for.
+/// What is below the root of one snapshot, in the form that the invocation asks for.
 using SnapshotMaker = std::function<void(const std::function<void(std::span<const std::byte>)>&)>;
 
 /// The form that the invocation asks for.

@@ -63,7 +63,7 @@ uint64_t processId();
 bool removeFile(const std::string& path);
 
 /// `std::fopen` for any path; `mode` is one of "rb", "wb". What is written to a path that `ownFile` knows goes to that
-/// very open file, from where it stands. When that does not work the result is null, and `code` says why.
+/// very open file, from its position. When that does not work the result is null, and `code` says why.
 FILE* openStream(const std::string& path, const char* mode, uint32_t& code);
 
 /// The number of the open file of this process that a path stands for, itself or by links: /dev/stdout, /dev/fd/3,

@@ -1,5 +1,5 @@
 /// @file machine.h
-/// What the machine tells about itself.
+/// What the machine reports about itself.
 #pragma once
 
 #include <cstdint>
@@ -14,7 +14,7 @@ struct CpuFacts
   std::optional<uint64_t> online{};
 };
 
-/// What this machine tells about itself; what it does not tell is empty.
+/// What this machine reports about itself; what it does not report is empty.
 struct MachineFacts
 {
   std::string hostName{};

@@ -19,7 +19,7 @@ Problem withHint(Problem problem);
 /// What leads to a stream from a file of this kind; empty: nothing does.
 std::string_view hintOf(const FileKind& kind);
 
-/// What is said behind a sentence that tells of a stream in another form at an offset of a source: the option that
+/// What is said behind a sentence that says of a stream in another form at an offset of a source: the option that
 /// reads it.
 std::string readsFrom(const ByteSource& source, uint64_t offset);
 

@@ -22,7 +22,7 @@ struct InputLimits
 };
 
 /// Opens a file, "-" for standard input. Standard input, pipes and files that tell a wrong size, as those of /proc do,
-/// are copied to a temporary file first, so that everything works on them. What stands before `from` is left out, and
+/// are copied to a temporary file first, so that everything works on them. What is before `from` is left out, and
 /// all offsets count from there. Throws Error, also because a limit is reached.
 std::unique_ptr<inspect::ByteSource> openSource(const std::string& path, const InputLimits& limits, uint64_t from = 0);
 

@@ -47,7 +47,7 @@ struct OptionSpec
   std::string help{};
   std::vector<std::string> choices{};
   bool many = false;            ///< may be given several times
-  bool required = false;        ///< shown in the command's usage; the command itself tells that it is missing
+  bool required = false;        ///< shown in the command's usage; the command itself reports it missing
   Concern concern = kNoConcern; ///< of a common option: what a command must have to do with; else it takes it always
 };
 

@@ -34,7 +34,7 @@ bool isInPlace(const std::string& path, const std::filesystem::path& target)
   return known && (!std::filesystem::is_regular_file(status) || std::filesystem::is_symlink(target, error));
 }
 
-/// The name of a file beside the target that nobody has; `attempt` tells one from another. Long names are cut, since a
+/// The name of a file beside the target that nobody has; `attempt` distinguishes them. Long names are cut, since a
 /// system allows 255 bytes or less.
 std::string besideName(const std::filesystem::path& target, unsigned attempt)
 {
@@ -108,7 +108,7 @@ std::vector<NamedOutput> outputsOf(const Invocation& invocation)
   return outputs;
 }
 
-/// The files that a command reads. Standard input has a name on most systems, which tells when it comes from a file.
+/// The files that a command reads. Standard input has a name on most systems, which shows when it comes from a file.
 std::vector<std::string> inputsOf(const Invocation& invocation)
 {
   std::vector<std::string> inputs = invocation.arguments();

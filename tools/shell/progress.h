@@ -11,7 +11,7 @@
 namespace tav::tool
 {
 
-/// A line on standard error that tells how far long work is: part, rate, remaining time. Only on a terminal and only
+/// A line on standard error that shows how far long work is: part, rate, remaining time. Only on a terminal and only
 /// when the work takes more than half a second. Cheap to call for every node.
 class Progress
 {

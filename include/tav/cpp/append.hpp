@@ -24,7 +24,7 @@ struct FileEnd
 {
   FileOutcome outcome{};
   StreamForm form{};
-  uint64_t end = 0;              ///< where the next node goes; what stands behind is zeros, or a node that was cut
+  uint64_t end = 0;              ///< where the next node goes; what is behind is zeros, or a node that was cut
   std::vector<TAVHeader> open{}; ///< groups that a killed writer left, the outermost first
 };
 

@@ -15,7 +15,7 @@
 namespace tav::detail
 {
 
-/// A payload as it stands in the stream.
+/// A payload as stored in the stream.
 struct RawValue
 {
   uint16_t type;

@@ -128,7 +128,7 @@ struct Told
   std::string sentence;
 };
 
-/// A failure of which more is known than its code tells: "adding cpu (60004): TAV_RC_BAD_PARAM: the group is closed".
+/// A failure of which more is known than its code says: "adding cpu (60004): TAV_RC_BAD_PARAM: the group is closed".
 class ToldError : public std::system_error
 {
 public:
@@ -157,7 +157,7 @@ private:
   throw ToldError(code, text + ": " + known->name + ": " + told.sentence);
 }
 
-/// The same where more can be said: `about` tells what it was done with.
+/// The same where more can be said: `about` says what it was done with.
 template<class About>
 [[noreturn, gnu::noinline, gnu::cold]] void raiseAbout(uint32_t code, const char* what, const About& about)
 {

@@ -191,7 +191,7 @@ private:
   }
 
   /// Short, so that it fits where the name that is replaced does. Nobody else has it in all likelihood: the object's
-  /// place tells the threads of a process apart, the thread's number the processes.
+  /// place says the threads of a process apart, the thread's number the processes.
   [[nodiscard]] std::string nameOf(int attempt) const
   {
     constexpr uint64_t spread = 0x9E3779B97F4A7C15U;

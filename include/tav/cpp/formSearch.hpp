@@ -79,7 +79,7 @@ private:
       keep(form, root, possible);
       return rc;
     }
-    for (const bool aligned : {false, true}) // no flag tells
+    for (const bool aligned : {false, true}) // no flag says
     {
       form.aligned = aligned;
       rc = follow(form, root, fits);

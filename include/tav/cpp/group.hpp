@@ -335,7 +335,7 @@ private:
       state_->innermost = outer_;
       if (fast && outer_ != 0)
       {
-        state_->fast = outer_; // a group of 64-bit headers stands in one
+        state_->fast = outer_; // a group of 64-bit headers is in one
       }
       else
       {
@@ -346,7 +346,7 @@ private:
     return rc;
   }
 
-  /// What can still go wrong is kept for the next who can report it.
+  /// What can still go wrong is kept for the next call that can report it.
   void closeForGood() noexcept
   {
     detail::WriterState& state = *state_;

@@ -218,7 +218,7 @@ public:
   [[nodiscard]] FindRange find(const Path& path) const;
   [[nodiscard]] FindRange find(const Path& path, std::error_code& ec) const;
 
-  /// The payload as it stands in the stream; empty for a group.
+  /// The payload as stored in the stream; empty for a group.
   [[nodiscard]] PayloadView payload() const
   {
     detail::demand(refresh(), "reading", [this] { return detail::nodeText(*this); });
@@ -315,7 +315,7 @@ private:
       : HeaderView(data), state_(&state), fetch_(state.fetches), isFast_(state.isFast)
   {
   }
-  /// A node that a walk stands on: the walk moves it on.
+  /// A node that a walk is at: the walk moves it on.
   explicit Node(detail::ReaderState* state) noexcept
       : state_(state), isFast_(state != nullptr && state->isFast)
   {
@@ -386,7 +386,7 @@ private:
   static constexpr bool kHasFastWay =
       StreamInteger<T> || std::same_as<T, TAVTimeStamp> || std::same_as<T, std::string_view>;
 
-  /// Whether a value can be taken as it stands.
+  /// Whether a value can be taken as it is.
   template<class T>
   [[gnu::always_inline]] bool isFast() const noexcept
   {

@@ -60,7 +60,7 @@ struct ReaderState
 
 } // namespace detail
 
-/// A node's payload as it stands in the stream. Over memory it lives as long as the memory, over a file or another
+/// A node's payload as stored in the stream. Over memory it lives as long as the memory, over a file or another
 /// storage until anything else is read through the reader: then, in debug builds, using it throws std::logic_error.
 /// It converts to std::span<const std::byte>, which is not checked. It must not outlive the reader.
 class PayloadView

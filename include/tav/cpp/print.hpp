@@ -136,7 +136,7 @@ private:
     }
   }
 
-  /// What stands before a line.
+  /// What is before a line.
   void begin(size_t depth, size_t further = 0)
   {
     if (!options_.xml)
@@ -205,7 +205,7 @@ private:
     }
   }
 
-  /// Whether the value stands in an element of its own, beside others.
+  /// Whether the value is in an element of its own, beside others.
   [[nodiscard]] bool isWrapped() const noexcept
   {
     return !options_.bare && (options_.headers || options_.descriptors);
@@ -284,7 +284,7 @@ private:
     return value;
   }
 
-  /// What an element's tag tells of a value that is no plain text.
+  /// What an element's tag says of a value that is no plain text.
   void appendForm(const ValueText& value)
   {
     if (value.isHex)

@@ -18,7 +18,7 @@ namespace tav
 namespace detail
 {
 
-/// An iterator over a walk that lives in its range. `Walk` has `current()` and `advance()`, which tells whether there
+/// An iterator over a walk that lives in its range. `Walk` has `current()` and `advance()`, which reports whether there
 /// is a node. The end is kept in the iterator, where a loop has it in a register.
 template<class Walk>
 class WalkIterator
@@ -128,7 +128,7 @@ private:
   {
   }
 
-  /// The stream's first node stands alone.
+  /// The stream's first node is alone.
   static uint32_t whyNoSiblings(const Node& node) noexcept
   {
     if (node.hasParent())

@@ -101,7 +101,7 @@ public:
   RootRange roots() const&& = delete;
   RootRange roots(std::error_code& ec) const&& = delete;
 
-  /// The node at an offset. Nothing in the stream tells which header form stands there.
+  /// The node at an offset. Nothing in the stream says which header form is there.
   [[nodiscard]] Node at(uint64_t offset, Width width = Width::bits64) const&
   {
     Node node;

@@ -178,7 +178,7 @@ public:
     return isLeft && files_.isNumbered() ? openNext() : outcome;
   }
 
-  /// What stands before a root: another file, when this one has had its time or has its size.
+  /// What is before a root: another file, when this one has had its time or has its size.
   FileOutcome prepare()
   {
     if (isFinished_)

@@ -113,7 +113,7 @@ private:
   uint64_t filled_ = 0;
 };
 
-/// Reads the header at an offset; `there` tells whether the bytes have room for one.
+/// Reads the header at an offset; `there` reports whether the bytes have room for one.
 template<class Bytes>
 uint32_t readHeader(Bytes& bytes, const StreamForm& form, bool wide, uint64_t offset, TAVHeader& header,
                     bool& there) noexcept
@@ -247,7 +247,7 @@ private:
     return rc;
   }
 
-  /// A root may begin with zeros itself: of those places that its own leave, the last one where a root stands that has
+  /// A root may begin with zeros itself: of those places that its own leave, the last one where a root is that has
   /// a child, and behind which there is nothing, zeros, or another root. One that ends in the file is preferred.
   uint32_t behindZeros(uint64_t from, uint64_t first, TAVHeader& root) noexcept
   {
@@ -290,7 +290,7 @@ private:
     return rc != TAV_RC_OK || !likely || layout::isSizeUnknown(root) ? rc : isFollowed(endOfGroup(root), likely);
   }
 
-  /// Whether nothing, zeros or a root that ends in the file stands at an offset, or a root behind zeros.
+  /// Whether nothing, zeros or a root that ends in the file is at an offset, or a root behind zeros.
   uint32_t isFollowed(uint64_t offset, bool& followed) noexcept
   {
     uint64_t first = offset;

@@ -72,7 +72,7 @@ private:
 /// The roots of the streams that stand one behind another in a file, in one form. Zeros between them, which fill the
 /// last page of each, are passed over. Nothing comes behind a root that was never closed: all there is counts as its
 /// own. A single pass; the range holds the place of the walk, so an iterator must not outlive it, nor it the reader.
-/// TAV_RC_BAD_CHILD_HDR where something else than a root stands.
+/// TAV_RC_BAD_CHILD_HDR where something else than a root is.
 class RootRange : public std::ranges::view_base
 {
 public:

@@ -15,7 +15,7 @@
 namespace tav
 {
 
-/// How a stream is laid out; reader and writer must agree, nothing in the stream tells.
+/// How a stream is laid out; reader and writer must agree, nothing in the stream says so.
 struct StreamOptions
 {
   ByteOrder byteOrder = ByteOrder::native;

@@ -11,7 +11,7 @@
 namespace tav::detail
 {
 
-/// Whether every byte is below 0x80. Looks at eight bytes at a time: it stands before every text that is written.
+/// Whether every byte is below 0x80. Looks at eight bytes at a time: it runs before every text that is written.
 [[gnu::always_inline]] inline bool isAscii(std::string_view text) noexcept
 {
   constexpr uint64_t high = 0x8080808080808080U;

@@ -53,7 +53,7 @@ public:
   {
     return static_cast<uint16_t>(number_);
   }
-  /// What was given; a negative number stands at the other end.
+  /// What was given; a negative number is at the other end.
   [[nodiscard]] constexpr uint64_t number() const noexcept
   {
     return number_;

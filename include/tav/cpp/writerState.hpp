@@ -141,7 +141,7 @@ struct WriterState
                   : finished;
   }
 
-  /// What stands before every operation on the group at a level; 0 stands for the stream. What a destructor could not
+  /// What is before every operation on the group at a level; 0 stands for the stream. What a destructor could not
   /// report comes first; then groups that a destructor could not end are ended, in the way in which this one is.
   uint32_t enter(uint32_t level, uint64_t how = 0) noexcept
   {

@@ -21,7 +21,7 @@ TAV_INSPECT_API std::string xmlNameOf(uint16_t elm);
 /// U+FFFF.
 TAV_INSPECT_API bool isXmlText(ByteSource& source, uint64_t from, uint64_t end);
 
-/// How a value stands in XML.
+/// How a value is in XML.
 enum class XmlValue : uint8_t
 {
   number,

@@ -1,5 +1,5 @@
 /// @file checker.hpp
-/// Follows a walk and tells what is wrong.
+/// Follows a walk and says what is wrong.
 #pragma once
 
 #include <cstdint>
@@ -31,7 +31,7 @@ class Checker
 public:
   using Sink = std::function<void(const Finding&)>;
 
-  /// `wanted` tells which rules to look for: payloads are read only for rules about strings.
+  /// `wanted` says which rules to look for: payloads are read only for rules about strings.
   /// `style` is that of the findings' paths; whole ones are given down to 4,000 levels.
   TAV_INSPECT_API Checker(ByteSource& source, const Form& form, std::function<bool(RuleId)> wanted, Sink sink,
                           PathStyle style = PathStyle::whole);

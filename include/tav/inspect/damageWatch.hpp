@@ -28,7 +28,7 @@ struct PassedOver
   bool otherStream = false; ///< a stream in another form seems to begin there
 };
 
-/// Follows a walk and tells what it passes over: bytes that are no node, streams in another form, and groups that end
+/// Follows a walk and says what it passes over: bytes that are no node, streams in another form, and groups that end
 /// past what is around them. Of groups that the same end cuts, the outermost is told. Groups that were never closed are
 /// read to their end, and what is behind a stream's zeros, or lacks its last padding, is sound.
 class DamageWatch

@@ -69,7 +69,7 @@ struct Difference
   std::string sentence{};           ///< "Uint32  7 -> 8"
 };
 
-/// Compares two streams and tells each difference; true when there is one. Byte order, header widths, padding, pairs
+/// Compares two streams and reports each difference; true when there is one. Byte order, header widths, padding, pairs
 /// and end elements are none; nor is the order of elements with different names. Groups of one name are matched by
 /// their keys where they have some; other elements of one name by what is equal in their order, and else one after the
 /// other. In memory are only the children of the groups on the way to the place that is compared, 200,000 of a group

@@ -27,7 +27,7 @@ namespace tav::inspect
 enum class OnDamage : uint8_t
 {
   stop, ///< throws Error
-  skip  ///< goes on behind it; Document::damage() tells what was passed over
+  skip  ///< goes on behind it; Document::damage() says what was passed over
 };
 
 /// Bytes that were passed over.
@@ -42,7 +42,7 @@ struct DocumentOptions
 {
   FormChoice form{};                 ///< what is known of the form; the rest is found out
   uint64_t ringBytes = kDefaultRing; ///< memory for a file's pages, once for walks and once for nodes
-  uint64_t from = 0;                 ///< what stands before it in a file is left out, and offsets count from there
+  uint64_t from = 0;                 ///< what is before it in a file is left out, and offsets count from there
 };
 
 /// How a file is followed.
@@ -139,7 +139,7 @@ public:
   /// The path is followed, not the file: when another file takes its place, the rest of the old one comes first, then
   /// all of the new one; a file that is missing is waited for; one that was made shorter, or emptied and begun with
   /// another root, is read from its start again. What a writer took back may have been told. Looks when the system
-  /// tells of a change, and ten times a second.
+  /// says of a change, and ten times a second.
   /// @throws Error TAV_RC_NOT_SUPPORTED for a document that was not opened by a path, or not from its first byte on;
   ///         TAV_RC_DATA_TOO_LARGE for a data element that is larger than the ring; and what `onNode` throws
   TAV_INSPECT_API FollowEnd follow(const std::function<void(const tav::Node&)>& onNode,

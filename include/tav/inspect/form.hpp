@@ -26,7 +26,7 @@ struct FormChoice
 struct Reason
 {
   std::string sentence{};          ///< starts with a lower-case letter, no full stop
-  std::optional<uint64_t> other{}; ///< where a stream in another form seems to begin, of which it tells
+  std::optional<uint64_t> other{}; ///< where a stream in another form seems to begin, of which it says
 };
 
 struct Recognition

@@ -17,7 +17,7 @@ namespace tav::inspect
 {
 
 inline constexpr uint64_t kJsonVersion = 1;
-inline constexpr uint16_t kUsualCodePage = 1208; ///< UTF-8; a string of another code page tells it
+inline constexpr uint16_t kUsualCodePage = 1208; ///< UTF-8; a string of another code page names it
 
 /// Appends text in quotation marks. The text must be UTF-8.
 TAV_INSPECT_API void appendJsonString(std::string& out, std::string_view text);

@@ -37,7 +37,7 @@ public:
   /// `safe`: whole numbers that a double cannot hold are written as texts.
   TAV_INSPECT_API JsonWriter(ByteSource& source, const Form& form, Sink& out, JsonStyle style, bool safe);
 
-  /// What stands before the first node and behind the last one.
+  /// What is before the first node and behind the last one.
   TAV_INSPECT_API void begin();
   TAV_INSPECT_API void end();
 

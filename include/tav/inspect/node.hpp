@@ -41,7 +41,7 @@ struct Node
   uint64_t depth = 0;                ///< 0: not inside any group
   uint64_t parentOffset = kNoOffset; ///< of the group around it
   uint64_t limit = 0;                ///< where its payload or its children end at the latest
-  uint64_t ordinal = 0;              ///< the how-manieth of its id among its siblings, from 1; 0: was not counted
+  uint64_t ordinal = 0;              ///< its place among those of its id among its siblings, from 1; 0: was not counted
   uint32_t flags = 0;                ///< NodeFlag bits
 
   uint64_t offset() const { return header.nodeOffset; }

@@ -46,7 +46,7 @@ TAV_INSPECT_API Error pathError(std::string_view text, const PathFault& fault);
 /// What there is to say of a path that leads to no node of a file.
 TAV_INSPECT_API Problem noMatch(const Path& path, const std::string& file);
 
-/// Follows a walk and tells which nodes a path leads to. Give it the nodeBegin of every node of the walk whose parent
+/// Follows a walk and reports which nodes a path leads to. Give it the nodeBegin of every node of the walk whose parent
 /// was not skipped. What a condition asks for ahead of the walk is looked up in the source. Memory grows with the depth
 /// alone: by a state for each place in the path that a node can be at.
 class PathMatcher

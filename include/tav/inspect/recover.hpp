@@ -101,7 +101,7 @@ struct RecoverBestOptions
   std::function<void(uint64_t)> progress{}; ///< is told by offset how far the work is
 };
 
-/// As `recover`, in the form that keeps most. Where the start is damaged, nothing but the outcome tells the form: all
+/// As `recover`, in the form that keeps most. Where the start is damaged, nothing but the outcome shows the form: all
 /// that are not refuted are tried, and the one that keeps most is taken; of equals the likelier one. Behind a sound
 /// start the next likely one is tried where it is not far off. Throws Error.
 TAV_INSPECT_API Outcome recoverBest(ByteSource& source, const Recognition& found, PatchFile& out,

@@ -27,7 +27,7 @@ public:
   static constexpr uint64_t kLongRead = uint64_t{64} * kPage; ///< what is read at once when reading goes straight on
 
   /// Opens a regular file by its path, UTF-8. At most `ringBytes` (and at least two pages) are kept in memory. What
-  /// stands before `from` is left out, and all offsets count from there. Throws Error when that does not work.
+  /// is before `from` is left out, and all offsets count from there. Throws Error when that does not work.
   TAV_INSPECT_API static std::unique_ptr<ByteSource> open(const std::string& path, uint64_t ringBytes = kDefaultRing,
                                                           uint64_t from = 0);
 

@@ -23,7 +23,7 @@ TAV_INSPECT_API std::vector<uint8_t> payloadBytes(ByteSource& source, const Form
 
 /// The value as one line of text without line breaks: numbers in decimal, 128-bit ones too; strings in quotation marks
 /// with escapes; calendar dates; bytes in hexadecimal. A value of the wrong size is shown as its bytes. At most `most`
-/// bytes of the payload are read; " ..." tells that there are more. A group has no value: empty.
+/// bytes of the payload are read; " ..." shows that there are more. A group has no value: empty.
 TAV_INSPECT_API std::string valueText(ByteSource& source, const Form& form, const Node& node, uint64_t most);
 
 /// The value as plain text: a string is its characters as they are, the rest as in valueText. Only for values that fit
@@ -43,7 +43,7 @@ TAV_INSPECT_API std::string forTerminal(std::string_view text);
 /// Whether bytes are well-formed UTF-8.
 TAV_INSPECT_API bool isUtf8(std::string_view text);
 
-/// The distance that the eye/size pair at `offset` tells; nothing where no eye catcher stands.
+/// The distance that the eye/size pair at `offset` gives; nothing where no eye catcher is.
 TAV_INSPECT_API std::optional<uint64_t> pairDistanceAt(ByteSource& source, const Form& form, uint64_t offset);
 
 /// "0011aaff"

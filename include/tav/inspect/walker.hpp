@@ -26,7 +26,7 @@ enum class What : uint8_t
   pair,      ///< a data element's eye/size pair, which has no header of its own
   nodeEnd,   ///< no bytes; the node ends at `offset`
   damaged,   ///< cannot be explained; see `reason`
-  zeros,     ///< behind a root: to the end of the file, which may be longer than its stream, or to what stands there
+  zeros,     ///< behind a root: to the end of the file, which may be longer than its stream, or to what is there
   skipped,   ///< the children of a group that were not asked for
   unread     ///< to the end of the file; not looked at, because the budget was used up
 };
@@ -107,7 +107,7 @@ public:
   TAV_INSPECT_API bool next(Event& event);
 
   /// Directly after the nodeBegin of a group: hands out its children as one `skipped` piece. False, and no effect, for
-  /// a group whose end is not known without walking it: it was never closed, or what stands at its end, or behind it,
+  /// a group whose end is not known without walking it: it was never closed, or what is at its end, or behind it,
   /// is not what should.
   TAV_INSPECT_API bool skip();
 

@@ -81,7 +81,7 @@ struct Expression
   Operator comparison = Operator::equal;
   std::vector<uint32_t> parts{};
   std::vector<uint32_t> routes{};
-  std::string text{};    ///< a text, or the digits of a number that stands alone
+  std::string text{};    ///< a text, or the digits of a number that is alone
   int64_t positions = 0; ///< how often position() is added
   int64_t lasts = 0;
   int64_t constant = 0;

@@ -1,5 +1,5 @@
 /// @file conditions.hpp
-/// What the brackets of a path ask of a node, answered by walks of their own from where it stands.
+/// What the brackets of a path ask of a node, answered by walks of their own from its position.
 #pragma once
 
 #include <algorithm>
@@ -249,7 +249,7 @@ private:
     return expression(index).kind != Kind::nodes;
   }
 
-  /// Whether one of the left values stands so to one of the right ones. The left ones are kept in pieces: two lists
+  /// Whether one of the left values is so to one of the right ones. The left ones are kept in pieces: two lists
   /// that do not fit together cost a walk over the right one for each of these.
   bool compares(const Expression& comparison, const At& at)
   {

@@ -3,7 +3,7 @@
 ///
 /// A route is an automaton whose states are the places between its steps. The nodes of a walk come in stream order,
 /// each with its level; a node's states follow from those of its parent. What only lies ahead (a condition, the number
-/// of siblings, a step back up) is looked up by a walk of its own from where the main one stands.
+/// of siblings, a step back up) is looked up by a walk of its own from where the main one is.
 ///
 /// A `Tree` has the nodes of a stream:
 ///

@@ -562,7 +562,7 @@ private:
     return true;
   }
 
-  /// A number stands with its digits, however many; with its value, too, where that is whole and can be counted with.
+  /// A number is with its digits, however many; with its value, too, where that is whole and can be counted with.
   bool parseNumber(uint32_t& out)
   {
     const size_t start = at_;

@@ -113,7 +113,7 @@ protected:
     }
     fault_ = {kind, column, std::move(sentence), {}};
   }
-  /// What stands here continues no path.
+  /// What is here continues no path.
   [[gnu::noinline, gnu::cold]] bool failHere()
   {
     passBlanks();

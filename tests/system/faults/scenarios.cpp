@@ -321,7 +321,7 @@ std::string nestDeeply(Steps& steps, const std::string&)
       TAVHeaderData data = group.data();
       const uint64_t before = handle.get()->streamBytes;
       steps.call("nest", [&] {
-        // The header stands there when the stack refuses; the offset tells that it is not counted.
+        // The header is there when the stack refuses; the offset shows that it is not counted.
         handle.get()->streamBytes = before;
         return tavAddElement(0, handle.get(), &data);
       });

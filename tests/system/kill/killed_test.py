@@ -68,7 +68,7 @@ class KilledWriter(unittest.TestCase):
         return status != 0
 
     def due(self, content):
-        """The groups of which every byte stands in the file where it belongs."""
+        """The groups of which every byte is in the file where it belongs."""
         return [(number, made) for number, (at, made) in enumerate(self.groups)
                 if content[at:at + len(made)] == made]
 

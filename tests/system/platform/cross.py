@@ -1,4 +1,4 @@
-"""Streams of one platform on another: both write the same bytes, each reads what the other wrote, and the program tells
+"""Streams of one platform on another: both write the same bytes, each reads what the other wrote, and the program says
 the same of it.
 
     cross.py NATIVE_STREAMS NATIVE_TAV OTHER_STREAMS OTHER_TAV [EMULATOR...]

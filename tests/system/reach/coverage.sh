@@ -1,5 +1,5 @@
 #!/usr/bin/env bash
-# Builds the library instrumented, runs the tests of the rooms, and tells what of it they reach. Fails below the limits,
+# Builds the library instrumented, runs the tests of the rooms, and says what of it they reach. Fails below the limits,
 # or when a line is not reached that docs/coverage.md does not name.
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")/../../.."

@@ -1,5 +1,5 @@
 #!/usr/bin/env python3
-"""Changes the library in small ways, one at a time, and tells which changes no test notices.
+"""Changes the library in small ways, one at a time, and reports which changes no test notices.
 
     tests/system/reach/mutate.py [--seed N] [--count N] [--group GROUP] [--only SOURCE:LINE] [--list]
 

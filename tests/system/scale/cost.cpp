@@ -1,4 +1,4 @@
-/// Runs each operation over streams of N, 2N and 4N nodes. Whoever counts instructions counts those of `tavMeasured`;
+/// Runs each operation over streams of N, 2N and 4N nodes. A counter of instructions counts those of `tavMeasured`;
 /// the names and sizes of the measurements go to standard output, in their order.
 ///   scale_cost N
 #include <cstdio>

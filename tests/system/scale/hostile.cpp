@@ -1,4 +1,4 @@
-/// Runs the reading operations over families of hostile streams of rising lengths. Whoever counts instructions counts
+/// Runs the reading operations over families of hostile streams of rising lengths. A counter of instructions counts
 /// those of `tavMeasured`; the names of the measurements go to standard output, in their order.
 ///   scale_hostile FAMILY LEAST MOST FORM...
 /// LEAST, MOST: lengths in bytes, doubled from one to the next. FORM: access (memory, ring1, ring2, ring10), and after

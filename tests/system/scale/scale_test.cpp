@@ -119,7 +119,7 @@ TEST_P(Deep, FourThousandLevelsAreWrittenValidatedAndPrintedAndTheNextIsRefused)
   TAVHeaderData next = group64(TAV_ELM_CMN_HOST).data();
   const uint64_t length = writer.length();
   EXPECT_EQ(tavAddElement(0, writer.handle(), &next), TAV_RC_NO_MEMORY);
-  writer.handle()->streamBytes = length; // the refused group's header stands there, without being counted from here on
+  writer.handle()->streamBytes = length; // the refused group's header is there, without being counted from here on
   writer.add(u32(TAV_ELM_CMN_CPU_SPEED, 7));
   for (int level = 0; level < 4000; ++level) writer.close();
   EXPECT_EQ(tavCloseHeader(0, writer.handle()), TAV_RC_NOT_FOUND);

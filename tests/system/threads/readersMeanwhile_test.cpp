@@ -64,7 +64,7 @@ void record(Shared& shared)
   shared.isOver.store(true);
 }
 
-/// Walks what there is once. The first `due` roots are closed, whole and in their order; behind them stands what is
+/// Walks what there is once. The first `due` roots are closed, whole and in their order; behind them is what is
 /// just being written, which may end anywhere. How many of the first ones there are.
 uint32_t walk(const Shared& shared, uint32_t due)
 {

@@ -124,7 +124,7 @@ def random_root(rng, form, pairs):
 
 
 def damaged_stream(number):
-    """The how-manieth: its form, its roots, and what is left of it."""
+    """The stream of this number: its form, its roots, and what is left of it."""
     rng = random.Random(f"damages {number}")
     damage = DAMAGES[number % len(DAMAGES)]
     pairs = (0, 1, 0.5)[number // len(DAMAGES) % 3]
@@ -152,7 +152,7 @@ def form_of(report):
 
 
 def verdict(number):
-    """What comes back of one damaged stream whose form nobody tells."""
+    """What comes back of one damaged stream whose form is not given."""
     damage, pairs, form, roots, damaged = damaged_stream(number)
     intact, due = Oracle(form, roots, damaged).judge()
     title = f"{number} {damage} pairs {pairs} {' '.join(form.options())}"

@@ -23,7 +23,7 @@ def info_fields(text):
 
 
 def node_counts(made):
-    """Nodes but for end elements, and these, as info tells them."""
+    """Nodes but for end elements, and these, as info counts them."""
     ends = sum(node[4] == END for node in made["nodes"])
     return str(len(made["nodes"]) - ends), str(ends) if ends else "none"
 

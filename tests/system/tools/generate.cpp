@@ -1,4 +1,4 @@
-// tav_generate: writes random streams in a given form with the library, and tells what is in them, so that tests of the
+// tav_generate: writes random streams in a given form with the library, and says what is in them, so that tests of the
 // program can compare what it finds with what was written.
 //
 //   tav_generate FILE [--seed N] [--nodes N] [--depth N] [--swap] [--align] [--root32] [--pairs] [--strings] [--utf8]

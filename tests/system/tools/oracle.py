@@ -44,7 +44,7 @@ class Oracle:
         self.form, self.roots, self.damaged = form, roots, damaged
 
     def intact(self, node):
-        """The shifts by which it stands in the file."""
+        """The shifts by which it is in the file."""
         if node.is_group:
             parts = [(node.offset, node.payload_offset)]
         else:

@@ -10,7 +10,7 @@ from support import ToolTest, generate, tav, tree_rows
 
 class Paths(ToolTest):
     def stream(self, content):
-        """The bytes of a stream that is given as it stands in JSON."""
+        """The bytes of a stream that is given as it is in JSON."""
         text, made = self.folder / "made.json", self.folder / "made.tav"
         text.write_text(json.dumps(content))
         result = tav("build", text, "-o", made, "--force")

@@ -41,7 +41,7 @@ class Node:
         self.by_string = bool(extra)   # the writer's string operation: its pair is in the host's order
         self.force_size = None         # in the header
         self.add_size = 0              # to the right size, in the header
-        self.force_bits = None         # info as it stands in the file
+        self.force_bits = None         # info as in the file
         self.force_pair = None         # 16 bytes, or b"" for none
         self.force_padding = None
         self.force_end = None          # an own Node instead of the end element; False: none

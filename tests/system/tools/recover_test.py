@@ -120,7 +120,7 @@ class Judge:
 
 
 def damaged_stream(pairs, number):
-    """The how-manieth stream of a kind, as it was and damaged."""
+    """The stream of this number of a kind, as it was and damaged."""
     rng = random.Random(f"{pairs} {number}")
     form = random_form(rng)
     form.wide = form.wide or pairs == 1
@@ -249,7 +249,7 @@ class Unfinished(ToolTest):
 
 
 class EmptyRoot(ToolTest):
-    """A root of size 0 is closed, or was never closed: what follows it tells."""
+    """A root of size 0 is closed, or was never closed: what follows shows which."""
 
     def saved(self, made, form):
         report, saved = recovered(self.folder, made, form)

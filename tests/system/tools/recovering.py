@@ -21,7 +21,7 @@ def read_back(made, form):
         return int.from_bytes(made[at:at + width], form.order)
 
     def begins(at, end, wide, info):
-        """Whether a pair, a node or the end stands here, not two bytes farther on."""
+        """Whether a pair, a node or the end is here, not two bytes farther on."""
         if info & EYE_SIZE:
             return number(at, 8) == EYE or int.from_bytes(made[at:at + 8], HOST) == EYE
         if at == end or at + 2 == end:

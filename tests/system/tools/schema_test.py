@@ -15,7 +15,7 @@ FORMS = ((), ("--byte-order", "big"), ("--byte-order", "little", "--align"), ("-
 
 
 class Expected:
-    """What stands in a document, counted here."""
+    """What is in a document, counted here."""
 
     def __init__(self):
         self.paths = {}

@@ -97,7 +97,7 @@ class NewFile(Folders):
                                  [found for found in self.findings(path, *options) if found[0] not in gone])
                 if b"\0" not in old and line["type"] != "Binary" and "bytes" not in line and "further" not in str(line):
                     again = tav("set", out, "-o", back, "--force", *options, "--", place, os.fsdecode(old))
-                    if again.status == 0:  # a date may be one that no text tells exactly
+                    if again.status == 0:  # a date may be one that no text says exactly
                         self.assertEqual(again.err, "")
                         self.assertEqual(tav("get", back, place, *options).raw, old + b"\n")
                         if line["type"] != "UTC Timestamp":

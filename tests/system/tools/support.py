@@ -73,7 +73,7 @@ def tree_rows(text):
 
 
 def bytes_of_hex(text):
-    """The bytes that the rows of `tav hex` show, and whether each stands at its own place, once."""
+    """The bytes that the rows of `tav hex` show, and whether each is at its own place, once."""
     made = bytearray()
     for line in text.splitlines():
         if line.startswith(";") or line == "*":

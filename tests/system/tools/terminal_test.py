@@ -265,7 +265,7 @@ class Completion(ToolTest):
             self.assertEqual(self.completed_by_zsh(line), wanted)
 
     def completed_by_zsh(self, line):
-        """The line as it stands after the tab key, which the shell writes to a file."""
+        """The line as it is after the tab key, which the shell writes to a file."""
         answer = self.folder / "answer"
         setup = (f"fpath=('{self.folder}' $fpath); autoload -U compinit; compinit -u -D; "
                  f"show() {{ print -r -- \"$BUFFER|\" > '{answer}'; zle accept-line; BUFFER=exit }}; "

@@ -1,4 +1,4 @@
-"""Timestamps mean seconds plus milliseconds (fraction A) plus microseconds (fraction B), whoever shows them."""
+"""Timestamps mean seconds plus milliseconds (fraction A) plus microseconds (fraction B), whichever face shows them."""
 import datetime
 import json
 import os

@@ -119,12 +119,12 @@ private:
   bool met_ = false;
 };
 
-/// A group, where it stands, and what is below it.
+/// A group, where it is, and what is below it.
 struct Closing
 {
   Form form;
   Element group;
-  uint64_t lead;     ///< bytes of an element that stands before the group, under a root; 0: the group is the root
+  uint64_t lead;     ///< bytes of an element that is before the group, under a root; 0: the group is the root
   uint64_t children; ///< elements of 8 bytes
 };
 
@@ -280,7 +280,7 @@ TEST_P(CloseOverAFaultyStorage, IsWholeOrIsRefusedAndCanBeTakenAgain)
   {
     for (const uint64_t pages : {1U, 2U, 4U})
     {
-      for (const uint64_t lead : {0U, 8U, 28U}) // 28: the size stands on two pages
+      for (const uint64_t lead : {0U, 8U, 28U}) // 28: the size is on two pages
       {
         for (const uint64_t children : {0U, 1U, 2U, 5U, 6U, 11U, 17U, 18U, 23U})
         {

@@ -24,7 +24,7 @@ struct Tree
   uint16_t type = TAV_TYPE_HEADER64;
   uint16_t elm = 20;
   uint32_t info = 0;
-  Bytes payload; ///< as it stands in the stream
+  Bytes payload; ///< as stored in the stream
   std::vector<Tree> children;
   uint64_t offset = 0;
   uint64_t size = 0;

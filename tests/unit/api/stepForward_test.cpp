@@ -467,7 +467,7 @@ TEST_P(NextChildFault, IsFoundInTheOrderOfTheArguments)
 INSTANTIATE_TEST_SUITE_P(Rows, NextChildFault, ::testing::ValuesIn(kFaults),
                          [](const auto& row) { return std::string(row.param.name); });
 
-/// A storage that does not tell its size, and one that tells a wrong one with a failure.
+/// A storage that does not tell its size, and one that gives a wrong one with a failure.
 class SizelessStorage : public VectorStorage
 {
 public:

@@ -26,7 +26,7 @@ constexpr uint16_t kValue = 60110;
 constexpr uint16_t kLast = 60111;
 constexpr uint32_t kRefusal = 0x90000777; // no code of the library
 
-/// What a header says, and where it stands.
+/// What a header says, and where it is.
 std::vector<uint64_t> contentOf(const TAVHeader& header)
 {
   return {header.hdrType, header.nodeOffset, tav::layout::sizeOf(header), tav::layout::infoOf(header),

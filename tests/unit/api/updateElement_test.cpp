@@ -168,7 +168,7 @@ TEST_P(UpdatedPayload, IsReversedAsTheWriterReversesIt)
 INSTANTIATE_TEST_SUITE_P(Types, UpdatedPayload, ::testing::ValuesIn(kReversals),
                          [](const auto& instance) { return std::string(instance.param.name); });
 
-// A node of 4 bytes, type 55, id kCpu stands in the stream.
+// A node of 4 bytes, type 55, id kCpu is in the stream.
 struct Claim
 {
   const char* name;

@@ -19,7 +19,7 @@ using tav::core::kNotHere;
 constexpr uint16_t kRoot = 1000;
 constexpr uint16_t kChild = 1001;
 
-/// What stands under the root of a stream, and behind its first child.
+/// What is under the root of a stream, and behind its first child.
 struct Case
 {
   const char* name;

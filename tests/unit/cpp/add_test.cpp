@@ -147,7 +147,7 @@ TEST(LayerAdd, TextBeyondAsciiIsAUtf8String)
   EXPECT_EQ(added(std::string("\xC3\xA4")), expected);
   EXPECT_EQ(added(std::string_view("\xC3\xA4")), expected);
   EXPECT_EQ(added(std::string(300, 'x') + "\xC3\xA4"), added(tav::Utf8{std::string(300, 'x') + "\xC3\xA4"}));
-  for (size_t place = 0; place < 20; ++place) // wherever it stands in the words that are looked at
+  for (size_t place = 0; place < 20; ++place) // wherever it is in the words that are looked at
   {
     std::string text(20, 'x');
     text.replace(place, 1, "\xF0\x9F\x98\x80");

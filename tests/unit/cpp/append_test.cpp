@@ -90,7 +90,7 @@ protected:
     return {.eyeSize = GetParam().pairs};
   }
 
-  /// What stands below a root that counts from `first`.
+  /// What is below a root that counts from `first`.
   void fill(tav::Group& root, uint32_t first, uint32_t count) const
   {
     for (uint32_t i = 0; i < count; ++i)

@@ -1,4 +1,4 @@
-/// Writers and updaters of files: locks, and what stands at the path meanwhile.
+/// Writers and updaters of files: locks, and what is at the path meanwhile.
 #include <fstream>
 #include <iterator>
 #include <vector>

@@ -127,7 +127,7 @@ public:
     {
       const auto id = static_cast<uint16_t>(dense ? 500 + k : k + 1 == count ? 65535
                                                                              : 7 + k * k * 3);
-      // What stands beside the id in its slot does not count.
+      // What is beside the id in its slot does not count.
       entries_.push_back({id, (0xABCDEF ^ k) & 0xFFFFFF, (0xFEDCBA ^ k) & 0xFFFFFF});
     }
     const auto first = static_cast<uint16_t>(count == 0 ? 7 : entries_.front().id);

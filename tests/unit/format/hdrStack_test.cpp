@@ -15,7 +15,7 @@ using namespace tav;
 using testing::ElementsAre;
 using testing::IsEmpty;
 
-/// An entry that tells its number.
+/// An entry that gives its number.
 TAVHeader entry(uint64_t number)
 {
   return header64(number, TAV_TYPE_HEADER64, 7, 0, 16 * number);

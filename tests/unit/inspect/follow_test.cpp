@@ -136,7 +136,7 @@ TEST_F(Follow, TellsOfTheChildrenOfAGroupThatIsStillOpen)
   EXPECT_THAT(news(), ElementsAre("host")) << "the number is not whole";
   append(part(number(3), 18, 20));
   EXPECT_THAT(news(), ElementsAre("cpuOnline 3"));
-  // The host is closed, and what stands behind it is a child of the system.
+  // The host is closed, and what is behind it is a child of the system.
   patch(16 + 20 + 20, sizeBytes(20));
   append(number(4));
   EXPECT_THAT(news(), ElementsAre("cpuOnline 4"));

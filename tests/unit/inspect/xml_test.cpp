@@ -31,7 +31,7 @@ struct Xml
   bool damaged = false;
 };
 
-/// Whether all tags are closed in the right order, and nothing stands outside of the one element around all.
+/// Whether all tags are closed in the right order, and nothing is outside of the one element around all.
 bool isNested(const std::string& text)
 {
   std::vector<std::string> open;

@@ -34,7 +34,7 @@ void* reserved(void* owner = nullptr)
   return block;
 }
 
-/// Writes every byte of a block and tells whether all of them hold.
+/// Writes every byte of a block and reports whether all of them hold.
 bool isUsable(void* block, uint64_t size)
 {
   auto* const bytes = static_cast<uint8_t*>(block);

@@ -1,4 +1,4 @@
-/// What stands at a path, where links lead, and removal.
+/// What is at a path, where links lead, and removal.
 #include "kor/testFiles.h"
 #include "support/platform.h"
 #include "tav/kor.h"

@@ -16,7 +16,7 @@ using testing::IsEmpty;
 constexpr uint64_t kMax = ~uint64_t{0};
 constexpr uint64_t kReadWriteNoSeek = VectorStorage::kReadWrite & ~TAV_ATTR_SEEK;
 
-// --- where the storage stands ---
+// --- where the storage's cursor is ---
 
 TEST(Fill, BringsTheStorageToThePageForAnEmptyRing)
 {

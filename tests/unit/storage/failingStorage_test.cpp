@@ -259,7 +259,7 @@ TEST_P(FailingReads, GiveTheStoragesCodeAndThenTheAnswer)
       const uint32_t rc = GetParam().run(reader.handle(), node);
       reader.vectorStorage().failAt(0, TAV_RC_OK);
       failures += rc != TAV_RC_OK ? 1 : 0;
-      // A search for a node tells that it found none; its own record has the code.
+      // A search for a node shows that it found none; its own record has the code.
       EXPECT_TRUE(rc == TAV_RC_OK || rc == KOR_RC_IO_ERROR || rc == TAV_RC_NOT_FOUND) << nth << ": " << korCodeName(rc);
       node = lastOf(reader.handle());
       EXPECT_EQ(GetParam().run(reader.handle(), node), TAV_RC_OK) << "the handle is usable after call " << nth;

@@ -30,7 +30,7 @@ TEST_F(FileStorage, OfAReadOnlyFileOpensForReadingAlone)
   EXPECT_EQ(code, KOR_RC_NO_PERMISSION);
 }
 
-// Elsewhere a system tells only that there is no such file.
+// Elsewhere a system says only that there is no such file.
 TEST_F(FileStorage, TellsAFileThatStandsWhereAFolderIsWanted)
 {
   EXPECT_EQ(OpenFile(fileOf(10) + "/x", KOR_FILE_READ).rc, KOR_RC_NOT_A_FOLDER);

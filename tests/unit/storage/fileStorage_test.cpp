@@ -377,7 +377,7 @@ TEST_F(FileStorage, WritesWhereABackwardReadWent)
 TEST_F(FileStorage, SeeksLazilyOnlyAfterABackwardRead)
 {
   OpenFile file(fileOf(20), KOR_FILE_READ);
-  file->position = 9; // the file itself stands at 0
+  file->position = 9; // the file itself is at 0
   EXPECT_EQ(read(file, 2), (Got{TAV_RC_OK, pattern(0, 2)}));
   file->position = 9;
   file->needSeek = 1;

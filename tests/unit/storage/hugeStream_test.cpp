@@ -25,7 +25,7 @@ constexpr uint64_t kElement = 16 + kPayload + 16; ///< header, payload, pair
 constexpr uint64_t kHeader = 16;
 constexpr uint64_t kHuge = 20 * 1024 * kMiB;
 
-/// One group of equal elements, each payload full of a word that tells its number, made from the offset alone.
+/// One group of equal elements, each payload full of a word that gives its number, made from the offset alone.
 class MadeStream
 {
 public:

@@ -14,7 +14,7 @@
 namespace test
 {
 
-/// Every byte tells its offset, as far as a byte can, and none is 0.
+/// Every byte gives its offset, as far as a byte can, and none is 0.
 inline uint8_t byteAt(uint64_t offset)
 {
   return static_cast<uint8_t>(1 + offset % 251);

@@ -73,7 +73,7 @@ TEST(SideStorage, GivesItsStatus)
   EXPECT_EQ(storage.getStatus(), 0x90000031U);
 }
 
-/// Where a virtual operation stands in the table, for platforms whose member pointers tell.
+/// Where a virtual operation is in the table, for platforms whose member pointers tell.
 template<class Operation>
 uint64_t slotOf(Operation operation)
 {

@@ -4,7 +4,7 @@
     run.py COMPILER [FLAG...]
 
 Every source beside this script but control.cpp begins with `// EXPECT: REGULAR EXPRESSION`: it must be refused, with a
-message that matches; after it `// AND: REGULAR EXPRESSION` may say what else the compiler tells beside its messages, and
+message that matches; after it `// AND: REGULAR EXPRESSION` may say what else the compiler says beside its messages, and
 `// STANDARD: NAME` which language it is told to take. control.cpp must be accepted, so that a refusal says something.
 """
 import concurrent.futures
