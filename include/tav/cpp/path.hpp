@@ -2,13 +2,10 @@
 /// Finding nodes by paths, as tav/path/path.hpp describes them. Always ends.
 #pragma once
 
-#include <algorithm>
 #include <cstddef>
 #include <cstdint>
 #include <iterator>
-#include <memory>
 #include <optional>
-#include <ranges>
 #include <string_view>
 #include <system_error>
 #include <utility>
@@ -24,7 +21,7 @@ namespace tav
 
 /// The nodes that a path leads to, in stream order, each once. A single pass; the range holds the place of the walk, so
 /// an iterator must not outlive it.
-class FindRange : public std::ranges::view_base
+class FindRange
 {
 public:
   FindRange(FindRange&&) = default;
@@ -108,14 +105,14 @@ private:
   FindRange() = default;
   /// From the place above the roots.
   FindRange(detail::ReaderState& state, const Path& path, std::error_code* ec)
-      : search_(std::make_unique<Search>(state, path)), ec_(ec)
+      : search_(new Search(state, path)), ec_(ec)
   {
     search_->matcher.begin();
   }
 
   /// From a node. Where the path can lead out of what is below it, the walk begins above the roots.
   FindRange(detail::ReaderState& state, const Node& node, const Path& path, std::error_code* ec)
-      : search_(std::make_unique<Search>(state, path)), ec_(ec)
+      : search_(new Search(state, path)), ec_(ec)
   {
     Search& search = *search_;
     std::vector<Place> line{Place{node, false}};
@@ -149,10 +146,15 @@ private:
 
   static bool isAbsolute(const detail::paths::Compiled& path) noexcept
   {
-    return std::any_of(path.main.begin(), path.main.end(), [&](uint32_t index) { return path.routes[index].absolute; });
+    bool isOne = false;
+    for (const uint32_t index : path.main)
+    {
+      isOne = isOne || path.routes[index].absolute;
+    }
+    return isOne;
   }
 
-  std::unique_ptr<Search> search_;
+  detail::Owner<Search> search_;
   std::error_code* ec_ = nullptr;
 };
 
@@ -253,3 +255,8 @@ inline std::optional<Node> Node::path(std::string_view path) const
 }
 
 } // namespace tav
+
+/// @cond  A view, as those of ranges.hpp.
+template<>
+inline constexpr bool std::ranges::enable_view<tav::FindRange> = true;
+/// @endcond

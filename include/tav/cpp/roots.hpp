@@ -73,7 +73,7 @@ private:
 /// last page of each, are passed over. Nothing comes behind a root that was never closed: all there is counts as its
 /// own. A single pass; the range holds the place of the walk, so an iterator must not outlive it, nor it the reader.
 /// TAV_RC_BAD_CHILD_HDR where something else than a root is.
-class RootRange : public std::ranges::view_base
+class RootRange
 {
 public:
   RootRange(RootRange&&) = default;
@@ -155,3 +155,8 @@ private:
 };
 
 } // namespace tav
+
+/// @cond  A view, as those of ranges.hpp.
+template<>
+inline constexpr bool std::ranges::enable_view<tav::RootRange> = true;
+/// @endcond
