@@ -52,6 +52,9 @@ uint32_t syncFolderNative(const char* pPath);
 uint32_t copyRightsNative(intptr_t from, intptr_t to);
 bool isAtNative(intptr_t file, const char* pPath);
 
+/// Whether a path leads to something that is no file and no folder.
+bool isDeviceNative(const char* pPath);
+
 /// Whether a file keeps its name from being given to another one for as long as it is open.
 extern const bool kOpenFileHoldsName;
 /// Renames a file, over one that is there.

@@ -168,7 +168,7 @@ uint32_t syncFolderNative(const char* pPath)
   const std::unique_ptr<char[]> folder(new (std::nothrow) char[length + 2]);
   if (folder == nullptr) return TAV_RC_NO_MEMORY;
   std::memcpy(folder.get(), pPath, length);
-  std::strcpy(folder.get() + length, length == 0 ? "." : "");
+  std::memcpy(folder.get() + length, length == 0 ? "." : "\0", 2);
   const int opened = uninterrupted([&] { return ::open(folder.get(), O_RDONLY | O_DIRECTORY | O_CLOEXEC); });
   if (opened < 0) return codeOfSystemError(errno);
   const int error = syncNative(opened) == TAV_RC_OK ? 0 : errno;
@@ -194,6 +194,12 @@ bool isAtNative(intptr_t file, const char* pPath)
   struct stat there = {};
   return ::fstat(descriptor(file), &open) == 0 && ::stat(pPath, &there) == 0 && open.st_dev == there.st_dev &&
          open.st_ino == there.st_ino;
+}
+
+bool isDeviceNative(const char* pPath)
+{
+  struct stat there = {};
+  return ::stat(pPath, &there) == 0 && !S_ISREG(there.st_mode) && !S_ISDIR(there.st_mode);
 }
 
 const bool kOpenFileHoldsName = false;

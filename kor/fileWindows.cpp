@@ -196,6 +196,18 @@ bool isAtNative(intptr_t file, const char* pPath)
          open.nFileIndexHigh == there.nFileIndexHigh && open.nFileIndexLow == there.nFileIndexLow;
 }
 
+bool isDeviceNative(const char* pPath)
+{
+  std::wstring path;
+  if (widen(pPath, path) != ERROR_SUCCESS) return false;
+  const DWORD sharing = FILE_SHARE_READ | FILE_SHARE_WRITE | FILE_SHARE_DELETE;
+  const HANDLE there = CreateFileW(path.c_str(), 0, sharing, nullptr, OPEN_EXISTING, FILE_ATTRIBUTE_NORMAL, nullptr);
+  if (there == INVALID_HANDLE_VALUE) return false; // nothing, or a folder, which opens with a flag alone
+  const DWORD type = GetFileType(there);
+  CloseHandle(there);
+  return type != FILE_TYPE_DISK;
+}
+
 const bool kOpenFileHoldsName = true;
 
 uint32_t renameNative(const char* pFrom, const char* pTo)

@@ -4,7 +4,7 @@
 #include <string>
 #include <string_view>
 
-#include "kor/systemError.h"
+#include "kor/port.h"
 #include "tav/kor.h"
 
 namespace tav::kor
@@ -82,15 +82,7 @@ uint32_t guarded(const Operation& operation)
 
 bool korIsDevice(const char* pPath)
 {
-  using namespace tav::kor;
-  bool isDevice = false;
-  const auto look = [&] {
-    std::error_code error;
-    const fs::file_status status = fs::status(pathOf(pPath), error);
-    isDevice = !error && fs::exists(status) && !fs::is_regular_file(status) && !fs::is_directory(status);
-    return TAV_RC_OK;
-  };
-  return pPath != nullptr && guarded(look) == TAV_RC_OK && isDevice;
+  return pPath != nullptr && tav::kor::isDeviceNative(pPath);
 }
 
 uint32_t korFollowLinks(const char* pPath, char* pTarget, uint64_t targetSize, uint64_t* pNameAt)

@@ -226,7 +226,8 @@ void Comparer::tell(Change change, uint64_t first, uint64_t second, std::string 
 
 } // namespace
 
-bool diff(DiffInput a, DiffInput b, const DiffOptions& options, const std::function<void(const Difference&)>& found)
+bool diff(const DiffInput& a, const DiffInput& b, const DiffOptions& options,
+          const std::function<void(const Difference&)>& found)
 {
   DiffIndex indexA = indexOf(a, options);
   DiffIndex indexB = indexOf(b, options);

@@ -35,7 +35,7 @@ Search::Search(DocumentState& state, const SearchStart& start, std::string_view 
 }
 
 /// Most paths lead down: then the walk begins at the node.
-Search::Search(DocumentState& state, const SearchStart& start, Path path, OnDamage onDamage)
+Search::Search(DocumentState& state, const SearchStart& start, const Path& path, OnDamage onDamage)
     : Search(state, start, !PathMatcher::leavesStart(path), path,
              PathMatcher::leavesStart(path) ? PathMatcher(path, *state.source, start.form, start.node.nodeOffset)
                                             : PathMatcher::below(path),

@@ -42,7 +42,7 @@ public:
 private:
   Search(DocumentState& state, const SearchStart& start, bool isBelow, Path path, PathMatcher matcher,
          OnDamage onDamage);
-  Search(DocumentState& state, const SearchStart& start, Path path, OnDamage onDamage);
+  Search(DocumentState& state, const SearchStart& start, const Path& path, OnDamage onDamage);
   void passOver(const PassedOver& passed);
 
   DocumentState& state_;

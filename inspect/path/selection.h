@@ -2,6 +2,7 @@
 /// Which nodes of a walk some paths lead to: the one place where extracting, editing and comparing ask a path.
 #pragma once
 
+#include <algorithm>
 #include <cstdint>
 #include <optional>
 #include <span>
@@ -45,14 +46,7 @@ public:
   /// Whether a path can lead to something below the node that was given last.
   bool reachesBelow() const
   {
-    for (const PathMatcher& matcher : matchers_)
-    {
-      if (matcher.reachesBelow())
-      {
-        return true;
-      }
-    }
-    return false;
+    return std::any_of(matchers_.begin(), matchers_.end(), [](const auto& matcher) { return matcher.reachesBelow(); });
   }
 
   /// How many nodes a path has led to so far.

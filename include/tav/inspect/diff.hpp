@@ -75,7 +75,7 @@ struct Difference
 /// other. In memory are only the children of the groups on the way to the place that is compared, 200,000 of a group
 /// at a time. Throws Error, with Trouble::notFound where
 /// the path of an input leads nowhere. Where both have paths, the two nodes stand for each other whatever their names.
-TAV_INSPECT_API bool diff(DiffInput a, DiffInput b, const DiffOptions& options,
+TAV_INSPECT_API bool diff(const DiffInput& a, const DiffInput& b, const DiffOptions& options,
                           const std::function<void(const Difference&)>& found);
 
 } // namespace tav::inspect
