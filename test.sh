@@ -203,7 +203,7 @@ check_platform()
 }
 
 # The longest tests of the program run once, with g++ and without sanitizers.
-slow='tools\.(json|check|recover|damages|build|forms|guess)_test'
+slow='tools\.(json|check|recover|damages|build|forms|guess|collect)_test'
 
 # Sanitizers keep a process busy at its start and its end, so rooms run as a whole; the program's tests as ever. With
 # clang++, which compiles what is sanitized in half of g++'s time, and whose sanitizers look for more.
