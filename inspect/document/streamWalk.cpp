@@ -21,13 +21,13 @@ Form ownForm(ByteSource& source, const Form& seen, uint64_t offset)
 
 } // namespace
 
-StreamWalk::StreamWalk(ByteSource& source, const Form& form, DamageWatch::Sink told, WalkStart start)
+StreamWalk::StreamWalk(ByteSource& source, const Form& form, DamageWatch::Sink told, const WalkStart& start)
     : source_(source), told_(std::move(told))
 {
   begin(form, start);
 }
 
-void StreamWalk::begin(const Form& form, WalkStart start)
+void StreamWalk::begin(const Form& form, const WalkStart& start)
 {
   start_ = start.offset;
   watch_.emplace(source_, form, told_);

@@ -15,7 +15,7 @@ namespace tav::inspect
 class StreamWalk
 {
 public:
-  StreamWalk(ByteSource& source, const Form& form, DamageWatch::Sink told, WalkStart start = {});
+  StreamWalk(ByteSource& source, const Form& form, DamageWatch::Sink told, const WalkStart& start = {});
 
   bool next(Event& event);
   bool skip() { return walker_->skip(); }
@@ -25,7 +25,7 @@ public:
   const Form& form() const { return walker_->form(); }
 
 private:
-  void begin(const Form& form, WalkStart start);
+  void begin(const Form& form, const WalkStart& start);
   bool goOnInOtherForm(const Event& event);
 
   ByteSource& source_;
