@@ -8,7 +8,7 @@
 namespace tav::detail
 {
 
-/// What std::unique_ptr is, as far as the layer needs it: <memory> and what its templates become are a tenth of the
+/// What std::unique_ptr is, as far as the layer needs it: `<memory>` and what its templates become are a tenth of the
 /// time that a small program takes to compile.
 template<class T>
 class Owner

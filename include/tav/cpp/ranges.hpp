@@ -303,8 +303,8 @@ private:
 
 } // namespace tav
 
-/// @cond  Views, as std::ranges::view_base would make them: <ranges> costs a small program more than all of this, and
-/// the variables come with <span>, too.
+/// @cond  Views, as std::ranges::view_base would make them: `<ranges>` costs a small program more than all of this, and
+/// the variables come with `<span>`, too.
 template<>
 inline constexpr bool std::ranges::enable_view<tav::ChildRange> = true;
 template<>

@@ -1,5 +1,5 @@
 /// @file time.hpp
-/// Moments, without the header that makes them: <chrono> is a fifth of the time that a small program takes to compile,
+/// Moments, without the header that makes them: `<chrono>` is a fifth of the time that a small program takes to compile,
 /// and who has a std::chrono::sys_time has included it.
 #pragma once
 

@@ -1,5 +1,5 @@
 /// @file attributes.hpp
-/// What the XML form shows of a node as attributes, and paths compare as `[@type='Uint64']`.
+/// What the XML form shows of a node as attributes, which paths compare, too.
 #pragma once
 
 #include <cstdint>
