@@ -99,8 +99,8 @@ std::string narrowed(std::basic_string_view<Character> wide)
 } // namespace detail
 
 /// The name of a file. Whatever makes a std::filesystem::path makes one, such a path among them; a program that has no
-/// other use for `<filesystem>` does not have to compile it. Names in `char` are UTF-8 everywhere; wide ones that are no
-/// text throw KOR_RC_BAD_NAME.
+/// other use for `<filesystem>` does not have to compile it. Names in `char` are UTF-8 everywhere; wide ones that are
+/// no text throw KOR_RC_BAD_NAME.
 class FilePath
 {
 public:
