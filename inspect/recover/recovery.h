@@ -77,7 +77,7 @@ private:
   Prober prober_;
   Place place_;
   Judge judge_;
-  Search search_;
+  RecoverySearch search_;
   Ledger ledger_;
   Nesting nesting_;
   bool indexed_ = false;

@@ -10,7 +10,7 @@ namespace tav::inspect
 
 using namespace tav::layout;
 
-bool Search::findNext(uint64_t from, uint64_t to, Candidate& found)
+bool RecoverySearch::findNext(uint64_t from, uint64_t to, Candidate& found)
 {
   constexpr uint64_t kWindow = uint64_t{16} * 1024;
   std::vector<uint8_t> window(kWindow + kHeaderSize64);
@@ -37,7 +37,7 @@ bool Search::findNext(uint64_t from, uint64_t to, Candidate& found)
 }
 
 /// Whether a node begins at an offset; one with other headers than the group around has takes more to be believed.
-bool Search::isFound(const uint8_t* bytes, uint64_t offset, uint64_t from, uint64_t to, Candidate& found)
+bool RecoverySearch::isFound(const uint8_t* bytes, uint64_t offset, uint64_t from, uint64_t to, Candidate& found)
 {
   const bool own = place_.top().wide;
   if (judge_.tryAt(bytes, offset, own, found) && judge_.isWorthTaking(found, from, to) &&
@@ -49,7 +49,7 @@ bool Search::isFound(const uint8_t* bytes, uint64_t offset, uint64_t from, uint6
          !judge_.isDamagedEnd(found, to) && judge_.isRun(offset, !own) && believe(found, Footing::searched);
 }
 
-uint64_t Search::firstSure(uint64_t from, uint64_t to, bool wide)
+uint64_t RecoverySearch::firstSure(uint64_t from, uint64_t to, bool wide)
 {
   // What was searched once is not searched again: claims may overlap as they like.
   const bool known = wide == sureWide_ && from >= sureFrom_ && from <= sureAt_;
@@ -88,7 +88,7 @@ uint64_t Search::firstSure(uint64_t from, uint64_t to, bool wide)
 
 /// Whether nodes inside of what a node claims follow one another exactly to its end, or to that of its payload where
 /// the announced pair is damaged.
-bool Search::isContradicted(const Candidate& found)
+bool RecoverySearch::isContradicted(const Candidate& found)
 {
   const TAVHeader& header = found.header();
   if (found.isGroup() || (Judge::isExact(header) && found.pairBytes == 0) || Judge::mayHoldNodes(found))
@@ -102,7 +102,7 @@ bool Search::isContradicted(const Candidate& found)
           (found.pairBytes != 0 && judge_.leadsTo(sure, is64(header), found.end - found.pairBytes)));
 }
 
-bool Search::believe(Candidate& found, Footing footing)
+bool RecoverySearch::believe(Candidate& found, Footing footing)
 {
   const TAVHeader& header = found.header();
   const bool named = Prober::isNamed(elmOf(header));
@@ -128,7 +128,7 @@ bool Search::believe(Candidate& found, Footing footing)
   return sure >= end || (!found.isGroup() && Judge::mayHoldNodes(found) && judge_.leadsTo(sure, is64(header), end));
 }
 
-bool Search::isStranger(const TAVHeader& header, uint64_t& end)
+bool RecoverySearch::isStranger(const TAVHeader& header, uint64_t& end)
 {
   constexpr int kMost = 16;
   const uint64_t limit = std::min(place_.sureLimit(), place_.top().limit);

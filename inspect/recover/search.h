@@ -21,11 +21,11 @@ enum class Footing : uint8_t
 
 /// Finds candidates by what the judge says of one place after another, and believes a candidate where nothing in its
 /// bytes is surer. Remembers what was searched, so that claims that overlap are not searched once more for each.
-class Search
+class RecoverySearch
 {
 public:
   /// `budget`: bytes that `findNext` may look through. All that is given outlives this object.
-  Search(ByteSource& source, const Form& form, const Place& place, const Judge& judge, uint64_t budget)
+  RecoverySearch(ByteSource& source, const Form& form, const Place& place, const Judge& judge, uint64_t budget)
       : source_(source), form_(form), place_(place), judge_(judge), budget_(budget) {}
 
   /// The first place from `from` on where a node can begin; false when there is none before `to`, or the budget is used

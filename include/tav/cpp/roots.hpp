@@ -53,7 +53,10 @@ public:
       const uint8_t* bytes = nullptr;
       rc = view(offset + got, bytes, there);
       there = lesser(there, length - got);
-      std::memcpy(to + got, bytes, static_cast<size_t>(there));
+      if (there != 0) // at the end the bytes are nowhere, which memcpy does not take
+      {
+        std::memcpy(to + got, bytes, static_cast<size_t>(there));
+      }
     }
     return rc;
   }

@@ -1,6 +1,6 @@
 /// @file time.hpp
-/// Moments, without the header that makes them: `<chrono>` is a fifth of the time that a small program takes to compile,
-/// and who has a std::chrono::sys_time has included it.
+/// Moments, without the header that makes them: `<chrono>` is a fifth of the time that a small program takes to
+/// compile, and who has a std::chrono::sys_time has included it.
 #pragma once
 
 #include <cstdint>

@@ -29,7 +29,7 @@ private:
 public:
   Place place;
   Judge judge;
-  Search search;
+  RecoverySearch search;
 };
 
 } // namespace
