@@ -227,7 +227,7 @@ check_clang()
 # The tests link the library's objects statically everywhere; here the installed static libraries are what is new.
 check_static()
 {
-  build static --target tav kor tav_texts snapshot growing_storage layer_tour
+  build static --target tav kor tav_texts snapshot growing_storage layer_tour record
   run_tests static --tests-regex '^(install|examples)\.'
 }
 
