@@ -25,7 +25,7 @@ Form formOf(const SearchStart& start)
 } // namespace
 
 Search::Search(DocumentState& state, std::string_view path, OnDamage onDamage)
-    : Search(state, {}, false, pathOf(path), PathMatcher(pathOf(path)), onDamage)
+    : Search(state, {}, false, PathMatcher(pathOf(path)), onDamage)
 {
 }
 
@@ -36,16 +36,15 @@ Search::Search(DocumentState& state, const SearchStart& start, std::string_view 
 
 /// Most paths lead down: then the walk begins at the node.
 Search::Search(DocumentState& state, const SearchStart& start, const Path& path, OnDamage onDamage)
-    : Search(state, start, !PathMatcher::leavesStart(path), path,
+    : Search(state, start, !PathMatcher::leavesStart(path),
              PathMatcher::leavesStart(path) ? PathMatcher(path, *state.source, start.form, start.node.nodeOffset)
                                             : PathMatcher::below(path),
              onDamage)
 {
 }
 
-Search::Search(DocumentState& state, const SearchStart& start, bool isBelow, Path path, PathMatcher matcher,
-               OnDamage onDamage)
-    : state_(state), path_(std::move(path)), matcher_(std::move(matcher)), onDamage_(onDamage),
+Search::Search(DocumentState& state, const SearchStart& start, bool isBelow, PathMatcher matcher, OnDamage onDamage)
+    : state_(state), matcher_(std::move(matcher)), onDamage_(onDamage),
       walk_(
           *state.source, isBelow ? formOf(start) : state.recognition.form,
           [this](const PassedOver& passed) { passOver(passed); }, isBelow ? startAt(start.node) : WalkStart{}),

@@ -40,13 +40,11 @@ public:
   DocumentState& state() { return state_; }
 
 private:
-  Search(DocumentState& state, const SearchStart& start, bool isBelow, Path path, PathMatcher matcher,
-         OnDamage onDamage);
+  Search(DocumentState& state, const SearchStart& start, bool isBelow, PathMatcher matcher, OnDamage onDamage);
   Search(DocumentState& state, const SearchStart& start, const Path& path, OnDamage onDamage);
   void passOver(const PassedOver& passed);
 
   DocumentState& state_;
-  Path path_;
   PathMatcher matcher_;
   OnDamage onDamage_;
   StreamWalk walk_;

@@ -230,6 +230,33 @@ TEST_P(TestDocument, FindsFromANodeInItsStreamsForm)
   EXPECT_THAT(names, ElementsAre("joan"));
 }
 
+TEST_P(TestDocument, FindsFromANodeWhatTheReaderFinds)
+{
+  const Document document = open(hosts({{"ada", 4}, {"eve", 8}, {"bob", 16}}));
+  const tav::Reader reader(test::spanOf(bytes_));
+  const auto offsetsOf = [](auto&& range) {
+    std::vector<uint64_t> offsets;
+    for (const tav::Node& node : range)
+    {
+      offsets.push_back(node.offset());
+    }
+    return offsets;
+  };
+  size_t found = 0;
+  for (const tav::Node& from : reader.find("/ | //*"))
+  {
+    for (const char* const path : {".", "*", ".//*", "hostName", "..", "../*", "../*[1]", "../../*", "..//cpuOnline",
+                                   "//host[cpuOnline > 4]", "/system/host[last()]", "../host[hostName='eve'] | ."})
+    {
+      SCOPED_TRACE(std::to_string(from.offset()) + " " + path);
+      const std::vector<uint64_t> expected = offsetsOf(from.find(path));
+      EXPECT_EQ(offsetsOf(document.find(from, path)), expected);
+      found += expected.size();
+    }
+  }
+  EXPECT_GT(found, 100U);
+}
+
 TEST_P(TestDocument, StopsAtDamageAndSaysWhere)
 {
   Bytes bytes = hosts({{"ada", 8}, {"grace", 16}, {"hedy", 3}});
