@@ -57,8 +57,8 @@ uint32_t readDirect(const TAVHandle& handle, uint64_t offset, TAVHeaderData& out
   uint8_t* const header = handle.pDirectData + relative;
   const bool swap = handle.swapBytes != 0;
   const bool hasData = core::BlockBytes<core::AnyForm>::hasData<Wide>(core::NodeIn<Wide>{header, swap}.type());
-  core::describe<Wide>(header, swap, offset, hasData ? header + length : nullptr,
-                       hasData ? handle.directDataSize - relative - length : 0, out);
+  core::describe<Wide, core::LibraryWay>(header, swap, offset, hasData ? header + length : nullptr,
+                                         hasData ? handle.directDataSize - relative - length : 0, out);
   return TAV_RC_OK;
 }
 

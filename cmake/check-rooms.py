@@ -9,6 +9,9 @@ program alone asks of the system is in tools/host, by the same rule. No other so
 examples included. What keeps a compiler from its work stands in one file. The inspection library names no option of the
 program.
 
+What of core is compiled into programs is installed, in include/tav/core/: the rooms below core do not use it, but for
+the header that storage shares with it.
+
 Names in `tav` itself are those of the installed headers: what stays inside the library is in `tav::inside`, and the
 steps are in `tav::core`.
 """
@@ -29,6 +32,10 @@ ROOMS = {
     "tools": {"tools"},
     "include": set(),
 }
+# The installed part of core: which of it the rooms below may use.
+CORE = "tav/core/"
+CORE_SHARED = {"storage": {"tav/core/cachedRun.hpp"}}
+BELOW_CORE = ("kor", "trace", "format", "storage", "dictionary")
 # libkor knows nothing of libtav.
 KOR_ROOMS = {"kor", "trace"}
 KOR_PUBLIC = {"tav/kor.h", "tav/codes.h", "tav/byteOrder.h", "tav/decl.h"}
@@ -91,6 +98,8 @@ def include_error(name, room, opening, path):
     if path.startswith("tav/"):
         if (room in KOR_ROOMS or name in KOR_HEADERS) and path not in KOR_PUBLIC:
             return f"libkor includes {path} of libtav"
+        if path.startswith(CORE) and room in BELOW_CORE and path not in CORE_SHARED.get(room, ()):
+            return f"{room} must not include {path}"
         return None
     if opening == '"':
         if "/" not in path:

@@ -15,7 +15,7 @@ void markPending(TAVCircularBuf& ring, uint64_t page, uint64_t last)
 
 uint8_t* takeCachedRun(TAVCircularBuf& ring, uint64_t offset, uint64_t length)
 {
-  if (uint8_t* const place = takeInPage(ring, offset, length))
+  if (uint8_t* const place = core::takeInPage(ring, offset, length))
   {
     return place;
   }

@@ -9,6 +9,7 @@
 #include <new>
 #include <utility>
 
+#include "tav/core/fastWay.hpp"
 #include "tav/cpp/text.hpp"
 #include "tav/cpp/time.hpp"
 #include "tav/cpp/values.hpp"
@@ -71,12 +72,23 @@ std::string_view textOf(const T& value) noexcept
   }
 }
 
+/// Whether a `write` puts payloads where the next node begins, or answers kNotHere: another one is called then.
+template<class Write>
+concept WritesInPlace = std::remove_cvref_t<Write>::isInPlace;
+
 /// Calls `write(type, bytes, size)` with the payload of UTF-8 text: code page and bytes. Short texts are not allocated.
 template<class Write>
-uint32_t withUtf8Payload(std::string_view text, uint16_t codePage, Write& write) noexcept
+uint32_t withUtf8Payload(std::string_view text, uint16_t codePage, Write&& write) noexcept
 {
   std::array<uint8_t, 256> room;
   const size_t size = sizeof codePage + text.size();
+  if constexpr (WritesInPlace<Write>)
+  {
+    if (size > room.size())
+    {
+      return core::kNotHere; // what allocates is for the way that can tell of it
+    }
+  }
   auto* const larger = size > room.size() ? static_cast<uint8_t*>(::operator new(size, std::nothrow)) : nullptr;
   uint8_t* const bytes = size > room.size() ? larger : room.data();
   if (bytes == nullptr)
@@ -95,7 +107,7 @@ uint32_t withUtf8Payload(std::string_view text, uint16_t codePage, Write& write)
 
 /// Calls `write(type, bytes, size)` with a 128-bit value.
 template<Integer128 T, class Write>
-uint32_t withHalves(const T& value, Write& write) noexcept
+[[gnu::always_inline]] inline uint32_t withHalves(const T& value, Write&& write) noexcept
 {
   if constexpr (BuiltinInteger128<T>)
   {
@@ -112,7 +124,7 @@ uint32_t withHalves(const T& value, Write& write) noexcept
 
 /// Out of line: the usual text shall not pay for it.
 template<class Write>
-[[gnu::noinline]] uint32_t withTextBeyondAscii(std::string_view text, Write& write) noexcept
+[[gnu::noinline]] uint32_t withTextBeyondAscii(std::string_view text, Write&& write) noexcept
 {
   return isUtf8(text) ? withUtf8Payload(text, kCodePageUtf8, write) : TAV_RC_BAD_PARAM;
 }
@@ -120,18 +132,25 @@ template<class Write>
 /// Calls `write(type, bytes, size)` with a text: an ASCII String where it is ASCII, else a UTF8 String where it is
 /// that. Other bytes are TAV_RC_BAD_PARAM.
 template<class Write>
-uint32_t withText(std::string_view text, Write& write) noexcept
+[[gnu::always_inline]] inline uint32_t withText(std::string_view text, Write&& write) noexcept
 {
   if (isAscii(text)) [[likely]]
   {
     return write(TAV_TYPE_ASCII_STRING, bytesOf(text.data()), uint64_t{text.size()});
   }
-  return withTextBeyondAscii(text, write);
+  if constexpr (WritesInPlace<Write>)
+  {
+    return core::kNotHere; // so that what is written in place needs no place in memory itself
+  }
+  else
+  {
+    return withTextBeyondAscii(text, write);
+  }
 }
 
 /// Calls `write(type, bytes, size)` with a text, a UTF-8 text, bytes or words. A null pointer is TAV_RC_BAD_PARAM.
 template<class T, class Write>
-uint32_t withView(const T& value, Write& write) noexcept
+[[gnu::always_inline]] inline uint32_t withView(const T& value, Write&& write) noexcept
 {
   if (isNullPointer(value))
   {
@@ -161,7 +180,7 @@ uint32_t withView(const T& value, Write& write) noexcept
 /// Calls `write(type, bytes, size)` with a value's payload in this machine's byte order, and returns its code. A value
 /// that its type cannot hold is TAV_RC_OUTSIDE_PARENT.
 template<Addable T, class Write>
-uint32_t withPayload(const T& value, Write&& write) noexcept
+[[gnu::always_inline]] inline uint32_t withPayload(const T& value, Write&& write) noexcept
 {
   if constexpr (StreamInteger<T>)
   {
@@ -208,6 +227,20 @@ uint32_t withPayloadFor(uint16_t type, const T& value, Write&& write) noexcept
   return withPayload(value, write);
 }
 
+/// A value for a call on the side: small ones as a copy, so that the value itself needs no place in memory.
+template<class T>
+[[gnu::always_inline]] inline decltype(auto) kept(const T& value) noexcept
+{
+  if constexpr (std::is_trivially_copyable_v<T> && !std::is_array_v<T> && sizeof(T) <= 2 * sizeof(uint64_t))
+  {
+    return T(value);
+  }
+  else
+  {
+    return (value);
+  }
+}
+
 /// Why withPayload refused a value; null when its code says it.
 template<class T>
 const char* refusalOf(const T& value, uint32_t code) noexcept
@@ -233,7 +266,7 @@ const char* refusalOf(const T& value, uint32_t code) noexcept
 
 /// As withPayload, with an integer as a value of a given type.
 template<uint16_t Type, StreamInteger T, class Write>
-uint32_t withPayloadAs(T value, Write&& write) noexcept
+[[gnu::always_inline]] inline uint32_t withPayloadAs(T value, Write&& write) noexcept
 {
   using Number = IntegerOf<Type>;
   if constexpr (Type == TAV_TYPE_SINT128 || Type == TAV_TYPE_UINT128)

@@ -38,9 +38,11 @@ public:
   HeaderView add(ElementId elm, const T& value, const NodeOptions& options = {})
   {
     TAVHeaderData node;
-    const uint32_t rc = append(node, elm, value, options);
-    detail::demand(rc, "adding", [&] { return tell(rc, elm, options, detail::refusalOf(value, rc)); });
-    return HeaderView(node.header);
+    if (putValue(node, elm, value, options)) [[likely]]
+    {
+      return HeaderView(node.header);
+    }
+    return addElsewhere(elm, detail::kept(value), NodeOptions(options));
   }
   template<class T>
   HeaderView add(ElementId elm, const T& value, std::error_code& ec) noexcept
@@ -51,7 +53,8 @@ public:
   HeaderView add(ElementId elm, const T& value, const NodeOptions& options, std::error_code& ec) noexcept
   {
     TAVHeaderData node{};
-    detail::report(append(node, elm, value, options), ec);
+    const bool isPut = putValue(node, elm, value, options);
+    detail::report(isPut ? TAV_RC_OK : append(node, elm, value, options), ec);
     return HeaderView(node.header);
   }
 
@@ -61,9 +64,11 @@ public:
   HeaderView add(ElementId elm, T value, const NodeOptions& options = {})
   {
     TAVHeaderData node;
-    const uint32_t rc = appendAs<Type>(node, elm, value, options);
-    detail::demand(rc, "adding", [&] { return tell(rc, elm, options, "the number does not fit the type"); });
-    return HeaderView(node.header);
+    if (putValueAs<Type>(node, elm, value, options)) [[likely]]
+    {
+      return HeaderView(node.header);
+    }
+    return addElsewhereAs<Type>(elm, value, NodeOptions(options));
   }
   template<uint16_t Type, class T>
   HeaderView add(ElementId elm, T value, std::error_code& ec) noexcept
@@ -74,7 +79,8 @@ public:
   HeaderView add(ElementId elm, T value, const NodeOptions& options, std::error_code& ec) noexcept
   {
     TAVHeaderData node{};
-    detail::report(appendAs<Type>(node, elm, value, options), ec);
+    const bool isPut = putValueAs<Type>(node, elm, value, options);
+    detail::report(isPut ? TAV_RC_OK : appendAs<Type>(node, elm, value, options), ec);
     return HeaderView(node.header);
   }
 
@@ -180,7 +186,7 @@ private:
     state->innermost = state->depth();
     if (fast && options.children == Width::bits64)
     {
-      state->fast = state->innermost;
+      state->goTo(state->innermost);
     }
     else
     {
@@ -230,30 +236,100 @@ private:
     return state_ ? state_->enter(own(), how) : TAV_RC_BAD_PARAM;
   }
 
+  /// Takes a payload to the place where the next node begins.
+  struct Put
+  {
+    static constexpr bool isInPlace = true;
+
+    detail::WriterState& state;
+    TAVHeaderData& node;
+    uint16_t elm;
+    const NodeOptions& options;
+
+    [[gnu::always_inline]] uint32_t operator()(uint16_t type, const uint8_t* bytes, uint64_t size) const noexcept
+    {
+      return state.put(node, type, elm, options, bytes, size);
+    }
+  };
+
+  /// Appends an element in the caller's own code, without a call; false where that is not possible, or is refused.
+  /// `give(write)` calls `write` with the payload.
+  template<class Give>
+  [[gnu::always_inline]] bool put(TAVHeaderData& node, ElementId elm, const NodeOptions& options,
+                                  const Give& give) noexcept
+  {
+    if (!state_ || state_->here != level_ || !isPlain(elm, options) || !core::hasNeverTraced()) [[unlikely]]
+    {
+      return false;
+    }
+    return give(Put{*state_, node, elm.id(), options}) == TAV_RC_OK;
+  }
   template<class T>
-  uint32_t append(TAVHeaderData& node, ElementId elm, const T& value, const NodeOptions& options) noexcept
+  [[gnu::always_inline]] bool putValue(TAVHeaderData& node, ElementId elm, const T& value,
+                                       const NodeOptions& options) noexcept
+  {
+    if constexpr (detail::Addable<T>)
+    {
+      return put(node, elm, options, [&value](auto&& write) { return detail::withPayload(value, write); });
+    }
+    return false;
+  }
+  template<uint16_t Type, class T>
+  [[gnu::always_inline]] bool putValueAs(TAVHeaderData& node, ElementId elm, T value,
+                                         const NodeOptions& options) noexcept
+  {
+    if constexpr (detail::isIntegerTypeCode<Type> && StreamInteger<T>)
+    {
+      return put(node, elm, options, [value](auto&& write) { return detail::withPayloadAs<Type>(value, write); });
+    }
+    return false;
+  }
+
+  template<class T>
+  [[gnu::noinline]] HeaderView addElsewhere(ElementId elm, const T& value, const NodeOptions& options)
+  {
+    TAVHeaderData node;
+    const uint32_t rc = append(node, elm, value, options);
+    detail::demand(rc, "adding", [&] { return tell(rc, elm, options, detail::refusalOf(value, rc)); });
+    return HeaderView(node.header);
+  }
+  template<uint16_t Type, class T>
+  [[gnu::noinline]] HeaderView addElsewhereAs(ElementId elm, T value, const NodeOptions& options)
+  {
+    TAVHeaderData node;
+    const uint32_t rc = appendAs<Type>(node, elm, value, options);
+    detail::demand(rc, "adding", [&] { return tell(rc, elm, options, "the number does not fit the type"); });
+    return HeaderView(node.header);
+  }
+
+  template<class T>
+  [[gnu::noinline]] uint32_t append(TAVHeaderData& node, ElementId elm, const T& value,
+                                    const NodeOptions& options) noexcept
   {
     static_assert(detail::Addable<T>,
                   "a value of this type has no type in the stream: use a sized integer, std::byte, "
                   "text, tav::Utf8, bytes, 64-bit words, tav::Uint128, a timestamp or a system time");
     if constexpr (detail::Addable<T>)
     {
-      const auto write = [&](uint16_t type, const uint8_t* bytes, uint64_t size) {
-        return state_->appendFast(node, type, elm.id(), options, bytes, size);
-      };
-      if (isFast(elm, options)) [[likely]]
-      {
-        return detail::withPayload(value, write);
-      }
-      const NodeOptions kept(options); // so that the fast way needs none in memory
-      return appendSlowly(node, elm, kept, [&value](auto& slow) { return detail::withPayload(value, slow); });
+      return appendGiven(node, elm, options, [&value](auto&& write) { return detail::withPayload(value, write); });
     }
   }
 
-  /// Whether a data element can be added without a look at anything else.
-  [[gnu::always_inline]] bool isFast(ElementId elm, const NodeOptions& options) const noexcept
+  /// By the operation.
+  template<class Give>
+  uint32_t appendGiven(TAVHeaderData& node, ElementId elm, const NodeOptions& options, const Give& give) noexcept
   {
-    return state_ && state_->fast == level_ && options.infoKey <= TAV_INFO_KEY_MASK && elm.isValid();
+    const auto write = [&](uint16_t type, const uint8_t* bytes, uint64_t size) {
+      return state_->appendFast(node, type, elm.id(), options, bytes, size);
+    };
+    const bool fast = state_ && state_->fast == level_ && isPlain(elm, options);
+    return fast ? give(write) : appendSlowly(node, elm, options, give);
+  }
+
+  /// Whether there is nothing to refuse.
+  [[gnu::always_inline]] static bool isPlain(ElementId elm, const NodeOptions& options) noexcept
+  {
+    return options.infoKey <= TAV_INFO_KEY_MASK && elm.isValid();
   }
 
   /// When there is something to look at before. `give(write)` calls `write` with the payload.
@@ -274,22 +350,15 @@ private:
   }
 
   template<uint16_t Type, class T>
-  uint32_t appendAs(TAVHeaderData& node, ElementId elm, T value, const NodeOptions& options) noexcept
+  [[gnu::noinline]] uint32_t appendAs(TAVHeaderData& node, ElementId elm, T value, const NodeOptions& options) noexcept
   {
     static_assert(detail::isIntegerTypeCode<Type>, "this is not the code of an integer type: use add with a value of "
                                                    "the type, or addRaw");
     static_assert(StreamInteger<T>, "only an integer can be added as an integer type");
     if constexpr (detail::isIntegerTypeCode<Type> && StreamInteger<T>)
     {
-      const auto write = [&](uint16_t type, const uint8_t* bytes, uint64_t size) {
-        return state_->appendFast(node, type, elm.id(), options, bytes, size);
-      };
-      if (isFast(elm, options)) [[likely]]
-      {
-        return detail::withPayloadAs<Type>(value, write);
-      }
-      const NodeOptions kept(options); // so that the fast way needs none in memory
-      return appendSlowly(node, elm, kept, [&value](auto& slow) { return detail::withPayloadAs<Type>(value, slow); });
+      return appendGiven(node, elm, options,
+                         [value](auto&& write) { return detail::withPayloadAs<Type>(value, write); });
     }
   }
 
@@ -335,7 +404,7 @@ private:
       state_->innermost = outer_;
       if (fast && outer_ != 0)
       {
-        state_->fast = outer_; // a group of 64-bit headers is in one
+        state_->goTo(outer_); // a group of 64-bit headers stands in one
       }
       else
       {

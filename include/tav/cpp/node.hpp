@@ -11,6 +11,7 @@
 #include <utility>
 #include <vector>
 
+#include "tav/core/step.hpp"
 #include "tav/cpp/decode.hpp"
 #include "tav/cpp/error.hpp"
 #include "tav/cpp/header.hpp"
@@ -23,11 +24,14 @@ class ChildRange;
 class DescendantRange;
 class FindRange;
 class Path;
+class Index;
 class RootRange;
 namespace detail
 {
 class Printer;
 struct NodeTree;
+template<class Walk>
+class WalkIterator;
 } // namespace detail
 
 /// Whether a walk shows the elements that only end a group (ids 65000 and 65001).
@@ -307,6 +311,9 @@ private:
   friend class ChildRange;
   friend class DescendantRange;
   friend class RootRange;
+  friend class Index;
+  template<class Walk>
+  friend class detail::WalkIterator;
   friend class detail::Printer;
   friend struct detail::NodeTree;
 
@@ -320,15 +327,54 @@ private:
       : state_(state), isFast_(state != nullptr && state->isFast)
   {
   }
-  /// Reads the node behind `reference`, which may be this one's own header, or the first one below the parent.
-  [[gnu::always_inline]] uint32_t readNext(TAVHeader* parent, TAVHeader* reference) noexcept
+  /// Where a group's content ends, if its children have 64-bit headers and it was closed; else 0, which leaves every
+  /// step to the operation.
+  static uint64_t endOf(const TAVHeader& group) noexcept
+  {
+    const core::Level level = core::levelBelowClosed(core::NodeAt<true>{group});
+    return layout::hasChildren64(group) && level.fits ? level.end : 0;
+  }
+
+  /// Reads the node behind `reference`, which may be this one's own header, or the first one below the parent. `end`:
+  /// endOf the parent.
+  template<bool First>
+  [[gnu::always_inline]] uint32_t readNext(TAVHeader* reference, uint64_t end) noexcept
   {
     detail::ReaderState& state = *state_;
-    if (!isFast_) [[unlikely]]
+    if (state.inPlace == detail::InPlace::block && core::hasNeverTraced()) [[likely]]
+    {
+      const uint32_t rc = step<First, detail::BlockInPlace>(*state.handle, reference, end);
+      return rc != core::kNotHere ? rc : readElsewhere(reference);
+    }
+    if (!isFast_)
     {
       fetch_ = ++state.fetches;
     }
-    return tavGetNextChild(0, state.handle, parent, reference, &data_);
+    if (state.inPlace == detail::InPlace::ring && core::hasNeverTraced()) [[likely]]
+    {
+      const uint32_t rc = step<First, detail::RingInPlace>(*state.handle, reference, end);
+      return rc != core::kNotHere ? rc : readElsewhere(reference);
+    }
+    return readElsewhere(reference);
+  }
+
+  /// The place of the sibling for a walk that steps in place; past every level where only readNext finds it.
+  [[nodiscard]] uint64_t behind() const noexcept
+  {
+    return layout::is64(data_.header) ? core::behind(core::NodeAt<true>{data_.header}) : ~uint64_t{0};
+  }
+
+  template<bool First, class Bytes>
+  [[gnu::always_inline]] uint32_t step(TAVHandle& handle, const TAVHeader* reference, uint64_t end) noexcept
+  {
+    const uint64_t start = First ? parent_.nodeOffset + layout::kHeaderSize64 : 0; // fits where the end does
+    const core::Level level{start, end, true, true};
+    return core::nextOnLevel<true, First>(Bytes(handle), handle, level, reference, data_);
+  }
+
+  [[gnu::noinline]] uint32_t readElsewhere(TAVHeader* reference) noexcept
+  {
+    return tavGetNextChild(0, state_->handle, &parent_, reference, &data_);
   }
 
   /// Surely no end element, in one look: those have the largest ids.

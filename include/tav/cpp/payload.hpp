@@ -30,6 +30,7 @@ struct ReaderState
   TAVHandle* handle = nullptr;
   uint64_t fetches = 0; ///< payload pointers into a ring last until the next one
   bool isFast = false;  ///< over memory, in this machine's order; unknown once the handle was given away
+  InPlace inPlace = InPlace::no;
 
   ReaderState() = default;
   ReaderState(const ReaderState&) = delete;
@@ -46,6 +47,17 @@ struct ReaderState
   void settle() noexcept
   {
     isFast = handle != nullptr && !isBuffered() && !isSwapped();
+    const bool reads = handle != nullptr && core::isReadOnly(*handle);
+    inPlace = reads && BlockInPlace::canRead(*handle)  ? InPlace::block
+              : reads && RingInPlace::canRead(*handle) ? InPlace::ring
+                                                       : InPlace::no;
+  }
+
+  /// The handle is given away: a plain operation can give it another storage.
+  void share() noexcept
+  {
+    isFast = false;
+    inPlace = InPlace::no;
   }
 
   [[nodiscard]] bool isBuffered() const noexcept

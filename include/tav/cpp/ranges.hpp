@@ -7,6 +7,7 @@
 #include <iterator>
 #include <optional>
 #include <span>
+#include <type_traits>
 #include <utility>
 
 #include "tav/cpp/node.hpp"
@@ -18,8 +19,13 @@ namespace tav
 namespace detail
 {
 
-/// An iterator over a walk that lives in its range. `Walk` has `current()` and `advance()`, which reports whether there
-/// is a node. The end is kept in the iterator, where a loop has it in a register.
+/// Whether a walk goes from sibling to sibling: then most of its steps are taken in place.
+template<class Walk>
+inline constexpr bool stepsInPlace = std::is_same_v<Walk, ChildRange> || std::is_same_v<Walk, DescendantRange>;
+
+/// An iterator over a walk that lives in its range. `Walk` has `current()` and `advance()`, which tells whether there
+/// is a node; one that steps in place has its node as `current_`, too, and the place `end_` where its level ends. The
+/// iterator keeps what most steps need, where a loop has it in registers: these are taken without a call.
 template<class Walk>
 class WalkIterator
 {
@@ -33,6 +39,7 @@ public:
   explicit WalkIterator(Walk* walk) noexcept
       : walk_(walk)
   {
+    settle();
   }
 
   const Node& operator*() const noexcept
@@ -43,13 +50,16 @@ public:
   {
     return &walk_->current();
   }
-  WalkIterator& operator++()
+  [[gnu::always_inline]] WalkIterator& operator++()
   {
-    Walk* const walk = std::exchange(walk_, nullptr); // at the end, too, when the step throws
-    if (walk->advance())
+    if constexpr (stepsInPlace<Walk>)
     {
-      walk_ = walk;
+      if (stepInPlace()) [[likely]]
+      {
+        return *this;
+      }
     }
+    stepElsewhere();
     return *this;
   }
   void operator++(int)
@@ -67,7 +77,67 @@ private:
     return walk_ == nullptr;
   }
 
+  /// To a sibling that is a data element, while nothing is traced.
+  [[gnu::always_inline]] bool stepInPlace() noexcept
+  {
+    if (!core::hasNeverTraced()) [[unlikely]]
+    {
+      return false;
+    }
+    Node& node = walk_->current_;
+    if (state_->inPlace == InPlace::block) [[likely]]
+    {
+      return core::nextElement(level_, next_, node.data_);
+    }
+    if (state_->inPlace != InPlace::ring)
+    {
+      return false;
+    }
+    TAVHandle& handle = *state_->handle;
+    const core::RingLevel<core::PlainWay> level{RingInPlace(handle), handle, walk_->end_};
+    const bool isHere = core::nextElement(level, behind_, node.data_);
+    if (isHere)
+    {
+      node.fetch_ = ++state_->fetches;
+    }
+    return isHere;
+  }
+
+  void stepElsewhere()
+  {
+    Walk* const walk = std::exchange(walk_, nullptr); // at the end, too, when the step throws
+    if (walk->advance())
+    {
+      walk_ = walk;
+      settle();
+    }
+  }
+
+  /// After a step that was not taken in place.
+  void settle() noexcept
+  {
+    if constexpr (stepsInPlace<Walk>)
+    {
+      if (walk_ == nullptr)
+      {
+        return;
+      }
+      const Node& node = walk_->current_;
+      state_ = node.state_;
+      behind_ = Walk::descends && node.isGroup() ? ~uint64_t{0} : node.behind();
+      if (state_->inPlace == InPlace::block)
+      {
+        level_ = core::BlockLevel(BlockInPlace(*state_->handle), walk_->end_);
+        next_ = level_.at(behind_);
+      }
+    }
+  }
+
   Walk* walk_ = nullptr;
+  ReaderState* state_ = nullptr;
+  core::BlockLevel level_;
+  uint8_t* next_ = nullptr; ///< where the node's sibling is looked for in a block
+  uint64_t behind_ = 0;     ///< the same by its offset, through a ring
 };
 
 /// The end of a walk: reported where somebody asks for the code, else thrown.
@@ -96,8 +166,8 @@ public:
     if (!begun_)
     {
       begun_ = true;
-      TAVHeader* const reference = hasReference_ ? &current_.data_.header : nullptr;
-      arriveElsewhere(first_ == TAV_RC_OK ? current_.readNext(&current_.parent_, reference) : first_);
+      arriveElsewhere(first_ != TAV_RC_OK ? first_ : hasReference_ ? onward()
+                                                                   : current_.readNext<true>(nullptr, end_));
     }
     return detail::WalkIterator<ChildRange>(done_ ? nullptr : this);
   }
@@ -116,6 +186,7 @@ private:
         first_(parent.isGroup() ? TAV_RC_OK : TAV_RC_NO_MORE_CHILDREN)
   {
     current_.parent_ = parent.data_.header;
+    end_ = Node::endOf(current_.parent_);
   }
   struct Behind
   {
@@ -124,7 +195,7 @@ private:
   /// The siblings behind a node.
   ChildRange(Behind behind, EndElements endElements, std::error_code* ec) noexcept
       : current_(behind.node), ec_(ec), endElements_(endElements), hasReference_(true),
-        first_(whyNoSiblings(behind.node))
+        first_(whyNoSiblings(behind.node)), end_(Node::endOf(current_.parent_))
   {
   }
 
@@ -138,15 +209,21 @@ private:
     return node.state_ != nullptr && node.isRoot_ ? TAV_RC_NO_MORE_CHILDREN : TAV_RC_NOT_SUPPORTED;
   }
 
+  static constexpr bool descends = false;
+
   [[nodiscard]] const Node& current() const noexcept
   {
     return current_;
   }
   /// Siblings lie ahead, whatever the bytes are: behind a node's end, or behind an eye catcher that is.
-  [[gnu::always_inline]] bool advance()
+  [[gnu::noinline]] bool advance()
   {
-    const uint32_t rc = current_.readNext(&current_.parent_, &current_.data_.header);
+    const uint32_t rc = onward();
     return (rc == TAV_RC_OK && current_.isSurelyNoEnd()) || arriveElsewhere(rc);
+  }
+  [[gnu::always_inline]] uint32_t onward() noexcept
+  {
+    return current_.readNext<false>(&current_.data_.header, end_);
   }
 
   /// After a step that led to no node, or perhaps to an end element.
@@ -154,7 +231,7 @@ private:
   {
     while (rc == TAV_RC_OK && endElements_ == EndElements::skip && layout::isEndElement(current_.elm()))
     {
-      rc = current_.readNext(&current_.parent_, &current_.data_.header);
+      rc = onward();
     }
     if (rc != TAV_RC_OK)
     {
@@ -170,7 +247,8 @@ private:
   bool hasReference_ = false;
   bool begun_ = false;
   bool done_ = false;
-  uint32_t first_; ///< why there is nothing to walk
+  uint32_t first_;   ///< why there is nothing to walk
+  uint64_t end_ = 0; ///< of the group that is walked
 };
 
 /// All nodes below a group, depth first. A single pass; the range holds the place of the walk, 32 bytes a level.
@@ -216,11 +294,13 @@ private:
   {
   }
 
+  static constexpr bool descends = true;
+
   [[nodiscard]] const Node& current() const noexcept
   {
     return current_;
   }
-  [[gnu::always_inline]] bool advance()
+  [[gnu::noinline]] bool advance()
   {
     const uint32_t rc = step();
     return (rc == TAV_RC_OK && current_.isSurelyNoEnd()) || arriveElsewhere(rc);
@@ -233,7 +313,7 @@ private:
     {
       return descend();
     }
-    return current_.readNext(&current_.parent_, &current_.data_.header);
+    return current_.readNext<false>(&current_.data_.header, end_);
   }
 
   /// To the first child of the present node.
@@ -241,7 +321,7 @@ private:
   {
     if (std::exchange(skips_, false))
     {
-      return current_.readNext(&current_.parent_, &current_.data_.header);
+      return current_.readNext<false>(&current_.data_.header, end_);
     }
     if (depth_ != 0)
     {
@@ -249,7 +329,8 @@ private:
     }
     ++depth_;
     current_.parent_ = current_.data_.header;
-    return current_.readNext(&current_.parent_, nullptr);
+    end_ = Node::endOf(current_.parent_);
+    return current_.readNext<true>(nullptr, end_);
   }
 
   /// After a step that led to no node, or perhaps to an end element.
@@ -286,13 +367,15 @@ private:
       current_.parent_ = outer_.back();
       outer_.pop();
       --depth_;
-      rc = current_.readNext(&current_.parent_, &ended);
+      end_ = Node::endOf(current_.parent_);
+      rc = current_.readNext<false>(&ended, end_);
     }
     return rc == TAV_RC_OK && current_.offset() <= last ? TAV_RC_OUTSIDE_PARENT : rc;
   }
 
   Node current_;                   ///< knows the group that is walked
   detail::Stack<TAVHeader> outer_; ///< the groups around that one
+  uint64_t end_ = 0;               ///< of the group that is walked
   size_t depth_ = 0;               ///< 0: still at the start
   std::error_code* ec_;
   EndElements endElements_;

@@ -244,7 +244,7 @@ public:
     {
       return nullptr;
     }
-    state_->isFast = false; // a plain operation can give the handle another storage
+    state_->share();
     return use();
   }
 

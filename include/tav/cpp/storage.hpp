@@ -4,10 +4,11 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <cstdlib>
 #include <cstring>
-#include <new>
 #include <utility>
 
+#include "tav/core/bytes.hpp"
 #include "tav/cpp/error.hpp"
 #include "tav/cpp/file.hpp"
 #include "tav/cpp/values.hpp"
@@ -27,6 +28,17 @@ struct StreamOptions
 namespace detail
 {
 
+/// Over which bytes the compiler puts steps into the caller's code. All others are calls of the operations.
+enum class InPlace : uint8_t
+{
+  no,
+  block, ///< over memory, in this machine's order, nothing padded
+  ring   ///< likewise, over what a ring caches
+};
+
+using BlockInPlace = core::BlockOf<core::HostForm, core::PlainWay>;
+using RingInPlace = core::RingOf<core::HostForm, core::PlainWay>;
+
 /// Opens a handle over a storage.
 inline uint32_t openHandle(TAVSideStorage* storage, uint64_t mode, const StreamOptions& options,
                            TAVHandle*& handle) noexcept
@@ -39,7 +51,8 @@ inline uint32_t openHandle(TAVSideStorage* storage, uint64_t mode, const StreamO
 }
 
 /// A block of memory that grows ahead of what is written. The handle addresses it directly, so it is told of each move.
-/// Bytes that no node was written to are zero: paddings show them.
+/// Where nodes leave gaps, as paddings do, bytes that no node was written to are zero; else nothing is cleared that
+/// will be written anyway.
 class GrowingBlock
 {
 public:
@@ -49,7 +62,7 @@ public:
   }
   ~GrowingBlock()
   {
-    ::operator delete(storage_.pBuffer);
+    std::free(storage_.pBuffer);
   }
   GrowingBlock(const GrowingBlock&) = delete;
   GrowingBlock& operator=(const GrowingBlock&) = delete;
@@ -69,10 +82,20 @@ public:
     return grow(handle, used, more);
   }
 
-  /// Wipes bytes that were taken back.
-  void clear(uint64_t from, uint64_t to) noexcept
+  /// From here on gaps are zero.
+  void clearGaps(uint64_t used) noexcept
   {
-    std::memset(storage_.pBuffer + from, 0, static_cast<size_t>(to - from));
+    clears_ = true;
+    clear(used, storage_.bufferSize);
+  }
+
+  /// Bytes that were taken back are a gap.
+  void takeBack(uint64_t from, uint64_t to) noexcept
+  {
+    if (clears_)
+    {
+      clear(from, to);
+    }
   }
 
 private:
@@ -86,19 +109,17 @@ private:
     }
     const uint64_t twice = 2 * storage_.bufferSize;
     const uint64_t size = more > twice ? more : twice;
-    auto* const block = static_cast<uint8_t*>(::operator new(static_cast<size_t>(size), std::nothrow));
+    auto* const block = static_cast<uint8_t*>(std::realloc(storage_.pBuffer, static_cast<size_t>(size)));
     if (block == nullptr)
     {
       return TAV_RC_NO_MEMORY;
     }
-    if (used != 0)
-    {
-      std::memcpy(block, storage_.pBuffer, static_cast<size_t>(used));
-    }
-    std::memset(block + used, 0, static_cast<size_t>(size - used));
-    ::operator delete(storage_.pBuffer);
+    const uint64_t former = std::exchange(storage_.bufferSize, size);
     storage_.pBuffer = block;
-    storage_.bufferSize = size;
+    if (clears_)
+    {
+      clear(former, size);
+    }
     if (handle != nullptr)
     {
       handle->pDirectData = block;
@@ -107,7 +128,13 @@ private:
     return TAV_RC_OK;
   }
 
+  void clear(uint64_t from, uint64_t to) noexcept
+  {
+    std::memset(storage_.pBuffer + from, 0, static_cast<size_t>(to - from));
+  }
+
   TAVSSMemory storage_;
+  bool clears_ = false;
 };
 
 } // namespace detail

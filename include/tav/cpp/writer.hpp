@@ -228,8 +228,7 @@ public:
     {
       return nullptr;
     }
-    state_->isShared = true;
-    state_->settle();
+    state_->share();
     return state_->handle;
   }
 
@@ -248,13 +247,22 @@ private:
   uint32_t open(TAVSideStorage* storage, const StreamOptions& options) noexcept
   {
     state_->root = options.root;
-    return detail::openHandle(storage, TAV_OPT_WRITE, options, state_->handle);
+    const uint32_t rc = detail::openHandle(storage, TAV_OPT_WRITE, options, state_->handle);
+    if (rc == TAV_RC_OK)
+    {
+      state_->lookAtHandle();
+    }
+    return rc;
   }
 
   uint32_t openBuffer(const StreamOptions& options)
   {
     state_->block.reset(new detail::GrowingBlock);
     const uint32_t rc = state_->block->reserve(nullptr, 0, 0);
+    if (rc == TAV_RC_OK && options.align8)
+    {
+      state_->block->clearGaps(0);
+    }
     return rc != TAV_RC_OK ? rc : open(&state_->block->storage(), options);
   }
 

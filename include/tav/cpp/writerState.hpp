@@ -7,6 +7,7 @@
 #include <span>
 #include <utility>
 
+#include "tav/core/append.hpp"
 #include "tav/cpp/header.hpp"
 #include "tav/cpp/storage.hpp"
 
@@ -74,6 +75,8 @@ struct WriterState
   Owner<TAVSideStorage> owned;
   Owner<GrowingBlock> block;
   Width root = Width::bits64;
+  InPlace inPlace = InPlace::no;       ///< of the handle
+  uint32_t here = kNoLevel;            ///< level of a group that takes data elements in place
   uint32_t fast = kNoLevel;            ///< level of a group that takes 64-bit nodes without a further look
   uint32_t innermost = 0;              ///< level of the innermost Group that is there and open; 1 for the root
   uint32_t orphans = 0;                ///< groups inside it that are still open, their Group objects gone
@@ -116,7 +119,35 @@ struct WriterState
   {
     const bool plain =
         handle != nullptr && !isShared && deferred == TAV_RC_OK && orphans == 0 && innermost != 0 && watch == nullptr;
-    fast = plain && block == nullptr && depth() == innermost && width() == Width::bits64 ? innermost : kNoLevel;
+    const bool wide = plain && depth() == innermost && width() == Width::bits64;
+    here = wide && inPlace != InPlace::no ? innermost : kNoLevel;
+    fast = wide && block == nullptr ? innermost : kNoLevel;
+  }
+
+  /// The fast level is another one.
+  void goTo(uint32_t level) noexcept
+  {
+    here = inPlace != InPlace::no ? level : kNoLevel;
+    fast = level;
+  }
+
+  /// After opening.
+  void lookAtHandle() noexcept
+  {
+    inPlace = BlockInPlace::canWrite(*handle)  ? InPlace::block
+              : RingInPlace::canWrite(*handle) ? InPlace::ring
+                                               : InPlace::no;
+  }
+
+  /// The handle is given away: plain operations can do what this does not know.
+  void share() noexcept
+  {
+    if (handle != nullptr && block != nullptr && !isShared)
+    {
+      block->clearGaps(handle->streamBytes);
+    }
+    isShared = true;
+    settle();
   }
 
   /// Groups that are open in the stream.
@@ -212,6 +243,25 @@ struct WriterState
     return layout::addChecked(bytes, around) ? block->reserve(handle, handle->streamBytes, bytes) : TAV_RC_NO_MEMORY;
   }
 
+  /// Appends a data element in place; kNotHere where that is not possible.
+  [[gnu::always_inline]] uint32_t put(TAVHeaderData& node, uint16_t type, uint16_t elm, const NodeOptions& options,
+                                      const uint8_t* bytes, uint64_t size) noexcept
+  {
+    const layout::HeaderFields fields{size, infoOf(options), type, elm};
+    if ((fields.info & TAV_INFO_EYE_SIZE) != 0) [[unlikely]]
+    {
+      return core::kNotHere;
+    }
+    layout::setHeader(fields, true, node.header);
+    node.pDataBuf = const_cast<uint8_t*>(bytes); // only read
+    TAVHandle& used = *handle;
+    if (inPlace == InPlace::block) [[likely]]
+    {
+      return core::appendElement<true>(BlockInPlace(used), used, node, fields);
+    }
+    return core::appendElement<true>(RingInPlace(used), used, node, fields);
+  }
+
   /// Appends a data element to the group of the fast way.
   [[gnu::always_inline]] uint32_t appendFast(TAVHeaderData& node, uint16_t type, uint16_t elm,
                                              const NodeOptions& options, const uint8_t* bytes,
@@ -279,7 +329,7 @@ struct WriterState
     }
     if (rc == TAV_RC_OK && block != nullptr && handle->streamBytes < end)
     {
-      block->clear(handle->streamBytes, end);
+      block->takeBack(handle->streamBytes, end);
     }
     return rc;
   }

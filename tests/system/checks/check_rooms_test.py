@@ -20,9 +20,12 @@ class CheckRooms(unittest.TestCase):
             ("api/writer.cpp", '#include "storage/circularBuf.h"'),
             ("api/writer.cpp", '#include "trace/traceFrame.h"'),
             ("api/writer.cpp", '#include "core/append.h"'),
-            ("core/bytes.h", '#include "storage/cachedRun.h"'),
             ("trace/trace.cpp", '#include "kor/lock.h"'),
             ("trace/trace.cpp", '#include "tav/kor.h"'),
+            ("core/word.h", '#include "storage/cachedRun.h"'),
+            ("core/bytes.h", '#include "tav/core/bytes.hpp"'),
+            ("storage/cachedRun.h", '#include "tav/core/cachedRun.hpp"'),
+            ("include/tav/cpp/node.hpp", '#include "tav/core/step.hpp"'),
             ("storage/file.cpp", '#include "format/layout.h"'),
             ("dictionary/lookup.cpp", '#include "dictionary/dictionary.h"'),
             ("tools/main.cpp", '#include "tav/tav.h"'),
@@ -58,6 +61,9 @@ class CheckRooms(unittest.TestCase):
             ("core/step.h", '#include "api/rawWrite.h"'),
             ("core/step.h", '#include "dictionary/dictionary.h"'),
             ("storage/file.cpp", '#include "core/bytes.h"'),
+            ("storage/file.cpp", '#include "tav/core/bytes.hpp"'),
+            ("format/eyeSearch.cpp", '#include "tav/core/step.hpp"'),
+            ("include/tav/core/step.hpp", '#include "core/word.h"'),
             ("storage/file.cpp", '#include "api/reader.h"'),
             ("storage/file.cpp", '#include "dictionary/dictionary.h"'),
             ("dictionary/lookup.cpp", '#include "storage/circularBuf.h"'),
@@ -80,6 +86,7 @@ class CheckRooms(unittest.TestCase):
             with self.subTest(line=line):
                 self.assertEqual(len(findings("include/tav/layout.hpp", line)), 1)
                 self.assertEqual(len(findings("core/step.h", line)), 1)
+                self.assertEqual(len(findings("include/tav/core/step.hpp", line)), 1)
                 self.assertEqual(findings("core/word.h", line), [])
         self.assertEqual(findings("tools/host/host.cpp", "volatile std::sig_atomic_t held = 0;"), [])
 

@@ -30,14 +30,15 @@ LEAST = 0.95
 
 GROUPS = {
     "reader": [
-        "api/readNode.cpp", "api/stepForward.cpp", "core/node.h", "core/step.h", "api/fetchBytes.cpp",
-        "api/fetchBytes.h", "api/findElement.cpp", "api/findLogicalGroup.cpp", "api/findNodeFromIndex.cpp",
+        "api/readNode.cpp", "api/stepForward.cpp", "include/tav/core/node.hpp", "include/tav/core/step.hpp",
+        "core/step.h", "api/fetchBytes.cpp", "api/fetchBytes.h", "api/findElement.cpp", "api/findLogicalGroup.cpp",
+        "api/findNodeFromIndex.cpp",
         "api/stepBack.cpp", "api/findEyeCatcher.cpp", "api/uncalledOperations.cpp", "api/validateSubtree.cpp",
         "api/walkGuard.h",
     ],
     "ring": [
         "storage/circularBuf.cpp", "storage/circularFill.cpp", "storage/circularRelease.cpp", "storage/cachedRun.cpp",
-        "storage/cachedRun.h",
+        "include/tav/core/cachedRun.hpp",
     ],
     "writer": [
         "api/addNode.cpp", "api/addStream.cpp", "api/addString.cpp", "api/rawWrite.cpp", "api/rawWrite.h",

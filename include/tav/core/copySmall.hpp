@@ -1,3 +1,4 @@
+/// @file copySmall.hpp
 /// Copying of payloads, which are mostly as long as one value.
 #pragma once
 
@@ -6,7 +7,7 @@
 #include <cstdint>
 #include <cstring>
 
-namespace tav::inside
+namespace tav::core
 {
 
 /// The leading and the last bytes of a run of `Size` to 2 * `Size` bytes, which overlap in the middle.
@@ -57,4 +58,4 @@ inline constexpr uint64_t kLongestSmall = 32;
   }
 }
 
-} // namespace tav::inside
+} // namespace tav::core

@@ -1,11 +1,12 @@
-/// What the steps know of a node and of the level that it is on.
+/// @file node.hpp
+/// What the steps know of a node and of the level that it stands on.
 #pragma once
 
 #include <cstddef>
 #include <cstdint>
 
-#include "core/word.h"
-#include "format/layout.h"
+#include "tav/core/words.hpp"
+#include "tav/layout.hpp"
 #include "tav/tav.h"
 
 namespace tav::core
@@ -70,6 +71,23 @@ struct NodeIn
     return swap ? kor::byteswap16(word) : word;
   }
   static constexpr bool wide() { return Wide; }
+};
+
+/// The same with its place, in host order.
+template<bool Wide>
+struct NodeFound : NodeIn<Wide>
+{
+  uint64_t place;
+
+  [[nodiscard]] uint64_t offset() const { return place; }
+  [[nodiscard]] uint32_t info() const
+  {
+    return Wide ? load<uint32_t>(this->header + offsetof(TAVHeader64, info)) : 0;
+  }
+  [[nodiscard]] uint16_t elm() const
+  {
+    return load<uint16_t>(this->header + (Wide ? offsetof(TAVHeader64, elm) : offsetof(TAVHeader32, elm)));
+  }
 };
 
 template<class AnyNode>
