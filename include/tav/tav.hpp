@@ -9,6 +9,7 @@
 #else
 
 #include "tav/cpp/error.hpp"
+#include "tav/cpp/index.hpp"
 #include "tav/cpp/reader.hpp"
 #include "tav/cpp/recorder.hpp"
 #include "tav/cpp/updater.hpp"
