@@ -287,6 +287,69 @@ void preadCalls(benchmark::State& state)
   }
 }
 
+/// An own page filled where it stands, without a call: the floor of a ring whose steps are in the caller's code. Each
+/// page is read before it is written, as a ring has to.
+void pwriteInPlace(benchmark::State& state)
+{
+  std::vector<char> page(kPageBytes);
+  perFile(state, [&](int fd) {
+    uint64_t number = 0;
+    for (size_t at = 0; at < kFileBytes; at += kPageBytes)
+    {
+      uint64_t words[kPieceWords] = {};
+      const auto offset = static_cast<off_t>(at);
+      bool works = ::pread(fd, page.data(), kPageBytes, offset) >= 0;
+      char* to = page.data();
+      for (uint64_t i = 0; i < kPagePieces; ++i)
+      {
+        words[0] = number++;
+        to = floor0::add(to, 1000, floor0::kString, words, kPieceData);
+      }
+      works &= ::pwrite(fd, page.data(), kPageBytes, offset) >= 0;
+      if (!works)
+      {
+        std::abort();
+      }
+    }
+    return number;
+  });
+}
+
+/// The same walked.
+void preadInPlace(benchmark::State& state)
+{
+  const int made = ::open(path().c_str(), O_RDWR);
+  writeByCalls(made);
+  ::close(made);
+  std::vector<char> page(kPageBytes);
+  uint64_t wrong = 0;
+  perFile(state, [&](int fd) {
+    uint64_t sum = 0;
+    for (size_t at = 0; at < kFileBytes; at += kPageBytes)
+    {
+      if (::pread(fd, page.data(), kPageBytes, static_cast<off_t>(at)) < 0)
+      {
+        std::abort();
+      }
+      const char* const end = page.data() + kPagePieces * kPieceBytes;
+      for (const char* node = page.data(); node < end;)
+      {
+        floor0::Header header;
+        std::memcpy(&header, node, sizeof header);
+        node += sizeof header;
+        sum += sumWords(node, header.size);
+        node += header.size;
+      }
+    }
+    wrong += sum != kPiecesSum;
+    return sum;
+  });
+  if (wrong != 0)
+  {
+    state.SkipWithError("what was written reads back otherwise");
+  }
+}
+
 void stdioRead(benchmark::State& state, size_t buffer, bool unlocked)
 {
   path();
@@ -385,6 +448,7 @@ BENCHMARK_CAPTURE(preadPages, c, 256 * kKiB)->Name("W7read/pread_256KiB")->UseRe
 BENCHMARK_CAPTURE(preadPages, d, kPageBytes)->Name("W7read/pread_1MiB")->UseRealTime();
 BENCHMARK_CAPTURE(preadPages, e, 4 * kPageBytes)->Name("W7read/pread_4MiB")->UseRealTime();
 BENCHMARK(preadPieces)->Name("W7read/pread_1MiB_40B_pieces")->UseRealTime();
+BENCHMARK(preadInPlace)->Name("W7read/pread_1MiB_40B_in_place")->UseRealTime();
 BENCHMARK(preadCalls)->Name("W7read/pread_1MiB_40B_floor_api")->UseRealTime();
 BENCHMARK_CAPTURE(stdioRead, a, 0, false)->Name("W7read/fread_40B_default_buffer")->UseRealTime();
 BENCHMARK_CAPTURE(stdioRead, b, kPageBytes, false)->Name("W7read/fread_40B_1MiB_buffer")->UseRealTime();
@@ -399,6 +463,7 @@ BENCHMARK_CAPTURE(pwritePages, c, 256 * kKiB)->Name("W7write/pwrite_256KiB")->Us
 BENCHMARK_CAPTURE(pwritePages, d, kPageBytes)->Name("W7write/pwrite_1MiB")->UseRealTime();
 BENCHMARK_CAPTURE(pwritePages, e, 4 * kPageBytes)->Name("W7write/pwrite_4MiB")->UseRealTime();
 BENCHMARK(pwritePieces)->Name("W7write/pwrite_1MiB_40B_pieces")->UseRealTime();
+BENCHMARK(pwriteInPlace)->Name("W7write/pread_pwrite_1MiB_40B_in_place")->UseRealTime();
 BENCHMARK(pwriteCalls)->Name("W7write/pwrite_1MiB_40B_floor_api_tuned")->UseRealTime();
 BENCHMARK(preadPwritePages)->Name("W7write/pread_pwrite_1MiB")->UseRealTime();
 BENCHMARK_CAPTURE(stdioWrite, a, 0, false)->Name("W7write/fwrite_40B_default_buffer")->UseRealTime();

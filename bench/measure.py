@@ -24,14 +24,15 @@ import compiling
 SMALL = "^(W[1-5](dom|mem|file)?|call)/([^_]|_[^t]|_t[^r])*$"
 TRACED = "_traced$"  # in a process of their own: one that has traced looks twice from then on
 # Which entries run interleaved with one another, how often, and for how many seconds each time at the least.
-GROUPS = [(SMALL, 15, 0.02), (TRACED, 5, 0.02), ("^W6", 7, 0.02), ("^W[125]cold/", 5, 0.01), ("^W7", 5, 0.01)]
+GROUPS = [(SMALL, 15, 0.02), (TRACED, 5, 0.02), ("^W6", 7, 0.02), ("^W[125]cold/", 5, 0.01), ("^W7", 5, 0.01), ("^W9", 5, 0.01)]
 QUICK_GROUPS = [(SMALL, 3, 0.001), (TRACED, 1, 0.001), ("^W6cache/", 3, 0.001)]
 
 INSTRUCTIONS = [
     "W1/floor", "W1/tavAddElement", "W1/tavAddElement_kept_descriptor", "W1/tavAddElement_zeroed_descriptor",
-    "W1/tavAddElement_initialized_descriptor", "W1/layer", "W2/floor", "W2/tavGetNextChild", "W2/layer_children",
-    "W2/layer_descendants", "W3/floor", "W3/tavFindElmInt", "W3/tavFindElmInt_own_stack", "W3/layer_path",
-    "W4file/tavPrintSubtree_xml", "W5/floor", "W5/tavValidateHierarchy", "ring/tavAddElement", "ring/tavGetNextChild",
+    "W1/tavAddElement_initialized_descriptor", "W1/layer", "W1/layer_growing", "W2/floor", "W2/tavGetNextChild", "W2/layer_children",
+    "W2/layer_descendants", "W3/floor", "W3/tavFindElmInt", "W3/tavFindElmInt_own_stack", "W3/layer_path", "index/made",
+    "W4file/tavPrintSubtree_xml", "W5/floor", "W5/tavValidateHierarchy", "ring/tavAddElement", "ring/tavGetNextChild", "ring/layer_add",
+    "ring/layer_children",
 ]
 GROWING = ["W1/tavAddElement", "W2/tavGetNextChild", "W4file/tavPrintSubtree_xml", "W5/tavValidateHierarchy"]
 DOUBLINGS = 6

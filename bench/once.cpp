@@ -5,6 +5,7 @@
 #include <cstdlib>
 #include <functional>
 #include <map>
+#include <optional>
 #include <span>
 #include <string>
 #include <vector>
@@ -110,6 +111,11 @@ const std::map<std::string, std::function<bool(Streams&)>> kParts = {
      [](Streams& s) {
        return library::encodeLayer(model(), std::as_writable_bytes(std::span(s.block))) == s.encoded.size();
      }},
+    {"W1/layer_growing",
+     [](Streams& s) {
+       std::optional<tav::Writer> writer;
+       return library::encodeLayerGrowing(model(), writer).size() == s.encoded.size();
+     }},
     {"W2/floor", [](Streams& s) { return s.isSum(floor0::walk(s.encoded.data(), s.end())); }},
     {"W2/tavGetNextChild",
      [](Streams& s) { return s.isSum(library::walkPlain(s.encoded.data(), s.encoded.size())); }},
@@ -122,12 +128,29 @@ const std::map<std::string, std::function<bool(Streams&)>> kParts = {
     {"W3/tavFindElmInt", [](Streams& s) { return findPlain(s, false); }},
     {"W3/tavFindElmInt_own_stack", [](Streams& s) { return findPlain(s, true); }},
     {"W3/layer_path", [paths = library::layerPaths()](Streams& s) { return findLayer(s, paths); }},
+    {"index/made", [](Streams& s) {
+       const tav::Reader reader(std::as_bytes(std::span(s.encoded)));
+       return tav::Index(reader.root()).size() == kLeaves + kGroups - 1;
+     }},
+    {"index/made_and_W3", [paths = library::layerPaths()](Streams& s) {
+       const tav::Reader reader(std::as_bytes(std::span(s.encoded)));
+       const tav::Index index(reader.root());
+       return findAll([&](const Path& path) {
+         return library::findIndexed(index, paths[static_cast<size_t>(&path - randomPaths().data())]);
+       });
+     }},
     {"W4file/tavPrintSubtree_xml", printXml},
     {"W5/floor", [](Streams& s) { return floor0::validate(s.encoded.data(), s.end()) != 0; }},
-    {"W5/tavValidateHierarchy",
-     [](Streams& s) { return library::validatePlain(s.encoded.data(), s.encoded.size()); }},
+    {"W5/tavValidateHierarchy", [](Streams& s) { return library::validatePlain(s.encoded.data(), s.encoded.size()); }},
     {"ring/tavAddElement", addThroughRing},
     {"ring/tavGetNextChild", stepThroughRing},
+    {"ring/layer_add", [](Streams& s) {
+       tav::Writer writer(s.buffered);
+       return library::addThroughRing(writer, kLeaves);
+     }},
+    {"ring/layer_children", [](Streams& s) {
+       return library::stepThroughRing(tav::Reader(s.buffered)) == kLeaves * (kLeaves - 1) / 2;
+     }},
 };
 
 bool run(const std::string& argument)

@@ -54,19 +54,23 @@ WORKS = [
     Work("W4mem", "the whole tree as text, into memory", "floor_to_chars_xml"),
     Work("W6cache", "scan for the eye catcher, 512 KiB", "both_avx2", (), "GB/s", 512 << 10),
     Work("W7new", "write a new file of 1 GiB", "pwrite_1MiB", (), "GB/s", GIB),
+    Work("W9write_1MB", "write 48,000 leaves as users do first", "layer_block"),
+    Work("W9write_25MB", "write 960,000 leaves as users do first", "layer_block"),
+    Work("W9read_1MB", "read 48,000 leaves as users do first", "layer_memory"),
+    Work("W9read_25MB", "read 960,000 leaves as users do first", "layer_memory"),
     Work("call", "a single call", "", (), "ns"),
 ]
 LIBRARY = ("tav", "layer", "open_close_", "header_stack_")
 FLOORS = ("floor", "both_", "read_bandwidth", "memcpy", "pread_", "pwrite_", "mmap")
 # Entries that show something beside the goal's own work.
-BESIDE = ("_traced", "tavPrintSubtree_text")
+BESIDE = ("_traced", "tavPrintSubtree_text", "layer_index_made")
 
 
 def kind(entry):
     """Whether an entry is the library's, a floor, or a peer."""
     if entry.startswith(LIBRARY):
         return "library"
-    own_page = "_40B_" in entry and "_floor_api" not in entry
+    own_page = "_40B_" in entry and not entry.endswith(("_floor_api", "_floor_api_tuned", "_in_place"))
     return "floor" if entry.startswith(FLOORS) and not own_page else "peer"
 
 

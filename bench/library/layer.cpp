@@ -3,6 +3,7 @@
 #include <span>
 #include <string>
 #include <string_view>
+#include <utility>
 
 #include "bench/harness.hpp"
 #include "bench/library/layer.hpp"
@@ -27,6 +28,24 @@ void addLeaf(tav::Group& group, const Model& model, const Leaf& leaf)
     break;
   }
   default: group.add(leaf.id, std::string_view(model.bytes(leaf), leaf.size));
+  }
+}
+
+void addHost(tav::Group& root, const Model& model)
+{
+  tav::Group host = root.group(kHostId);
+  for (unsigned k = 0; k < kDatabases; ++k)
+  {
+    tav::Group database = host.group(static_cast<uint16_t>(kDatabaseId + k));
+    for (unsigned j = 0; j < kApplications; ++j)
+    {
+      tav::Group application = database.group(static_cast<uint16_t>(kApplicationId + j));
+      const Leaf* leaf = model.application(k, j);
+      for (unsigned m = 0; m < kMetrics; ++m, ++leaf)
+      {
+        addLeaf(application, model, *leaf);
+      }
+    }
   }
 }
 
@@ -72,6 +91,22 @@ void encode(benchmark::State& state)
 }
 BENCHMARK(encode)->Name("W1/layer");
 
+/// Into the writer's own buffer, which grows: what most programs write first.
+void encodeGrowing(benchmark::State& state)
+{
+  std::optional<tav::Writer> writer;
+  std::span<const std::byte> written;
+  perTree(state, [&] {
+    written = library::encodeLayerGrowing(model(), writer);
+    return written.size() == kStreamBytes ? kStreamBytes : 0;
+  });
+  if (fingerprint(reinterpret_cast<const char*>(written.data()), written.size()) != kStreamFingerprint)
+  {
+    state.SkipWithError("not the stream of the workload");
+  }
+}
+BENCHMARK(encodeGrowing)->Name("W1/layer_growing");
+
 void walkChildren(benchmark::State& state)
 {
   perWalk(state, encoded().size(), [] { return library::walkLayerChildren(encoded()); });
@@ -83,6 +118,28 @@ void walkDescendants(benchmark::State& state)
   perWalk(state, encoded().size(), [] { return library::walkLayerDescendants(encoded()); });
 }
 BENCHMARK(walkDescendants)->Name("W2/layer_descendants");
+
+/// An index made before: for a program that looks up many paths in a stream that stays.
+void findIndexed(benchmark::State& state)
+{
+  const tav::Reader reader(encoded());
+  const tav::Index index(reader.root());
+  const std::vector<tav::Path> paths = library::layerPaths();
+  perPath(state, [&](const Path& path) { return library::findIndexed(index, paths[indexOf(path)]); });
+}
+BENCHMARK(findIndexed)->Name("W3/layer_index");
+
+/// Making one, an item for each node.
+void makeIndex(benchmark::State& state)
+{
+  const tav::Reader reader(encoded());
+  perTree(state, [&] {
+    const tav::Index index(reader.root());
+    state.counters["bytes_a_node"] = static_cast<double>(index.memory()) / static_cast<double>(index.size());
+    return index.size();
+  });
+}
+BENCHMARK(makeIndex)->Name("W2/layer_index_made");
 
 std::string pathText(const Path& path)
 {
@@ -142,28 +199,30 @@ BENCHMARK(validate)->Name("W5/layer_validate");
 namespace library
 {
 
-size_t encodeLayer(const Model& model, std::span<std::byte> block)
+void writeTree(tav::Writer& writer, const Model& model, size_t hosts)
 {
-  tav::Writer writer(block);
   {
     tav::Group root = writer.group(kRootId);
-    tav::Group host = root.group(kHostId);
-    for (unsigned k = 0; k < kDatabases; ++k)
+    for (size_t i = 0; i < hosts; ++i)
     {
-      tav::Group database = host.group(static_cast<uint16_t>(kDatabaseId + k));
-      for (unsigned j = 0; j < kApplications; ++j)
-      {
-        tav::Group application = database.group(static_cast<uint16_t>(kApplicationId + j));
-        const Leaf* leaf = model.application(k, j);
-        for (unsigned m = 0; m < kMetrics; ++m, ++leaf)
-        {
-          addLeaf(application, model, *leaf);
-        }
-      }
+      addHost(root, model);
     }
   }
   writer.finish();
+}
+
+size_t encodeLayer(const Model& model, std::span<std::byte> block)
+{
+  tav::Writer writer(block);
+  writeTree(writer, model);
   return writer.size();
+}
+
+std::span<const std::byte> encodeLayerGrowing(const Model& model, std::optional<tav::Writer>& writer)
+{
+  writer.emplace();
+  writeTree(*writer, model);
+  return std::as_const(*writer).bytes();
 }
 
 uint64_t walkLayerChildren(std::span<const std::byte> stream)
@@ -174,7 +233,11 @@ uint64_t walkLayerChildren(std::span<const std::byte> stream)
 
 uint64_t walkLayerDescendants(std::span<const std::byte> stream)
 {
-  const tav::Reader reader(stream);
+  return sumLayer(tav::Reader(stream));
+}
+
+uint64_t sumLayer(const tav::Reader& reader)
+{
   uint64_t sum = 0;
   for (const tav::Node& node : reader.root().descendants())
   {
@@ -191,6 +254,12 @@ std::vector<tav::Path> layerPaths()
     paths.emplace_back(pathText(path));
   }
   return paths;
+}
+
+uint64_t findIndexed(const tav::Index& index, const tav::Path& path)
+{
+  const std::optional<tav::Node> found = index.find(path);
+  return found ? valueOf(*found) : 0;
 }
 
 uint64_t findLayer(const tav::Reader& reader, const tav::Path& path)

@@ -4,6 +4,7 @@
 
 #include "bench/file.hpp"
 #include "bench/library/plain.hpp"
+#include "bench/library/ringSteps.hpp"
 
 namespace
 {
@@ -94,6 +95,45 @@ uint64_t read()
   return sum;
 }
 
+/// The same with the C++ layer.
+bool writeLayer()
+{
+  tav::Writer writer(path(), {.overwrite = true, .inPlace = true, .lock = false});
+  uint64_t words[kPayloadBytes / sizeof(uint64_t)] = {};
+  tav::Group root = writer.group(1000);
+  for (uint64_t i = 0; i < kElements; ++i)
+  {
+    words[0] = i;
+    root.add(1000, std::as_bytes(std::span(words)));
+  }
+  root.close();
+  writer.finish();
+  return true;
+}
+
+bool writeLayerOver()
+{
+  KORFileOpenParam open;
+  open.pPath = path().c_str();
+  open.options = KOR_FILE_UPDATE;
+  uint32_t rc = TAV_RC_OK;
+  TAVSSFile storage(&open, &rc);
+  tav::Writer writer(storage);
+  return library::addThroughRing(writer, kElements) && rc == TAV_RC_OK;
+}
+
+uint64_t readLayer()
+{
+  const tav::Reader reader(path());
+  uint64_t sum = 0;
+  for (const tav::Node& node : reader.root().children())
+  {
+    const tav::PayloadView payload = node.payload();
+    sum += sumWords(reinterpret_cast<const char*>(payload.data()), payload.size());
+  }
+  return sum;
+}
+
 template<class Pass>
 void perFile(benchmark::State& state, Pass&& pass)
 {
@@ -119,6 +159,36 @@ void writeOver(benchmark::State& state)
   }
 }
 BENCHMARK(writeOver)->Name("W7write/tavAddElement")->UseRealTime();
+
+void writeLayerOver(benchmark::State& state)
+{
+  path();
+  perFile(state, [] { return writeLayerOver(); });
+  if (readLayer() != kSum)
+  {
+    state.SkipWithError("what was written reads back otherwise");
+  }
+}
+BENCHMARK(writeLayerOver)->Name("W7write/layer")->UseRealTime();
+
+void writeLayerNew(benchmark::State& state)
+{
+  path();
+  perFile(state, [] { return writeLayer(); });
+}
+BENCHMARK(writeLayerNew)->Name("W7new/layer")->UseRealTime();
+
+void readLayer(benchmark::State& state)
+{
+  path();
+  if (!writeLayerOver())
+  {
+    state.SkipWithError("the stream could not be written");
+    return;
+  }
+  perFile(state, [] { return readLayer() == kSum; });
+}
+BENCHMARK(readLayer)->Name("W7read/layer")->UseRealTime();
 
 /// A file that grows: the system adds pages to its cache meanwhile.
 void writeNew(benchmark::State& state)

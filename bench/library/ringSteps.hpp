@@ -4,9 +4,10 @@
 #include <algorithm>
 #include <cstdint>
 #include <cstring>
+#include <span>
 #include <vector>
 
-#include "tav/tav.h"
+#include "tav/tav.hpp"
 
 namespace library
 {
@@ -133,6 +134,32 @@ inline uint64_t stepThroughRing(TAVHandle* handle)
     previous = &node.header;
     uint64_t word = 0;
     std::memcpy(&word, node.pDataBuf, sizeof word);
+    sum += word;
+  }
+  return sum;
+}
+
+/// The same by the C++ layer.
+inline bool addThroughRing(tav::Writer& writer, uint64_t elements)
+{
+  uint64_t words[kRingPayload / sizeof(uint64_t)] = {};
+  tav::Group root = writer.group(1000);
+  for (uint64_t i = 0; i < elements; ++i)
+  {
+    words[0] = i;
+    root.add(1000, std::as_bytes(std::span(words)));
+  }
+  root.close();
+  return true;
+}
+
+inline uint64_t stepThroughRing(const tav::Reader& reader)
+{
+  uint64_t sum = 0;
+  for (const tav::Node& node : reader.root().children())
+  {
+    uint64_t word = 0;
+    std::memcpy(&word, node.payload().data(), sizeof word);
     sum += word;
   }
   return sum;

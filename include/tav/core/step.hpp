@@ -216,9 +216,9 @@ struct RingLevel
 };
 
 /// The fast way from a node to its sibling on such a level, when that is a data element and ends no group: all else is
-/// not here. `spot` is where it starts, as `behind` tells, and becomes the place behind it: who keeps that in a register
-/// waits for no descriptor in memory. `node` is the node before, with a header of the same form, and becomes the
-/// sibling.
+/// not here. `spot` is where it starts, as `behind` tells, and becomes the place behind it: who keeps that in a
+/// register waits for no descriptor in memory. `node` is the node before, with a header of the same form, and becomes
+/// the sibling.
 template<class AnyLevel>
 [[gnu::always_inline]] inline bool nextElement(const AnyLevel& level, typename AnyLevel::Spot& spot,
                                                TAVHeaderData& node)
