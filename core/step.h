@@ -1,4 +1,4 @@
-/// The steps that the library alone takes: walks with the node in registers, and reading a node by its offset.
+/// The step that the library alone takes: walks with the node in registers.
 #pragma once
 
 #include <cstdint>
@@ -27,15 +27,6 @@ template<bool Wide, class Bytes>
     node = {place.offset, decodeFields(place.header, Wide, bytes.form.swap), Wide};
   }
   return rc;
-}
-
-/// The fast way of reading the node at an offset.
-template<bool Wide, class Bytes>
-[[gnu::always_inline]] inline uint32_t readNode(const Bytes& bytes, TAVHandle& handle, uint64_t offset,
-                                                TAVHeaderData& out)
-{
-  Place place = bytes.nowhere();
-  return findNode<Wide>(bytes, offset, place) ? handOut<Wide>(bytes, handle, place, out) : kNotHere;
 }
 
 } // namespace tav::core

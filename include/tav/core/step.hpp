@@ -140,6 +140,15 @@ template<bool Wide, bool First, class Bytes>
   return rc == TAV_RC_OK ? handOut<Wide>(bytes, handle, place, out) : rc;
 }
 
+/// The fast way of reading the node at an offset.
+template<bool Wide, class Bytes>
+[[gnu::always_inline]] inline uint32_t readNode(const Bytes& bytes, TAVHandle& handle, uint64_t offset,
+                                                TAVHeaderData& out)
+{
+  Place place = bytes.nowhere();
+  return findNode<Wide>(bytes, offset, place) ? handOut<Wide>(bytes, handle, place, out) : kNotHere;
+}
+
 /// Where the sibling of a node starts, for nextElement; past every level where only a step by the node itself tells.
 template<class AnyNode>
 [[gnu::always_inline]] inline uint64_t behind(const AnyNode& node)

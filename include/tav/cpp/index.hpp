@@ -529,8 +529,15 @@ private:
   uint32_t read(const Entry& entry, TAVHeaderData& data) const noexcept
   {
     detail::ReaderState& state = *start_.state_;
+    TAVHandle& handle = *state.handle;
     ++state.fetches;
-    const uint32_t rc = tavReadNodeInt(0, state.handle, entry.offset, entry.isWide, &data);
+    const bool isInPlace = state.inPlace == detail::InPlace::block && entry.isWide && core::hasNeverTraced();
+    uint32_t rc = isInPlace ? core::readNode<true>(detail::BlockInPlace(handle), handle, entry.offset, data)
+                            : core::kNotHere;
+    if (rc == core::kNotHere) [[unlikely]]
+    {
+      rc = tavReadNodeInt(0, &handle, entry.offset, entry.isWide, &data);
+    }
     return rc == TAV_RC_OK && layout::elmOf(data.header) != entry.elm ? TAV_RC_OUTSIDE_PARENT : rc;
   }
 

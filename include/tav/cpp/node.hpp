@@ -432,19 +432,29 @@ private:
   static constexpr bool kHasFastWay =
       StreamInteger<T> || std::same_as<T, TAVTimeStamp> || std::same_as<T, std::string_view>;
 
-  /// Whether a value can be taken as it is.
+  /// Whether the payload is still where a ring in this machine's order had it.
+  [[nodiscard]] bool isFresh() const noexcept
+  {
+    return state_ != nullptr && state_->inPlace == detail::InPlace::ring && fetch_ == state_->fetches;
+  }
+
+  /// Whether a value can be taken as it stands.
   template<class T>
   [[gnu::always_inline]] bool isFast() const noexcept
+  {
+    return isFast<T>(isFast_);
+  }
+  template<class T>
+  [[gnu::always_inline]] bool isFast(bool isReady) const noexcept
   {
     const TAVHeader64& header = data_.header.hdr64;
     if constexpr (std::same_as<T, std::string_view>)
     {
-      return layout::is64(data_.header) && header.type == TAV_TYPE_ASCII_STRING && isFast_;
+      return layout::is64(data_.header) && header.type == TAV_TYPE_ASCII_STRING && isReady;
     }
     else
     {
-      return layout::is64(data_.header) && header.type == detail::fixedType<T>() && header.size == sizeof(T) &&
-             isFast_;
+      return layout::is64(data_.header) && header.type == detail::fixedType<T>() && header.size == sizeof(T) && isReady;
     }
   }
   template<class T>
@@ -465,6 +475,13 @@ private:
   template<class T>
   [[gnu::noinline]] T readWhole() const
   {
+    if constexpr (kHasFastWay<T>)
+    {
+      if (isFast<T>(isFresh()))
+      {
+        return readFast<T>();
+      }
+    }
     T value{};
     const uint32_t rc = read(value);
     detail::demand(rc, "reading", [&] { return detail::tellReading<T>(rc, *this, isGroup()); });
