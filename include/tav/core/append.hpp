@@ -14,7 +14,7 @@
 namespace tav::core
 {
 
-/// Whether a payload stands apart from the place that its node is encoded to.
+/// Whether a payload is apart from the place that its node is encoded to.
 inline bool isApart(const uint8_t* payload, uint64_t size, const uint8_t* to, uint64_t length)
 {
   const auto from = reinterpret_cast<uintptr_t>(payload);
@@ -35,7 +35,7 @@ inline void encodePayload(uint16_t type, bool swap, const uint8_t* payload, uint
   copySmall(to + prefix, payload + prefix, size - prefix);
 }
 
-/// Ends an append: the node stands where the write offset was. The payload was read before, as it may be one of these
+/// Ends an append: the node is where the write offset was. The payload was read before, as it may be one of these
 /// numbers.
 [[gnu::always_inline]] inline void moveBehind(TAVHandle& handle, TAVHeaderData& node, uint64_t position,
                                               uint64_t length)

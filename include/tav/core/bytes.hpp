@@ -69,7 +69,7 @@ inline constexpr uint64_t kFarSize = ~uint64_t{0} / 4;
   return size > position;
 }
 
-/// A handle's direct block. Who walks keeps it in registers. `Step` is how steps over it are compiled.
+/// A handle's direct block. A walk keeps it in registers. `Step` is how steps over it are compiled.
 template<class Form, class Step>
 struct BlockOf
 {

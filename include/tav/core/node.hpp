@@ -1,5 +1,5 @@
 /// @file node.hpp
-/// What the steps know of a node and of the level that it stands on.
+/// What the steps know of a node and of the level that it is on.
 #pragma once
 
 #include <cstddef>

@@ -1,5 +1,5 @@
 /// @file step.hpp
-/// The step to a group's first child or to a node's sibling, and reading the node that stands there. The operations
+/// The step to a group's first child or to a node's sibling, and reading the node that is there. The operations
 /// find the place with their trace frame; their fast way finds it with one that has no records.
 #pragma once
 

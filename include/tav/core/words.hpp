@@ -59,7 +59,7 @@ public:
     }
   }
 
-  /// `Way::keepApart()` stands between the stores.
+  /// `Way::keepApart()` comes between the stores.
   template<class Way>
   [[gnu::always_inline]] void store(uint8_t* to) const
   {

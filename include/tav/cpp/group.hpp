@@ -404,7 +404,7 @@ private:
       state_->innermost = outer_;
       if (fast && outer_ != 0)
       {
-        state_->goTo(outer_); // a group of 64-bit headers stands in one
+        state_->goTo(outer_); // a group of 64-bit headers is in one
       }
       else
       {

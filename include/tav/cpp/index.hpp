@@ -26,7 +26,7 @@ namespace tav
 /// node as Node::path does.
 ///
 /// The reader must outlive it, and the stream must stay as it is: what was added since is not found. The header of what
-/// is found is read anew; where another id stands there by now, a look-up answers TAV_RC_OUTSIDE_PARENT. Look-ups read
+/// is found is read anew; where another id is there by now, a look-up answers TAV_RC_OUTSIDE_PARENT. Look-ups read
 /// through the reader: they are for one thread at a time, as it is.
 class Index
 {

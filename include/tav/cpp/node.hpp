@@ -438,7 +438,7 @@ private:
     return state_ != nullptr && state_->inPlace == detail::InPlace::ring && fetch_ == state_->fetches;
   }
 
-  /// Whether a value can be taken as it stands.
+  /// Whether a value can be taken as it is.
   template<class T>
   [[gnu::always_inline]] bool isFast() const noexcept
   {

@@ -23,7 +23,7 @@ namespace detail
 template<class Walk>
 inline constexpr bool stepsInPlace = std::is_same_v<Walk, ChildRange> || std::is_same_v<Walk, DescendantRange>;
 
-/// An iterator over a walk that lives in its range. `Walk` has `current()` and `advance()`, which tells whether there
+/// An iterator over a walk that lives in its range. `Walk` has `current()` and `advance()`, which reports whether there
 /// is a node; one that steps in place has its node as `current_`, too, and the place `end_` where its level ends. The
 /// iterator keeps what most steps need, where a loop has it in registers: these are taken without a call.
 template<class Walk>
