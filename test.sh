@@ -76,7 +76,7 @@ build_and_test()
 check_tidy()
 {
   cmake --preset clang -DTAV_BUILD_TESTS=OFF -DTAV_BUILD_TOOLS=OFF >"$work/configure.log" || { cat "$work/configure.log"; return 1; }
-  find kor trace format storage dictionary api inspect -name '*.cpp' ! -name '*Windows.cpp' -print0 |
+  find kor trace format storage dictionary api layer inspect -name '*.cpp' ! -name '*Windows.cpp' -print0 |
     xargs -0 -n 2 -P "$(nproc)" clang-tidy --quiet -p build/clang 2>"$work/tidy.log" || { cat "$work/tidy.log"; return 1; }
 }
 
@@ -86,7 +86,7 @@ check_static_analysis()
   cppcheck --enable=warning,performance,portability --inconclusive --std=c++20 --language=c++ --inline-suppr --quiet \
     --error-exitcode=1 -j "$(nproc)" -I include -I . -DTAV_VERSION='""' \
     --template='{file}:{line}: {severity}: {id}: {message}' \
-    kor trace format storage dictionary core api inspect include tools examples
+    kor trace format storage dictionary core api layer inspect include tools examples
 }
 
 # The description of the format for other languages, compiled, finds what the library finds.

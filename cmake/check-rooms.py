@@ -3,7 +3,7 @@
 
     check-rooms.py [ROOT]
 
-Includes point one way: tools -> inspect -> api -> core -> storage, dictionary -> format -> trace -> kor. The system, its
+Includes point one way: tools -> inspect -> layer -> api -> core -> storage, dictionary -> format -> trace -> kor. The system, its
 headers and the byte order are kor's business, which has a file a platform: names that end in Posix or Windows. What the
 program alone asks of the system is in tools/host, by the same rule. No other source asks for the platform, tests and
 examples included. What keeps a compiler from its work stands in one file. The inspection library names no option of the
@@ -28,6 +28,7 @@ ROOMS = {
     "dictionary": {"dictionary", "format", "trace", "kor"},
     "core": {"core", "storage", "format", "trace", "kor"},
     "api": {"api", "core", "storage", "dictionary", "format", "trace", "kor"},
+    "layer": {"layer"},
     "inspect": {"inspect"},
     "tools": {"tools"},
     "include": set(),

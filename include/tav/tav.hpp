@@ -1,5 +1,5 @@
 /// @file tav.hpp
-/// The C++ layer of libtav, header only: writers and readers that own what they use, groups that close themselves,
+/// The C++ layer of libtav: writers and readers that own what they use, groups that close themselves,
 /// values by their C++ type, ranges, paths, and errors as std::error_code. Every operation comes in a form that throws
 /// std::system_error and in one with a std::error_code at the end, which throws nothing but what an allocation throws.
 #pragma once

@@ -8,6 +8,7 @@
 #include "tav/inspect/phrases.hpp"
 #include "tav/inspect/problem.hpp"
 #include "tav/inspect/similar.hpp"
+#include "tav/path/names.hpp"
 
 namespace tav::inspect
 {

@@ -24,11 +24,11 @@ class ChildRange;
 class DescendantRange;
 class FindRange;
 class Path;
-class Index;
 class RootRange;
 namespace detail
 {
 class Printer;
+class NodeIndex;
 struct NodeTree;
 template<class Walk>
 class WalkIterator;
@@ -311,10 +311,10 @@ private:
   friend class ChildRange;
   friend class DescendantRange;
   friend class RootRange;
-  friend class Index;
   template<class Walk>
   friend class detail::WalkIterator;
   friend class detail::Printer;
+  friend class detail::NodeIndex;
   friend struct detail::NodeTree;
 
   /// A node of no known group.

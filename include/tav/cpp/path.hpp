@@ -2,22 +2,49 @@
 /// Finding nodes by paths, as tav/path/path.hpp describes them. Always ends.
 #pragma once
 
-#include <cstddef>
 #include <cstdint>
 #include <iterator>
 #include <optional>
+#include <string>
 #include <string_view>
 #include <system_error>
 #include <utility>
 #include <vector>
 
-#include "tav/cpp/pathTree.hpp"
+#include "tav/cpp/owner.hpp"
 #include "tav/cpp/ranges.hpp"
-#include "tav/path/matcher.hpp"
 #include "tav/path/path.hpp"
 
 namespace tav
 {
+
+namespace detail
+{
+
+/// A walk over the nodes that a path leads to; the library has one.
+class PathSearch
+{
+public:
+  PathSearch() = default;
+  PathSearch(const PathSearch&) = delete;
+  PathSearch& operator=(const PathSearch&) = delete;
+  virtual ~PathSearch() = default;
+
+  /// To the first node, or to the next one. At the end, and after a failure, false.
+  virtual bool advance(Node& found) = 0;
+  [[nodiscard]] virtual uint32_t failure() const noexcept = 0;
+};
+
+/// From a node, or from the place above the roots.
+TAV_API PathSearch* searchPath(ReaderState& state, const paths::Compiled& path, const Node* from);
+
+/// The first match of a path of plain names, where the first match of every step leads there; else false, which says
+/// nothing. Over memory the library looks through a level without handing out what it passes.
+TAV_API bool findStraight(const paths::Compiled& path, const Node& start, Node& found) noexcept;
+/// The same from the stream's first node, whose name comes first.
+TAV_API bool findStraightFromRoot(const paths::Compiled& path, const Node& root, Node& found) noexcept;
+
+} // namespace detail
 
 /// The nodes that a path leads to, in stream order, each once. A single pass; the range holds the place of the walk, so
 /// an iterator must not outlive it.
@@ -33,13 +60,12 @@ public:
     {
       return {};
     }
-    if (!search_->begun)
+    if (!begun_)
     {
-      search_->begun = true;
-      search_->found = search_->start() || search_->advance();
-      settle();
+      begun_ = true;
+      advance();
     }
-    return detail::WalkIterator<FindRange>(search_->found ? this : nullptr);
+    return detail::WalkIterator<FindRange>(found_ ? this : nullptr);
   }
   static std::default_sentinel_t end() noexcept
   {
@@ -51,111 +77,35 @@ private:
   friend class Reader;
   friend class detail::WalkIterator<FindRange>;
 
-  using Tree = detail::NodeTree;
-  using Place = Tree::Place;
-
-  /// Stays where it is: its parts know each other.
-  struct Search
-  {
-    Search(detail::ReaderState& state, Path given)
-        : path(std::move(given)), tree(state), matcher(tree, path.compiled())
-    {
-    }
-
-    /// Gives the walk's top; whether the path leads there.
-    bool start()
-    {
-      const bool matches = matcher.give(top, 0);
-      current = top.node;
-      if (matcher.reachesBelow())
-      {
-        walk.emplace(tree, top);
-      }
-      return matches && !tree.hasFailed();
-    }
-    bool advance()
-    {
-      while (walk && !tree.hasFailed() && walk->next())
-      {
-        const bool matches = matcher.give(walk->place(), walk->depth());
-        if (!matcher.reachesBelow())
-        {
-          walk->skip();
-        }
-        if (matches && !tree.hasFailed())
-        {
-          current = walk->place().node;
-          return true;
-        }
-      }
-      return false;
-    }
-
-    Path path;
-    Tree tree;
-    detail::paths::Matcher<Tree> matcher;
-    Place top{};
-    std::optional<Tree::Walk> walk{};
-    Node current{};
-    bool begun = false;
-    bool found = false;
-  };
-
   /// Of nothing.
   FindRange() = default;
-  /// From the place above the roots.
-  FindRange(detail::ReaderState& state, const Path& path, std::error_code* ec)
-      : search_(new Search(state, path)), ec_(ec)
+  /// `from` null: from the place above the roots.
+  FindRange(detail::ReaderState& state, const Node* from, const Path& path, std::error_code* ec)
+      : search_(detail::searchPath(state, path.compiled(), from)), text_(path.text()), ec_(ec)
   {
-    search_->matcher.begin();
-  }
-
-  /// From a node. Where the path can lead out of what is below it, the walk begins above the roots.
-  FindRange(detail::ReaderState& state, const Node& node, const Path& path, std::error_code* ec)
-      : search_(new Search(state, path)), ec_(ec)
-  {
-    Search& search = *search_;
-    std::vector<Place> line{Place{node, false}};
-    if (path.compiled().leavesStart)
-    {
-      line = search.tree.lineTo(node, isAbsolute(path.compiled()));
-    }
-    search.top = line.front();
-    search.matcher.begin(line);
   }
 
   [[nodiscard]] const Node& current() const noexcept
   {
-    return search_->current;
+    return current_;
   }
   bool advance()
   {
-    search_->found = search_->advance();
-    settle();
-    return search_->found;
-  }
-  void settle()
-  {
-    if (!search_->found)
+    found_ = search_->advance(current_);
+    if (!found_)
     {
-      const uint32_t rc = search_->tree.failure();
-      ec_ != nullptr ? detail::report(rc, *ec_)
-                     : detail::demand(rc, "searching", [this] { return search_->path.text(); });
+      const uint32_t rc = search_->failure();
+      ec_ != nullptr ? detail::report(rc, *ec_) : detail::demand(rc, "searching", [this] { return text_; });
     }
+    return found_;
   }
 
-  static bool isAbsolute(const detail::paths::Compiled& path) noexcept
-  {
-    bool isOne = false;
-    for (const uint32_t index : path.main)
-    {
-      isOne = isOne || path.routes[index].absolute;
-    }
-    return isOne;
-  }
-
-  detail::Owner<Search> search_;
+  detail::Owner<detail::PathSearch> search_;
+  std::string text_; ///< of the path
   std::error_code* ec_ = nullptr;
+  Node current_{};
+  bool begun_ = false;
+  bool found_ = false;
 };
 
 namespace detail
@@ -183,13 +133,13 @@ inline std::optional<Node> firstOf(FindRange&& range)
 
 inline FindRange Node::find(const Path& path) const
 {
-  return state_ == nullptr ? FindRange() : FindRange(*state_, *this, path, nullptr);
+  return state_ == nullptr ? FindRange() : FindRange(*state_, this, path, nullptr);
 }
 
 inline FindRange Node::find(const Path& path, std::error_code& ec) const
 {
   ec.clear();
-  return state_ == nullptr ? FindRange() : FindRange(*state_, *this, path, &ec);
+  return state_ == nullptr ? FindRange() : FindRange(*state_, this, path, &ec);
 }
 
 inline FindRange Node::find(std::string_view path) const
@@ -226,7 +176,8 @@ inline std::vector<Node> Node::all(std::string_view path) const
 
 inline std::optional<Node> Node::path(const Path& path, std::error_code& ec) const
 {
-  if (std::optional<Node> found = detail::NodeTree::findStraight(path, *this))
+  Node found;
+  if (detail::findStraight(path.compiled(), *this, found))
   {
     ec.clear();
     return found;
@@ -236,7 +187,8 @@ inline std::optional<Node> Node::path(const Path& path, std::error_code& ec) con
 
 inline std::optional<Node> Node::path(const Path& path) const
 {
-  if (std::optional<Node> found = detail::NodeTree::findStraight(path, *this))
+  Node found;
+  if (detail::findStraight(path.compiled(), *this, found))
   {
     return found;
   }

@@ -187,12 +187,12 @@ public:
   [[nodiscard]] FindRange find(const Path& path) const&
   {
     detail::demand(use() == nullptr ? TAV_RC_BAD_PARAM : TAV_RC_OK, "searching", [&path] { return path.text(); });
-    return {*state_, path, nullptr};
+    return {*state_, nullptr, path, nullptr};
   }
   [[nodiscard]] FindRange find(const Path& path, std::error_code& ec) const&
   {
     detail::report(use() == nullptr ? TAV_RC_BAD_PARAM : TAV_RC_OK, ec);
-    return ec ? FindRange() : FindRange(*state_, path, &ec);
+    return ec ? FindRange() : FindRange(*state_, nullptr, path, &ec);
   }
   FindRange find(std::string_view path) const&& = delete;
   FindRange find(std::string_view path, std::error_code& ec) const&& = delete;
@@ -340,19 +340,14 @@ private:
     return rc == TAV_RC_NOT_FOUND ? TAV_RC_OK : rc;
   }
 
-  /// As NodeTree::findStraight, from the stream's first node on.
+  /// As detail::findStraight, from the stream's first node on.
   [[nodiscard]] std::optional<Node> findStraight(const Path& path) const noexcept
   {
-    const detail::paths::Compiled& compiled = path.compiled();
     Node root;
-    if (!compiled.isStraight || state_ == nullptr || !state_->isFast || readRoot(root) != TAV_RC_OK)
-    {
-      return std::nullopt;
-    }
-    const std::span<const detail::paths::Step> steps = compiled.routes[compiled.main.front()].steps;
-    return steps.size() > 1 && steps.front().matches(root.elm())
-               ? detail::NodeTree::findStraight(steps.subspan(1), root)
-               : std::nullopt;
+    Node found;
+    const bool isFound = state_ != nullptr && state_->isFast && readRoot(root) == TAV_RC_OK &&
+                         detail::findStraightFromRoot(path.compiled(), root, found);
+    return isFound ? std::optional(found) : std::nullopt;
   }
 
   uint32_t printNode(FILE* stream, const Node& node, const PrintOptions& options, uint64_t& characters) const noexcept
@@ -365,11 +360,10 @@ private:
     try
     {
       Node start;
-      detail::Printer printer(stream, options, state_->isSwapped());
-      const uint32_t read = readAt(node.offset(), node.width(), start);
-      const uint32_t rc = read == TAV_RC_OK ? printer.print(start) : read;
-      characters = printer.count();
-      return rc;
+      const uint32_t rc = readAt(node.offset(), node.width(), start);
+      return rc == TAV_RC_OK ? detail::printNode(stream != nullptr ? stream : stdout, options, start,
+                                                 state_->isSwapped(), characters)
+                             : rc;
     }
     catch (const std::bad_alloc&)
     {

@@ -22,17 +22,98 @@
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 #include <string>
 #include <string_view>
 #include <system_error>
 #include <utility>
 
 #include "tav/cpp/error.hpp"
-#include "tav/path/compiled.hpp"
-#include "tav/path/parser.hpp"
+#include "tav/tav.h"
 
 namespace tav
 {
+
+/// Why a text is no path.
+struct PathFault
+{
+  enum class Kind : uint8_t
+  {
+    none,
+    malformed,  ///< it cannot be read as a path
+    unknownName ///< it can, but has a name that no element has
+  };
+  Kind kind = Kind::none;
+  size_t column = 0;      ///< in characters, from 1
+  std::string sentence{}; ///< starts with a lower-case letter, no full stop
+  std::string nearest{};  ///< the tag that may have been meant; empty: none is near
+};
+
+namespace detail::paths
+{
+
+struct Compiled;
+
+/// Takes what is wrong with a path. The library gives out no class of the standard library: the program's may be
+/// another one.
+struct FaultTaker
+{
+  struct Text
+  {
+    const char* begin;
+    size_t length;
+  };
+  PathFault& fault;
+  void (*take)(PathFault& fault, uint32_t kind, size_t column, Text sentence, Text nearest);
+};
+
+/// Reads a path; one that cannot be read leads nowhere. It never changes, and lasts until as many have released it as
+/// have it from here and have retained it.
+TAV_API const Compiled* readPath(const char* text, size_t length, const FaultTaker& taker);
+TAV_API void retainPath(const Compiled& path) noexcept;
+TAV_API void releasePath(const Compiled& path) noexcept;
+TAV_API bool leadsNowhere(const Compiled& path) noexcept;
+
+/// A path that was read, and what all copies of it share.
+class SharedPath
+{
+public:
+  SharedPath(std::string_view text, PathFault& fault)
+      : path_(readPath(text.data(), text.size(), FaultTaker{fault, take}))
+  {
+  }
+  SharedPath(const SharedPath& other) noexcept
+      : path_(other.path_)
+  {
+    retainPath(*path_);
+  }
+  SharedPath& operator=(const SharedPath& other) noexcept
+  {
+    retainPath(*other.path_);
+    releasePath(*std::exchange(path_, other.path_));
+    return *this;
+  }
+  ~SharedPath()
+  {
+    releasePath(*path_);
+  }
+
+  const Compiled& operator*() const noexcept
+  {
+    return *path_;
+  }
+
+private:
+  static void take(PathFault& fault, uint32_t kind, size_t column, FaultTaker::Text sentence, FaultTaker::Text nearest)
+  {
+    fault = {static_cast<PathFault::Kind>(kind), column, std::string(sentence.begin, sentence.length),
+             std::string(nearest.begin, nearest.length)};
+  }
+
+  const Compiled* path_;
+};
+
+} // namespace detail::paths
 
 /// A path, read once and usable for any number of searches, by any number of threads at a time.
 class Path
@@ -45,24 +126,18 @@ public:
   {
   }
   Path(std::string_view text, std::error_code& ec)
+      : Path(text, PathFault{}, ec)
   {
-    PathFault fault;
-    read(text, fault);
-    detail::report(codeOf(fault), ec);
   }
   /// The same with all that is known of a failure.
   Path(std::string_view text, PathFault& fault)
+      : text_(text), compiled_(text, fault = {})
   {
-    read(text, fault);
   }
   /// The same as the first; `doing` begins the message.
   Path(std::string_view text, const char* doing)
+      : Path(text, PathFault{}, doing)
   {
-    PathFault fault;
-    read(text, fault);
-    detail::demand(codeOf(fault), doing, [&] {
-      return detail::Told{std::string(text), "column " + std::to_string(fault.column) + ": " + fault.sentence};
-    });
   }
 
   [[nodiscard]] const std::string& text() const noexcept
@@ -73,30 +148,36 @@ public:
   /// Whether it leads to nothing: after a failure.
   [[nodiscard]] bool empty() const noexcept
   {
-    return compiled_.main.empty();
+    return detail::paths::leadsNowhere(*compiled_);
   }
 
   /// What the matcher works with; of the library's own use.
   [[nodiscard]] const detail::paths::Compiled& compiled() const noexcept
   {
-    return compiled_;
+    return *compiled_;
   }
 
 private:
+  Path(std::string_view text, PathFault&& fault, std::error_code& ec)
+      : Path(text, fault)
+  {
+    detail::report(codeOf(fault), ec);
+  }
+  Path(std::string_view text, PathFault&& fault, const char* doing)
+      : Path(text, fault)
+  {
+    detail::demand(codeOf(fault), doing, [&] {
+      return detail::Told{text_, "column " + std::to_string(fault.column) + ": " + fault.sentence};
+    });
+  }
+
   static uint32_t codeOf(const PathFault& fault) noexcept
   {
     return fault.kind == PathFault::Kind::none ? TAV_RC_OK : TAV_RC_BAD_PARAM;
   }
 
-  void read(std::string_view text, PathFault& fault)
-  {
-    fault = {};
-    text_ = text;
-    detail::paths::Parser(text_, compiled_, fault).parse();
-  }
-
   std::string text_;
-  detail::paths::Compiled compiled_;
+  detail::paths::SharedPath compiled_;
 };
 
 } // namespace tav

@@ -19,6 +19,8 @@ class CheckRooms(unittest.TestCase):
         for name, line in [
             ("api/writer.cpp", '#include "storage/circularBuf.h"'),
             ("api/writer.cpp", '#include "trace/traceFrame.h"'),
+            ("layer/path.cpp", '#include "layer/pathParser.h"'),
+            ("layer/path.cpp", '#include "tav/path/path.hpp"'),
             ("api/writer.cpp", '#include "core/append.h"'),
             ("trace/trace.cpp", '#include "kor/lock.h"'),
             ("trace/trace.cpp", '#include "tav/kor.h"'),
@@ -65,6 +67,8 @@ class CheckRooms(unittest.TestCase):
             ("format/eyeSearch.cpp", '#include "tav/core/step.hpp"'),
             ("include/tav/core/step.hpp", '#include "core/word.h"'),
             ("storage/file.cpp", '#include "api/reader.h"'),
+            ("layer/path.cpp", '#include "api/readNode.h"'),
+            ("inspect/path/search.cpp", '#include "layer/pathTree.h"'),
             ("storage/file.cpp", '#include "dictionary/dictionary.h"'),
             ("dictionary/lookup.cpp", '#include "storage/circularBuf.h"'),
             ("tools/main.cpp", '#include "api/reader.h"'),

@@ -34,8 +34,8 @@ fi
 # sources are not compiled here. For the compiler every call can throw, which makes a branch of it.
 gcovr --root . -j "$(nproc)" --json "$work/coverage.json" \
   --filter 'api/' --filter 'core/' --filter 'format/' --filter 'storage/' --filter 'dictionary/' --filter 'trace/' \
-  --filter 'kor/' \
+  --filter 'kor/' --filter 'layer/' \
   --filter 'include/' \
   --exclude-throw-branches --exclude-unreachable-branches \
-  "$folder"/{api,format,storage,dictionary,trace,kor} "$folder"/tests/CMakeFiles/{core,cpp}_tests.dir
+  "$folder"/{api,layer,format,storage,dictionary,trace,kor} "$folder"/tests/CMakeFiles/{core,cpp}_tests.dir
 tests/system/reach/coverage.py "$work/coverage.json" docs/coverage.md

@@ -1,4 +1,4 @@
-/// @file scanner.hpp
+/// @file pathScanner.h
 /// The characters of a path, one token after the other, and what is wrong with them.
 #pragma once
 
@@ -9,26 +9,9 @@
 #include <utility>
 
 #include "tav/path/decimal.hpp"
+#include "tav/path/path.hpp"
 
-namespace tav
-{
-
-/// Why a text is no path.
-struct PathFault
-{
-  enum class Kind : uint8_t
-  {
-    none,
-    malformed,  ///< it cannot be read as a path
-    unknownName ///< it can, but has a name that no element has
-  };
-  Kind kind = Kind::none;
-  size_t column = 0;      ///< in characters, from 1
-  std::string sentence{}; ///< starts with a lower-case letter, no full stop
-  std::string nearest{};  ///< the tag that may have been meant; empty: none is near
-};
-
-namespace detail::paths
+namespace tav::detail::paths
 {
 
 class Scanner
@@ -139,6 +122,4 @@ protected:
   size_t at_ = 0;
 };
 
-} // namespace detail::paths
-
-} // namespace tav
+} // namespace tav::detail::paths

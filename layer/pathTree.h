@@ -1,4 +1,4 @@
-/// @file pathTree.hpp
+/// @file pathTree.h
 /// The nodes of a reader as the matcher of paths wants them.
 #pragma once
 
@@ -16,7 +16,7 @@
 
 #include "tav/cpp/ranges.hpp"
 #include "tav/path/compare.hpp"
-#include "tav/path/path.hpp"
+#include "tav/path/compiled.hpp"
 #include "tav/path/valueText.hpp"
 
 namespace tav::detail
@@ -226,14 +226,12 @@ struct NodeTree
     return line;
   }
 
-  /// The first match of a straight path's steps, when the first match of every step leads there; else nothing, which
-  /// says nothing. Over memory the library looks through a level without handing out what it passes.
-  static std::optional<Node> findStraight(std::span<const paths::Step> steps, const Node& start) noexcept
+  /// The first match of the steps of a path of plain names; see detail::findStraight.
+  static bool findStraight(std::span<const paths::Step> steps, const Node& start, Node& found) noexcept
   {
-    std::optional<Node> found;
     if (start.state_ == nullptr || !start.state_->isFast)
     {
-      return found;
+      return false;
     }
     TAVHeaderData nodes[2];
     nodes[0].header = start.data_.header;
@@ -245,20 +243,12 @@ struct NodeTree
       if (!layout::isGroup(parent.header) || tavFindElmInt(start.state_->handle, &parent.header, 0, 0, 0, step.only,
                                                            nullptr, nullptr, &nodes[current]) != TAV_RC_OK)
       {
-        return found;
+        return false;
       }
     }
     found = Node(*start.state_, nodes[current]);
-    found->parent_ = nodes[current ^ 1U].header;
-    return found;
-  }
-  /// The same for a path from a node.
-  static std::optional<Node> findStraight(const Path& path, const Node& start) noexcept
-  {
-    const paths::Compiled& compiled = path.compiled();
-    return compiled.isStraight && !compiled.leavesStart
-               ? findStraight(std::span(compiled.routes[compiled.main.front()].steps), start)
-               : std::nullopt;
+    found.parent_ = nodes[current ^ 1U].header;
+    return true;
   }
 
 private:

@@ -1,0 +1,60 @@
+// Paths that were read, each for as long as anybody has it.
+#include "tav/path/path.hpp"
+
+#include <atomic>
+#include <memory>
+#include <string_view>
+
+#include "layer/pathParser.h"
+#include "tav/path/compiled.hpp"
+
+namespace tav::detail::paths
+{
+
+namespace
+{
+
+struct Counted : Compiled
+{
+  mutable std::atomic<size_t> owners = 1;
+};
+
+const Counted& countedOf(const Compiled& path) noexcept
+{
+  return static_cast<const Counted&>(path);
+}
+
+} // namespace
+
+const Compiled* readPath(const char* text, size_t length, const FaultTaker& taker)
+{
+  auto path = std::make_unique<Counted>();
+  PathFault fault;
+  Parser(std::string_view(text, length), *path, fault).parse();
+  if (fault.kind != PathFault::Kind::none)
+  {
+    taker.take(taker.fault, static_cast<uint32_t>(fault.kind), fault.column,
+               {fault.sentence.data(), fault.sentence.size()}, {fault.nearest.data(), fault.nearest.size()});
+  }
+  return path.release();
+}
+
+void retainPath(const Compiled& path) noexcept
+{
+  countedOf(path).owners.fetch_add(1, std::memory_order_relaxed);
+}
+
+void releasePath(const Compiled& path) noexcept
+{
+  if (countedOf(path).owners.fetch_sub(1, std::memory_order_acq_rel) == 1)
+  {
+    delete &countedOf(path);
+  }
+}
+
+bool leadsNowhere(const Compiled& path) noexcept
+{
+  return path.main.empty();
+}
+
+} // namespace tav::detail::paths
