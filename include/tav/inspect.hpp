@@ -24,6 +24,7 @@
 #include "tav/inspect/patchFile.hpp"
 #include "tav/inspect/path.hpp"
 #include "tav/inspect/phrases.hpp"
+#include "tav/inspect/plan.hpp"
 #include "tav/inspect/problem.hpp"
 #include "tav/inspect/recover.hpp"
 #include "tav/inspect/rules.hpp"

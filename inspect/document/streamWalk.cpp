@@ -27,6 +27,14 @@ StreamWalk::StreamWalk(ByteSource& source, const Form& form, DamageWatch::Sink t
   begin(form, start);
 }
 
+StreamWalk::StreamWalk(ByteSource& source, const Form& form, DamageWatch::Sink told, const Walker::State& state,
+                       uint64_t streamOffset, bool everyForm, uint64_t budget)
+    : source_(source), told_(std::move(told)), start_(streamOffset), everyForm_(everyForm), budget_(budget)
+{
+  watch_.emplace(source_, form, told_);
+  walker_.emplace(Walker::from(source_, form, state, budget));
+}
+
 void StreamWalk::begin(const Form& form, const WalkStart& start)
 {
   start_ = start.offset;
@@ -49,14 +57,15 @@ bool StreamWalk::next(Event& event)
 
 bool StreamWalk::goOnInOtherForm(const Event& event)
 {
-  if (event.what != What::damaged || event.depth != 0 || event.offset <= start_)
+  if (!everyForm_ || event.what != What::damaged || event.depth != 0 || event.offset <= start_)
   {
     return false;
   }
   const auto other = otherStreamAt(source_, walker_->form(), event.offset);
   if (other)
   {
-    begin(ownForm(source_, *other, event.offset), {.offset = event.offset, .wide = other->root64});
+    begin(ownForm(source_, *other, event.offset),
+          {.offset = event.offset, .wide = other->root64, .budget = budget_});
   }
   return other.has_value();
 }

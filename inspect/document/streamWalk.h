@@ -16,13 +16,21 @@ class StreamWalk
 {
 public:
   StreamWalk(ByteSource& source, const Form& form, DamageWatch::Sink told, const WalkStart& start = {});
+  /// A walk that goes on where another one stands, whose walk in this form began at `streamOffset`. `everyForm` false:
+  /// streams in other forms are damage. Damage is told of in the groups around the place, too.
+  StreamWalk(ByteSource& source, const Form& form, DamageWatch::Sink told, const Walker::State& state,
+             uint64_t streamOffset, bool everyForm, uint64_t budget = kNoBudget);
 
   bool next(Event& event);
   bool skip() { return walker_->skip(); }
+  /// Takes in a group around the place where it began.
+  void see(const Event& event) { watch_->see(*walker_, event); }
 
   const Walker& walker() const { return *walker_; }
   /// Of the stream that the last event belongs to.
   const Form& form() const { return walker_->form(); }
+  /// Where the walk in this form began.
+  uint64_t streamOffset() const { return start_; }
 
 private:
   void begin(const Form& form, const WalkStart& start);
@@ -31,6 +39,8 @@ private:
   ByteSource& source_;
   DamageWatch::Sink told_;
   uint64_t start_ = 0;
+  bool everyForm_ = true;
+  uint64_t budget_ = kNoBudget;
   std::optional<Walker> walker_{};
   std::optional<DamageWatch> watch_{};
 };

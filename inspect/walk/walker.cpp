@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <utility>
 
+#include "inspect/walk/mostCounts.h"
 #include "inspect/walk/prober.h"
 #include "tav/inspect/path.hpp"
 #include "tav/inspect/phrases.hpp"
@@ -11,13 +12,6 @@ namespace tav::inspect
 {
 
 using namespace tav::layout;
-
-namespace
-{
-
-constexpr size_t kMaxCounts = 256; ///< different ids among siblings that are counted; others are named by offset
-
-} // namespace
 
 uint64_t missingPadding(const Event& ended, const Form& form)
 {
@@ -431,6 +425,7 @@ void Walker::afterEndElement(const Node& node)
   const bool itsOwn = !marker && prober_->pairEnds(node.payloadOffset(), top.limit, top.node.header);
   // Behind damaged bytes an end element can be that of a group whose header was among them.
   const bool doubtful = !itsOwn && !marker && top.lastDamage != 0;
+  leans_ = leans_ || (!itsOwn && !marker && !doubtful && frames_.size() <= inherited_);
   // Nodes up to the very end of the group are in it, although readers stop before them.
   const bool more = top.open || position_ == top.limit || prober_->isChain(position_, top.wide, top.limit, true);
   if (top.open ? !doubtful : itsOwn && !more)
@@ -462,6 +457,7 @@ void Walker::endGroup(End end)
   event.depth = event.node.depth;
   counts_.resize(frames_.back().counts);
   frames_.pop_back();
+  inherited_ = std::min(inherited_, frames_.size());
 }
 
 uint64_t Walker::countChild(uint16_t elm)
@@ -474,7 +470,7 @@ uint64_t Walker::countChild(uint16_t elm)
       return ++counts_[i].count;
     }
   }
-  if (counts_.size() - top.counts == kMaxCounts)
+  if (counts_.size() - top.counts == kMostCounts)
   {
     return 0;
   }

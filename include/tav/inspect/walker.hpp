@@ -94,12 +94,16 @@ class Walker
 {
 public:
   struct Mark;
+  struct State;
 
   /// `source` outlives the walk.
   TAV_INSPECT_API Walker(ByteSource& source, const Form& form, WalkStart start = {});
   /// A walk of its own through the group that a walk has marked: its pieces up to its nodeEnd, the same as there. It
   /// knows no more than the node's parent, so that its paths are none.
   TAV_INSPECT_API static Walker through(ByteSource& source, const Form& form, const Mark& mark);
+  /// A walk that goes on where another one stands, or is believed to.
+  TAV_INSPECT_API static Walker from(ByteSource& source, const Form& form, const State& state,
+                                     uint64_t budget = kNoBudget);
   TAV_INSPECT_API ~Walker();
   TAV_INSPECT_API Walker(Walker&&) noexcept;
 
@@ -118,6 +122,28 @@ public:
 
   /// Directly after the nodeBegin of a group: what is needed to walk through it once more, at any time.
   TAV_INSPECT_API Mark mark() const;
+
+  /// Whether all before `place()` was handed out, all groups that end there are ended, and a node may begin there.
+  bool isBetween() const
+  {
+    return queueHead_ == queueCount_ && !endPending_ && (frames_.size() == 1 || position_ < frames_.back().limit);
+  }
+  uint64_t place() const { return position_; }
+  /// Groups around it; of the file and each of them, by depth: where it begins (kNoOffset: the file), where it ends at
+  /// the latest, and whether its children have 64-bit headers.
+  size_t depth() const { return frames_.size() - 1; }
+  uint64_t groupAt(size_t level) const { return level == 0 ? kNoOffset : frames_[level].node.offset(); }
+  uint64_t limitAt(size_t level) const { return frames_[level].limit; }
+  bool wideAt(size_t level) const { return frames_[level].wide; }
+  /// Whether the bytes directly before it are damaged.
+  bool isAfterDamage() const { return afterDamage_; }
+  /// While `isBetween`: all that the rest of the walk depends on but the bytes.
+  TAV_INSPECT_API State state() const;
+  /// Of a walk that goes on where another one stands: whether it asked if there was damage before it in a group around
+  /// its first place.
+  bool leansOnDamage() const { return leans_; }
+  /// And how many of the file and the groups around that place it is still in.
+  size_t inherited() const { return inherited_; }
 
   const Form& form() const { return form_; }
   ByteSource& source() const { return source_; }
@@ -177,6 +203,8 @@ private:
   bool endPending_ = false; ///< the group on top was ended by its end element
   bool done_ = false;
   bool canSkip_ = false;
+  bool leans_ = false;
+  size_t inherited_ = 0;
   std::array<Event, 8> queue_{};
   size_t queueHead_ = 0;
   size_t queueCount_ = 0;
@@ -191,6 +219,22 @@ struct Walker::Mark
   uint64_t depth = 0;
   uint64_t position = 0;
   uint64_t budget = 0;
+};
+
+/// Where a walk stands between two nodes.
+struct Walker::State
+{
+  std::vector<Frame> frames{}; ///< of the file and the groups around the place
+  std::vector<Count> counts{};
+  uint64_t above = 0;
+  uint64_t position = 0;
+  bool afterDamage = false;
+
+  /// Makes this state, of a walk that began at `before` without knowing what was counted in the `shared` first frames,
+  /// one of the whole walk. False where counts are not known: there were too many ids among siblings.
+  TAV_INSPECT_API bool join(const State& before, size_t shared);
+  /// Forgets what was counted and lost before the place.
+  TAV_INSPECT_API void forget();
 };
 
 } // namespace tav::inspect

@@ -1,0 +1,45 @@
+#include "tav/inspect/plan.hpp"
+
+#include <algorithm>
+
+#include "inspect/plan/planner.h"
+
+namespace tav::inspect
+{
+
+namespace
+{
+
+constexpr uint64_t kShortest = uint64_t{1} << 20U; ///< of the parts that are made where nobody says how long they are
+constexpr uint64_t kLongest = uint64_t{16} << 20U;
+constexpr uint64_t kParts = 64;                  ///< that a file of a middling size is cut into
+constexpr uint64_t kRing = uint64_t{256} * 1024; ///< a plan jumps: what was read is not needed any more
+
+std::vector<Part> cut(ByteSource& source, const Form& form, const PlanOptions& options, bool everyForm)
+{
+  const uint64_t size = source.size();
+  uint64_t target = options.targetBytes != 0 ? options.targetBytes : std::clamp(size / kParts, kShortest, kLongest);
+  if (options.maxParts != 0)
+  {
+    target = std::max(target, size / options.maxParts + 1);
+  }
+  const auto window = source.window(0, kRing);
+  return Planner(*window, form, everyForm).run(target);
+}
+
+} // namespace
+
+std::vector<Part> plan(ByteSource& source, const PlanOptions& options)
+{
+  const Recognition found = recognise(source, options.form);
+  PlanOptions own = options;
+  own.targetBytes = found.isStream ? own.targetBytes : ~uint64_t{0};
+  return cut(source, found.form, own, true);
+}
+
+std::vector<Part> plan(ByteSource& source, const Form& form, const PlanOptions& options)
+{
+  return cut(source, form, options, false);
+}
+
+} // namespace tav::inspect
