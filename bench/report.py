@@ -1,5 +1,5 @@
 #!/usr/bin/env python3
-"""Prints what measure.py found as tables, and puts them into the documents.
+"""Prints what measure.py and program.py found as tables, and puts them into the documents.
 
     report.py RESULT                       tables to standard output
     report.py RESULT --documents FOLDER    the same, and FOLDER/performance.{md,json,svg}
@@ -12,7 +12,8 @@ import json
 import pathlib
 from dataclasses import dataclass
 
-BEGIN, END = "<!-- figures: written by ./bench.sh -->", "<!-- end of the figures -->"
+FIGURES = "<!-- figures: written by ./bench.sh -->", "<!-- end of the figures -->"
+PROGRAM = "<!-- the program: written by ./bench.sh --program -->", "<!-- end of the program -->"
 
 
 @dataclass(frozen=True)
@@ -60,6 +61,9 @@ WORKS = [
     Work("W9read_25MB", "read 960,000 leaves as users do first", "layer_memory"),
     Work("call", "a single call", "", (), "ns"),
 ]
+# W8: the most that a command of the program may take, as a ratio to `print`.
+PROGRAM_GOALS = {"check": 0.35, "tree": 1.5, "json": 1.5, "json --lines": 2, "xml": 1.5, "hex": 4,
+                 "diff with itself": 1.5, "recover": 1, "json | build": 4}
 LIBRARY = ("tav", "layer", "open_close_", "header_stack_")
 FLOORS = ("floor", "both_", "read_bandwidth", "memcpy", "pread_", "pwrite_", "mmap")
 # Entries that show something beside the goal's own work.
@@ -203,22 +207,43 @@ def work_tables(result):
     return text
 
 
-def figures(result):
+def program_figures(program):
+    """W8, with ratios to `print`. A command without a goal has none."""
+    first = program["times"]["print"]["seconds"]
+    lines = []
+    for name, taken in program["times"].items():
+        ratio, must = taken["seconds"] / first, PROGRAM_GOALS.get(name)
+        count = program["instructions"].get(name)
+        lines.append([name if " of the " in name else f"`{name}`", f"{taken['seconds']:.3f}", f"{ratio:.2f}",
+                      f"{must:.2f}" if must else "", verdict(ratio, (must, 0)) if must else "",
+                      f"{taken['spread'] * 100:.1f} %", f"{count:,.0f}" if count is not None else "",
+                      mib(taken["peak"])])
+    size = program["bytes"]
+    about = (f"{program['leaves']:,} leaves, {mib(size['s'])}; as JSON {mib(size['json'])}, as XML {mib(size['xml'])}.")
+    left_out = [f"Left out: {name}, since {tool} is not here." for name, tool in program["missing"].items()]
+    return [*measured_on(program), *left_out, about, "",
+            *table(["command", "seconds", "ratio", "must", " goal", "spread", "instructions a leaf", "peak memory"], lines)]
+
+
+def measured_on(result):
     machine = result["machine"]
-    where = f"{machine['cpu']}, {machine['cores']} cores, {machine['compiler']}"
     note = ["", "A quick run: the times mean little."] if result["quick"] else []
-    return [f"Measured on: {where}.", *note, "", "### Goals", "", *goal_table(result), "", "### Beside the goals", "",
+    return [f"Measured on: {machine['cpu']}, {machine['cores']} cores, {machine['compiler']}.", *note]
+
+
+def figures(result):
+    return [*measured_on(result), "", "### Goals", "", *goal_table(result), "", "### Beside the goals", "",
             *other_table(result), "", "### Instructions a leaf (W3: a look-up)", "", *instruction_table(result),
             *work_tables(result)]
 
 
-def with_figures(document, text):
+def with_figures(document, marks, text):
     """The document with what is between the marks replaced."""
-    before, begin, rest = document.partition(BEGIN)
-    _, end, after = rest.partition(END)
+    before, begin, rest = document.partition(marks[0])
+    _, end, after = rest.partition(marks[1])
     if not begin or not end:
-        raise ValueError("the document has no place for the figures")
-    return f"{before}{BEGIN}\n\n{text}\n\n{END}{after}"
+        raise ValueError(f"the document has no place for {marks[0]}")
+    return f"{before}{begin}\n\n{text}\n\n{end}{after}"
 
 
 def main():
@@ -227,13 +252,18 @@ def main():
     parser.add_argument("--documents", type=pathlib.Path)
     arguments = parser.parse_args()
     result = json.loads(arguments.result.read_text())
-    text = "\n".join(figures(result))
-    print(text)
-    if arguments.documents:
+    parts = [(FIGURES, figures(result))] if "times" in result else []
+    parts += [(PROGRAM, program_figures(result["program"]))] if "program" in result else []
+    page, store = (arguments.documents / f"performance.{kind}" if arguments.documents else None for kind in ("md", "json"))
+    for marks, lines in parts:
+        text = "\n".join(lines)
+        print(text)
+        if page:
+            page.write_text(with_figures(page.read_text(), marks, text))
+    if store:
+        store.write_text(json.dumps({**json.loads(store.read_text()), **result}, indent=1) + "\n")
+    if page and "times" in result:
         import plot  # needs a package that the tables do not
-        page = arguments.documents / "performance.md"
-        page.write_text(with_figures(page.read_text(), text))
-        (arguments.documents / "performance.json").write_text(json.dumps(result, indent=1) + "\n")
         plot.draw([(work, rows(work, result["times"])) for work in WORKS if work.goal], BESIDE,
                   arguments.documents / "performance.svg")
 

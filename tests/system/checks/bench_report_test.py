@@ -77,15 +77,28 @@ class Tables(unittest.TestCase):
         self.assertAlmostEqual(report.steepest([100, 200, 440, 880]), 0.1)
 
 
+class Program(unittest.TestCase):
+    def test_relate_commands_to_print_and_judge_those_with_a_goal(self):
+        program = {"quick": False, "machine": {"cpu": "one", "cores": 2, "compiler": "g++"}, "leaves": 24000,
+                   "bytes": {"s": 1, "json": 2, "xml": 3}, "missing": {"jq of the JSON": "jq"}, "instructions": {},
+                   "times": {name: {"seconds": seconds, "spread": 0.0, "peak": 1 << 20} for name, seconds in
+                             {"print": 2.0, "tree": 2.9, "hex": 9.0, "info": 0.1}.items()}}
+        text = report.program_figures(program)
+        cells = {line.split(" | ")[0]: line.split(" | ")[2:5] for line in text if line.startswith("| `")}
+        self.assertEqual(cells, {"| `print`": ["1.00", "", ""], "| `tree`": ["1.45", "1.50", "must met"],
+                                 "| `hex`": ["4.50", "4.00", "missed"], "| `info`": ["0.05", "", ""]})
+        self.assertIn("Left out: jq of the JSON, since jq is not here.", text)
+
+
 class Documents(unittest.TestCase):
     def test_replace_what_is_between_the_marks(self):
-        page = f"before\n{report.BEGIN}\nold\n{report.END}\nafter\n"
-        self.assertEqual(report.with_figures(page, "new"),
-                         f"before\n{report.BEGIN}\n\nnew\n\n{report.END}\nafter\n")
+        begin, end = report.PROGRAM
+        page = f"before\n{begin}\nold\n{end}\nafter\n"
+        self.assertEqual(report.with_figures(page, report.PROGRAM, "new"), f"before\n{begin}\n\nnew\n\n{end}\nafter\n")
 
     def test_refuse_a_page_without_marks(self):
         with self.assertRaises(ValueError):
-            report.with_figures("no place", "new")
+            report.with_figures("no place", report.FIGURES, "new")
 
 
 if __name__ == "__main__":
