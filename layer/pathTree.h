@@ -15,6 +15,7 @@
 #include <vector>
 
 #include "tav/cpp/ranges.hpp"
+#include "tav/dictionary.hpp"
 #include "tav/path/compare.hpp"
 #include "tav/path/compiled.hpp"
 #include "tav/path/valueText.hpp"

@@ -8,6 +8,7 @@
 #include "tav/cpp/ranges.hpp"
 #include "tav/cpp/stack.hpp"
 #include "tav/cpp/valueText.hpp"
+#include "tav/dictionary.hpp"
 
 namespace tav::detail
 {

@@ -4,6 +4,7 @@
 
 #include "inspect/c/node.h"
 #include "tav/cpp/decode.hpp"
+#include "tav/dictionary.hpp"
 #include "tav/inspect/path.hpp"
 
 using namespace tav;

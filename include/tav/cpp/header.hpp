@@ -6,9 +6,9 @@
 #include <string>
 #include <string_view>
 
+#include "tav/cpp/chars.hpp"
 #include "tav/cpp/text.hpp"
 #include "tav/cpp/values.hpp"
-#include "tav/dictionary.hpp"
 
 namespace tav
 {
@@ -70,12 +70,12 @@ public:
   /// The element's enum name, empty for an unknown id.
   [[nodiscard]] std::string_view name() const noexcept
   {
-    return dictionary::nameOf(elm());
+    return detail::nameOf(elm());
   }
   /// The element's tag name, empty for an unknown id.
   [[nodiscard]] std::string_view tag() const noexcept
   {
-    return dictionary::tagOf(elm());
+    return detail::tagOf(elm());
   }
 
 protected:
@@ -95,7 +95,7 @@ namespace detail
 /// "hostName (60104)", or "element 7" for an unknown id: what messages call an element.
 inline std::string elementText(uint16_t elm)
 {
-  const std::string_view tag = dictionary::tagOf(elm);
+  const std::string_view tag = tagOf(elm);
   const std::string number = std::to_string(elm);
   return tag.empty() ? "element " + number : std::string(tag) + " (" + number + ')';
 }

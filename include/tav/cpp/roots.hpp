@@ -3,12 +3,10 @@
 #pragma once
 
 #include <cstdint>
-#include <cstring>
 #include <system_error>
-#include <utility>
 
+#include "tav/cpp/form.hpp"
 #include "tav/cpp/ranges.hpp"
-#include "tav/cpp/rootSearch.hpp"
 
 namespace tav
 {
@@ -16,59 +14,10 @@ namespace tav
 namespace detail
 {
 
-/// The bytes under a handle that reads, by offset.
-class HandleBytes
-{
-public:
-  explicit HandleBytes(TAVHandle& handle) noexcept
-      : handle_(handle)
-  {
-  }
-
-  /// Bytes that are at hand from an offset on: at least one, but at the end.
-  uint32_t view(uint64_t offset, const uint8_t*& bytes, uint64_t& length) noexcept
-  {
-    constexpr uint64_t piece = 4096;
-    length = 0;
-    if (handle_.pCircularBuf == nullptr)
-    {
-      length = offset < handle_.directDataSize ? handle_.directDataSize - offset : 0;
-      bytes = handle_.pDirectData + (length != 0 ? offset : 0);
-      return TAV_RC_OK;
-    }
-    TAVCBUserArea area{};
-    const uint32_t rc = handle_.pCircularBuf->getChunk(offset, piece, &area, false, false);
-    bytes = area.pChunk;
-    length = rc == TAV_RC_OK ? area.chunkLength : 0;
-    return isEnd(rc) ? TAV_RC_OK : rc;
-  }
-
-  /// Up to `length` bytes; fewer at the end alone.
-  uint32_t read(uint64_t offset, uint8_t* to, uint64_t length, uint64_t& got) noexcept
-  {
-    uint32_t rc = TAV_RC_OK;
-    uint64_t there = 1;
-    for (got = 0; rc == TAV_RC_OK && there != 0 && got < length; got += there)
-    {
-      const uint8_t* bytes = nullptr;
-      rc = view(offset + got, bytes, there);
-      there = lesser(there, length - got);
-      if (there != 0) // at the end the bytes are nowhere, which memcpy does not take
-      {
-        std::memcpy(to + got, bytes, static_cast<size_t>(there));
-      }
-    }
-    return rc;
-  }
-
-private:
-  static bool isEnd(uint32_t rc) noexcept
-  {
-    return rc == TAV_RC_END_OF_STORAGE || rc == TAV_RC_END_OF_DATA;
-  }
-
-  TAVHandle& handle_;
-};
+/// The root at an offset, or behind the zeros that are there, and where it ends. TAV_RC_NO_MORE_CHILDREN when nothing
+/// but zeros is left, TAV_RC_BAD_CHILD_HDR where something else than a root is.
+TAV_API uint32_t findRoot(TAVHandle& handle, const StreamForm& form, uint64_t from, uint64_t& root,
+                          uint64_t& end) noexcept;
 
 } // namespace detail
 
@@ -130,21 +79,20 @@ private:
     TAVHandle& handle = *state_->handle;
     ++state_->fetches;
     const detail::StreamForm form{state_->isSwapped(), (handle.options & TAV_OPT_ROOT32) == 0, handle.alignMode == 1};
-    detail::HandleBytes bytes(handle);
-    detail::RootSearch<detail::HandleBytes> search(bytes, form);
-    TAVHeader root;
-    uint32_t rc = search.next(next_, root);
+    uint64_t root = 0;
+    uint64_t end = 0;
+    uint32_t rc = detail::findRoot(handle, form, next_, root, end);
     if (rc != TAV_RC_OK)
     {
       return rc;
     }
     TAVHeaderData data{};
-    rc = tavReadNodeInt(0, &handle, root.nodeOffset, form.wide, &data);
+    rc = tavReadNodeInt(0, &handle, root, form.wide, &data);
     if (rc == TAV_RC_OK)
     {
       current_ = Node(*state_, data);
       current_.isRoot_ = true;
-      next_ = detail::endOfGroup(root);
+      next_ = end;
     }
     return rc;
   }

@@ -28,8 +28,8 @@
 #include <system_error>
 #include <utility>
 
+#include "tav/cpp/chars.hpp"
 #include "tav/cpp/error.hpp"
-#include "tav/tav.h"
 
 namespace tav
 {
@@ -54,17 +54,11 @@ namespace detail::paths
 
 struct Compiled;
 
-/// Takes what is wrong with a path. The library gives out no class of the standard library: the program's may be
-/// another one.
+/// Takes what is wrong with a path.
 struct FaultTaker
 {
-  struct Text
-  {
-    const char* begin;
-    size_t length;
-  };
   PathFault& fault;
-  void (*take)(PathFault& fault, uint32_t kind, size_t column, Text sentence, Text nearest);
+  void (*take)(PathFault& fault, uint32_t kind, size_t column, Chars sentence, Chars nearest);
 };
 
 /// Reads a path; one that cannot be read leads nowhere. It never changes, and lasts until as many have released it as
@@ -104,10 +98,10 @@ public:
   }
 
 private:
-  static void take(PathFault& fault, uint32_t kind, size_t column, FaultTaker::Text sentence, FaultTaker::Text nearest)
+  static void take(PathFault& fault, uint32_t kind, size_t column, Chars sentence, Chars nearest)
   {
-    fault = {static_cast<PathFault::Kind>(kind), column, std::string(sentence.begin, sentence.length),
-             std::string(nearest.begin, nearest.length)};
+    fault = {static_cast<PathFault::Kind>(kind), column, std::string(std::string_view(sentence)),
+             std::string(std::string_view(nearest))};
   }
 
   const Compiled* path_;

@@ -1,117 +1,18 @@
-/// @file rootSearch.hpp
+/// @file rootSearch.h
 /// Where the streams in a file begin: one root behind another, with zeros between them where a page was not full.
 #pragma once
 
+#include <algorithm>
 #include <array>
 #include <cstddef>
 #include <cstdint>
-#include <cstring>
-#include <new>
 
-#include "tav/cpp/owner.hpp"
+#include "tav/core/node.hpp"
+#include "tav/cpp/form.hpp"
 #include "tav/layout.hpp"
 
 namespace tav::detail
 {
-
-/// How the bytes of a stream are to be taken.
-struct StreamForm
-{
-  bool swapped = false;
-  bool wide = true; ///< the root has a 64-bit header
-  bool aligned = false;
-};
-
-/// As std::min, whose header holds a hundred other algorithms.
-constexpr uint64_t lesser(uint64_t a, uint64_t b) noexcept
-{
-  return b < a ? b : a;
-}
-
-/// The bytes of an open file by offset, through a window: headers that stand near each other cost one read.
-class FileBytes
-{
-public:
-  explicit FileBytes(KORHFile& file) noexcept
-      : file_(file)
-  {
-  }
-
-  uint32_t open() noexcept
-  {
-    window_.reset(new (std::nothrow) Window);
-    return window_ != nullptr ? file_.getSize(&size_) : TAV_RC_NO_MEMORY;
-  }
-  [[nodiscard]] uint64_t size() const noexcept
-  {
-    return size_;
-  }
-
-  /// Bytes that are at hand from an offset on: at least one, but at the end of the file.
-  uint32_t view(uint64_t offset, const uint8_t*& bytes, uint64_t& length) noexcept
-  {
-    length = 0;
-    if (offset >= size_)
-    {
-      return TAV_RC_OK;
-    }
-    if (offset < from_ || offset - from_ >= filled_)
-    {
-      if (const uint32_t rc = fill(offset); rc != TAV_RC_OK)
-      {
-        return rc;
-      }
-    }
-    bytes = window_->data() + (offset - from_);
-    length = filled_ - (offset - from_);
-    return TAV_RC_OK;
-  }
-
-  /// Up to `length` bytes; fewer at the end of the file alone.
-  uint32_t read(uint64_t offset, uint8_t* to, uint64_t length, uint64_t& got) noexcept
-  {
-    got = 0;
-    uint32_t rc = TAV_RC_OK;
-    while (rc == TAV_RC_OK && got < length)
-    {
-      const uint8_t* bytes = nullptr;
-      uint64_t there = 0;
-      rc = view(offset + got, bytes, there);
-      if (rc != TAV_RC_OK || there == 0)
-      {
-        break;
-      }
-      there = lesser(there, length - got);
-      std::memcpy(to + got, bytes, static_cast<size_t>(there));
-      got += there;
-    }
-    return rc;
-  }
-
-private:
-  static constexpr size_t kWindow = size_t{16} * 1024;
-  using Window = std::array<uint8_t, kWindow>;
-
-  uint32_t fill(uint64_t offset) noexcept
-  {
-    from_ = offset;
-    filled_ = 0;
-    KORFileSeekParam seek;
-    seek.offset = offset;
-    KORFileReadParam read;
-    read.length = kWindow;
-    uint32_t rc = file_.seek(&seek, nullptr);
-    rc = rc == TAV_RC_OK ? file_.read(&read, window_->data(), &filled_) : rc;
-    size_ = rc == TAV_RC_END_OF_STORAGE ? lesser(size_, offset + filled_) : size_;
-    return rc == TAV_RC_END_OF_STORAGE ? TAV_RC_OK : rc;
-  }
-
-  KORHFile& file_;
-  Owner<Window> window_;
-  uint64_t size_ = 0;
-  uint64_t from_ = 0;
-  uint64_t filled_ = 0;
-};
 
 /// Reads the header at an offset; `there` reports whether the bytes have room for one.
 template<class Bytes>
@@ -135,23 +36,15 @@ uint32_t readHeader(Bytes& bytes, const StreamForm& form, bool wide, uint64_t of
 /// Where a closed group ends; the largest offset for one that is open, or whose size cannot be.
 inline uint64_t endOfGroup(const TAVHeader& group) noexcept
 {
-  return layout::isSizeUnknown(group)
-             ? ~uint64_t{0}
-             : layout::addSaturated(layout::addSaturated(group.nodeOffset, layout::headerLength(group.hdrType)),
-                                    layout::sizeOf(group));
+  const core::Node node = core::nodeOf(group);
+  return core::isOpen(node) ? ~uint64_t{0} : core::levelBelow(node).end;
 }
 
-/// From a node's start to its sibling's.
+/// From a node's start to its sibling's; the largest length for one whose size cannot be.
 inline uint64_t lengthOfNode(const TAVHeader& node, bool aligned) noexcept
 {
-  uint64_t length = layout::sizeOf(node);
-  if (!layout::isGroup(node))
-  {
-    const bool padded = aligned || (layout::infoOf(node) & TAV_INFO_ALIGNED8) != 0;
-    const bool fits = !padded || layout::roundUp8Checked(length);
-    length = fits && layout::hasEyeSize(node) ? layout::addSaturated(length, layout::kEyeSizeLength) : length;
-  }
-  return layout::addSaturated(length, layout::headerLength(node.hdrType));
+  uint64_t length = 0;
+  return core::lengthOf(aligned, core::nodeOf(node), length) ? length : ~uint64_t{0};
 }
 
 /// The first byte that is not zero, from an offset on; the end of the bytes when there is none.
@@ -220,11 +113,12 @@ public:
   /// end anywhere.
   uint32_t hasFittingChild(const TAVHeader& group, bool& fits) noexcept
   {
-    const uint64_t start = group.nodeOffset + layout::headerLength(group.hdrType);
+    const core::Level level = core::levelBelow(core::nodeOf(group));
+    const uint64_t start = level.start;
     const uint64_t end = endOfGroup(group);
     TAVHeader child;
     bool there = false;
-    const uint32_t rc = readHeader(bytes_, form_, layout::hasChildren64(group), start, child, there);
+    const uint32_t rc = readHeader(bytes_, form_, level.wide, start, child, there);
     const bool blank = there && layout::typeOf(child) == 0;
     const uint64_t length = layout::isSizeUnknown(child) ? layout::headerLength(child.hdrType)
                                                          : lengthOfNode(child, form_.aligned);
@@ -299,7 +193,7 @@ private:
     uint64_t length = 0;
     rc = rc == TAV_RC_OK ? bytes_.view(first, rest, length) : rc;
     followed = rc == TAV_RC_OK && length == 0;
-    const uint64_t places = lesser(layout::kHeaderSize64, first - offset + 1);
+    const uint64_t places = std::min<uint64_t>(layout::kHeaderSize64, first - offset + 1);
     for (uint64_t back = 0; rc == TAV_RC_OK && !followed && back < places; ++back)
     {
       TAVHeader root;
