@@ -1,6 +1,7 @@
 #include "tav/inspect/path.hpp"
 
 #include <algorithm>
+#include <array>
 #include <charconv>
 #include <unordered_map>
 
@@ -51,6 +52,32 @@ const Names& names()
   return table;
 }
 
+/// Tags that stand for one id each and can be written in a path. They are asked for at every node.
+class ClearTags
+{
+public:
+  ClearTags()
+  {
+    for (const dictionary::Entry& entry : dictionary::entries())
+    {
+      const std::string_view tag = dictionary::tagOf(entry.id);
+      const auto found = names().find(tag);
+      if (isCleanName(tag) && found != names().end() && found->second == std::vector<uint16_t>{entry.id})
+      {
+        tags_.push_back(tag);
+        places_[entry.id] = static_cast<uint16_t>(tags_.size());
+      }
+    }
+  }
+
+  /// Empty where there is none.
+  std::string_view tagOf(uint16_t elm) const { return places_[elm] == 0 ? std::string_view() : tags_[places_[elm] - 1]; }
+
+private:
+  std::vector<std::string_view> tags_{};
+  std::array<uint16_t, 65536> places_{}; ///< in `tags_`, from 1; 0: has none
+};
+
 template<class Number>
 bool parseNumber(std::string_view text, Number& value, int base)
 {
@@ -63,34 +90,37 @@ bool parseNumber(std::string_view text, Number& value, int base)
 
 std::string elementText(uint16_t elm)
 {
-  const std::string_view tag = dictionary::tagOf(elm);
-  if (isCleanName(tag))
+  std::string text;
+  appendElementText(text, elm);
+  return text;
+}
+
+void appendElementText(std::string& out, uint16_t elm)
+{
+  static const ClearTags clear;
+  if (const std::string_view tag = clear.tagOf(elm); !tag.empty())
   {
-    const auto found = names().find(tag);
-    if (found != names().end() && found->second.size() == 1 && found->second.front() == elm)
-    {
-      return std::string(tag);
-    }
+    out += tag;
+    return;
   }
-  std::string id = std::to_string(elm);
-  id.insert(id.begin(), '#');
-  return id;
+  out += '#';
+  appendNumber(out, elm);
 }
 
 void appendStep(std::string& path, const Node& node)
 {
   path += '/';
-  path += elementText(node.elm());
+  appendElementText(path, node.elm());
   if (node.ordinal == 0)
   {
     path += "[@";
-    path += hexOffset(node.offset());
+    appendHexOffset(path, node.offset());
     path += ']';
   }
   else if (node.ordinal > 1)
   {
     path += '[';
-    path += std::to_string(node.ordinal);
+    appendNumber(path, node.ordinal);
     path += ']';
   }
 }

@@ -24,8 +24,8 @@ std::string_view codeSentence(uint32_t code)
 
 std::string hexOffset(uint64_t offset)
 {
-  char text[24];
-  std::snprintf(text, sizeof text, "0x%llx", static_cast<unsigned long long>(offset));
+  std::string text;
+  appendHexOffset(text, offset);
   return text;
 }
 

@@ -1,7 +1,7 @@
 #include "tav/inspect/value.hpp"
 
 #include <algorithm>
-#include <cstdio>
+#include <array>
 #include <cstring>
 
 #include "inspect/text/bytes.h"
@@ -39,9 +39,8 @@ void appendEscape(std::string& out, uint8_t byte)
       return;
     }
   }
-  char text[8];
-  std::snprintf(text, sizeof text, "\\x%02x", static_cast<unsigned>(byte));
-  out += text;
+  out += "\\x";
+  detail::paths::appendDigits(out, &byte, 1);
 }
 
 /// Whether a character, with its length, steers a terminal: the control characters below the blank, U+007F to U+009F,
@@ -62,17 +61,36 @@ bool steers(std::string_view character)
   return first < 0x20 || first == 0x7F;
 }
 
-/// Text without what steers terminals or is no UTF-8, and without the characters of `more`: written as \n, \x1b and so
-/// on.
-std::string escaped(std::string_view text, std::string_view more)
+/// Which bytes stand for themselves: ASCII that steers nothing. In quotation marks those and backslashes do not.
+using Plain = std::array<bool, 256>;
+
+constexpr Plain plainBytes(bool inQuotes)
 {
-  std::string out;
+  Plain plain{};
+  for (size_t byte = 0x20; byte < 0x7F; ++byte)
+  {
+    plain[byte] = !inQuotes || (byte != '"' && byte != '\\');
+  }
+  return plain;
+}
+
+/// Appends text without what steers terminals or is no UTF-8: written as \n, \x1b and so on.
+void appendEscaped(std::string& out, std::string_view text, bool inQuotes)
+{
+  static constexpr std::array<Plain, 2> plains{plainBytes(false), plainBytes(true)};
+  const Plain& plain = plains[inQuotes ? 1 : 0];
   while (!text.empty())
   {
+    const auto special = std::find_if(text.begin(), text.end(), [&](char c) { return !plain[static_cast<uint8_t>(c)]; });
+    out.append(text.begin(), special);
+    text.remove_prefix(static_cast<size_t>(special - text.begin()));
+    if (text.empty())
+    {
+      return;
+    }
     const size_t length = detail::characterLength(text);
-    const size_t count = std::max<size_t>(length, 1);
-    const std::string_view character = text.substr(0, count);
-    if (length == 0 || steers(character) || more.find(character) != std::string_view::npos)
+    const std::string_view character = text.substr(0, std::max<size_t>(length, 1));
+    if (length == 0 || steers(character) || character == "\"" || character == "\\")
     {
       std::for_each(character.begin(), character.end(), [&](char c) { appendEscape(out, static_cast<uint8_t>(c)); });
     }
@@ -80,27 +98,45 @@ std::string escaped(std::string_view text, std::string_view more)
     {
       out += character;
     }
-    text.remove_prefix(count);
+    text.remove_prefix(character.size());
   }
-  return out;
 }
 
-/// A value of the right size, in host order.
-std::string scalarText(uint16_t type, std::span<const uint8_t> bytes, bool quote)
+void appendQuoted(std::string& out, std::string_view text)
 {
-  const size_t whole = type == TAV_TYPE_UINT64_ARRAY ? bytes.size() / 8 * 8 : bytes.size(); // of one that was cut
-  const std::string text = detail::paths::plainText({type, bytes.data(), whole, false});
-  const bool isText = type == TAV_TYPE_ASCII_STRING || type == TAV_TYPE_UTF8_STRING;
-  return quote && isText ? quoted(text) : text;
+  out += '"';
+  appendEscaped(out, text, true);
+  out += '"';
 }
 
-std::vector<uint8_t> storedBytes(ByteSource& source, const Node& node, uint64_t most)
+using Bytes = std::span<const uint8_t>;
+
+/// The first bytes of a payload: where they lie when they are at hand, else in `room`. Valid until the source is
+/// asked again.
+Bytes storedBytes(ByteSource& source, const Node& node, uint64_t most, std::vector<uint8_t>& room)
 {
   const uint64_t size = std::min(node.size(), node.limit - std::min(node.limit, node.payloadOffset()));
   // Never more than the file has, whatever a header claims.
-  std::vector<uint8_t> bytes(static_cast<size_t>(std::min({most, size, source.size()})));
-  bytes.resize(source.read(node.payloadOffset(), bytes));
-  return bytes;
+  const auto count = static_cast<size_t>(std::min({most, size, source.size()}));
+  const Bytes atHand = count == 0 ? Bytes() : source.view(node.payloadOffset());
+  if (atHand.size() >= count)
+  {
+    return atHand.first(count);
+  }
+  room.resize(count);
+  return Bytes(room).first(source.read(node.payloadOffset(), room));
+}
+
+/// A value of the right size for a decoder.
+detail::RawValue rawValue(const Form& form, uint16_t type, Bytes bytes)
+{
+  const size_t whole = type == TAV_TYPE_UINT64_ARRAY ? bytes.size() / 8 * 8 : bytes.size(); // of one that was cut
+  return {type, bytes.data(), whole, form.swapped};
+}
+
+bool isTextType(uint16_t type)
+{
+  return type == TAV_TYPE_ASCII_STRING || type == TAV_TYPE_UTF8_STRING;
 }
 
 /// Whether the bytes are shown as they are stored, so that they read the same on every machine.
@@ -113,47 +149,80 @@ bool isNoValue(const Node& node)
 
 std::vector<uint8_t> payloadBytes(ByteSource& source, const Form& form, const Node& node, uint64_t most)
 {
-  std::vector<uint8_t> bytes = storedBytes(source, node, most);
+  std::vector<uint8_t> room;
+  const Bytes stored = storedBytes(source, node, most, room);
+  std::vector<uint8_t> bytes(stored.begin(), stored.end());
   const SwapRule rule = typeInfo(node.type()).swapRule;
-  uint64_t prefix = form.swapped ? swappedPrefix(rule, bytes.size()) : 0;
-  if (rule == SwapRule::one128 && node.size() != 16)
-  {
-    prefix = 0;
-  }
+  const bool isWhole = rule != SwapRule::one128 || node.size() == 16;
+  const uint64_t prefix = form.swapped && isWhole ? swappedPrefix(rule, bytes.size()) : 0;
   if (prefix != 0)
   {
-    const std::vector<uint8_t> stored(bytes.begin(), bytes.begin() + static_cast<ptrdiff_t>(prefix));
     swapPayload(rule, stored.data(), bytes.data(), prefix);
   }
   return bytes;
 }
 
-std::string valueText(ByteSource& source, const Form& form, const Node& node, uint64_t most)
+void appendValueText(std::string& out, ByteSource& source, const Form& form, const Node& node, uint64_t most)
 {
   if (node.isGroup())
   {
-    return {};
+    return;
   }
-  const uint64_t wanted = std::max<uint64_t>(most, 16);
+  std::vector<uint8_t> room;
+  const Bytes bytes = storedBytes(source, node, std::max<uint64_t>(most, 16), room);
   if (isNoValue(node))
   {
-    return hexText(storedBytes(source, node, wanted)) + (node.size() > most ? " ..." : "");
+    detail::paths::appendDigits(out, bytes.data(), bytes.size());
+    out += node.size() > most ? " ..." : "";
+    return;
   }
-  const std::vector<uint8_t> bytes = payloadBytes(source, form, node, wanted);
-  return scalarText(node.type(), bytes, true) + (node.size() > bytes.size() ? " ..." : "");
+  const detail::RawValue raw = rawValue(form, node.type(), bytes);
+  std::string_view text;
+  if (!isTextType(node.type()))
+  {
+    detail::paths::appendPlainText(out, raw);
+  }
+  else if (detail::decode(raw, text) == TAV_RC_OK)
+  {
+    appendQuoted(out, text);
+  }
+  else
+  {
+    appendQuoted(out, hexText(bytes)); // fewer than a code page's bytes are there
+  }
+  out += node.size() > bytes.size() ? " ..." : "";
+}
+
+std::string valueText(ByteSource& source, const Form& form, const Node& node, uint64_t most)
+{
+  std::string text;
+  appendValueText(text, source, form, node, most);
+  return text;
+}
+
+bool appendPlainText(std::string& out, ByteSource& source, const Form& form, const Node& node, uint64_t most)
+{
+  if (node.size() > most)
+  {
+    return false;
+  }
+  std::vector<uint8_t> room;
+  const Bytes bytes = storedBytes(source, node, most, room);
+  if (isNoValue(node))
+  {
+    detail::paths::appendDigits(out, bytes.data(), bytes.size());
+  }
+  else
+  {
+    detail::paths::appendPlainText(out, rawValue(form, node.type(), bytes));
+  }
+  return true;
 }
 
 std::optional<std::string> plainText(ByteSource& source, const Form& form, const Node& node, uint64_t most)
 {
-  if (node.size() > most)
-  {
-    return std::nullopt;
-  }
-  if (isNoValue(node))
-  {
-    return hexText(storedBytes(source, node, most));
-  }
-  return scalarText(node.type(), payloadBytes(source, form, node, most), false);
+  std::string text;
+  return appendPlainText(text, source, form, node, most) ? std::optional(std::move(text)) : std::nullopt;
 }
 
 std::string typeText(uint16_t type)
@@ -177,12 +246,16 @@ bool isUtf8(std::string_view text)
 
 std::string quoted(std::string_view text)
 {
-  return '"' + escaped(text, "\"\\") + '"';
+  std::string out;
+  appendQuoted(out, text);
+  return out;
 }
 
 std::string forTerminal(std::string_view text)
 {
-  return escaped(text, {});
+  std::string out;
+  appendEscaped(out, text, false);
+  return out;
 }
 
 std::optional<uint64_t> pairDistanceAt(ByteSource& source, const Form& form, uint64_t offset)
@@ -197,7 +270,9 @@ std::optional<uint64_t> pairDistanceAt(ByteSource& source, const Form& form, uin
 
 std::string hexText(std::span<const uint8_t> bytes)
 {
-  return detail::paths::digitsOf(bytes.data(), bytes.size());
+  std::string text;
+  detail::paths::appendDigits(text, bytes.data(), bytes.size());
+  return text;
 }
 
 std::string dateText(const TAVTimeStamp& stamp)

@@ -480,20 +480,26 @@ uint64_t Walker::countChild(uint16_t elm)
 
 std::string Walker::path(const Event& event, PathStyle style) const
 {
+  std::string text;
+  appendPath(text, event, style);
+  return text;
+}
+
+void Walker::appendPath(std::string& out, const Event& event, PathStyle style) const
+{
   const uint64_t groups = std::min<uint64_t>(event.depth, frames_.size() - 1);
   const uint64_t steps = groups + (event.node.header.hdrType != 0 ? 1 : 0);
   const bool cut = style == PathStyle::brief && steps > kWholeSteps;
-  std::string text;
   for (uint64_t i = 1; i <= steps; ++i)
   {
     if (cut && i == kFirstSteps + 1)
     {
-      text += "/\xE2\x80\xA6";
+      out += "/\xE2\x80\xA6";
       i = steps - kLastSteps + 1;
     }
-    appendStep(text, i <= groups ? frames_[static_cast<size_t>(i)].node : event.node);
+    appendStep(out, i <= groups ? frames_[static_cast<size_t>(i)].node : event.node);
   }
-  return text.empty() ? "/" : text;
+  out += steps == 0 ? "/" : "";
 }
 
 } // namespace tav::inspect

@@ -1,11 +1,11 @@
 // tav hex: an annotated hex dump, each byte once.
 #include <algorithm>
 #include <array>
-#include <cstdio>
 #include <utility>
 
 #include "tav/inspect/locate.hpp"
 #include "tav/inspect/path.hpp"
+#include "tav/inspect/phrases.hpp"
 #include "tav/inspect/value.hpp"
 #include "tav/inspect/walker.hpp"
 #include "tools/shell/options.h"
@@ -84,79 +84,98 @@ public:
 
 private:
   void heading(const Walker& walker, const Event& event);
-  std::string headerText(const Node& node) const;
-  std::string pairText(const Node& node, uint64_t offset);
+  void headerText(const Node& node);
+  void pairText(const Node& node, uint64_t offset);
   void rows(uint64_t offset, uint64_t length);
+  void row(uint64_t offset, std::span<const uint8_t> bytes);
 
   Stream& stream_;
   DamageNotices& notices_;
   Output out_;
+  std::string text_{}; ///< of a line while it grows
 };
 
-std::string Dumper::headerText(const Node& node) const
+void Dumper::headerText(const Node& node)
 {
-  std::string text = (node.is64() ? "64-bit header: size " : "32-bit header: size ") +
-                     (layout::isSizeUnknown(node.header) ? "unknown" : std::to_string(node.size()));
+  text_ += node.is64() ? "64-bit header: size " : "32-bit header: size ";
+  layout::isSizeUnknown(node.header) ? void(text_ += "unknown") : appendNumber(text_, node.size());
   if (node.is64())
   {
-    char info[40];
-    std::snprintf(info, sizeof info, ", info 0x%x", static_cast<unsigned>(node.info()));
-    text += info;
+    text_ += ", info ";
+    appendHexOffset(text_, node.info());
   }
-  text += ", type " + std::to_string(node.type()) + " (" + typeText(node.type());
-  text += node.isGroup() ? layout::hasChildren64(node.header) ? ", 64-bit children)" : ", 32-bit children)" : ")";
-  return text + ", element " + std::to_string(node.elm());
+  text_ += ", type ";
+  appendNumber(text_, node.type());
+  text_ += " (";
+  text_ += typeText(node.type());
+  text_ += node.isGroup() ? layout::hasChildren64(node.header) ? ", 64-bit children)" : ", 32-bit children)" : ")";
+  text_ += ", element ";
+  appendNumber(text_, node.elm());
 }
 
-std::string Dumper::pairText(const Node& node, uint64_t offset)
+void Dumper::pairText(const Node& node, uint64_t offset)
 {
   const std::optional<uint64_t> distance = pairDistanceAt(stream_.bytes(), stream_.form(), offset);
   if (!distance)
   {
-    return "eye/size pair, the eye catcher is damaged";
+    text_ += "eye/size pair, the eye catcher is damaged";
+    return;
   }
   const uint64_t back = offset - node.offset();
-  std::string text = "eye/size pair: distance " + std::to_string(*distance);
-  return back == *distance ? text : text + ", of " + std::to_string(back) + " back to the node";
+  text_ += "eye/size pair: distance ";
+  appendNumber(text_, *distance);
+  text_ += back == *distance ? "" : ", of " + std::to_string(back) + " back to the node";
 }
 
 void Dumper::heading(const Walker& walker, const Event& event)
 {
-  std::string text;
+  text_ = "; ";
   switch (event.what)
   {
-  case What::nodeBegin: text = walker.path(event, PathStyle::brief) + "\n;   " + headerText(event.node); break;
-  case What::payload:
-    text = "  " + std::string(event.node.elm() == TAV_ELM_CMN_END_HDR_EYE_SIZE && event.length == layout::kEyeSizeLength
-                                  ? "eye/size pair of the group"
-                                  : "payload: " + valueText(stream_.bytes(), stream_.form(), event.node, 60));
+  case What::nodeBegin:
+    walker.appendPath(text_, event, PathStyle::brief);
+    text_ += "\n;   ";
+    headerText(event.node);
     break;
-  case What::extra: text = "  two uncounted bytes behind a UTF-8 string"; break;
-  case What::padding: text = "  padding"; break;
-  case What::pair: text = "  " + pairText(event.node, event.offset); break;
-  case What::damaged: text = "damaged: " + event.reason; break;
+  case What::payload:
+    if (event.node.elm() == TAV_ELM_CMN_END_HDR_EYE_SIZE && event.length == layout::kEyeSizeLength)
+    {
+      text_ += "  eye/size pair of the group";
+      break;
+    }
+    text_ += "  payload: ";
+    appendValueText(text_, stream_.bytes(), stream_.form(), event.node, 60);
+    break;
+  case What::extra: text_ += "  two uncounted bytes behind a UTF-8 string"; break;
+  case What::padding: text_ += "  padding"; break;
+  case What::pair:
+    text_ += "  ";
+    pairText(event.node, event.offset);
+    break;
+  case What::damaged: text_ += "damaged: " + event.reason; break;
   case What::zeros:
   {
     const bool between = event.offset + event.length < stream_.bytes().size();
-    text = std::string("zeros ") + (between ? "between streams, " : "behind the stream, ") +
-           counted(event.length, "byte");
+    text_ += between ? "zeros between streams, " : "zeros behind the stream, ";
+    text_ += counted(event.length, "byte");
     break;
   }
-  case What::unread: text = "not looked at"; break;
+  case What::unread: text_ += "not looked at"; break;
   default: break;
   }
-  out_.write("; " + text + "\n");
+  text_ += '\n';
+  out_.write(text_);
 }
 
 void Dumper::rows(uint64_t offset, uint64_t length)
 {
-  std::array<uint8_t, kRow> bytes{};
+  std::array<uint8_t, kRow> room{};
   bool zeroBefore = false;
   bool starred = false;
   for (uint64_t done = 0; done < length; done += kRow)
   {
-    const auto count = static_cast<size_t>(std::min<uint64_t>(kRow, length - done));
-    stream_.bytes().read(offset + done, std::span(bytes).first(count));
+    const auto bytes = std::span(room).first(static_cast<size_t>(std::min<uint64_t>(kRow, length - done)));
+    stream_.bytes().read(offset + done, bytes);
     const bool zero = std::all_of(bytes.begin(), bytes.end(), [](uint8_t byte) { return byte == 0; });
     if (zero && zeroBefore && done + kRow < length)
     {
@@ -166,23 +185,34 @@ void Dumper::rows(uint64_t offset, uint64_t length)
     }
     zeroBefore = zero;
     starred = false;
-    char row[128];
-    const unsigned long long place = offset + done;
-    int at = std::snprintf(row, sizeof row, "%08llx: ", place);
-    for (size_t i = 0; i < kRow; ++i)
-    {
-      at += i < count ? std::snprintf(row + at, sizeof row - static_cast<size_t>(at), i % 2 == 1 ? "%02x " : "%02x",
-                                      static_cast<unsigned>(bytes[i]))
-                      : std::snprintf(row + at, sizeof row - static_cast<size_t>(at), i % 2 == 1 ? "   " : "  ");
-    }
-    std::string line(row, static_cast<size_t>(at));
-    line += ' ';
-    for (size_t i = 0; i < count; ++i)
-    {
-      line += bytes[i] >= 0x20 && bytes[i] < 0x7F ? static_cast<char>(bytes[i]) : '.';
-    }
-    out_.write(line + "\n");
+    row(offset + done, bytes);
   }
+}
+
+/// "00000010: 6162 0a                                  ab."
+void Dumper::row(uint64_t offset, std::span<const uint8_t> bytes)
+{
+  constexpr std::string_view digits = "0123456789abcdef";
+  constexpr size_t columns = kRow / 2 * 5;
+  constexpr size_t addressWidth = 8;
+  text_.clear();
+  appendNumber(text_, offset, 16);
+  text_.insert(0, addressWidth - std::min(addressWidth, text_.size()), '0');
+  text_ += ": ";
+  const size_t begin = text_.size();
+  text_.resize(begin + columns + 1 + bytes.size() + 1, ' ');
+  char* number = text_.data() + begin;
+  char* letter = number + columns + 1;
+  for (size_t i = 0; i < bytes.size(); ++i)
+  {
+    const uint8_t byte = bytes[i];
+    number[0] = digits[byte >> 4U];
+    number[1] = digits[byte & 0xFU];
+    number += i % 2 == 1 ? 3 : 2;
+    *letter++ = byte >= 0x20 && byte < 0x7F ? static_cast<char>(byte) : '.';
+  }
+  *letter = '\n';
+  out_.write(text_);
 }
 
 int run(const Invocation& invocation)

@@ -1,12 +1,12 @@
 // tav tree: one line a node.
 #include <algorithm>
-#include <cstdio>
 #include <optional>
 #include <utility>
 
 #include "tav/inspect/folding.hpp"
 #include "tav/inspect/locate.hpp"
 #include "tav/inspect/path.hpp"
+#include "tav/inspect/phrases.hpp"
 #include "tav/inspect/value.hpp"
 #include "tav/inspect/walker.hpp"
 #include "tools/host/host.h"
@@ -35,6 +35,16 @@ struct Colours
 };
 
 constexpr Colours kOnTerminal{"\033[2m", "\033[1m", "\033[36m", "\033[31m", "\033[0m"};
+
+/// Where the parts of a line begin or end.
+struct Parts
+{
+  size_t name = 0;
+  size_t nameEnd = 0;
+  size_t type = 0;
+  size_t typeEnd = 0;
+  bool bad = false; ///< what stands for the name says what is wrong
+};
 
 class TreePrinter
 {
@@ -97,12 +107,17 @@ private:
   void setFolding(const Invocation& invocation);
   bool isLeftOut(const Node& node) const;
   void fold(const Folded& folded);
-  static std::string indent(uint64_t level);
+  void indent(uint64_t level);
   void line(const Walker& walker, const Event& event, uint64_t base);
-  std::string label(const Walker& walker, const Event& event, uint64_t level) const;
-  std::string remarks(const Node& node) const;
-  void put(uint64_t offset, const std::string& size, const std::string& text, const std::string& bad,
-           const std::string& type, const std::string& value);
+  void nodeLine(const Walker& walker, const Event& event, uint64_t level);
+  void label(const Walker& walker, const Event& event, uint64_t level);
+  void remarks(const Node& node);
+  void begin(uint64_t offset, std::string_view size);
+  void column(size_t begin, size_t width);
+  void bad(std::string_view text);
+  void type(std::string_view text);
+  void value(std::string_view text);
+  void put();
 
   Stream& stream_;
   Output out_;
@@ -117,12 +132,19 @@ private:
   uint64_t named_ = kNoOffset; ///< the one node that was asked for
   std::vector<uint16_t> only_{};
   uint64_t lines_ = 0;
+  std::string text_{}; ///< of a line while it grows
+  Parts parts_{};
 };
 
-std::string TreePrinter::indent(uint64_t level)
+void TreePrinter::indent(uint64_t level)
 {
-  std::string text(static_cast<size_t>(std::min(level, kMaxIndent)) * 2, ' ');
-  return level > kMaxIndent ? text + "(" + std::to_string(level) + ") " : text;
+  text_.append(static_cast<size_t>(std::min(level, kMaxIndent)) * 2, ' ');
+  if (level > kMaxIndent)
+  {
+    text_ += '(';
+    appendNumber(text_, level);
+    text_ += ") ";
+  }
 }
 
 /// Repetitions are folded where a person looks, unless something else is asked for.
@@ -146,7 +168,10 @@ void TreePrinter::fold(const Folded& folded)
   if (level <= maxDepth_)
   {
     const std::string text = "\xE2\x80\xA6 " + std::to_string(folded.count) + " more like this";
-    put(folded.offset, "", (paths_ ? "" : indent(level)) + text, "", "", "");
+    begin(folded.offset, {});
+    indent(paths_ ? 0 : level);
+    text_ += text;
+    put();
   }
 }
 
@@ -158,34 +183,39 @@ bool TreePrinter::isLeftOut(const Node& node) const
   return only_.empty() ? end : !named;
 }
 
-std::string TreePrinter::label(const Walker& walker, const Event& event, uint64_t level) const
+void TreePrinter::label(const Walker& walker, const Event& event, uint64_t level)
 {
   if (paths_ || !only_.empty())
   {
-    return walker.path(event, PathStyle::brief);
+    walker.appendPath(text_, event, PathStyle::brief);
+    return;
   }
-  std::string text = indent(level);
+  indent(level);
   if (event.what == What::nodeBegin)
   {
-    std::string step;
-    appendStep(step, event.node);
-    text += step.substr(1);
+    const size_t slash = text_.size();
+    appendStep(text_, event.node);
+    text_.erase(slash, 1);
   }
-  return text;
 }
 
-std::string TreePrinter::remarks(const Node& node) const
+void TreePrinter::remarks(const Node& node)
 {
-  std::string text;
-  const auto add = [&](NodeFlag flag, const char* remark) {
-    text += node.has(flag) ? (text.empty() ? "" : ", ") + std::string(remark) : "";
-  };
-  add(kOpen, "open");
-  add(kOverrun, "cut: claims more than there is");
-  add(kNoPair, "no eye/size pair");
-  add(kBadPair, "damaged eye/size pair");
-  add(kBadGroupType, "64-bit children announced by a 32-bit header");
-  return text;
+  static constexpr std::pair<NodeFlag, std::string_view> all[] = {
+      {kOpen, "open"},
+      {kOverrun, "cut: claims more than there is"},
+      {kNoPair, "no eye/size pair"},
+      {kBadPair, "damaged eye/size pair"},
+      {kBadGroupType, "64-bit children announced by a 32-bit header"}};
+  bool first = true;
+  for (const auto& [flag, remark] : all)
+  {
+    if (node.has(flag))
+    {
+      text_ += std::exchange(first, false) ? "" : ", ";
+      text_ += remark;
+    }
+  }
 }
 
 void TreePrinter::line(const Walker& walker, const Event& event, uint64_t base)
@@ -193,62 +223,129 @@ void TreePrinter::line(const Walker& walker, const Event& event, uint64_t base)
   const uint64_t level = event.depth - std::min(base, event.depth);
   if (event.what == What::damaged)
   {
-    put(event.offset, std::to_string(event.length), label(walker, event, level), "damaged", "", event.reason);
+    begin(event.offset, std::to_string(event.length));
+    label(walker, event, level);
+    bad("damaged");
+    value(event.reason);
+    put();
     return;
   }
   const bool between = event.offset + event.length < stream_.bytes().size();
   if (event.what == What::unread ||
       (event.what == What::zeros && (between || event.length > uint64_t{2} * 1024 * 1024)))
   {
-    put(event.offset, std::to_string(event.length), "", event.what == What::zeros ? "zeros" : "unread", "", "");
+    begin(event.offset, std::to_string(event.length));
+    bad(event.what == What::zeros ? "zeros" : "unread");
+    put();
     return;
   }
-  if (event.what != What::nodeBegin || level > maxDepth_)
+  if (event.what == What::nodeBegin && level <= maxDepth_ && !isLeftOut(event.node))
   {
-    return;
+    nodeLine(walker, event, level);
   }
-  const Node& node = event.node;
-  if (isLeftOut(node))
-  {
-    return;
-  }
-  std::string value = remarks(node);
-  if (!node.isGroup())
-  {
-    const size_t room = width_ != 0 ? width_ : kWideLine;
-    const std::string shown = valueText(stream_.bytes(), stream_.form(), node, room);
-    value = shown + (value.empty() ? "" : "  (" + value + ")");
-  }
-  const std::string size = node.has(kOpen) && node.size() != 0 ? "?" : std::to_string(node.size());
-  put(node.offset(), size, label(walker, event, level), "", typeText(node.type()), value);
 }
 
-void TreePrinter::put(uint64_t offset, const std::string& size, const std::string& text, const std::string& bad,
-                      const std::string& type, const std::string& value)
+void TreePrinter::nodeLine(const Walker& walker, const Event& event, uint64_t level)
 {
-  char columns[64];
-  std::snprintf(columns, sizeof columns, "%10s %8s  ", hexOffset(offset).c_str(), size.c_str());
-  const bool gap = !bad.empty() && !text.empty() && text.back() != ' ';
-  std::string line = columns;
-  const size_t nameBegin = line.size();
-  line += text + (gap ? " " : "") + bad;
-  const size_t nameEnd = line.size();
-  line += type.empty() && value.empty() ? "" : "  ";
-  const size_t typeBegin = line.size();
-  line += type;
-  const size_t typeEnd = line.size();
-  line += (type.empty() || value.empty() ? "" : "  ") + value;
+  const Node& node = event.node;
+  begin(node.offset(), node.has(kOpen) && node.size() != 0 ? "?" : std::to_string(node.size()));
+  label(walker, event, level);
+  type(typeText(node.type()));
+  value({});
+  const size_t before = text_.size();
+  if (!node.isGroup())
+  {
+    appendValueText(text_, stream_.bytes(), stream_.form(), node, width_ != 0 ? width_ : kWideLine);
+  }
+  const size_t behind = text_.size();
+  if (node.flags != 0)
+  {
+    text_ += node.isGroup() ? "" : "  (";
+    const size_t remarked = text_.size();
+    remarks(node);
+    text_.size() == remarked ? text_.resize(behind) : void(text_ += node.isGroup() ? "" : ")");
+  }
+  if (text_.size() == before)
+  {
+    text_.resize(parts_.typeEnd);
+  }
+  put();
+}
+
+/// Sets what was written from `begin` on to the right of a column.
+void TreePrinter::column(size_t begin, size_t width)
+{
+  const size_t length = text_.size() - begin;
+  text_.insert(begin, width - std::min(length, width), ' ');
+}
+
+void TreePrinter::begin(uint64_t offset, std::string_view size)
+{
+  text_.clear();
+  appendHexOffset(text_, offset);
+  column(0, 10);
+  text_ += ' ';
+  const size_t sizeBegin = text_.size();
+  text_ += size;
+  column(sizeBegin, 8);
+  text_ += "  ";
+  parts_ = {.name = text_.size()};
+}
+
+/// What stands for the name, or behind it, and is wrong.
+void TreePrinter::bad(std::string_view text)
+{
+  const bool gap = text_.size() != parts_.name && text_.back() != ' ';
+  text_ += gap ? " " : "";
+  text_ += text;
+  parts_.bad = true;
+}
+
+void TreePrinter::type(std::string_view text)
+{
+  parts_.nameEnd = text_.size();
+  text_ += "  ";
+  parts_.type = text_.size();
+  text_ += text;
+  parts_.typeEnd = text_.size();
+}
+
+void TreePrinter::value(std::string_view text)
+{
+  if (parts_.typeEnd == 0)
+  {
+    parts_.nameEnd = text_.size();
+    parts_.type = parts_.typeEnd = text_.size() + 2;
+  }
+  text_ += "  ";
+  text_ += text;
+}
+
+void TreePrinter::put()
+{
+  if (parts_.typeEnd == 0) // a name alone
+  {
+    parts_.nameEnd = parts_.type = parts_.typeEnd = text_.size();
+  }
   if (width_ != 0)
   {
-    line = strict_ || width_ >= typeBegin + 3 ? cutToWidth(line, width_) : line.substr(0, nameEnd);
+    const bool fits = strict_ || width_ >= parts_.type + 3;
+    text_ = fits ? cutToWidth(text_, width_) : text_.substr(0, parts_.nameEnd);
   }
-  const auto part = [&](size_t begin, size_t end) {
-    return line.substr(std::min(begin, line.size()), std::min(end, line.size()) - std::min(begin, line.size()));
-  };
-  out_.write(colours_.offset + part(0, nameBegin) + colours_.plain + (bad.empty() ? colours_.name : colours_.bad) +
-             part(nameBegin, nameEnd) + colours_.plain + part(nameEnd, typeBegin) + colours_.type +
-             part(typeBegin, typeEnd) + colours_.plain + part(typeEnd, line.size()) + "\n");
+  text_ += '\n';
   ++lines_;
+  if (*colours_.plain == '\0')
+  {
+    out_.write(text_);
+    return;
+  }
+  const std::string_view line = std::string_view(text_).substr(0, text_.size() - 1);
+  const auto part = [&](size_t begin, size_t end) {
+    return std::string(line.substr(std::min(begin, line.size()), end - std::min(begin, end)));
+  };
+  out_.write(colours_.offset + part(0, parts_.name) + colours_.plain + (parts_.bad ? colours_.bad : colours_.name) +
+             part(parts_.name, parts_.nameEnd) + colours_.plain + part(parts_.nameEnd, parts_.type) + colours_.type +
+             part(parts_.type, parts_.typeEnd) + colours_.plain + part(parts_.typeEnd, line.size()) + "\n");
 }
 
 int run(const Invocation& invocation)

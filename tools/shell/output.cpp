@@ -341,8 +341,11 @@ void Output::write(std::span<const uint8_t> bytes)
 void Output::flush()
 {
   // Taken out first: what failed once is not written again when the object goes.
-  const std::string pending = std::exchange(buffer_, {});
+  std::string pending;
+  pending.swap(buffer_);
   writeOut(pending.data(), pending.size());
+  pending.clear();
+  buffer_.swap(pending); // its room is needed again
 }
 
 void Output::commit()

@@ -3,7 +3,7 @@
 #pragma once
 
 #include <array>
-#include <cstdio>
+#include <charconv>
 #include <cstdlib>
 #include <cstring>
 #include <string>
@@ -78,8 +78,28 @@ inline void appendHex(std::string& to, const uint8_t* bytes, size_t size)
   }
 }
 
-/// A moment with the offset of its time zone: "2024-05-01T12:20:30.123456+02:00"; of a year beyond 9999 the seconds.
-inline std::string timeText(const TAVTimeStamp& stamp)
+template<class Number>
+void appendNumber(std::string& to, Number number)
+{
+  std::array<char, 24> digits;
+  const std::to_chars_result end = std::to_chars(digits.data(), digits.data() + digits.size(), number);
+  to.append(digits.data(), end.ptr);
+}
+
+/// Writes the last digits of a number, so many, and returns the place behind them.
+inline char* putDigits(char* at, uint32_t number, unsigned count)
+{
+  char* const end = at + count;
+  for (char* digit = end; digit != at; number /= 10)
+  {
+    *--digit = static_cast<char>('0' + number % 10);
+  }
+  return end;
+}
+
+/// Appends a moment with the offset of its time zone: "2024-05-01T12:20:30.123456+02:00"; of a year beyond 9999 the
+/// seconds.
+inline void appendTime(std::string& to, const TAVTimeStamp& stamp)
 {
   constexpr uint64_t endOf9999 = 253402300800;
   constexpr uint64_t million = 1'000'000;
@@ -88,7 +108,9 @@ inline std::string timeText(const TAVTimeStamp& stamp)
   const int64_t shift = static_cast<int64_t>(fraction / million) + int64_t{stamp.offsetMinutes} * 60;
   if (stamp.seconds >= endOf9999 || static_cast<int64_t>(stamp.seconds) + shift >= static_cast<int64_t>(endOf9999))
   {
-    return std::to_string(stamp.seconds) + " s";
+    appendNumber(to, stamp.seconds);
+    to += " s";
+    return;
   }
   constexpr int64_t daySeconds = 24 * 60 * 60;
   const int64_t seconds = static_cast<int64_t>(stamp.seconds) + shift;
@@ -96,11 +118,28 @@ inline std::string timeText(const TAVTimeStamp& stamp)
   const auto clock = static_cast<uint32_t>(seconds - days * daySeconds);
   const Date date = dateOf(days);
   const auto east = static_cast<unsigned>(std::abs(int{stamp.offsetMinutes}));
-  std::array<char, 64> text{};
-  std::snprintf(text.data(), text.size(), "%04d-%02u-%02uT%02u:%02u:%02u.%06u%c%02u:%02u", static_cast<int>(date.year),
-                date.month, date.day, clock / 3600, clock / 60 % 60, clock % 60,
-                static_cast<unsigned>(fraction % million), stamp.offsetMinutes < 0 ? '-' : '+', east / 60, east % 60);
-  return text.data();
+  std::array<char, 40> text;
+  char* at = putDigits(text.data(), static_cast<uint32_t>(date.year), 4);
+  const auto put = [&at](char before, uint32_t number, unsigned count) {
+    *at = before;
+    at = putDigits(at + 1, number, count);
+  };
+  put('-', date.month, 2);
+  put('-', date.day, 2);
+  put('T', clock / 3600, 2);
+  put(':', clock / 60 % 60, 2);
+  put(':', clock % 60, 2);
+  put('.', static_cast<uint32_t>(fraction % million), 6);
+  put(stamp.offsetMinutes < 0 ? '-' : '+', east / 60, east >= 6000 ? 3 : 2);
+  put(':', east % 60, 2);
+  to.append(text.data(), at);
+}
+
+inline std::string timeText(const TAVTimeStamp& stamp)
+{
+  std::string text;
+  appendTime(text, stamp);
+  return text;
 }
 
 /// The digits of a 128-bit number without a sign.

@@ -20,6 +20,9 @@ namespace tav::inspect
 /// The tag of an element when it stands for this id alone and can be written in a path, else "#id".
 TAV_INSPECT_API std::string elementText(uint16_t elm);
 
+/// Appends it.
+TAV_INSPECT_API void appendElementText(std::string& out, uint16_t elm);
+
 /// Appends "/tag", "/tag[3]" or "/tag[@0x1a40]": the step that leads to `node` from its parent. The first of its id
 /// gets no index, as the first match is what every command takes.
 TAV_INSPECT_API void appendStep(std::string& path, const Node& node);

@@ -2,6 +2,9 @@
 /// Numbers, offsets and codes as people read them.
 #pragma once
 
+#include <array>
+#include <charconv>
+#include <concepts>
 #include <cstdint>
 #include <string>
 #include <string_view>
@@ -13,6 +16,22 @@ namespace tav::inspect
 
 /// The sentence of a library code, as codes.h has it.
 TAV_INSPECT_API std::string_view codeSentence(uint32_t code);
+
+/// Appends a number in decimal, or in another base.
+template<std::integral Number>
+void appendNumber(std::string& out, Number number, int base = 10)
+{
+  std::array<char, 24> digits;
+  const std::to_chars_result end = std::to_chars(digits.data(), digits.data() + digits.size(), number, base);
+  out.append(digits.data(), end.ptr);
+}
+
+/// Appends "0x1a40".
+inline void appendHexOffset(std::string& out, uint64_t offset)
+{
+  out += "0x";
+  appendNumber(out, offset, 16);
+}
 
 /// "0x1a40"
 TAV_INSPECT_API std::string hexOffset(uint64_t offset);

@@ -26,10 +26,18 @@ TAV_INSPECT_API std::vector<uint8_t> payloadBytes(ByteSource& source, const Form
 /// bytes of the payload are read; " ..." shows that there are more. A group has no value: empty.
 TAV_INSPECT_API std::string valueText(ByteSource& source, const Form& form, const Node& node, uint64_t most);
 
+/// Appends it.
+TAV_INSPECT_API void appendValueText(std::string& out, ByteSource& source, const Form& form, const Node& node,
+                                     uint64_t most);
+
 /// The value as plain text: a string is its characters as they are, the rest as in valueText. Only for values that fit
 /// in memory; nothing for a value of more than `most` bytes, which is to be copied piece by piece.
 TAV_INSPECT_API std::optional<std::string> plainText(ByteSource& source, const Form& form, const Node& node,
                                                      uint64_t most);
+
+/// Appends it; false, and nothing, for a value of more than `most` bytes.
+TAV_INSPECT_API bool appendPlainText(std::string& out, ByteSource& source, const Form& form, const Node& node,
+                                     uint64_t most);
 
 /// The name of a type for people: "Uint32"; "group" for both kinds of groups; "type 12345".
 TAV_INSPECT_API std::string typeText(uint16_t type);

@@ -119,6 +119,8 @@ public:
   /// one leads back to the node as a Path: steps are tags, or ids where a tag is not unique, and the place among the
   /// siblings of that name.
   TAV_INSPECT_API std::string path(const Event& event, PathStyle style = PathStyle::whole) const;
+  /// Appends it.
+  TAV_INSPECT_API void appendPath(std::string& out, const Event& event, PathStyle style = PathStyle::whole) const;
 
   /// Directly after the nodeBegin of a group: what is needed to walk through it once more, at any time.
   TAV_INSPECT_API Mark mark() const;

@@ -13,26 +13,34 @@
 namespace tav::detail::paths
 {
 
-/// Bytes in hexadecimal digits.
-inline std::string digitsOf(const uint8_t* bytes, size_t size)
+/// Appends bytes in hexadecimal digits.
+inline void appendDigits(std::string& to, const uint8_t* bytes, size_t size)
 {
   constexpr std::string_view digits = "0123456789abcdef";
-  std::string text;
-  text.reserve(2 * size);
+  const size_t before = to.size();
+  to.resize(before + 2 * size);
+  char* at = to.data() + before;
   for (size_t i = 0; i < size; ++i)
   {
-    text += digits[bytes[i] >> 4U];
-    text += digits[bytes[i] & 0xFU];
+    *at++ = digits[bytes[i] >> 4U];
+    *at++ = digits[bytes[i] & 0xFU];
   }
-  return text;
 }
 
 template<class Number>
-bool appendLong(const RawValue& raw, std::string& text)
+void appendNumber(std::string& to, const RawValue& raw)
+{
+  Number number{};
+  static_cast<void>(decode(raw, number));
+  detail::appendNumber(to, number);
+}
+
+template<class Number>
+bool appendLong(std::string& to, const RawValue& raw)
 {
   Number number;
   const bool isOne = decode(raw, number) == TAV_RC_OK;
-  text = isOne ? longText(number) : text;
+  to += isOne ? longText(number) : std::string();
   return isOne;
 }
 
@@ -42,52 +50,66 @@ constexpr bool hasText(uint16_t type, uint64_t size) noexcept
   return size > (type == TAV_TYPE_UTF8_STRING && size >= 2 ? 2U : 0U);
 }
 
-/// Numbers in decimal, texts as they are, moments with their zone, words in brackets; what has no value, for its type
-/// or its size, as its bytes in hexadecimal.
-inline std::string plainText(const RawValue& raw)
+/// Appends words in brackets; false when there are none.
+inline bool appendWords(std::string& to, const RawValue& raw)
+{
+  std::vector<uint64_t> words;
+  if (decode(raw, words) != TAV_RC_OK)
+  {
+    return false;
+  }
+  to += '[';
+  for (size_t i = 0; i != words.size(); ++i)
+  {
+    to += i == 0 ? "" : " ";
+    detail::appendNumber(to, words[i]);
+  }
+  to += ']';
+  return true;
+}
+
+/// Appends a value. Numbers in decimal, texts as they are, moments with their zone, words in brackets; what has no
+/// value, for its type or its size, as its bytes in hexadecimal.
+inline void appendPlainText(std::string& to, const RawValue& raw)
 {
   const layout::TypeInfo& info = layout::typeInfo(raw.type);
   if (!info.known || (info.valueSize != 0 && info.valueSize != raw.size))
   {
-    return digitsOf(raw.bytes, raw.length());
+    return appendDigits(to, raw.bytes, raw.length());
   }
   switch (raw.type)
   {
-  case TAV_TYPE_ASCII_STRING: return {reinterpret_cast<const char*>(raw.bytes), raw.length()};
-  case TAV_TYPE_UINT8: return numberText<uint8_t>(raw);
-  case TAV_TYPE_SINT8: return numberText<int8_t>(raw);
-  case TAV_TYPE_UINT16: return numberText<uint16_t>(raw);
-  case TAV_TYPE_SINT16: return numberText<int16_t>(raw);
-  case TAV_TYPE_UINT32: return numberText<uint32_t>(raw);
-  case TAV_TYPE_SINT32: return numberText<int32_t>(raw);
-  case TAV_TYPE_UINT64: return numberText<uint64_t>(raw);
-  case TAV_TYPE_SINT64: return numberText<int64_t>(raw);
+  case TAV_TYPE_ASCII_STRING: to.append(reinterpret_cast<const char*>(raw.bytes), raw.length()); return;
+  case TAV_TYPE_UINT8: return appendNumber<uint8_t>(to, raw);
+  case TAV_TYPE_SINT8: return appendNumber<int8_t>(to, raw);
+  case TAV_TYPE_UINT16: return appendNumber<uint16_t>(to, raw);
+  case TAV_TYPE_SINT16: return appendNumber<int16_t>(to, raw);
+  case TAV_TYPE_UINT32: return appendNumber<uint32_t>(to, raw);
+  case TAV_TYPE_SINT32: return appendNumber<int32_t>(to, raw);
+  case TAV_TYPE_UINT64: return appendNumber<uint64_t>(to, raw);
+  case TAV_TYPE_SINT64: return appendNumber<int64_t>(to, raw);
   default: break;
   }
-  std::string text;
   Utf8 view;
   TAVTimeStamp stamp{};
-  std::vector<uint64_t> words;
   if (decode(raw, view) == TAV_RC_OK)
   {
-    text = view.text;
+    to += view.text;
   }
   else if (decode(raw, stamp) == TAV_RC_OK)
   {
-    text = timeText(stamp);
+    appendTime(to, stamp);
   }
-  else if (decode(raw, words) == TAV_RC_OK)
+  else if (!appendWords(to, raw) && !appendLong<Uint128>(to, raw) && !appendLong<Sint128>(to, raw))
   {
-    for (const uint64_t word : words)
-    {
-      text += (text.empty() ? "" : " ") + std::to_string(word);
-    }
-    text = '[' + text + ']';
+    appendDigits(to, raw.bytes, raw.length());
   }
-  else if (!appendLong<Uint128>(raw, text) && !appendLong<Sint128>(raw, text))
-  {
-    text = digitsOf(raw.bytes, raw.length());
-  }
+}
+
+inline std::string plainText(const RawValue& raw)
+{
+  std::string text;
+  appendPlainText(text, raw);
   return text;
 }
 
