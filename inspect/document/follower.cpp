@@ -2,11 +2,10 @@
 
 #include <algorithm>
 #include <array>
-#include <chrono>
+#include <utility>
 
 #include "inspect/document/state.h"
 #include "inspect/document/streamWalk.h"
-#include "kor/fileWatch.h"
 #include "tav/inspect/fileKind.hpp"
 #include "tav/inspect/path.hpp"
 #include "tav/inspect/phrases.hpp"
@@ -17,6 +16,8 @@ namespace tav::inspect
 
 namespace
 {
+
+constexpr uint64_t kRingBytes = uint64_t{1} << 20U;
 
 bool isBlank(const TAVHeader& header)
 {
@@ -45,18 +46,25 @@ uint64_t neededEnd(const TAVHeader& header)
 
 bool Follower::open()
 {
+  std::unique_ptr<ByteSource> file;
   try
   {
-    file_ = ByteSource::open(path_, options_.ringBytes);
+    file = ByteSource::open(path_, options_.ringBytes);
   }
   catch (const Error& error)
   {
     if (codeOf(error.code()) == KOR_RC_NO_SUCH_FILE)
     {
+      if (!std::exchange(isMissing_, true))
+      {
+        tellChange(FileChange::missing);
+      }
       return false; // it may come
     }
     throw;
   }
+  endOpenRoot();
+  file_ = std::move(file);
   beginAnew();
   return true;
 }
@@ -65,8 +73,12 @@ void Follower::beginAnew()
 {
   former_ = form_ ? form_ : former_;
   form_.reset();
+  formBefore_.reset();
   root_ = {};
+  rootBefore_ = {};
+  roots_.clear();
   levels_.clear();
+  above_.clear();
   reached_ = 0;
 }
 
@@ -78,26 +90,54 @@ uint64_t Follower::goOn(bool quiet)
   {
     return 0;
   }
+  if (now_ == nullptr && std::exchange(isMissing_, false))
+  {
+    tellChange(FileChange::appeared);
+  }
   const auto& storage = static_cast<TAVSSFile&>(file_->storage());
   readOn();
   if (!storage.pFile->isAt(path_.c_str()))
   {
-    readOn(); // what came before it lost its name
-    if (open())
-    {
-      readOn();
-    }
+    goOver();
   }
   return count_;
 }
 
+/// The file that is open has lost its name.
+void Follower::goOver()
+{
+  readOn(); // what came before
+  if (open())
+  {
+    tellChange(std::exchange(isMissing_, false) ? FileChange::appeared : FileChange::replaced);
+    readOn();
+  }
+}
+
+/// The file is let go of: nothing more is to come of a root that is open in it.
+void Follower::endOpenRoot()
+{
+  if (!levels_.empty())
+  {
+    hand(told_.rootEnd, above_.front(), {});
+  }
+}
+
+void Follower::tellChange(FileChange change)
+{
+  if (told_.change)
+  {
+    told_.change(change);
+  }
+}
+
 void Follower::readOn()
 {
-  constexpr uint64_t ringBytes = uint64_t{1} << 20U;
   reader_.reset();
-  now_ = file_->window(0, ringBytes);
-  if (now_->size() < reached_ || !isSame())
+  now_ = file_->window(0, kRingBytes);
+  if (now_->size() < reached_ || (!isSame() && !goBack()))
   {
+    tellChange(FileChange::shortened);
     beginAnew();
   }
   if (!form_ && !findForm())
@@ -150,6 +190,22 @@ FormChoice Follower::choiceNow()
   return choice;
 }
 
+/// A root that was taken back leaves the one before it in its place. False when that is gone, too.
+bool Follower::goBack()
+{
+  root_ = std::exchange(rootBefore_, {});
+  form_ = formBefore_;
+  const bool isThere = root_.hdrType != 0 && form_ && isSame();
+  if (isThere && !levels_.empty())
+  {
+    --roots_[layout::elmOf(levels_.front().group)];
+    reached_ = behindHeader(root_);
+    levels_.clear();
+    above_.clear();
+  }
+  return isThere;
+}
+
 /// Whether the root is still there: a file can be emptied and filled again between two looks.
 bool Follower::isSame()
 {
@@ -193,8 +249,9 @@ bool Follower::nextRoot()
     start = {.offset = root_.nodeOffset, .wide = layout::is64(root_)};
     form.root64 = layout::is64(root_);
   }
+  std::vector<PassedOver> passed; // what is at the end may be a part of what is being written
   StreamWalk walk(
-      *now_, form, [](const PassedOver&) {}, start);
+      *now_, form, [&passed](const PassedOver& place) { passed.push_back(place); }, start);
   Event event;
   for (bool isPast = root_.hdrType == 0; walk.next(event);)
   {
@@ -204,10 +261,11 @@ bool Follower::nextRoot()
     }
     if (isPast)
     {
+      tellBetween(passed);
       const bool isOther = !(walk.form() == *form_);
-      form_ = walk.form();
+      formBefore_ = std::exchange(form_, walk.form());
       reader_ = isOther ? nullptr : std::move(reader_);
-      root_ = event.node.header;
+      rootBefore_ = std::exchange(root_, event.node.header);
       arrive(root_, {});
       return true;
     }
@@ -215,6 +273,19 @@ bool Follower::nextRoot()
     walk.skip();
   }
   return false;
+}
+
+/// Tells what was passed over between the last root and the next; what is in the root was told when it was read.
+void Follower::tellBetween(const std::vector<PassedOver>& passed)
+{
+  const uint64_t end = root_.hdrType == 0 ? 0 : layout::addSaturated(behindHeader(root_), layout::sizeOf(root_));
+  for (const PassedOver& place : passed)
+  {
+    if (told_.damage && !quiet_ && place.offset >= end)
+    {
+      told_.damage(place);
+    }
+  }
 }
 
 bool Follower::nextChild()
@@ -235,7 +306,7 @@ bool Follower::nextChild()
     leave();
     return true;
   }
-  return refresh() || !waits(rc == TAV_RC_DATA_TOO_LARGE && isThere);
+  return refresh() || !waits(rc, rc == TAV_RC_DATA_TOO_LARGE && isThere);
 }
 
 /// A node was read where the next child of the innermost group would be. It is one unless the group was closed before.
@@ -259,7 +330,7 @@ bool Follower::takeChild(const TAVHeader& child)
 }
 
 /// Whether there is nothing to do but wait for more bytes. Damage in a group that is there as a whole ends the group.
-bool Follower::waits(bool isLarge)
+bool Follower::waits(uint32_t rc, bool isLarge)
 {
   if (isLarge)
   {
@@ -274,8 +345,27 @@ bool Follower::waits(bool isLarge)
   {
     return true;
   }
+  tellCut(levels_.back(), end, rc);
   leave();
   return false;
+}
+
+/// Damage has ended a group that is there as a whole: what is behind its last sound child was passed over.
+void Follower::tellCut(const Level& level, uint64_t end, uint32_t rc)
+{
+  const TAVHeader& last = level.last;
+  const uint64_t from = last.hdrType == 0 ? behindHeader(level.group)
+                                          : layout::addSaturated(behindHeader(last), layout::sizeOf(last));
+  if (!told_.damage || quiet_ || from >= end)
+  {
+    return;
+  }
+  PassedOver passed{.offset = from, .length = end - from};
+  passed.code = rc == TAV_RC_OK ? TAV_RC_BAD_HDR_TYPE : rc;
+  passed.path = pathText({above_.back(), std::span(above_).first(above_.size() - 1), *now_, *form_}, PathStyle::brief);
+  passed.reason = codeSentence(passed.code);
+  passed.sentence = "passed over " + counted(passed.length, "byte") + ": " + passed.reason;
+  told_.damage(passed);
 }
 
 /// Reads the innermost group's header again; true when it has changed: the group was closed, or taken back.
@@ -290,8 +380,21 @@ bool Follower::refresh()
   if (!isSameNode(header, top.group))
   {
     const TAVHeader before = top.before;
+    const uint16_t elm = layout::elmOf(top.group);
+    if (levels_.size() == 1)
+    {
+      now_ = file_->window(0, kRingBytes); // in which the root is not any more
+      reader_.reset();
+      if (!goBack())
+      {
+        beginAnew();
+      }
+      return true;
+    }
     levels_.pop_back();
-    levels_.empty() ? beginAnew() : void(levels_.back().last = before);
+    above_.pop_back();
+    levels_.back().last = before;
+    --levels_.back().counts[elm];
     return true;
   }
   const bool isOther = layout::sizeOf(header) != layout::sizeOf(top.group);
@@ -303,9 +406,14 @@ void Follower::leave()
 {
   const TAVHeader group = levels_.back().group;
   levels_.pop_back();
+  const Node node = above_.back();
+  above_.pop_back();
   if (levels_.empty())
   {
     root_ = group;
+    Node ended = nodeOf(group);
+    ended.ordinal = node.ordinal;
+    hand(told_.rootEnd, ended, {});
   }
   else
   {
@@ -313,18 +421,56 @@ void Follower::leave()
   }
 }
 
-void Follower::arrive(const TAVHeader& node, const TAVHeader& before)
+void Follower::arrive(const TAVHeader& header, const TAVHeader& before)
 {
   ++count_;
-  reached_ = std::max(reached_, behindHeader(node));
-  if (layout::isGroup(node))
+  reached_ = std::max(reached_, behindHeader(header));
+  Node node = nodeOf(header);
+  node.ordinal = ++(levels_.empty() ? roots_ : levels_.back().counts)[node.elm()];
+  hand(told_.node, node, above_);
+  if (node.isGroup())
   {
-    levels_.push_back({node, before, {}});
+    levels_.push_back({.group = header, .before = before});
+    above_.push_back(node);
   }
-  if (quiet_)
+  if (onNode_ && !quiet_)
+  {
+    handRead(header);
+  }
+}
+
+Node Follower::nodeOf(const TAVHeader& header) const
+{
+  Node node{.header = header, .depth = levels_.size(), .limit = neededEnd(header)};
+  node.parentOffset = above_.empty() ? kNoOffset : above_.back().offset();
+  if (node.isGroup() && layout::isSizeUnknown(header))
+  {
+    node.flags = kOpen;
+    node.limit = now_->size();
+  }
+  else if (node.isGroup())
+  {
+    node.limit = layout::addSaturated(behindHeader(header), layout::sizeOf(header));
+  }
+  return node;
+}
+
+/// Bytes near the end may have been written since `now_` has read their page: there they are read anew.
+void Follower::hand(const std::function<void(const Arrival&)>& to, const Node& node, std::span<const Node> above)
+{
+  constexpr uint64_t changing = uint64_t{1} << 20U;
+  constexpr uint64_t ringBytes = uint64_t{64} * 1024;
+  if (!to || quiet_)
   {
     return;
   }
+  const bool isNearEnd = layout::addSaturated(node.limit, changing) > now_->size();
+  const auto fresh = isNearEnd ? file_->window(0, ringBytes) : nullptr;
+  to({node, above, fresh != nullptr ? *fresh : *now_, *form_});
+}
+
+void Follower::handRead(const TAVHeader& node)
+{
   std::error_code ec;
   const tav::Node read = reader().at(node.nodeOffset, layout::is64(node) ? Width::bits64 : Width::bits32, ec);
   if (ec)
@@ -336,34 +482,6 @@ void Follower::arrive(const TAVHeader& node, const TAVHeader& before)
                         .code = code});
   }
   onNode_(read);
-}
-
-FollowEnd Document::follow(const std::function<void(const tav::Node&)>& onNode, const FollowOptions& options) const
-{
-  using Clock = std::chrono::steady_clock;
-  constexpr std::chrono::milliseconds longestWait(100); // how long a stop, or what no watch says of, can take
-  if (state_->path.empty())
-  {
-    throw Error(Problem{.file = state_->source->name(),
-                        .sentence = "only a file that was opened by its path, from its first byte on, can be followed",
-                        .code = TAV_RC_NOT_SUPPORTED});
-  }
-  kor::FileWatch watch(state_->path);
-  Follower follower(state_->path, state_->options, onNode, options.stop);
-  follower.goOn(!options.existing);
-  auto last = Clock::now();
-  while (!options.stop.stop_requested())
-  {
-    watch.wait(static_cast<uint32_t>(longestWait.count()));
-    const uint64_t count = follower.goOn();
-    const auto now = Clock::now();
-    last = count != 0 ? now : last;
-    if (options.timeout.count() != 0 && now - last >= options.timeout)
-    {
-      return FollowEnd::timedOut;
-    }
-  }
-  return FollowEnd::stopped;
 }
 
 } // namespace tav::inspect

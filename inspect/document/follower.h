@@ -3,14 +3,17 @@
 
 #include <cstdint>
 #include <functional>
+#include <map>
 #include <memory>
 #include <optional>
+#include <span>
 #include <stop_token>
 #include <string>
 #include <utility>
 #include <vector>
 
 #include "tav/inspect/document.hpp"
+#include "tav/inspect/follow.hpp"
 
 namespace tav::inspect
 {
@@ -24,18 +27,24 @@ public:
 
   Follower(std::string path, const DocumentOptions& options, const OnNode& onNode, std::stop_token stop)
       : path_(std::move(path)), options_(options), onNode_(onNode), stop_(std::move(stop)) {}
+  /// The same for who wants to know more than the nodes.
+  Follower(std::string path, const DocumentOptions& options, const FollowTold& told, std::stop_token stop)
+      : path_(std::move(path)), options_(options), told_(told), stop_(std::move(stop)) {}
 
   /// Reads all that is there now, also of a file that took the place. Returns how many nodes were new. With `quiet`
   /// they are passed over. Throws Error, and what the callback throws.
   uint64_t goOn(bool quiet = false);
 
 private:
+  using Counts = std::map<uint16_t, uint64_t>; ///< of siblings, by their ids
+
   /// A group around the place.
   struct Level
   {
     TAVHeader group{};
     TAVHeader before{}; ///< the child of the group around that is before this one; header type 0: none
     TAVHeader last{};   ///< the child that was read last; header type 0: none
+    Counts counts{};    ///< of its children
   };
 
   bool open();
@@ -46,8 +55,17 @@ private:
   bool nextRoot();
   bool nextChild();
   bool takeChild(const TAVHeader& child);
-  bool waits(bool isLarge);
+  bool waits(uint32_t rc, bool isLarge);
   void arrive(const TAVHeader& node, const TAVHeader& before);
+  void hand(const std::function<void(const Arrival&)>& to, const Node& node, std::span<const Node> above);
+  void handRead(const TAVHeader& node);
+  Node nodeOf(const TAVHeader& header) const;
+  void tellChange(FileChange change);
+  void tellCut(const Level& level, uint64_t end, uint32_t rc);
+  void tellBetween(const std::vector<PassedOver>& passed);
+  void goOver();
+  void endOpenRoot();
+  bool goBack();
   bool refresh();
   FormChoice choiceNow();
   bool readHeader(const TAVHeader& like, bool swapped, TAVHeader& header);
@@ -56,16 +74,22 @@ private:
 
   std::string path_;
   DocumentOptions options_;
-  const OnNode& onNode_;
+  OnNode onNode_{};
+  FollowTold told_{};
   std::stop_token stop_;
   bool quiet_ = false;
+  bool isMissing_ = false;                ///< and that was told
   std::unique_ptr<ByteSource> file_{};    ///< whose storage sees the file as it is at any time
   std::unique_ptr<ByteSource> now_{};     ///< the file as it was when reading began this time
   std::unique_ptr<tav::Reader> reader_{}; ///< of this time, too: what it has cached may change
   std::optional<Form> former_{};          ///< the last form that was read
   std::optional<Form> form_{};            ///< of the present stream; nothing before one is recognised
   TAVHeader root_{};                      ///< the present root, or the last one; header type 0: none yet
+  TAVHeader rootBefore_{};                ///< the one before it
+  std::optional<Form> formBefore_{};      ///< of that one
+  Counts roots_{};                        ///< how many there were
   std::vector<Level> levels_{};           ///< from the present root on; empty between roots
+  std::vector<Node> above_{};             ///< the groups of the levels
   uint64_t reached_ = 0;                  ///< behind the header of the last node
   uint64_t count_ = 0;
 };

@@ -1,4 +1,5 @@
 // Paths over the walker.
+#include <algorithm>
 #include <optional>
 #include <span>
 #include <utility>
@@ -199,6 +200,14 @@ PathMatcher PathMatcher::below(const Path& path)
   return PathMatcher(std::move(state));
 }
 
+bool PathMatcher::looksAhead(const Path& path)
+{
+  const paths::Compiled& compiled = path.compiled();
+  const auto hasParents = [&compiled](uint32_t route) { return compiled.routes[route].hasParents; };
+  return compiled.keepsPlaces || !compiled.expressions.empty() ||
+         std::any_of(compiled.main.begin(), compiled.main.end(), hasParents);
+}
+
 bool PathMatcher::leavesStart(const Path& path)
 {
   return path.compiled().leavesStart;
@@ -218,6 +227,11 @@ bool PathMatcher::matches(const Walker& walker, const Event& event)
     state.matcher.begin(std::span(&place, 1));
   }
   return state.matcher.give(place, static_cast<size_t>(event.depth + state.levels));
+}
+
+bool PathMatcher::matches(const Node& node)
+{
+  return state_->matcher.give({node, false, std::nullopt}, static_cast<size_t>(node.depth + state_->levels));
 }
 
 bool PathMatcher::reachesBelow() const

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cstring>
 
+#include "inspect/walk/pathSteps.h"
 #include "tav/inspect/path.hpp"
 #include "tav/inspect/value.hpp"
 
@@ -223,18 +224,9 @@ std::string Schema::pathText(const std::vector<uint16_t>& steps, PathStyle style
   {
     return "/**/" + elementText(steps.back());
   }
-  const bool cut = style == PathStyle::brief && steps.size() > kWholeSteps;
-  std::string text;
-  for (size_t i = 0; i < steps.size(); ++i)
-  {
-    if (cut && i == kFirstSteps)
-    {
-      text += "/\xE2\x80\xA6";
-      i = steps.size() - kLastSteps;
-    }
-    text += "/" + elementText(steps[i]);
-  }
-  return text;
+  return textOfSteps(steps.size(), style, [&steps](std::string& text, uint64_t i) {
+    text += "/" + elementText(steps[static_cast<size_t>(i)]);
+  });
 }
 
 void Schema::each(PathStyle style, const std::function<void(const SchemaEntry&)>& told, uint64_t mostSteps) const

@@ -4,6 +4,7 @@
 #include <utility>
 
 #include "inspect/walk/mostCounts.h"
+#include "inspect/walk/pathSteps.h"
 #include "inspect/walk/prober.h"
 #include "tav/inspect/path.hpp"
 #include "tav/inspect/phrases.hpp"
@@ -489,16 +490,9 @@ void Walker::appendPath(std::string& out, const Event& event, PathStyle style) c
 {
   const uint64_t groups = std::min<uint64_t>(event.depth, frames_.size() - 1);
   const uint64_t steps = groups + (event.node.header.hdrType != 0 ? 1 : 0);
-  const bool cut = style == PathStyle::brief && steps > kWholeSteps;
-  for (uint64_t i = 1; i <= steps; ++i)
-  {
-    if (cut && i == kFirstSteps + 1)
-    {
-      out += "/\xE2\x80\xA6";
-      i = steps - kLastSteps + 1;
-    }
-    appendStep(out, i <= groups ? frames_[static_cast<size_t>(i)].node : event.node);
-  }
+  appendSteps(out, steps, style, [&](std::string& to, uint64_t i) {
+    appendStep(to, i < groups ? frames_[static_cast<size_t>(i) + 1].node : event.node);
+  });
   out += steps == 0 ? "/" : "";
 }
 

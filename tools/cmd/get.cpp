@@ -10,6 +10,7 @@
 #include "tav/inspect/path.hpp"
 #include "tav/inspect/value.hpp"
 #include "tav/inspect/walker.hpp"
+#include "tools/cmd/following.h"
 #include "tools/host/host.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
@@ -36,7 +37,10 @@ struct Wanted
     const Path path(text, fault);
     switch (fault.kind)
     {
-    case PathFault::Kind::none: matcher.emplace(path); break;
+    case PathFault::Kind::none:
+      matcher.emplace(path);
+      looksAhead = PathMatcher::looksAhead(path);
+      break;
     case PathFault::Kind::malformed: throw pathError(text, fault);
     default: // the other paths are followed all the same
       problem.sentence += ": column " + std::to_string(fault.column) + ": " + fault.sentence;
@@ -45,16 +49,26 @@ struct Wanted
 
   bool isOpen(bool all) const { return matcher && (all || found == 0); }
 
+  /// What is followed begins again.
+  void beginAnew()
+  {
+    if (matcher)
+    {
+      matcher.emplace(Path(problem.path));
+    }
+  }
+
   std::optional<PathMatcher> matcher{}; ///< nothing for a name that no element has
   Problem problem;                      ///< when it has led nowhere
   uint64_t found = 0;
+  bool looksAhead = false;
 };
 
 class Getter
 {
 public:
   explicit Getter(const Invocation& invocation)
-      : stream_(openStream(invocation)), out_("-"), raw_(invocation.has("--raw")), json_(invocation.has("--json")),
+      : out_("-"), raw_(invocation.has("--raw")), json_(invocation.has("--json")),
         all_(invocation.has("--all")), paths_(invocation.has("--paths")), terminal_(host::isTerminal(stdout))
   {
     if (raw_ && terminal_)
@@ -73,28 +87,115 @@ public:
 
   Status run(const Invocation& invocation)
   {
-    DamageNotices notices(stream_);
-    walk(notices);
+    Stream stream = openStream(invocation);
+    DamageNotices notices(stream);
+    walk(stream, notices);
     out_.commit();
-    tellStatistics(invocation, stream_.bytes());
-    Status status = notices.tell();
+    tellStatistics(invocation, stream.bytes());
+    const Status status = notices.tell();
+    return tellMissing(stream.bytes().name()) ? kFindings : status;
+  }
+
+  /// Prints what comes: each node at once, or, where a path looks ahead, those of a root when it has ended.
+  Status follow(const Invocation& invocation)
+  {
+    all_ = true;
+    inspect::FollowTold told;
+    const auto isOpen = [this](const auto& wanted) { return wanted->isOpen(all_); };
+    const bool hasUnknown = !std::all_of(wanted_.begin(), wanted_.end(), isOpen) && tellUnknown(invocation);
+    if (isDone())
+    {
+      return kFindings;
+    }
+    if (std::any_of(wanted_.begin(), wanted_.end(), [](const auto& wanted) { return wanted->looksAhead; }))
+    {
+      told.rootEnd = [this](const inspect::Arrival& root) { walkRoot(root); };
+    }
+    else
+    {
+      told.node = [this](const inspect::Arrival& node) { take(node); };
+    }
+    told.change = [this](inspect::FileChange change) {
+      if (change != inspect::FileChange::missing)
+      {
+        std::for_each(wanted_.begin(), wanted_.end(), [](const auto& wanted) { wanted->beginAnew(); });
+      }
+    };
+    const Status status = followFile(invocation, told, out_);
+    return hasUnknown ? kFindings : status;
+  }
+
+private:
+  /// Tells of the paths that have led nowhere.
+  bool tellMissing(const std::string& file)
+  {
+    bool isAny = false;
     for (const auto& wanted : wanted_)
     {
       if (wanted->found == 0)
       {
-        status = kFindings;
-        wanted->problem.file = stream_.bytes().name();
+        isAny = true;
+        wanted->problem.file = file;
         report(wanted->problem);
       }
     }
-    return status;
+    return isAny;
   }
 
-private:
-  void walk(DamageNotices& notices)
+  /// Tells of the paths that can lead nowhere, before what the others lead to is waited for.
+  bool tellUnknown(const Invocation& invocation)
   {
-    Walker walker(stream_.bytes(), stream_.form());
-    Progress progress("get", stream_.bytes());
+    bool isAny = false;
+    for (const auto& wanted : wanted_)
+    {
+      if (!wanted->matcher)
+      {
+        isAny = true;
+        wanted->problem.file = invocation.arguments().at(0);
+        report(wanted->problem);
+      }
+    }
+    return isAny;
+  }
+
+  void take(const inspect::Arrival& arrival)
+  {
+    for (const auto& wanted : wanted_)
+    {
+      if (wanted->matcher && wanted->matcher->matches(arrival.node))
+      {
+        put(foundIn(arrival));
+      }
+    }
+  }
+
+  void walkRoot(const inspect::Arrival& root)
+  {
+    Walker walker(root.source, root.form, {.offset = root.node.offset(), .wide = root.node.is64()});
+    std::string first;
+    for (Event event; walker.next(event) && (event.what != What::nodeEnd || event.depth != 0);)
+    {
+      if (event.what != What::nodeBegin)
+      {
+        continue;
+      }
+      if (first.empty())
+      {
+        appendStep(first, event.node);
+      }
+      FoundNode found = foundIn(walker, event);
+      // The walk begins with this root, which is not the first of its name.
+      found.path = [&](PathStyle style) {
+        return inspect::pathText(root) + walker.path(event, style).substr(first.size());
+      };
+      visit(walker, event, found);
+    }
+  }
+
+  void walk(Stream& stream, DamageNotices& notices)
+  {
+    Walker walker(stream.bytes(), stream.form());
+    Progress progress("get", stream.bytes());
     Event event;
     while (!isDone() && walker.next(event))
     {
@@ -102,7 +203,7 @@ private:
       notices.see(walker, event);
       if (event.what == What::nodeBegin)
       {
-        visit(walker, event);
+        visit(walker, event, foundIn(walker, event));
       }
     }
   }
@@ -112,7 +213,7 @@ private:
     return std::none_of(wanted_.begin(), wanted_.end(), [this](const auto& wanted) { return wanted->isOpen(all_); });
   }
 
-  void visit(Walker& walker, const Event& event)
+  void visit(Walker& walker, const Event& event, const FoundNode& found)
   {
     bool reaches = false;
     for (const auto& wanted : wanted_)
@@ -124,7 +225,7 @@ private:
       if (wanted->matcher->matches(walker, event))
       {
         ++wanted->found;
-        put(walker, event);
+        put(found);
       }
       reaches = reaches || (wanted->isOpen(all_) && wanted->matcher->reachesBelow());
     }
@@ -134,51 +235,51 @@ private:
     }
   }
 
-  void put(const Walker& walker, const Event& event)
+  void put(const FoundNode& found)
   {
-    const Node& node = event.node;
+    const Node& node = found.node;
     if (raw_)
     {
-      copyPayload(node);
+      copyPayload(found);
       return;
     }
     if (json_)
     {
-      putJson(walker, event);
+      putJson(found);
       return;
     }
     if (paths_)
     {
-      out_.write(walker.path(event, PathStyle::brief) + "\t");
+      out_.write(found.path(PathStyle::brief) + "\t");
     }
     if (node.isGroup())
     {
       // A group has no value; its path and size tell that it is there.
-      out_.write((paths_ ? "" : walker.path(event, PathStyle::brief) + ": ") + "group of " +
+      out_.write((paths_ ? "" : found.path(PathStyle::brief) + ": ") + "group of " +
                  counted(node.limit - node.payloadOffset(), "byte"));
     }
-    else if (const auto text = plainText(stream_.bytes(), stream_.form(), node, kMostText))
+    else if (const auto text = plainText(found.source, found.form, node, kMostText))
     {
       out_.write(terminal_ ? forTerminal(*text) : *text);
     }
     else
     {
-      terminal_ ? showPayload(node) : copyPayload(node);
+      terminal_ ? showPayload(found) : copyPayload(found);
     }
     out_.write("\n");
   }
 
-  void putJson(const Walker& walker, const Event& event)
+  void putJson(const FoundNode& found)
   {
-    const Node& node = event.node;
+    const Node& node = found.node;
     nlohmann::ordered_json object;
-    object["path"] = event.depth <= kMostSteps ? walker.path(event) : offsetPath(node);
+    object["path"] = node.depth <= kMostSteps ? found.path(PathStyle::whole) : offsetPath(node);
     object["offset"] = node.offset();
     object["size"] = node.size();
     object["type"] = typeText(node.type());
     if (!node.isGroup())
     {
-      object["value"] = jsonValue(node);
+      object["value"] = jsonValue(found);
     }
     std::string text = object.dump();
     if (terminal_ && forTerminal(text) != text)
@@ -188,9 +289,10 @@ private:
     out_.write(text + "\n");
   }
 
-  nlohmann::ordered_json jsonValue(const Node& node)
+  static nlohmann::ordered_json jsonValue(const FoundNode& found)
   {
-    const std::string text = plainText(stream_.bytes(), stream_.form(), node, ~uint64_t{0}).value_or("");
+    const Node& node = found.node;
+    const std::string text = plainText(found.source, found.form, node, ~uint64_t{0}).value_or("");
     const uint16_t type = node.type();
     const auto& info = layout::typeInfo(type);
     const bool number = type >= TAV_TYPE_UINT8 && type <= TAV_TYPE_SINT64 && info.valueSize == node.size();
@@ -206,12 +308,13 @@ private:
     return text;
   }
 
-  void copyPayload(const Node& node)
+  void copyPayload(const FoundNode& found)
   {
+    const Node& node = found.node;
     const uint64_t end = node.isGroup() ? node.limit : node.payloadOffset() + node.size();
     for (uint64_t at = node.payloadOffset(); at < end;)
     {
-      const auto piece = stream_.bytes().view(at);
+      const auto piece = found.source.view(at);
       if (piece.empty())
       {
         return;
@@ -222,15 +325,16 @@ private:
     }
   }
 
-  void showPayload(const Node& node)
+  void showPayload(const FoundNode& found)
   {
+    const Node& node = found.node;
     constexpr size_t most = size_t{64} * 1024;
     const uint64_t end = node.payloadOffset() + node.size();
     std::vector<uint8_t> bytes;
     for (uint64_t at = node.payloadOffset(); at < end;)
     {
       bytes.resize(static_cast<size_t>(std::min<uint64_t>(most + 4, end - at)));
-      bytes.resize(stream_.bytes().read(at, bytes));
+      bytes.resize(found.source.read(at, bytes));
       const std::string_view text(reinterpret_cast<const char*>(bytes.data()), bytes.size());
       const size_t count = cutAtCharacter(text, most);
       if (count == 0)
@@ -242,7 +346,6 @@ private:
     }
   }
 
-  Stream stream_;
   Output out_;
   bool raw_;
   bool json_;
@@ -254,7 +357,8 @@ private:
 
 int run(const Invocation& invocation)
 {
-  return Getter(invocation).run(invocation);
+  Getter getter(invocation);
+  return invocation.has("--follow") ? getter.follow(invocation) : getter.run(invocation);
 }
 
 const Registration registration{{
@@ -274,15 +378,20 @@ const Registration registration{{
         "Every path that a command prints whole is understood. On a terminal control characters of texts are\n"
         "written as \\x1b, as 'tav tree' does. Exit status 1: a path leads nowhere, also by a name that no\n"
         "element has, or damage was passed over, which is told on standard error; the other values are printed.\n"
-        "2: a path is malformed.",
+        "2: a path is malformed.\n\n"
+        "With --follow every node that a path leads to is printed when it has come, until an interrupt, which is\n"
+        "no failure. Where a path asks for conditions, places or parents, those of a root are printed when the\n"
+        "root has been closed. Files that take the place of FILE are followed, and a line on standard error says so.",
     .options = {{.names = "-a,--all", .help = "every node that a path leads to, not only the first"},
                 {.names = "--raw", .help = "the payload's bytes as they stand in the file, without line ends"},
                 {.names = "--json", .help = "one JSON object a match: path, offset, size, type, value"},
-                {.names = "--paths", .help = "each value behind its path and a tab"}},
+                {.names = "--paths", .help = "each value behind its path and a tab"},
+                followOption()},
     .examples = {{"tav get x.tav /system/host/hostName", "one value"},
                  {"tav get x.tav --all --paths //hostName", "every host name in the file, with its path"},
                  {"tav get x.tav --all '//host[cpu/cpuOnline > 4]/hostName'", "those with many processors"},
-                 {"tav get x.tav --raw '/system/host[2]/#60123' > bytes", "the bytes of a value"}},
+                 {"tav get x.tav --raw '/system/host[2]/#60123' > bytes", "the bytes of a value"},
+                 {"tav get day.tav /system/host/memory/memFree --follow", "free memory, as it is recorded"}},
     .run = run,
 }};
 

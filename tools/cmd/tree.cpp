@@ -9,6 +9,7 @@
 #include "tav/inspect/phrases.hpp"
 #include "tav/inspect/value.hpp"
 #include "tav/inspect/walker.hpp"
+#include "tools/cmd/following.h"
 #include "tools/host/host.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
@@ -49,8 +50,8 @@ struct Parts
 class TreePrinter
 {
 public:
-  TreePrinter(const Invocation& invocation, Stream& stream)
-      : stream_(stream), out_("-"), colours_(wantsColour(invocation) ? kOnTerminal : Colours{}),
+  explicit TreePrinter(const Invocation& invocation)
+      : out_("-"), colours_(wantsColour(invocation) ? kOnTerminal : Colours{}),
         width_(static_cast<size_t>(host::terminalWidth().value_or(0))), paths_(invocation.has("--paths")),
         maxDepth_(invocation.number("--depth").value_or(kNoOffset)), ends_(invocation.has("--ends"))
   {
@@ -70,7 +71,7 @@ public:
   /// Prints what `walker` hands out from `event` on; `base` is the depth that is not indented.
   void print(Walker& walker, Event& event, uint64_t base, bool oneNode, DamageNotices& notices)
   {
-    Progress progress("tree", stream_.bytes());
+    Progress progress("tree", walker.source());
     base_ = base;
     named_ = oneNode ? event.offset : kNoOffset;
     bool seen = oneNode; // on the way to it
@@ -101,6 +102,17 @@ public:
     out_.commit();
   }
 
+  /// Prints each node as it comes.
+  Status follow(const Invocation& invocation)
+  {
+    folding_.reset();
+    inspect::FollowTold told;
+    told.node = [this](const inspect::Arrival& arrival) {
+      nodeLine(foundIn(arrival), arrival.node.depth);
+    };
+    return followFile(invocation, told, out_);
+  }
+
   bool printedNothing() const { return lines_ == 0; }
 
 private:
@@ -109,8 +121,8 @@ private:
   void fold(const Folded& folded);
   void indent(uint64_t level);
   void line(const Walker& walker, const Event& event, uint64_t base);
-  void nodeLine(const Walker& walker, const Event& event, uint64_t level);
-  void label(const Walker& walker, const Event& event, uint64_t level);
+  void nodeLine(const FoundNode& found, uint64_t level);
+  bool hasPaths() const { return paths_ || !only_.empty(); }
   void remarks(const Node& node);
   void begin(uint64_t offset, std::string_view size);
   void column(size_t begin, size_t width);
@@ -119,7 +131,6 @@ private:
   void value(std::string_view text);
   void put();
 
-  Stream& stream_;
   Output out_;
   Colours colours_;
   size_t width_;
@@ -183,22 +194,6 @@ bool TreePrinter::isLeftOut(const Node& node) const
   return only_.empty() ? end : !named;
 }
 
-void TreePrinter::label(const Walker& walker, const Event& event, uint64_t level)
-{
-  if (paths_ || !only_.empty())
-  {
-    walker.appendPath(text_, event, PathStyle::brief);
-    return;
-  }
-  indent(level);
-  if (event.what == What::nodeBegin)
-  {
-    const size_t slash = text_.size();
-    appendStep(text_, event.node);
-    text_.erase(slash, 1);
-  }
-}
-
 void TreePrinter::remarks(const Node& node)
 {
   static constexpr std::pair<NodeFlag, std::string_view> all[] = {
@@ -224,13 +219,13 @@ void TreePrinter::line(const Walker& walker, const Event& event, uint64_t base)
   if (event.what == What::damaged)
   {
     begin(event.offset, std::to_string(event.length));
-    label(walker, event, level);
+    hasPaths() ? walker.appendPath(text_, event, PathStyle::brief) : indent(level);
     bad("damaged");
     value(event.reason);
     put();
     return;
   }
-  const bool between = event.offset + event.length < stream_.bytes().size();
+  const bool between = event.offset + event.length < walker.source().size();
   if (event.what == What::unread ||
       (event.what == What::zeros && (between || event.length > uint64_t{2} * 1024 * 1024)))
   {
@@ -239,23 +234,37 @@ void TreePrinter::line(const Walker& walker, const Event& event, uint64_t base)
     put();
     return;
   }
-  if (event.what == What::nodeBegin && level <= maxDepth_ && !isLeftOut(event.node))
+  if (event.what == What::nodeBegin)
   {
-    nodeLine(walker, event, level);
+    nodeLine(foundIn(walker, event), level);
   }
 }
 
-void TreePrinter::nodeLine(const Walker& walker, const Event& event, uint64_t level)
+void TreePrinter::nodeLine(const FoundNode& found, uint64_t level)
 {
-  const Node& node = event.node;
+  const Node& node = found.node;
+  if (level > maxDepth_ || isLeftOut(node))
+  {
+    return;
+  }
   begin(node.offset(), node.has(kOpen) && node.size() != 0 ? "?" : std::to_string(node.size()));
-  label(walker, event, level);
+  if (hasPaths())
+  {
+    text_ += found.path(PathStyle::brief);
+  }
+  else
+  {
+    indent(level);
+    const size_t slash = text_.size();
+    appendStep(text_, node);
+    text_.erase(slash, 1);
+  }
   type(typeText(node.type()));
   value({});
   const size_t before = text_.size();
   if (!node.isGroup())
   {
-    appendValueText(text_, stream_.bytes(), stream_.form(), node, width_ != 0 ? width_ : kWideLine);
+    appendValueText(text_, found.source, found.form, node, width_ != 0 ? width_ : kWideLine);
   }
   const size_t behind = text_.size();
   if (node.flags != 0)
@@ -350,9 +359,20 @@ void TreePrinter::put()
 
 int run(const Invocation& invocation)
 {
+  TreePrinter printer(invocation);
+  if (invocation.has("--follow"))
+  {
+    for (const char* const option : {"--at", "--fold"})
+    {
+      if (invocation.has(option))
+      {
+        throw Failure("tree: --follow and " + std::string(option) + " exclude each other");
+      }
+    }
+    return printer.follow(invocation);
+  }
   Stream stream = openStream(invocation);
   Walker walker(stream.bytes(), stream.form());
-  TreePrinter printer(invocation, stream);
   DamageNotices notices(stream);
   Event event;
   const auto at = invocation.number("--at");
@@ -398,9 +418,11 @@ const Registration registration{{
           .kind = ValueKind::choice,
           .value = "WHEN",
           .help = "colour the output",
-          .choices = {"auto", "always", "never"}}},
+          .choices = {"auto", "always", "never"}},
+         followOption()},
     .examples = {{"tav tree x.tav --depth 2", "the outline of a stream"},
-                 {"tav tree x.tav --only hostName", "every host name with its path"}},
+                 {"tav tree x.tav --only hostName", "every host name with its path"},
+                 {"tav tree day.tav --follow", "what is recorded, as it is"}},
     .run = run,
 }};
 

@@ -56,6 +56,18 @@ public:
   HeldInterrupts& operator=(const HeldInterrupts&) = delete;
 };
 
+/// While one lives an interrupt (SIGINT, Ctrl-C) is remembered and does not end the program. One at a time.
+class CaughtInterrupt
+{
+public:
+  CaughtInterrupt();
+  ~CaughtInterrupt();
+  CaughtInterrupt(const CaughtInterrupt&) = delete;
+  CaughtInterrupt& operator=(const CaughtInterrupt&) = delete;
+
+  static bool hasCome();
+};
+
 /// The number of this process, for names of temporary files.
 uint64_t processId();
 

@@ -15,8 +15,16 @@ InterruptedFiles<char> filesToRemove;
 volatile std::sig_atomic_t held = 0;
 volatile std::sig_atomic_t waiting = 0; ///< the number of a signal that came while it was held
 
+volatile std::sig_atomic_t catching = 0;
+volatile std::sig_atomic_t caught = 0;
+
 extern "C" void endBySignal(int number)
 {
+  if (catching != 0 && number == SIGINT)
+  {
+    caught = 1;
+    return;
+  }
   if (held != 0)
   {
     waiting = number;
@@ -76,6 +84,22 @@ HeldInterrupts::~HeldInterrupts()
 {
   held = 0;
   if (waiting != 0) endBySignal(waiting);
+}
+
+CaughtInterrupt::CaughtInterrupt()
+{
+  caught = 0;
+  catching = 1;
+}
+
+CaughtInterrupt::~CaughtInterrupt()
+{
+  catching = 0;
+}
+
+bool CaughtInterrupt::hasCome()
+{
+  return caught != 0;
 }
 
 uint64_t processId()

@@ -2,7 +2,6 @@
 /// Documents: reading files that come from somewhere.
 #pragma once
 
-#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <filesystem>
@@ -10,11 +9,12 @@
 #include <memory>
 #include <ranges>
 #include <span>
-#include <stop_token>
 #include <string_view>
 #include <utility>
 
 #include "tav/inspect/api.hpp"
+#include "tav/inspect/documentOptions.hpp"
+#include "tav/inspect/follow.hpp"
 #include "tav/inspect/form.hpp"
 #include "tav/inspect/rules.hpp"
 #include "tav/inspect/source.hpp"
@@ -36,28 +36,6 @@ struct Damage
   uint64_t offset = 0;
   uint64_t size = 0; ///< of the bytes that are there; 0: a group begins at `offset` that announces more than there is
   RuleId rule = RuleId::damaged;
-};
-
-struct DocumentOptions
-{
-  FormChoice form{};                 ///< what is known of the form; the rest is found out
-  uint64_t ringBytes = kDefaultRing; ///< memory for a file's pages, once for walks and once for nodes
-  uint64_t from = 0;                 ///< what is before it in a file is left out, and offsets count from there
-};
-
-/// How a file is followed.
-struct FollowOptions
-{
-  std::stop_token stop{};               ///< ends it, at the latest after a tenth of a second
-  std::chrono::milliseconds timeout{0}; ///< ends it when no node has come for so long; 0: nothing does
-  bool existing = true;                 ///< begins with what is there already
-};
-
-/// Why following has ended.
-enum class FollowEnd : uint8_t
-{
-  stopped,
-  timedOut
 };
 
 struct DocumentState;

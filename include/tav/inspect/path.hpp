@@ -68,8 +68,13 @@ public:
   TAV_INSPECT_API ~PathMatcher();
   TAV_INSPECT_API PathMatcher(PathMatcher&&) noexcept;
 
+  /// Whether what a path leads to depends on what comes behind a node, or is in it: on conditions, places, or parents.
+  TAV_INSPECT_API static bool looksAhead(const Path& path);
+
   /// Whether the path leads to this node, whose nodeBegin the walk has returned last.
   TAV_INSPECT_API bool matches(const Walker& walker, const Event& event);
+  /// The same without a walk, for a path that does not look ahead. The nodes come in stream order.
+  TAV_INSPECT_API bool matches(const Node& node);
 
   /// Whether the path can lead to something below the node that was given last.
   TAV_INSPECT_API bool reachesBelow() const;

@@ -1,0 +1,71 @@
+/// @file follow.hpp
+/// Following a file that grows.
+#pragma once
+
+#include <chrono>
+#include <cstdint>
+#include <functional>
+#include <span>
+#include <stop_token>
+#include <string>
+
+#include "tav/inspect/api.hpp"
+#include "tav/inspect/damageWatch.hpp"
+#include "tav/inspect/documentOptions.hpp"
+#include "tav/inspect/walker.hpp"
+
+namespace tav::inspect
+{
+
+/// How a file is followed.
+struct FollowOptions
+{
+  std::stop_token stop{};               ///< ends it, at the latest after a tenth of a second
+  std::chrono::milliseconds timeout{0}; ///< ends it when no node has come for so long; 0: nothing does
+  bool existing = true;                 ///< begins with what is there already
+};
+
+/// Why following has ended.
+enum class FollowEnd : uint8_t
+{
+  stopped,
+  timedOut
+};
+
+/// What has become of the file at a path.
+enum class FileChange : uint8_t
+{
+  missing,  ///< no file is there; what was open is read on until another one comes
+  appeared, ///< one has come where none was
+  replaced, ///< another one has taken its place and is read from its start
+  shortened ///< it was made shorter, or begun again, and is read from its start
+};
+
+/// A node that has come. All of it is valid during the call.
+struct Arrival
+{
+  const Node& node;            ///< of a group that is open: kOpen
+  std::span<const Node> above; ///< the groups around it, the root first
+  ByteSource& source;          ///< the file as it is now
+  const Form& form;            ///< of its stream
+};
+
+/// Who is told of what; those that are empty are not.
+struct FollowTold
+{
+  std::function<void(const Arrival&)> node{};    ///< a group when it was opened, a data element when it is whole
+  std::function<void(const Arrival&)> rootEnd{}; ///< a root has ended: closed, or left open in a file that was replaced
+  std::function<void(const PassedOver&)> damage{};
+  std::function<void(FileChange)> change{};
+  std::function<void()> caughtUp{}; ///< all that is there was told; also at every look that finds nothing new
+};
+
+/// As Document::follow, with all that is known of each node. The file need not be there yet, nor have a stream in it.
+/// @throws Error as Document::follow, and what the callbacks throw
+TAV_INSPECT_API FollowEnd follow(const std::string& path, const FollowTold& told, const DocumentOptions& options = {},
+                                 const FollowOptions& how = {});
+
+/// The path of a node that has come, written as Walker::path does.
+TAV_INSPECT_API std::string pathText(const Arrival& arrival, PathStyle style = PathStyle::whole);
+
+} // namespace tav::inspect
