@@ -54,8 +54,8 @@ class ByHand(Folder):
 
     def test_the_form_of_the_document_is_taken(self):
         for form in encode.Form.all():
-            document = {"form": {"byteOrder": "big" if form.big else "little", "root": 32 if form.root32 else 64,
-                                 "aligned": form.aligned}, "nodes": SHORT}
+            document = {"form": {"byteOrder": "big" if form.big else "little", "root": 64 if form.wide else 32,
+                                 "aligned": form.align}, "nodes": SHORT}
             with self.subTest(form=form):
                 self.assertEqual(build(document).raw, made(form, ada))
 
@@ -100,13 +100,13 @@ class ByHand(Folder):
 class Conversion(Folder):
     def test_every_form_is_converted_to_every_other(self):
         for source in encode.Form.all():
-            for eye in (False, not source.root32):
-                document = tav("json", self.file(made(source, ada, eye)), "--align" if source.aligned else "--no-align").raw
+            for eye in (False, source.wide):
+                document = tav("json", self.file(made(source, ada, eye)), "--align" if source.align else "--no-align").raw
                 for to in encode.Form.all():
-                    options = ["--byte-order", "big" if to.big else "little", "--root", 32 if to.root32 else 64,
-                               "--align" if to.aligned else "--no-align"]
+                    options = ["--byte-order", "big" if to.big else "little", "--root", 64 if to.wide else 32,
+                               "--align" if to.align else "--no-align"]
                     with self.subTest(source=source, to=to, eye=eye):
-                        self.assertEqual(tav("build", *options, stdin=document).raw, made(to, ada, eye and not to.root32))
+                        self.assertEqual(tav("build", *options, stdin=document).raw, made(to, ada, eye and to.wide))
 
     def test_eye_size_puts_pairs_everywhere(self):
         document = tav("json", self.file(made(encode.Form(), ada))).raw

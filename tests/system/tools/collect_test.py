@@ -8,13 +8,13 @@ from damage_test import HOST, STREAM, group, host, number, overwritten, system
 from json_test import GOLDEN, Folder, golden_bytes
 from support import EMULATOR, SANITIZED, WINDOWS, tav, tav_in_little_memory
 
-ADDED = encode.EYE_SIZE | encode.ALIGNED8
+ADDED = encode.EYE_SIZE | encode.ALIGNED
 SEEDS = 60 if SANITIZED or EMULATOR else 100
 
 
 def options_of(form):
-    return ("--byte-order", "big" if form.big else "little", "--root", "32" if form.root32 else "64",
-            "--align" if form.aligned else "--no-align")
+    return ("--byte-order", "big" if form.big else "little", "--root", "64" if form.wide else "32",
+            "--align" if form.align else "--no-align")
 
 
 def plain(node):
@@ -63,7 +63,7 @@ class Cat(Collect):
                 path = self.file(encode.RandomStream(seed * 3 + i, form, nodes=30).bytes(), f"{i}.tav")
                 found = json.loads(tav("info", path, "--json").out)
                 if found["ambiguous"] or found["form"] != {"byteOrder": "big" if form.big else "little",
-                                                           "root": 32 if form.root32 else 64, "aligned": form.aligned}:
+                                                           "root": 64 if form.wide else 32, "aligned": form.align}:
                     continue  # nobody can know how that one is to be read
                 sources.append(path)
                 roots += [plain(root) for root in self.roots(path)]

@@ -5,6 +5,7 @@ import struct
 import unittest
 import xml.etree.ElementTree as ElementTree
 
+from layout import BINARY, END, Form
 from support import ToolTest, bytes_of_hex, tav
 
 UNKNOWN = 2**64 - 1
@@ -12,7 +13,7 @@ HOSTS = 20
 
 
 def header(size, kind, elm, order="<", wide=True):
-    return struct.pack(order + ("QIHH" if wide else "IHH"), *([size, 0, kind, elm] if wide else [size, kind, elm]))
+    return Form(big=order == ">").header(wide, size, kind, elm)
 
 
 def number(value, elm=60111, order="<", wide=True):
@@ -152,7 +153,7 @@ class Damage(ToolTest):
 
     def test_a_group_whose_end_is_not_there_is_walked_and_not_stepped_over(self):
         def end(length):
-            return header(16, 101, 65001) + struct.pack("<QQ", 0xC0DED5EEDDEC0DED, length + 32)
+            return header(16, BINARY, END) + Form(big=False).end_pair(length, wide=True)
         for more in (1, HOST - 1, HOST + 7, 3 * HOST + 1):
             head = struct.pack("<QIHH", 24 + 32 + more, 0x400000, 2, 60104)
             content = head + number(7) + end(24) + STREAM[16:]

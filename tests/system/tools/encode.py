@@ -3,14 +3,10 @@ with. Random streams come from a seed and are the same on every machine."""
 import random
 import struct
 
+from layout import (ARRAY, ASCII, BINARY, END, EYE_SIZE, GROUP32, GROUP64, STAMP, UINT32, UINT64,  # noqa: F401
+                    UTF8, ALIGNED, Form, header_length)
 from support import BIG_ENDIAN
 
-EYE = 0xC0DED5EEDDEC0DED
-EYE_SIZE = 0x00400000
-ALIGNED8 = 0x00100000
-GROUP32, GROUP64 = 1, 2
-ASCII, UINT32, UINT64, STAMP, BINARY, UTF8, ARRAY = 50, 55, 57, 100, 101, 102, 106
-END = 65001
 INTEGERS = {51: "B", 52: "b", 53: "H", 54: "h", 55: "I", 56: "i", 57: "Q", 58: "q", 105: "B"}
 NAMES = [60100, 60102, 60103, 60101, 60104, 60105, 60109, 60111, 60117, 60118, 307, 321, 20, 1003, 1004, 45307]
 
@@ -23,21 +19,6 @@ def words(*numbers, size=8):
     return b"".join(number.to_bytes(size, HOST) for number in numbers)
 
 
-class Form:
-    def __init__(self, big=BIG_ENDIAN, root32=False, aligned=False):
-        self.big, self.root32, self.aligned = big, root32, aligned
-        self.order = ">" if big else "<"
-
-    @staticmethod
-    def all():
-        return [Form(big, root32, aligned) for big in (False, True) for root32 in (False, True)
-                for aligned in (False, True)]
-
-    def __repr__(self):
-        return "%s-endian, root %d%s" % ("big" if self.big else "little", 32 if self.root32 else 64,
-                                         ", aligned" if self.aligned else "")
-
-
 class Writer:
     """Appends nodes; groups are closed with `close`."""
 
@@ -47,16 +28,13 @@ class Writer:
         self.groups = []  # [offset, wide, children wide, eye size]
 
     def pack(self, codes, *values):
-        return struct.pack(self.form.order + codes, *values)
+        return struct.pack((">" if self.form.big else "<") + codes, *values)
 
     def wide(self):
-        return self.groups[-1][2] if self.groups else not self.form.root32
+        return self.groups[-1][2] if self.groups else self.form.wide
 
     def header(self, wide, size, kind, elm, info=0):
-        if not wide:
-            return self.pack("IHH", size & 0xFFFFFFFF, kind, elm)
-        info |= ALIGNED8 if self.form.aligned else 0
-        return self.pack("QIHH", size & 0xFFFFFFFFFFFFFFFF, info, kind, elm)
+        return self.form.header(wide, size, kind, elm, self.form.info(info))
 
     def open(self, elm, narrow_children=False, eye=False, info=0, size=0):
         wide = self.wide()
@@ -66,21 +44,20 @@ class Writer:
 
     def close(self, keep_size=False):
         offset, wide, children, eye = self.groups.pop()
-        start = offset + (16 if wide else 8)
+        start = offset + header_length(wide)
         if eye:
-            distance = len(self.bytes) - start + (32 if children else 16)
-            self.bytes += self.header(children, 16, BINARY, END) + self.pack("QQ", EYE, distance)
-        size = len(self.bytes) - start
+            pair = self.form.end_pair(len(self.bytes) - start, children)
+            self.bytes += self.header(children, len(pair), BINARY, END) + pair
         if not keep_size:
-            self.bytes[offset:offset + (8 if wide else 4)] = self.pack("Q" if wide else "I", size)
+            width = 8 if wide else 4
+            self.bytes[offset:offset + width] = self.form.number(len(self.bytes) - start, width)
 
     def data(self, elm, kind, payload, eye=False, info=0, extra=b""):
         wide = self.wide()
         self.bytes += self.header(wide, len(payload), kind, elm, info | (EYE_SIZE if eye else 0)) + payload + extra
-        if self.form.aligned:
-            self.bytes += bytes(-len(payload) % 8)
+        self.bytes += self.form.padding(len(payload))
         if wide and eye:
-            self.bytes += struct.pack("<QQ" if extra else self.form.order + "QQ", EYE, len(payload) + 16)
+            self.bytes += self.form.pair(len(payload), "little" if extra else None)
 
 
 class RandomStream:
@@ -100,7 +77,7 @@ class RandomStream:
         return self.random.randrange(65000) if self.wild and self.chance(3) else self.random.choice(NAMES)
 
     def info(self):
-        return self.random.getrandbits(32) & ~(EYE_SIZE | ALIGNED8) if self.wild and self.chance(3) else 0
+        return self.random.getrandbits(32) & ~(EYE_SIZE | ALIGNED) if self.wild and self.chance(3) else 0
 
     def make(self):
         writer, eyes = self.writer, self.chance(2)

@@ -5,17 +5,19 @@ import resource
 import struct
 import unittest
 
+from layout import EYE_SIZE, Form
 from support import EMULATOR, SANITIZED, ToolTest, bytes_of_hex, generate, tav, tav_in_little_memory, tree_rows
 
 OPEN = 2**64 - 1
+LITTLE = Form(big=False)
 
 
 def group(size, elm=60100, info=0, kind=2):
-    return struct.pack("<QIHH", size, info, kind, elm)
+    return LITTLE.header(True, size, kind, elm, info)
 
 
 def number(value, elm=307, info=0):
-    return struct.pack("<QIHHI", 4, info, 55, elm, value)
+    return LITTLE.header(True, 4, 55, elm, info) + LITTLE.number(value, 4)
 
 
 def processor_time():
@@ -81,7 +83,7 @@ class Hostile(ToolTest):
         self.assertEqual(len(damaged), 1)
 
     def test_a_subtree_behind_damage_is_found_by_its_pair(self):
-        strange = struct.pack("<QIHHQ", 8, 0x00400000, 60000, 1, 5) + struct.pack("<QQ", 0xC0DED5EEDDEC0DED, 24)
+        strange = LITTLE.header(True, 8, 60000, 1, EYE_SIZE) + LITTLE.number(5, 8) + LITTLE.pair(8)
         content = group(16 * 3 + len(strange)) + b"\xff" * 48 + strange
         nodes, damaged = tree_rows(tav("tree", self.file(content), "--paths", "--width", "0").out)
         self.assertEqual(([node[0] for node in nodes], damaged), ([0, 64], [16]))

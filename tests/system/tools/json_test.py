@@ -120,9 +120,9 @@ class Document(Folder):
         for form in encode.Form.all():
             data = self.stream(form, lambda w: w.data(60103, encode.ASCII, b"some text"))
             with self.subTest(form=form):
-                order = {"byteOrder": "big" if form.big else "little", "root": 32 if form.root32 else 64,
-                         "aligned": form.aligned}
-                options = ("--align",) if form.aligned else ("--no-align",)
+                order = {"byteOrder": "big" if form.big else "little", "root": 64 if form.wide else 32,
+                         "aligned": form.align}
+                options = ("--align",) if form.align else ("--no-align",)
                 self.assertEqual(json.loads(self.json_of(data, *options).raw)["form"], order)
 
     def test_values_are_written_in_their_natural_form(self):

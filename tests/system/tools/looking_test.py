@@ -3,13 +3,11 @@ import json
 import struct
 import unittest
 
+from damage_test import group, header, number
+from layout import BINARY, END, Form
 from support import ToolTest, bytes_of_hex, tav
 
 UNKNOWN = 2**64 - 1
-
-
-def header(size, kind, elm):
-    return struct.pack("<QIHH", size, 0, kind, elm)
 
 
 class Info(ToolTest):
@@ -120,15 +118,6 @@ class Tree(ToolTest):
                     self.assertTrue(any(line.endswith("..."[:width]) for line in lines))
 
 
-def group(elm, *children):
-    content = b"".join(children)
-    return header(len(content), 2, elm) + content
-
-
-def number(value, elm=60111):
-    return header(8, 57, elm) + struct.pack("<Q", value)
-
-
 class Repetitions(ToolTest):
     def write(self, content):
         path = self.folder / "many.tav"
@@ -208,7 +197,7 @@ class EndElements(ToolTest):
             self.assertEqual((counted["nodes"], counted["headers64"], counted["headers32"]), (16, wide, narrow))
 
     def test_an_end_element_is_no_level(self):
-        end = header(16, 101, 65001) + struct.pack("<QQ", 0xC0DED5EEDDEC0DED, 32)
+        end = header(16, BINARY, END) + Form(big=False).end_pair(0, wide=True)
         path = self.folder / "one.tav"
         path.write_bytes(struct.pack("<QIHH", 32, 0x00400000, 2, 60100) + end)
         self.assertEqual(json.loads(tav("info", path, "--json").out)["counted"]["depth"], 1)

@@ -4,29 +4,12 @@ A tree of Node objects is encoded by Encoder; afterwards every node knows where 
 `force` make it wrong."""
 import random
 
-EYE = 0xC0DED5EEDDEC0DED
-EYE_SIZE = 0x00400000
-ALIGNED = 0x00100000
-END = 65001
-MARKER = 65000
+from layout import ALIGNED, ARRAY, BINARY, END, EYE, EYE_SIZE, MARKER, Form, header_length  # noqa: F401
+
 NAMED = [20, 307, 321, 60001, 60002, 60003, 60004, 60005, 60006, 60007, 60008, 60103]
 SIZES = {51: 1, 52: 1, 53: 2, 54: 2, 55: 4, 56: 4, 57: 8, 58: 8, 100: 16, 103: 16, 104: 16, 105: 1}
-BINARY, ARRAY = 101, 106
 FREE = [50, BINARY, 102, ARRAY]
 HOST = "little"
-
-
-class Form:
-    def __init__(self, big=False, wide=True, align=False):
-        self.big, self.wide, self.align = big, wide, align
-
-    @property
-    def order(self):
-        return "big" if self.big else "little"
-
-    def options(self):
-        return ["--byte-order", self.order, "--root", "64" if self.wide else "32",
-                "--align" if self.align else "--no-align"]
 
 
 def random_form(rng):
@@ -70,20 +53,9 @@ class Encoder:
         self.form = form
         self.out = bytearray()
 
-    def number(self, value, width, order=None):
-        return (value & ((1 << 8 * width) - 1)).to_bytes(width, order or self.form.order)
-
-    def header(self, size, kind, elm, info, wide):
-        if wide:
-            return self.number(size, 8) + self.number(info, 4) + self.number(kind, 2) + self.number(elm, 2)
-        return self.number(size, 4) + self.number(kind, 2) + self.number(elm, 2)
-
-    def pair(self, distance, order=None):
-        return self.number(EYE, 8, order) + self.number(distance, 8, order)
-
     def put(self, node, wide, parent=None):
         node.parent, node.wide, node.offset = parent, wide, len(self.out)
-        self.out += bytes(16 if wide else 8)
+        self.out += bytes(header_length(wide))
         node.payload_offset = len(self.out)
         self.put_children(node, wide) if node.is_group else self.put_payload(node, wide)
         node.end = len(self.out)
@@ -92,19 +64,18 @@ class Encoder:
         else:
             right = len(node.payload)
         size = right + node.add_size if node.force_size is None else node.force_size
-        bits = node.info | (ALIGNED if self.form.align else 0)
-        bits = bits if node.force_bits is None else node.force_bits
-        head = self.header(size, node.kind, node.elm, bits, wide)
+        bits = self.form.info(node.info) if node.force_bits is None else node.force_bits
+        head = self.form.header(wide, size, node.kind, node.elm, bits)
         self.out[node.offset:node.offset + len(head)] = head
 
     def put_payload(self, node, wide):
         self.out += node.payload + node.extra
         node.padding_offset = len(self.out)
-        padding = bytes(-len(node.payload) % 8 if self.form.align else 0)
+        padding = self.form.padding(len(node.payload))
         self.out += padding if node.force_padding is None else node.force_padding
         node.pair_offset = len(self.out)
         if wide and node.eye:
-            pair = self.pair(len(node.payload) + 16, HOST if node.by_string else None)
+            pair = self.form.pair(len(node.payload), HOST if node.by_string else None)
             self.out += pair if node.force_pair is None else node.force_pair
 
     def put_children(self, node, wide):
@@ -113,7 +84,7 @@ class Encoder:
             self.put(child, inner, node)
         if wide and node.eye and node.force_end is not False:
             length = len(self.out) - node.payload_offset
-            end = node.force_end or Node(END, 101, self.pair(length + (32 if inner else 16)))
+            end = node.force_end or Node(END, BINARY, self.form.end_pair(length, inner))
             self.put(end, inner, node)
             node.end_element = end
         for child in node.after_end:

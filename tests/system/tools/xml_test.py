@@ -81,7 +81,7 @@ class Xml(Folder):
     def test_every_value_of_random_streams_is_the_one_that_json_tells(self):
         import json
         for seed in range(60):
-            path = self.file(encode.RandomStream(seed, encode.Form(aligned=False)).bytes())
+            path = self.file(encode.RandomStream(seed, encode.Form(align=False)).bytes())
             rows = [json.loads(line) for line in tav("json", path, "--lines").raw.splitlines()][1:]
             rows = [row for row in rows if isinstance(row.get("value"), int) and row["type"] != "Byte"]
             nodes = [n for n in ElementTree.fromstring(tav("xml", path).raw).iter()
