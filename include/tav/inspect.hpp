@@ -35,6 +35,7 @@
 #include "tav/inspect/similar.hpp"
 #include "tav/inspect/sink.hpp"
 #include "tav/inspect/source.hpp"
+#include "tav/inspect/table.hpp"
 #include "tav/inspect/textSource.hpp"
 #include "tav/inspect/value.hpp"
 #include "tav/inspect/walker.hpp"

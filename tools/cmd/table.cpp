@@ -1,0 +1,340 @@
+// tav table: a row for each node that a path leads to.
+#include <algorithm>
+#include <optional>
+#include <set>
+
+#include "tav/inspect.hpp"
+#include "tools/cmd/tableRates.h"
+#include "tools/cmd/tableRows.h"
+#include "tools/shell/options.h"
+#include "tools/shell/output.h"
+#include "tools/shell/progress.h"
+#include "tools/shell/report.h"
+#include "tools/shell/session.h"
+
+namespace tav::tool
+{
+
+namespace
+{
+
+struct NamedText
+{
+  std::string name{};
+  std::string text{};
+};
+
+/// "NAME=TEXT" in its parts; no name where what is before the first = is no word.
+NamedText namedText(const std::string& given)
+{
+  const size_t equals = std::min(given.find('='), given.size());
+  const std::string name = given.substr(0, equals);
+  const auto isWord = [](char c) {
+    return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') || c == '_';
+  };
+  const bool named = equals != given.size() && !name.empty() && std::all_of(name.begin(), name.end(), isWord);
+  return named ? NamedText{name, given.substr(equals + 1)} : NamedText{{}, given};
+}
+
+std::vector<TableColumn> columnsOf(const Invocation& invocation)
+{
+  std::vector<TableColumn> columns;
+  for (const std::string& given : invocation.all("--col"))
+  {
+    const NamedText column = namedText(given);
+    columns.push_back({column.name.empty() ? column.text : column.name, column.text});
+  }
+  if (!invocation.has("--each") || columns.empty())
+  {
+    throw Failure("table: --each and at least one --col say what the rows and the columns are",
+                  "for instance --each /system --col host/hostName");
+  }
+  return columns;
+}
+
+std::vector<NamedText> labelsOf(const Invocation& invocation)
+{
+  std::vector<NamedText> labels;
+  for (const std::string& given : invocation.all("--label"))
+  {
+    labels.push_back(namedText(given));
+    if (labels.back().name.empty())
+    {
+      throw Failure("table: --label '" + shown(given, stderr) + "' is not NAME=TEXT",
+                    "a name is a word of letters, digits and _");
+    }
+  }
+  return labels;
+}
+
+class Tabler
+{
+public:
+  explicit Tabler(const Invocation& invocation)
+      : invocation_(invocation), labels_(labelsOf(invocation)),
+        query_(invocation.text("--each"), columnsOf(invocation), joinerOf(invocation)),
+        onDamage_(invocation.text("--on-damage", "stop") == "skip" ? OnDamage::skip : OnDamage::stop)
+  {
+    check();
+    nameColumns();
+    if (invocation.has("--rate"))
+    {
+      requireCounters();
+      rates_.emplace(columns_);
+    }
+  }
+
+  Status run()
+  {
+    Output out(invocation_.text("--output", "-"), invocation_.has("--force"));
+    const auto writer = makeRowWriter(invocation_, out);
+    writer->begin(columns_);
+    Status status = kFine;
+    for (const std::string& name : invocation_.arguments())
+    {
+      status = std::max(status, readFile(name, *writer));
+    }
+    writer->end();
+    out.commit();
+    return rows_ == 0 ? std::max(status, kFindings) : status;
+  }
+
+private:
+  static std::optional<std::string> joinerOf(const Invocation& invocation)
+  {
+    return invocation.has("--join") ? std::optional(invocation.text("--join")) : std::nullopt;
+  }
+
+  void check() const
+  {
+    const std::vector<std::string>& files = invocation_.arguments();
+    const std::string format = invocation_.text("--format", "csv");
+    if (std::count(files.begin(), files.end(), "-") > 1)
+    {
+      throw Failure("table: only one of the files can be standard input");
+    }
+    if (format == "parquet")
+    {
+      throw Failure("table: this build writes no Parquet",
+                    "what reads the table with --format csv or jsonl can write it, DuckDB for instance");
+    }
+    if (format == "openmetrics" && invocation_.has("--rate"))
+    {
+      throw Failure("table: metrics are counters; their readers make rates of them, --rate does not");
+    }
+    if (invocation_.has("--crlf") && format != "csv" && format != "tsv")
+    {
+      throw Failure("table: --crlf is for --format csv and tsv");
+    }
+  }
+
+  /// Where it is decided what a column counts, and in what unit.
+  static OutColumn described(const TableColumn& column, const std::vector<std::string>& counters)
+  {
+    OutColumn about{.name = column.name, .help = column.path};
+    about.isCounter = about.name.ends_with("_total") ||
+                      std::find(counters.begin(), counters.end(), about.name) != counters.end();
+    return about;
+  }
+
+  void nameColumns()
+  {
+    if (invocation_.has("--file"))
+    {
+      columns_.push_back({.name = "file"});
+    }
+    for (const NamedText& label : labels_)
+    {
+      columns_.push_back({.name = label.name});
+    }
+    const std::vector<std::string> counters = invocation_.all("--counter");
+    for (const TableColumn& column : query_.columns())
+    {
+      columns_.push_back(described(column, counters));
+    }
+    std::set<std::string> names;
+    for (const OutColumn& column : columns_)
+    {
+      if (!names.insert(column.name).second)
+      {
+        throw Failure("table: two columns are called '" + shown(column.name, stderr) + "'",
+                      "'--col NAME=PATH' gives one another name");
+      }
+    }
+    for (const std::string& counter : counters)
+    {
+      if (std::none_of(query_.columns().begin(), query_.columns().end(),
+                       [&](const TableColumn& column) { return column.name == counter; }))
+      {
+        throw Failure("table: --counter: no column is called '" + shown(counter, stderr) + "'");
+      }
+    }
+  }
+
+  void requireCounters() const
+  {
+    if (std::none_of(columns_.begin(), columns_.end(), [](const OutColumn& column) { return column.isCounter; }))
+    {
+      throw Failure("table: --rate: no column is a counter",
+                    "--counter NAME says that a column is one; those whose names end in _total are");
+    }
+  }
+
+  /// Adds one file. What ends its reading is told, and ends nothing else.
+  Status readFile(const std::string& name, RowWriter& writer)
+  {
+    std::optional<Stream> stream;
+    try
+    {
+      stream.emplace(openStream(invocation_, name, invocation_.number("--from").value_or(0)));
+    }
+    catch (const Failure& failure)
+    {
+      report(failure.problem);
+      return failure.status;
+    }
+    catch (const Error& error)
+    {
+      report(error.problem());
+      return kTrouble;
+    }
+    return readStream(name, *stream, writer);
+  }
+
+  Status readStream(const std::string& name, Stream& stream, RowWriter& writer)
+  {
+    DamageNotices notices(stream);
+    TableReader reader(stream.bytes(), stream.form(), query_,
+                       {.onDamage = onDamage_, .passedOver = [&](const PassedOver& passed) { notices.add(passed); }});
+    try
+    {
+      Progress progress("table " + stream.source->name(), stream.bytes());
+      writeRows(name, reader, writer);
+    }
+    catch (const Error& error)
+    {
+      report(error.problem());
+      return std::max(notices.tell(), kTrouble);
+    }
+    tellStatistics(invocation_, stream.bytes());
+    const Status status = notices.tell();
+    if (!reader.stopped())
+    {
+      return status;
+    }
+    report(*reader.stopped());
+    return kFindings;
+  }
+
+  void writeRows(const std::string& name, TableReader& reader, RowWriter& writer)
+  {
+    constexpr uint64_t batch = 4096;
+    OutRow row(columns_.size());
+    size_t first = 0;
+    if (invocation_.has("--file"))
+    {
+      row[first++] = {.own = name, .isOwn = true, .isText = true};
+    }
+    for (const NamedText& label : labels_)
+    {
+      row[first++] = {.own = label.text, .isOwn = true, .isText = true};
+    }
+    for (Table rows(query_); reader.next(rows, batch); rows = Table(query_))
+    {
+      for (uint64_t i = 0; i < rows.rows(); ++i)
+      {
+        for (size_t column = 0; column < query_.columns().size(); ++column)
+        {
+          row[first + column] = {.cell = rows.cell(column, i)};
+        }
+        rates_ ? rates_->apply(row) : void();
+        writer.row(row);
+      }
+      rows_ += rows.rows();
+    }
+  }
+
+  const Invocation& invocation_;
+  std::vector<NamedText> labels_;
+  TableQuery query_;
+  OnDamage onDamage_;
+  std::vector<OutColumn> columns_{};
+  std::optional<Rates> rates_{};
+  uint64_t rows_ = 0;
+};
+
+int run(const Invocation& invocation)
+{
+  return Tabler(invocation).run();
+}
+
+const Registration registration{{
+    .place = 54,
+    .name = "table",
+    .arguments = "FILE...",
+    .inputs = ~size_t{0},
+    .summary = "a table of nodes: a row each, columns by paths",
+    .description =
+        "Writes a row for each node that --each leads to, in the order of the stream, with the columns in the order\n"
+        "given: the value of the first data element that a --col leads to from the row's node. Paths are those of\n"
+        "'tav get'. A column is called NAME, a word of letters, digits and _, or as its path is written. Numbers are\n"
+        "in decimal, times ISO 8601 in UTC, bytes in hexadecimal. Where there is no value, or a group, the cell is\n"
+        "empty; an empty text is \"\" in CSV. CSV follows RFC 4180, with line feeds unless --crlf is given. TSV\n"
+        "writes tabs, line ends and backslashes in texts as \\t, \\n, \\r and \\\\. JSON lines have null for what is\n"
+        "missing, and numbers of 128 bits as texts.\n\n"
+        "--rate puts in place of a counter's value what it rose by in a second since the row before, by the first\n"
+        "time in the rows, from file to file. The first cell is empty, and so is one where the counter went down,\n"
+        "which begins it anew. Counters are columns whose names end in _total, and those that --counter names.\n\n"
+        "--format openmetrics makes a page of metrics of one snapshot: numbers are samples, gauges or counters, and\n"
+        "the texts of a row its labels, which no two rows may share.\n\n"
+        "At damage a file ends with its rows so far, those whose nodes had ended; --on-damage skip goes on behind it.\n"
+        "Both are told on standard error with exit status 1, as it is when there is no row, but for the header. A\n"
+        "file that cannot be read, or is no stream, is told, and the next one is read; the exit status is the highest\n"
+        "that one of the files gives. Memory grows with the rows inside of a row's node alone.",
+    .options = {{.names = "--each", .kind = ValueKind::text, .value = "PATH", .help = "a row for each of these nodes", .required = true},
+                {.names = "--col",
+                 .kind = ValueKind::text,
+                 .value = "[NAME=]PATH",
+                 .help = "a column, by a path from the row's node",
+                 .many = true,
+                 .required = true},
+                {.names = "--file", .help = "the name of the file as the first column"},
+                {.names = "--label",
+                 .kind = ValueKind::text,
+                 .value = "NAME=TEXT",
+                 .help = "a column with this text in every row",
+                 .many = true},
+                {.names = "--join",
+                 .kind = ValueKind::text,
+                 .value = "SEP",
+                 .help = "all values that a column's path leads to, with SEP between them"},
+                {.names = "--rate", .help = "counters as what they rose by in a second"},
+                {.names = "--counter",
+                 .kind = ValueKind::text,
+                 .value = "NAME",
+                 .help = "this column counts up",
+                 .many = true},
+                {.names = "--format",
+                 .kind = ValueKind::choice,
+                 .value = "FORMAT",
+                 .help = "what is written: csv unless given; parquet is not written yet",
+                 .choices = {"csv", "tsv", "jsonl", "openmetrics", "parquet"}},
+                {.names = "--crlf", .help = "end lines with CR LF"},
+                {.names = "--on-damage",
+                 .kind = ValueKind::choice,
+                 .value = "WAY",
+                 .help = "at damage: stop, which ends the file's rows, or skip",
+                 .choices = {"stop", "skip"}},
+                {.names = "-o,--output",
+                 .kind = ValueKind::file,
+                 .value = "OUT",
+                 .help = "where the table goes, standard output unless given"}},
+    .examples = {{"tav table day.tav --each /system --col time=timestamp --col host/hostName", "a series as CSV"},
+                 {"tav table *.tav --each //db --col name=db_name --col ../hostName --file > dbs.csv", "every database of many files"},
+                 {"tav table day.tav --each /system --col time=timestamp --col n=rows_read --counter n --rate", "rates of a counter"}},
+    .run = run,
+}};
+
+} // namespace
+
+} // namespace tav::tool
