@@ -291,7 +291,11 @@ const Registration registration{{
         "Both are told on standard error with exit status 1, as it is when there is no row, but for the header. A\n"
         "file that cannot be read, or is no stream, is told, and the next one is read; the exit status is the highest\n"
         "that one of the files gives. Memory grows with the rows inside of a row's node alone.",
-    .options = {{.names = "--each", .kind = ValueKind::text, .value = "PATH", .help = "a row for each of these nodes", .required = true},
+    .options = {{.names = "--each",
+                 .kind = ValueKind::text,
+                 .value = "PATH",
+                 .help = "a row for each of these nodes",
+                 .required = true},
                 {.names = "--col",
                  .kind = ValueKind::text,
                  .value = "[NAME=]PATH",
@@ -330,8 +334,10 @@ const Registration registration{{
                  .value = "OUT",
                  .help = "where the table goes, standard output unless given"}},
     .examples = {{"tav table day.tav --each /system --col time=timestamp --col host/hostName", "a series as CSV"},
-                 {"tav table *.tav --each //db --col name=db_name --col ../hostName --file > dbs.csv", "every database of many files"},
-                 {"tav table day.tav --each /system --col time=timestamp --col n=rows_read --counter n --rate", "rates of a counter"}},
+                 {"tav table *.tav --each //db --col name=db_name --col ../hostName --file > dbs.csv",
+                  "every database of many files"},
+                 {"tav table day.tav --each /system --col time=timestamp --col n=rows_read --counter n --rate",
+                  "rates of a counter"}},
     .run = run,
 }};
 

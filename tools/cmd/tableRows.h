@@ -6,10 +6,10 @@
 #include <string>
 #include <vector>
 
+#include "tav/inspect.hpp"
 #include "tools/shell/names.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
-#include "tav/inspect.hpp"
 
 namespace tav::tool
 {

@@ -6,7 +6,7 @@ import unittest
 from support import EMULATOR, WINDOWS, ToolTest, tav
 
 COMMANDS = ("snapshot", "info", "tree", "print", "get", "hex", "elements", "json", "build", "xml", "check", "recover", "diff",
-            "schema", "extract", "cat", "set", "help", "completion")
+            "schema", "table", "extract", "cat", "set", "help", "completion")
 COMMON = ("--byte-order", "--root", "--align", "--no-align", "--ring", "--spool-limit", "--trace", "--trace-probe",
           "--force", "--stats")
 

@@ -1,0 +1,289 @@
+"""tav table: rows by a path, columns by paths from there, as CSV, TSV, JSON lines and metrics."""
+import csv
+import io
+import json
+import random
+import sqlite3
+import subprocess
+import unittest
+
+from damage_test import KINDS, SOUND, STREAM, group, header, number, overwritten, host, system
+from json_test import GOLDEN, Folder, golden_bytes
+from support import EMULATOR, TAV, tav, tav_in_little_memory, until
+
+HOSTS = ("--each", "/system/host", "--col", "n=#60111")
+FORMS = ((), ("--byte-order", "big"), ("--byte-order", "little", "--align"), ("--root", "32"), ("--eye-size",))
+
+
+def leaf(element, value, kind=None):
+    return {"element": element, "value": value} | ({"type": kind} if kind else {})
+
+
+def sample(time, read, name="ada"):
+    return {"element": "system", "children": [leaf("timestamp", time, "UTC Timestamp"), leaf("hostName", name),
+                                              leaf("cpuOnline", read, "Uint64")]}
+
+
+class Table(Folder):
+    def stream(self, document, name="a.tav", *options):
+        path = self.folder / name
+        document = document if isinstance(document, list) else [document]
+        result = tav("build", *options, "-o", path, "--force", stdin=json.dumps(document).encode())
+        self.assertEqual((result.status, result.err), (0, ""))
+        return path
+
+    def table(self, *arguments, status=0, **more):
+        result = tav("table", *arguments, **more)
+        self.assertEqual(result.status, status, result.err)
+        return result
+
+    def rows(self, *arguments, status=0):
+        return list(csv.reader(io.StringIO(self.table(*arguments, status=status).raw.decode(), newline="")))
+
+
+class Formats(Table):
+    TEXTS = ["ada", "", 'a"b', "a,b", "a\nb", "a\r\nb", "\\n\t\\", " x ", "1.5e3", "gr\u00e4ce", "=1+2"]
+
+    def texts(self):
+        return self.stream({"element": "system", "children": [
+            {"element": "host", "children": [leaf("hostName", text), leaf("cpuOnline", i, "Uint32")]}
+            for i, text in enumerate(self.TEXTS)] + [{"element": "host", "children": [leaf("memTotal", 2**100, "Uint128")]}]})
+
+    ARGUMENTS = ("--each", "/system/host", "--col", "name=hostName", "--col", "cpuOnline", "--col", "memTotal")
+
+    def test_csv_is_read_by_what_reads_csv(self):
+        for options, end in (((), "\n"), (("--crlf",), "\r\n")):
+            text = self.table(self.texts(), *self.ARGUMENTS, *options).raw.decode()
+            self.assertTrue(text.startswith("name,cpuOnline,memTotal" + end))
+            rows = list(csv.reader(io.StringIO(text, newline="")))
+            self.assertEqual(rows[1:-1], [[name, str(i), ""] for i, name in enumerate(self.TEXTS)])
+            self.assertEqual(rows[-1], ["", "", str(2**100)])
+            self.assertIn(end + '"",1,' + end, text)  # an empty text, and nothing
+            self.assertTrue(text.endswith(end + ",," + str(2**100) + end))
+
+    def test_a_database_takes_it(self):
+        rows = self.rows(self.texts(), *self.ARGUMENTS)
+        base = sqlite3.connect(":memory:")
+        self.addCleanup(base.close)
+        base.execute("create table t(name text, n integer, m text)")
+        base.executemany("insert into t values (?, nullif(?, ''), ?)", rows[1:])
+        self.assertEqual(base.execute("select sum(n), count(n), count(*) from t").fetchone(),
+                         (sum(range(len(self.TEXTS))), len(self.TEXTS), len(self.TEXTS) + 1))
+
+    def test_pandas_takes_it(self):
+        code = ("import io, sys\ntry:\n import pandas\nexcept ImportError:\n sys.exit(77)\n"
+                "t = pandas.read_csv(sys.stdin.buffer, dtype={'cpuOnline': 'Int64'}, keep_default_na=False,"
+                " na_values={'cpuOnline': ['']})\n"
+                "print(list(t.columns), int(t.cpuOnline.sum()), int(t.cpuOnline.isna().sum()), t.name[2])")
+        try:
+            done = subprocess.run(["/usr/bin/python3", "-c", code], input=self.table(self.texts(), *self.ARGUMENTS).raw,
+                                  capture_output=True, check=False)
+        except FileNotFoundError:
+            self.skipTest("there is no system's Python")
+        if done.returncode == 77:
+            self.skipTest("there is no pandas")
+        self.assertEqual(done.stdout.decode(), f"['name', 'cpuOnline', 'memTotal'] {sum(range(len(self.TEXTS)))} 1 a\"b\n",
+                         done.stderr)
+
+    def test_tsv_escapes_what_ends_cells(self):
+        lines = self.table(self.texts(), *self.ARGUMENTS, "--format", "tsv").raw.decode().split("\n")
+        self.assertEqual(lines[0], "name\tcpuOnline\tmemTotal")
+        back = []
+        for line in lines[1:-2]:
+            name, count, rest = line.split("\t")
+            self.assertEqual((count, rest), (str(len(back)), ""))
+            back.append(name.replace("\\\\", "\0").replace("\\t", "\t").replace("\\n", "\n").replace("\\r", "\r")
+                        .replace("\0", "\\"))
+        self.assertEqual(back, self.TEXTS)
+
+    def test_json_lines_are_objects(self):
+        lines = [json.loads(line) for line in self.table(self.texts(), *self.ARGUMENTS, "--format", "jsonl").out.splitlines()]
+        self.assertEqual(lines[:-1], [{"name": name, "cpuOnline": i, "memTotal": None} for i, name in enumerate(self.TEXTS)])
+        self.assertEqual(lines[-1], {"name": None, "cpuOnline": None, "memTotal": str(2**100)})
+
+    def test_times_are_in_utc(self):
+        path = self.stream(sample("2024-05-01T10:20:30.123456+02:00", 1))
+        self.assertEqual(self.rows(path, "--each", "/system", "--col", "t=timestamp")[1], ["2024-05-01T08:20:30.123456Z"])
+
+    def test_columns_that_are_there_anyway(self):
+        path = self.stream([sample("2024-05-01T10:20:30Z", 1)])
+        self.assertEqual(self.rows(path, path, "--each", "/system", "--col", "cpuOnline", "--label", "a=x=y", "--file",
+                                   "--label", "b="),
+                         [["file", "a", "b", "cpuOnline"], [str(path), "x=y", "", "1"], [str(path), "x=y", "", "1"]])
+
+    def test_names_and_paths(self):
+        path = self.stream(sample("2024-05-01T10:20:30Z", 7))
+        self.assertEqual(self.rows(path, "--each", "/system[hostName='ada']", "--col", "a_1=cpuOnline",
+                                   "--col", "../system[hostName='ada']/cpuOnline", "--col", "hostName|osName"),
+                         [["a_1", "../system[hostName='ada']/cpuOnline", "hostName|osName"], ["7", "", "ada"]])
+        self.assertEqual(self.rows(path, "--each", "/system", "--col", "x=*", "--join", "; ")[1],
+                         ["2024-05-01T10:20:30.000000Z; ada; 7"])
+
+    def test_out_is_a_file(self):
+        out = self.folder / "out.csv"
+        path = self.stream(sample("2024-05-01T10:20:30Z", 7))
+        arguments = (path, "--each", "/system", "--col", "cpuOnline", "-o", out)
+        self.table(*arguments)
+        self.assertEqual(out.read_text(), "cpuOnline\n7\n")
+        self.table(*arguments, status=2)
+        self.table(*arguments, "--force")
+
+    def test_values_are_those_of_json(self):
+        chance = random.Random(11)
+        for number_ in range(20):
+            hosts = [[chance.randrange(2**chance.randrange(1, 64)) for _ in range(chance.randrange(3))] for _ in range(20)]
+            path = self.stream({"element": "system", "children": [
+                {"element": "host", "children": [leaf("cpuOnline", value, "Uint64") for value in values]} for values in hosts]},
+                "a.tav", *FORMS[number_ % len(FORMS)])
+            rows = self.rows(path, "--each", "/system/host", "--col", "cpuOnline")[1:]
+            self.assertEqual([row or [""] for row in rows], [[str(values[0]) if values else ""] for values in hosts])
+
+
+class Statuses(Table):
+    def test_golden_vectors_have_the_values_of_get(self):
+        for vector in sorted(GOLDEN.glob("*.hex")):
+            with self.subTest(vector=vector.name):
+                path = self.file(golden_bytes(vector))
+                lines = self.table(path, "--each", "//*", "--col", "v=.", "--format", "jsonl", "--on-damage", "skip",
+                                   status=tav("get", path, "--all", "--json", "//*").status).out.splitlines()
+                found = [json.loads(line)["v"] for line in lines]
+                wanted = [json.loads(line) for line in tav("get", path, "--all", "--json", "//*").out.splitlines()]
+                self.assertEqual(len(found), len(wanted))
+                for value, node in zip(found, wanted):
+                    if node["type"] != "UTC Timestamp":
+                        self.assertEqual(value, node.get("value"))
+
+    def test_damage_ends_the_rows_of_its_file(self):
+        for kind, (content, offset, place, sentence, left) in KINDS.items():
+            if "another form" in kind or "first header" in kind:
+                continue
+            with self.subTest(kind=kind):
+                path = self.file(content)
+                result = self.table(path, *HOSTS, status=1)
+                begin = f"tav: {path}: {offset:#x} {place}: "
+                self.assertEqual([line[:len(begin)] for line in result.err.splitlines()][:1], [begin])
+                stopped = len(result.out.splitlines()) - 1
+                skipped = self.table(path, *HOSTS, "--on-damage", "skip", status=1)
+                self.assertIn(begin, skipped.err)
+                self.assertIn(sentence, skipped.err)
+                rows = skipped.out.splitlines()[1:]
+                self.assertEqual(rows[:stopped], result.out.splitlines()[1:])
+                stray = kind in ("a header of a group", "a value that ends past its parent",
+                                 "a group that ends past its parent")  # one value is in no host
+                self.assertEqual(len([row for row in rows if row]), left - stray)
+
+    def test_each_stream_is_read_in_its_own_form(self):
+        for kind, (content, *_) in KINDS.items():
+            if "another form" in kind:
+                with self.subTest(kind=kind):
+                    result = self.table(self.file(content), *HOSTS)
+                    self.assertEqual(len(result.out.splitlines()), 1 + 40)
+        for kind, content in SOUND.items():
+            with self.subTest(kind=kind):
+                self.assertEqual(self.table(self.file(content), "--each", "/*", "--col", "*", status=0).err, "")
+
+    def test_the_next_file_is_read(self):
+        sound = self.file(STREAM, "sound.tav")
+        damaged = self.file(overwritten(STREAM, host(3), 40), "damaged.tav")
+        text = self.file(b"no stream at all, whatever is done with it, or so", "text.tav")
+        empty = self.file(b"", "empty.tav")
+        rows = len(self.table(sound, *HOSTS).out.splitlines()) - 1
+        self.assertEqual(rows, 20)
+        for files, status, count in (((damaged, sound), 1, 23), ((text, sound), 3, 20), ((empty, sound), 3, 20),
+                                     ((self.folder / "none", sound), 2, 20), ((sound, damaged, empty), 3, 23)):
+            with self.subTest(files=files):
+                result = self.table(*files, *HOSTS, status=status)
+                self.assertEqual(len(result.out.splitlines()), 1 + count)
+                self.assertNotEqual(result.err, "")
+
+    def test_no_row_is_the_header_and_a_finding(self):
+        path = self.file(STREAM)
+        self.assertEqual(self.table(path, "--each", "/host", "--col", "a=#60111", status=1).out, "a\n")
+        self.assertEqual(self.table(path, "--each", "/host", "--col", "a=#60111", "--format", "jsonl", status=1).out, "")
+
+    def test_wrong_usage(self):
+        path = self.file(STREAM)
+        for arguments in (("--col", "x"), ("--each", "/system"), ("--each", "/system", "--col", "a["),
+                          ("--each", "/[", "--col", "host"), (*HOSTS, "--format", "parquet"), (*HOSTS, "--format", "xls"),
+                          (*HOSTS, "--on-damage", "hope"), (*HOSTS, "--label", "x"), (*HOSTS, "--label", "a b=x"),
+                          (*HOSTS, "--col", "n=host"), (*HOSTS, "--file", "--label", "file=x"), (*HOSTS, "--rate"),
+                          (*HOSTS, "--counter", "m", "--rate"), (*HOSTS, "--crlf", "--format", "jsonl"),
+                          (*HOSTS, "--rate", "--counter", "n", "--format", "openmetrics"), ("-", "-", *HOSTS)):
+            with self.subTest(arguments=arguments):
+                self.table(path, *arguments, status=2)
+        self.table(path, "--each", "/system", "--col", "hostNam", status=1)  # a name that no element has
+        self.assertEqual(len(self.table("-", *HOSTS, stdin=STREAM).out.splitlines()), 21)
+
+    def test_a_file_larger_than_its_memory(self):
+        path = self.folder / "large.tav"
+        one = system(hosts=1000)
+        with open(path, "wb") as file:
+            for _ in range(2000):
+                file.write(one)
+        result = tav_in_little_memory("table", path, *HOSTS, "-o", self.folder / "out.csv")
+        self.assertEqual((result.status, result.err), (0, ""))
+        with open(self.folder / "out.csv", encoding="ascii") as file:
+            self.assertEqual(sum(1 for _ in file), 2_000_001)
+
+
+class Series(Table):
+    def series(self, *samples):
+        return self.stream([sample(*each) for each in samples], f"{random.random()}.tav")
+
+    ARGUMENTS = ("--each", "/system", "--col", "time=timestamp", "--col", "n=cpuOnline", "--counter", "n", "--rate")
+
+    def rates(self, *arguments):
+        return [row[1] for row in self.rows(*arguments)[1:]]
+
+    def test_a_rate_is_by_the_second_and_begins_anew_where_a_counter_does(self):
+        day = "2024-05-01T10:20:"
+        path = self.series((day + "00Z", 100), (day + "10Z", 150), (day + "10.5Z", 151), (day + "20Z", 7), (day + "21Z", 9),
+                           (day + "21Z", 12), (day + "23Z", 13))
+        self.assertEqual(self.rates(path, *self.ARGUMENTS), ["", "5", "2", "", "2", "", "2"])
+
+    def test_it_goes_on_from_file_to_file(self):
+        first = self.series(("2024-05-01T10:20:00Z", 2**64 - 2))
+        second = self.series(("2024-05-01T10:20:02Z", 2**64 - 1), ("2024-05-01T10:20:03Z", 0))
+        self.assertEqual(self.rates(first, second, *self.ARGUMENTS), ["", "0.5", ""])
+
+
+class Metrics(Table):
+    def metrics(self, document, *arguments, status=0):
+        return self.table(self.stream(document), *arguments, "--format", "openmetrics", status=status)
+
+    HOST = ("--each", "/system/host", "--col", "hostName", "--col", "up=cpuOnline", "--col", "read_total=memTotal")
+
+    def test_a_snapshot_is_a_page_of_metrics(self):
+        document = {"element": "system", "children": [{"element": "host", "children": [
+            leaf("hostName", name), leaf("cpuOnline", i, "Sint32"), leaf("memTotal", 2**63 + i, "Uint64")]}
+            for i, name in enumerate(("ada", 'g"r\\a\nce', "h\u00e4"))]}
+        text = self.metrics(document, *self.HOST, "--label", "job=x").raw.decode()
+        labels = ('job="x",hostName="ada"', 'job="x",hostName="g\\"r\\\\a\\nce"', 'job="x",hostName="h\u00e4"')
+        self.assertEqual(text.split("\n"), [
+            "# TYPE up gauge", "# HELP up cpuOnline", *[f"up{{{label}}} {i}" for i, label in enumerate(labels)],
+            "# TYPE read counter", "# HELP read memTotal",
+            *[f"read_total{{{label}}} {2**63 + i}" for i, label in enumerate(labels)], "# EOF", ""])
+
+    def test_rows_that_nothing_tells_apart_are_refused(self):
+        document = {"element": "system", "children": [{"element": "host", "children": [leaf("cpuOnline", 1)]}] * 2}
+        result = self.metrics(document, *self.HOST, status=2)
+        self.assertIn("two rows have the same labels", result.err)
+        self.assertEqual(result.out, "")
+        self.metrics(document, "--each", "//host", "--col", "a/b=cpuOnline", status=2)
+        self.metrics(document, "--each", "//host", "--col", "#60111", status=2)
+
+
+@unittest.skipIf(EMULATOR, "an emulator is slow to begin")
+class Growing(Table):
+    def test_what_is_there_is_read(self):
+        path = self.folder / "g.tav"
+        whole = system(hosts=3)
+        path.write_bytes(b"\xff" * 8 + whole[8:])  # its root was never closed
+        self.assertEqual(len(self.table(path, *HOSTS).out.splitlines()), 4)
+        path.write_bytes(b"\xff" * 8 + whole[8:-5])
+        result = self.table(path, *HOSTS, status=1)
+        self.assertEqual(len(result.out.splitlines()), 3)
+
+
+if __name__ == "__main__":
+    unittest.main()
