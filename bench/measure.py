@@ -21,7 +21,7 @@ import time
 
 import compiling
 
-SMALL = "^(W[1-5](dom|mem|file)?|call)/([^_]|_[^t]|_t[^r])*$"
+SMALL = "^(W[1-5](dom|mem|file|table)?|call)/([^_]|_[^t]|_t[^r])*$"
 TRACED = "_traced$"  # in a process of their own: one that has traced looks twice from then on
 # Which entries run interleaved with one another, how often, and for how many seconds each time at the least.
 GROUPS = [(SMALL, 15, 0.02), (TRACED, 5, 0.02), ("^W6", 7, 0.02), ("^W[125]cold/", 5, 0.01), ("^W7", 5, 0.01), ("^W9", 5, 0.01)]

@@ -51,6 +51,7 @@ WORKS = [
     Work("W2cold", "walk and sum 1 GiB", "floor"),
     Work("W5cold", "validate 1 GiB", "floor"),
     Work("W2dom", "walk a tree that was parsed before", "W2/floor"),
+    Work("W2table", "a table of all leaves", "W2/tavGetNextChild"),
     Work("W3dom", "path look-up in a tree that was parsed before", "W3/floor", (), "ns a look-up"),
     Work("W4mem", "the whole tree as text, into memory", "floor_to_chars_xml"),
     Work("W6cache", "scan for the eye catcher, 512 KiB", "both_avx2", (), "GB/s", 512 << 10),
@@ -67,7 +68,7 @@ PROGRAM_GOALS = {"check": 0.35, "tree": 1.5, "json": 1.5, "json --lines": 2, "xm
 LIBRARY = ("tav", "layer", "open_close_", "header_stack_")
 FLOORS = ("floor", "both_", "read_bandwidth", "memcpy", "pread_", "pwrite_", "mmap")
 # Entries that show something beside the goal's own work.
-BESIDE = ("_traced", "tavPrintSubtree_text", "layer_index_made")
+BESIDE = ("_traced", "tavPrintSubtree_text", "layer_index_made", "tavTable_condition", "tavTable_walker_alone")
 
 
 def kind(entry):
