@@ -170,6 +170,13 @@ uint32_t KORHFile::syncData()
   return native_ == kNoFile ? KOR_RC_NOT_OPEN : syncDataNative(native_);
 }
 
+uint32_t KORHFile::findData(uint64_t offset, uint64_t* pFound) const
+{
+  if (pFound == nullptr || offset > static_cast<uint64_t>(INT64_MAX)) return TAV_RC_BAD_PARAM;
+  *pFound = offset;
+  return native_ == kNoFile ? KOR_RC_NOT_OPEN : findDataNative(native_, offset, *pFound);
+}
+
 uint32_t KORHFile::copyRights(const KORHFile& from)
 {
   const bool open = native_ != kNoFile && from.native_ != kNoFile;
@@ -188,6 +195,32 @@ uint32_t KORHFile::replaceBy(const char* pFrom, const char* pPath)
   const uint32_t code = renameNative(pFrom, pPath);
   if (code == TAV_RC_OK && native_ != kNoFile) close(); // nobody reaches it by the path any more
   return code;
+}
+
+KORFileMapping::KORFileMapping()
+    : pBytes_(nullptr), size_(0) {}
+
+KORFileMapping::~KORFileMapping()
+{
+  unmap();
+}
+
+uint32_t KORFileMapping::map(const KORHFile& file)
+{
+  if (pBytes_ != nullptr) return KOR_RC_BUSY;
+  return file.native_ == kNoFile ? KOR_RC_NOT_OPEN : mapNative(file.native_, pBytes_, size_);
+}
+
+void KORFileMapping::unmap()
+{
+  if (pBytes_ != nullptr) unmapNative(pBytes_, size_);
+  pBytes_ = nullptr;
+  size_ = 0;
+}
+
+void KORFileMapping::readAhead()
+{
+  if (pBytes_ != nullptr) readAheadNative(pBytes_, size_);
 }
 
 uint32_t korSyncFolderOf(const char* pPath)

@@ -52,6 +52,15 @@ uint32_t syncFolderNative(const char* pPath);
 uint32_t copyRightsNative(intptr_t from, intptr_t to);
 bool isAtNative(intptr_t file, const char* pPath);
 
+/// As KORHFile::findData: `found` is `offset` where the system does not tell.
+uint32_t findDataNative(intptr_t file, uint64_t offset, uint64_t& found);
+
+/// Maps the whole of a regular file that is not empty for reading; TAV_RC_NOT_SUPPORTED for others.
+uint32_t mapNative(intptr_t file, void*& bytes, uint64_t& size);
+void unmapNative(void* bytes, uint64_t size);
+/// Tells the system that a mapping is read from its start to its end.
+void readAheadNative(void* bytes, uint64_t size);
+
 /// Whether a path leads to something that is no file and no folder.
 bool isDeviceNative(const char* pPath);
 

@@ -4,11 +4,11 @@
 ///
 /// | source          | gives                                                                                    |
 /// | --------------- | ---------------------------------------------------------------------------------------- |
-/// | file…           | the functions of kor/fileNative.h: opening, transfer, locks, sizes, syncing, renaming     |
-/// | systemError…    | `codeOfSystemError`: one table from the system's errors to codes                          |
-/// | thread…         | `korThreadID`, of tav/kor.h                                                                |
-/// | lineBuffered…   | `isLineBuffered`: how a standard stream passes on what is written to it                    |
-/// | fileWatch…      | `FileWatch`: waiting for a file to grow; looking ten times a second will do                |
+/// | file…           | the functions of kor/fileNative.h: opening, transfer, locks, sizes, syncing, renaming, mapping,
+/// holes | | systemError…    | `codeOfSystemError`: one table from the system's errors to codes | | thread…         |
+/// `korThreadID`, of tav/kor.h                                                                | | lineBuffered…   |
+/// `isLineBuffered`: how a standard stream passes on what is written to it                    | | fileWatch…      |
+/// `FileWatch`: waiting for a file to grow; looking ten times a second will do                |
 ///
 /// The byte order is asked for in tav/byteOrder.h, how symbols are exported in tav/decl.h, and what separates folders
 /// in tav/kor.h. The program asks for more: tools/host/host.h (terminals, open files, signals) and

@@ -9,3 +9,4 @@
 #define NOMINMAX
 #endif
 #include <windows.h>
+#include <winioctl.h>

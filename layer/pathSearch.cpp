@@ -20,6 +20,15 @@ bool isAbsolute(const paths::Compiled& path) noexcept
                      [&path](uint32_t index) { return path.routes[index].absolute; });
 }
 
+/// Whether the path leads to any level, and with that past every node.
+bool looksEverywhere(const paths::Compiled& path) noexcept
+{
+  return std::any_of(path.routes.begin(), path.routes.end(), [](const paths::Route& route) {
+    return std::any_of(route.steps.begin(), route.steps.end(),
+                       [](const paths::Step& step) { return step.axis == paths::Axis::descendantOrSelf; });
+  });
+}
+
 class NodeSearch final : public PathSearch
 {
 public:
@@ -27,6 +36,10 @@ public:
       : path_(path), tree_(state), matcher_(tree_, path)
   {
     paths::retainPath(path_);
+    if (looksEverywhere(path_))
+    {
+      state.walk();
+    }
   }
   ~NodeSearch() override
   {

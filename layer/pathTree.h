@@ -156,7 +156,7 @@ struct NodeTree
   private:
     void enter(const Node& node)
     {
-      range_.emplace(node.descendants(ec_, EndElements::show));
+      range_.emplace(node.below(ec_));
     }
     bool readRoot() noexcept
     {

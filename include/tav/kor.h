@@ -257,9 +257,50 @@ public:
   /// failure this file is as it was, but on Windows it is closed.
   uint32_t replaceBy(const char* pFrom, const char* pPath);
 
+  /// The first place at or behind an offset where the file can hold something else than zeros: behind the hole of a
+  /// sparse file, which reads as zeros and takes no room on the device. The file's size when nothing is behind; the
+  /// offset itself where the system does not tell. The position stays.
+  /// @retval KOR_RC_NOT_OPEN, TAV_RC_BAD_PARAM
+  uint32_t findData(uint64_t offset, uint64_t* pFound) const;
+
 private:
+  friend class KORFileMapping;
+
   intptr_t native_; ///< descriptor or system handle; -1 when closed
   bool locked_;
+};
+
+/// A file as it stands, as memory that can only be read: nothing is copied, and it may be larger than memory is. It
+/// shows what others write into the file, and has the size that the file had. On POSIX systems a program that reads
+/// bytes which another one has cut off since ends by SIGBUS, and reading what the device cannot give does the same; on
+/// Windows a mapped file can be neither cut nor replaced. Not shared between threads while it is mapped or unmapped.
+class KOR_API KORFileMapping
+{
+public:
+  KORFileMapping();
+  ~KORFileMapping(); ///< unmaps
+  KORFileMapping(const KORFileMapping&) = delete;
+  KORFileMapping& operator=(const KORFileMapping&) = delete;
+
+  /// Maps all of a file that is open for reading; it may be closed then. The system is told that a few places are
+  /// looked at, and reads nothing ahead of them.
+  /// @retval TAV_RC_NOT_SUPPORTED  no regular file, or one of size 0, as an empty one and those in /proc
+  /// @retval TAV_RC_NO_MEMORY      there are no addresses for so many bytes
+  /// @retval KOR_RC_BUSY           this object has a file already
+  /// @retval KOR_RC_NOT_OPEN, and codes of the system
+  uint32_t map(const KORHFile& file);
+  /// Gives the addresses back.
+  void unmap();
+  /// Tells the system that the bytes are read one after another from now on: it reads ahead.
+  void readAhead();
+
+  /// The first byte; null while nothing is mapped.
+  const void* bytes() const { return pBytes_; }
+  uint64_t size() const { return size_; }
+
+private:
+  void* pBytes_;
+  uint64_t size_;
 };
 
 extern "C" {

@@ -377,6 +377,17 @@ private:
     return tavGetNextChild(0, state_->handle, &parent_, reference, &data_);
   }
 
+  /// Before a walk that somebody asks for.
+  void beginWalk() const noexcept
+  {
+    if (state_ != nullptr)
+    {
+      state_->walk();
+    }
+  }
+  /// The nodes below, for a path, which may look at few of them.
+  [[nodiscard]] DescendantRange below(std::error_code& ec) const;
+
   /// Surely no end element, in one look: those have the largest ids.
   [[nodiscard]] bool isSurelyNoEnd() const noexcept
   {

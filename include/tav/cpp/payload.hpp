@@ -31,6 +31,9 @@ struct ReaderState
   uint64_t fetches = 0; ///< payload pointers into a ring last until the next one
   bool isFast = false;  ///< over memory, in this machine's order; unknown once the handle was given away
   InPlace inPlace = InPlace::no;
+  /// What comes later stands here: nodes that an older library handed out know the places of what is above.
+  bool readsAhead = true; ///< false: the system was told that a few places of a mapping are looked at
+  KORFileMapping mapping{};
 
   ReaderState() = default;
   ReaderState(const ReaderState&) = delete;
@@ -53,9 +56,20 @@ struct ReaderState
                                                        : InPlace::no;
   }
 
+  /// A walk begins: what it comes to stands one behind another.
+  void walk() noexcept
+  {
+    if (!readsAhead) [[unlikely]]
+    {
+      readsAhead = true;
+      mapping.readAhead();
+    }
+  }
+
   /// The handle is given away: a plain operation can give it another storage.
   void share() noexcept
   {
+    walk();
     isFast = false;
     inPlace = InPlace::no;
   }
@@ -72,9 +86,10 @@ struct ReaderState
 
 } // namespace detail
 
-/// A node's payload as stored in the stream. Over memory it lives as long as the memory, over a file or another
-/// storage until anything else is read through the reader: then, in debug builds, using it throws std::logic_error.
-/// It converts to std::span<const std::byte>, which is not checked. It must not outlive the reader.
+/// A node's payload as stored in the stream. Over memory it lives as long as the memory, over a mapped file as long as
+/// the reader, over a file that is read through a ring or another storage until anything else is read through the
+/// reader: then, in debug builds, using it throws std::logic_error. It converts to std::span<const std::byte>, which is
+/// not checked. It must not outlive the reader.
 class PayloadView
 {
 public:

@@ -399,35 +399,47 @@ namespace tav
 
 inline ChildRange Node::children(EndElements endElements) const
 {
+  beginWalk();
   return {*this, endElements, nullptr};
 }
 
 inline ChildRange Node::children(std::error_code& ec, EndElements endElements) const
 {
+  beginWalk();
   ec.clear();
   return {*this, endElements, &ec};
 }
 
 inline ChildRange Node::siblings(EndElements endElements) const
 {
+  beginWalk();
   return {ChildRange::Behind{*this}, endElements, nullptr};
 }
 
 inline ChildRange Node::siblings(std::error_code& ec, EndElements endElements) const
 {
+  beginWalk();
   ec.clear();
   return {ChildRange::Behind{*this}, endElements, &ec};
 }
 
 inline DescendantRange Node::descendants(EndElements endElements) const
 {
+  beginWalk();
   return {*this, endElements, nullptr};
 }
 
 inline DescendantRange Node::descendants(std::error_code& ec, EndElements endElements) const
 {
+  beginWalk();
   ec.clear();
   return {*this, endElements, &ec};
+}
+
+inline DescendantRange Node::below(std::error_code& ec) const
+{
+  ec.clear();
+  return {*this, EndElements::show, &ec};
 }
 
 inline std::optional<Node> Node::next() const

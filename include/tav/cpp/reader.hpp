@@ -48,7 +48,7 @@ public:
   template<detail::TemporaryBytes T>
   Reader(T&& bytes, const StreamOptions& options, std::error_code& ec) = delete;
 
-  /// Over a file, through a ring.
+  /// Over a file: mapped, or through a ring, as `options.access` says.
   explicit Reader(const FilePath& path, const StreamOptions& options = {})
       : Reader()
   {
@@ -288,9 +288,28 @@ private:
   uint32_t openPath(const FilePath& path, const StreamOptions& options)
   {
     detail::Owner<TAVSSFile> storage;
-    const uint32_t rc = detail::openFile(path, KOR_FILE_READ, storage);
+    uint32_t rc = detail::openFile(path, KOR_FILE_READ, storage);
+    if (rc != TAV_RC_OK)
+    {
+      return rc;
+    }
+    if (options.access != Access::ring)
+    {
+      KORFileMapping& mapping = state_->mapping;
+      rc = mapping.map(*storage->pFile);
+      if (rc == TAV_RC_OK)
+      {
+        state_->readsAhead = false;
+        return openBytes({static_cast<const std::byte*>(mapping.bytes()), static_cast<size_t>(mapping.size())},
+                         options);
+      }
+      if (options.access == Access::mapped)
+      {
+        return rc;
+      }
+    }
     state_->owned = std::move(storage);
-    return rc != TAV_RC_OK ? rc : open(state_->owned.get(), options);
+    return open(state_->owned.get(), options);
   }
 
   /// A node from a plain operation.
@@ -327,12 +346,39 @@ private:
     });
   }
 
+  /// The node that ends with a mapped file, when its pair is the first at or behind an offset: over memory the
+  /// operation does not see a pair that ends with the block.
+  uint32_t readLast(uint64_t offset, Node& node) const noexcept
+  {
+    uint64_t eye = 0;
+    uint64_t distance = 0;
+    bool swapped = false;
+    // It says so of an eye catcher, and of nothing else in the block, when its distance ends there.
+    const uint32_t first = tavFindEyeSizeComboInt(use(), offset, 0, false, &eye, &distance, &swapped);
+    const uint64_t end = state_->mapping.size();
+    if (first != TAV_RC_NO_MEMORY || offset >= end)
+    {
+      return TAV_RC_NOT_FOUND;
+    }
+    TAVHeaderData behind{};
+    behind.header.nodeOffset = end;
+    behind.header.hdrType = TAV_HDR_64;
+    const uint32_t rc = read(node, [&behind](TAVHandle& used, TAVHeaderData& data) {
+      return tavGetPrevNode(0, &used, &behind, &data);
+    });
+    return rc == TAV_RC_OK ? rc : TAV_RC_NOT_FOUND;
+  }
+
   uint32_t findEnding(uint64_t offset, std::optional<Node>& found) const noexcept
   {
     Node node;
-    const uint32_t rc = read(node, [=](TAVHandle& used, TAVHeaderData& data) {
+    uint32_t rc = read(node, [=](TAVHandle& used, TAVHeaderData& data) {
       return tavFindNodeFromIndex(0, &used, offset, 0, &data);
     });
+    if (rc == TAV_RC_NOT_FOUND && state_->mapping.size() != 0)
+    {
+      rc = readLast(offset, node);
+    }
     if (rc == TAV_RC_OK)
     {
       found = node;
@@ -373,6 +419,10 @@ private:
 
   uint32_t check() const noexcept
   {
+    if (state_ != nullptr)
+    {
+      state_->walk();
+    }
     Node first;
     const uint32_t rc = readRoot(first);
     TAVHeader header = first.header();

@@ -16,6 +16,20 @@
 namespace tav
 {
 
+/// How a Reader gets at the bytes of a file.
+enum class Access : uint8_t
+{
+  /// Mapped, where the system can map the file; else through a ring.
+  automatic,
+  /// As memory: nothing is copied, nodes and payloads last as long as the reader, and it has the file as it was when it
+  /// was opened, but for what is written into it since. TAV_RC_NOT_SUPPORTED for what has no size: devices, pipes,
+  /// files in /proc, empty ones; TAV_RC_NO_MEMORY where there are no addresses for it. Not for a file that another
+  /// process may make shorter: to read what is no longer there ends the program on POSIX systems. See docs/files.md.
+  mapped,
+  /// Read through a ring: any file, also one that is written, cut or grows meanwhile.
+  ring
+};
+
 /// How a stream is laid out; reader and writer must agree, nothing in the stream says so.
 struct StreamOptions
 {
@@ -23,6 +37,7 @@ struct StreamOptions
   bool align8 = false;               ///< payloads are padded to multiples of 8
   Width root = Width::bits64;        ///< header of the stream's first node
   uint64_t ringBytes = 10ULL << 20U; ///< memory of the ring over a file; a data element can be as large, not larger
+  Access access = Access::automatic; ///< how a Reader gets at a file; nobody else asks
 };
 
 namespace detail

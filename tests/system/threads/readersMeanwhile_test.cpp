@@ -68,7 +68,7 @@ void record(Shared& shared)
 /// just being written, which may end anywhere. How many of the first ones there are.
 uint32_t walk(const Shared& shared, uint32_t due)
 {
-  const tav::Reader reader(shared.path, {.ringBytes = 2U << 20U});
+  const tav::Reader reader(shared.path, {.ringBytes = 2U << 20U, .access = tav::Access::ring});
   uint32_t roots = 0;
   std::error_code ec;
   for (const tav::Node& root : reader.roots(ec))

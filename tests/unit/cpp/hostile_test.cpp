@@ -6,8 +6,8 @@
 
 using namespace test;
 
-// Whatever the bytes are: walks end, nothing outside the block is read (the block ends with its last byte, and the
-// address sanitizer watches), and failures are codes of the library.
+// Whatever the bytes are, in memory, mapped or behind a ring: walks end, nothing outside the block is read (the block
+// ends with its last byte, and the address sanitizer watches), and failures are codes of the library.
 
 namespace
 {
@@ -73,12 +73,14 @@ uint64_t visitAll(const tav::Reader& reader, uint64_t size)
   return visits;
 }
 
-void visitBothWays(const Bytes& stream)
+void visitEveryWay(const Bytes& stream)
 {
   const auto exact = std::make_unique<std::byte[]>(stream.size()); // ends with the block
   std::copy_n(std::as_bytes(std::span(stream)).begin(), stream.size(), exact.get());
   const tav::Reader direct(std::span<const std::byte>(exact.get(), stream.size()));
-  visitAll(direct, stream.size());
+  const uint64_t visits = visitAll(direct, stream.size());
+  const StreamFile file(stream);
+  EXPECT_EQ(visitAll(tav::Reader(file.path(), {.access = tav::Access::mapped}), stream.size()), visits);
   VectorStorage storage(0x1000, stream, VectorStorage::kReadOnly);
   const tav::Reader buffered(storage, {.ringBytes = 0x1000});
   visitAll(buffered, stream.size());
@@ -101,7 +103,7 @@ TEST(LayerHostile, EveryTruncationEnds)
   const Bytes stream = sample();
   for (size_t length = 1; length < stream.size(); ++length)
   {
-    visitBothWays(Bytes(stream.begin(), stream.begin() + static_cast<ptrdiff_t>(length)));
+    visitEveryWay(Bytes(stream.begin(), stream.begin() + static_cast<ptrdiff_t>(length)));
   }
 }
 
@@ -114,7 +116,7 @@ TEST(LayerHostile, EveryByteSetToExtremesEnds)
     {
       Bytes damaged = stream;
       damaged[at] = value;
-      visitBothWays(damaged);
+      visitEveryWay(damaged);
     }
   }
 }
@@ -130,7 +132,7 @@ TEST(LayerHostile, RandomDamageEnds)
     {
       damaged[random() % damaged.size()] = static_cast<uint8_t>(random());
     }
-    visitBothWays(damaged);
+    visitEveryWay(damaged);
   }
 }
 
@@ -154,7 +156,7 @@ TEST(LayerHostile, OpenGroupsThatLeadBackEndTheWalk)
   rows.h64(TAV_SIZE_UNKNOWN, TAV_INFO_EYE_SIZE, TAV_TYPE_HEADER64, TAV_ELM_CMN_HOST);
   rows.h64(0, 0, TAV_TYPE_ASCII_STRING, TAV_ELM_CMN_HOST_NAME);
   rows.end64(48 - 16 + 16).end64(32).end64(200);
-  visitBothWays(rows.bytes);
+  visitEveryWay(rows.bytes);
 }
 
 TEST(LayerHostile, PathThroughOpenGroupsThatOverlapIsNotSearchedOverAndOver)

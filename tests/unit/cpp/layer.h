@@ -3,7 +3,9 @@
 
 #define TAV_CHECK_PAYLOADS 1 // also where NDEBUG is defined
 
+#include <cstdio>
 #include <filesystem>
+#include <span>
 #include <string>
 #include <system_error>
 
@@ -82,6 +84,38 @@ private:
     static int count = 0;
     return "tav-layer-" + std::to_string(tav::host::processId()) + "-" + std::to_string(++count);
   }
+};
+
+/// A file with bytes in it.
+class StreamFile
+{
+public:
+  explicit StreamFile(std::span<const uint8_t> bytes)
+  {
+    write(bytes, "wb");
+  }
+
+  /// Adds bytes at its end, as somebody else would.
+  void append(std::span<const uint8_t> bytes) const
+  {
+    write(bytes, "ab");
+  }
+
+  [[nodiscard]] const std::filesystem::path& path() const
+  {
+    return file_.path;
+  }
+
+private:
+  void write(std::span<const uint8_t> bytes, const char* mode) const
+  {
+    std::FILE* const stream = std::fopen(tav::host::textOf(file_.path).c_str(), mode);
+    ASSERT_NE(stream, nullptr);
+    EXPECT_EQ(std::fwrite(bytes.data(), 1, bytes.size(), stream), bytes.size());
+    EXPECT_EQ(std::fclose(stream), 0);
+  }
+
+  TemporaryPath file_;
 };
 
 } // namespace test

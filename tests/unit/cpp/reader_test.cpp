@@ -57,20 +57,51 @@ std::string printed(const tav::Reader& reader, const tav::PrintOptions& options,
 
 } // namespace
 
-struct Access
+namespace
 {
-  bool buffered;
+
+enum class From : uint8_t
+{
+  memory,
+  ring,
+  mapped
+};
+
+struct Opening
+{
+  From from;
   tav::StreamOptions options;
 };
 
-/// Walks give the same in memory and through a ring, in every form.
-class LayerReader : public ::testing::TestWithParam<Access>
+std::string nameOf(const Opening& opening)
+{
+  const std::string from = opening.from == From::memory ? "Direct" : opening.from == From::ring ? "Buffered"
+                                                                                                : "Mapped";
+  return from + (opening.options.byteOrder == tav::ByteOrder::swapped ? "Swapped" : "") +
+         (opening.options.align8 ? "Aligned" : "");
+}
+
+} // namespace
+
+/// Walks give the same in memory, through a ring and from a mapped file, in every form.
+class LayerReader : public ::testing::TestWithParam<Opening>
 {
 protected:
+  [[nodiscard]] tav::Reader open()
+  {
+    tav::StreamOptions options = GetParam().options;
+    switch (GetParam().from)
+    {
+    case From::ring: return tav::Reader(storage, options);
+    case From::mapped: options.access = tav::Access::mapped; return tav::Reader(file.path(), options);
+    default: return tav::Reader(spanOf(stream), options);
+    }
+  }
+
   const Bytes stream = sample(GetParam().options);
+  const StreamFile file{stream};
   VectorStorage storage{0x1000, stream, VectorStorage::kReadOnly};
-  const tav::Reader reader = GetParam().buffered ? tav::Reader(storage, GetParam().options)
-                                                 : tav::Reader(spanOf(stream), GetParam().options);
+  const tav::Reader reader = open();
 };
 
 TEST_P(LayerReader, RootIsTheFirstNode)
@@ -262,15 +293,14 @@ TEST_P(LayerReader, MovedReaderKeepsItsNodes)
 
 INSTANTIATE_TEST_SUITE_P(
     Forms, LayerReader,
-    ::testing::Values(Access{false, {}}, Access{true, {.ringBytes = 0x2000}},
-                      Access{false, {.byteOrder = tav::ByteOrder::swapped}},
-                      Access{true, {.byteOrder = tav::ByteOrder::swapped, .ringBytes = 0x2000}},
-                      Access{false, {.align8 = true}}, Access{true, {.align8 = true, .ringBytes = 0x2000}}),
-    [](const auto& row) {
-      return std::string(row.param.buffered ? "Buffered" : "Direct") +
-             (row.param.options.byteOrder == tav::ByteOrder::swapped ? "Swapped" : "") +
-             (row.param.options.align8 ? "Aligned" : "");
-    });
+    ::testing::Values(Opening{From::memory, {}}, Opening{From::ring, {.ringBytes = 0x2000}}, Opening{From::mapped, {}},
+                      Opening{From::memory, {.byteOrder = tav::ByteOrder::swapped}},
+                      Opening{From::ring, {.byteOrder = tav::ByteOrder::swapped, .ringBytes = 0x2000}},
+                      Opening{From::mapped, {.byteOrder = tav::ByteOrder::swapped}},
+                      Opening{From::memory, {.align8 = true}},
+                      Opening{From::ring, {.align8 = true, .ringBytes = 0x2000}},
+                      Opening{From::mapped, {.align8 = true}}),
+    [](const auto& row) { return nameOf(row.param); });
 
 TEST(LayerRanges, AreInputRangesAndViews)
 {
