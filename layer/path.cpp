@@ -26,11 +26,12 @@ const Counted& countedOf(const Compiled& path) noexcept
 
 } // namespace
 
-const Compiled* readPath(const char* text, size_t length, const FaultTaker& taker)
+const Compiled* readPath(const char* text, size_t length, const dictionary::OwnName* own, size_t owns,
+                         const FaultTaker& taker)
 {
   auto path = std::make_unique<Counted>();
   PathFault fault;
-  Parser(std::string_view(text, length), *path, fault).parse();
+  Parser(std::string_view(text, length), dictionary::OwnNames(own, owns), *path, fault).parse();
   if (fault.kind != PathFault::Kind::none)
   {
     taker.take(taker.fault, static_cast<uint32_t>(fault.kind), fault.column,

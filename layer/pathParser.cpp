@@ -35,7 +35,23 @@ bool Parser::parse()
   path_.isStraight = path_.main.size() == 1 && first.ups == 0 && !first.steps.empty() &&
                      std::all_of(first.steps.begin(), first.steps.end(),
                                  [this](const Step& step) { return isFirstOfOne(step); });
+  keepOwnTags();
   return true;
+}
+
+void Parser::keepOwnTags()
+{
+  const auto asks = [](const Route& route) {
+    return route.attribute == Attribute::id || route.attribute == Attribute::name;
+  };
+  if (!own_.empty() && std::any_of(path_.routes.begin(), path_.routes.end(), asks))
+  {
+    for (const dictionary::OwnName& name : own_)
+    {
+      path_.ownTags.push_back(name.id);
+    }
+    putInOrder(path_.ownTags);
+  }
 }
 
 bool Parser::parseUnion(std::vector<uint32_t>& routes, bool inBrackets)
@@ -205,7 +221,7 @@ void Parser::setIds(Step& step, const std::vector<uint16_t>& ids)
 
 void Parser::tellUnknown(size_t start, std::string_view name)
 {
-  const std::string nearest(nearestTag(name));
+  const std::string nearest(nearestTag(name, own_));
   tell(PathFault::Kind::unknownName, start,
        "no element is called " + quoted(name) + (nearest.empty() ? "" : "; did you mean " + nearest + "?"));
   fault_.nearest = nearest;
@@ -253,7 +269,8 @@ bool Parser::parseTest(Step& step)
   {
     return fail(start, quoted(name) + " is no pattern; * is any element, ** any number of levels");
   }
-  const std::vector<uint16_t> ids = name.find('*') == std::string_view::npos ? idsNamed(name) : idsLike(name);
+  const std::vector<uint16_t> ids =
+      name.find('*') == std::string_view::npos ? idsNamed(name, own_) : idsLike(name, own_);
   if (ids.empty() && fault_.kind == PathFault::Kind::none)
   {
     tellUnknown(start, name);

@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "layer/pathScanner.h"
+#include "tav/dictionary.hpp"
 #include "tav/path/compiled.hpp"
 
 namespace tav::detail::paths
@@ -23,8 +24,8 @@ inline constexpr size_t kMostMixed = 4;      ///< comparisons of position() with
 class Parser : private Scanner
 {
 public:
-  Parser(std::string_view text, Compiled& path, PathFault& fault) noexcept
-      : Scanner(text, fault), path_(path)
+  Parser(std::string_view text, dictionary::OwnNames own, Compiled& path, PathFault& fault) noexcept
+      : Scanner(text, fault), path_(path), own_(own)
   {
   }
 
@@ -33,6 +34,9 @@ public:
 
 private:
   using Kind = Expression::Kind;
+
+  /// The XML form shows the id and the name of elements that it cannot call by their tags.
+  void keepOwnTags();
 
   // Routes
 
@@ -103,6 +107,7 @@ private:
   static constexpr int64_t kNoConstant = std::numeric_limits<int64_t>::max();
 
   Compiled& path_;
+  dictionary::OwnNames own_;
   size_t nested_ = 0;
   size_t steps_ = 0;
   size_t parents_ = 0;

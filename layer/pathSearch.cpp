@@ -36,6 +36,7 @@ public:
       : path_(path), tree_(state), matcher_(tree_, path)
   {
     paths::retainPath(path_);
+    tree_.ownTags = path.ownTags;
     if (looksEverywhere(path_))
     {
       state.walk();

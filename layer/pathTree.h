@@ -270,11 +270,12 @@ private:
     return "0x" + std::string(digits.data(), end.ptr);
   }
   /// Whether the XML form calls an element by its tag.
-  static bool hasXmlName(uint16_t elm)
+  bool hasXmlName(uint16_t elm) const
   {
     const std::string_view tag = dictionary::tagOf(elm);
-    return !tag.empty() && tag.find(' ') == std::string_view::npos &&
-           paths::idsNamed(tag) == std::vector<uint16_t>{elm};
+    return tag.empty() ? std::binary_search(ownTags.begin(), ownTags.end(), elm)
+                       : tag.find(' ') == std::string_view::npos &&
+                             paths::idsNamed(tag) == std::vector<uint16_t>{elm};
   }
 
   std::optional<std::string> headerAttribute(const Node& node, paths::Attribute attribute) const
@@ -349,6 +350,7 @@ private:
 
 public:
   ReaderState& state;
+  std::span<const uint16_t> ownTags{}; ///< as the path that is followed has them
   uint32_t failed = TAV_RC_OK;
 };
 

@@ -22,6 +22,17 @@ struct Entry
   std::string_view tag;      ///< the tag name, as the XML form prints it
 };
 
+/// The tag of an element that is not in the dictionary: a program's own.
+struct OwnName
+{
+  uint16_t id = 0;
+  std::string_view tag{};
+};
+
+/// The names of a program's own elements, in any order. Where one is a name of the dictionary, too, both elements bear
+/// it.
+using OwnNames = std::span<const OwnName>;
+
 namespace detail
 {
 

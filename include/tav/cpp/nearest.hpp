@@ -43,22 +43,27 @@ constexpr size_t mostSlips(std::string_view word) noexcept
   return 1 + word.size() / 4;
 }
 
-/// The tag that comes nearest to a name that no element has; empty when none is near.
-inline std::string_view nearestTag(std::string_view name) noexcept
+/// The tag that comes nearest to a name that no element has, of the dictionary's and the own ones; empty when none is
+/// near.
+inline std::string_view nearestTag(std::string_view name, dictionary::OwnNames own = {}) noexcept
 {
   std::string_view nearest;
   if (name.size() <= kLongestMisspelt)
   {
     std::array<size_t, kLongestMisspelt + 1> row{};
     size_t least = mostSlips(name) + 1;
+    const auto consider = [&](std::string_view tag) {
+      const size_t distance = editDistance(name, tag, row.data());
+      nearest = distance < least ? tag : nearest;
+      least = distance < least ? distance : least;
+    };
+    for (const dictionary::OwnName& entry : own)
+    {
+      consider(entry.tag);
+    }
     for (const dictionary::Entry& entry : dictionary::entries())
     {
-      const size_t distance = entry.constant == "INVALID_ELEMENT" ? least : editDistance(name, entry.tag, row.data());
-      if (distance < least)
-      {
-        least = distance;
-        nearest = entry.tag;
-      }
+      entry.constant == "INVALID_ELEMENT" ? void() : consider(entry.tag);
     }
   }
   return nearest;

@@ -95,6 +95,8 @@ struct Compiled
   std::vector<Route> routes{};  ///< of the path and of the expressions
   std::vector<uint32_t> main{}; ///< those of the path
   std::vector<Expression> expressions{};
+  /// Own elements with a tag, ascending, where an attribute shows which have none.
+  std::vector<uint16_t> ownTags{};
   bool isStraight = false;  ///< one route, each step of which asks for children with one id, all of them or the first
   bool leavesStart = false; ///< something in it begins above the roots, or leads up from a node
   bool keepsPlaces =

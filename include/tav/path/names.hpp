@@ -62,8 +62,15 @@ inline bool isLike(std::string_view text, std::string_view pattern) noexcept
   return pattern.find_first_not_of('*', of) == none;
 }
 
+/// Ascending, each once.
+inline void putInOrder(std::vector<uint16_t>& ids)
+{
+  std::sort(ids.begin(), ids.end());
+  ids.erase(std::unique(ids.begin(), ids.end()), ids.end());
+}
+
 /// The ids that bear a name, ascending: several elements can share a tag. Empty when no element has it.
-inline std::vector<uint16_t> idsNamed(std::string_view name)
+inline std::vector<uint16_t> idsNamed(std::string_view name, dictionary::OwnNames own = {})
 {
   std::vector<uint16_t> ids;
   for (const dictionary::Entry& entry : dictionary::entries())
@@ -74,13 +81,19 @@ inline std::vector<uint16_t> idsNamed(std::string_view name)
       ids.push_back(entry.id);
     }
   }
-  std::sort(ids.begin(), ids.end());
-  ids.erase(std::unique(ids.begin(), ids.end()), ids.end());
+  for (const dictionary::OwnName& entry : own)
+  {
+    if (entry.tag == name)
+    {
+      ids.push_back(entry.id);
+    }
+  }
+  putInOrder(ids);
   return ids;
 }
 
 /// The ids whose tags a pattern describes, ascending; those of elements that only end a group where there is no other.
-inline std::vector<uint16_t> idsLike(std::string_view stars)
+inline std::vector<uint16_t> idsLike(std::string_view stars, dictionary::OwnNames own = {})
 {
   std::string pattern; // where stars follow each other, one says the same
   std::unique_copy(stars.begin(), stars.end(), std::back_inserter(pattern),
@@ -93,12 +106,18 @@ inline std::vector<uint16_t> idsLike(std::string_view stars)
       ids.push_back(entry.id);
     }
   }
+  for (const dictionary::OwnName& entry : own)
+  {
+    if (isLike(entry.tag, pattern))
+    {
+      ids.push_back(entry.id);
+    }
+  }
   if (std::any_of(ids.begin(), ids.end(), [](uint16_t id) { return !layout::isEndElement(id); }))
   {
     ids.erase(std::remove_if(ids.begin(), ids.end(), layout::isEndElement), ids.end());
   }
-  std::sort(ids.begin(), ids.end());
-  ids.erase(std::unique(ids.begin(), ids.end()), ids.end());
+  putInOrder(ids);
   return ids;
 }
 

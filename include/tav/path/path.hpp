@@ -18,7 +18,8 @@
 ///   /                     the roots
 /// @endcode
 ///
-/// Elements that only end a group are found by their names alone.
+/// Elements that only end a group are found by their names alone. A program's own elements have the names that it
+/// gives.
 #pragma once
 
 #include <cstddef>
@@ -30,6 +31,7 @@
 
 #include "tav/cpp/chars.hpp"
 #include "tav/cpp/error.hpp"
+#include "tav/dictionary.hpp"
 
 namespace tav
 {
@@ -62,8 +64,9 @@ struct FaultTaker
 };
 
 /// Reads a path; one that cannot be read leads nowhere. It never changes, and lasts until as many have released it as
-/// have it from here and have retained it.
-TAV_API const Compiled* readPath(const char* text, size_t length, const FaultTaker& taker);
+/// have it from here and have retained it. `own`: names of elements beside the dictionary's.
+TAV_API const Compiled* readPath(const char* text, size_t length, const dictionary::OwnName* own, size_t owns,
+                                 const FaultTaker& taker);
 TAV_API void retainPath(const Compiled& path) noexcept;
 TAV_API void releasePath(const Compiled& path) noexcept;
 TAV_API bool leadsNowhere(const Compiled& path) noexcept;
@@ -72,8 +75,8 @@ TAV_API bool leadsNowhere(const Compiled& path) noexcept;
 class SharedPath
 {
 public:
-  SharedPath(std::string_view text, PathFault& fault)
-      : path_(readPath(text.data(), text.size(), FaultTaker{fault, take}))
+  SharedPath(std::string_view text, dictionary::OwnNames own, PathFault& fault)
+      : path_(readPath(text.data(), text.size(), own.data(), own.size(), FaultTaker{fault, take}))
   {
   }
   SharedPath(const SharedPath& other) noexcept
@@ -120,17 +123,35 @@ public:
   {
   }
   Path(std::string_view text, std::error_code& ec)
-      : Path(text, PathFault{}, ec)
+      : Path(text, dictionary::OwnNames(), ec)
   {
   }
   /// The same with all that is known of a failure.
   Path(std::string_view text, PathFault& fault)
-      : text_(text), compiled_(text, fault = {})
+      : Path(text, dictionary::OwnNames(), fault)
   {
   }
   /// The same as the first; `doing` begins the message.
   Path(std::string_view text, const char* doing)
-      : Path(text, PathFault{}, doing)
+      : Path(text, dictionary::OwnNames(), doing)
+  {
+  }
+
+  /// The same with names of elements that the dictionary does not have. They are looked up here and not kept.
+  Path(std::string_view text, dictionary::OwnNames own)
+      : Path(text, own, "understanding the path")
+  {
+  }
+  Path(std::string_view text, dictionary::OwnNames own, std::error_code& ec)
+      : Path(text, own, PathFault{}, ec)
+  {
+  }
+  Path(std::string_view text, dictionary::OwnNames own, PathFault& fault)
+      : text_(text), compiled_(text, own, fault = {})
+  {
+  }
+  Path(std::string_view text, dictionary::OwnNames own, const char* doing)
+      : Path(text, own, PathFault{}, doing)
   {
   }
 
@@ -152,13 +173,13 @@ public:
   }
 
 private:
-  Path(std::string_view text, PathFault&& fault, std::error_code& ec)
-      : Path(text, fault)
+  Path(std::string_view text, dictionary::OwnNames own, PathFault&& fault, std::error_code& ec)
+      : Path(text, own, fault)
   {
     detail::report(codeOf(fault), ec);
   }
-  Path(std::string_view text, PathFault&& fault, const char* doing)
-      : Path(text, fault)
+  Path(std::string_view text, dictionary::OwnNames own, PathFault&& fault, const char* doing)
+      : Path(text, own, fault)
   {
     detail::demand(codeOf(fault), doing, [&] {
       return detail::Told{text_, "column " + std::to_string(fault.column) + ": " + fault.sentence};
