@@ -10,6 +10,7 @@
 #include "tav/inspect/checker.hpp"
 #include "tav/inspect/collect.hpp"
 #include "tav/inspect/damageWatch.hpp"
+#include "tav/inspect/dictionary.hpp"
 #include "tav/inspect/diff.hpp"
 #include "tav/inspect/document.hpp"
 #include "tav/inspect/documentOptions.hpp"

@@ -86,6 +86,13 @@ TAV_C_API void tav_close(tav_reader* reader);
 /// The form of the file's first stream, no member 0.
 TAV_C_API uint32_t tav_form_of(const tav_reader* reader, tav_form* out);
 
+/// Reads names of own elements from a file, for paths and messages of this reader. A second file adds to the first.
+///
+/// @param path  UTF-8; a dictionary as docs/tav.md describes it
+/// @retval TAV_RC_BAD_PARAM  it is no dictionary, or contradicts one that was read before: the message tells both
+/// places and the system's codes. A failure leaves the names as they were.
+TAV_C_API uint32_t tav_reader_dictionary(tav_reader* reader, const char* path);
+
 /// The last failure in one line: file, offset, path and sentence. Empty when there was none. TAV_RC_NO_MORE_CHILDREN,
 /// and TAV_RC_NOT_FOUND of a search, are answers and no failures. Valid until the next call with the reader; a null
 /// reader has the empty text. Looking for the path can cost a walk up to the place.
@@ -156,6 +163,11 @@ TAV_C_API const char* tav_tag(uint16_t elm);
 /// The id of a tag, an enum name, a constant or a number (`60103`, `#60103`); of several with one tag the first.
 /// TAV_RC_NOT_FOUND where no element is called so.
 TAV_C_API uint32_t tav_id(const char* name, uint16_t* elm);
+
+/// The same with the names that tav_reader_dictionary has read; these live until it is called again, and with the
+/// reader.
+TAV_C_API const char* tav_reader_tag(const tav_reader* reader, uint16_t elm);
+TAV_C_API uint32_t tav_reader_id(const tav_reader* reader, const char* name, uint16_t* elm);
 
 /// The sentence of a code; "unknown code" for others. It lives for ever.
 TAV_C_API const char* tav_message(uint32_t rc);

@@ -242,6 +242,25 @@ uint32_t tav_form_of(const tav_reader* reader, tav_form* out)
   return TAV_RC_OK;
 }
 
+uint32_t tav_reader_dictionary(tav_reader* reader, const char* path)
+{
+  if (reader == nullptr)
+  {
+    return TAV_RC_BAD_PARAM;
+  }
+  return guarded(&reader->failure, [=] {
+    if (path == nullptr)
+    {
+      throw Error("no path was given");
+    }
+    DocumentState& state = reader->state();
+    const Dictionary both = state.source->dictionary().with(Dictionary::open(path));
+    state.options.dictionary = both;
+    state.source->setDictionary(both);
+    return uint32_t{TAV_RC_OK};
+  });
+}
+
 const char* tav_last_message(const tav_reader* reader)
 {
   if (reader == nullptr || !reader->failure.isThere)

@@ -91,6 +91,23 @@ uint32_t wholePayload(const tav_reader& reader, const PlacedNode& placed, detail
   return bytes != nullptr ? TAV_RC_OK : TAV_RC_DATA_TOO_LARGE;
 }
 
+uint32_t idNamed(const char* name, uint16_t* elm, const Dictionary& dictionary)
+{
+  return guarded(nullptr, [&] {
+    if (name == nullptr || elm == nullptr)
+    {
+      return uint32_t{TAV_RC_BAD_PARAM};
+    }
+    const std::vector<uint16_t> ids = idsOf(name, dictionary);
+    if (ids.empty())
+    {
+      return uint32_t{TAV_RC_NOT_FOUND};
+    }
+    *elm = ids.front();
+    return uint32_t{TAV_RC_OK};
+  });
+}
+
 } // namespace
 
 } // namespace tav::inspect
@@ -192,19 +209,19 @@ const char* tav_tag(uint16_t elm)
 
 uint32_t tav_id(const char* name, uint16_t* elm)
 {
-  return guarded(nullptr, [=] {
-    if (name == nullptr || elm == nullptr)
-    {
-      return uint32_t{TAV_RC_BAD_PARAM};
-    }
-    const std::vector<uint16_t> ids = idsOf(name);
-    if (ids.empty())
-    {
-      return uint32_t{TAV_RC_NOT_FOUND};
-    }
-    *elm = ids.front();
-    return uint32_t{TAV_RC_OK};
-  });
+  return idNamed(name, elm, {});
+}
+
+const char* tav_reader_tag(const tav_reader* reader, uint16_t elm)
+{
+  // of either kind a text with a zero behind it
+  const std::string_view tag = reader == nullptr ? std::string_view() : reader->state().source->dictionary().tagOf(elm);
+  return tag.empty() ? nullptr : tag.data();
+}
+
+uint32_t tav_reader_id(const tav_reader* reader, const char* name, uint16_t* elm)
+{
+  return reader == nullptr ? uint32_t{TAV_RC_BAD_PARAM} : idNamed(name, elm, reader->state().source->dictionary());
 }
 
 const char* tav_message(uint32_t rc)

@@ -276,11 +276,11 @@ std::string DiffIndex::path(uint64_t number)
     steps.front().ordinal = 0; // makes it be named by its offset
     text = "/**";
   }
-  std::for_each(steps.rbegin(), steps.rend(), [&text](const auto& step) {
+  std::for_each(steps.rbegin(), steps.rend(), [this, &text](const auto& step) {
     Node node = nodeOf(step);
     node.ordinal = step.ordinal;
     node.header.nodeOffset = step.offset;
-    appendStep(text, node);
+    appendStep(text, node, source_.dictionary());
   });
   return text.empty() ? "/" : text; // damaged bytes have the path of the group around them
 }

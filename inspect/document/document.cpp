@@ -142,6 +142,7 @@ void Document::open(std::unique_ptr<ByteSource> source, const DocumentOptions& o
   DocumentState& state = *state_;
   state.source = std::move(source);
   state.options = options;
+  state.source->setDictionary(options.dictionary.over(state.source->dictionary()));
   state.recognition = recognise(*state.source, options.form);
   const FormChoice& given = options.form;
   const bool isGiven = given.swapped || given.root64 || given.aligned;

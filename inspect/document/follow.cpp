@@ -79,7 +79,8 @@ FollowEnd Document::follow(const std::function<void(const tav::Node&)>& onNode, 
 std::string pathText(const Arrival& arrival, PathStyle style)
 {
   return textOfSteps(arrival.above.size() + 1, style, [&arrival](std::string& text, uint64_t i) {
-    appendStep(text, i < arrival.above.size() ? arrival.above[static_cast<size_t>(i)] : arrival.node);
+    appendStep(text, i < arrival.above.size() ? arrival.above[static_cast<size_t>(i)] : arrival.node,
+               arrival.source.dictionary());
   });
 }
 

@@ -50,6 +50,7 @@ bool Follower::open()
   try
   {
     file = ByteSource::open(path_, options_.ringBytes);
+    file->setDictionary(options_.dictionary);
   }
   catch (const Error& error)
   {
@@ -478,7 +479,8 @@ void Follower::handRead(const TAVHeader& node)
     const uint32_t code = codeOf(ec);
     throw Error(Problem{.file = path_,
                         .offset = node.nodeOffset,
-                        .sentence = elementText(layout::elmOf(node)) + ": " + std::string(codeSentence(code)),
+                        .sentence = elementText(layout::elmOf(node), options_.dictionary) + ": " +
+                                    std::string(codeSentence(code)),
                         .code = code});
   }
   onNode_(read);

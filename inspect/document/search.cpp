@@ -25,12 +25,12 @@ Form formOf(const SearchStart& start)
 } // namespace
 
 Search::Search(DocumentState& state, std::string_view path, OnDamage onDamage)
-    : Search(state, {}, false, PathMatcher(pathOf(path)), onDamage)
+    : Search(state, {}, false, PathMatcher(pathOf(path, state.source->dictionary())), onDamage)
 {
 }
 
 Search::Search(DocumentState& state, const SearchStart& start, std::string_view path, OnDamage onDamage)
-    : Search(state, start, pathOf(path), onDamage)
+    : Search(state, start, pathOf(path, state.source->dictionary()), onDamage)
 {
 }
 

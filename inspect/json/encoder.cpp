@@ -47,7 +47,7 @@ TAVHeader StreamEncoder::header(const Properties& properties, bool wide, uint16_
 {
   if (!properties.elm)
   {
-    throw BuildError("the node has no element");
+    throw BuildError(properties.unknown.empty() ? "the node has no element" : properties.unknown);
   }
   TAVHeader header{};
   if (!remake_ && properties.size)

@@ -26,6 +26,7 @@ struct BuildError : std::runtime_error
 struct Properties
 {
   std::optional<uint16_t> elm{};
+  std::string unknown{}; ///< what to say of its name, when no element has that and no id is given
   std::optional<uint16_t> type{};
   std::optional<bool> wide{};
   std::optional<uint32_t> info{};

@@ -30,7 +30,7 @@ bool toJson(ByteSource& source, const Form& form, Sink& out, const ToJsonOptions
 LeftOut fromJson(TextSource& document, PatchFile& out, const Conversion& conversion)
 {
   StreamEncoder encoder(out, conversion);
-  DocumentReader(document, encoder).read();
+  DocumentReader(document, encoder, conversion.dictionary).read();
   return {encoder.leftOut(), encoder.leftOutBytes()};
 }
 

@@ -10,14 +10,10 @@
 namespace tav::inspect
 {
 
-uint16_t elementNamed(std::string_view name)
+std::optional<uint16_t> elementNamed(std::string_view name, const Dictionary& dictionary)
 {
-  const std::vector<uint16_t> ids = idsOf(name);
-  if (ids.size() == 1)
-  {
-    return ids.front();
-  }
-  if (!ids.empty())
+  const std::vector<uint16_t> ids = idsOf(name, dictionary);
+  if (ids.size() > 1)
   {
     std::string list;
     for (const uint16_t id : ids)
@@ -26,9 +22,14 @@ uint16_t elementNamed(std::string_view name)
     }
     throw BuildError("several elements have the name " + inspect::quoted(name) + ": " + list);
   }
-  const std::string similar = similarNames(name);
-  throw BuildError("no element has the name " + inspect::quoted(name) +
-                   (similar.empty() ? "" : "; did you mean " + similar + "?"));
+  return ids.empty() ? std::nullopt : std::optional(ids.front());
+}
+
+BuildError unknownElement(std::string_view name, const Dictionary& dictionary)
+{
+  const std::string similar = similarNames(name, dictionary);
+  return BuildError("no element has the name " + inspect::quoted(name) +
+                    (similar.empty() ? "" : "; did you mean " + similar + "?"));
 }
 
 void DocumentReader::fail(const std::string& sentence) const
@@ -181,10 +182,10 @@ void DocumentReader::key(std::string name)
       {
         beginGroup(top());
       }
-      startChild(elementNamed(name));
+      startChild(name);
     }
     break;
-  case Where::shortList: startChild(elementNamed(name)); break;
+  case Where::shortList: startChild(name); break;
   default: break;
   }
 }
@@ -201,7 +202,7 @@ void DocumentReader::documentKey(const std::string& name)
     // Without an envelope, every key is an element.
     beginNodes();
     top().where = Where::shortList;
-    startChild(elementNamed(name));
+    startChild(name);
   }
 }
 
@@ -209,6 +210,16 @@ void DocumentReader::startChild(uint16_t elm)
 {
   draft_ = Draft();
   draft_.properties.elm = elm;
+}
+
+void DocumentReader::startChild(const std::string& name)
+{
+  const auto elm = elementNamed(name, dictionary_);
+  if (!elm)
+  {
+    throw unknownElement(name, dictionary_);
+  }
+  startChild(*elm);
 }
 
 void DocumentReader::endObject()

@@ -10,13 +10,17 @@
 
 #include "inspect/json/encoder.h"
 #include "inspect/json/parser.h"
+#include "tav/inspect/dictionary.hpp"
 #include "tav/inspect/textSource.hpp"
 
 namespace tav::inspect
 {
 
-/// The one element of a name. Throws BuildError when there is none, or more than one.
-uint16_t elementNamed(std::string_view name);
+/// The one element of a name; nothing when there is none. Throws BuildError when there are more.
+std::optional<uint16_t> elementNamed(std::string_view name, const Dictionary& dictionary);
+
+/// What is said of a name that no element has.
+BuildError unknownElement(std::string_view name, const Dictionary& dictionary);
 
 /// A single value of the document.
 struct Scalar
@@ -36,8 +40,9 @@ struct Scalar
 class DocumentReader final : private JsonHandler
 {
 public:
-  DocumentReader(TextSource& text, StreamEncoder& encoder)
-      : source_(text), encoder_(encoder) {}
+  /// `dictionary` outlives this object.
+  DocumentReader(TextSource& text, StreamEncoder& encoder, const Dictionary& dictionary)
+      : source_(text), encoder_(encoder), dictionary_(dictionary) {}
 
   /// Reads everything. Throws Error, with the place, when the text is no JSON or describes no stream.
   void read();
@@ -87,6 +92,8 @@ private:
   void startForm();
   void beginNodes();
   void startChild(uint16_t elm);
+  void startChild(const std::string& name);
+  void elementProperty(Properties& properties, const std::string& name, const Scalar& value);
   void shortValue(const Scalar& value);
   void property(const std::string& name, const Scalar& value);
   bool headerProperty(Properties& properties, const std::string& name, const Scalar& value);
@@ -109,6 +116,7 @@ private:
 
   TextSource& source_;
   StreamEncoder& encoder_;
+  const Dictionary& dictionary_;
   std::vector<Level> levels_{};
   Draft draft_{};
   Form form_{};

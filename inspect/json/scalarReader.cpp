@@ -197,17 +197,32 @@ void DocumentReader::property(const std::string& name, const Scalar& value)
   valueProperty(name, value);
 }
 
+/// A name that no dictionary has is taken for that of an own element: its id says which.
+void DocumentReader::elementProperty(Properties& properties, const std::string& name, const Scalar& value)
+{
+  const bool isName = name == "element";
+  const auto elm = isName ? elementNamed(textOf(name, value), dictionary_) : wholeNumber<uint16_t>(name, value);
+  if (!elm)
+  {
+    properties.unknown = unknownElement(value.text, dictionary_).what();
+  }
+  else if (properties.elm.value_or(*elm) != *elm)
+  {
+    throw BuildError("element and id do not agree: #" + std::to_string(*properties.elm) + " and #" +
+                     std::to_string(*elm));
+  }
+  properties.elm = elm ? elm : properties.elm;
+  if (!properties.unknown.empty() && properties.elm && !dictionary::tagOf(*properties.elm).empty())
+  {
+    throw BuildError(properties.unknown);
+  }
+}
+
 bool DocumentReader::headerProperty(Properties& properties, const std::string& name, const Scalar& value)
 {
   if (name == "element" || name == "id")
   {
-    const uint16_t elm = name == "id" ? wholeNumber<uint16_t>(name, value) : elementNamed(textOf(name, value));
-    if (properties.elm.value_or(elm) != elm)
-    {
-      throw BuildError("element and id do not agree: #" + std::to_string(*properties.elm) + " and #" +
-                       std::to_string(elm));
-    }
-    properties.elm = elm;
+    elementProperty(properties, name, value);
   }
   else if (name == "header")
   {

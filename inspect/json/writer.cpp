@@ -121,7 +121,7 @@ void JsonWriter::putPlace(const std::string& path, uint64_t offset, uint64_t dep
 void JsonWriter::putHead(const std::string& path, const Node& node)
 {
   putPlace(path, node.offset(), groups_.size());
-  putString("element", elementText(node.elm()));
+  putString("element", elementText(node.elm(), source_.dictionary()));
   putNumber("id", node.elm());
   putNumber("header", node.is64() ? 64 : 32);
   if (const auto name = jsonTypeName(node.type()))
@@ -155,7 +155,7 @@ std::string JsonWriter::pathOf(const Walker& walker, const Event& event) const
   {
     return {};
   }
-  return event.depth <= kMaxSteps ? walker.path(event) : offsetPath(event.node);
+  return event.depth <= kMaxSteps ? walker.path(event) : offsetPath(event.node, source_.dictionary());
 }
 
 void JsonWriter::add(const Walker& walker, const Event& event)

@@ -90,14 +90,24 @@ bool parseNumber(std::string_view text, Number& value, int base)
 
 std::string elementText(uint16_t elm)
 {
+  return elementText(elm, {});
+}
+
+std::string elementText(uint16_t elm, const Dictionary& dictionary)
+{
   std::string text;
-  appendElementText(text, elm);
+  appendElementText(text, elm, dictionary);
   return text;
 }
 
-void appendElementText(std::string& out, uint16_t elm)
+void appendElementText(std::string& out, uint16_t elm, const Dictionary& dictionary)
 {
   static const ClearTags clear;
+  if (const OwnElement* const own = dictionary.find(elm))
+  {
+    out += own->tag;
+    return;
+  }
   if (const std::string_view tag = clear.tagOf(elm); !tag.empty())
   {
     out += tag;
@@ -109,8 +119,13 @@ void appendElementText(std::string& out, uint16_t elm)
 
 void appendStep(std::string& path, const Node& node)
 {
+  appendStep(path, node, {});
+}
+
+void appendStep(std::string& path, const Node& node, const Dictionary& dictionary)
+{
   path += '/';
-  appendElementText(path, node.elm());
+  appendElementText(path, node.elm(), dictionary);
   if (node.ordinal == 0)
   {
     path += "[@";
@@ -127,17 +142,27 @@ void appendStep(std::string& path, const Node& node)
 
 std::string offsetPath(const Node& node)
 {
+  return offsetPath(node, {});
+}
+
+std::string offsetPath(const Node& node, const Dictionary& dictionary)
+{
   std::string path = "/**";
   if (node.header.hdrType != 0)
   {
     Node unnumbered = node;
     unnumbered.ordinal = 0;
-    appendStep(path, unnumbered);
+    appendStep(path, unnumbered, dictionary);
   }
   return path;
 }
 
 std::vector<uint16_t> idsOf(std::string_view name)
+{
+  return idsOf(name, {});
+}
+
+std::vector<uint16_t> idsOf(std::string_view name, const Dictionary& dictionary)
 {
   const std::string_view digits = name.starts_with('#') ? name.substr(1) : name;
   uint16_t id = 0;
@@ -145,24 +170,40 @@ std::vector<uint16_t> idsOf(std::string_view name)
   {
     return {id};
   }
+  if (const OwnElement* const own = dictionary.find(name))
+  {
+    return {own->id};
+  }
   const auto found = names().find(name);
   return found == names().end() ? std::vector<uint16_t>() : found->second;
 }
 
 std::string similarNames(std::string_view name)
 {
+  return similarNames(name, {});
+}
+
+std::string similarNames(std::string_view name, const Dictionary& dictionary)
+{
   if (name.size() > 64)
   {
     return {};
   }
   std::vector<std::pair<size_t, std::string_view>> close;
-  for (const dictionary::Entry& entry : dictionary::entries())
-  {
-    const size_t distance = editDistance(name, entry.tag);
+  const auto consider = [&](std::string_view tag) {
+    const size_t distance = editDistance(name, tag);
     if (distance <= mostSlips(name))
     {
-      close.emplace_back(distance, entry.tag);
+      close.emplace_back(distance, tag);
     }
+  };
+  for (const dictionary::Entry& entry : dictionary::entries())
+  {
+    consider(entry.tag);
+  }
+  for (const OwnElement& element : dictionary.elements())
+  {
+    consider(element.tag);
   }
   std::sort(close.begin(), close.end());
   close.erase(std::unique(close.begin(), close.end()), close.end());
@@ -176,8 +217,13 @@ std::string similarNames(std::string_view name)
 
 Path pathOf(std::string_view text)
 {
+  return pathOf(text, {});
+}
+
+Path pathOf(std::string_view text, const Dictionary& dictionary)
+{
   PathFault fault;
-  Path path(text, fault);
+  Path path(text, dictionary.names(), fault);
   if (fault.kind != PathFault::Kind::none)
   {
     throw pathError(text, fault);

@@ -63,6 +63,7 @@ Schema::~Schema() = default;
 void Schema::add(ByteSource& source, const Form& form, const std::function<void(const Walker&, const Event&)>& seen)
 {
   open_.clear();
+  dictionary_ = dictionary_.over(source.dictionary());
   Walker walker(source, form);
   Event event;
   while (walker.next(event))
@@ -218,14 +219,14 @@ SchemaEntry Schema::entryOf(const PathNode& path)
   return entry;
 }
 
-std::string Schema::pathText(const std::vector<uint16_t>& steps, PathStyle style, uint64_t mostSteps)
+std::string Schema::pathText(const std::vector<uint16_t>& steps, PathStyle style, uint64_t mostSteps) const
 {
   if (style == PathStyle::whole && steps.size() > mostSteps)
   {
-    return "/**/" + elementText(steps.back());
+    return "/**/" + elementText(steps.back(), dictionary_);
   }
-  return textOfSteps(steps.size(), style, [&steps](std::string& text, uint64_t i) {
-    text += "/" + elementText(steps[static_cast<size_t>(i)]);
+  return textOfSteps(steps.size(), style, [this, &steps](std::string& text, uint64_t i) {
+    text += "/" + elementText(steps[static_cast<size_t>(i)], dictionary_);
   });
 }
 

@@ -87,7 +87,12 @@ std::string eyeSizeOf(const Node& node)
 
 std::string xmlNameOf(uint16_t elm)
 {
-  const std::string text = elementText(elm);
+  return xmlNameOf(elm, {});
+}
+
+std::string xmlNameOf(uint16_t elm, const Dictionary& dictionary)
+{
+  const std::string text = elementText(elm, dictionary);
   const bool letter = (text[0] >= 'a' && text[0] <= 'z') || (text[0] >= 'A' && text[0] <= 'Z') || text[0] == '_';
   return letter ? text : "element";
 }
@@ -138,7 +143,7 @@ XmlValue xmlValueOf(ByteSource& source, const Node& node)
 
 std::optional<std::string> attributeText(ByteSource& source, const Form& form, const Node& node, Attribute attribute)
 {
-  const bool named = xmlNameOf(node.elm()) != "element";
+  const bool named = xmlNameOf(node.elm(), source.dictionary()) != "element";
   const std::string_view name = dictionary::nameOf(node.elm());
   const uint32_t usual = form.aligned ? TAV_INFO_ALIGNED8 : 0;
   const bool strange = node.is64() && (node.info() & ~uint32_t{TAV_INFO_EYE_SIZE}) != usual;

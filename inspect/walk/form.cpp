@@ -230,7 +230,7 @@ Recognition recognise(ByteSource& source, const FormChoice& choice)
       result.possible.push_back(formOf(other));
     }
   }
-  result.because = explainForm(trials, result);
+  result.because = explainForm(trials, result, source.dictionary());
   return result;
 }
 

@@ -42,7 +42,8 @@ void explainPadding(const std::vector<Trial>& trials, std::vector<Reason>& becau
 
 } // namespace
 
-std::vector<Reason> explainForm(const std::vector<Trial>& trials, const Recognition& result)
+std::vector<Reason> explainForm(const std::vector<Trial>& trials, const Recognition& result,
+                                const Dictionary& dictionary)
 {
   const Trial& best = trials.front();
   std::vector<Reason> because;
@@ -53,7 +54,7 @@ std::vector<Reason> explainForm(const std::vector<Trial>& trials, const Recognit
   else
   {
     because.push_back({"the first header, read as " + std::string(best.form.root64 ? "64" : "32") + "-bit " +
-                       orderText(best.form) + ", is that of a group, " + elementText(best.first.elm())});
+                       orderText(best.form) + ", is that of a group, " + elementText(best.first.elm(), dictionary)});
   }
   because.push_back({std::to_string(best.named) + " of the first " + counted(best.nodes, "node") +
                      " have an element of the dictionary and a size that suits the type"});

@@ -10,6 +10,7 @@ namespace tav::inspect
 {
 
 /// Why the first of the trials, which are sorted, is taken for the form of a file.
-std::vector<Reason> explainForm(const std::vector<Trial>& trials, const Recognition& result);
+std::vector<Reason> explainForm(const std::vector<Trial>& trials, const Recognition& result,
+                                const Dictionary& dictionary);
 
 } // namespace tav::inspect

@@ -113,11 +113,17 @@ std::unique_ptr<ByteSource> ByteSource::open(const std::string& path, uint64_t r
 std::unique_ptr<ByteSource> ByteSource::window(uint64_t from, uint64_t ringBytes)
 {
   from = std::min(from, size_);
+  std::unique_ptr<ByteSource> made;
   if (!memory_.empty())
   {
-    return std::make_unique<ByteSource>(name_, memory_.subspan(static_cast<size_t>(from)));
+    made = std::make_unique<ByteSource>(name_, memory_.subspan(static_cast<size_t>(from)));
   }
-  return std::make_unique<ByteSource>(name_, std::make_unique<StorageWindow>(*storage_, from_ + from), ringBytes);
+  else
+  {
+    made = std::make_unique<ByteSource>(name_, std::make_unique<StorageWindow>(*storage_, from_ + from), ringBytes);
+  }
+  made->dictionary_ = dictionary_;
+  return made;
 }
 
 ByteSource::Page& ByteSource::slotFor(uint64_t number)

@@ -491,7 +491,7 @@ void Walker::appendPath(std::string& out, const Event& event, PathStyle style) c
   const uint64_t groups = std::min<uint64_t>(event.depth, frames_.size() - 1);
   const uint64_t steps = groups + (event.node.header.hdrType != 0 ? 1 : 0);
   appendSteps(out, steps, style, [&](std::string& to, uint64_t i) {
-    appendStep(to, i < groups ? frames_[static_cast<size_t>(i) + 1].node : event.node);
+    appendStep(to, i < groups ? frames_[static_cast<size_t>(i) + 1].node : event.node, source_.dictionary());
   });
   out += steps == 0 ? "/" : "";
 }

@@ -74,7 +74,7 @@ public:
       if (event.node.isGroup())
       {
         indent(event.depth);
-        out_.write("</" + xmlNameOf(event.node.elm()) + ">\n");
+        out_.write("</" + xmlNameOf(event.node.elm(), source_.dictionary()) + ">\n");
       }
       return;
     case What::damaged:
@@ -133,7 +133,7 @@ void XmlWriter::attributes(const Node& node, std::initializer_list<Attribute> wh
 
 void XmlWriter::beginTag(const Node& node)
 {
-  out_.write("<" + xmlNameOf(node.elm()));
+  out_.write("<" + xmlNameOf(node.elm(), source_.dictionary()));
   attributes(node, {Attribute::id, Attribute::name, Attribute::type, Attribute::header, Attribute::info,
                     Attribute::eyeSize, Attribute::size, Attribute::extra});
 }
@@ -160,7 +160,7 @@ void XmlWriter::putData(const Node& node)
     out_.write(">");
     putHex(start, node.size());
   }
-  out_.write("</" + xmlNameOf(node.elm()) + ">\n");
+  out_.write("</" + xmlNameOf(node.elm(), source_.dictionary()) + ">\n");
 }
 
 void XmlWriter::putArray(const Node& node)

@@ -3,6 +3,7 @@
 
 #include "tav/inspect.hpp"
 #include "tools/host/host.h"
+#include "tools/shell/dictionary.h"
 #include "tools/shell/input.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
@@ -19,7 +20,9 @@ namespace
 Conversion conversionOf(const Invocation& invocation)
 {
   const FormChoice choice = formChoice(invocation);
-  return {choice.swapped, choice.root64, choice.aligned, invocation.has("--eye-size")};
+  const std::string input = invocation.arguments().empty() ? "-" : invocation.arguments().front();
+  return {choice.swapped, choice.root64, choice.aligned, invocation.has("--eye-size"),
+          dictionaryFor(invocation, input)};
 }
 
 int run(const Invocation& invocation)
@@ -65,7 +68,7 @@ const Registration registration{{
                  .value = "FILE",
                  .help = "where to; standard output unless given"},
                 {.names = "--eye-size", .help = "end every node with an eye/size pair"}},
-    .concerns = kForm,
+    .concerns = kForm | kNames,
     .examples = {{"tav json x.tav | tav build -o y.tav", "the same bytes again"},
                  {"tav json x.tav | tav build --byte-order big --align -o y.tav", "convert a stream"},
                  {"echo '{\"system\": {\"host\": {\"hostName\": \"ada\"}}}' | tav build -o x.tav", "a stream by hand"}},

@@ -76,7 +76,7 @@ const Registration registration{{
                  .choices = {"32", "64"}},
                 {.names = "--align", .help = "pad the payloads of OUT to multiples of 8"},
                 {.names = "--no-align", .help = "do not pad the payloads of OUT"}},
-    .concerns = kInput | kCalls,
+    .concerns = kInput | kCalls | kNames,
     .examples = {{"tav cat monday.tav tuesday.tav -o both.tav", "one file of two"},
                  {"tav cat x.tav --byte-order big --align -o y.tav", "the same stream in another form"}},
     .run = run,

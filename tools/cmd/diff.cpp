@@ -3,6 +3,7 @@
 #include <optional>
 
 #include "tav/inspect.hpp"
+#include "tools/shell/dictionary.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/progress.h"
@@ -81,7 +82,7 @@ std::string jsonOf(const Difference& difference)
   return text + "}\n";
 }
 
-std::vector<Path> ignoredPaths(const Invocation& invocation)
+std::vector<Path> ignoredPaths(const Invocation& invocation, const Dictionary& dictionary)
 {
   std::vector<Path> ignored;
   for (const std::string& path : invocation.all("--ignore"))
@@ -90,17 +91,17 @@ std::vector<Path> ignoredPaths(const Invocation& invocation)
     {
       throw Failure("diff: --ignore / leaves nothing to compare");
     }
-    ignored.push_back(pathOf(path));
+    ignored.push_back(pathOf(path, dictionary));
   }
   return ignored;
 }
 
-std::vector<uint16_t> keysOf(const Invocation& invocation)
+std::vector<uint16_t> keysOf(const Invocation& invocation, const Dictionary& dictionary)
 {
   std::vector<uint16_t> keys;
   for (const std::string& name : invocation.all("--key"))
   {
-    const std::vector<uint16_t> ids = requireIds("--key", name);
+    const std::vector<uint16_t> ids = requireIds("--key", name, dictionary);
     keys.insert(keys.end(), ids.begin(), ids.end());
   }
   return keys;
@@ -109,13 +110,13 @@ std::vector<uint16_t> keysOf(const Invocation& invocation)
 /// The subtrees to compare: a path that is given for one side alone is that of the other, too.
 struct Subtrees
 {
-  explicit Subtrees(const Invocation& invocation)
+  Subtrees(const Invocation& invocation, const Dictionary& dictionaryA, const Dictionary& dictionaryB)
   {
     const std::string pathA = invocation.text("--path-a", invocation.text("--path-b"));
     if (!pathA.empty())
     {
-      a.emplace(pathOf(pathA));
-      b.emplace(pathOf(invocation.text("--path-b", pathA)));
+      a.emplace(pathOf(pathA, dictionaryA));
+      b.emplace(pathOf(invocation.text("--path-b", pathA), dictionaryB));
     }
   }
 
@@ -125,9 +126,11 @@ struct Subtrees
 
 int run(const Invocation& invocation)
 {
-  const Subtrees subtrees(invocation);
   const std::string& nameA = invocation.arguments().front();
   const std::string& nameB = invocation.arguments().back();
+  const Dictionary dictionaryB = dictionaryFor(invocation, nameB);
+  const Dictionary dictionary = dictionaryFor(invocation, nameA).over(dictionaryB);
+  const Subtrees subtrees(invocation, dictionary, dictionaryB.over(dictionary));
   if (invocation.arguments().size() == 1 && !subtrees.a && !(invocation.has("--from-a") || invocation.has("--from-b")))
   {
     throw Failure("diff: an argument is missing: tav diff A B",
@@ -139,8 +142,8 @@ int run(const Invocation& invocation)
   }
   const bool json = invocation.has("--json");
   DiffOptions options;
-  options.ignored = ignoredPaths(invocation);
-  options.keys = keysOf(invocation);
+  options.ignored = ignoredPaths(invocation, dictionary);
+  options.keys = keysOf(invocation, dictionary);
   options.contents = invocation.has("--contents");
   options.tolerance = parseTolerance(invocation.text("--tolerance", "0"));
   options.mostValue = json ? options.mostValue : 0;

@@ -1,5 +1,6 @@
 // tav extract: subtrees as a stream of their own.
 #include "tav/inspect.hpp"
+#include "tools/shell/dictionary.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/progress.h"
@@ -16,7 +17,7 @@ namespace
 int run(const Invocation& invocation)
 {
   const std::string output = requireStreamOutput(invocation);
-  const Path path = pathOf(invocation.arguments().at(1));
+  const Path path = pathOf(invocation.arguments().at(1), dictionaryFor(invocation, invocation.arguments().at(0)));
   Stream stream = openStream(invocation);
   DamageNotices notices(stream);
   try

@@ -4,6 +4,7 @@
 #include <utility>
 
 #include "tools/host/host.h"
+#include "tools/shell/dictionary.h"
 
 namespace tav::tool
 {
@@ -61,7 +62,10 @@ public:
     };
     mine.change = [this](FileChange change) { tell(change); };
     mine.caughtUp = [this] { look(); };
-    inspect::follow(path_, mine, {.form = formChoice(invocation), .ringBytes = ringBytes(invocation)},
+    inspect::follow(path_, mine,
+                    {.form = formChoice(invocation),
+                     .ringBytes = ringBytes(invocation),
+                     .dictionary = dictionaryFor(invocation, path_)},
                     {.stop = stop_.get_token()});
     return status_;
   }

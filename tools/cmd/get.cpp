@@ -12,6 +12,7 @@
 #include "tav/inspect/walker.hpp"
 #include "tools/cmd/following.h"
 #include "tools/host/host.h"
+#include "tools/shell/dictionary.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/progress.h"
@@ -30,11 +31,11 @@ constexpr uint64_t kMostSteps = 4000;                 ///< deeper nodes are name
 /// A path with what was found so far.
 struct Wanted
 {
-  explicit Wanted(const std::string& text)
+  Wanted(const std::string& text, const Dictionary& dictionary)
       : problem{.path = text, .sentence = "no match"}
   {
     PathFault fault;
-    const Path path(text, fault);
+    const Path path(text, dictionary.names(), fault);
     switch (fault.kind)
     {
     case PathFault::Kind::none:
@@ -79,9 +80,10 @@ public:
     {
       throw Failure("get: --raw and --json exclude each other");
     }
+    const Dictionary names = dictionaryFor(invocation, invocation.arguments().at(0));
     for (size_t i = 1; i < invocation.arguments().size(); ++i)
     {
-      wanted_.push_back(std::make_unique<Wanted>(invocation.arguments()[i]));
+      wanted_.push_back(std::make_unique<Wanted>(invocation.arguments()[i], names));
     }
   }
 
@@ -181,7 +183,7 @@ private:
       }
       if (first.empty())
       {
-        appendStep(first, event.node);
+        appendStep(first, event.node, walker.source().dictionary());
       }
       FoundNode found = foundIn(walker, event);
       // The walk begins with this root, which is not the first of its name.
@@ -273,7 +275,7 @@ private:
   {
     const Node& node = found.node;
     nlohmann::ordered_json object;
-    object["path"] = node.depth <= kMostSteps ? found.path(PathStyle::whole) : offsetPath(node);
+    object["path"] = node.depth <= kMostSteps ? found.path(PathStyle::whole) : offsetPath(node, found.source.dictionary());
     object["offset"] = node.offset();
     object["size"] = node.size();
     object["type"] = typeText(node.type());

@@ -253,7 +253,7 @@ int run(const Invocation& invocation)
   }
   else if (invocation.has("--path"))
   {
-    const Path path = pathOf(invocation.text("--path"));
+    const Path path = pathOf(invocation.text("--path"), stream.bytes().dictionary());
     PathMatcher matcher(path);
     if (!goToMatch(walker, matcher, event, seen))
     {

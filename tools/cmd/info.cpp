@@ -1,6 +1,7 @@
 // tav info: what a file is, and why it is taken for that.
 #include <algorithm>
 #include <cstdio>
+#include <functional>
 #include <map>
 #include <optional>
 
@@ -142,8 +143,8 @@ public:
     out_.write(name + text + "\n");
   }
 
-  void tallies(const std::string& title, const std::map<uint16_t, Tally>& tallies, std::string (*nameOf)(uint16_t),
-               size_t most)
+  void tallies(const std::string& title, const std::map<uint16_t, Tally>& tallies,
+               const std::function<std::string(uint16_t)>& nameOf, size_t most)
   {
     std::vector<std::pair<uint16_t, Tally>> sorted(tallies.begin(), tallies.end());
     std::stable_sort(sorted.begin(), sorted.end(),
@@ -297,8 +298,10 @@ Json infoJson(const Stream& stream, const Counts* counts)
     object["elements"] = Json::array();
     for (const auto& [elm, tally] : counts->elements)
     {
-      object["elements"].push_back(
-          {{"element", elementText(elm)}, {"id", elm}, {"nodes", tally.nodes}, {"bytes", tally.bytes}});
+      object["elements"].push_back({{"element", elementText(elm, stream.source->dictionary())},
+                                    {"id", elm},
+                                    {"nodes", tally.nodes},
+                                    {"bytes", tally.bytes}});
     }
   }
   object["because"] =
@@ -322,7 +325,8 @@ void printText(const Stream& stream, const Counts* counts, bool full, Output& ou
   printForm(print, stream);
   printCounts(print, *counts, stream.source->size());
   print.tallies("type", counts->types, typeName, full ? ~size_t{0} : 20);
-  print.tallies("element", counts->elements, elementText, full ? ~size_t{0} : 12);
+  const auto elementName = [&](uint16_t elm) { return elementText(elm, stream.source->dictionary()); };
+  print.tallies("element", counts->elements, elementName, full ? ~size_t{0} : 12);
   out.write("\n");
   for (const std::string& reason : reasonTexts(*stream.source, found))
   {

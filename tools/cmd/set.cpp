@@ -3,6 +3,7 @@
 
 #include "tav/inspect.hpp"
 #include "tools/host/host.h"
+#include "tools/shell/dictionary.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/progress.h"
@@ -24,10 +25,11 @@ std::vector<Assignment> assignmentsOf(const Invocation& invocation)
   {
     throw Failure("set: the path '" + words.back() + "' has no value behind it", "paths and values come in pairs");
   }
+  const Dictionary dictionary = dictionaryFor(invocation, words.at(0));
   std::vector<Assignment> assignments;
   for (size_t i = 1; i < words.size(); i += 2)
   {
-    assignments.push_back({pathOf(words[i]), words[i + 1]});
+    assignments.push_back({pathOf(words[i], dictionary), words[i + 1]});
   }
   return assignments;
 }

@@ -11,6 +11,7 @@
 #include "tav/inspect/walker.hpp"
 #include "tools/cmd/following.h"
 #include "tools/host/host.h"
+#include "tools/shell/dictionary.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/progress.h"
@@ -60,9 +61,10 @@ public:
       width_ = static_cast<size_t>(std::min<uint64_t>(*width, 100000));
       strict_ = true;
     }
+    const Dictionary names = dictionaryFor(invocation, invocation.arguments().at(0));
     for (const std::string& name : invocation.all("--only"))
     {
-      const std::vector<uint16_t> ids = requireIds("--only", name);
+      const std::vector<uint16_t> ids = requireIds("--only", name, names);
       only_.insert(only_.end(), ids.begin(), ids.end());
     }
     setFolding(invocation);
@@ -256,7 +258,7 @@ void TreePrinter::nodeLine(const FoundNode& found, uint64_t level)
   {
     indent(level);
     const size_t slash = text_.size();
-    appendStep(text_, node);
+    appendStep(text_, node, found.source.dictionary());
     text_.erase(slash, 1);
   }
   type(typeText(node.type()));

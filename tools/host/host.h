@@ -3,6 +3,7 @@
 /// files. Texts and paths are UTF-8.
 #pragma once
 
+#include <algorithm>
 #include <cstdint>
 #include <cstdio>
 #include <filesystem>
@@ -26,6 +27,25 @@ inline std::string textOf(const std::filesystem::path& path)
 {
   const std::u8string utf8 = path.u8string();
   return {utf8.begin(), utf8.end()};
+}
+
+/// The paths that a variable of the environment lists, as PATH does; none when it is not set.
+std::vector<std::string> pathList(const char* variable);
+
+/// The parts of a text between separators, without empty ones.
+inline std::vector<std::string> separated(const std::string& text, char separator)
+{
+  std::vector<std::string> parts;
+  for (size_t at = 0; at < text.size();)
+  {
+    const size_t end = std::min(text.find(separator, at), text.size());
+    if (end != at)
+    {
+      parts.push_back(text.substr(at, end - at));
+    }
+    at = end + 1;
+  }
+  return parts;
 }
 
 /// Whether a standard stream is a terminal.

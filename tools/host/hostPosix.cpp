@@ -1,5 +1,6 @@
 #include <algorithm>
 #include <csignal>
+#include <cstdlib>
 #include <sys/ioctl.h>
 #include <unistd.h>
 
@@ -39,6 +40,12 @@ extern "C" void endBySignal(int number)
 std::vector<std::string> commandLine(int argc, char** argv)
 {
   return {argv + std::min(argc, 1), argv + argc};
+}
+
+std::vector<std::string> pathList(const char* variable)
+{
+  const char* const value = std::getenv(variable);
+  return separated(value == nullptr ? "" : value, ':');
 }
 
 bool isTerminal(FILE* stream)

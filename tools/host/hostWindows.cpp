@@ -1,5 +1,6 @@
 #include <algorithm>
 #include <csignal>
+#include <cstdlib>
 #include <fcntl.h>
 #include <io.h>
 #include <process.h>
@@ -55,6 +56,13 @@ std::vector<std::string> commandLine(int argc, char** argv)
   for (int i = 1; i < count; ++i) texts.push_back(narrow(words[i]));
   LocalFree(static_cast<HLOCAL>(words));
   return texts;
+}
+
+std::vector<std::string> pathList(const char* variable)
+{
+  std::wstring name;
+  const wchar_t* const value = widen(variable, name) == ERROR_SUCCESS ? _wgetenv(name.c_str()) : nullptr;
+  return separated(value == nullptr ? std::string() : narrow(value), ';');
 }
 
 bool isTerminal(FILE* stream)

@@ -123,7 +123,7 @@ private:
     {
       fail(name + ": '" + value + "' is no number; 10, 0x1a40, 64K and 10M are");
     }
-    if (option.kind == ValueKind::file && value.empty())
+    if ((option.kind == ValueKind::file || option.kind == ValueKind::input) && value.empty())
     {
       fail(name + ": a file has a name");
     }

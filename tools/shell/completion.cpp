@@ -78,6 +78,11 @@ std::string bash()
          "    esac\n    return\n  fi\n  COMPREPLY=($(compgen -f -- \"$word\"))\n}\ncomplete -o filenames -F _tav tav\n";
 }
 
+bool isFile(const OptionSpec& option)
+{
+  return option.kind == ValueKind::file || option.kind == ValueKind::input;
+}
+
 std::string zshOption(const OptionSpec& option)
 {
   std::string text;
@@ -93,7 +98,7 @@ std::string zshOption(const OptionSpec& option)
     if (option.kind != ValueKind::flag)
     {
       spec += ":" + option.value + ":";
-      spec += option.kind == ValueKind::file     ? "_files"
+      spec += isFile(option)                     ? "_files"
               : option.kind == ValueKind::choice ? "(" + joined(option.choices, " ") + ")"
                                                  : "";
     }
@@ -131,7 +136,7 @@ std::string fishOption(const std::string& condition, const OptionSpec& option)
   }
   if (option.kind != ValueKind::flag)
   {
-    text += option.kind == ValueKind::file ? " -r -F" : " -x";
+    text += isFile(option) ? " -r -F" : " -x";
     text += option.kind == ValueKind::choice ? " -a " + inQuotes(joined(option.choices, " ")) : "";
   }
   return text + " -d " + inQuotes(option.help) + "\n";

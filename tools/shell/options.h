@@ -25,6 +25,7 @@ enum class ValueKind : uint8_t
   text,
   number, ///< 10, 0x1a40, 64K, 10M
   file,   ///< a file that is written
+  input,  ///< a file that is read
   choice  ///< one of `choices`
 };
 
@@ -35,8 +36,9 @@ enum Concern : unsigned
   kForm = 1,  ///< how a stream is laid out
   kInput = 2, ///< streams that are read
   kCalls = 4, ///< the library's calls
-  kAllConcerns = 7,
-  kFiles = 8 ///< files that are written; the command's options tell
+  kNames = 8, ///< names of elements
+  kAllConcerns = 15,
+  kFiles = 16 ///< files that are written; the command's options tell
 };
 
 struct OptionSpec

@@ -113,6 +113,14 @@ std::vector<std::string> inputsOf(const Invocation& invocation)
 {
   std::vector<std::string> inputs = invocation.arguments();
   inputs.resize(std::min(invocation.command().inputs, std::max<size_t>(inputs.size(), 1)), "-");
+  for (const auto* list : {&invocation.command().options, &globalOptions()})
+  {
+    for (const OptionSpec& option : *list)
+    {
+      const auto read = option.kind == ValueKind::input ? invocation.all(longName(option)) : std::vector<std::string>();
+      inputs.insert(inputs.end(), read.begin(), read.end());
+    }
+  }
   std::replace(inputs.begin(), inputs.end(), std::string("-"), std::string("/dev/stdin"));
   return inputs;
 }

@@ -3,6 +3,7 @@
 #include <utility>
 
 #include "tav/inspect.hpp"
+#include "tools/shell/dictionary.h"
 #include "tools/shell/hints.h"
 #include "tools/shell/input.h"
 #include "tools/shell/report.h"
@@ -33,12 +34,12 @@ FormChoice formChoice(const Invocation& invocation)
   return choice;
 }
 
-std::vector<uint16_t> requireIds(const std::string& option, const std::string& name)
+std::vector<uint16_t> requireIds(const std::string& option, const std::string& name, const Dictionary& dictionary)
 {
-  std::vector<uint16_t> ids = idsOf(name);
+  std::vector<uint16_t> ids = idsOf(name, dictionary);
   if (ids.empty())
   {
-    const std::string similar = similarNames(name);
+    const std::string similar = similarNames(name, dictionary);
     throw Failure(option + ": no element has the name '" + name + "'",
                   similar.empty() ? "'tav elements' lists the names" : "did you mean " + similar + "?");
   }
@@ -60,6 +61,7 @@ Stream openStream(const Invocation& invocation, const std::string& path, uint64_
 {
   const InputLimits limits{ringBytes(invocation), invocation.number("--spool-limit").value_or(kDefaultSpool)};
   Stream stream{openSource(path, limits, from), {}};
+  stream.source->setDictionary(dictionaryFor(invocation, path));
   stream.recognition = recognise(*stream.source, choice);
   const bool formGiven = choice.swapped || choice.root64 || choice.aligned;
   if (!formGiven)

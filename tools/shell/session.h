@@ -33,7 +33,8 @@ Problem noStream(const Stream& stream);
 FormChoice formChoice(const Invocation& invocation);
 
 /// The ids of an element that an option names. Throws Failure when no element has the name.
-std::vector<uint16_t> requireIds(const std::string& option, const std::string& name);
+std::vector<uint16_t> requireIds(const std::string& option, const std::string& name,
+                                 const Dictionary& dictionary);
 
 /// Bytes of memory for pages: --ring.
 uint64_t ringBytes(const Invocation& invocation);

@@ -7,6 +7,7 @@
 #include <string>
 
 #include "tav/inspect/api.hpp"
+#include "tav/inspect/dictionary.hpp"
 #include "tav/inspect/node.hpp"
 #include "tav/inspect/source.hpp"
 #include "tav/path/names.hpp"
@@ -16,6 +17,7 @@ namespace tav::inspect
 
 /// The name of a node's element in XML; "element" where the tag is not unique or no name in XML.
 TAV_INSPECT_API std::string xmlNameOf(uint16_t elm);
+TAV_INSPECT_API std::string xmlNameOf(uint16_t elm, const Dictionary& dictionary);
 
 /// Whether XML can hold the text of a part of the file: no control characters but tab and line ends, no U+FFFE and
 /// U+FFFF.

@@ -7,6 +7,7 @@
 #include <optional>
 
 #include "tav/inspect/api.hpp"
+#include "tav/inspect/dictionary.hpp"
 #include "tav/inspect/jsonWriter.hpp"
 #include "tav/inspect/patchFile.hpp"
 #include "tav/inspect/textSource.hpp"
@@ -31,6 +32,7 @@ struct Conversion
   std::optional<bool> root64{};
   std::optional<bool> aligned{};
   bool eyeSize = false;
+  Dictionary dictionary{}; ///< what the document may call own elements; their ids are understood without it
 
   bool isAsked() const { return swapped || root64 || aligned || eyeSize; }
 };

@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "tav/inspect/api.hpp"
+#include "tav/inspect/dictionary.hpp"
 #include "tav/inspect/problem.hpp"
 #include "tav/inspect/walker.hpp"
 #include "tav/path/path.hpp"
@@ -19,22 +20,27 @@ namespace tav::inspect
 
 /// The tag of an element when it stands for this id alone and can be written in a path, else "#id".
 TAV_INSPECT_API std::string elementText(uint16_t elm);
+TAV_INSPECT_API std::string elementText(uint16_t elm, const Dictionary& dictionary);
 
 /// Appends it.
-TAV_INSPECT_API void appendElementText(std::string& out, uint16_t elm);
+TAV_INSPECT_API void appendElementText(std::string& out, uint16_t elm, const Dictionary& dictionary);
 
 /// Appends "/tag", "/tag[3]" or "/tag[@0x1a40]": the step that leads to `node` from its parent. The first of its id
 /// gets no index, as the first match is what every command takes.
 TAV_INSPECT_API void appendStep(std::string& path, const Node& node);
+TAV_INSPECT_API void appendStep(std::string& path, const Node& node, const Dictionary& dictionary);
 
 /// "/**/tag[@0x1a40]": a path that leads to `node` alone and is short at any depth. Without a node: "/**".
 TAV_INSPECT_API std::string offsetPath(const Node& node);
+TAV_INSPECT_API std::string offsetPath(const Node& node, const Dictionary& dictionary);
 
 /// The ids that a name means: a tag, an enum name, a constant, "#12" or "12". Empty when there is none.
 TAV_INSPECT_API std::vector<uint16_t> idsOf(std::string_view name);
+TAV_INSPECT_API std::vector<uint16_t> idsOf(std::string_view name, const Dictionary& dictionary);
 
 /// Up to three elements whose names are close to a misspelt one, for a hint; empty when there is none.
 TAV_INSPECT_API std::string similarNames(std::string_view name);
+TAV_INSPECT_API std::string similarNames(std::string_view name, const Dictionary& dictionary);
 
 using tav::Path;
 using tav::PathFault;
@@ -42,6 +48,7 @@ using tav::PathFault;
 /// Reads a path. Throws Error with the column: Trouble::notFound for a name that no element has, with the nearest one;
 /// Trouble::refused for a text that is no path.
 TAV_INSPECT_API Path pathOf(std::string_view text);
+TAV_INSPECT_API Path pathOf(std::string_view text, const Dictionary& dictionary);
 
 /// What pathOf throws.
 TAV_INSPECT_API Error pathError(std::string_view text, const PathFault& fault);

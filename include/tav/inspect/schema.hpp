@@ -100,9 +100,10 @@ private:
   void addText(ByteSource& source, const Form& form, const Node& node, PathNode& path) const;
   static std::optional<Rank> rankOf(ByteSource& source, const Form& form, const Node& node);
   static SchemaEntry entryOf(const PathNode& path);
-  static std::string pathText(const std::vector<uint16_t>& steps, PathStyle style, uint64_t mostSteps);
+  std::string pathText(const std::vector<uint16_t>& steps, PathStyle style, uint64_t mostSteps) const;
 
   SchemaOptions options_;
+  Dictionary dictionary_{}; ///< of all sources; where they say different things, the first is right
   std::vector<PathNode> nodes_{};
   std::unordered_map<uint64_t, uint32_t> children_{}; ///< by parent and element
   std::vector<uint32_t> open_{};                      ///< the nodes on the way to the place, level by level

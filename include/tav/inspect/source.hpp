@@ -8,9 +8,11 @@
 #include <span>
 #include <string>
 #include <unordered_map>
+#include <utility>
 #include <vector>
 
 #include "tav/inspect/api.hpp"
+#include "tav/inspect/dictionary.hpp"
 #include "tav/tav.h"
 
 namespace tav::inspect
@@ -45,6 +47,10 @@ public:
 
   /// As it is called in messages.
   const std::string& name() const { return name_; }
+
+  /// What own elements in it are called, wherever nodes of it are named; those that are handed out by `window`, too.
+  const Dictionary& dictionary() const { return dictionary_; }
+  void setDictionary(Dictionary dictionary) { dictionary_ = std::move(dictionary); }
 
   /// Where in the storage it begins.
   uint64_t from() const { return from_; }
@@ -91,6 +97,7 @@ private:
   void fetch(uint64_t number, uint64_t count);
 
   std::string name_;
+  Dictionary dictionary_{};
   std::shared_ptr<void> keep_{};
   std::unique_ptr<TAVSideStorage> storage_{};
   std::unique_ptr<TAVSideStorage> window_{}; ///< on the storage, where it is not read from its first byte on

@@ -49,6 +49,9 @@ FUNCTIONS = {
     "tav_read": (c_uint32, READER, POINTER(Node), c_uint64, c_void_p, POINTER(c_size_t)),
     "tav_tag": (c_char_p, c_uint16),
     "tav_id": (c_uint32, c_char_p, POINTER(c_uint16)),
+    "tav_reader_dictionary": (c_uint32, READER, c_char_p),
+    "tav_reader_tag": (c_char_p, READER, c_uint16),
+    "tav_reader_id": (c_uint32, READER, c_char_p, POINTER(c_uint16)),
     "tav_message": (c_char_p, c_uint32),
     "tav_create_file": (c_uint32, c_char_p, POINTER(Form), c_uint32, POINTER(WRITER)),
     "tav_create_memory": (c_uint32, POINTER(Form), POINTER(WRITER)),
@@ -198,6 +201,41 @@ class CInterface(unittest.TestCase):
         self.assertEqual(steps, elements)
         self.assertEqual(len(steps), 8)
         self.assertEqual(tav.tav_next_root(reader, byref(root), byref(root)), NO_MORE_CHILDREN)
+
+    def test_names_of_own_elements(self):
+        tav, reader, node, elm, number = self.tav, READER(), Node(), c_uint16(), c_uint64()
+        stream = self.made()
+        kept = ctypes.create_string_buffer(stream, len(stream))
+        self.fine(tav.tav_open_memory(kept, len(stream), None, byref(reader)))
+        self.assertIsNone(tav.tav_reader_tag(reader, 40001))
+        self.assertEqual(tav.tav_reader_tag(reader, self.id_of(b"hostName")), b"hostName")
+        self.assertEqual(tav.tav_reader_id(reader, b"largest", byref(elm)), NOT_FOUND)
+        with tempfile.TemporaryDirectory() as folder:
+            path = []
+            for name, text in (("gr\u00fc\u00dfe.json", '{"40001": {"tag": "largest"}}'),
+                               ("b.json", '{"40002": {"tag": "less"}}'), ("bad.json", '{"40001": {"tag": "other"}}')):
+                path.append(os.fsencode(os.path.join(folder, name)))
+                pathlib.Path(folder, name).write_text(text, encoding="utf-8")
+            self.fine(tav.tav_reader_dictionary(reader, path[0]))
+            self.fine(tav.tav_reader_dictionary(reader, path[1]))
+            self.assertEqual(tav.tav_reader_dictionary(reader, path[2]), BAD_PARAM)
+            says = b"%s: line 1, column 2: the id 40001 is given otherwise at %s: line 1, column 2"
+            self.assertEqual(tav.tav_last_message(reader), says % (path[2], path[0]))
+            self.assertNotIn(tav.tav_reader_dictionary(reader, path[0] + b"x"), (OK, BAD_PARAM))
+        self.assertEqual([tav.tav_reader_tag(reader, id) for id in (40001, 40002, 40003)], [b"largest", b"less", None])
+        self.fine(tav.tav_reader_id(reader, b"largest", byref(elm)))
+        self.assertEqual(elm.value, 40001)
+        self.fine(tav.tav_find(reader, None, b"/system/largest[../less < 0]", byref(node)))
+        self.fine(tav.tav_get_u64(reader, byref(node), byref(number)))
+        self.assertEqual(number.value, 2**64 - 1)
+        self.assertEqual(tav.tav_find(reader, None, b"/system/largst", byref(node)), BAD_PARAM)
+        self.assertIn(b"did you mean largest?", tav.tav_last_message(reader))
+        self.assertEqual(tav.tav_reader_dictionary(None, b""), BAD_PARAM)
+        self.assertEqual(tav.tav_reader_dictionary(reader, None), BAD_PARAM)
+        self.assertEqual(tav.tav_reader_id(None, b"system", byref(elm)), BAD_PARAM)
+        self.assertEqual(tav.tav_reader_id(reader, b"system", None), BAD_PARAM)
+        self.assertIsNone(tav.tav_reader_tag(None, 40001))
+        tav.tav_close(reader)
 
     def test_tells_what_is_wrong(self):
         tav, reader, node = self.tav, READER(), Node()
