@@ -139,7 +139,8 @@ private:
     uint32_t rc = readHeader(bytes_, found_.form, wide, start, element, there);
     rc = rc == TAV_RC_OK ? bytes_.read(end - pair.size(), pair.data(), pair.size(), got) : rc;
     const layout::EyeSize eye = layout::decodeEyeSize(pair, found_.form.swapped);
-    const uint64_t payload = layout::sizeOf(group) - std::min<uint64_t>(layout::sizeOf(group), layout::endElementLength(wide));
+    const uint64_t size = layout::sizeOf(group);
+    const uint64_t payload = size - std::min(size, layout::endElementLength(wide));
     whole = there && got == pair.size() && layout::elmOf(element) == TAV_ELM_CMN_END_HDR_EYE_SIZE &&
             eye.eye == TAV_EYE_CATCHER && eye.distance == layout::groupDistance(payload, wide);
     return rc;

@@ -118,7 +118,7 @@ uint32_t FormSearch::follow(const StreamForm& form, const TAVHeader& root, bool&
 }
 
 uint32_t FormSearch::compare(const StreamForm& given, const std::vector<StreamForm>& possible, StreamForm& form,
-                        std::string& sentence)
+                             std::string& sentence)
 {
   for (const StreamForm& one : possible)
   {
