@@ -6,6 +6,7 @@
 /// starts threads. An object belongs to one thread at a time; different objects are independent of each other.
 #pragma once
 
+#include "tav/inspect/arrow.hpp"
 #include "tav/inspect/attributes.hpp"
 #include "tav/inspect/checker.hpp"
 #include "tav/inspect/collect.hpp"

@@ -112,8 +112,9 @@ public:
 
   /// Puts the rows of another table of the same query behind these. Takes the cells over as they are.
   TAV_INSPECT_API void append(Table other);
-  /// The same of a reader's result.
+  /// The same of a reader's result; of the library's own use, as is `chunks`.
   TAV_INSPECT_API void append(std::shared_ptr<const TableChunk> chunk);
+  const std::vector<std::shared_ptr<const TableChunk>>& chunks() const noexcept { return chunks_; }
 
 private:
   TableQuery query_;
