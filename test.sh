@@ -4,6 +4,7 @@
 #   TAV_STAGES=REGEX   only the stages whose titles match
 #   ./test.sh --full   what CI runs: the checks of the sources, both compilers, the sanitizers, fuzzing, packages,
 #                      most of s390x and Windows
+#   ./test.sh --face python   the Python package
 #   ./test.sh --platforms   all that is tested of libc++, s390x under qemu, Windows under wine
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")"
@@ -32,9 +33,13 @@ totals()
 
 build()
 {
-  local preset=$1
+  local preset=$1 options=()
   shift
-  cmake --preset "$preset" -DTAV_BUILD_TESTS=ON -DTAV_BUILD_TOOLS=ON >"$work/configure.log" || { cat "$work/configure.log"; return 1; }
+  while [[ ${1:-} == -D* ]]; do
+    options+=("$1")
+    shift
+  done
+  cmake --preset "$preset" -DTAV_BUILD_TESTS=ON -DTAV_BUILD_TOOLS=ON "${options[@]}" >"$work/configure.log" || { cat "$work/configure.log"; return 1; }
   cmake --build --preset "$preset" --parallel "$(nproc)" "$@" >"$work/build.log" || { grep -v '^\[[0-9]*/' "$work/build.log"; return 1; }
 }
 
@@ -239,6 +244,31 @@ check_link_time()
   ! grep -A 5 'warning:' "$work/build.log"
 }
 
+# The Python package of the build folder, with the Python that the packages are of.
+check_python()
+{
+  build release -DTAV_BUILD_PYTHON=ON -DPython3_EXECUTABLE=/usr/bin/python3 --target tav_python tav_tool
+  local -x PYTHONPATH=$PWD/build/release/python PYTHONDONTWRITEBYTECODE=1 TAV_TOOL=$PWD/build/release/tools/tav
+  /usr/bin/python3 -m mypy --strict --no-error-summary --cache-dir="$work/mypy" python/tav
+  /usr/bin/python3 -m pytest -q -p no:cacheprovider --junitxml="$work/report.xml" python/tests >"$work/tests.log" 2>&1 ||
+    { tail -n 60 "$work/tests.log"; return 1; }
+  count_python
+}
+
+# Adds to the totals what pytest's report counts.
+count_python()
+{
+  local tests bad out
+  tests=$(grep -oE ' tests="[0-9]+"' "$work/report.xml" | grep -oE '[0-9]+' | head -n 1)
+  bad=$(grep -oE ' (failures|errors)="[0-9]+"' "$work/report.xml" | grep -oE '[0-9]+' | awk '{ sum += $1 } END { print sum + 0 }')
+  out=$(grep -oE ' skipped="[0-9]+"' "$work/report.xml" | grep -oE '[0-9]+' | head -n 1)
+  passed=$((passed + tests - bad - out))
+  failed=$((failed + bad))
+  skipped=$((skipped + out))
+  echo "$tests tests, $bad failed, $out skipped"
+  ((tests > out && bad == 0))
+}
+
 check_libcxx()
 {
   check_platform libcxx tests "" "" "$@"
@@ -271,6 +301,7 @@ full()
   stage "demo" ./demo.sh
   stage "Kaitai" check_kaitai
   stage "g++" build_and_test release
+  stage "Python" check_python
   stage "clang++" check_clang
   stage "static libraries" check_static
   stage "link-time optimisation" check_link_time
@@ -293,18 +324,23 @@ case ${1:-} in
     stage "g++" build_and_test release
     ;;
   --full)
-    stage "packages" cmake/install-packages.sh build test full platforms
+    stage "packages" cmake/install-packages.sh build test full platforms python
     # The same sources are compiled again and again, at every place where the project is checked out.
     export CMAKE_CXX_COMPILER_LAUNCHER=ccache CCACHE_BASEDIR=$PWD CCACHE_NOHASHDIR=1
     export CCACHE_SLOPPINESS=pch_defines,time_macros,include_file_mtime,include_file_ctime
     full
+    ;;
+  --face)
+    [[ ${2:-} == python ]] || { echo "usage: $0 --face python" >&2; exit 2; }
+    stage "packages" cmake/install-packages.sh python
+    stage "Python" check_python
     ;;
   --platforms)
     stage "packages" cmake/install-packages.sh build test platforms
     platforms
     ;;
   *)
-    echo "usage: $0 [--full | --platforms]" >&2
+    echo "usage: $0 [--full | --face python | --platforms]" >&2
     exit 2
     ;;
 esac

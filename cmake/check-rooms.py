@@ -3,8 +3,8 @@
 
     check-rooms.py [ROOT]
 
-Includes point one way: tools -> inspect -> layer -> api -> core -> storage, dictionary -> format -> trace -> kor. The system, its
-headers and the byte order are kor's business, which has a file a platform: names that end in Posix or Windows. What the
+Includes point one way: tools, python -> inspect -> layer -> api -> core -> storage, dictionary -> format -> trace -> kor. The
+system, its headers and the byte order are kor's business, which has a file a platform: names that end in Posix or Windows. What the
 program alone asks of the system is in tools/host, by the same rule. No other source asks for the platform, tests and
 examples included. What keeps a compiler from its work stands in one file. The inspection library names no option of the
 program.
@@ -31,6 +31,7 @@ ROOMS = {
     "layer": {"layer"},
     "inspect": {"inspect"},
     "tools": {"tools"},
+    "python": {"python"},
     "include": set(),
 }
 # The installed part of core: which of it the rooms below may use.
@@ -54,7 +55,7 @@ PLATFORM_FILE = re.compile(r"^(kor/(\w+(Posix|Windows)\.cpp|windows\.h)|tools/ho
 # Sources that are no room: they may include what they like, but must not ask for the platform.
 BESIDE = ("tests", "examples", "bench", "fuzz")
 # Libraries of others that a room may use.
-THIRD_PARTY = {"tools": ("CLI/", "nlohmann/")}
+THIRD_PARTY = {"tools": ("CLI/", "nlohmann/"), "python": ("Python.h", "datetime.h", "structmember.h")}
 
 # A namespace of the users' own names, in a source that is not installed.
 USERS_NAMESPACE = re.compile(r"^\s*namespace\s+tav\s*(\{|$)")

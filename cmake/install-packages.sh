@@ -1,6 +1,7 @@
 #!/usr/bin/env bash
 # Installs the Debian packages of the named groups that are missing. This is the one list of them.
-#   cmake/install-packages.sh GROUP...        groups: build, test, full, platforms, bench, coverage, kaitai
+#   cmake/install-packages.sh GROUP...        groups: build, test, full, platforms, bench, coverage, kaitai,
+#                                            python
 set -euo pipefail
 
 declare -A groups=(
@@ -9,6 +10,7 @@ declare -A groups=(
   [bench]="libbenchmark-dev libbson-dev libmsgpack-dev libcbor-dev libflatbuffers-dev libebml-dev rapidjson-dev libpugixml-dev pkg-config valgrind binutils python3 python3-matplotlib"
   [full]="clang clang-format clang-tidy cppcheck libclang-rt-dev ccache doxygen lintian dpkg-dev gzip abigail-tools valgrind"
   [kaitai]="nodejs npm"
+  [python]="g++ cmake ninja-build nlohmann-json3-dev python3-dev python3-pytest python3-hypothesis python3-numpy python3-pandas mypy"
   [coverage]="gcovr qemu-user-static"
   [platforms]="clang libc++-dev libc++abi-dev googletest ccache qemu-user-static g++-s390x-linux-gnu g++-mingw-w64-x86-64-posix wine64 wine"
 )

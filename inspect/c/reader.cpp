@@ -178,26 +178,6 @@ uint32_t nextRoot(tav_reader& reader, const PlacedNode* after, tav_node& out)
   return TAV_RC_NO_MORE_CHILDREN;
 }
 
-/// The path of the node at an offset: walks up to it.
-std::string pathAt(const tav_reader& reader, uint64_t offset)
-{
-  DocumentState& state = reader.state();
-  StreamWalk walk(*state.source, state.recognition.form, [](const PassedOver&) {});
-  Event event;
-  while (walk.next(event) && event.offset <= offset)
-  {
-    if (event.what == What::nodeBegin && event.offset == offset)
-    {
-      return walk.walker().path(event, PathStyle::brief);
-    }
-    if (event.what == What::nodeBegin && event.node.isGroup() && event.node.limit <= offset)
-    {
-      walk.skip();
-    }
-  }
-  return {};
-}
-
 } // namespace
 
 } // namespace tav::inspect
@@ -271,7 +251,7 @@ const char* tav_last_message(const tav_reader* reader)
   const uint32_t rc = guarded(nullptr, [&] {
     if (std::exchange(failure.wantsPath, false))
     {
-      failure.problem.path = pathAt(*reader, failure.problem.offset.value_or(0));
+      failure.problem.path = reader->state().pathAt(failure.problem.offset.value_or(0), PathStyle::brief);
     }
     failure.text = problemLine(failure.problem);
     return uint32_t{TAV_RC_OK};

@@ -69,6 +69,24 @@ Form DocumentState::formAt(uint64_t offset) const
   return behind == forms.begin() ? recognition.form : std::prev(behind)->second;
 }
 
+std::string DocumentState::pathAt(uint64_t offset, PathStyle style) const
+{
+  StreamWalk walk(*source, recognition.form, [](const PassedOver&) {});
+  Event event;
+  while (walk.next(event) && event.offset <= offset)
+  {
+    if (event.what == What::nodeBegin && event.offset == offset)
+    {
+      return walk.walker().path(event, style);
+    }
+    if (event.what == What::nodeBegin && event.node.isGroup() && event.node.limit <= offset)
+    {
+      walk.skip();
+    }
+  }
+  return {};
+}
+
 void DocumentState::learn(uint64_t offset, const Form& form)
 {
   if (formAt(offset) != form)
@@ -176,6 +194,23 @@ NodeRange Document::find(const tav::Node& from, std::string_view path, OnDamage 
 std::span<const Damage> Document::damage() const noexcept
 {
   return state_->damage;
+}
+
+Form Document::formOf(const tav::Node& node) const noexcept
+{
+  Form form = state_->formAt(node.offset());
+  form.root64 = node.width() == Width::bits64;
+  return form;
+}
+
+std::string Document::pathOf(const tav::Node& node, PathStyle style) const
+{
+  return state_->pathAt(node.offset(), style);
+}
+
+void Document::tellProgress(std::function<void(uint64_t)> told) const
+{
+  state_->told = std::move(told);
 }
 
 const Form& Document::form() const noexcept

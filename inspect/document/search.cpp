@@ -10,6 +10,8 @@ namespace tav::inspect
 namespace
 {
 
+constexpr uint64_t kToldEvery = 4096; // nodes, of which a search tells how far it is
+
 WalkStart startAt(const TAVHeader& node)
 {
   return {.offset = node.nodeOffset, .wide = layout::is64(node)};
@@ -48,7 +50,7 @@ Search::Search(DocumentState& state, const SearchStart& start, bool isBelow, Pat
       walk_(
           *state.source, isBelow ? formOf(start) : state.recognition.form,
           [this](const PassedOver& passed) { passOver(passed); }, isBelow ? startAt(start.node) : WalkStart{}),
-      isBelow_(isBelow)
+      start_(start.node.nodeOffset), isBelow_(isBelow)
 {
 }
 
@@ -61,9 +63,17 @@ void Search::passOver(const PassedOver& passed)
   }
   throw Error(Problem{.file = state_.source->name(),
                       .offset = passed.offset,
-                      .path = passed.path,
+                      .path = isBelow_ ? wholePath(passed.path) : passed.path,
                       .sentence = passed.reason,
                       .code = passed.code});
+}
+
+/// A path that begins with the node where the walk does, as one that begins at the roots.
+std::string Search::wholePath(const std::string& path) const
+{
+  const std::string start = state_.pathAt(start_, PathStyle::brief);
+  const size_t below = path.find('/', 1);
+  return start.empty() ? path : start + (below == std::string::npos ? "" : path.substr(below));
 }
 
 bool Search::next()
@@ -78,6 +88,10 @@ bool Search::next()
     if (event_.what != What::nodeBegin)
     {
       continue;
+    }
+    if (++seen_ % kToldEvery == 0 && state_.told)
+    {
+      state_.told(event_.offset);
     }
     if (event_.depth == 0 && !isBelow_)
     {

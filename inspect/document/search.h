@@ -2,6 +2,7 @@
 #pragma once
 
 #include <cstdint>
+#include <string>
 #include <string_view>
 #include <vector>
 
@@ -43,13 +44,16 @@ private:
   Search(DocumentState& state, const SearchStart& start, bool isBelow, PathMatcher matcher, OnDamage onDamage);
   Search(DocumentState& state, const SearchStart& start, const Path& path, OnDamage onDamage);
   void passOver(const PassedOver& passed);
+  std::string wholePath(const std::string& path) const;
 
   DocumentState& state_;
   PathMatcher matcher_;
   OnDamage onDamage_;
   StreamWalk walk_;
+  uint64_t start_;
   bool isBelow_; ///< what is searched is below the walk's first node
   bool isDone_ = false;
+  uint64_t seen_ = 0; ///< nodes
   Event event_{};
   std::vector<TAVHeader> around_{}; ///< the groups on the way to the event's node, by depth
 };

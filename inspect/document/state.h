@@ -2,6 +2,7 @@
 #pragma once
 
 #include <array>
+#include <functional>
 #include <map>
 #include <memory>
 #include <string>
@@ -32,6 +33,9 @@ struct DocumentState
   /// The form of the stream that a node is in which a walk has handed out.
   Form formAt(uint64_t offset) const;
 
+  /// The path of the node at an offset: walks up to it. Empty where no node begins there.
+  std::string pathAt(uint64_t offset, PathStyle style) const;
+
   /// Remembers that a stream of this form begins at an offset.
   void learn(uint64_t offset, const Form& form);
 
@@ -42,6 +46,7 @@ struct DocumentState
   std::vector<Damage> damage{};     ///< by offset, each place once
   std::map<uint64_t, Form> forms{}; ///< where streams begin that are in another form than the one before
   std::array<std::unique_ptr<tav::Reader>, 4> readers{};
+  std::function<void(uint64_t)> told{}; ///< is told how far a search is
 };
 
 } // namespace tav::inspect

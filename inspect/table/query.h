@@ -9,6 +9,7 @@
 
 #include "tav/inspect/path.hpp"
 #include "tav/inspect/table.hpp"
+#include "tav/path/compiled.hpp"
 
 namespace tav::inspect
 {

@@ -9,6 +9,7 @@
 #include <memory>
 #include <ranges>
 #include <span>
+#include <string>
 #include <string_view>
 #include <utility>
 
@@ -18,6 +19,7 @@
 #include "tav/inspect/form.hpp"
 #include "tav/inspect/rules.hpp"
 #include "tav/inspect/source.hpp"
+#include "tav/inspect/walker.hpp"
 #include "tav/tav.hpp"
 
 namespace tav::inspect
@@ -126,6 +128,16 @@ public:
   /// What walks have passed over so far, by offset, each place once: the first 1,048,576 of them. Valid until a range
   /// of the document moves on.
   TAV_INSPECT_API std::span<const Damage> damage() const noexcept;
+
+  /// The form of the stream that a node of this document is in.
+  TAV_INSPECT_API Form formOf(const tav::Node& node) const noexcept;
+  /// A path that leads back to a node of this document: a walk from the first byte on that steps over the groups beside
+  /// the way. Empty where no node begins there.
+  TAV_INSPECT_API std::string pathOf(const tav::Node& node, PathStyle style = PathStyle::whole) const;
+
+  /// Names who is told by offset, every few thousand nodes, how far a search is; nobody when empty. To cancel the
+  /// search, throw from it.
+  TAV_INSPECT_API void tellProgress(std::function<void(uint64_t)> told) const;
 
   /// The first stream's form, and why it is that one.
   TAV_INSPECT_API const Form& form() const noexcept;

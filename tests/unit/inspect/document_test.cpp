@@ -110,6 +110,44 @@ INSTANTIATE_TEST_SUITE_P(, TestDocument, testing::Values(Access::memory, Access:
   return name.param == Access::memory ? "memory" : "file";
 });
 
+TEST_P(TestDocument, ANodesPathLeadsBackToItAndItsFormIsThatOfItsStream)
+{
+  Bytes bytes = hosts({{"ada", 1}, {"grace", 2}});
+  const Bytes other = hosts({{"hedy", 3}}, {.swap = true});
+  bytes.insert(bytes.end(), other.begin(), other.end());
+  const Document document = open(bytes);
+  std::vector<std::string> paths;
+  std::vector<bool> swapped;
+  for (const tav::Node& node : document.find("//hostName"))
+  {
+    paths.push_back(document.pathOf(node));
+    swapped.push_back(document.formOf(node).swapped);
+  }
+  EXPECT_THAT(paths, ElementsAre("/system/host/hostName", "/system/host[2]/hostName", "/system/host/hostName"));
+  EXPECT_THAT(swapped, ElementsAre(false, false, true));
+}
+
+TEST_P(TestDocument, ASearchTellsHowFarItIsAndIsCancelledByThrowing)
+{
+  Bytes bytes;
+  for (int i = 0; i < 3000; ++i)
+  {
+    const Bytes more = hosts({{"ada", 1}});
+    bytes.insert(bytes.end(), more.begin(), more.end());
+  }
+  const Document document = open(bytes);
+  std::vector<uint64_t> told;
+  document.tellProgress([&](uint64_t offset) {
+    told.push_back(offset);
+    if (told.size() == 2)
+    {
+      throw std::runtime_error("enough");
+    }
+  });
+  EXPECT_THROW(static_cast<void>(tav::test::count(document.find("//osName"))), std::runtime_error);
+  EXPECT_THAT(told, ElementsAre(testing::Gt(0U), testing::Gt(told.front())));
+}
+
 TEST_P(TestDocument, FindsOutTheFormOfAFile)
 {
   for (const bool swap : {false, true})
