@@ -129,17 +129,29 @@ public:
   }
   Places(const Places&) = delete;
   Places& operator=(const Places&) = delete;
-  ~Places() { PyBuffer_Release(&view_); }
+  ~Places()
+  {
+    Py_SET_REFCNT(Py_None, Py_REFCNT(Py_None) - nones_);
+    PyBuffer_Release(&view_);
+  }
 
   /// Takes the object over.
   void put(size_t row, PyObject* object)
   {
     auto* const places = static_cast<PyObject**>(view_.buf);
     PyObject* const before = std::exchange(places[row], object);
-    Py_XDECREF(before);
+    if (before == Py_None) [[likely]]
+    {
+      ++nones_; // given back at once: they are most of the work
+    }
+    else
+    {
+      Py_XDECREF(before);
+    }
   }
 
 private:
+  Py_ssize_t nones_ = 0;
   Py_buffer view_{};
 };
 

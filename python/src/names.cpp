@@ -1,6 +1,5 @@
 #include "python/src/names.h"
 
-#include <array>
 #include <optional>
 #include <vector>
 
@@ -14,29 +13,23 @@ namespace tav::python
 namespace
 {
 
-using Names = std::array<PyObject*, 65536>; // of all ids
-
-Names tags{};
-Names steps{};
-Names types{};
 PyObject* idsByName = nullptr;
 
-PyObject* keep(PyObject*& place, Ref name)
+Ref makeTag(uint16_t elm)
 {
-  PyObject* object = name.release();
-  if (PyUnicode_CheckExact(object))
-  {
-    PyUnicode_InternInPlace(&object); // keys of dicts compare by their place then
-  }
-  place = object;
-  return place;
+  const std::string_view tag = dictionary::tagOf(elm);
+  return tag.empty() ? Ref(none()) : textOf(tag);
 }
 
-/// Calls `make` for a name that is not there yet.
-template<class Make>
-PyObject* lookUp(Names& names, uint16_t number, Make&& make)
+Ref makeStep(uint16_t elm)
 {
-  return names[number] != nullptr ? names[number] : keep(names[number], make());
+  return textOf(inspect::elementText(elm));
+}
+
+Ref makeType(uint16_t type)
+{
+  const auto name = inspect::jsonTypeName(type);
+  return name ? textOf(*name) : numberOf(type);
 }
 
 /// A whole number from 0 to 65,535.
@@ -64,25 +57,19 @@ uint16_t lookUpName(PyObject* name)
 
 } // namespace
 
-PyObject* tagOf(uint16_t elm)
-{
-  return lookUp(tags, elm, [elm] {
-    const std::string_view tag = dictionary::tagOf(elm);
-    return tag.empty() ? Ref(none()) : textOf(tag);
-  });
-}
+Names elementTags(makeTag);
+Names elementSteps(makeStep);
+Names typeNames(makeType);
 
-PyObject* stepNameOf(uint16_t elm)
+PyObject* Names::add(uint16_t number)
 {
-  return lookUp(steps, elm, [elm] { return textOf(inspect::elementText(elm)); });
-}
-
-PyObject* typeNameOf(uint16_t type)
-{
-  return lookUp(types, type, [type] {
-    const auto name = inspect::jsonTypeName(type);
-    return name ? textOf(*name) : numberOf(type);
-  });
+  PyObject* object = make_(number).release();
+  if (PyUnicode_CheckExact(object))
+  {
+    PyUnicode_InternInPlace(&object); // keys of dicts compare by their place then
+  }
+  names_[number] = object;
+  return object;
 }
 
 uint16_t idOf(PyObject* name)

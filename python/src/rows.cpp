@@ -1,26 +1,47 @@
 #include "python/src/rows.h"
 
+#include <algorithm>
+
 #include "python/src/values.h"
 #include "python/src/walkBelow.h"
 
 namespace tav::python
 {
 
+/// The widest values come first, so that each column is aligned where the one before it ends.
+template<class Use>
+void Rows::eachColumn(const Use& use)
+{
+  use(parent);
+  use(offset);
+  use(size);
+  use(number);
+  use(time);
+  use(depth);
+  use(place_);
+  use(id);
+  use(type);
+  use(key);
+  use(kind);
+}
+
 void Rows::grow()
 {
-  constexpr size_t first = 4096;
-  room_ = room_ == 0 ? first : room_ * 2;
-  parent.reserve(room_);
-  depth.reserve(room_);
-  offset.reserve(room_);
-  size.reserve(room_);
-  id.reserve(room_);
-  type.reserve(room_);
-  key.reserve(room_);
-  kind.reserve(room_);
-  number.reserve(room_);
-  time.reserve(room_);
-  place_.reserve(room_);
+  constexpr size_t bytesOfRow = 24; // of most nodes, in a stream
+  constexpr size_t mostAtFirst = size_t{1} << 20U;
+  constexpr size_t few = 64;
+  const size_t room = room_ == 0 ? std::min(opened_->bytes.size() / bytesOfRow, mostAtFirst) + few : room_ * 2;
+  size_t width = 0;
+  eachColumn([&](auto& column) { width += sizeof(column[0]); });
+  auto* const block = static_cast<uint8_t*>(std::malloc(room * width));
+  if (block == nullptr)
+  {
+    throw std::bad_alloc();
+  }
+  uint8_t* place = block;
+  eachColumn([&](auto& column) { column.move(place, room, count_); });
+  std::free(std::exchange(block_, block));
+  room_ = room;
 }
 
 template<class Number>
@@ -51,10 +72,13 @@ Kind Rows::takeTime(const tav::detail::RawValue& raw, size_t row)
   {
     return Kind::bytes;
   }
-  return nanosecondsFit(stamp, time[row]) ? Kind::time : Kind::none;
+  int64_t nanoseconds = 0;
+  const bool fits = nanosecondsFit(stamp, nanoseconds);
+  time[row] = fits ? nanoseconds : kNoTime;
+  return fits ? Kind::time : Kind::none;
 }
 
-Kind Rows::classify(const tav::detail::RawValue& raw, size_t row)
+inline Kind Rows::classify(const tav::detail::RawValue& raw, size_t row)
 {
   switch (raw.type)
   {
@@ -91,7 +115,7 @@ Kind Rows::classify(const tav::detail::RawValue& raw, size_t row)
   }
 }
 
-void Rows::add(const Step& step, int64_t parentRow, bool swapped)
+inline void Rows::add(const Step& step, int64_t parentRow, bool swapped)
 {
   if (count_ == room_)
   {
@@ -151,13 +175,18 @@ void Rows::fill(inspect::ByteSource& source, bool withPaths, Pass& pass)
     const uint8_t* const payload = isGroup ? nullptr : payloadIn(opened_->bytes, header);
     add(Step{header, payload, 0, isGroup, withPaths ? &path : nullptr}, -1, root.form.swapped);
     walkBelow(*opened_, source, reader, root, withPaths, [&](const Step& step) {
-      open.resize(static_cast<size_t>(step.depth));
+      const auto level = static_cast<size_t>(step.depth);
+      if (open.size() != level)
+      {
+        open.resize(level);
+      }
+      const int64_t around = open.back();
       if (step.isGroup)
       {
         open.push_back(static_cast<int64_t>(count_));
       }
       pass.at(step.header.nodeOffset);
-      add(step, open[static_cast<size_t>(step.depth) - 1], root.form.swapped);
+      add(step, around, root.form.swapped);
     });
   }
 }

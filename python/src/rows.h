@@ -1,10 +1,9 @@
 /// The nodes of streams as rows, column by column.
 #pragma once
 
-#include <array>
-#include <bit>
 #include <cstdint>
 #include <cstdlib>
+#include <cstring>
 #include <new>
 #include <string>
 #include <vector>
@@ -14,28 +13,26 @@
 namespace tav::python
 {
 
-/// Plain values one behind the other, which are not cleared before they are written.
+/// The values of a column, in the rows' block.
 template<class T>
 class Column
 {
 public:
-  Column() = default;
-  Column(const Column&) = delete;
-  Column& operator=(const Column&) = delete;
-  ~Column() { std::free(items_); }
-
-  void reserve(size_t room)
-  {
-    auto* const larger = static_cast<T*>(std::realloc(items_, room * sizeof(T)));
-    if (larger == nullptr)
-    {
-      throw std::bad_alloc();
-    }
-    items_ = larger;
-  }
   T& operator[](size_t at) { return items_[at]; }
   const T& operator[](size_t at) const { return items_[at]; }
   T* data() { return items_; }
+
+  /// Goes on in a new block, behind what is there already; keeps its first values.
+  void move(uint8_t*& place, size_t room, size_t count)
+  {
+    auto* const items = reinterpret_cast<T*>(place);
+    if (count != 0)
+    {
+      std::memcpy(items, items_, count * sizeof(T));
+    }
+    items_ = items;
+    place += room * sizeof(T);
+  }
 
 private:
   T* items_ = nullptr;
@@ -60,6 +57,9 @@ public:
 
   explicit Rows(std::shared_ptr<Opened> opened)
       : opened_(std::move(opened)) {}
+  Rows(const Rows&) = delete;
+  Rows& operator=(const Rows&) = delete;
+  ~Rows() { std::free(block_); }
 
   /// Walks all streams. Called without the interpreter.
   void fill(inspect::ByteSource& source, bool withPaths, Pass& pass);
@@ -93,6 +93,8 @@ private:
   };
 
   void grow();
+  template<class Use>
+  void eachColumn(const Use& use);
   void add(const Step& step, int64_t parentRow, bool swapped);
   Kind classify(const tav::detail::RawValue& raw, size_t row);
   template<class Number>
@@ -102,6 +104,7 @@ private:
   std::shared_ptr<Opened> opened_;
   size_t count_ = 0;
   size_t room_ = 0;
+  uint8_t* block_ = nullptr; ///< of all columns: one, which the allocator keeps at hand for the next rows
   Column<uint32_t> place_{}; ///< of the rest
   std::vector<Rest> rests_{};
 };

@@ -3,7 +3,6 @@
 
 #include <datetime.h>
 
-#include <limits>
 #include <type_traits>
 #include <vector>
 
@@ -178,16 +177,6 @@ Ref nanosecondsOf(const TAVTimeStamp& stamp)
   const Ref whole = made(PyNumber_Multiply(seconds.get(), billion.get()));
   const Ref fraction = numberOf((uint64_t{stamp.fractionA} * 1000 + stamp.fractionB) * 1000);
   return made(PyNumber_Add(whole.get(), fraction.get()));
-}
-
-bool nanosecondsFit(const TAVTimeStamp& stamp, int64_t& nanoseconds) noexcept
-{
-  constexpr uint64_t most = std::numeric_limits<int64_t>::max();
-  constexpr uint64_t billion = 1'000'000'000;
-  const uint64_t fraction = (uint64_t{stamp.fractionA} * 1000 + stamp.fractionB) * 1000;
-  const bool fits = stamp.seconds <= (most - fraction) / billion;
-  nanoseconds = fits ? static_cast<int64_t>(stamp.seconds * billion + fraction) : 0;
-  return fits;
 }
 
 bool isMoment(PyObject* value)
