@@ -75,6 +75,13 @@ public:
     return rc;
   }
 
+  /// Behind the zeros at an offset that are known without a look at them.
+  [[nodiscard]] uint64_t zerosUntil(uint64_t offset) const noexcept
+  {
+    uint64_t found = 0;
+    return file_.findData(offset, &found) == TAV_RC_OK ? std::min(std::max(found, offset), size_) : offset;
+  }
+
 private:
   static constexpr size_t kWindow = size_t{16} * 1024;
   using Window = std::array<uint8_t, kWindow>;

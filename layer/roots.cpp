@@ -16,9 +16,17 @@ namespace
 class HandleBytes
 {
 public:
-  explicit HandleBytes(TAVHandle& handle) noexcept
-      : handle_(handle)
+  /// `file`: what is read, when it is known, for its holes.
+  HandleBytes(TAVHandle& handle, KORHFile* file) noexcept
+      : handle_(handle), file_(file)
   {
+  }
+
+  /// Behind the zeros at an offset that are known without a look at them.
+  [[nodiscard]] uint64_t zerosUntil(uint64_t offset) const noexcept
+  {
+    uint64_t found = 0;
+    return file_ != nullptr && file_->findData(offset, &found) == TAV_RC_OK ? std::max(found, offset) : offset;
   }
 
   /// Bytes that are at hand from an offset on: at least one, but at the end.
@@ -64,13 +72,15 @@ private:
   }
 
   TAVHandle& handle_;
+  KORHFile* file_;
 };
 
 } // namespace
 
-uint32_t findRoot(TAVHandle& handle, const StreamForm& form, uint64_t from, uint64_t& root, uint64_t& end) noexcept
+uint32_t findRoot(TAVHandle& handle, KORHFile* file, const StreamForm& form, uint64_t from, uint64_t& root,
+                  uint64_t& end) noexcept
 {
-  HandleBytes bytes(handle);
+  HandleBytes bytes(handle, file);
   TAVHeader header;
   const uint32_t rc = RootSearch<HandleBytes>(bytes, form).next(from, header);
   root = header.nodeOffset;

@@ -201,6 +201,12 @@ void JsonWriter::putBytes(std::string_view name, uint64_t from, uint64_t length)
       flush();
     }
     blank ? void(zeros += piece_.size()) : void(hex += hexText(piece_));
+    if (blank && from + kBlock < end)
+    {
+      const uint64_t past = std::min(end, source_.zerosUntil(from + kBlock)) - (from + kBlock);
+      zeros += past / kBlock * kBlock;
+      from += past / kBlock * kBlock;
+    }
   }
   flush();
   put("]");

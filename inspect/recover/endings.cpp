@@ -42,7 +42,7 @@ public:
     // What was read stays at hand for the look at what an eye catcher ends.
     constexpr size_t kWindow = ByteSource::kPage;
     std::vector<uint8_t> window(kWindow + kEyeLength - 1);
-    for (uint64_t at = from_; at < source_.size(); at += kWindow)
+    for (uint64_t at = from_; at < source_.size();)
     {
       const size_t got = source_.read(at, window);
       const uint8_t* place = window.data();
@@ -52,6 +52,7 @@ public:
         take(at + static_cast<uint64_t>(place - window.data()));
         place += kEyeLength;
       }
+      at = source_.pastHole(at + kWindow, window, kEyeLength - 1);
     }
     std::sort(found_.begin(), found_.end(), [](const Ending& a, const Ending& b) {
       return a.start != b.start ? a.start < b.start : a.end > b.end;

@@ -26,7 +26,7 @@ bool RecoverySearch::findNext(uint64_t from, uint64_t to, Candidate& found)
         return true;
       }
     }
-    at += tests;
+    at = std::min(to, source_.pastHole(at + tests, window, kHeaderSize64));
     spent_ += tests;
     if (gaveUp())
     {
@@ -78,6 +78,7 @@ uint64_t RecoverySearch::firstSure(uint64_t from, uint64_t to, bool wide)
     }
     at += i;
     done = i < tests;
+    at = done ? at : std::min(to, source_.pastHole(at, window, kHeaderSize64));
   }
   sureFrom_ = known ? sureFrom_ : from;
   sureAt_ = at;

@@ -295,8 +295,8 @@ Restart Prober::findRestart(uint64_t from, bool wide, bool eitherWidth, uint64_t
         return restart;
       }
     }
-    at += tests;
     spent_ += tests;
+    at = std::min(limit, source_.pastHole(at + tests, window, kMargin));
     if (spent_ > budget_)
     {
       restart.gaveUp = at < limit;
@@ -323,7 +323,7 @@ bool Prober::zerosToEnd(uint64_t offset, bool& gaveUp)
       nonZeroAt_ = offset + static_cast<uint64_t>(found - bytes.begin()) + 1;
       return false;
     }
-    offset += bytes.size();
+    offset = source_.zerosUntil(offset + bytes.size());
     if (spent_ > budget_)
     {
       gaveUp = offset < source_.size();
@@ -348,6 +348,7 @@ uint64_t Prober::zerosStart(uint64_t from)
     {
       break;
     }
+    end = source_.zerosBefore(end, from);
   }
   return source_.size() - end >= worthTelling ? end : source_.size();
 }

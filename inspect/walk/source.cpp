@@ -61,10 +61,15 @@ ByteSource::ByteSource(std::string name, std::unique_ptr<TAVSideStorage> storage
   {
     failAt(name_, code);
   }
+  if (const auto* const file = dynamic_cast<const TAVSSFile*>(storage_.get()); file != nullptr)
+  {
+    file_ = file->pFile;
+  }
   if (from_ != 0)
   {
     startAt();
   }
+  inFile_ = from_;
 }
 
 void ByteSource::startAt()
@@ -103,6 +108,7 @@ std::unique_ptr<ByteSource> ByteSource::open(const std::string& path, uint64_t r
   param.options = KOR_FILE_READ;
   uint32_t code = TAV_RC_OK;
   auto file = std::make_unique<TAVSSFile>(&param, &code);
+  file->ioUnit = 4 * kPage; // of a ring over it: a node somewhere in a large file is read by one page
   if (code != TAV_RC_OK)
   {
     failAt(path, code);
@@ -121,6 +127,8 @@ std::unique_ptr<ByteSource> ByteSource::window(uint64_t from, uint64_t ringBytes
   else
   {
     made = std::make_unique<ByteSource>(name_, std::make_unique<StorageWindow>(*storage_, from_ + from), ringBytes);
+    made->file_ = file_;
+    made->inFile_ = inFile_ + from;
   }
   made->dictionary_ = dictionary_;
   return made;
@@ -213,6 +221,51 @@ std::span<const uint8_t> ByteSource::view(uint64_t offset)
   }
   const Page& found = page(offset / kPage);
   return std::span<const uint8_t>(found.bytes).subspan(static_cast<size_t>(offset % kPage));
+}
+
+uint64_t ByteSource::zerosUntil(uint64_t offset)
+{
+  if (offset >= size_)
+  {
+    return size_;
+  }
+  if (offset >= holeFrom_ && offset < holeTo_)
+  {
+    return holeTo_;
+  }
+  uint64_t found = 0;
+  if (file_ == nullptr || file_->findData(inFile_ + offset, &found) != TAV_RC_OK || found <= inFile_ + offset)
+  {
+    return offset;
+  }
+  holeFrom_ = offset;
+  holeTo_ = std::min(found - inFile_, size_);
+  return holeTo_;
+}
+
+uint64_t ByteSource::zerosBefore(uint64_t end, uint64_t from)
+{
+  if (end <= from || zerosUntil(end - 1) < end)
+  {
+    return end;
+  }
+  // What is known of a place holds for all behind it.
+  uint64_t known = end - 1;
+  while (from < known)
+  {
+    const uint64_t between = from + (known - from) / 2;
+    const bool isBlank = zerosUntil(between) >= end;
+    known = isBlank ? between : known;
+    from = isBlank ? from : between + 1;
+  }
+  return known;
+}
+
+uint64_t ByteSource::pastHole(uint64_t offset, std::span<const uint8_t> seen, uint64_t margin)
+{
+  const bool blank = std::all_of(seen.begin(), seen.end(), [](uint8_t byte) { return byte == 0; });
+  const uint64_t zeros = blank ? zerosUntil(offset) : offset;
+  return zeros > offset && zeros - offset > margin ? zeros - margin : offset;
 }
 
 size_t ByteSource::read(uint64_t offset, std::span<uint8_t> to)

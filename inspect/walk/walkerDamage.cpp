@@ -70,6 +70,7 @@ bool Walker::passZeros()
     {
       break;
     }
+    end = source_.zerosUntil(end);
   }
   // A root's header can itself begin with zeros.
   for (uint64_t back = 0; back < fewest && back <= end - position_; ++back)

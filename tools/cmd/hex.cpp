@@ -21,7 +21,8 @@ namespace
 {
 
 constexpr size_t kRow = 16;
-constexpr uint64_t kMostOfPiece = 32 * kRow; ///< bytes that are shown where no node begins
+constexpr uint64_t kLong = uint64_t{64} * 1024; ///< of zeros it is asked again how many follow
+constexpr uint64_t kMostOfPiece = 32 * kRow;    ///< bytes that are shown where no node begins
 
 class Dumper
 {
@@ -88,6 +89,7 @@ private:
   void pairText(const Node& node, uint64_t offset);
   void rows(uint64_t offset, uint64_t length);
   void row(uint64_t offset, std::span<const uint8_t> bytes);
+  uint64_t pastHole(uint64_t offset, uint64_t done, uint64_t length);
 
   Stream& stream_;
   DamageNotices& notices_;
@@ -167,6 +169,14 @@ void Dumper::heading(const Walker& walker, const Event& event)
   out_.write(text_);
 }
 
+/// The row of zeros behind which one comes that has to be looked at, from the one at `done` on.
+uint64_t Dumper::pastHole(uint64_t offset, uint64_t done, uint64_t length)
+{
+  const uint64_t next = std::min(length, stream_.bytes().zerosUntil(offset + done + kRow) - offset);
+  const uint64_t last = (length - 1) / kRow;
+  return std::max(done, std::min(next / kRow, last) * kRow - kRow);
+}
+
 void Dumper::rows(uint64_t offset, uint64_t length)
 {
   std::array<uint8_t, kRow> room{};
@@ -180,7 +190,9 @@ void Dumper::rows(uint64_t offset, uint64_t length)
     if (zero && zeroBefore && done + kRow < length)
     {
       // Rows of zeros are told once: where addresses jump, xxd -r fills with zeros. The last row shows where they end.
+      const bool asks = !starred || (offset + done) % kLong < kRow;
       out_.write(std::exchange(starred, true) ? "" : "*\n");
+      done = asks ? pastHole(offset, done, length) : done;
       continue;
     }
     zeroBefore = zero;

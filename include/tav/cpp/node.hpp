@@ -374,7 +374,23 @@ private:
 
   [[gnu::noinline]] uint32_t readElsewhere(TAVHeader* reference) noexcept
   {
+    if (reference != nullptr && state_->isBuffered())
+    {
+      goBehind(*reference);
+    }
     return tavGetNextChild(0, state_->handle, &parent_, reference, &data_);
+  }
+
+  /// Brings a ring to the sibling of a node; that of an open group is searched through all that is between.
+  void goBehind(const TAVHeader& header) const noexcept
+  {
+    const core::Node node = core::nodeOf(header);
+    uint64_t length = 0;
+    if (!core::isOpen(node) && core::lengthOf(state_->handle->alignMode == 1, node, length) &&
+        layout::addChecked(length, node.offset()))
+    {
+      state_->goTo(length);
+    }
   }
 
   /// Before a walk that somebody asks for.
@@ -418,6 +434,7 @@ private:
     }
     TAVHeaderData again{};
     ++state_->fetches;
+    state_->goTo(offset());
     uint32_t rc = tavReadNodeInt(0, state_->handle, offset(), layout::is64(data_.header), &again);
     if (rc == TAV_RC_OK && (layout::sizeOf(again.header) != size() || layout::typeOf(again.header) != type()))
     {

@@ -34,6 +34,8 @@ struct ReaderState
   /// What comes later stands here: nodes that an older library handed out know the places of what is above.
   bool readsAhead = true; ///< false: the system was told that a few places of a mapping are looked at
   KORFileMapping mapping{};
+  Owner<TAVSSFile> mapped{}; ///< the file of a mapping
+  KORHFile* file = nullptr;  ///< that is read, when it was opened by its path
 
   ReaderState() = default;
   ReaderState(const ReaderState&) = delete;
@@ -63,6 +65,26 @@ struct ReaderState
     {
       readsAhead = true;
       mapping.readAhead();
+    }
+  }
+
+  /// Before a look at a place that a ring may not cache. One that is far from what it does is read by a page: the ring
+  /// by itself would read all that is between, or as much as it holds.
+  void goTo(uint64_t offset) noexcept
+  {
+    if (!isBuffered() || !core::hasNeverTraced())
+    {
+      return;
+    }
+    TAVCircularBuf& ring = *handle->pCircularBuf;
+    if (core::runAt(ring, offset).length != 0)
+    {
+      return;
+    }
+    const uint64_t end = ring.headOffset + core::cachedBytes(ring);
+    if (ring.empty != 0 || offset < end || offset - end >= ring.pageSize)
+    {
+      ring.reposition(offset, 0, 0); // what fails fails again where the place is looked at
     }
   }
 

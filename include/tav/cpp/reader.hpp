@@ -300,6 +300,8 @@ private:
       if (rc == TAV_RC_OK)
       {
         state_->readsAhead = false;
+        state_->file = storage->pFile;
+        state_->mapped = std::move(storage);
         return openBytes({static_cast<const std::byte*>(mapping.bytes()), static_cast<size_t>(mapping.size())},
                          options);
       }
@@ -308,6 +310,10 @@ private:
         return rc;
       }
     }
+    // A walk reads as fast by small pages as by large ones, and a look at one place reads less.
+    constexpr uint64_t page = uint64_t{64} * 1024;
+    storage->ioUnit = page;
+    state_->file = storage->pFile;
     state_->owned = std::move(storage);
     return open(state_->owned.get(), options);
   }
@@ -341,7 +347,8 @@ private:
 
   uint32_t readAt(uint64_t offset, Width width, Node& node) const noexcept
   {
-    return read(node, [=](TAVHandle& used, TAVHeaderData& data) {
+    return read(node, [=, this](TAVHandle& used, TAVHeaderData& data) {
+      state_->goTo(offset);
       return tavReadNodeInt(0, &used, offset, width == Width::bits64, &data);
     });
   }

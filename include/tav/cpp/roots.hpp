@@ -15,8 +15,9 @@ namespace detail
 {
 
 /// The root at an offset, or behind the zeros that are there, and where it ends. TAV_RC_NO_MORE_CHILDREN when nothing
-/// but zeros is left, TAV_RC_BAD_CHILD_HDR where something else than a root is.
-TAV_API uint32_t findRoot(TAVHandle& handle, const StreamForm& form, uint64_t from, uint64_t& root,
+/// but zeros is left, TAV_RC_BAD_CHILD_HDR where something else than a root is. `file`: what is read, where it is known, for
+/// its holes.
+TAV_API uint32_t findRoot(TAVHandle& handle, KORHFile* file, const StreamForm& form, uint64_t from, uint64_t& root,
                           uint64_t& end) noexcept;
 
 } // namespace detail
@@ -81,7 +82,7 @@ private:
     const detail::StreamForm form{state_->isSwapped(), (handle.options & TAV_OPT_ROOT32) == 0, handle.alignMode == 1};
     uint64_t root = 0;
     uint64_t end = 0;
-    uint32_t rc = detail::findRoot(handle, form, next_, root, end);
+    uint32_t rc = detail::findRoot(handle, state_->file, form, next_, root, end);
     if (rc != TAV_RC_OK)
     {
       return rc;

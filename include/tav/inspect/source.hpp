@@ -68,6 +68,18 @@ public:
   /// Valid until the next call of any function of this object.
   TAV_INSPECT_API std::span<const uint8_t> view(uint64_t offset);
 
+  /// The first place at or behind an offset where something else than zeros can be, as far as that is known without
+  /// reading: the end of a sparse file's hole. The offset itself where nothing is known; the size at the most.
+  TAV_INSPECT_API uint64_t zerosUntil(uint64_t offset);
+
+  /// The same backwards: from where on, `from` at the earliest, nothing but zeros can be up to `end`; `end` where
+  /// nothing is known.
+  TAV_INSPECT_API uint64_t zerosBefore(uint64_t end, uint64_t from);
+
+  /// Where a search goes on that has come to `offset` through the bytes `seen`: there, or, when they were all zeros and
+  /// more are known to follow, `margin` bytes before those end.
+  TAV_INSPECT_API uint64_t pastHole(uint64_t offset, std::span<const uint8_t> seen, uint64_t margin = 0);
+
   /// The same bytes from an offset on, through pages of its own. This object outlives it.
   TAV_INSPECT_API std::unique_ptr<ByteSource> window(uint64_t from, uint64_t ringBytes = kDefaultRing);
 
@@ -114,6 +126,10 @@ private:
   std::unordered_map<uint64_t, size_t> places_{};
   std::vector<uint8_t> buffer_{};
   std::function<void(uint64_t)> told_{};
+  KORHFile* file_ = nullptr; ///< under the storage, for its holes; offsets in it are `inFile_` more
+  uint64_t inFile_ = 0;
+  uint64_t holeFrom_ = 0; ///< the hole that was found last
+  uint64_t holeTo_ = 0;
 };
 
 } // namespace tav::inspect

@@ -151,3 +151,59 @@ TEST(LayerAccess, ThePairAtTheEndOfAFileLeadsBackInEitherWay)
     EXPECT_FALSE(reader.endingAfter(writer.size()));
   }
 }
+
+namespace
+{
+
+/// Groups of a long element each, and a number behind them.
+Bytes longGroups()
+{
+  tav::Writer writer;
+  {
+    tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM);
+    for (uint32_t i = 0; i < 75; ++i)
+    {
+      root.group(TAV_ELM_CMN_HOST).add(TAV_ELM_CMN_HOST_NAME, std::string(100 * 1000, 'x'));
+    }
+    root.add(TAV_ELM_CMN_CPU_ONLINE, uint32_t{7});
+  }
+  writer.finish();
+  return bytesOf(writer.bytes());
+}
+
+} // namespace
+
+TEST(LayerRing, APathReadsAPageOrTwoForEachGroupThatItPasses)
+{
+  constexpr uint64_t page = 0x1000;
+  VectorStorage storage(page, longGroups(), VectorStorage::kReadOnly);
+  const tav::Reader reader(storage, {.ringBytes = 1U << 20U});
+  EXPECT_EQ(reader.path("system/cpuOnline")->as<uint32_t>(), 7U);
+  EXPECT_LE(storage.bytesRead, 80 * 2 * page);
+}
+
+TEST(LayerRing, ALookAtAPlaceReadsAPageOrTwo)
+{
+  constexpr uint64_t page = 0x1000;
+  VectorStorage storage(page, longGroups(), VectorStorage::kReadOnly);
+  const tav::Reader reader(storage, {.ringBytes = 1U << 20U});
+  const uint64_t last = reader.path("system/cpuOnline")->offset();
+  storage.bytesRead = 0;
+  EXPECT_EQ(reader.at(0).elm(), TAV_ELM_CMN_SYSTEM);
+  EXPECT_EQ(reader.at(last).as<uint32_t>(), 7U);
+  EXPECT_LE(storage.bytesRead, 4 * page);
+}
+
+TEST(LayerRing, AWalkReadsEachByteOnce)
+{
+  const Bytes stream = longGroups();
+  VectorStorage storage(0x1000, stream, VectorStorage::kReadOnly);
+  const tav::Reader reader(storage, {.ringBytes = 1U << 20U});
+  uint64_t size = 0;
+  for (const tav::Node& node : reader.root().descendants())
+  {
+    size += node.payload().size();
+  }
+  EXPECT_EQ(size, 75 * 100 * 1000 + sizeof(uint32_t));
+  EXPECT_LE(storage.bytesRead, stream.size() + stream.size() / 10);
+}
