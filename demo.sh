@@ -1,6 +1,6 @@
 #!/usr/bin/env bash
 # Installs what is missing, builds, and shows tav at work: this machine described as a stream, in memory and in a file,
-# printed as text and as XML, looked into with the program, damaged, and recovered.
+# printed as text and as XML, looked into with the program, damaged, and recovered; then recorded for ten seconds.
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")"
 
@@ -32,3 +32,15 @@ look tav check damaged.tav
 look tav recover damaged.tav -o recovered.tav
 show tav check recovered.tav
 show tav tree recovered.tav
+
+printf '\n# This machine, recorded for ten seconds, while another process watches:\n'
+printf '\n$ tav get series.tav --follow /system/host/memory/memFree &\n'
+tav get series.tav --follow /system/host/memory/memFree 2>/dev/null &
+watching=$!
+show tav snapshot --append --every 1s --count 10 -o series.tav
+sleep 1
+kill "$watching" # on a terminal Ctrl-C ends it; what a script starts beside itself takes no interrupts
+wait "$watching" || true
+show tav get series.tav --all /system/timestamp /system/host/cpu/cpuTotalUsage
+show tav schema series.tav
+show tav check series.tav

@@ -58,6 +58,28 @@ LD_LIBRARY_PATH=$libraries "$root/usr/bin/tav" snapshot -o "$work/x.tav"
 [[ $(file -b -m "$root/usr/share/file/magic/tav:/usr/share/misc/magic" "$work/x.tav") == 'tav stream, '* ]] ||
   { echo "file(1) does not know a stream by the package's entry"; exit 1; }
 [[ -s $root/usr/share/mime/packages/tav.xml ]] || { echo "the package has no MIME type"; exit 1; }
+
+echo "== the service"
+unit=$(find "$root" -name tav-snapshot.service)
+[[ -s $unit ]] || { echo "the package has no service"; exit 1; }
+enabled=$(find "$root" -type l -lname '*tav-snapshot.service')
+[[ -z $enabled ]] || { echo "the service is on by default: $enabled"; exit 1; }
+command=$(sed -n 's/^ExecStart=//p' "$unit")
+for option in --rotate --keep; do
+  [[ $command == *" $option "* ]] || { echo "the service has no $option, so that it fills the disk"; exit 1; }
+done
+# What it starts is what the program takes: a snapshot by that very line, in another folder.
+mkdir "$work/state"
+line=${command//%%/%}
+line=${line/\/usr\/bin\/tav/$root/usr/bin/tav}
+read -ra words <<<"${line/\/var\/lib\/tav/$work/state} --count 1"
+LD_LIBRARY_PATH=$libraries "${words[@]}"
+[[ -s $work/state/snapshot-1.tav ]] || { echo "the service's command has recorded nothing"; exit 1; }
+if command -v systemd-analyze >/dev/null; then
+  sed "s|/usr/bin/tav|$root/usr/bin/tav|" "$unit" >"$work/tav-snapshot.service"
+  systemd-analyze verify --man=no "$work/tav-snapshot.service"
+  systemd-analyze security --offline=yes --threshold=30 --no-pager "$work/tav-snapshot.service" >"$work/log" || { cat "$work/log"; exit 1; }
+fi
 for part in tav:main tav-inspect:inspect; do
   read -ra flags <<<"$(PKG_CONFIG_PATH=$libraries/pkgconfig pkg-config --cflags --libs "${part%%:*}")"
   g++ -std=c++20 "tests/system/install/outside/${part##*:}.cpp" -o "$work/outside" "${flags[@]}"

@@ -62,7 +62,7 @@ uint32_t skipZeros(Bytes& bytes, uint64_t offset, uint64_t& found) noexcept
       return rc;
     }
     constexpr uint64_t most = uint64_t{64} * 1024; // then it is asked whether a hole begins here
-    length = lesser(length, most);
+    length = std::min(length, most);
     uint64_t zeros = 0;
     while (zeros < length && piece[zeros] == 0) ++zeros;
     offset += zeros;

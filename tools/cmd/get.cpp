@@ -380,10 +380,7 @@ const Registration registration{{
         "Every path that a command prints whole is understood. On a terminal control characters of texts are\n"
         "written as \\x1b, as 'tav tree' does. Exit status 1: a path leads nowhere, also by a name that no\n"
         "element has, or damage was passed over, which is told on standard error; the other values are printed.\n"
-        "2: a path is malformed.\n\n"
-        "With --follow every node that a path leads to is printed when it has come, until an interrupt, which is\n"
-        "no failure. Where a path asks for conditions, places or parents, those of a root are printed when the\n"
-        "root has been closed. Files that take the place of FILE are followed, and a line on standard error says so.",
+        "2: a path is malformed.",
     .options = {{.names = "-a,--all", .help = "every node that a path leads to, not only the first"},
                 {.names = "--raw", .help = "the payload's bytes as they stand in the file, without line ends"},
                 {.names = "--json", .help = "one JSON object a match: path, offset, size, type, value"},
@@ -392,8 +389,7 @@ const Registration registration{{
     .examples = {{"tav get x.tav /system/host/hostName", "one value"},
                  {"tav get x.tav --all --paths //hostName", "every host name in the file, with its path"},
                  {"tav get x.tav --all '//host[cpu/cpuOnline > 4]/hostName'", "those with many processors"},
-                 {"tav get x.tav --raw '/system/host[2]/#60123' > bytes", "the bytes of a value"},
-                 {"tav get day.tav /system/host/memory/memFree --follow", "free memory, as it is recorded"}},
+                 {"tav get x.tav --raw '/system/host[2]/#60123' > bytes", "the bytes of a value"},},
     .run = run,
 }};
 

@@ -52,6 +52,7 @@ struct Series
   std::optional<milliseconds> every{};
   uint64_t count = 1; ///< 0: until the program is ended
   uint64_t rotate = 0;
+  uint64_t keep = 0;
 };
 
 Series seriesOf(const Invocation& invocation)
@@ -82,6 +83,11 @@ Series seriesOf(const Invocation& invocation)
     throw Failure("snapshot: --rotate needs a FILE with %n in its name",
                   "day-%n.tav stands for day-1.tav, day-2.tav, …");
   }
+  series.keep = invocation.number("--keep").value_or(0);
+  if (invocation.has("--keep") && (series.rotate == 0 || series.keep == 0))
+  {
+    throw Failure("snapshot: --keep needs " + std::string(series.rotate == 0 ? "--rotate" : "a number above 0"));
+  }
   return series;
 }
 
@@ -100,7 +106,7 @@ void appendOne(Recorder& recorder, bool pairs, const SnapshotMaker& make, Width 
 
 void refuseSeries(const Invocation& invocation)
 {
-  for (const char* const option : {"--every", "--count", "--rotate"})
+  for (const char* const option : {"--every", "--count", "--rotate", "--keep"})
   {
     if (invocation.has(option))
     {
@@ -115,7 +121,7 @@ int appendSnapshots(const Invocation& invocation, const SnapshotForm& form, cons
   try
   {
     Recorder recorder(host::pathOf(series.path),
-                      {.maxBytes = series.rotate, .syncEvery = std::chrono::nanoseconds(0)}, form.stream);
+                      {.maxBytes = series.rotate, .keep = series.keep, .syncEvery = std::chrono::nanoseconds(0)}, form.stream);
     auto next = std::chrono::steady_clock::now();
     for (uint64_t made = 0; series.count == 0 || made < series.count; ++made)
     {

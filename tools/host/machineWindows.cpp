@@ -38,20 +38,26 @@ void describeProcessors(CpuFacts& cpu)
   cpu.online = std::thread::hardware_concurrency();
 }
 
-void describeMemory(MachineFacts& facts)
+void describeMemory(MemoryFacts& memory)
 {
   MEMORYSTATUSEX status{};
   status.dwLength = sizeof status;
   if (!GlobalMemoryStatusEx(&status)) return;
-  facts.memTotal = status.ullTotalPhys;
-  facts.memFree = status.ullAvailPhys;
+  memory.total = status.ullTotalPhys;
+  memory.free = memory.available = status.ullAvailPhys;
   // The page file's numbers count the memory in.
-  facts.swapTotal = status.ullTotalPageFile - std::min(status.ullTotalPageFile, status.ullTotalPhys);
-  facts.swapFree = status.ullAvailPageFile - std::min(status.ullAvailPageFile, status.ullAvailPhys);
+  memory.swapTotal = status.ullTotalPageFile - std::min(status.ullTotalPageFile, status.ullTotalPhys);
+  memory.swapFree = status.ullAvailPageFile - std::min(status.ullAvailPageFile, status.ullAvailPhys);
+}
+
+uint64_t millisecondsOf(const FILETIME& time)
+{
+  constexpr uint64_t perMillisecond = 10000;
+  return ((uint64_t{time.dwHighDateTime} << 32U) | time.dwLowDateTime) / perMillisecond;
 }
 } // namespace
 
-MachineFacts describeMachine()
+MachineFacts Machine::look()
 {
   constexpr const wchar_t* kVersion = L"SOFTWARE\\Microsoft\\Windows NT\\CurrentVersion";
   MachineFacts facts;
@@ -61,7 +67,22 @@ MachineFacts describeMachine()
   facts.osRelease = registryText(kVersion, L"CurrentVersion");
   facts.osVersion = registryText(kVersion, L"CurrentBuildNumber");
   describeProcessors(facts.cpu);
-  describeMemory(facts);
+  describeMemory(facts.memory);
+  facts.load.uptime = GetTickCount64() / 1000;
+  FILETIME idle{};
+  FILETIME kernel{}; // with the idle time
+  FILETIME user{};
+  if (GetSystemTimes(&idle, &kernel, &user))
+  {
+    facts.cpu.idleTime = millisecondsOf(idle);
+    facts.cpu.userTime = millisecondsOf(user);
+    facts.cpu.systemTime = millisecondsOf(kernel) - std::min(millisecondsOf(kernel), millisecondsOf(idle));
+    const uint64_t busy = *facts.cpu.userTime + *facts.cpu.systemTime;
+    const uint64_t whole = busy + *facts.cpu.idleTime;
+    if (busy >= busy_ && whole > whole_) facts.cpu.usage = (busy - busy_) * 100 / (whole - whole_);
+    busy_ = busy;
+    whole_ = whole;
+  }
   return facts;
 }
 } // namespace tav::host

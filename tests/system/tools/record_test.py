@@ -59,6 +59,13 @@ class Record(ToolTest):
         self.assertEqual(result.status, 0, result.err)
         self.assertEqual(sorted(file.name for file in self.folder.iterdir()), ["r-1.tav", "r-2.tav", "r-3.tav"])
 
+    def test_the_last_files_are_kept(self):
+        path = self.folder / "r-%n.tav"
+        for _ in range(2):
+            result = tav("snapshot", "--append", "--rotate", "1", "--keep", "2", "--every", "1ms", "--count", "4", "-o", path)
+            self.assertEqual(result.status, 0, result.err)
+        self.assertEqual(sorted(file.name for file in self.folder.iterdir()), ["r-7.tav", "r-8.tav"])
+
     def test_what_cannot_be_gone_on_with_stays_as_it_is(self):
         path = self.folder / "x.tav"
         for content in (b"no stream at all, but long enough", bytes(100)):
@@ -83,6 +90,9 @@ class Record(ToolTest):
                               (["--append", "--count", "5", "-o", path], "--count needs --every"),
                               (["--append", "--every", "1s", "--count", "0", "-o", path], "a number above 0"),
                               (["--append", "--rotate", "5K", "-o", path], "needs a FILE with %n"),
+                              (["--append", "--keep", "5", "-o", path], "--keep needs --rotate"),
+                              (["--keep", "5", "-o", path], "--keep needs --append"),
+                              (["--append", "--rotate", "1", "--keep", "0", "-o", self.folder / "%n"], "a number above 0"),
                               (["--append", "--every", "5", "-o", path], "'5' is no time"),
                               (["--append", "--every", "0s", "-o", path], "'0s' is no time")):
             with self.subTest(options=options):

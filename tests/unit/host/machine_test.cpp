@@ -19,10 +19,10 @@ TEST(Machine, TellsItsSystemAndItsProcessors)
 TEST(Machine, HasNoMoreFreeMemoryThanMemory)
 {
   const MachineFacts facts = describeMachine();
-  ASSERT_TRUE(facts.memTotal.has_value());
-  ASSERT_TRUE(facts.memFree.has_value());
-  EXPECT_GT(*facts.memTotal, 1U << 20U) << "in bytes";
-  EXPECT_LE(*facts.memFree, *facts.memTotal);
+  ASSERT_TRUE(facts.memory.total.has_value());
+  ASSERT_TRUE(facts.memory.free.has_value());
+  EXPECT_GT(*facts.memory.total, 1U << 20U) << "in bytes";
+  EXPECT_LE(*facts.memory.free, *facts.memory.total);
 }
 
 TEST(PathOfAText, IsThatTextAgain)
