@@ -389,7 +389,7 @@ const Registration registration{{
     .examples = {{"tav get x.tav /system/host/hostName", "one value"},
                  {"tav get x.tav --all --paths //hostName", "every host name in the file, with its path"},
                  {"tav get x.tav --all '//host[cpu/cpuOnline > 4]/hostName'", "those with many processors"},
-                 {"tav get x.tav --raw '/system/host[2]/#60123' > bytes", "the bytes of a value"},},
+                 {"tav get x.tav --raw '/system/host[2]/#60123' > bytes", "the bytes of a value"}},
     .run = run,
 }};
 

@@ -55,7 +55,8 @@ public:
   {
     if (!text.empty())
     {
-      std::replace_if(text.begin(), text.end(), [](char letter) { return (letter & 0x80) != 0; }, '?');
+      std::replace_if(
+          text.begin(), text.end(), [](char letter) { return (letter & 0x80) != 0; }, '?');
       add(elm, TAV_TYPE_ASCII_STRING, text.data(), text.size());
     }
   }
@@ -291,7 +292,8 @@ int run(const Invocation& invocation)
   host::Machine machine;
   if (invocation.has("--append"))
   {
-    return appendSnapshots(invocation, form, [&](const auto& take) { take(nodesOf(makeSnapshot(machine, form), form)); });
+    return appendSnapshots(invocation, form,
+                           [&](const auto& take) { take(nodesOf(makeSnapshot(machine, form), form)); });
   }
   refuseSeries(invocation);
   Output out(invocation.text("--output", "-"), invocation.has("--force"));

@@ -1,6 +1,6 @@
 /// @file snapshotNames.h
-/// Elements of snapshots that the dictionary has no name for. packaging/snapshot-names.json names them, with kinds, units
-/// and texts; ids stay what they are, since streams have them.
+/// Elements of snapshots that the dictionary has no name for. packaging/snapshot-names.json names them, with kinds,
+/// units and texts; ids stay what they are, since streams have them.
 #pragma once
 
 #include <cstdint>

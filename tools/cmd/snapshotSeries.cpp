@@ -121,7 +121,8 @@ int appendSnapshots(const Invocation& invocation, const SnapshotForm& form, cons
   try
   {
     Recorder recorder(host::pathOf(series.path),
-                      {.maxBytes = series.rotate, .keep = series.keep, .syncEvery = std::chrono::nanoseconds(0)}, form.stream);
+                      {.maxBytes = series.rotate, .keep = series.keep, .syncEvery = std::chrono::nanoseconds(0)},
+                      form.stream);
     auto next = std::chrono::steady_clock::now();
     for (uint64_t made = 0; series.count == 0 || made < series.count; ++made)
     {

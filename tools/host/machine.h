@@ -19,7 +19,7 @@ struct CpuFacts
   Fact speed{};          ///< MHz, of the first one
   Fact coresPerSocket{}; ///< of the first one
   Fact threadsPerCore{};
-  Fact usage{}; ///< percent of all together since the last look, at the first one since the system was started
+  Fact usage{};    ///< percent of all together since the last look, at the first one since the system was started
   Fact userTime{}; ///< all times in milliseconds, of all together since the system was started
   Fact niceTime{};
   Fact systemTime{};

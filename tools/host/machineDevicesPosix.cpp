@@ -23,8 +23,9 @@ std::string unescaped(std::string_view word)
   for (size_t i = 0; i < word.size(); ++i)
   {
     unsigned octal = 0;
-    const bool isEscape = word[i] == '\\' && i + 3 < word.size() &&
-                          std::from_chars(word.data() + i + 1, word.data() + i + 4, octal, 8).ptr == word.data() + i + 4;
+    const bool isEscape =
+        word[i] == '\\' && i + 3 < word.size() &&
+        std::from_chars(word.data() + i + 1, word.data() + i + 4, octal, 8).ptr == word.data() + i + 4;
     text += isEscape ? static_cast<char>(octal) : word[i];
     i += isEscape ? 3 : 0;
   }

@@ -104,7 +104,8 @@ MachineFacts Machine::look()
     const auto tick = static_cast<uint64_t>(std::max(1L, ::sysconf(_SC_CLK_TCK)));
     const auto next = [&] { return times(words.number(), 1000 / tick); };
     CpuFacts& cpu = facts.cpu;
-    for (Fact* const time : {&cpu.userTime, &cpu.niceTime, &cpu.systemTime, &cpu.idleTime, &cpu.waitTime}) *time = next();
+    for (Fact* const time : {&cpu.userTime, &cpu.niceTime, &cpu.systemTime, &cpu.idleTime, &cpu.waitTime})
+      *time = next();
     cpu.interruptTime = next().value_or(0) + next().value_or(0);
     cpu.stolenTime = next();
     const uint64_t idle = cpu.idleTime.value_or(0) + cpu.waitTime.value_or(0);
