@@ -86,6 +86,12 @@ def bytes_of_hex(text):
     return bytes(made)
 
 
+def nodes_of(path, *options):
+    """Types of all nodes but those that only end a group, in stream order, as the JSON has them."""
+    lines = (json.loads(line) for line in tav("json", path, "--lines", *options).out.splitlines())
+    return [line["type"] for line in lines if line.get("id", 65001) not in (65000, 65001)]
+
+
 class ToolTest(unittest.TestCase):
     def _formatMessage(self, msg, standardMsg):
         """What a failure says. Outputs of megabytes are cut: nobody reads them, and logs have limits."""
