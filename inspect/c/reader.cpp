@@ -133,7 +133,10 @@ uint32_t search(tav_reader& reader, const tav_node* from, const char* path, Visi
   {
     isFound = true;
     tav_node node{};
-    give(reader, PlacedNode{matches->found().header, matches->parent(), matches->form()}, nullptr, node);
+    // The search begins at the node, whose parent it does not see.
+    const bool isStart = from != nullptr && matches->found().offset() == start.header.nodeOffset;
+    const TAVHeader parent = isStart ? start.parent : matches->parent();
+    give(reader, PlacedNode{matches->found().header, parent, matches->form()}, nullptr, node);
     if (!visit(node))
     {
       break;

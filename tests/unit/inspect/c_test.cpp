@@ -1,5 +1,6 @@
 #include <cstring>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include <gmock/gmock.h>
@@ -245,6 +246,48 @@ TEST(C, FindsEachUntilItIsStopped)
   EXPECT_EQ(elements.size(), 3U);
   EXPECT_EQ(tav_find_each(reader.get(), nullptr, "/system/#1", visit, &elements), TAV_RC_NOT_FOUND);
   EXPECT_THAT(tav_last_message(reader.get()), StrEq(""));
+}
+
+TEST(C, StepsOnFromANodeThatAPathOfDotsLeadsTo)
+{
+  CWriter made(&kNative);
+  ASSERT_EQ(tav_begin(made.writer, TAV_ELM_CMN_SYSTEM, 0), TAV_RC_OK);
+  ASSERT_EQ(tav_begin(made.writer, TAV_ELM_CMN_HOST, 0), TAV_RC_OK);
+  ASSERT_EQ(tav_add_text(made.writer, TAV_ELM_CMN_HOST_NAME, "ada", 3), TAV_RC_OK);
+  ASSERT_EQ(tav_end(made.writer), TAV_RC_OK);
+  ASSERT_EQ(tav_add_u32(made.writer, TAV_ELM_CMN_CPU_ONLINE, 8), TAV_RC_OK);
+  ASSERT_EQ(tav_end(made.writer), TAV_RC_OK);
+  const Bytes bytes = made.finish();
+  const test::TemporaryPath path;
+  test::writeFile(path.path, bytes);
+  for (const bool inFile : {false, true})
+  {
+    SCOPED_TRACE(inFile);
+    const CReader reader = inFile ? test::openFile(path.path, &kNative) : openMemory(bytes);
+    ASSERT_NE(reader, nullptr);
+    tav_node host{};
+    tav_node name{};
+    ASSERT_EQ(tav_find(reader.get(), nullptr, "/system/host", &host), TAV_RC_OK);
+    ASSERT_EQ(tav_find(reader.get(), &host, "hostName", &name), TAV_RC_OK);
+    const std::vector<std::pair<const tav_node*, const char*>> ways = {
+        {&host, "."}, {&name, ".."}, {&name, "../."}, {&name, "../../host"}, {&host, "/system/host"}};
+    for (const auto& [from, way] : ways)
+    {
+      SCOPED_TRACE(way);
+      tav_node found{};
+      tav_node next{};
+      ASSERT_EQ(tav_find(reader.get(), from, way, &found), TAV_RC_OK);
+      EXPECT_EQ(found.offset, host.offset);
+      EXPECT_EQ(tav_next_sibling(reader.get(), &found, &next), TAV_RC_OK);
+      EXPECT_EQ(next.elm, TAV_ELM_CMN_CPU_ONLINE);
+    }
+    tav_node root{};
+    tav_node next{};
+    ASSERT_EQ(tav_find(reader.get(), &name, "../..", &root), TAV_RC_OK);
+    EXPECT_EQ(root.offset, 0U);
+    EXPECT_EQ(tav_next_sibling(reader.get(), &root, &next), TAV_RC_NO_MORE_CHILDREN);
+    EXPECT_EQ(tav_next_root(reader.get(), &root, &next), TAV_RC_NO_MORE_CHILDREN);
+  }
 }
 
 TEST(C, TellsOfDamageWithOffsetAndPath)
