@@ -1,5 +1,6 @@
 // The completions for shells that are made from the table of options.
 #include "tools/shell/options.h"
+#include "tools/shell/pathCompletion.h"
 
 namespace tav::tool
 {
@@ -75,7 +76,13 @@ std::string bash()
     text += "      " + command->name + ") COMPREPLY=($(compgen -W '" + joined(names, " ") + "' -- \"$word\")) ;;\n";
   }
   return text +
-         "    esac\n    return\n  fi\n  COMPREPLY=($(compgen -f -- \"$word\"))\n}\ncomplete -o filenames -F _tav tav\n";
+         "    esac\n    return\n  fi\n"
+         "  local found step\n"
+         "  if found=$(\"${COMP_WORDS[0]}\" complete-words bash \"${COMP_WORDS[@]:1:COMP_CWORD}\" 2>/dev/null); then\n"
+         "    compopt -o nospace +o filenames 2>/dev/null\n"
+         "    while IFS= read -r step; do [[ -z $step ]] || COMPREPLY+=(\"$step\"); done <<<\"$found\"\n"
+         "    return\n  fi\n"
+         "  COMPREPLY=($(compgen -f -- \"$word\"))\n}\ncomplete -o filenames -F _tav tav\n";
 }
 
 bool isFile(const OptionSpec& option)
@@ -100,6 +107,7 @@ std::string zshOption(const OptionSpec& option)
       spec += ":" + option.value + ":";
       spec += isFile(option)                     ? "_files"
               : option.kind == ValueKind::choice ? "(" + joined(option.choices, " ") + ")"
+              : isPathValue(option.value)        ? "_tav_path"
                                                  : "";
     }
     text += " \\\n        " + inQuotes(spec);
@@ -109,7 +117,12 @@ std::string zshOption(const OptionSpec& option)
 
 std::string zsh()
 {
-  std::string text = "#compdef tav\n_tav()\n{\n  local -a commands\n  commands=(\n";
+  std::string text = "#compdef tav\n"
+                     "_tav_path()\n{\n  local found\n"
+                     "  if found=$($tav complete-words zsh \"${(@Q)words[1,CURRENT]}\" 2>/dev/null); then\n"
+                     "    [[ -z $found ]] || compadd -S '' -- \"${(@f)found}\"\n"
+                     "  else\n    _files\n  fi\n}\n"
+                     "_tav()\n{\n  local tav=$words[1]\n  local -a commands\n  commands=(\n";
   for (const Command* command : commands())
   {
     text += "    " + inQuotes(command->name + ":" + command->summary) + "\n";
@@ -122,7 +135,7 @@ std::string zsh()
     {
       text += zshOption(option);
     }
-    text += " \\\n        '*:file:_files'\n      ;;\n";
+    text += " \\\n        '*:file:_tav_path'\n      ;;\n";
   }
   return text + "  esac\n}\n_tav \"$@\"\n";
 }
@@ -138,16 +151,25 @@ std::string fishOption(const std::string& condition, const OptionSpec& option)
   {
     text += isFile(option) ? " -r -F" : " -x";
     text += option.kind == ValueKind::choice ? " -a " + inQuotes(joined(option.choices, " ")) : "";
+    text += isPathValue(option.value) ? " -a '(__tav_path)'" : "";
   }
   return text + " -d " + inQuotes(option.help) + "\n";
 }
 
 std::string fish()
 {
-  std::string text = "# fish completion for tav\n";
+  std::string text = "# fish completion for tav\n"
+                     "function __tav_path\n"
+                     "  set -l words (commandline -opc) (commandline -ct)\n"
+                     "  $words[1] complete-words fish $words[2..-1] 2>/dev/null\nend\n";
   for (const Command* command : commands())
   {
     text += "complete -c tav -n __fish_use_subcommand -a " + command->name + " -d " + inQuotes(command->summary) + "\n";
+    if (command->arguments.find("PATH") != std::string::npos)
+    {
+      text += "complete -c tav -n '__fish_seen_subcommand_from " + command->name +
+              "; and __tav_path >/dev/null' -f -a '(__tav_path)'\n";
+    }
     for (const OptionSpec& option : allOptions(*command))
     {
       text += fishOption("__fish_seen_subcommand_from " + command->name, option);

@@ -8,6 +8,7 @@
 #include "tools/shell/hints.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
+#include "tools/shell/pathCompletion.h"
 #include "tools/shell/report.h"
 #include "tools/shell/trace.h"
 
@@ -72,6 +73,10 @@ int dispatch(const std::vector<std::string>& words)
   if (first == "--version")
   {
     return printText("tav " TAV_VERSION "\n");
+  }
+  if (first == "complete-words")
+  {
+    return completeWords({words.begin() + 1, words.end()});
   }
   if (first == "-h" || first == "--help")
   {

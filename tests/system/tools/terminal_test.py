@@ -230,7 +230,8 @@ class Interrupt(TerminalTest):
         self.assertEqual([(entry.name, entry.read_bytes()) for entry in target.iterdir()], [("saved", b"precious")])
 
 
-class Completion(ToolTest):
+@unittest.skipIf(EMULATOR, "the shells start the program themselves")
+class Completion(TerminalTest):
     """The shells complete by themselves: bash by its function, zsh on a terminal, fish by its own command."""
 
     def script(self, shell):
@@ -264,6 +265,81 @@ class Completion(ToolTest):
                              ("tav tree --byte-order sw", "tav tree --byte-order swapped ")):
             self.assertEqual(self.completed_by_zsh(line), wanted)
 
+    def paths_stream(self):
+        """A stream with steps to offer, and a folder in which it is called x.tav."""
+        document = {"system": {"host": [{"hostName": "ada"}, {"cpu": {"cpuOnline": 8}}], "#40001": 7, "#40002": 8}}
+        path = self.folder / "x.tav"
+        self.assertEqual(tav("build", "-o", path, stdin=json.dumps(document).encode()).status, 0)
+        (self.folder / "x.tav.names.json").write_text('{"40001": {"tag": "queueDepth"}}')
+        return path
+
+    @unittest.skipUnless(shutil.which("bash"), "bash is not installed")
+    def test_bash_offers_the_steps_of_a_path(self):
+        script, path = self.script("bash"), self.paths_stream()
+        for line, wanted in ((["get", path, "/sys"], ["/system"]),
+                             (["get", path, "/system/"], ["/system/host", "/system/queueDepth", "/system/#40002"]),
+                             (["get", f"'{path}'", "'/system/ho"], ["/system/host"]),
+                             (["get", "--all", path, "/system/host/"], ["/system/host/hostName", "/system/host/cpu"]),
+                             (["hex", path, "--path", "//cpuO"], ["//cpuOnline"]), (["get", path, "/system/x"], []),
+                             (["get", path, self.folder / "x.t"], []), (["get", self.folder / "x.tav.n"], [path.name + ".names.json"])):
+            words = " ".join(f'"{word}"' for word in [TAV[0], *line])
+            done = subprocess.run(["bash", "-c", f". '{script}'; COMP_WORDS=({words}); COMP_CWORD={len(line)}; _tav; "
+                                                 "printf '%s\\n' \"${COMPREPLY[@]}\""], capture_output=True, timeout=PATIENCE)
+            offered = [os.path.basename(word) if word.startswith(str(self.folder)) else word
+                       for word in done.stdout.decode().split()]
+            self.assertEqual((offered, done.stderr), (wanted, b""), line)
+
+    @unittest.skipUnless(shutil.which("fish"), "fish is not installed")
+    def test_fish_offers_the_steps_of_a_path(self):
+        script, path = self.script("fish"), self.paths_stream()
+        for line, wanted in (("get x.tav /sys", ["/system"]), ("set x.tav /system/queueDepth 9 /system/q", ["/system/queueDepth"]),
+                             ("get x.tav /system/host/", ["/system/host/hostName", "/system/host/cpu"]),
+                             ("diff x.tav --path-a /system/h", ["/system/host"])):
+            done = subprocess.run(["fish", "--no-config", "-c", f"source '{script}'; complete -C 'tav {line}'"],
+                                  capture_output=True, timeout=PATIENCE, cwd=self.folder,
+                                  env={**os.environ, "HOME": str(self.folder), "PATH": self.path_of_program()})
+            offered = [row.split("\t")[0] for row in done.stdout.decode().splitlines()]
+            self.assertEqual((sorted(offered), done.stderr), (sorted(wanted), b""), line)
+
+    @unittest.skipUnless(shutil.which("zsh") and pty is not None, "zsh is not installed")
+    def test_zsh_offers_the_steps_of_a_path(self):
+        self.script("zsh")
+        path = self.paths_stream()
+        for line, wanted in ((f"get {path} /sys", "/system"), (f"get {path} /system/q", "/system/queueDepth"),
+                             (f"hex {path} --path //cpuO", "//cpuOnline")):
+            self.assertEqual(self.completed_by_zsh(f"tav {line}"), f"tav {line[:line.rindex(' ')]} {wanted}")
+
+    def test_completion_tells_nothing_and_waits_for_nothing(self):
+        path = self.paths_stream()
+        offered = tav("complete-words", "fish", "get", path, "/system/")
+        self.assertEqual((offered.status, offered.err), (0, ""))
+        self.assertEqual(offered.out.split(), ["/system/host", "/system/queueDepth", "/system/#40002"])
+        for line, status in ((["get", path, "/sys["], 0), (["get", path, "/nothing/"], 0), (["get", path, "/sys]/"], 0),
+                             (["get", "-", "/"], 0), (["get", "/dev/zero", "/"], 0), (["get", self.folder, "/"], 0),
+                             (["get", "none", "/"], 0), (["get", path], 1), (["set", path, "/system", "/sys"], 1),
+                             (["tree", path, "/sys"], 1), (["nothing", path, "/sys"], 1), (["get"], 1), ([], 1),
+                             (["get", path, "--dictionary", "none", "/sys"], 0), (["get", path, "--no-such", "/nothing"], 0)):
+            result = tav("complete-words", "fish", *line)
+            self.assertEqual((result.status, result.out, result.err), (status, "", ""), line)
+        began = time.monotonic()
+        self.assertEqual(tav("complete-words", "fish", "get", self.long_stream(), "/").status, 0)
+        self.assertLess(time.monotonic() - began, 60)
+
+    def test_of_a_large_file_the_begin_is_looked_at(self):
+        path = self.folder / "many.tav"
+        number, last = (struct.pack("<QIHH", 8, 0, 57, element) + bytes(8) for element in (60111, 60112))
+        content = number * 400_000 + last
+        path.write_bytes(struct.pack("<QIHH", len(content), 0, 2, 60100) + content)
+        self.assertEqual(tav("complete-words", "fish", "get", path, "/system/").out, "/system/cpuOnline\n")
+
+    def path_of_program(self):
+        """Where the shells find the program under its own name."""
+        place = self.folder / "bin"
+        place.mkdir(exist_ok=True)
+        if not (place / "tav").exists():
+            (place / "tav").symlink_to(TAV[0])
+        return f"{place}:{os.environ['PATH']}"
+
     def completed_by_zsh(self, line):
         """The line as it is after the tab key, which the shell writes to a file."""
         answer = self.folder / "answer"
@@ -274,7 +350,8 @@ class Completion(ToolTest):
         answer.unlink(missing_ok=True)
         ours, theirs = pty.openpty()
         with subprocess.Popen(["zsh", "-i"], stdin=theirs, stdout=theirs, stderr=theirs, start_new_session=True,
-                              env={**os.environ, "ZDOTDIR": str(self.folder), "HOME": str(self.folder), "TERM": "xterm"}) as run:
+                              env={**os.environ, "ZDOTDIR": str(self.folder), "HOME": str(self.folder), "TERM": "xterm",
+                                   "PATH": self.path_of_program()}) as run:
             os.close(theirs)
             try:
                 os.write(ours, (line + "\t\x18").encode())
