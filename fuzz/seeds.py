@@ -81,6 +81,8 @@ def main(tool, target):
             made, swapped, aligned = vector(path)
             inputs += seeds_of(path.stem, made, swapped, aligned)
             inputs += (("build", text) for text in documents(tool, made, pathlib.Path(folder)))
+    own = b'{"40001": {"tag": "queueDepth", "kind": "gauge", "unit": "1", "text": "jobs that wait"}, "40002": {"tag": "a"}}'
+    inputs += (("dictionary", bytes((len(own),)) + own + other) for other in (own, own[:50], b'{"40001": {"tag": "b"}}'))
     inputs.append(("build", b'\x00{"system": {"host": {"hostName": "ada", "cpuOnline": 8}}}'))
     for number, (name, made) in enumerate(inputs):
         place = pathlib.Path(target) / name
