@@ -2,7 +2,8 @@
 # Brings the sources into the project's form, or says where they are not in it.
 #   format.sh             rewrites what needs it
 #   format.sh --check     fails when something does
-# Line breaks are the author's (see .clang-format); only a line of more than 120 columns is broken by the tool.
+# Line breaks are the author's (see .clang-format); only a line of more than 120 columns is broken by the tool. What a
+# condition guards is in braces on lines of its own, which the author has to see to.
 set -euo pipefail
 export LC_ALL=C.UTF-8
 cd "$(dirname "${BASH_SOURCE[0]}")/.."
@@ -16,6 +17,12 @@ sources()
 long_lines()
 {
   sources | xargs -0 grep -nHE '^.{121,}' | cut -d: -f1,2 || true
+}
+
+# FILE:LINE of each condition with what it guards on its line.
+guarded_on_the_line()
+{
+  sources | xargs -0 grep -nHE '^ *(else )?if (constexpr )?\(.*\) [^/{]*;( *//.*)?$|^ *else [^i{].*;$' | cut -d: -f1,2 || true
 }
 
 wrap()
@@ -49,6 +56,11 @@ case ${1:-} in
     ;;
 esac
 
+mapfile -t guarded < <(guarded_on_the_line)
+if ((${#guarded[@]} > 0)); then
+  printf '%s: what a condition guards belongs on lines of its own, in braces\n' "${guarded[@]}"
+  exit 1
+fi
 mapfile -t long < <(long_lines)
 if ((${#long[@]} > 0)); then
   printf '%s: longer than 120 columns\n' "${long[@]}"

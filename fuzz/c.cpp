@@ -15,7 +15,10 @@ namespace
 
 void demand(bool holds, const char* what)
 {
-  if (!holds) throw std::runtime_error(what);
+  if (!holds)
+  {
+    throw std::runtime_error(what);
+  }
 }
 
 /// Failures are codes of the library.
@@ -51,7 +54,10 @@ public:
   void tampered(fuzz::Input& input)
   {
     tav_node node{};
-    if (accept(tav_next_root(reader_, nullptr, &node)) != TAV_RC_OK) return;
+    if (accept(tav_next_root(reader_, nullptr, &node)) != TAV_RC_OK)
+    {
+      return;
+    }
     const uint64_t owner = node.reserved[3];
     auto* const bytes = reinterpret_cast<uint8_t*>(&node);
     for (int i = 0; i < 8; ++i) bytes[input.byte() % sizeof node] = input.byte();
@@ -68,12 +74,18 @@ private:
   void walk(const tav_node& group, unsigned depth)
   {
     look(group);
-    if (depth == 100) return;
+    if (depth == 100)
+    {
+      return;
+    }
     tav_node child{};
     for (uint32_t rc = accept(tav_first_child(reader_, &group, &child)); rc == TAV_RC_OK;
          rc = accept(tav_next_sibling(reader_, &child, &child)))
     {
-      if (++steps_ > 20 * most_) return; // levels of groups can overlap
+      if (++steps_ > 20 * most_)
+      {
+        return; // levels of groups can overlap
+      }
       walk(child, depth + 1);
     }
     static_cast<void>(std::strlen(tav_last_message(reader_)));
@@ -91,11 +103,20 @@ private:
     accept(tav_get_i64(reader_, &node, &whole));
     accept(tav_get_u128(reader_, &node, &number, &low));
     accept(tav_get_time(reader_, &node, &whole));
-    if (accept(tav_get_text(reader_, &node, &text, &size)) == TAV_RC_OK) touch(text, size);
-    if (accept(tav_get_bytes(reader_, &node, &data, &size)) == TAV_RC_OK) touch(data, size);
+    if (accept(tav_get_text(reader_, &node, &text, &size)) == TAV_RC_OK)
+    {
+      touch(text, size);
+    }
+    if (accept(tav_get_bytes(reader_, &node, &data, &size)) == TAV_RC_OK)
+    {
+      touch(data, size);
+    }
     uint8_t part[16];
     size = sizeof part;
-    if (accept(tav_read(reader_, &node, number, part, &size)) == TAV_RC_OK) touch(part, size);
+    if (accept(tav_read(reader_, &node, number, part, &size)) == TAV_RC_OK)
+    {
+      touch(part, size);
+    }
     static_cast<void>(tav_tag(node.elm));
   }
 
@@ -132,7 +153,10 @@ private:
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
 {
-  if (size > fuzz::kLargest) return 0;
+  if (size > fuzz::kLargest)
+  {
+    return 0;
+  }
   fuzz::Input input(data, size);
   const uint8_t choice = input.byte();
   const std::string path = input.text(24);

@@ -30,7 +30,10 @@ const tav::tool::Command& commandOf(std::string_view name)
 {
   for (const tav::tool::Command* command : tav::tool::commands())
   {
-    if (command->name == name) return *command;
+    if (command->name == name)
+    {
+      return *command;
+    }
   }
   throw std::logic_error("no command " + std::string(name));
 }
@@ -40,7 +43,10 @@ const tav::tool::Command& commandOf(std::string_view name)
 std::vector<Option> formOptions(uint8_t flags)
 {
   std::vector<Option> options;
-  if ((flags & 0x80U) == 0) return options; // recognised from the bytes
+  if ((flags & 0x80U) == 0)
+  {
+    return options; // recognised from the bytes
+  }
   options.push_back({"--byte-order", (flags & 1U) != 0 ? "swapped" : "native"});
   options.push_back({(flags & 2U) != 0 ? "--align" : "--no-align"});
   options.push_back({"--root", (flags & 4U) != 0 ? "32" : "64"});
@@ -55,13 +61,19 @@ std::vector<Option> with(std::vector<Option> options, std::initializer_list<Opti
 
 void demand(bool holds, const std::string& what)
 {
-  if (!holds) throw std::runtime_error(what);
+  if (!holds)
+  {
+    throw std::runtime_error(what);
+  }
 }
 
 Folder::Folder()
 {
   std::string pattern = (place() / "tav-fuzz-XXXXXX").string();
-  if (mkdtemp(pattern.data()) == nullptr) throw std::runtime_error("no folder " + pattern);
+  if (mkdtemp(pattern.data()) == nullptr)
+  {
+    throw std::runtime_error("no folder " + pattern);
+  }
   path_ = pattern;
 }
 
@@ -82,14 +94,20 @@ std::string Folder::put(std::string_view name, std::span<const uint8_t> bytes) c
   std::ofstream out(file, std::ios::binary | std::ios::trunc);
   out.write(reinterpret_cast<const char*>(bytes.data()), static_cast<std::streamsize>(bytes.size()));
   out.close();
-  if (!out) throw std::runtime_error("cannot write " + file);
+  if (!out)
+  {
+    throw std::runtime_error("cannot write " + file);
+  }
   return file;
 }
 
 test::Bytes Folder::get(std::string_view name) const
 {
   std::ifstream file(path(name), std::ios::binary);
-  if (!file) throw std::runtime_error("missing: " + std::string(name));
+  if (!file)
+  {
+    throw std::runtime_error("missing: " + std::string(name));
+  }
   return {std::istreambuf_iterator<char>(file), std::istreambuf_iterator<char>()};
 }
 

@@ -17,11 +17,17 @@ namespace fs = std::filesystem;
 
 std::vector<fs::path> filesOf(const fs::path& path)
 {
-  if (!fs::is_directory(path)) return {path};
+  if (!fs::is_directory(path))
+  {
+    return {path};
+  }
   std::vector<fs::path> files;
   for (const auto& entry : fs::directory_iterator(path))
   {
-    if (entry.is_regular_file()) files.push_back(entry.path());
+    if (entry.is_regular_file())
+    {
+      files.push_back(entry.path());
+    }
   }
   std::sort(files.begin(), files.end());
   return files;
@@ -30,7 +36,10 @@ std::vector<fs::path> filesOf(const fs::path& path)
 void runFile(const fs::path& path)
 {
   std::ifstream file(path, std::ios::binary);
-  if (!file) throw std::runtime_error("cannot be read: " + path.string());
+  if (!file)
+  {
+    throw std::runtime_error("cannot be read: " + path.string());
+  }
   const std::vector<uint8_t> content{std::istreambuf_iterator<char>(file), std::istreambuf_iterator<char>()};
   // A block of exactly its size, so that a step behind its end is seen.
   const auto exact = std::make_unique<uint8_t[]>(content.size());

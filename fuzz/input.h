@@ -27,7 +27,10 @@ public:
 
   uint8_t byte()
   {
-    if (bytes_.empty()) return 0;
+    if (bytes_.empty())
+    {
+      return 0;
+    }
     const uint8_t first = bytes_.front();
     bytes_ = bytes_.subspan(1);
     return first;

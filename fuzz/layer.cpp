@@ -15,7 +15,10 @@ namespace
 
 void demand(bool holds, const char* what)
 {
-  if (!holds) throw std::runtime_error(what);
+  if (!holds)
+  {
+    throw std::runtime_error(what);
+  }
 }
 
 /// Failures are codes of the library.
@@ -35,7 +38,10 @@ public:
     std::error_code ec;
     const tav::Node root = reader_.root(ec);
     accept(ec);
-    if (ec) return;
+    if (ec)
+    {
+      return;
+    }
     uint64_t visits = 0;
     for (const tav::Node& node : root.descendants(ec, tav::EndElements::show))
     {
@@ -58,7 +64,10 @@ private:
     const T one = node.as<T>(ec);
     accept(ec);
     const tav::OwnedNode owned = node.copy(ec);
-    if (ec) return;
+    if (ec)
+    {
+      return;
+    }
     const T other = owned.as<T>(ec);
     accept(ec);
     demand(ec || same(one, other), "a copied node has another value");
@@ -121,7 +130,10 @@ private:
     {
       const tav::Node node = reader_.at(offset, width, ec);
       accept(ec);
-      if (!ec) look(node);
+      if (!ec)
+      {
+        look(node);
+      }
     }
   }
 
@@ -162,12 +174,21 @@ void update(const test::Form& form, std::span<std::byte> block, uint64_t offset)
 {
   std::error_code ec;
   const tav::Reader reader(std::span<const std::byte>(block), optionsOf(form), ec);
-  if (ec) return;
+  if (ec)
+  {
+    return;
+  }
   const tav::Node node = reader.at(offset, tav::Width::bits64, ec);
-  if (ec) return;
+  if (ec)
+  {
+    return;
+  }
   tav::Updater updater(block, optionsOf(form), ec);
   accept(ec);
-  if (ec) return;
+  if (ec)
+  {
+    return;
+  }
   updater.update(node, uint32_t{7}, ec);
   accept(ec);
   updater.update(node, std::string_view("abc"), ec);
@@ -190,9 +211,15 @@ void read(fuzz::Input& input, const test::Form& form)
     const tav::Reader reader = form.buffered ? tav::Reader(storage, optionsOf(form), ec)
                                              : tav::Reader(std::span<const std::byte>(block), optionsOf(form), ec);
     accept(ec);
-    if (!ec) Looker(reader, stream.size()).everything(path, offset);
+    if (!ec)
+    {
+      Looker(reader, stream.size()).everything(path, offset);
+    }
   }
-  if (!block.empty()) update(form, block, offset);
+  if (!block.empty())
+  {
+    update(form, block, offset);
+  }
 }
 
 /// What was added last at each depth, and what has to be read back.
@@ -225,7 +252,10 @@ private:
     std::error_code ec;
     if (groups_.empty())
     {
-      if (added != 0) return; // one root
+      if (added != 0)
+      {
+        return; // one root
+      }
       groups_.push_back({writer_.group(TAV_ELM_CMN_SYSTEM, groupOptions(choice, true), ec), 0});
       accept(ec);
       added += ec ? 0 : 1;
@@ -238,7 +268,10 @@ private:
     switch (choice % 9U)
     {
     case 0:
-      if (groups_.size() == 40) return;
+      if (groups_.size() == 40)
+      {
+        return;
+      }
       groups_.push_back({top.group(elm, options, ec), added});
       break;
     case 1: top.add(elm, uint32_t(size), ec); break;
@@ -252,7 +285,10 @@ private:
       groups_.pop_back();
       return;
     case 7:
-      if (groups_.size() < 2) return;
+      if (groups_.size() < 2)
+      {
+        return;
+      }
       top.abandon(ec);
       accept(ec);
       added = ec ? added : groups_.back().before;
@@ -287,7 +323,10 @@ void write(fuzz::Input& input, test::Form form)
     std::error_code ec;
     tav::Writer writer = form.buffered ? tav::Writer(storage, optionsOf(form), ec) : tav::Writer(optionsOf(form), ec);
     accept(ec);
-    if (ec) return;
+    if (ec)
+    {
+      return;
+    }
     Adder adder(writer, input);
     adder.run(300);
     added = adder.added;
@@ -299,7 +338,10 @@ void write(fuzz::Input& input, test::Form form)
       made = storage.bytes;
     made.resize(writer.size()); // the padding of the last node is not written
   }
-  if (added == 0) return;
+  if (added == 0)
+  {
+    return;
+  }
   const tav::Reader reader(std::as_bytes(std::span(made)), optionsOf(form));
   std::error_code ec;
   uint64_t seen = 1;
@@ -317,7 +359,10 @@ void write(fuzz::Input& input, test::Form form)
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
 {
-  if (size > fuzz::kLargest) return 0;
+  if (size > fuzz::kLargest)
+  {
+    return 0;
+  }
   fuzz::Input input(data, size);
   const uint8_t choice = input.byte();
   const test::Form form = fuzz::takeForm(input);

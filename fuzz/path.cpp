@@ -16,7 +16,10 @@ namespace
 
 void demand(bool holds, const char* what)
 {
-  if (!holds) throw std::runtime_error(what);
+  if (!holds)
+  {
+    throw std::runtime_error(what);
+  }
 }
 
 /// The stream in one form, and its readers.
@@ -58,7 +61,10 @@ private:
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
 {
-  if (size > fuzz::kLargest) return 0;
+  if (size > fuzz::kLargest)
+  {
+    return 0;
+  }
   fuzz::Input input(data, size);
   const bool swap = (input.byte() & 1U) != 0;
   const auto rest = input.rest();

@@ -24,14 +24,38 @@ enum Part : uint8_t
 void probe(const Bytes& stream, const Form& form, uint8_t parts, uint64_t seed)
 {
   Prober prober(stream, form, seed);
-  if ((parts & kRead) != 0) prober.readEverywhere();
-  if ((parts & kScan) != 0) prober.scanEverywhere();
-  if ((parts & kIndex) != 0) prober.indexEverywhere();
-  if ((parts & kStep) != 0) prober.stepEverywhere();
-  if (!prober.walk()) return;
-  if ((parts & kSearch) != 0) prober.search();
-  if ((parts & kValidate) != 0) prober.validate();
-  if ((parts & kPrint) != 0) prober.print();
+  if ((parts & kRead) != 0)
+  {
+    prober.readEverywhere();
+  }
+  if ((parts & kScan) != 0)
+  {
+    prober.scanEverywhere();
+  }
+  if ((parts & kIndex) != 0)
+  {
+    prober.indexEverywhere();
+  }
+  if ((parts & kStep) != 0)
+  {
+    prober.stepEverywhere();
+  }
+  if (!prober.walk())
+  {
+    return;
+  }
+  if ((parts & kSearch) != 0)
+  {
+    prober.search();
+  }
+  if ((parts & kValidate) != 0)
+  {
+    prober.validate();
+  }
+  if ((parts & kPrint) != 0)
+  {
+    prober.print();
+  }
 }
 
 void compare(const Bytes& stream, const Form& form, uint64_t seed)
@@ -50,13 +74,19 @@ void compare(const Bytes& stream, const Form& form, uint64_t seed)
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
 {
-  if (size > fuzz::kLargest) return 0;
+  if (size > fuzz::kLargest)
+  {
+    return 0;
+  }
   fuzz::Input input(data, size);
   const Form form = fuzz::takeForm(input);
   const uint8_t parts = input.byte();
   const uint8_t seed = input.byte();
   const Bytes stream = input.copyOfRest();
-  if (stream.empty()) return 0;
+  if (stream.empty())
+  {
+    return 0;
+  }
   if ((parts & kCompare) != 0)
     compare(stream, form, seed);
   else

@@ -10,9 +10,18 @@ using namespace fuzz;
 void thereAndBack(const Folder& folder, const std::string& file, const std::vector<Option>& form, uint8_t style)
 {
   std::vector<Option> options = with(form, {{"--output", folder.path("x.json")}, {"--force"}});
-  if (style % 3U == 1) options.push_back({"--lines"});
-  if (style % 3U == 2) options.push_back({"--compact"});
-  if (style >= 0x80) options.push_back({"--safe"});
+  if (style % 3U == 1)
+  {
+    options.push_back({"--lines"});
+  }
+  if (style % 3U == 2)
+  {
+    options.push_back({"--compact"});
+  }
+  if (style >= 0x80)
+  {
+    options.push_back({"--safe"});
+  }
   const int status = runCommand("json", options, {file});
   demand(status == 0 || status == 1 || status == 3, "json ended with " + std::to_string(status));
   const int built = runCommand("build", {{"--output", folder.path("y.tav")}, {"--force"}}, {folder.path("x.json")});
@@ -33,7 +42,10 @@ void recover(const Folder& folder, const std::string& file, const std::vector<Op
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
 {
   static const Folder folder;
-  if (size > kLargest) return 0;
+  if (size > kLargest)
+  {
+    return 0;
+  }
   Input input(data, size);
   const uint8_t choice = input.byte();
   const std::vector<Option> form = formOptions(input.byte());

@@ -48,22 +48,37 @@ KORHFile::KORHFile()
 
 KORHFile::~KORHFile()
 {
-  if (native_ != kNoFile) close();
+  if (native_ != kNoFile)
+  {
+    close();
+  }
 }
 
 uint32_t KORHFile::open(const KORFileOpenParam* pParam)
 {
   OpenMode mode{};
-  if (!isParam(pParam) || pParam->pPath == nullptr || !resolve(*pParam, mode)) return TAV_RC_BAD_PARAM;
-  if (native_ != kNoFile) return KOR_RC_BUSY;
+  if (!isParam(pParam) || pParam->pPath == nullptr || !resolve(*pParam, mode))
+  {
+    return TAV_RC_BAD_PARAM;
+  }
+  if (native_ != kNoFile)
+  {
+    return KOR_RC_BUSY;
+  }
   return openNative(pParam->pPath, mode, native_);
 }
 
 uint32_t KORHFile::close()
 {
-  if (native_ == kNoFile) return KOR_RC_NOT_OPEN;
+  if (native_ == kNoFile)
+  {
+    return KOR_RC_NOT_OPEN;
+  }
   // Closing would leave the lock to a forked process that shares the open file.
-  if (locked_) unlockNative(native_);
+  if (locked_)
+  {
+    unlockNative(native_);
+  }
   const uint32_t code = closeNative(native_);
   native_ = kNoFile;
   locked_ = false;
@@ -72,10 +87,19 @@ uint32_t KORHFile::close()
 
 uint32_t KORHFile::read(const KORFileReadParam* pParam, void* pBuffer, uint64_t* pDone)
 {
-  if (pDone == nullptr) return TAV_RC_BAD_PARAM;
+  if (pDone == nullptr)
+  {
+    return TAV_RC_BAD_PARAM;
+  }
   *pDone = 0;
-  if (!isParam(pParam) || (pBuffer == nullptr && pParam->length != 0)) return TAV_RC_BAD_PARAM;
-  if (native_ == kNoFile) return KOR_RC_NOT_OPEN;
+  if (!isParam(pParam) || (pBuffer == nullptr && pParam->length != 0))
+  {
+    return TAV_RC_BAD_PARAM;
+  }
+  if (native_ == kNoFile)
+  {
+    return KOR_RC_NOT_OPEN;
+  }
 
   auto* const bytes = static_cast<uint8_t*>(pBuffer);
   while (*pDone < pParam->length)
@@ -85,10 +109,16 @@ uint32_t KORHFile::read(const KORFileReadParam* pParam, void* pBuffer, uint64_t*
     if (code != TAV_RC_OK)
     {
       // What came before the failure is read again by a second attempt.
-      if (*pDone != 0 && moveBack(native_, static_cast<int64_t>(*pDone))) *pDone = 0;
+      if (*pDone != 0 && moveBack(native_, static_cast<int64_t>(*pDone)))
+      {
+        *pDone = 0;
+      }
       return code;
     }
-    if (done == 0) return TAV_RC_END_OF_STORAGE;
+    if (done == 0)
+    {
+      return TAV_RC_END_OF_STORAGE;
+    }
     *pDone += done;
   }
   return TAV_RC_OK;
@@ -96,17 +126,29 @@ uint32_t KORHFile::read(const KORFileReadParam* pParam, void* pBuffer, uint64_t*
 
 uint32_t KORHFile::write(const KORFileWriteParam* pParam, uint64_t* pDone)
 {
-  if (pDone == nullptr) return TAV_RC_BAD_PARAM;
+  if (pDone == nullptr)
+  {
+    return TAV_RC_BAD_PARAM;
+  }
   *pDone = 0;
-  if (!isParam(pParam) || (pParam->pData == nullptr && pParam->length != 0)) return TAV_RC_BAD_PARAM;
-  if (native_ == kNoFile) return KOR_RC_NOT_OPEN;
+  if (!isParam(pParam) || (pParam->pData == nullptr && pParam->length != 0))
+  {
+    return TAV_RC_BAD_PARAM;
+  }
+  if (native_ == kNoFile)
+  {
+    return KOR_RC_NOT_OPEN;
+  }
 
   const auto* const bytes = static_cast<const uint8_t*>(pParam->pData);
   while (*pDone < pParam->length)
   {
     std::size_t done = 0;
     const uint32_t code = writeSome(native_, bytes + *pDone, nextTransfer(pParam->length, *pDone), done);
-    if (code != TAV_RC_OK) return code;
+    if (code != TAV_RC_OK)
+    {
+      return code;
+    }
     *pDone += done;
   }
   return TAV_RC_OK;
@@ -115,12 +157,24 @@ uint32_t KORHFile::write(const KORFileWriteParam* pParam, uint64_t* pDone)
 uint32_t KORHFile::seek(const KORFileSeekParam* pParam, uint64_t* pNewPosition)
 {
   uint64_t position = 0;
-  if (pNewPosition != nullptr) *pNewPosition = 0;
-  if (!isParam(pParam) || pParam->offset > static_cast<uint64_t>(INT64_MAX)) return TAV_RC_BAD_PARAM;
-  if (native_ == kNoFile) return KOR_RC_NOT_OPEN;
+  if (pNewPosition != nullptr)
+  {
+    *pNewPosition = 0;
+  }
+  if (!isParam(pParam) || pParam->offset > static_cast<uint64_t>(INT64_MAX))
+  {
+    return TAV_RC_BAD_PARAM;
+  }
+  if (native_ == kNoFile)
+  {
+    return KOR_RC_NOT_OPEN;
+  }
 
   const uint32_t code = seekNative(native_, static_cast<int64_t>(pParam->offset), position);
-  if (pNewPosition != nullptr) *pNewPosition = position;
+  if (pNewPosition != nullptr)
+  {
+    *pNewPosition = position;
+  }
   return code;
 }
 
@@ -128,7 +182,10 @@ uint32_t KORHFile::lock(const KORFileLockParam* pParam)
 {
   if (!isParam(pParam) || pParam->word1 > kLockWord1Exclusive || (pParam->word2 & ~kLockWord2NoWait) != 0)
     return TAV_RC_BAD_PARAM;
-  if (native_ == kNoFile) return KOR_RC_NOT_OPEN;
+  if (native_ == kNoFile)
+  {
+    return KOR_RC_NOT_OPEN;
+  }
 
   const bool exclusive = pParam->word1 == kLockWord1Exclusive;
   const bool wait = (pParam->word2 & kLockWord2NoWait) == 0;
@@ -139,24 +196,42 @@ uint32_t KORHFile::lock(const KORFileLockParam* pParam)
 
 uint32_t KORHFile::unlock()
 {
-  if (native_ == kNoFile) return KOR_RC_NOT_OPEN;
-  if (!locked_) return KOR_RC_NOT_LOCKED;
+  if (native_ == kNoFile)
+  {
+    return KOR_RC_NOT_OPEN;
+  }
+  if (!locked_)
+  {
+    return KOR_RC_NOT_LOCKED;
+  }
   const uint32_t code = unlockNative(native_);
-  if (code == TAV_RC_OK) locked_ = false;
+  if (code == TAV_RC_OK)
+  {
+    locked_ = false;
+  }
   return code;
 }
 
 uint32_t KORHFile::getSize(uint64_t* pSize)
 {
-  if (pSize == nullptr) return TAV_RC_BAD_PARAM;
+  if (pSize == nullptr)
+  {
+    return TAV_RC_BAD_PARAM;
+  }
   *pSize = 0;
-  if (native_ == kNoFile) return KOR_RC_NOT_OPEN;
+  if (native_ == kNoFile)
+  {
+    return KOR_RC_NOT_OPEN;
+  }
   return sizeNative(native_, *pSize);
 }
 
 uint32_t KORHFile::setSize(uint64_t size)
 {
-  if (size > static_cast<uint64_t>(INT64_MAX)) return TAV_RC_BAD_PARAM;
+  if (size > static_cast<uint64_t>(INT64_MAX))
+  {
+    return TAV_RC_BAD_PARAM;
+  }
   return native_ == kNoFile ? KOR_RC_NOT_OPEN : setSizeNative(native_, static_cast<int64_t>(size));
 }
 
@@ -190,10 +265,19 @@ bool KORHFile::isAt(const char* pPath) const
 
 uint32_t KORHFile::replaceBy(const char* pFrom, const char* pPath)
 {
-  if (pFrom == nullptr || pPath == nullptr) return TAV_RC_BAD_PARAM;
-  if (kOpenFileHoldsName && native_ != kNoFile) close();
+  if (pFrom == nullptr || pPath == nullptr)
+  {
+    return TAV_RC_BAD_PARAM;
+  }
+  if (kOpenFileHoldsName && native_ != kNoFile)
+  {
+    close();
+  }
   const uint32_t code = renameNative(pFrom, pPath);
-  if (code == TAV_RC_OK && native_ != kNoFile) close(); // nobody reaches it by the path any more
+  if (code == TAV_RC_OK && native_ != kNoFile)
+  {
+    close(); // nobody reaches it by the path any more
+  }
   return code;
 }
 

@@ -39,16 +39,28 @@ int descriptor(intptr_t file)
 
 int accessOf(const OpenMode& mode)
 {
-  if (mode.read && mode.write) return O_RDWR;
+  if (mode.read && mode.write)
+  {
+    return O_RDWR;
+  }
   return mode.write ? O_WRONLY : O_RDONLY;
 }
 
 int flagsOf(const OpenMode& mode)
 {
   int flags = accessOf(mode) | O_CLOEXEC | O_NOCTTY;
-  if (mode.create) flags |= O_CREAT;
-  if (mode.truncate) flags |= O_TRUNC;
-  if (mode.exclusive) flags |= O_EXCL;
+  if (mode.create)
+  {
+    flags |= O_CREAT;
+  }
+  if (mode.truncate)
+  {
+    flags |= O_TRUNC;
+  }
+  if (mode.exclusive)
+  {
+    flags |= O_EXCL;
+  }
   return flags;
 }
 } // namespace
@@ -57,12 +69,18 @@ uint32_t openNative(const char* pPath, const OpenMode& mode, intptr_t& file)
 {
   const auto permissions = static_cast<mode_t>(mode.permissions & 07777);
   const int opened = uninterrupted([&] { return ::open(pPath, flagsOf(mode), permissions); });
-  if (opened < 0) return codeOfSystemError(errno);
+  if (opened < 0)
+  {
+    return codeOfSystemError(errno);
+  }
 
   // A folder can be opened for reading; only its reads would fail.
   struct stat status = {};
   uint32_t code = ::fstat(opened, &status) == 0 ? TAV_RC_OK : codeOfSystemError(errno);
-  if (code == TAV_RC_OK && S_ISDIR(status.st_mode)) code = KOR_RC_IS_FOLDER;
+  if (code == TAV_RC_OK && S_ISDIR(status.st_mode))
+  {
+    code = KOR_RC_IS_FOLDER;
+  }
   if (code == TAV_RC_OK)
     file = opened;
   else
@@ -79,7 +97,10 @@ uint32_t closeNative(intptr_t file)
 uint32_t readSome(intptr_t file, void* bytes, std::size_t length, std::size_t& done)
 {
   const ssize_t count = uninterrupted([&] { return ::read(descriptor(file), bytes, length); });
-  if (count < 0) return transferCodeOf(errno);
+  if (count < 0)
+  {
+    return transferCodeOf(errno);
+  }
   done = static_cast<std::size_t>(count);
   return TAV_RC_OK;
 }
@@ -87,7 +108,10 @@ uint32_t readSome(intptr_t file, void* bytes, std::size_t length, std::size_t& d
 uint32_t writeSome(intptr_t file, const void* bytes, std::size_t length, std::size_t& done)
 {
   const ssize_t count = uninterrupted([&] { return ::write(descriptor(file), bytes, length); });
-  if (count < 0) return transferCodeOf(errno);
+  if (count < 0)
+  {
+    return transferCodeOf(errno);
+  }
   done = static_cast<std::size_t>(count);
   return count == 0 ? KOR_RC_IO_ERROR : TAV_RC_OK;
 }
@@ -95,7 +119,10 @@ uint32_t writeSome(intptr_t file, const void* bytes, std::size_t length, std::si
 uint32_t seekNative(intptr_t file, int64_t offset, uint64_t& position)
 {
   const off_t landed = ::lseek(descriptor(file), offset, SEEK_SET);
-  if (landed < 0) return codeOfSystemError(errno);
+  if (landed < 0)
+  {
+    return codeOfSystemError(errno);
+  }
   position = static_cast<uint64_t>(landed);
   return TAV_RC_OK;
 }
@@ -123,7 +150,10 @@ uint32_t unlockNative(intptr_t file)
 uint32_t sizeNative(intptr_t file, uint64_t& size)
 {
   struct stat status = {};
-  if (::fstat(descriptor(file), &status) != 0) return codeOfSystemError(errno);
+  if (::fstat(descriptor(file), &status) != 0)
+  {
+    return codeOfSystemError(errno);
+  }
   if (S_ISREG(status.st_mode))
   {
     size = static_cast<uint64_t>(status.st_size);
@@ -132,9 +162,15 @@ uint32_t sizeNative(intptr_t file, uint64_t& size)
 
   // Devices tell their size by their end only.
   const off_t here = ::lseek(descriptor(file), 0, SEEK_CUR);
-  if (here < 0) return codeOfSystemError(errno);
+  if (here < 0)
+  {
+    return codeOfSystemError(errno);
+  }
   const off_t end = ::lseek(descriptor(file), 0, SEEK_END);
-  if (end < 0 || ::lseek(descriptor(file), here, SEEK_SET) != here) return codeOfSystemError(errno);
+  if (end < 0 || ::lseek(descriptor(file), here, SEEK_SET) != here)
+  {
+    return codeOfSystemError(errno);
+  }
   size = static_cast<uint64_t>(end);
   return TAV_RC_OK;
 }
@@ -148,7 +184,10 @@ uint32_t syncNative(intptr_t file)
 {
 #if defined(F_FULLFSYNC)
   // There fsync leaves the bytes in the device's cache. Not every file system knows the other one.
-  if (uninterrupted([&] { return ::fcntl(descriptor(file), F_FULLFSYNC); }) == 0) return TAV_RC_OK;
+  if (uninterrupted([&] { return ::fcntl(descriptor(file), F_FULLFSYNC); }) == 0)
+  {
+    return TAV_RC_OK;
+  }
 #endif
   return uninterrupted([&] { return ::fsync(descriptor(file)); }) == 0 ? TAV_RC_OK : codeOfSystemError(errno);
 }
@@ -167,11 +206,17 @@ uint32_t syncFolderNative(const char* pPath)
   const char* const slash = std::strrchr(pPath, '/');
   const std::size_t length = slash != nullptr ? static_cast<std::size_t>(slash - pPath) + 1 : 0;
   const std::unique_ptr<char[]> folder(new (std::nothrow) char[length + 2]);
-  if (folder == nullptr) return TAV_RC_NO_MEMORY;
+  if (folder == nullptr)
+  {
+    return TAV_RC_NO_MEMORY;
+  }
   std::memcpy(folder.get(), pPath, length);
   std::memcpy(folder.get() + length, length == 0 ? "." : "\0", 2);
   const int opened = uninterrupted([&] { return ::open(folder.get(), O_RDONLY | O_DIRECTORY | O_CLOEXEC); });
-  if (opened < 0) return codeOfSystemError(errno);
+  if (opened < 0)
+  {
+    return codeOfSystemError(errno);
+  }
   const int error = syncNative(opened) == TAV_RC_OK ? 0 : errno;
   ::close(opened);
   const bool cannot = error == EINVAL || error == EROFS || error == ENOSYS || error == EOPNOTSUPP;
@@ -181,10 +226,16 @@ uint32_t syncFolderNative(const char* pPath)
 uint32_t copyRightsNative(intptr_t from, intptr_t to)
 {
   struct stat status = {};
-  if (::fstat(descriptor(from), &status) != 0) return codeOfSystemError(errno);
+  if (::fstat(descriptor(from), &status) != 0)
+  {
+    return codeOfSystemError(errno);
+  }
   // The owner first: giving a file away takes the set-id bits from it.
   const bool owned = ::fchown(descriptor(to), status.st_uid, status.st_gid) == 0;
-  if (!owned) static_cast<void>(::fchown(descriptor(to), static_cast<uid_t>(-1), status.st_gid) == 0);
+  if (!owned)
+  {
+    static_cast<void>(::fchown(descriptor(to), static_cast<uid_t>(-1), status.st_gid) == 0);
+  }
   const mode_t mode = status.st_mode & (owned ? 07777U : 0777U);
   return ::fchmod(descriptor(to), mode) == 0 ? TAV_RC_OK : codeOfSystemError(errno);
 }

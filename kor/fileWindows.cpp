@@ -61,10 +61,16 @@ uint32_t openNative(const char* pPath, const OpenMode& mode, intptr_t& file)
 {
   std::wstring path;
   const DWORD error = widen(pPath, path);
-  if (error != ERROR_SUCCESS) return codeOfSystemError(error);
+  if (error != ERROR_SUCCESS)
+  {
+    return codeOfSystemError(error);
+  }
 
   const HANDLE opened = createFile(path, mode);
-  if (opened == INVALID_HANDLE_VALUE) return openFailure(path, GetLastError());
+  if (opened == INVALID_HANDLE_VALUE)
+  {
+    return openFailure(path, GetLastError());
+  }
 
   // Emptied here and not by the disposition, which would refuse a hidden file.
   if (mode.truncate && GetFileType(opened) == FILE_TYPE_DISK && !SetEndOfFile(opened))
@@ -89,7 +95,10 @@ uint32_t readSome(intptr_t file, void* bytes, std::size_t length, std::size_t& d
   {
     const DWORD error = GetLastError();
     // A pipe ends with its last writer.
-    if (error != ERROR_HANDLE_EOF && error != ERROR_BROKEN_PIPE) return transferCodeOf(error);
+    if (error != ERROR_HANDLE_EOF && error != ERROR_BROKEN_PIPE)
+    {
+      return transferCodeOf(error);
+    }
     count = 0;
   }
   done = count;
@@ -99,7 +108,10 @@ uint32_t readSome(intptr_t file, void* bytes, std::size_t length, std::size_t& d
 uint32_t writeSome(intptr_t file, const void* bytes, std::size_t length, std::size_t& done)
 {
   DWORD count = 0;
-  if (!WriteFile(handleOf(file), bytes, transferSize(length), &count, nullptr)) return transferCodeOf(GetLastError());
+  if (!WriteFile(handleOf(file), bytes, transferSize(length), &count, nullptr))
+  {
+    return transferCodeOf(GetLastError());
+  }
   done = count;
   return count == 0 ? KOR_RC_IO_ERROR : TAV_RC_OK;
 }
@@ -107,11 +119,17 @@ uint32_t writeSome(intptr_t file, const void* bytes, std::size_t length, std::si
 uint32_t seekNative(intptr_t file, int64_t offset, uint64_t& position)
 {
   // A pipe or a console accepts a position and ignores it.
-  if (GetFileType(handleOf(file)) != FILE_TYPE_DISK) return KOR_RC_NOT_SEEKABLE;
+  if (GetFileType(handleOf(file)) != FILE_TYPE_DISK)
+  {
+    return KOR_RC_NOT_SEEKABLE;
+  }
   LARGE_INTEGER wanted{};
   LARGE_INTEGER landed{};
   wanted.QuadPart = offset;
-  if (!SetFilePointerEx(handleOf(file), wanted, &landed, FILE_BEGIN)) return codeOfSystemError(GetLastError());
+  if (!SetFilePointerEx(handleOf(file), wanted, &landed, FILE_BEGIN))
+  {
+    return codeOfSystemError(GetLastError());
+  }
   position = static_cast<uint64_t>(landed.QuadPart);
   return TAV_RC_OK;
 }
@@ -130,7 +148,10 @@ uint32_t lockNative(intptr_t file, bool exclusive, bool wait, bool held)
   if (held)
   {
     const uint32_t code = unlockNative(file);
-    if (code != TAV_RC_OK) return code;
+    if (code != TAV_RC_OK)
+    {
+      return code;
+    }
   }
   OVERLAPPED place = lockedPlace();
   const DWORD flags = (exclusive ? LOCKFILE_EXCLUSIVE_LOCK : 0) | (wait ? 0 : LOCKFILE_FAIL_IMMEDIATELY);
@@ -145,9 +166,15 @@ uint32_t unlockNative(intptr_t file)
 
 uint32_t sizeNative(intptr_t file, uint64_t& size)
 {
-  if (GetFileType(handleOf(file)) != FILE_TYPE_DISK) return KOR_RC_NOT_SEEKABLE;
+  if (GetFileType(handleOf(file)) != FILE_TYPE_DISK)
+  {
+    return KOR_RC_NOT_SEEKABLE;
+  }
   LARGE_INTEGER bytes{};
-  if (!GetFileSizeEx(handleOf(file), &bytes)) return codeOfSystemError(GetLastError());
+  if (!GetFileSizeEx(handleOf(file), &bytes))
+  {
+    return codeOfSystemError(GetLastError());
+  }
   size = static_cast<uint64_t>(bytes.QuadPart);
   return TAV_RC_OK;
 }
@@ -184,10 +211,16 @@ uint32_t copyRightsNative(intptr_t /*from*/, intptr_t /*to*/)
 bool isAtNative(intptr_t file, const char* pPath)
 {
   std::wstring path;
-  if (widen(pPath, path) != ERROR_SUCCESS) return false;
+  if (widen(pPath, path) != ERROR_SUCCESS)
+  {
+    return false;
+  }
   const DWORD sharing = FILE_SHARE_READ | FILE_SHARE_WRITE | FILE_SHARE_DELETE;
   const HANDLE other = CreateFileW(path.c_str(), 0, sharing, nullptr, OPEN_EXISTING, FILE_ATTRIBUTE_NORMAL, nullptr);
-  if (other == INVALID_HANDLE_VALUE) return false;
+  if (other == INVALID_HANDLE_VALUE)
+  {
+    return false;
+  }
   BY_HANDLE_FILE_INFORMATION open{};
   BY_HANDLE_FILE_INFORMATION there{};
   const bool known = GetFileInformationByHandle(handleOf(file), &open) && GetFileInformationByHandle(other, &there);
@@ -252,10 +285,16 @@ void readAheadNative(void* /*bytes*/, uint64_t /*size*/)
 bool isDeviceNative(const char* pPath)
 {
   std::wstring path;
-  if (widen(pPath, path) != ERROR_SUCCESS) return false;
+  if (widen(pPath, path) != ERROR_SUCCESS)
+  {
+    return false;
+  }
   const DWORD sharing = FILE_SHARE_READ | FILE_SHARE_WRITE | FILE_SHARE_DELETE;
   const HANDLE there = CreateFileW(path.c_str(), 0, sharing, nullptr, OPEN_EXISTING, FILE_ATTRIBUTE_NORMAL, nullptr);
-  if (there == INVALID_HANDLE_VALUE) return false; // nothing, or a folder, which opens with a flag alone
+  if (there == INVALID_HANDLE_VALUE)
+  {
+    return false; // nothing, or a folder, which opens with a flag alone
+  }
   const DWORD type = GetFileType(there);
   CloseHandle(there);
   return type != FILE_TYPE_DISK;
@@ -268,7 +307,10 @@ uint32_t renameNative(const char* pFrom, const char* pTo)
   std::wstring from;
   std::wstring to;
   DWORD error = widen(pFrom, from);
-  if (error == ERROR_SUCCESS) error = widen(pTo, to);
+  if (error == ERROR_SUCCESS)
+  {
+    error = widen(pTo, to);
+  }
   if (error == ERROR_SUCCESS && !MoveFileExW(from.c_str(), to.c_str(), MOVEFILE_REPLACE_EXISTING))
     error = GetLastError();
   return error == ERROR_SUCCESS ? TAV_RC_OK : codeOfSystemError(error);

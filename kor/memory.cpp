@@ -80,13 +80,19 @@ void join(Reserved* companion, Reserved* owner)
 {
   companion->owner = owner;
   companion->nextCompanion = owner->firstCompanion;
-  if (owner->firstCompanion != nullptr) owner->firstCompanion->previousCompanion = companion;
+  if (owner->firstCompanion != nullptr)
+  {
+    owner->firstCompanion->previousCompanion = companion;
+  }
   owner->firstCompanion = companion;
 }
 
 void part(Reserved* companion)
 {
-  if (companion->owner == nullptr) return;
+  if (companion->owner == nullptr)
+  {
+    return;
+  }
   if (companion->previousCompanion != nullptr)
     companion->previousCompanion->nextCompanion = companion->nextCompanion;
   else
@@ -117,21 +123,33 @@ void releaseTree(Reserved* root)
 void* allocatePlain(uint64_t size)
 {
   // No object is larger than this; checking tools abort on such requests instead of refusing them.
-  if (size > static_cast<uint64_t>(PTRDIFF_MAX)) return nullptr;
+  if (size > static_cast<uint64_t>(PTRDIFF_MAX))
+  {
+    return nullptr;
+  }
   return ::operator new(size, std::nothrow);
 }
 
 void* allocateReserved(uint64_t size, const void* ownerBytes)
 {
-  if (size > KOR_MEM_RESERVE) return nullptr;
+  if (size > KOR_MEM_RESERVE)
+  {
+    return nullptr;
+  }
   void* const room = ::operator new(kReservedSize, std::nothrow);
-  if (room == nullptr) return nullptr;
+  if (room == nullptr)
+  {
+    return nullptr;
+  }
 
   // cppcheck-suppress legacyUninitvar ; its members have initial values
   Reserved* const block = ::new (room) Reserved;
   const std::lock_guard<Lock> guard(registry.lock);
   Reserved* const owner = find(ownerBytes);
-  if (owner != nullptr) join(block, owner);
+  if (owner != nullptr)
+  {
+    join(block, owner);
+  }
   enter(block);
   return block->bytes();
 }
@@ -139,11 +157,20 @@ void* allocateReserved(uint64_t size, const void* ownerBytes)
 
 uint32_t _korMemAlloc(void** pp, uint64_t flags, uint64_t size, uint32_t mode, const char* /*pFile*/, uint32_t /*line*/)
 {
-  if (pp == nullptr) return TAV_RC_BAD_PARAM;
+  if (pp == nullptr)
+  {
+    return TAV_RC_BAD_PARAM;
+  }
   const void* const ownerBytes = *pp;
   *pp = nullptr;
-  if (flags != 0) return TAV_RC_BAD_PARAM;
-  if (mode != KOR_MEM_PLAIN && mode != KOR_MEM_RESERVED) return TAV_RC_BAD_PARAM;
+  if (flags != 0)
+  {
+    return TAV_RC_BAD_PARAM;
+  }
+  if (mode != KOR_MEM_PLAIN && mode != KOR_MEM_RESERVED)
+  {
+    return TAV_RC_BAD_PARAM;
+  }
 
   *pp = mode == KOR_MEM_PLAIN ? allocatePlain(size) : allocateReserved(size, ownerBytes);
   return *pp == nullptr ? TAV_RC_NO_MEMORY : TAV_RC_OK;
@@ -151,10 +178,16 @@ uint32_t _korMemAlloc(void** pp, uint64_t flags, uint64_t size, uint32_t mode, c
 
 uint32_t _korMemFree(void** pp, uint64_t /*flags*/, uint64_t /*reserved*/, const char* /*pFile*/, uint32_t /*line*/)
 {
-  if (pp == nullptr) return TAV_RC_BAD_PARAM;
+  if (pp == nullptr)
+  {
+    return TAV_RC_BAD_PARAM;
+  }
   void* const bytes = *pp;
   *pp = nullptr;
-  if (bytes == nullptr) return TAV_RC_OK;
+  if (bytes == nullptr)
+  {
+    return TAV_RC_OK;
+  }
 
   {
     const std::lock_guard<Lock> guard(registry.lock);

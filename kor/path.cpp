@@ -38,10 +38,16 @@ uint32_t followLinks(fs::path& path)
 {
   std::error_code error;
   path = fs::absolute(path, error);
-  if (error) return codeOfSystemError(error.value());
+  if (error)
+  {
+    return codeOfSystemError(error.value());
+  }
   for (int i = 0; i < kMostLinks && fs::is_symlink(path, error); ++i)
   {
-    if (isOfTheSystem(path)) return TAV_RC_NOT_SUPPORTED;
+    if (isOfTheSystem(path))
+    {
+      return TAV_RC_NOT_SUPPORTED;
+    }
     path = path.parent_path() / fs::read_symlink(path, error);
   }
   return TAV_RC_OK;
@@ -51,9 +57,15 @@ uint32_t targetOf(const char* pPath, char* pTarget, uint64_t targetSize, uint64_
 {
   fs::path path = pathOf(pPath);
   const uint32_t rc = followLinks(path);
-  if (rc != TAV_RC_OK) return rc;
+  if (rc != TAV_RC_OK)
+  {
+    return rc;
+  }
   const std::string text = textOf(path);
-  if (text.size() >= targetSize) return TAV_RC_NO_MEMORY;
+  if (text.size() >= targetSize)
+  {
+    return TAV_RC_NO_MEMORY;
+  }
   std::memcpy(pTarget, text.c_str(), text.size() + 1);
   *pNameAt = text.size() - textOf(path.filename()).size();
   return TAV_RC_OK;
@@ -88,14 +100,20 @@ bool korIsDevice(const char* pPath)
 uint32_t korFollowLinks(const char* pPath, char* pTarget, uint64_t targetSize, uint64_t* pNameAt)
 {
   using namespace tav::kor;
-  if (pPath == nullptr || pTarget == nullptr || pNameAt == nullptr) return TAV_RC_BAD_PARAM;
+  if (pPath == nullptr || pTarget == nullptr || pNameAt == nullptr)
+  {
+    return TAV_RC_BAD_PARAM;
+  }
   return guarded([&] { return targetOf(pPath, pTarget, targetSize, pNameAt); });
 }
 
 uint32_t korRemoveFile(const char* pPath)
 {
   using namespace tav::kor;
-  if (pPath == nullptr) return TAV_RC_BAD_PARAM;
+  if (pPath == nullptr)
+  {
+    return TAV_RC_BAD_PARAM;
+  }
   return guarded([&] {
     std::error_code error;
     const bool removed = fs::remove(pathOf(pPath), error);
@@ -107,7 +125,10 @@ uint32_t korRemoveFile(const char* pPath)
 uint32_t korListFolder(const char* pPath, KORFileNameVisit visit, void* context)
 {
   using namespace tav::kor;
-  if (pPath == nullptr || visit == nullptr) return TAV_RC_BAD_PARAM;
+  if (pPath == nullptr || visit == nullptr)
+  {
+    return TAV_RC_BAD_PARAM;
+  }
   return guarded([&] {
     std::error_code error;
     fs::directory_iterator entry(pathOf(pPath), error);

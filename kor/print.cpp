@@ -5,9 +5,18 @@
 
 uint32_t korSnprintf(char* pBuffer, uint64_t bufferSize, const char* pFormat, ...)
 {
-  if (pBuffer == nullptr) return TAV_RC_BAD_PARAM;
-  if (bufferSize != 0) pBuffer[0] = '\0';
-  if (pFormat == nullptr) return TAV_RC_BAD_PARAM;
+  if (pBuffer == nullptr)
+  {
+    return TAV_RC_BAD_PARAM;
+  }
+  if (bufferSize != 0)
+  {
+    pBuffer[0] = '\0';
+  }
+  if (pFormat == nullptr)
+  {
+    return TAV_RC_BAD_PARAM;
+  }
 
   va_list arguments;
   va_start(arguments, pFormat);
@@ -16,7 +25,10 @@ uint32_t korSnprintf(char* pBuffer, uint64_t bufferSize, const char* pFormat, ..
 
   if (wanted < 0)
   {
-    if (bufferSize != 0) pBuffer[0] = '\0'; // a format that fails half-way has stored its first half
+    if (bufferSize != 0)
+    {
+      pBuffer[0] = '\0'; // a format that fails half-way has stored its first half
+    }
     return TAV_RC_BAD_PARAM;
   }
   return static_cast<uint64_t>(wanted) < bufferSize ? TAV_RC_OK : TAV_RC_NO_MEMORY;

@@ -75,7 +75,10 @@ constexpr ErrorCode kErrorCodes[] = {
 uint32_t codeOfSystemError(int64_t error)
 {
   for (const ErrorCode& known : kErrorCodes)
-    if (known.error == error) return known.code;
+    if (known.error == error)
+    {
+      return known.code;
+    }
   return KOR_RC_OS_ERROR;
 }
 } // namespace tav::kor

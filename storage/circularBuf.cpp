@@ -58,7 +58,10 @@ bool findIndex(const TAVCircularBuf& ring, uint64_t offset, uint64_t& index)
   frame.dump(0, offset);
   const bool cached = !cachesNothing<Frame>(ring) && offset >= ring.headOffset &&
                       offset - ring.headOffset < countCached<Frame>(ring);
-  if (cached) index = runAt(ring, offset).index;
+  if (cached)
+  {
+    index = runAt(ring, offset).index;
+  }
   frame.dump(100, cached, index);
   return cached;
 }
@@ -253,7 +256,10 @@ uint32_t TAVCircularBuf::write(uint64_t offset, const void* data, uint64_t size,
   }
   if (cached)
   {
-    if (frame.step(40, writeCached(index, offset, bytes, size, direct))) frame.dump(100, offset + size);
+    if (frame.step(40, writeCached(index, offset, bytes, size, direct)))
+    {
+      frame.dump(100, offset + size);
+    }
     return frame.code();
   }
   const bool overlaps = !isEmpty() && offset < headOffset && headOffset - offset < size;
@@ -350,7 +356,10 @@ uint32_t TAVCircularBuf::reposition(uint64_t offset, int8_t adjustment, uint8_t 
   if (frame.step(10, pRing != nullptr ? reset() : TAV_RC_BAD_PARAM))
   {
     const uint64_t from = offset + static_cast<uint64_t>(int64_t{adjustment});
-    if (frame.step(20, fill(from, pages, false, Purpose::read))) frame.dump(100, headOffset, cachedBytes(*this));
+    if (frame.step(20, fill(from, pages, false, Purpose::read)))
+    {
+      frame.dump(100, headOffset, cachedBytes(*this));
+    }
   }
   return frame.code();
 }

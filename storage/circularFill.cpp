@@ -146,7 +146,10 @@ uint32_t TAVCircularBuf::readPages(uint64_t pages, bool backward, uint64_t offse
       break;
     }
   }
-  if (frame.code() == TAV_RC_OK) frame.dump(100, done, cachedBytes(*this));
+  if (frame.code() == TAV_RC_OK)
+  {
+    frame.dump(100, done, cachedBytes(*this));
+  }
   return frame.code();
 }
 

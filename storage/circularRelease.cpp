@@ -53,7 +53,10 @@ uint32_t TAVCircularBuf::releasePages(uint64_t pages, bool fromTail)
     seekNeeded = !pending;
     dropPiece(piece, fromTail);
   }
-  if (frame.code() == TAV_RC_OK) frame.dump(100, done, cachedBytes(*this));
+  if (frame.code() == TAV_RC_OK)
+  {
+    frame.dump(100, done, cachedBytes(*this));
+  }
   return frame.code();
 }
 

@@ -43,20 +43,32 @@ class ActiveCall
 public:
   ActiveCall()
   {
-    if (insideSink) return;
+    if (insideSink)
+    {
+      return;
+    }
     const std::lock_guard<Lock> guard(tracer.lock);
     sink_ = tracer.sink;
-    if (sink_ == nullptr) return;
+    if (sink_ == nullptr)
+    {
+      return;
+    }
     context_ = tracer.context;
     session_ = tracer.session;
     next_ = tracer.firstActive;
-    if (next_ != nullptr) next_->previous_ = this;
+    if (next_ != nullptr)
+    {
+      next_->previous_ = this;
+    }
     tracer.firstActive = this;
   }
 
   ~ActiveCall()
   {
-    if (sink_ == nullptr) return;
+    if (sink_ == nullptr)
+    {
+      return;
+    }
     insideSink = false;
     {
       const std::lock_guard<Lock> guard(tracer.lock);
@@ -64,7 +76,10 @@ public:
         previous_->next_ = next_;
       else
         tracer.firstActive = next_;
-      if (next_ != nullptr) next_->previous_ = previous_;
+      if (next_ != nullptr)
+      {
+        next_->previous_ = previous_;
+      }
       tracer.finished.fetch_add(1);
     }
     tracer.finished.notify_all();
@@ -105,7 +120,10 @@ void waitForCalls(uint64_t session)
     uint32_t seen = 0;
     {
       const std::lock_guard<Lock> guard(tracer.lock);
-      if (!ActiveCall::anyUpTo(session)) return;
+      if (!ActiveCall::anyUpTo(session))
+      {
+        return;
+      }
       seen = tracer.finished.load();
     }
     tracer.finished.wait(seen);
@@ -159,16 +177,25 @@ KORTraceRecord recordOf(KORTraceKind kind, uint32_t threadId, uint32_t probe, ui
 uint32_t codeAt(const void* pCode)
 {
   uint32_t code = 0;
-  if (pCode != nullptr) std::memcpy(&code, pCode, sizeof code);
+  if (pCode != nullptr)
+  {
+    std::memcpy(&code, pCode, sizeof code);
+  }
   return code;
 }
 } // namespace
 
 uint32_t korTraceStart(KORTraceSink sink, void* context)
 {
-  if (sink == nullptr) return TAV_RC_BAD_PARAM;
+  if (sink == nullptr)
+  {
+    return TAV_RC_BAD_PARAM;
+  }
   const std::lock_guard<Lock> guard(tracer.lock);
-  if (tracer.sink != nullptr) return KOR_RC_TRACE_ACTIVE;
+  if (tracer.sink != nullptr)
+  {
+    return KOR_RC_TRACE_ACTIVE;
+  }
   tracer.sink = sink;
   tracer.context = context;
   ++tracer.session;
@@ -182,27 +209,39 @@ uint32_t korTraceStop(void)
   uint64_t session = 0;
   {
     const std::lock_guard<Lock> guard(tracer.lock);
-    if (tracer.sink == nullptr) return KOR_RC_TRACE_INACTIVE;
+    if (tracer.sink == nullptr)
+    {
+      return KOR_RC_TRACE_INACTIVE;
+    }
     store(controlBlock.enable, uint32_t{0});
     tracer.sink = nullptr;
     tracer.context = nullptr;
     session = tracer.session;
   }
   // From inside a sink the wait would be for itself, or for a sink that stops the trace as well.
-  if (!insideSink) waitForCalls(session);
+  if (!insideSink)
+  {
+    waitForCalls(session);
+  }
   return TAV_RC_OK;
 }
 
 void _wtraceEntry(uint32_t threadId, uint32_t probe, uint32_t /*reserved*/, uint32_t /*level*/)
 {
   ActiveCall call;
-  if (call) call.deliver(recordOf(KOR_TRACE_ENTRY, threadId, probe, 0));
+  if (call)
+  {
+    call.deliver(recordOf(KOR_TRACE_ENTRY, threadId, probe, 0));
+  }
 }
 
 void _wtraceExit(uint32_t threadId, uint32_t probe, const void* pResult, uint32_t /*reserved*/)
 {
   ActiveCall call;
-  if (!call) return;
+  if (!call)
+  {
+    return;
+  }
   KORTraceRecord record = recordOf(KOR_TRACE_EXIT, threadId, probe, 0);
   record.code = codeAt(pResult);
   call.deliver(record);
@@ -211,7 +250,10 @@ void _wtraceExit(uint32_t threadId, uint32_t probe, const void* pResult, uint32_
 void _wtraceVar(uint32_t threadId, uint32_t probe, uint32_t point, uint32_t /*kind*/, uint32_t count, ...)
 {
   ActiveCall call;
-  if (!call) return;
+  if (!call)
+  {
+    return;
+  }
   va_list triples;
   va_start(triples, count);
   const Items items(count, triples);
@@ -227,7 +269,10 @@ void _wtraceErrorVar(uint32_t threadId, uint32_t probe, uint32_t point, uint32_t
                      uint32_t count, ...)
 {
   ActiveCall call;
-  if (!call) return;
+  if (!call)
+  {
+    return;
+  }
   va_list triples;
   va_start(triples, count);
   const Items items(count, triples);
@@ -236,6 +281,9 @@ void _wtraceErrorVar(uint32_t threadId, uint32_t probe, uint32_t point, uint32_t
   KORTraceRecord record = recordOf(KOR_TRACE_ERROR, threadId, probe, point);
   record.pItems = items.data();
   record.itemCount = items.count();
-  if (items.count() > 0 && items.data()[0].length == sizeof record.code) record.code = codeAt(items.data()[0].pData);
+  if (items.count() > 0 && items.data()[0].length == sizeof record.code)
+  {
+    record.code = codeAt(items.data()[0].pData);
+  }
   call.deliver(record);
 }

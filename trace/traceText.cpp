@@ -35,7 +35,10 @@ bool isPrintable(uint8_t byte)
 
 void appendLengthWhenCut(std::string& line, uint64_t length, uint64_t shown)
 {
-  if (shown < length) line += "... (" + std::to_string(length) + " bytes)";
+  if (shown < length)
+  {
+    line += "... (" + std::to_string(length) + " bytes)";
+  }
 }
 
 void appendText(std::string& line, const uint8_t* bytes, uint64_t length)
@@ -45,7 +48,10 @@ void appendText(std::string& line, const uint8_t* bytes, uint64_t length)
   for (uint64_t i = 0; i < shown; ++i)
   {
     const char character = static_cast<char>(bytes[i]);
-    if (character == '"' || character == '\\') line += '\\';
+    if (character == '"' || character == '\\')
+    {
+      line += '\\';
+    }
     line += character;
   }
   line += '"';
@@ -118,7 +124,10 @@ std::string lineOf(const KORTraceRecord& record)
 
 void korTraceTextSink(void* context, const KORTraceRecord* record)
 {
-  if (context == nullptr || record == nullptr) return;
+  if (context == nullptr || record == nullptr)
+  {
+    return;
+  }
   try
   {
     // One fwrite a line: the stream's lock keeps the lines of several threads apart.

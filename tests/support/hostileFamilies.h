@@ -264,7 +264,10 @@ inline void pairsTo(HostileRows& rows, uint64_t groups, uint64_t filler, uint64_
 {
   for (uint64_t i = 0; i < groups; ++i) rows.open();
   rows.marker();
-  if (filler != 0) rows.elementUpTo(filler);
+  if (filler != 0)
+  {
+    rows.elementUpTo(filler);
+  }
   rows.repeatUpTo(rows.length(), 16, [&] { rows.pairTo(target); });
 }
 

@@ -89,7 +89,10 @@ private:
     case 1:
     case 2: group(TAV_SIZE_UNKNOWN); break;
     case 3:
-      if (!open_.empty()) close();
+      if (!open_.empty())
+      {
+        close();
+      }
       break;
     case 4: rows_.h64(4, 0, TAV_TYPE_UINT32, 8).fill(4, 7); break;
     case 5: rows_.fill(16 * pick(3)); break;

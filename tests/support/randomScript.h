@@ -38,7 +38,10 @@ public:
   /// 0 to `limit` - 1.
   uint64_t below(uint64_t limit)
   {
-    if (limit == 0) return 0;
+    if (limit == 0)
+    {
+      return 0;
+    }
     return (choices_.empty() ? next() : choose(limit)) % limit;
   }
   bool oneIn(uint64_t chance) { return below(chance) == 0; }
@@ -186,7 +189,10 @@ private:
   {
     // Elements larger than a ring of large pages are rare: they cost more than a hundred small cases.
     const uint64_t ring = case_.ringBytes();
-    if (ring <= 0x4000) return 0x4000;
+    if (ring <= 0x4000)
+    {
+      return 0x4000;
+    }
     return ring <= 0x400000 && random_.oneIn(ring <= 0x40000 ? 12 : 150) ? 2 * ring : 0x4000;
   }
 
@@ -374,22 +380,34 @@ private:
 
   void update()
   {
-    if (nodes_.empty()) return;
+    if (nodes_.empty())
+    {
+      return;
+    }
     WrittenNode& node = nodes_[random_.below(nodes_.size())];
     const uint64_t size = tav::layout::sizeOf(node.header);
-    if (!node.updatable || node.header.nodeOffset + 16 + size > direct_->streamBytes) return;
+    if (!node.updatable || node.header.nodeOffset + 16 + size > direct_->streamBytes)
+    {
+      return;
+    }
     Bytes payload = randomBytes(size);
     payload.reserve(1);
     TAVHeaderData data{node.header, payload.data(), payload.size(), 0};
     const uint32_t buffered = tavUpdateElement(0, buffered_, &data);
-    if (buffered == TAV_RC_DATA_TOO_LARGE && !inRing(node.header)) return; // neither way changes it
+    if (buffered == TAV_RC_DATA_TOO_LARGE && !inRing(node.header))
+    {
+      return; // neither way changes it
+    }
     written(tavUpdateElement(0, direct_, &data), buffered, "tavUpdateElement");
   }
 
   /// Reads a node that was written before, or what an arbitrary place looks like as one.
   void readBack()
   {
-    if (nodes_.empty()) return;
+    if (nodes_.empty())
+    {
+      return;
+    }
     const TAVHeader& known = nodes_[random_.below(nodes_.size())].header;
     const bool arbitrary = random_.oneIn(4);
     const uint64_t offset = arbitrary ? random_.below(direct_->streamBytes + 20) : known.nodeOffset;
@@ -402,9 +420,15 @@ private:
     const bool inside =
         direct == TAV_RC_OK && end + 8 <= direct_->streamBytes &&
         (tav::layout::isGroup(one.header) || tav::layout::sizeOf(one.header) + 8 <= direct_->streamBytes - end);
-    if (!inside || (!wideHere && one.header.hdr32.type == TAV_TYPE_HEADER64)) return;
+    if (!inside || (!wideHere && one.header.hdr32.type == TAV_TYPE_HEADER64))
+    {
+      return;
+    }
     same(std::memcmp(&one.header, &other.header, sizeof one.header) == 0, "header read back at ", offset);
-    if (tav::layout::isGroup(one.header)) return;
+    if (tav::layout::isGroup(one.header))
+    {
+      return;
+    }
     const uint64_t size = tav::layout::sizeOf(one.header);
     same(buffered == (inRing(one.header) ? TAV_RC_OK : TAV_RC_DATA_TOO_LARGE), "read back: ", nameOf(buffered));
     same(buffered != TAV_RC_OK || std::memcmp(one.pDataBuf, other.pDataBuf, size) == 0, "data read back at ", offset);
@@ -428,7 +452,10 @@ private:
 
   void resetHandle()
   {
-    if (!random_.oneIn(6)) return;
+    if (!random_.oneIn(6))
+    {
+      return;
+    }
     TAVResetParam param;
     const uint32_t direct = tavResetHandle(direct_, &param);
     written(direct, tavResetHandle(buffered_, &param), "tavResetHandle");

@@ -33,14 +33,23 @@ KORTraceSink witness = nullptr;
 
 void traceAllTo(KORTraceSink sink)
 {
-  if (witness != nullptr) korTraceStop();
+  if (witness != nullptr)
+  {
+    korTraceStop();
+  }
   witness = sink;
-  if (witness != nullptr) korTraceStart(witness, nullptr);
+  if (witness != nullptr)
+  {
+    korTraceStart(witness, nullptr);
+  }
 }
 
 TraceLog::TraceLog()
 {
-  if (witness != nullptr) korTraceStop();
+  if (witness != nullptr)
+  {
+    korTraceStop();
+  }
   if (korTraceStart(&TraceLog::sink, this) != TAV_RC_OK)
   {
     throw std::logic_error("a trace is running already");
@@ -50,12 +59,18 @@ TraceLog::TraceLog()
 TraceLog::~TraceLog()
 {
   korTraceStop();
-  if (witness != nullptr) korTraceStart(witness, nullptr);
+  if (witness != nullptr)
+  {
+    korTraceStart(witness, nullptr);
+  }
 }
 
 void TraceLog::sink(void* context, const KORTraceRecord* record)
 {
-  if (witness != nullptr) witness(nullptr, record);
+  if (witness != nullptr)
+  {
+    witness(nullptr, record);
+  }
   auto& log = *static_cast<TraceLog*>(context);
   Record copy{record->kind, record->threadId, record->probe, record->point, record->code, {}};
   for (uint32_t i = 0; i < record->itemCount; ++i)

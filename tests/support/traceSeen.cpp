@@ -26,7 +26,10 @@ void note(void* /*context*/, const KORTraceRecord* record)
   for (uint64_t at = key * 0x9E3779B97F4A7C15U >> 50U;; at = (at + 1) % seen.size())
   {
     uint64_t there = 0;
-    if (seen[at].compare_exchange_strong(there, key) || there == key) return;
+    if (seen[at].compare_exchange_strong(there, key) || there == key)
+    {
+      return;
+    }
   }
 }
 
@@ -35,17 +38,26 @@ class Witness : public testing::Environment
 public:
   void SetUp() override
   {
-    if (file_ != nullptr) test::traceAllTo(note);
+    if (file_ != nullptr)
+    {
+      test::traceAllTo(note);
+    }
   }
   void TearDown() override
   {
-    if (file_ == nullptr) return;
+    if (file_ == nullptr)
+    {
+      return;
+    }
     test::traceAllTo(nullptr);
     std::ofstream out(file_);
     for (const std::atomic<uint64_t>& one : seen)
     {
       const uint64_t key = one.load();
-      if (key == 0) continue;
+      if (key == 0)
+      {
+        continue;
+      }
       out << (key >> 32U) << ' ' << (key >> 28U & 0xFU) << ' ' << (key >> 12U & 0xFFFFU) << ' ';
       out << (key & 0xFFFU) << '\n';
     }

@@ -118,7 +118,10 @@ private:
     const TAVHeader& one = direct.node.header;
     same(std::memcmp(&one, &buffered.node.header, sizeof one) == 0, "headers at ", one.nodeOffset, " and ",
          buffered.node.header.nodeOffset);
-    if (buffered.code != TAV_RC_OK) return;
+    if (buffered.code != TAV_RC_OK)
+    {
+      return;
+    }
     if (tav::layout::isGroup(one))
     {
       same(buffered.node.pDataBuf == nullptr && buffered.node.dataBufSize == 0, "a group with data");
@@ -137,7 +140,10 @@ private:
     ask([&](TAVHandle* handle, TAVHeaderData& node) { return tavReadNodeInt(0, handle, offset, wide, &node); }, direct,
         buffered);
     // Direct memory takes a 32-bit header of type 2 for a data element.
-    if (!wide && direct.node.header.hdr32.type == TAV_TYPE_HEADER64) return buffered;
+    if (!wide && direct.node.header.hdr32.type == TAV_TYPE_HEADER64)
+    {
+      return buffered;
+    }
     const uint32_t expected = expectedRead(direct.node, direct.code);
     same(buffered.code == expected, "read at ", offset, ": ", nameOf(direct.code), " direct, ", nameOf(buffered.code),
          " buffered");
@@ -165,7 +171,10 @@ private:
                          (buffered.code != TAV_RC_END_OF_STORAGE || ranOut(direct.code));
     if ((bothOk && sameNode) || sameEnd)
     {
-      if (bothOk && direct.node.header.hdrType != 0) compareNodes(direct, buffered);
+      if (bothOk && direct.node.header.hdrType != 0)
+      {
+        compareNodes(direct, buffered);
+      }
       return direct;
     }
     same(meetsLargeData(call), what, ": ", nameOf(direct.code), " at ", direct.node.header.nodeOffset, " direct, ",
@@ -188,14 +197,20 @@ private:
       });
       if (answer.code != TAV_RC_OK)
       {
-        if (parents.size() < 2) return;
+        if (parents.size() < 2)
+        {
+          return;
+        }
         previous = parents.back();
         parents.pop_back();
         first = false;
         continue;
       }
       const TAVHeader& node = answer.node.header;
-      if (!tav::layout::is64(node) && node.hdr32.type == TAV_TYPE_HEADER64) return; // a group through the ring alone
+      if (!tav::layout::is64(node) && node.hdr32.type == TAV_TYPE_HEADER64)
+      {
+        return; // a group through the ring alone
+      }
       visited_.push_back(node);
       previous = node;
       first = tav::layout::isGroup(node) && parents.size() < 100;
@@ -220,13 +235,19 @@ private:
   /// From the last node visited to the front, as far as pairs lead.
   void walkBack()
   {
-    if (visited_.empty()) return;
+    if (visited_.empty())
+    {
+      return;
+    }
     TAVHeaderData at{visited_.back(), nullptr, 0, 0};
     for (uint64_t left = 30; left != 0; --left)
     {
       const Answer answer = compareCalls(
           "a walk back", [&](TAVHandle* handle, TAVHeaderData& node) { return tavGetPrevNode(0, handle, &at, &node); });
-      if (answer.code != TAV_RC_OK) return;
+      if (answer.code != TAV_RC_OK)
+      {
+        return;
+      }
       at.header = answer.node.header;
     }
   }
@@ -268,7 +289,10 @@ private:
 
   void search()
   {
-    if (visited_.empty()) return;
+    if (visited_.empty())
+    {
+      return;
+    }
     TAVHeader parent = visited_[random_.below(visited_.size())];
     const uint32_t elm = tav::layout::elmOf(visited_[random_.below(visited_.size())]);
     const auto deepest = static_cast<uint32_t>(random_.below(3));
@@ -281,7 +305,10 @@ private:
       {
         found = {};
         rc = tavFindElmInt(handle, &parent, 0, deepest, key, elm, left == 6 ? nullptr : &last.header, &stack, &found);
-        if (rc == TAV_RC_OK && found.header.hdrType == 0) break; // entered a group
+        if (rc == TAV_RC_OK && found.header.hdrType == 0)
+        {
+          break; // entered a group
+        }
         last = found;
       }
       return rc;
@@ -291,10 +318,16 @@ private:
   /// A path whose first entry is known to match: one that misses there does not come back.
   void searchPath()
   {
-    if (root_.hdrType == 0 || !tav::layout::isGroup(root_)) return;
+    if (root_.hdrType == 0 || !tav::layout::isGroup(root_))
+    {
+      return;
+    }
     Answer answer;
     const uint32_t rc = tavGetNextChild(0, buffered_->get(), &root_, nullptr, &answer.node);
-    if (rc != TAV_RC_OK || !tav::layout::isGroup(answer.node.header)) return;
+    if (rc != TAV_RC_OK || !tav::layout::isGroup(answer.node.header))
+    {
+      return;
+    }
     const TAVPathEntry path[] = {{0, tav::layout::elmOf(answer.node.header)},
                                  {0, random_.pick<uint32_t>({SQLM_ELM_NODE, SQLM_ELM_DBASE})}};
     TAVFindLogicalGroupParam param{0, path, random_.oneIn(2) ? 1U : 2U, nullptr, 0};
@@ -305,7 +338,10 @@ private:
 
   void validate()
   {
-    if (root_.hdrType == 0) return;
+    if (root_.hdrType == 0)
+    {
+      return;
+    }
     const uint64_t options = random_.below(2);
     compareCalls("tavValidateSubtreeInt",
                  [&](TAVHandle* handle, TAVHeaderData&) { return tavValidateSubtreeInt(options, handle, &root_); });

@@ -66,7 +66,10 @@ public:
       : number_(number) {}
   ~Descriptor()
   {
-    if (number_ >= 0) ::close(number_);
+    if (number_ >= 0)
+    {
+      ::close(number_);
+    }
   }
   Descriptor(const Descriptor&) = delete;
   Descriptor& operator=(const Descriptor&) = delete;
@@ -89,10 +92,19 @@ mode_t takeOwner(int file, const struct stat& old)
 {
   const mode_t mode = old.st_mode & 07777;
   struct stat now = {};
-  if (::fstat(file, &now) == 0 && now.st_uid == old.st_uid && now.st_gid == old.st_gid) return mode;
-  if (::fchown(file, old.st_uid, old.st_gid) == 0) return mode;
+  if (::fstat(file, &now) == 0 && now.st_uid == old.st_uid && now.st_gid == old.st_gid)
+  {
+    return mode;
+  }
+  if (::fchown(file, old.st_uid, old.st_gid) == 0)
+  {
+    return mode;
+  }
   const mode_t plain = mode & 0777;
-  if (::fchown(file, static_cast<uid_t>(-1), old.st_gid) == 0) return plain;
+  if (::fchown(file, static_cast<uid_t>(-1), old.st_gid) == 0)
+  {
+    return plain;
+  }
   // Another group than before gets no more than everybody.
   return (plain & 0707) | ((plain & 07) << 3);
 }
@@ -109,12 +121,21 @@ uint32_t synced(int file)
 uint32_t finishFile(const std::string& from, const std::string& to, bool replace)
 {
   const Descriptor file(::open(from.c_str(), O_WRONLY | O_NOFOLLOW | O_CLOEXEC));
-  if (file.number() < 0) return codeOfSystemError(errno);
+  if (file.number() < 0)
+  {
+    return codeOfSystemError(errno);
+  }
   struct stat old = {};
   const bool known = replace && ::lstat(to.c_str(), &old) == 0;
-  if (known && !S_ISREG(old.st_mode)) return KOR_RC_FILE_EXISTS; // something else took the name just now
+  if (known && !S_ISREG(old.st_mode))
+  {
+    return KOR_RC_FILE_EXISTS; // something else took the name just now
+  }
   const mode_t mode = known ? takeOwner(file.number(), old) : modeOfNewFiles();
-  if (::fchmod(file.number(), mode) != 0 && errno != EPERM && errno != EOPNOTSUPP) return codeOfSystemError(errno);
+  if (::fchmod(file.number(), mode) != 0 && errno != EPERM && errno != EOPNOTSUPP)
+  {
+    return codeOfSystemError(errno);
+  }
   return synced(file.number());
 }
 
@@ -129,7 +150,10 @@ uint32_t giveName(const std::string& from, const std::string& to, bool replace)
       return TAV_RC_OK;
     }
     std::error_code error;
-    if (errno == EEXIST || fs::exists(to, error)) return KOR_RC_FILE_EXISTS;
+    if (errno == EEXIST || fs::exists(to, error))
+    {
+      return KOR_RC_FILE_EXISTS;
+    }
     // A file system without links: the name was free a moment ago.
   }
   return ::rename(from.c_str(), to.c_str()) == 0 ? TAV_RC_OK : codeOfSystemError(errno);
@@ -171,7 +195,10 @@ FILE* openStream(const std::string& path, const char* mode, uint32_t& code)
   {
     const int copy = ::fcntl(*own, F_DUPFD_CLOEXEC, 3);
     stream = copy < 0 ? nullptr : ::fdopen(copy, mode);
-    if (stream == nullptr && copy >= 0) ::close(copy);
+    if (stream == nullptr && copy >= 0)
+    {
+      ::close(copy);
+    }
   }
   else
   {
@@ -191,7 +218,10 @@ FILE* openStream(const std::string& path, const char* mode, uint32_t& code)
 uint32_t moveIntoPlace(const std::string& from, const std::string& to, bool replace)
 {
   uint32_t code = finishFile(from, to, replace);
-  if (code == TAV_RC_OK) code = giveName(from, to, replace);
+  if (code == TAV_RC_OK)
+  {
+    code = giveName(from, to, replace);
+  }
   return code == TAV_RC_OK ? syncFolderOf(to) : code;
 }
 } // namespace tav::host

@@ -55,9 +55,15 @@ bool isTerminal(FILE* stream)
 
 std::optional<unsigned> terminalWidth()
 {
-  if (!isTerminal(stdout)) return std::nullopt;
+  if (!isTerminal(stdout))
+  {
+    return std::nullopt;
+  }
   winsize size{};
-  if (::ioctl(::fileno(stdout), TIOCGWINSZ, &size) == 0 && size.ws_col != 0) return size.ws_col;
+  if (::ioctl(::fileno(stdout), TIOCGWINSZ, &size) == 0 && size.ws_col != 0)
+  {
+    return size.ws_col;
+  }
   return 80;
 }
 
@@ -68,7 +74,10 @@ void prepareStandardStreams()
   for (const int number : {SIGINT, SIGTERM, SIGHUP, SIGQUIT})
   {
     // Who was told to ignore a signal (nohup) goes on ignoring it.
-    if (std::signal(number, endBySignal) == SIG_IGN) std::signal(number, SIG_IGN);
+    if (std::signal(number, endBySignal) == SIG_IGN)
+    {
+      std::signal(number, SIG_IGN);
+    }
   }
 }
 
@@ -90,7 +99,10 @@ HeldInterrupts::HeldInterrupts()
 HeldInterrupts::~HeldInterrupts()
 {
   held = 0;
-  if (waiting != 0) endBySignal(waiting);
+  if (waiting != 0)
+  {
+    endBySignal(waiting);
+  }
 }
 
 CaughtInterrupt::CaughtInterrupt()

@@ -51,7 +51,10 @@ std::vector<std::string> commandLine(int argc, char** argv)
   // The words of `main` are in the code page of the machine, which cannot name every file.
   int count = 0;
   LPWSTR* const words = CommandLineToArgvW(GetCommandLineW(), &count);
-  if (words == nullptr) return {argv + std::min(argc, 1), argv + argc};
+  if (words == nullptr)
+  {
+    return {argv + std::min(argc, 1), argv + argc};
+  }
   std::vector<std::string> texts;
   for (int i = 1; i < count; ++i) texts.push_back(narrow(words[i]));
   LocalFree(static_cast<HLOCAL>(words));
@@ -72,7 +75,10 @@ bool isTerminal(FILE* stream)
 
 std::optional<unsigned> terminalWidth()
 {
-  if (!isTerminal(stdout)) return std::nullopt;
+  if (!isTerminal(stdout))
+  {
+    return std::nullopt;
+  }
   CONSOLE_SCREEN_BUFFER_INFO info{};
   if (GetConsoleScreenBufferInfo(GetStdHandle(STD_OUTPUT_HANDLE), &info) && info.srWindow.Right > info.srWindow.Left)
     return static_cast<unsigned>(info.srWindow.Right - info.srWindow.Left + 1);
@@ -84,20 +90,29 @@ void prepareStandardStreams()
   for (FILE* const stream : {stdin, stdout, stderr}) _setmode(_fileno(stream), _O_BINARY);
   for (const int number : {SIGINT, SIGTERM, SIGBREAK})
   {
-    if (std::signal(number, endBySignal) == SIG_IGN) std::signal(number, SIG_IGN);
+    if (std::signal(number, endBySignal) == SIG_IGN)
+    {
+      std::signal(number, SIG_IGN);
+    }
   }
 }
 
 void removeOnInterrupt(const std::string& path)
 {
   std::wstring wide;
-  if (widen(path.c_str(), wide) == ERROR_SUCCESS) filesToRemove.add(wide);
+  if (widen(path.c_str(), wide) == ERROR_SUCCESS)
+  {
+    filesToRemove.add(wide);
+  }
 }
 
 void keepOnInterrupt(const std::string& path)
 {
   std::wstring wide;
-  if (widen(path.c_str(), wide) == ERROR_SUCCESS) filesToRemove.drop(wide);
+  if (widen(path.c_str(), wide) == ERROR_SUCCESS)
+  {
+    filesToRemove.drop(wide);
+  }
 }
 
 HeldInterrupts::HeldInterrupts()
@@ -108,7 +123,10 @@ HeldInterrupts::HeldInterrupts()
 HeldInterrupts::~HeldInterrupts()
 {
   held = 0;
-  if (waiting != 0) endBySignal(waiting);
+  if (waiting != 0)
+  {
+    endBySignal(waiting);
+  }
 }
 
 CaughtInterrupt::CaughtInterrupt()

@@ -17,7 +17,10 @@ public:
   void add(const std::basic_string<Char>& path)
   {
     Slot* const slot = std::find_if(slots_, slots_ + kSlots, [](const Slot& place) { return place.used == 0; });
-    if (slot == slots_ + kSlots || path.empty() || path.size() >= kLongest) return;
+    if (slot == slots_ + kSlots || path.empty() || path.size() >= kLongest)
+    {
+      return;
+    }
     std::copy_n(path.c_str(), path.size() + 1, slot->path);
     slot->used = 1; // from here on the handler looks at it
   }
@@ -25,7 +28,10 @@ public:
   void drop(const std::basic_string<Char>& path)
   {
     for (Slot& slot : slots_)
-      if (slot.used != 0 && path == slot.path) slot.used = 0;
+      if (slot.used != 0 && path == slot.path)
+      {
+        slot.used = 0;
+      }
   }
 
   /// In the handler: calls `remove` with every path.
@@ -33,7 +39,10 @@ public:
   void each(Remove remove) const
   {
     for (const Slot& slot : slots_)
-      if (slot.used != 0) remove(slot.path);
+      if (slot.used != 0)
+      {
+        remove(slot.path);
+      }
   }
 
 private:

@@ -16,7 +16,10 @@ std::string computerName()
   DWORD units = 0;
   GetComputerNameExW(ComputerNameDnsHostname, nullptr, &units);
   std::wstring name(units, L'\0');
-  if (!GetComputerNameExW(ComputerNameDnsHostname, name.data(), &units)) return {};
+  if (!GetComputerNameExW(ComputerNameDnsHostname, name.data(), &units))
+  {
+    return {};
+  }
   return narrow(name.c_str());
 }
 

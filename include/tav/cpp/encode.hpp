@@ -22,15 +22,42 @@ template<uint16_t Type>
 constexpr auto makeIntegerOf() noexcept
 {
   // clang-format off
-  if constexpr (Type == TAV_TYPE_UINT8 || Type == TAV_TYPE_BYTE) return std::type_identity<uint8_t>();
-  else if constexpr (Type == TAV_TYPE_SINT8) return std::type_identity<int8_t>();
-  else if constexpr (Type == TAV_TYPE_UINT16) return std::type_identity<uint16_t>();
-  else if constexpr (Type == TAV_TYPE_SINT16) return std::type_identity<int16_t>();
-  else if constexpr (Type == TAV_TYPE_UINT32) return std::type_identity<uint32_t>();
-  else if constexpr (Type == TAV_TYPE_SINT32) return std::type_identity<int32_t>();
-  else if constexpr (Type == TAV_TYPE_UINT64) return std::type_identity<uint64_t>();
-  else if constexpr (Type == TAV_TYPE_SINT64) return std::type_identity<int64_t>();
-  else return std::type_identity<void>();
+  if constexpr (Type == TAV_TYPE_UINT8 || Type == TAV_TYPE_BYTE)
+  {
+    return std::type_identity<uint8_t>();
+  }
+  else if constexpr (Type == TAV_TYPE_SINT8)
+  {
+    return std::type_identity<int8_t>();
+  }
+  else if constexpr (Type == TAV_TYPE_UINT16)
+  {
+    return std::type_identity<uint16_t>();
+  }
+  else if constexpr (Type == TAV_TYPE_SINT16)
+  {
+    return std::type_identity<int16_t>();
+  }
+  else if constexpr (Type == TAV_TYPE_UINT32)
+  {
+    return std::type_identity<uint32_t>();
+  }
+  else if constexpr (Type == TAV_TYPE_SINT32)
+  {
+    return std::type_identity<int32_t>();
+  }
+  else if constexpr (Type == TAV_TYPE_UINT64)
+  {
+    return std::type_identity<uint64_t>();
+  }
+  else if constexpr (Type == TAV_TYPE_SINT64)
+  {
+    return std::type_identity<int64_t>();
+  }
+  else
+  {
+    return std::type_identity<void>();
+  }
   // clang-format on
 }
 

@@ -37,7 +37,10 @@ std::string folderOf(const std::string& path)
 
 bool fails(int file)
 {
-  if (!isToFail || !isAt(file, watchedPath)) return false;
+  if (!isToFail || !isAt(file, watchedPath))
+  {
+    return false;
+  }
   isToFail = false;
   errno = EIO;
   return true;

@@ -63,7 +63,10 @@ private:
   {
     rlimit limit = before_;
     limit.rlim_cur = bytes;
-    if (setrlimit(RLIMIT_FSIZE, &limit) != 0) throw std::runtime_error("no limit");
+    if (setrlimit(RLIMIT_FSIZE, &limit) != 0)
+    {
+      throw std::runtime_error("no limit");
+    }
   }
 
   TestFolder folder_;
@@ -80,7 +83,10 @@ public:
   }
   ~SmallDisk() override
   {
-    if (mounted_) umount2(folder_.path().c_str(), MNT_DETACH);
+    if (mounted_)
+    {
+      umount2(folder_.path().c_str(), MNT_DETACH);
+    }
   }
   [[nodiscard]] bool isMounted() const { return mounted_; }
   [[nodiscard]] std::string path() const override { return folder_ / "x.tav"; }
@@ -214,8 +220,14 @@ public:
     {
       act = acts_[at_];
       code = script_->act(act);
-      if (code != TAV_RC_OK) return true;
-      if (act == Act::reset) stored_ = length();
+      if (code != TAV_RC_OK)
+      {
+        return true;
+      }
+      if (act == Act::reset)
+      {
+        stored_ = length();
+      }
     }
     return false;
   }
@@ -264,7 +276,10 @@ void fillUp(Disk& disk, uint64_t step)
     Life life(disk, room);
     Act act{};
     uint32_t code = TAV_RC_OK;
-    if (!life.untilFull(act, code)) continue;
+    if (!life.untilFull(act, code))
+    {
+      continue;
+    }
     ++met[act];
     // A small write whose page cannot be made room for is refused as one outside the cached range.
     ASSERT_THAT(code, testing::AnyOf(disk.code(), TAV_RC_BAD_PARAM)) << korCodeName(code);
@@ -289,7 +304,10 @@ TEST(FullDisk, OfAFileSizeLimitIsReportedAndTheStreamGoesOnWhenThereIsRoom)
 TEST(FullDisk, OfASmallFileSystemIsReportedAndTheStreamGoesOnWhenThereIsRoom)
 {
   SmallDisk disk;
-  if (!disk.isMounted()) GTEST_SKIP() << "mounting is not allowed here";
+  if (!disk.isMounted())
+  {
+    GTEST_SKIP() << "mounting is not allowed here";
+  }
   fillUp(disk, 4096);
 }
 
@@ -324,7 +342,10 @@ TEST(FullDisk, ThatStaysFullKeepsWhatWasStored)
 TEST(WithdrawnPermission, IsReportedByTheNextWriteAndLeavesWhatIsStored)
 {
   const int file = static_cast<int>(syscall(SYS_memfd_create, "withdrawn", 2U /* seals are allowed */));
-  if (file < 0) GTEST_SKIP() << "no file in memory";
+  if (file < 0)
+  {
+    GTEST_SKIP() << "no file in memory";
+  }
   const std::string path = "/proc/self/fd/" + std::to_string(file);
   KORFileOpenParam param;
   param.pPath = path.c_str();
@@ -358,11 +379,17 @@ public:
   Nobody()
       : before_(geteuid())
   {
-    if (before_ == 0 && seteuid(65534) != 0) throw std::runtime_error("root stays root");
+    if (before_ == 0 && seteuid(65534) != 0)
+    {
+      throw std::runtime_error("root stays root");
+    }
   }
   ~Nobody()
   {
-    if (before_ == 0 && seteuid(0) != 0) std::abort();
+    if (before_ == 0 && seteuid(0) != 0)
+    {
+      std::abort();
+    }
   }
   Nobody(const Nobody&) = delete;
   Nobody& operator=(const Nobody&) = delete;

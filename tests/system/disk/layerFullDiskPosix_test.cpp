@@ -23,7 +23,10 @@ public:
     getrlimit(RLIMIT_FSIZE, &before_);
     rlimit limit = before_;
     limit.rlim_cur = bytes;
-    if (setrlimit(RLIMIT_FSIZE, &limit) != 0) throw std::runtime_error("no limit");
+    if (setrlimit(RLIMIT_FSIZE, &limit) != 0)
+    {
+      throw std::runtime_error("no limit");
+    }
   }
   ~SizeLimit()
   {
@@ -47,7 +50,10 @@ uint64_t writeWithRoomFor(uint64_t room, uint64_t elements, TAVSideStorage& stor
   const auto tried = [&](const auto& operation) {
     std::error_code ec;
     operation(ec);
-    if (!ec) return;
+    if (!ec)
+    {
+      return;
+    }
     ++failures;
     failed(ec);
     limit.reset();

@@ -23,9 +23,15 @@ std::atomic<int64_t> liveBlocks{0};
 /// Counts a call; true when it is the one that fails, once.
 bool isTurn(Kind kind)
 {
-  if (!calls.watching) return false;
+  if (!calls.watching)
+  {
+    return false;
+  }
   const uint64_t count = ++calls.counts[static_cast<unsigned>(kind)];
-  if (calls.nth == 0 || calls.kind != kind || calls.nth != count) return false;
+  if (calls.nth == 0 || calls.kind != kind || calls.nth != count)
+  {
+    return false;
+  }
   calls.happened = true;
   return true;
 }
@@ -33,7 +39,10 @@ bool isTurn(Kind kind)
 /// Whether the call fails now; sets errno. A short transfer is no failure.
 bool fails(Kind kind)
 {
-  if (!isTurn(kind) || calls.error == faults::kShort) return false;
+  if (!isTurn(kind) || calls.error == faults::kShort)
+  {
+    return false;
+  }
   errno = calls.error;
   return true;
 }
@@ -48,7 +57,10 @@ size_t lengthOf(Kind kind, size_t length, bool& failed)
 {
   const bool turn = isTurn(kind);
   failed = turn && calls.error >= 0;
-  if (failed) errno = calls.error;
+  if (failed)
+  {
+    errno = calls.error;
+  }
   if (turn && calls.error == faults::kHalfway)
   {
     ++calls.nth;
@@ -83,7 +95,10 @@ void __libc_free(void* block);
 
 EXPORTED void* malloc(size_t size) noexcept
 {
-  if (fails(Kind::malloc)) return nullptr;
+  if (fails(Kind::malloc))
+  {
+    return nullptr;
+  }
   void* const block = __libc_malloc(size);
   liveBlocks += block != nullptr ? 1 : 0;
   return block;
@@ -91,7 +106,10 @@ EXPORTED void* malloc(size_t size) noexcept
 
 EXPORTED void* calloc(size_t count, size_t size) noexcept
 {
-  if (fails(Kind::malloc)) return nullptr;
+  if (fails(Kind::malloc))
+  {
+    return nullptr;
+  }
   void* const block = __libc_calloc(count, size);
   liveBlocks += block != nullptr ? 1 : 0;
   return block;
@@ -99,7 +117,10 @@ EXPORTED void* calloc(size_t count, size_t size) noexcept
 
 EXPORTED void* realloc(void* block, size_t size) noexcept
 {
-  if (fails(Kind::malloc)) return nullptr;
+  if (fails(Kind::malloc))
+  {
+    return nullptr;
+  }
   void* const moved = __libc_realloc(block, size);
   liveBlocks += block == nullptr && moved != nullptr ? 1 : 0;
   return moved;
@@ -122,7 +143,10 @@ EXPORTED int open(const char* path, int flags, ...)
     mode = static_cast<mode_t>(va_arg(more, unsigned));
     va_end(more);
   }
-  if (fails(Kind::open)) return -1;
+  if (fails(Kind::open))
+  {
+    return -1;
+  }
   static const auto real = next<int (*)(const char*, int, ...)>("open");
   return real(path, flags, mode);
 }
@@ -134,7 +158,10 @@ EXPORTED int close(int file)
   const bool failed = fails(Kind::close);
   const int error = errno;
   const int result = real(file);
-  if (failed) errno = error;
+  if (failed)
+  {
+    errno = error;
+  }
   return failed ? -1 : result;
 }
 

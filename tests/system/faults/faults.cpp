@@ -159,7 +159,10 @@ protected:
     silent_ += silent ? 1 : 0;
     const uint32_t code = silent ? kUnseen : life.failures.front().code;
     EXPECT_TRUE(silent || life.failures.front().step == life.faultIn) << "told by another step";
-    if (code == fault.code) return;
+    if (code == fault.code)
+    {
+      return;
+    }
     const auto answers = [&](const OtherAnswer& one) {
       return one.step == life.faultIn && one.kind == fault.kind && one.code == code;
     };
@@ -194,7 +197,10 @@ TEST_P(EveryCallFailsOnce, AndTheSecondAttemptWorks)
     const Life healthy = live(scenario, path);
     ASSERT_TRUE(healthy.failures.empty()) << scenario << ": " << healthy.failures.front().step;
     uint64_t count = healthy.calls.counts[static_cast<unsigned>(fault.kind)];
-    if (fault.error == kHalfway && count != 0) --count; // the one behind fails
+    if (fault.error == kHalfway && count != 0)
+    {
+      --count; // the one behind fails
+    }
     for (uint64_t nth = 1; nth <= count && !HasFailure(); ++nth)
     {
       const Life life = live(scenario, path, fault.kind, nth, fault.error);
@@ -217,7 +223,10 @@ std::vector<Fault> faultsHere()
   for (const Fault& fault : kFaults)
   {
 #if defined(FAULTS_WITHOUT_MALLOC)
-    if (fault.kind == Kind::malloc) continue; // the sanitizer's
+    if (fault.kind == Kind::malloc)
+    {
+      continue; // the sanitizer's
+    }
 #endif
     faults.push_back(fault);
   }

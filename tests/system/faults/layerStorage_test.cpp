@@ -29,7 +29,10 @@ void twice(uint64_t& failures, Operation&& operation)
 {
   std::error_code ec;
   operation(ec);
-  if (!ec) return;
+  if (!ec)
+  {
+    return;
+  }
   ++failures;
   EXPECT_EQ(ec.category(), tav::category());
   operation(ec);
@@ -64,12 +67,21 @@ std::vector<uint32_t> numbers(VectorStorage& storage, std::error_code& ec)
 {
   std::vector<uint32_t> found;
   const tav::Reader reader(storage, options(), ec);
-  if (ec) return found;
+  if (ec)
+  {
+    return found;
+  }
   const tav::Node root = reader.root(ec);
-  if (ec) return found;
+  if (ec)
+  {
+    return found;
+  }
   for (const tav::Node& node : root.descendants(ec))
   {
-    if (node.elm() != TAV_ELM_CMN_CPU_SPEED) continue;
+    if (node.elm() != TAV_ELM_CMN_CPU_SPEED)
+    {
+      continue;
+    }
     std::error_code valueError;
     found.push_back(node.as<uint32_t>(valueError));
     if (valueError)
@@ -126,7 +138,10 @@ TEST(LayerOverAFailingStorage, ReadsEverythingAtTheSecondAttempt)
     EXPECT_LT(found.size(), kHosts + 1U);
     EXPECT_EQ(numbers(storage, ec), expectedNumbers());
     EXPECT_FALSE(ec) << ec.message();
-    if (nth == 1) blocks = allocations::live(); // what the test's own first time takes is taken
+    if (nth == 1)
+    {
+      blocks = allocations::live(); // what the test's own first time takes is taken
+    }
   }
   EXPECT_EQ(allocations::live(), blocks) << "nothing leaks";
 }

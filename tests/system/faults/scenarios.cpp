@@ -80,7 +80,10 @@ public:
   }
   ~OpenedHandle()
   {
-    if (handle_ != nullptr) steps_.call("term", [&] { return tavTermHandle(&handle_); });
+    if (handle_ != nullptr)
+    {
+      steps_.call("term", [&] { return tavTermHandle(&handle_); });
+    }
   }
   OpenedHandle(const OpenedHandle&) = delete;
   OpenedHandle& operator=(const OpenedHandle&) = delete;
@@ -117,7 +120,10 @@ void close(Steps& steps, TAVHandle* handle, uint64_t options = 0)
 
 void flush(Steps& steps, TAVHandle* handle)
 {
-  if (handle->pCircularBuf == nullptr) return;
+  if (handle->pCircularBuf == nullptr)
+  {
+    return;
+  }
   steps.call("reset", [&] { return handle->pCircularBuf->reset(); });
 }
 
@@ -196,7 +202,10 @@ private:
       {
         note("child", node);
         last_ = node;
-        if (node.header.hdr64.size != 0 && node.pDataBuf != nullptr) text_ << "data " << int{node.pDataBuf[0]} << '\n';
+        if (node.header.hdr64.size != 0 && node.pDataBuf != nullptr)
+        {
+          text_ << "data " << int{node.pDataBuf[0]} << '\n';
+        }
       }
     }
   }

@@ -67,7 +67,10 @@ private:
     calls.watching = watching_;
     const uint32_t rc = call();
     calls.watching = false;
-    if (calls.happened && !before) faultIn = step;
+    if (calls.happened && !before)
+    {
+      faultIn = step;
+    }
     return rc;
   }
 

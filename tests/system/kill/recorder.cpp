@@ -57,7 +57,10 @@ private:
   void promise()
   {
     const uint64_t what = random_.below(40);
-    if (what > 1) return;
+    if (what > 1)
+    {
+      return;
+    }
     what == 0 ? writer_.flush() : writer_.sync();
     std::printf("%s %llu\n", what == 0 ? "flushed" : "synced", static_cast<unsigned long long>(next_));
     std::fflush(stdout);
@@ -72,7 +75,10 @@ private:
 
 int main(int argc, char** argv)
 {
-  if (argc != 5) return 2;
+  if (argc != 5)
+  {
+    return 2;
+  }
   const auto number = [&](int at) { return std::strtoull(argv[at], nullptr, 0); };
   try
   {
@@ -81,7 +87,10 @@ int main(int argc, char** argv)
     Recording recording(writer, number(2), number(3));
     {
       tav::Group left = writer.resumed();
-      if (left.isOpen()) recording.add(left, 0);
+      if (left.isOpen())
+      {
+        recording.add(left, 0);
+      }
     }
     while (true)
     {

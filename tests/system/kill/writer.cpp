@@ -20,7 +20,10 @@ namespace
 
 void check(uint32_t code, const char* what)
 {
-  if (code != TAV_RC_OK) fail(what, code);
+  if (code != TAV_RC_OK)
+  {
+    fail(what, code);
+  }
 }
 
 void add(TAVHandle* handle, uint16_t elm, uint16_t type, uint32_t info, const void* payload, uint64_t size)
@@ -56,7 +59,10 @@ void addGroup(TAVHandle* handle, uint32_t number)
 
 int main(int argc, char** argv)
 {
-  if (argc != 6) return 2;
+  if (argc != 6)
+  {
+    return 2;
+  }
   const auto number = [&](int at) { return std::strtoull(argv[at], nullptr, 0); };
   KORFileOpenParam file;
   file.pPath = argv[1];
@@ -75,7 +81,10 @@ int main(int argc, char** argv)
     addGroup(handle, static_cast<uint32_t>(i));
     random = random * 6364136223846793005U + 1442695040888963407U;
     // Now and then everything goes out at once, between two groups, as a program does that wants to be sure.
-    if (random >> 59 == 0) check(handle->pCircularBuf->reset(), "reset");
+    if (random >> 59 == 0)
+    {
+      check(handle->pCircularBuf->reset(), "reset");
+    }
   }
   check(tavCloseHeader(0, handle), "tavCloseHeader");
   check(handle->pCircularBuf->reset(), "reset");

@@ -155,13 +155,19 @@ private:
   TAVHeader pick()
   {
     TAVHeader header = nodes_.empty() ? TAVHeader{} : nodes_[random_.below(nodes_.size())];
-    if (random_.oneIn(12)) disturb(header, random_);
+    if (random_.oneIn(12))
+    {
+      disturb(header, random_);
+    }
     return header;
   }
 
   void keep(uint32_t rc, const TAVHeaderData& node)
   {
-    if (rc == TAV_RC_OK && nodes_.size() < 60) nodes_.push_back(node.header);
+    if (rc == TAV_RC_OK && nodes_.size() < 60)
+    {
+      nodes_.push_back(node.header);
+    }
   }
 
   void nextChild(TAVHeaderData& out)
@@ -171,8 +177,14 @@ private:
     const bool root = nodes_.empty() || random_.oneIn(30);
     const bool first = random_.oneIn(4);
     const bool sameNode = random_.oneIn(6); // the reference's own descriptor is the answer's
-    if (!first && !root && random_.oneIn(2)) parent = lastParent_;
-    if (sameNode) out.header = before;
+    if (!first && !root && random_.oneIn(2))
+    {
+      parent = lastParent_;
+    }
+    if (sameNode)
+    {
+      out.header = before;
+    }
     const uint64_t options = random_.oneIn(40) ? 1 : 0;
     const uint32_t rc = twins_.take("tavGetNextChild", out, [&](TAVHandle* handle, TAVHeaderData& node) {
       TAVHeader* const reference = first ? nullptr : sameNode ? &node.header
@@ -218,7 +230,10 @@ private:
     keep(twins_.take("tavFindElmInt", out,
                      [&](TAVHandle* handle, TAVHeaderData& node) {
                        TAVHdrStack stack;
-                       if (own && !fresh) stack.push(&parent);
+                       if (own && !fresh)
+                       {
+                         stack.push(&parent);
+                       }
                        const uint32_t rc = tavFindElmInt(handle, &parent, 0, deepest, 0, elm, fresh ? nullptr : &resume,
                                                          own ? &stack : nullptr, &node);
                        counts[handle == twins_.fast() ? 0 : 1] = stack.count;
@@ -329,9 +344,15 @@ void addNode(Twins& twins, Random& random, bool usual)
     const uint64_t there = node.payload.size();
     disturb(data.header, random);
     data.dataBufSize = tav::layout::sizeOf(data.header) <= there && random.oneIn(2) ? 0 : there;
-    if (random.oneIn(6)) data.pDataBuf = nullptr;
+    if (random.oneIn(6))
+    {
+      data.pDataBuf = nullptr;
+    }
     // Without a length the header's size is believed.
-    if (data.dataBufSize == 0 && tav::layout::sizeOf(data.header) > there) return;
+    if (data.dataBufSize == 0 && tav::layout::sizeOf(data.header) > there)
+    {
+      return;
+    }
   }
   const uint64_t options = random.oneIn(50) ? 1 : 0;
   twins.take("tavAddElement", data,

@@ -54,7 +54,10 @@ void walk(TAVHandle* handle)
   {
     rc = tavGetNextChild(0, handle, &root.header, &nodes[i % 2].header, &nodes[(i + 1) % 2]);
   }
-  if (rc != TAV_RC_NO_MORE_CHILDREN) check(rc, "walk");
+  if (rc != TAV_RC_NO_MORE_CHILDREN)
+  {
+    check(rc, "walk");
+  }
 }
 
 void walkBack(TAVHandle* handle, uint64_t end)
@@ -83,7 +86,10 @@ void searchInVain(TAVHandle* handle)
 {
   TAVHeader root = rootOf(handle);
   TAVHeaderData found{};
-  if (tavFindElmInt(handle, &root, 0, 0, 0, 1, nullptr, nullptr, &found) != TAV_RC_NOT_FOUND) std::abort();
+  if (tavFindElmInt(handle, &root, 0, 0, 0, 1, nullptr, nullptr, &found) != TAV_RC_NOT_FOUND)
+  {
+    std::abort();
+  }
 }
 
 void print(TAVHandle* handle, uint64_t options)

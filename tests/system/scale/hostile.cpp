@@ -61,7 +61,10 @@ uint64_t print(StreamReader& reader, uint64_t options)
 uint64_t walk(StreamReader& reader)
 {
   TAVHeaderData node{};
-  if (tavGetNextChild(0, reader.handle(), nullptr, nullptr, &node) != TAV_RC_OK) return 0;
+  if (tavGetNextChild(0, reader.handle(), nullptr, nullptr, &node) != TAV_RC_OK)
+  {
+    return 0;
+  }
   tav::inside::WalkGuard guard(node.header);
   std::vector<TAVHeader> stack{node.header};
   bool first = true;
@@ -80,7 +83,10 @@ uint64_t walk(StreamReader& reader)
     {
       return 0;
     }
-    if (first) stack.push_back(node.header);
+    if (first)
+    {
+      stack.push_back(node.header);
+    }
   }
   return 0;
 }
@@ -118,7 +124,10 @@ uint64_t nodesFromIndex(StreamReader& reader, uint64_t options)
   uint64_t index = 0;
   for (uint64_t calls = 0; calls < 64; ++calls)
   {
-    if (tavFindNodeFromIndex(options, reader.handle(), index, 0, &node) != TAV_RC_OK) break;
+    if (tavFindNodeFromIndex(options, reader.handle(), index, 0, &node) != TAV_RC_OK)
+    {
+      break;
+    }
     index = std::max(index, node.header.nodeOffset) + 16;
   }
   return 0;
@@ -133,7 +142,10 @@ uint64_t search(StreamReader& reader)
     TAVHeaderData found{};
     tavFindElmInt(reader.handle(), &parent, 0, 0, 0, 1000, nullptr, nullptr, &found);
     TAVHdrStack stack;
-    if (tavFindElmInt(reader.handle(), &parent, 0, 1, 0, 1000, nullptr, &stack, &found) != TAV_RC_OK) break;
+    if (tavFindElmInt(reader.handle(), &parent, 0, 1, 0, 1000, nullptr, &stack, &found) != TAV_RC_OK)
+    {
+      break;
+    }
     parent = *stack.top();
   }
   return 0;
@@ -157,7 +169,10 @@ uint64_t searchPath(StreamReader& reader)
       break;
     }
   }
-  if (elm == 0) return 0;
+  if (elm == 0)
+  {
+    return 0;
+  }
   std::vector<TAVPathEntry> path(6, TAVPathEntry{0, elm});
   path.push_back({0, 1000});
   TAVFindLogicalGroupParam param{0, path.data(), static_cast<uint32_t>(path.size()), nullptr, 0};

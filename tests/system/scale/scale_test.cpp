@@ -42,7 +42,10 @@ protected:
       data.header = header32(sizeof i, TAV_TYPE_UINT32, 7);
       data.pDataBuf = reinterpret_cast<uint8_t*>(&i);
       data.dataBufSize = sizeof i;
-      if (const uint32_t rc = tavAddElement(0, handle, &data); rc != TAV_RC_OK) check(rc, "sibling");
+      if (const uint32_t rc = tavAddElement(0, handle, &data); rc != TAV_RC_OK)
+      {
+        check(rc, "sibling");
+      }
     }
     check(tavCloseHeader(0, handle), "close");
   }

@@ -66,7 +66,10 @@ public:
   void stop()
   {
     ended_ = true;
-    if (thread_.joinable()) thread_.join();
+    if (thread_.joinable())
+    {
+      thread_.join();
+    }
   }
 
   std::atomic<uint64_t> records{0};
@@ -165,7 +168,10 @@ TEST(HandlesOfTheirOwn, NestDeeplyInEightThreads)
         const TAVHeader header = header64(0, TAV_TYPE_HEADER64, 1);
         uint64_t count = 0;
         while (stack.push(&header) == TAV_RC_OK) ++count;
-        if (count == 4000) ++deepest;
+        if (count == 4000)
+        {
+          ++deepest;
+        }
       }
     });
   }

@@ -20,14 +20,20 @@ Function* next(const char* name)
 __attribute__((format(printf, 1, 2))) void tell(const char* format, ...)
 {
   const char* const path = std::getenv("TAV_CALLS");
-  if (path == nullptr) return;
+  if (path == nullptr)
+  {
+    return;
+  }
   char line[9000];
   std::va_list values;
   va_start(values, format);
   const int length = std::vsnprintf(line, sizeof line, format, values);
   va_end(values);
   const int file = next<int(const char*, int, ...)>("open")(path, O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC, 0600);
-  if (::write(file, line, static_cast<size_t>(length)) != length) std::abort();
+  if (::write(file, line, static_cast<size_t>(length)) != length)
+  {
+    std::abort();
+  }
   ::close(file);
 }
 
@@ -45,7 +51,10 @@ struct Path
 
 int opened(const char* function, const char* path, int flags, mode_t mode)
 {
-  if ((flags & O_CREAT) != 0) tell("open %04o %s\n", static_cast<unsigned>(mode), path);
+  if ((flags & O_CREAT) != 0)
+  {
+    tell("open %04o %s\n", static_cast<unsigned>(mode), path);
+  }
   return next<int(const char*, int, ...)>(function)(path, flags, mode);
 }
 

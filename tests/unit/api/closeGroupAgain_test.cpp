@@ -75,7 +75,10 @@ public:
 
   uint32_t seek(uint64_t offset, uint64_t hint) override
   {
-    if (isHit(Fault::refused)) return kRefusal;
+    if (isHit(Fault::refused))
+    {
+      return kRefusal;
+    }
     return VectorStorage::seek(isHit(Fault::elsewhere) ? offset + 1 : offset, hint);
   }
 
@@ -88,14 +91,20 @@ public:
                 bool backward) override
   {
     *pRead = 0;
-    if (isHit(Fault::refused)) return kRefusal;
+    if (isHit(Fault::refused))
+    {
+      return kRefusal;
+    }
     return VectorStorage::read(wanted, ppData, bufSize, pRead, zeroCopy, backward);
   }
 
   uint32_t write(const void* pData, uint64_t size, uint64_t* pWritten) override
   {
     *pWritten = 0;
-    if (isHit(Fault::refused) || isHit(Fault::full)) return kRefusal;
+    if (isHit(Fault::refused) || isHit(Fault::full))
+    {
+      return kRefusal;
+    }
     const bool cutOff = isHit(Fault::cutOff);
     const uint64_t length = cutOff || isHit(Fault::cutShort) ? size / 2 : size;
     const uint32_t rc = VectorStorage::write(pData, length, pWritten);

@@ -257,7 +257,10 @@ TEST(CloseHeaderSize, StaysInTheEntryThatWasTakenOffTheStack)
     writer.add(group64(kRoot));
     writer.add(u32(kRoot, 1));
     std::optional<TraceLog> trace;
-    if (traced) trace.emplace();
+    if (traced)
+    {
+      trace.emplace();
+    }
     ASSERT_EQ(tavCloseHeader(0, writer.handle()), TAV_RC_OK);
     const TAVHdrStack& stack = *writer.handle()->pHdrStack;
     EXPECT_EQ(stack.count, 0U);

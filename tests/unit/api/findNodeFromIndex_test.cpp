@@ -354,7 +354,10 @@ TEST_P(NodeFromIndex, ReadsNodesWithoutOptions)
   uint64_t reads = 0;
   for (const Record& record : trace.recordsOf(probe::readNode))
   {
-    if (record.kind != KOR_TRACE_VAR || record.point != 0) continue;
+    if (record.kind != KOR_TRACE_VAR || record.point != 0)
+    {
+      continue;
+    }
     ++reads;
     EXPECT_EQ(record.items.at(0), bytesOf(uint64_t{0}));
   }

@@ -112,7 +112,10 @@ TEST_P(OwnNumberAsPayload, OfManyBytesIsTheWholeDescriptorAsTheCallerLeftIt)
   node_.header.hdr64.size = sizeof node_;
   node_.dataBufSize = sizeof node_;
   node_.pDataBuf = reinterpret_cast<uint8_t*>(&node_);
-  if (GetParam().form.align) node_.header.hdr64.info |= TAV_INFO_ALIGNED8; // the one change that is made before
+  if (GetParam().form.align)
+  {
+    node_.header.hdr64.info |= TAV_INFO_ALIGNED8; // the one change that is made before
+  }
   const Bytes before(node_.pDataBuf, node_.pDataBuf + sizeof node_);
   ASSERT_EQ(tavAddElement(0, writer_.handle(), &node_), TAV_RC_OK);
   const Bytes all = writer_.bytes();

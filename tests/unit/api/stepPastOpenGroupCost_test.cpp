@@ -19,7 +19,10 @@ const HostileFamily& familyOf(const std::string& name)
 {
   for (const HostileFamily& family : hostileFamilies())
   {
-    if (name == family.name) return family;
+    if (name == family.name)
+    {
+      return family;
+    }
   }
   throw std::runtime_error("no such family: " + name);
 }

@@ -53,7 +53,10 @@ Sample sampleOf(const Form& form)
   for (uint64_t i = 0; i < 20; ++i)
   {
     sample.lastValue = writer.add(u64(i == 19 ? kLast : kValue, i, true, TAV_INFO_EYE_SIZE));
-    if (i == 0) sample.firstValue = sample.lastValue;
+    if (i == 0)
+    {
+      sample.firstValue = sample.lastValue;
+    }
   }
   sample.openGroup = writer.add(group64(kGroup, TAV_TYPE_HEADER64, TAV_INFO_EYE_SIZE));
   writer.add(binary(kValue, Bytes(40, 7)));

@@ -18,10 +18,16 @@ class Child
 public:
   explicit Child(const std::function<uint32_t()>& work)
   {
-    if (pipe(pipe_.data()) != 0) throw std::runtime_error("no pipe");
+    if (pipe(pipe_.data()) != 0)
+    {
+      throw std::runtime_error("no pipe");
+    }
     std::fflush(nullptr); // or the process inherits what is not printed yet
     process_ = fork();
-    if (process_ < 0) throw std::runtime_error("no process");
+    if (process_ < 0)
+    {
+      throw std::runtime_error("no process");
+    }
     if (process_ > 0)
     {
       ::close(pipe_[1]);
@@ -34,7 +40,10 @@ public:
   }
   ~Child()
   {
-    if (process_ <= 0) return;
+    if (process_ <= 0)
+    {
+      return;
+    }
     ::kill(process_, SIGKILL); // nobody waits for it, so the test has failed, and it may wait for the test
     result();
   }
@@ -50,7 +59,10 @@ public:
     {
       got = ::read(pipe_[0], &code, sizeof code);
     } while (got < 0 && errno == EINTR); // some tests interrupt themselves
-    if (got != sizeof code) code = UINT32_MAX;
+    if (got != sizeof code)
+    {
+      code = UINT32_MAX;
+    }
     ::close(pipe_[0]);
     while (waitpid(process_, nullptr, 0) < 0 && errno == EINTR)
     {}

@@ -111,10 +111,19 @@ TEST_F(FileLock, AWaitingLockComesWhenTheOtherIsGone)
   Child holder([&] {
     KORHFile file;
     uint32_t code = openFile(file, path_, KOR_FILE_UPDATE);
-    if (code == TAV_RC_OK) code = lockFile(file, kExclusive, kDoNotWait);
-    if (::write(locked[1], "x", 1) != 1) code = UINT32_MAX;
+    if (code == TAV_RC_OK)
+    {
+      code = lockFile(file, kExclusive, kDoNotWait);
+    }
+    if (::write(locked[1], "x", 1) != 1)
+    {
+      code = UINT32_MAX;
+    }
     usleep(50000);
-    if (writeFile(file, "after the wait").code != TAV_RC_OK) code = UINT32_MAX;
+    if (writeFile(file, "after the wait").code != TAV_RC_OK)
+    {
+      code = UINT32_MAX;
+    }
     return code;
   });
   char byte = 0;

@@ -33,7 +33,10 @@ int descriptorOf(const std::string& path)
   {
     std::error_code failed;
     const auto target = std::filesystem::read_symlink(entry.path(), failed);
-    if (!failed && target == path) return std::stoi(entry.path().filename());
+    if (!failed && target == path)
+    {
+      return std::stoi(entry.path().filename());
+    }
   }
   return -1;
 }
@@ -125,7 +128,10 @@ uint32_t openAsNobody(const std::string& path, uint64_t options)
 {
   return inChild([&] {
     constexpr uid_t kNobody = 65534;
-    if (geteuid() == 0 && setresuid(kNobody, kNobody, kNobody) != 0) return UINT32_MAX;
+    if (geteuid() == 0 && setresuid(kNobody, kNobody, kNobody) != 0)
+    {
+      return UINT32_MAX;
+    }
     KORHFile file;
     return openFile(file, path, options);
   });
@@ -202,7 +208,10 @@ TEST(FilePosix, MoreOpenFilesThanAllowedAreRefused)
   touch(folder / "a");
   const uint32_t code = inChild([&] {
     const rlimit none = {0, 0};
-    if (setrlimit(RLIMIT_NOFILE, &none) != 0) return UINT32_MAX;
+    if (setrlimit(RLIMIT_NOFILE, &none) != 0)
+    {
+      return UINT32_MAX;
+    }
     KORHFile file;
     return openFile(file, folder / "a", KOR_FILE_READ);
   });
@@ -223,8 +232,14 @@ TEST(FilePosix, AFileBeyondItsLimitTellsTheBytesThatGotThere)
     std::signal(SIGXFSZ, SIG_IGN);
     const rlimit limit = {4096, 4096};
     KORHFile file;
-    if (openFile(file, folder / "a", KOR_FILE_WRITE | KOR_FILE_CREATE) != TAV_RC_OK) return UINT32_MAX;
-    if (setrlimit(RLIMIT_FSIZE, &limit) != 0) return UINT32_MAX;
+    if (openFile(file, folder / "a", KOR_FILE_WRITE | KOR_FILE_CREATE) != TAV_RC_OK)
+    {
+      return UINT32_MAX;
+    }
+    if (setrlimit(RLIMIT_FSIZE, &limit) != 0)
+    {
+      return UINT32_MAX;
+    }
     const Transfer transfer = writeFile(file, std::string(10000, 'x'));
     return transfer.done == 4096 ? transfer.code : UINT32_MAX;
   });
@@ -252,7 +267,10 @@ public:
   }
   ~LargeBuffer()
   {
-    if (start_ != MAP_FAILED) ::munmap(start_, kSize);
+    if (start_ != MAP_FAILED)
+    {
+      ::munmap(start_, kSize);
+    }
   }
   LargeBuffer(const LargeBuffer&) = delete;
   LargeBuffer& operator=(const LargeBuffer&) = delete;
@@ -363,12 +381,18 @@ TEST_F(InterruptedFifo, IsReadWhole)
   Child writer([this] {
     while (alarms().load() < 5) usleep(1000); // until the open has waited, however busy the machine is
     KORHFile file;
-    if (openFile(file, path_, KOR_FILE_WRITE) != TAV_RC_OK) return UINT32_MAX;
+    if (openFile(file, path_, KOR_FILE_WRITE) != TAV_RC_OK)
+    {
+      return UINT32_MAX;
+    }
     const std::string bytes = pattern();
     for (std::size_t start = 0; start < bytes.size(); start += 50000)
     {
       usleep(5000);
-      if (writeFile(file, bytes.data() + start, 50000).code != TAV_RC_OK) return UINT32_MAX;
+      if (writeFile(file, bytes.data() + start, 50000).code != TAV_RC_OK)
+      {
+        return UINT32_MAX;
+      }
     }
     return TAV_RC_OK;
   });
@@ -388,12 +412,18 @@ TEST_F(InterruptedFifo, IsWrittenWhole)
 {
   Child reader([this] {
     KORHFile file;
-    if (openFile(file, path_, KOR_FILE_READ) != TAV_RC_OK) return UINT32_MAX;
+    if (openFile(file, path_, KOR_FILE_READ) != TAV_RC_OK)
+    {
+      return UINT32_MAX;
+    }
     std::string bytes(kLength, '\0');
     for (std::size_t start = 0; start < bytes.size(); start += 50000)
     {
       usleep(5000);
-      if (readFile(file, bytes.data() + start, 50000).code != TAV_RC_OK) return UINT32_MAX;
+      if (readFile(file, bytes.data() + start, 50000).code != TAV_RC_OK)
+      {
+        return UINT32_MAX;
+      }
     }
     return bytes == pattern() ? TAV_RC_OK : UINT32_MAX;
   });
@@ -412,7 +442,10 @@ TEST_F(InterruptedFifo, EndsWithItsLastWriter)
 {
   Child writer([this] {
     KORHFile file;
-    if (openFile(file, path_, KOR_FILE_WRITE) != TAV_RC_OK) return UINT32_MAX;
+    if (openFile(file, path_, KOR_FILE_WRITE) != TAV_RC_OK)
+    {
+      return UINT32_MAX;
+    }
     return writeFile(file, "short").code;
   });
   ASSERT_EQ(openFile(file_, path_, KOR_FILE_READ), TAV_RC_OK);
@@ -443,7 +476,10 @@ TEST(FilePosix, AWriteWithoutAReaderIsAnOutputError)
     std::signal(SIGPIPE, SIG_IGN);
     KORHFile file;
     const int reader = ::open((folder / "fifo").c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC);
-    if (openFile(file, folder / "fifo", KOR_FILE_WRITE) != TAV_RC_OK) return UINT32_MAX;
+    if (openFile(file, folder / "fifo", KOR_FILE_WRITE) != TAV_RC_OK)
+    {
+      return UINT32_MAX;
+    }
     ::close(reader);
     return writeFile(file, "x").code;
   });
@@ -492,7 +528,10 @@ TEST(FileRights, AreTakenFromAnotherFile)
 
 TEST(FileRights, WithoutTheOwnerDoNotLetAProgramRunAsHim)
 {
-  if (::geteuid() != 0) GTEST_SKIP() << "only root has files of others";
+  if (::geteuid() != 0)
+  {
+    GTEST_SKIP() << "only root has files of others";
+  }
   const TestFolder folder;
   touch(folder / "old");
   ASSERT_EQ(::chown((folder / "old").c_str(), 12, 34), 0);

@@ -316,8 +316,14 @@ TEST(Memory, ThreadsAllocateAndFreeAtATime)
           void* owner = reserved();
           void* alone = reserved(owner);
           reserved(owner);
-          if (!isUsable(alone, kEntry)) ++unusable;
-          if (i % 2 == 0) release(&alone);
+          if (!isUsable(alone, kEntry))
+          {
+            ++unusable;
+          }
+          if (i % 2 == 0)
+          {
+            release(&alone);
+          }
           release(&owner);
         }
       });

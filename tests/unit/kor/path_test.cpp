@@ -50,7 +50,10 @@ TEST(FilePath, IsADeviceOnlyWhenItLeadsToOne)
 TEST(FilePath, IsADeviceThroughALink)
 {
   const TestFolder folder;
-  if (!fs::exists("/dev/null") || !link("/dev/null", folder / "link")) GTEST_SKIP() << "no links to devices here";
+  if (!fs::exists("/dev/null") || !link("/dev/null", folder / "link"))
+  {
+    GTEST_SKIP() << "no links to devices here";
+  }
   EXPECT_TRUE(korIsDevice((folder / "link").c_str()));
 }
 
@@ -76,13 +79,19 @@ TEST(FilePath, LeadsThroughLinksToWhatIsThereOrIsNot)
 TEST(FilePath, ThatLeadsInACircleComesToAnEnd)
 {
   const TestFolder folder;
-  if (!link("two", folder / "one") || !link("one", folder / "two")) GTEST_SKIP() << "no links here";
+  if (!link("two", folder / "one") || !link("one", folder / "two"))
+  {
+    GTEST_SKIP() << "no links here";
+  }
   EXPECT_EQ(target(folder / "one"), folder / "one");
 }
 
 TEST(FilePath, IsNotFollowedOutOfTheSystemsOwnFolders)
 {
-  if (!fs::is_symlink("/dev/stdout")) GTEST_SKIP() << "no /dev/stdout here";
+  if (!fs::is_symlink("/dev/stdout"))
+  {
+    GTEST_SKIP() << "no /dev/stdout here";
+  }
   EXPECT_EQ(target("/dev/stdout"), "TAV_RC_NOT_SUPPORTED");
   EXPECT_EQ(target("/proc/self/exe"), "TAV_RC_NOT_SUPPORTED");
 }
@@ -134,7 +143,10 @@ TEST(FilePath, OfALinkIsRemovedAndNotWhatIsBehindIt)
 {
   const TestFolder folder;
   touch(folder / "file");
-  if (!link("file", folder / "link")) GTEST_SKIP() << "no links here";
+  if (!link("file", folder / "link"))
+  {
+    GTEST_SKIP() << "no links here";
+  }
   EXPECT_EQ(korRemoveFile((folder / "link").c_str()), TAV_RC_OK);
   EXPECT_TRUE(fs::exists(folder / "file"));
   EXPECT_FALSE(fs::exists(fs::symlink_status(folder / "link")));

@@ -44,7 +44,10 @@ TEST(OneTimeStart, SucceedsInManyThreadsAtATime)
     threads.emplace_back([&failures] {
       for (int i = 0; i < 1000; ++i)
       {
-        if (korOneTimeOnly() != TAV_RC_OK) ++failures;
+        if (korOneTimeOnly() != TAV_RC_OK)
+        {
+          ++failures;
+        }
       }
     });
   }

@@ -80,7 +80,10 @@ inline std::string readText(KORHFile& file, uint64_t length)
 {
   std::string text(length, '?');
   const Transfer transfer = readFile(file, text.data(), length);
-  if (transfer.code != TAV_RC_OK && transfer.code != TAV_RC_END_OF_STORAGE) return korCodeName(transfer.code);
+  if (transfer.code != TAV_RC_OK && transfer.code != TAV_RC_END_OF_STORAGE)
+  {
+    return korCodeName(transfer.code);
+  }
   text.resize(transfer.done);
   return text;
 }

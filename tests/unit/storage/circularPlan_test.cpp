@@ -17,7 +17,10 @@ std::vector<std::string> readsOf(const std::vector<std::string>& log)
   std::vector<std::string> reads;
   for (const std::string& line : log)
   {
-    if (line.starts_with("read")) reads.push_back(line);
+    if (line.starts_with("read"))
+    {
+      reads.push_back(line);
+    }
   }
   return reads;
 }

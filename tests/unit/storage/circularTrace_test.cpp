@@ -27,7 +27,10 @@ std::vector<Items> dumpsOf(const TraceLog& trace, uint32_t id, uint32_t point)
   std::vector<Items> dumps;
   for (const Record& record : trace.recordsOf(id))
   {
-    if (record.kind == KOR_TRACE_VAR && record.point == point) dumps.push_back(record.items);
+    if (record.kind == KOR_TRACE_VAR && record.point == point)
+    {
+      dumps.push_back(record.items);
+    }
   }
   return dumps;
 }

@@ -107,7 +107,10 @@ private:
   /// After one failure the storage works again, and so does the handle.
   void failedHandleIsUsable(uint32_t rc)
   {
-    if (rc == TAV_RC_OK) return;
+    if (rc == TAV_RC_OK)
+    {
+      return;
+    }
     storage_.longestWrite = ~uint64_t{0};
     storage_.seekError = 0;
     EXPECT_EQ(handle_->pCircularBuf->reset(), TAV_RC_OK);

@@ -22,7 +22,10 @@ TEST_F(FileStorage, OfAReadOnlyFileOpensForReadingAlone)
   ASSERT_EQ(chmod(path.c_str(), 0444), 0);
   ASSERT_EQ(chmod(folder_.path().c_str(), 0755), 0);
   const uint32_t code = inChild([&] {
-    if (geteuid() == 0 && setuid(65534) != 0) return uint32_t{1}; // the superuser may write anything
+    if (geteuid() == 0 && setuid(65534) != 0)
+    {
+      return uint32_t{1}; // the superuser may write anything
+    }
     const OpenFile reading(path, KOR_FILE_READ);
     const OpenFile writing(path, KOR_FILE_UPDATE);
     return reading.rc == TAV_RC_OK ? writing.rc : 2;
@@ -55,7 +58,10 @@ TEST_F(FileStorage, WritesUpToTheSizeThatIsAllowed)
   const uint32_t code = inChild([&] {
     std::signal(SIGXFSZ, SIG_IGN);
     const rlimit limit{8192, 8192};
-    if (setrlimit(RLIMIT_FSIZE, &limit) != 0) return uint32_t{1};
+    if (setrlimit(RLIMIT_FSIZE, &limit) != 0)
+    {
+      return uint32_t{1};
+    }
     OpenFile file(path, kCreate);
     const std::vector<uint8_t> bytes = pattern(0, 10000);
     const uint32_t rc = file->write(bytes.data(), bytes.size(), &written);
@@ -108,7 +114,10 @@ TEST_F(FileStorage, IsRefusedWhileAnotherProcessHoldsTheLock)
     OpenFile file(path, KOR_FILE_UPDATE);
     const uint32_t rc = file->lock(0);
     char byte = 'r';
-    if (::write(ready[1], &byte, 1) != 1 || ::read(done[0], &byte, 1) < 0) return uint32_t{1};
+    if (::write(ready[1], &byte, 1) != 1 || ::read(done[0], &byte, 1) < 0)
+    {
+      return uint32_t{1};
+    }
     return rc;
   });
   char byte = 0;

@@ -74,7 +74,10 @@ private:
 
   uint64_t piece(uint64_t offset, uint8_t* to, uint64_t count)
   {
-    if (offset < kHeader) return part(&root_.hdr64, kHeader, offset, to, count);
+    if (offset < kHeader)
+    {
+      return part(&root_.hdr64, kHeader, offset, to, count);
+    }
     if (offset >= length())
     {
       std::memset(to, 0, count);
@@ -87,7 +90,10 @@ private:
       const TAVHeader64 header{kPayload, TAV_INFO_EYE_SIZE, TAV_TYPE_BINARY, 2};
       return part(&header, kHeader, at, to, count);
     }
-    if (at < kHeader + kPayload) return part(payload(number).data(), kPayload, at - kHeader, to, count);
+    if (at < kHeader + kPayload)
+    {
+      return part(payload(number).data(), kPayload, at - kHeader, to, count);
+    }
     const uint64_t pair[] = {TAV_EYE_CATCHER, kHeader + kPayload};
     return part(pair, sizeof pair, at - kHeader - kPayload, to, count);
   }

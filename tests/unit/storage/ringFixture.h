@@ -106,7 +106,10 @@ struct SmallRing
   /// How many bytes are cached, by the fields.
   [[nodiscard]] uint64_t count() const
   {
-    if (ring.empty != 0) return 0;
+    if (ring.empty != 0)
+    {
+      return 0;
+    }
     return ring.head <= ring.tail ? ring.tail - ring.head + 1 : ring.tail + ring.ringSize - ring.head + 1;
   }
   /// Which pages are marked as pending.

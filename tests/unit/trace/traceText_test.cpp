@@ -36,7 +36,10 @@ public:
     for (;;)
     {
       const std::size_t count = std::fread(part.data(), 1, part.size(), file_.get());
-      if (count == 0) return text;
+      if (count == 0)
+      {
+        return text;
+      }
       text.append(part.data(), count);
     }
   }
@@ -66,7 +69,10 @@ std::string shown(const void* data, uint64_t length)
   record.itemCount = 1;
   const std::string line = lineOf(record);
   const std::string head = "var   thread 4711 probe 0x088A0012 point 0 ";
-  if (line.rfind(head, 0) != 0 || line.back() != '\n') return "not a line of variables: " + line;
+  if (line.rfind(head, 0) != 0 || line.back() != '\n')
+  {
+    return "not a line of variables: " + line;
+  }
   return line.substr(head.size(), line.size() - head.size() - 1);
 }
 

@@ -14,7 +14,10 @@ bool write(TAVSSMemory& storage)
 {
   TAVInitParam param(&storage, TAV_OPT_WRITE);
   TAVHandle* handle = nullptr;
-  if (tavInitHandle(&handle, &param) != TAV_RC_OK) return false;
+  if (tavInitHandle(&handle, &param) != TAV_RC_OK)
+  {
+    return false;
+  }
 
   TAVHeaderData group{};
   group.header.hdrType = TAV_HDR_64;
@@ -36,7 +39,10 @@ bool readBack(TAVSSMemory& storage)
 {
   TAVInitParam param(&storage, TAV_OPT_READ);
   TAVHandle* handle = nullptr;
-  if (tavInitHandle(&handle, &param) != TAV_RC_OK) return false;
+  if (tavInitHandle(&handle, &param) != TAV_RC_OK)
+  {
+    return false;
+  }
 
   TAVHeaderData group{};
   TAVHeaderData child{};
@@ -46,7 +52,10 @@ bool readBack(TAVSSMemory& storage)
                   child.header.hdr64.type == TAV_TYPE_UINT32 &&
                   child.header.hdr64.elm == TAV_ELM_CMN_HOST &&
                   child.header.hdr64.size == sizeof value;
-  if (ok) std::memcpy(&value, child.pDataBuf, sizeof value);
+  if (ok)
+  {
+    std::memcpy(&value, child.pDataBuf, sizeof value);
+  }
   return tavTermHandle(&handle) == TAV_RC_OK && ok && value == kValue;
 }
 
