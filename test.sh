@@ -72,12 +72,6 @@ run_tests()
   fi
 }
 
-build_and_test()
-{
-  build "$1"
-  run_tests "$@"
-}
-
 check_tidy()
 {
   cmake --preset clang -DTAV_BUILD_TESTS=OFF -DTAV_BUILD_TOOLS=OFF >"$work/configure.log" || { cat "$work/configure.log"; return 1; }
@@ -143,8 +137,8 @@ run_parts()
   return "$status"
 }
 
-# run_rooms PRESET FOLDER ENDING ROOM...: the programs of whole rooms, each in one go, which spares an emulator thousands
-# of starts; adds to the totals what they count themselves.
+# run_rooms PRESET FOLDER ENDING ROOM...: the programs of whole rooms, each in one go, which spares thousands of
+# starts; adds to the totals what they count themselves.
 run_rooms()
 {
   local preset=$1 folder=$PWD/build/$1/$2 ending=$3 room status
@@ -187,6 +181,22 @@ run_properties()
 }
 
 rooms=(kor trace format storage dictionary core api golden cpp host)
+roomsHere=("${rooms[@]}" inspect) # on this platform
+
+# labels_of ROOM...: the expression by which ctest knows the tests of these rooms.
+labels_of()
+{
+  local IFS='|'
+  echo "^($*)\$"
+}
+
+# Everything. The rooms run as whole programs: by ctest it would be a process for each of their 4,600 tests.
+build_and_test()
+{
+  build "$1"
+  run_rooms "$1" tests "" "${roomsHere[@]}"
+  run_tests "$1" --label-exclude "$(labels_of "${roomsHere[@]}")"
+}
 
 # check_platform PRESET FOLDER ENDING EMULATOR ROOM...: rooms and properties on another platform, the exported symbols,
 # the program's behaviour that platforms tend to differ in, and the streams that cross from and to this one.
@@ -217,7 +227,7 @@ check_sanitizers()
   build asan-clang
   local -x ASAN_OPTIONS=detect_leaks=1:detect_stack_use_after_return=1:strict_string_checks=1:allocator_may_return_null=1
   local -x UBSAN_OPTIONS=print_stacktrace=1
-  run_rooms asan-clang tests "" "${rooms[@]}"
+  run_rooms asan-clang tests "" "${roomsHere[@]}"
   run_properties asan-clang tests ""
   run_tests asan-clang --label-regex '^(tools|fuzz|faults|disk|kill)$' --exclude-regex "^($slow)$"
 }
