@@ -382,14 +382,7 @@ private:
     {
       return place > children.size() || take(children[static_cast<size_t>(place - 1)].entry);
     }
-    for (const Spot& child : children)
-    {
-      if (!take(child.entry))
-      {
-        return false;
-      }
-    }
-    return true;
+    return std::all_of(children.begin(), children.end(), [&take](const Spot& child) { return take(child.entry); });
   }
 
   template<class Visit>

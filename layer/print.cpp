@@ -1,6 +1,7 @@
 // The forms of Reader::print.
 #include <array>
 #include <cstdint>
+#include <iterator>
 #include <string>
 #include <string_view>
 
@@ -75,7 +76,7 @@ private:
   {
     std::error_code ec;
     DescendantRange all = start.descendants(ec, EndElements::show);
-    for (auto at = all.begin(); at != all.end() && !failed_; ++at)
+    for (auto at = all.begin(); at != std::default_sentinel && !failed_; ++at)
     {
       const Node& node = *at;
       closeDownTo(all.depth());
@@ -250,7 +251,7 @@ private:
   /// In XML, characters that it cannot hold become the payload's digits.
   [[nodiscard]] ValueText valueOf(const Node& node) const
   {
-    if (node.size() == 0)
+    if (node.size() == 0 || node.data_.pDataBuf == nullptr)
     {
       return {};
     }
