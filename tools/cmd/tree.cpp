@@ -14,6 +14,7 @@
 #include "tools/shell/dictionary.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
+#include "tools/shell/pager.h"
 #include "tools/shell/progress.h"
 #include "tools/shell/report.h"
 #include "tools/shell/session.h"
@@ -52,7 +53,8 @@ class TreePrinter
 {
 public:
   explicit TreePrinter(const Invocation& invocation)
-      : out_("-"), colours_(wantsColour(invocation) ? kOnTerminal : Colours{}),
+      : pagerCommand_(invocation.has("--no-pager") ? "" : pagerCommand()), out_("-"),
+        colours_(wantsColour(invocation) ? kOnTerminal : Colours{}),
         width_(static_cast<size_t>(host::terminalWidth().value_or(0))), paths_(invocation.has("--paths")),
         maxDepth_(invocation.number("--depth").value_or(kNoOffset)), ends_(invocation.has("--ends"))
   {
@@ -73,13 +75,21 @@ public:
   /// Prints what `walker` hands out from `event` on; `base` is the depth that is not indented.
   void print(Walker& walker, Event& event, uint64_t base, bool oneNode, DamageNotices& notices)
   {
-    Progress progress("tree", walker.source());
+    std::optional<Progress> progress;
+    if (pagerCommand_.empty())
+    {
+      progress.emplace("tree", walker.source());
+    }
+    else
+    {
+      pager_.emplace(pagerCommand_);
+    }
     base_ = base;
     named_ = oneNode ? event.offset : kNoOffset;
     bool seen = oneNode; // on the way to it
     do
     {
-      progress.at(event.offset);
+      progress ? progress->at(event.offset) : void();
       if (!std::exchange(seen, false))
       {
         notices.see(walker, event);
@@ -102,6 +112,7 @@ public:
       folding_->finish();
     }
     out_.commit();
+    pager_.reset(); // what is told behind the tree is told behind the pager
   }
 
   /// Prints each node as it comes.
@@ -133,6 +144,8 @@ private:
   void value(std::string_view text);
   void put();
 
+  std::string pagerCommand_;           ///< empty: none
+  std::optional<host::Pager> pager_{}; ///< ends behind the output
   Output out_;
   Colours colours_;
   size_t width_;
@@ -401,7 +414,8 @@ const Registration registration{{
         "listed as damaged, with the reason; then the exit status is 1. Elements that only end a group are\n"
         "left out. On a terminal values are cut to its width, lines are coloured unless NO_COLOR is set or\n"
         "TERM is dumb, and of siblings of one name that follow one another three are shown, with a line that\n"
-        "counts the others; damage among them is always shown. Where the output is no terminal, and with\n"
+        "counts the others; damage among them is always shown. What is longer than the terminal goes through\n"
+        "PAGER, less unless it is set; empty or cat: through none. Where the output is no terminal, and with\n"
         "--only, every node has its line, unless --fold asks for the short form.",
     .options =
         {{.names = "--depth", .kind = ValueKind::number, .value = "N", .help = "no node deeper than N levels"},
@@ -415,6 +429,7 @@ const Registration registration{{
          {.names = "--fold", .help = "fold repetitions also where the output is no terminal"},
          {.names = "--ends", .help = "also elements that only end a group"},
          {.names = "--paths", .help = "paths instead of indented names"},
+         {.names = "--no-pager", .help = "no pager on a terminal"},
          {.names = "--width", .kind = ValueKind::number, .value = "N", .help = "cut lines to N columns; 0: never"},
          {.names = "--color",
           .kind = ValueKind::choice,

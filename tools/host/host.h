@@ -54,6 +54,23 @@ bool isTerminal(FILE* stream);
 /// Columns of the terminal on standard output; nothing when there is none.
 std::optional<unsigned> terminalWidth();
 
+/// While one lives, what goes to standard output goes through a command of the shell, and an interrupt is the
+/// command's. At its end it waits for the command. Where the command cannot be started, or the system has none, nothing
+/// changes.
+class Pager
+{
+public:
+  explicit Pager(const std::string& command);
+  ~Pager();
+  Pager(const Pager&) = delete;
+  Pager& operator=(const Pager&) = delete;
+
+private:
+  int64_t process_ = -1;
+  int before_ = -1; ///< standard output as it was
+  void (*interrupt_)(int) = nullptr;
+};
+
 /// Makes all standard streams streams of bytes, where a line ends as it was written, and a closed pipe or a file that
 /// must not grow further an error of the write. A program that is interrupted or told to end removes the files of
 /// `removeOnInterrupt` first.

@@ -1,7 +1,9 @@
 #include <algorithm>
+#include <cerrno>
 #include <csignal>
 #include <cstdlib>
 #include <sys/ioctl.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
 #include "tools/host/host.h"
@@ -65,6 +67,50 @@ std::optional<unsigned> terminalWidth()
     return size.ws_col;
   }
   return 80;
+}
+
+namespace
+{
+/// What the new process does until it is the command. Signals that this program ignores, it takes again.
+[[noreturn]] void becomePager(const std::string& command, const int (&ends)[2])
+{
+  for (const int number : {SIGINT, SIGPIPE, SIGXFSZ}) std::signal(number, SIG_DFL);
+  ::dup2(ends[0], STDIN_FILENO);
+  ::close(ends[0]);
+  ::close(ends[1]);
+  ::setenv("LESS", "FRX", 0); // ends by itself behind less than a screen, takes colours, leaves the text there
+  ::execl("/bin/sh", "sh", "-c", command.c_str(), static_cast<char*>(nullptr));
+  ::_exit(127);
+}
+} // namespace
+
+Pager::Pager(const std::string& command)
+{
+  int ends[2];
+  std::fflush(stdout);
+  if (::pipe(ends) != 0) return;
+  process_ = ::fork();
+  if (process_ == 0) becomePager(command, ends);
+  ::close(ends[0]);
+  if (process_ > 0)
+  {
+    before_ = ::dup(STDOUT_FILENO);
+    ::dup2(ends[1], STDOUT_FILENO);
+    interrupt_ = std::signal(SIGINT, SIG_IGN);
+  }
+  ::close(ends[1]);
+}
+
+Pager::~Pager()
+{
+  if (process_ <= 0) return;
+  std::fflush(stdout);
+  ::dup2(before_, STDOUT_FILENO); // the command comes to the end of its input
+  ::close(before_);
+  while (::waitpid(static_cast<pid_t>(process_), nullptr, 0) < 0 && errno == EINTR)
+  {
+  }
+  std::signal(SIGINT, interrupt_);
 }
 
 void prepareStandardStreams()

@@ -85,6 +85,11 @@ std::optional<unsigned> terminalWidth()
   return 80;
 }
 
+/// The console scrolls by itself.
+Pager::Pager(const std::string&) {}
+
+Pager::~Pager() = default;
+
 void prepareStandardStreams()
 {
   for (FILE* const stream : {stdin, stdout, stderr}) _setmode(_fileno(stream), _O_BINARY);

@@ -43,7 +43,7 @@ class TerminalTest(ToolTest):
         with open(other or self.folder / "elsewhere", "wb") as file:
             streams = {name: theirs if name in terminal else file for name in ("stdout", "stderr")}
             run = subprocess.Popen([*TAV, *map(str, arguments)], stdin=subprocess.DEVNULL, **streams,
-                                   env={**os.environ, "TERM": "xterm", **more})
+                                   env={**os.environ, "TERM": "xterm", "PAGER": "", **more})
         os.close(theirs)
         self.addCleanup(self.end, run)
         return run, ours
@@ -106,6 +106,61 @@ class Terminal(TerminalTest):
         path = self.snapshot()
         self.assertNotRegex(self.on_terminal("tree", path, TERM="dumb"), ESCAPE)
         self.assertRegex(self.on_terminal("tree", path, "--color", "always", TERM="dumb"), ESCAPE)
+
+    def many(self, count=100):
+        path = self.folder / "many.tav"
+        number = struct.pack("<QIHH", 8, 0, 57, 60111) + bytes(8)
+        path.write_bytes(struct.pack("<QIHH", len(number) * count, 0, 2, 60100) + number * count)
+        return path
+
+    def test_a_tree_goes_through_the_pager_that_the_user_wants(self):
+        path = self.many()
+        plain = self.on_terminal("tree", path, "--all", "--color", "never").splitlines()
+        self.assertEqual(len(plain), 101)
+        paged = self.on_terminal("tree", path, "--all", "--color", "never", PAGER="sed s/^/paged:/ && echo end").splitlines()
+        self.assertEqual(paged, ["paged:" + line for line in plain] + ["end"])
+        self.assertRegex(self.on_terminal("tree", path, PAGER="sed s/^/paged:/"), "paged:" + ESCAPE.pattern)
+        for words, more in ((("--no-pager",), {"PAGER": "echo paged:"}), ((), {"PAGER": "cat"}), ((), {"PAGER": ""}),
+                            ((), {"PAGER": "echo paged:", "TERM": "dumb"}),
+                            ((), {"PAGER": "echo paged:", "terminal": ("stderr",)})):
+            self.assertNotIn("paged:", self.on_terminal("tree", path, *words, **more))
+        self.assertNotIn("paged:", tav("tree", path, env={**os.environ, "PAGER": "echo paged:", "TERM": "xterm"}).out)
+
+    def test_what_was_passed_over_is_told_behind_the_pager(self):
+        path = self.many()
+        with path.open("ab") as file:
+            file.write(b"\xee" * 40)
+        run, ours = self.start("tree", path, "--all", "--color", "never", PAGER="sed s/^/paged:/ && sleep 0.3 && echo end")
+        lines = self.read(ours).splitlines()
+        self.assertEqual(run.wait(timeout=PATIENCE), 1)
+        self.assertEqual(lines[-2], "end")
+        self.assertIn("passed over 40 bytes", lines[-1])
+
+    def test_a_pager_that_ends_early_ends_the_tree(self):
+        path = self.many(200_000)
+        run, ours = self.start("tree", path, "--all", "--color", "never", PAGER="head -n 2")
+        self.assertEqual(len(self.read(ours).splitlines()), 2)
+        self.assertEqual(run.wait(timeout=PATIENCE), 0)
+
+    @unittest.skipUnless(shutil.which("less"), "less is not installed")
+    def test_less_is_the_pager_and_ends_by_itself_where_all_fits(self):
+        path = self.many()
+        unset = {key: value for key, value in os.environ.items() if key not in ("PAGER", "LESS")}
+        for words, key in (((), b""), (("--all",), b"q")):
+            ours, theirs = pty.openpty()
+            fcntl.ioctl(theirs, termios.TIOCSWINSZ, struct.pack("HHHH", 24, 80, 0, 0))
+            run = subprocess.Popen([*TAV, "tree", str(path), *words], stdin=theirs, stdout=theirs, stderr=theirs,
+                                   start_new_session=True, env={**unset, "TERM": "xterm"},
+                                   preexec_fn=lambda: fcntl.ioctl(0, termios.TIOCSCTTY, 0))
+            os.close(theirs)
+            self.addCleanup(os.close, ours)
+            self.addCleanup(self.end, run)
+            if key:
+                self.assertIn("cpuOnline", self.read(ours, until="cpuOnline(.|\n)*:"))
+                self.assertIsNone(run.poll())
+                os.write(ours, key)
+            self.read(ours)
+            self.assertEqual(run.wait(timeout=PATIENCE), 0)
 
     def hostile_text(self, text):
         path = self.folder / "hostile.tav"
