@@ -45,6 +45,8 @@ def seeds_of(name, made, swapped, aligned):
         for path in (b"\x0a*/*[2]/cpu", b"\x02**", b"\x09/system/*"):
             yield "c", bytes((choice,)) + path + made
     yield "path", bytes((flags & 1,)) + b"//host[cpu/cpuOnline > 4]/*[last()]/.. | /system/*[2]"
+    for asked in range(4):
+        yield "table", bytes((flags | 8 * (asked & 1), asked)) + made
     yield "recover", bytes((flags,)) + made
     yield "recover", bytes((flags,)) + made[:len(made) * 2 // 3]
     for choice in range(4):
