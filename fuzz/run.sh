@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # Fuzzes for a time or a number of times: builds the preset `fuzz`, runs each target from its corpus and all findings
 # of the past, and fails on a new finding. What is new in a corpus and what was found stays in build/fuzz-work.
-#   fuzz/run.sh SECONDS [TARGET...]      targets: read write layer c path dictionary table tool recover build; all unless some are named
+#   fuzz/run.sh SECONDS [TARGET...]      targets: read write layer c path dictionary table plan tool recover build; all unless some are named
 #   fuzz/run.sh fixed [TARGET...]        the same inputs in every run, as many as take about a minute: a fast machine
 #                                        finds nothing that a slow one has passed
 # To reproduce: build/fuzz/fuzz/fuzz_TARGET FILE. A finding becomes a file in fuzz/findings/TARGET, which every build
@@ -19,9 +19,9 @@ if (($# == 0)) || [[ ! $1 =~ ^([0-9]+|fixed)$ ]]; then
 fi
 seconds=$1
 shift
-declare -A executions=([read]=70000 [write]=20000 [layer]=140000 [c]=5000 [path]=3000 [dictionary]=60000 [table]=20000 [tool]=20000 [recover]=90000 [build]=17000)
+declare -A executions=([read]=70000 [write]=20000 [layer]=140000 [c]=5000 [path]=3000 [dictionary]=60000 [table]=20000 [plan]=4000 [tool]=20000 [recover]=90000 [build]=17000)
 targets=("$@")
-((${#targets[@]} > 0)) || targets=(read write layer c path dictionary table tool recover build)
+((${#targets[@]} > 0)) || targets=(read write layer c path dictionary table plan tool recover build)
 
 build=${FUZZ_BUILD:-build/fuzz}
 work=${FUZZ_WORK:-build/fuzz-work}

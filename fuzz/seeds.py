@@ -47,6 +47,8 @@ def seeds_of(name, made, swapped, aligned):
     yield "path", bytes((flags & 1,)) + b"//host[cpu/cpuOnline > 4]/*[last()]/.. | /system/*[2]"
     for asked in range(4):
         yield "table", bytes((flags | 8 * (asked & 1), asked)) + made
+    for part in (10, 60):
+        yield "plan", bytes((flags, part)) + made
     yield "recover", bytes((flags,)) + made
     yield "recover", bytes((flags,)) + made[:len(made) * 2 // 3]
     for choice in range(4):

@@ -2,8 +2,9 @@
 /// Inspection: looking into streams whose form is not known and whose bytes may be damaged. Library `libtav-inspect`.
 ///
 /// Sources are files, storages and memory; results go to sinks that the caller gives; how far long work is comes as a
-/// callback. What cannot go on throws tav::inspect::Error. Nothing here prints, ends the program, keeps global state or
-/// starts threads. An object belongs to one thread at a time; different objects are independent of each other.
+/// callback. What cannot go on throws tav::inspect::Error. Nothing here prints, ends the program or keeps global state,
+/// and threads are started only where their number is asked for: they end before the call does. An object belongs to
+/// one thread at a time; different objects are independent of each other.
 #pragma once
 
 #include "tav/inspect/arrow.hpp"

@@ -32,11 +32,37 @@ Checker::Checker(ByteSource& source, const Form& form, std::function<bool(RuleId
   groups_.push_back(file);
 }
 
+Checker::Checker(ByteSource& source, const Form& form, std::function<bool(RuleId)> wanted, Sink sink, PathStyle style,
+                 const Walker::State& state, bool rootEnded)
+    : source_(source), form_(form), wanted_(std::move(wanted)), sink_(std::move(sink)), style_(style),
+      walker_(Walker::from(source, form, state)), rootEnded_(rootEnded)
+{
+  Group file;
+  file.wide = form.root64;
+  groups_.push_back(file);
+  for (size_t i = 1; i < state.frames.size(); ++i)
+  {
+    enter(state.frames[i].node);
+  }
+}
+
+bool Checker::isPlain() const
+{
+  const auto isPlainGroup = [](const Group& group) {
+    return !group.ended && !group.damagedTail && group.afterEnd == 0 && group.lastClaim == 0;
+  };
+  return deepOpen_ == 0 && !deepTold_ && std::all_of(groups_.begin(), groups_.end(), isPlainGroup);
+}
+
 void Checker::found(RuleId rule, uint64_t offset, uint64_t length, std::string sentence, bool otherStream)
 {
   if (wanted_(rule))
   {
-    sink_({rule, offset, length, path(), std::move(sentence), otherStream});
+    ++findings_;
+    if (sink_)
+    {
+      sink_({rule, offset, length, path(), std::move(sentence), otherStream});
+    }
   }
 }
 
@@ -69,6 +95,7 @@ bool Checker::step()
   }
   case What::nodeEnd: event_.node.isGroup() ? endGroup() : endNode(); break;
   case What::damaged:
+    ++damages_;
     placeIsTaken(event_.offset);
     checkDamage();
     groups_.back().damagedTail = true;
@@ -148,7 +175,11 @@ void Checker::checkHeader()
 
 void Checker::beginGroup()
 {
-  const Node& node = event_.node;
+  enter(event_.node);
+}
+
+void Checker::enter(const Node& node)
+{
   Group group;
   group.node = node;
   group.wide = hasChildren64(node.header);
@@ -293,7 +324,8 @@ void Checker::checkClaim(uint64_t offset, bool boundary)
   }
   const bool exact = offset == group.lastClaim;
   const RuleId rule = exact ? RuleId::afterEnd : RuleId::groupSize;
-  if (wanted_(rule))
+  findings_ += wanted_(rule) ? 1 : 0;
+  if (sink_ && wanted_(rule))
   {
     const std::string sentence = exact ? "stands behind the end element of this group, but inside its size"
                                        : "says that it ends at " + hexOffset(group.lastClaim) +

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 
+#include "inspect/plan/partChain.h"
 #include "inspect/plan/planner.h"
 
 namespace tav::inspect
@@ -27,7 +28,25 @@ std::vector<Part> cut(ByteSource& source, const Form& form, const PlanOptions& o
   return Planner(*window, form, everyForm).run(target);
 }
 
+constexpr uint64_t kWorthCutting = uint64_t{4} << 20U;
+
 } // namespace
+
+std::vector<Part> partsFor(ByteSource& source, const Form& form, unsigned threads, uint64_t partBytes)
+{
+  if (threads < 2 || (partBytes == 0 && source.size() < kWorthCutting))
+  {
+    return {};
+  }
+  std::vector<Part> parts = plan(source, form, {.targetBytes = partBytes});
+  return parts.size() < 2 ? std::vector<Part>{} : parts;
+}
+
+bool standsAt(const Walker& walk, const Part& part)
+{
+  return walk.place() == part.offset && walk.depth() == part.around.size() &&
+         isSeam(partAt(walk.state(), walk.form(), part.streamOffset), part);
+}
 
 std::vector<Part> plan(ByteSource& source, const PlanOptions& options)
 {

@@ -2,7 +2,11 @@
 
 #include <algorithm>
 #include <array>
+#include <atomic>
 #include <cstring>
+#include <utility>
+
+#include "inspect/plan/partRun.h"
 
 namespace tav::inspect
 {
@@ -13,6 +17,8 @@ namespace
 {
 
 constexpr size_t kMostEndings = size_t{256} * 1024; ///< 6 MiB
+constexpr size_t kWindow = ByteSource::kPage;
+constexpr uint64_t kStretch = 64 * kWindow; ///< that a thread takes at a time
 
 bool readHeader(ByteSource& source, const Form& form, uint64_t offset, bool wide, TAVHeader& out)
 {
@@ -30,8 +36,9 @@ bool readHeader(ByteSource& source, const Form& form, uint64_t offset, bool wide
 class EyeSearch
 {
 public:
-  EyeSearch(ByteSource& source, const Form& form, uint64_t from)
-      : source_(source), form_(form), from_(from)
+  /// Looks at the eye catchers that begin between `at` and `to`.
+  EyeSearch(ByteSource& source, const Form& form, uint64_t from, uint64_t at, uint64_t to)
+      : source_(source), form_(form), from_(from), at_(at), to_(to)
   {
     const EyeSizeBytes pair = encodeEyeSize(0, form.swapped);
     std::copy_n(pair.begin(), eye_.size(), eye_.begin());
@@ -40,9 +47,8 @@ public:
   std::vector<Ending> run()
   {
     // What was read stays at hand for the look at what an eye catcher ends.
-    constexpr size_t kWindow = ByteSource::kPage;
     std::vector<uint8_t> window(kWindow + kEyeLength - 1);
-    for (uint64_t at = from_; at < source_.size();)
+    for (uint64_t at = at_; at < to_;)
     {
       const size_t got = source_.read(at, window);
       const uint8_t* place = window.data();
@@ -54,9 +60,6 @@ public:
       }
       at = source_.pastHole(at + kWindow, window, kEyeLength - 1);
     }
-    std::sort(found_.begin(), found_.end(), [](const Ending& a, const Ending& b) {
-      return a.start != b.start ? a.start < b.start : a.end > b.end;
-    });
     return std::move(found_);
   }
 
@@ -81,9 +84,32 @@ private:
   ByteSource& source_;
   Form form_;
   uint64_t from_;
+  uint64_t at_;
+  uint64_t to_;
   std::array<uint8_t, kEyeLength> eye_{};
   std::vector<Ending> found_{};
 };
+
+/// Stretch by stretch, as many as one thread would keep.
+std::vector<Ending> findInStretches(ByteSource& source, const Form& form, uint64_t from, unsigned threads,
+                                    size_t stretches)
+{
+  const auto search = [&](ByteSource& bytes, size_t i) {
+    const uint64_t at = from + i * kStretch;
+    return EyeSearch(bytes, form, from, at, std::min(at + kStretch, bytes.size())).run();
+  };
+  std::vector<std::vector<Ending>> each(stretches);
+  std::vector<Ending> found;
+  PartRun run(source, stretches, threads,
+              [&](const std::atomic<bool>&, ByteSource& bytes, size_t i) { each[i] = search(bytes, i); });
+  for (size_t i = 0; i < stretches && found.size() < kMostEndings; ++i)
+  {
+    const std::vector<Ending> some = run.await(i) ? std::exchange(each[i], {}) : search(run.source(), i);
+    const size_t room = kMostEndings - found.size();
+    found.insert(found.end(), some.begin(), some.begin() + static_cast<ptrdiff_t>(std::min(room, some.size())));
+  }
+  return found;
+}
 
 } // namespace
 
@@ -118,9 +144,27 @@ bool headerAgrees(ByteSource& source, const Form& form, const Ending& ending)
          (isSizeUnknown(header) || addSaturated(ending.start + kHeaderSize64, sizeOf(header)) == ending.end);
 }
 
-std::vector<Ending> findEndings(ByteSource& source, const Form& form, uint64_t from)
+std::vector<Ending> findEndings(ByteSource& source, const Form& form, uint64_t from, unsigned threads)
 {
-  return form.root64 ? EyeSearch(source, form, from).run() : std::vector<Ending>{};
+  std::vector<Ending> found;
+  if (!form.root64)
+  {
+    return found;
+  }
+  const uint64_t size = source.size();
+  const auto stretches = static_cast<size_t>((size - std::min(from, size) + kStretch - 1) / kStretch);
+  if (threads < 2 || stretches < 2)
+  {
+    found = EyeSearch(source, form, from, from, size).run();
+  }
+  else
+  {
+    found = findInStretches(source, form, from, threads, stretches);
+  }
+  std::sort(found.begin(), found.end(), [](const Ending& a, const Ending& b) {
+    return a.start != b.start ? a.start < b.start : a.end > b.end;
+  });
+  return found;
 }
 
 } // namespace tav::inspect

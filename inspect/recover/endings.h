@@ -27,7 +27,7 @@ bool headerAgrees(ByteSource& source, const Form& form, const Ending& ending);
 
 /// Searches all bytes from `from` to the end of the file for eye catchers, and keeps the end elements whose groups
 /// begin at `from` or later with a header that says something else. Sorted by start, outer groups first. A bounded
-/// number is kept.
-std::vector<Ending> findEndings(ByteSource& source, const Form& form, uint64_t from);
+/// number is kept. `threads` search in stretches of the file, with the same outcome for any number.
+std::vector<Ending> findEndings(ByteSource& source, const Form& form, uint64_t from, unsigned threads = 1);
 
 } // namespace tav::inspect

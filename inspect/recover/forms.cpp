@@ -56,7 +56,8 @@ Account FormRecovery::recoverAs(const Form& form, PatchFile& file)
   };
   Recovery recovery(source_, form, rebuilder, search_,
                     {.loss = [&](const Loss& loss) { keep(account.losses, loss); },
-                     .doubt = [&](const Doubt& doubt) { keep(account.doubts, doubt); }});
+                     .doubt = [&](const Doubt& doubt) { keep(account.doubts, doubt); }},
+                    threads_);
   while (recovery.step())
   {
     reading_(recovery.position());
@@ -137,7 +138,8 @@ Outcome recoverBest(ByteSource& source, const Recognition& found, PatchFile& out
       options.progress(offset);
     }
   };
-  return FormRecovery(source, options.search, options.listed, options.makeFile, reading).run(found, out);
+  return FormRecovery(source, options.search, options.listed, options.makeFile, reading, options.threads)
+      .run(found, out);
 }
 
 } // namespace tav::inspect

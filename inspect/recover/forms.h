@@ -28,8 +28,9 @@ public:
   /// `search`: bytes that may be searched for nodes in each form. `listed`: losses that are kept, and doubts.
   /// `makeFile` makes a file for each form that is tried. `reading` is told where the file is read.
   FormRecovery(ByteSource& source, uint64_t search, size_t listed, ScratchMaker makeFile,
-               std::function<void(uint64_t)> reading)
-      : source_(source), search_(search), listed_(listed), makeFile_(std::move(makeFile)), reading_(std::move(reading))
+               std::function<void(uint64_t)> reading, unsigned threads)
+      : source_(source), search_(search), listed_(listed), makeFile_(std::move(makeFile)), reading_(std::move(reading)),
+        threads_(threads)
   {
   }
 
@@ -56,6 +57,7 @@ private:
   size_t listed_;
   ScratchMaker makeFile_;
   std::function<void(uint64_t)> reading_;
+  unsigned threads_; ///< that search for eye catchers
   Outcome outcome_{};
   std::vector<Account> others_{}; ///< of the ways that were not taken
   std::unique_ptr<Draft> best_{}; ///< what the way that was taken so far has saved

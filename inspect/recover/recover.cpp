@@ -27,7 +27,8 @@ RecoveryTotals recover(ByteSource& source, const Form& form, PatchFile& out, con
       options.doubted(doubted);
     }
   };
-  Recovery recovery(source, form, rebuilder, options.search, {.loss = loss, .doubt = doubt});
+  Recovery recovery(source, form, rebuilder, options.search, {.loss = loss, .doubt = doubt},
+                    options.threads);
   while (recovery.step())
   {
     at(recovery.position());

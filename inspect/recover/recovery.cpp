@@ -10,8 +10,9 @@ namespace tav::inspect
 
 using namespace tav::layout;
 
-Recovery::Recovery(ByteSource& source, const Form& form, Rebuilder& rebuilder, uint64_t search, Sinks sinks)
-    : source_(source), form_(form), rebuilder_(rebuilder), prober_(source, form, kNoOffset),
+Recovery::Recovery(ByteSource& source, const Form& form, Rebuilder& rebuilder, uint64_t search, Sinks sinks,
+                   unsigned threads)
+    : source_(source), form_(form), threads_(threads), rebuilder_(rebuilder), prober_(source, form, kNoOffset),
       place_(form, source.size()), judge_(source, form, place_), search_(source, form, place_, judge_, search),
       ledger_(source, place_, std::move(sinks)), nesting_(form, place_, rebuilder, ledger_)
 {
@@ -56,7 +57,7 @@ void Recovery::index(uint64_t from)
   if (!indexed_)
   {
     indexed_ = true;
-    place_.expect(findEndings(source_, form_, from));
+    place_.expect(findEndings(source_, form_, from, threads_));
   }
 }
 

@@ -30,7 +30,9 @@ public:
   using Sinks = Ledger::Sinks;
 
   /// `search`: bytes that may be searched for nodes.
-  Recovery(ByteSource& source, const Form& form, Rebuilder& rebuilder, uint64_t search, Sinks sinks);
+  /// `threads` search for eye catchers.
+  Recovery(ByteSource& source, const Form& form, Rebuilder& rebuilder, uint64_t search, Sinks sinks,
+           unsigned threads = 1);
 
   /// Refers to its own parts.
   Recovery(const Recovery&) = delete;
@@ -73,6 +75,7 @@ private:
 
   ByteSource& source_;
   Form form_;
+  unsigned threads_;
   Rebuilder& rebuilder_;
   Prober prober_;
   Place place_;

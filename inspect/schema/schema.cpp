@@ -72,11 +72,30 @@ void Schema::add(ByteSource& source, const Form& form, const std::function<void(
     {
       seen(walker, event);
     }
-    if (event.what == What::nodeBegin && (options_.ends || !isEndPiece(event)))
-    {
-      addNode(source, form, event.node);
-    }
+    see(source, form, event);
   }
+}
+
+void Schema::see(ByteSource& source, const Form& form, const Event& event)
+{
+  if (event.what != What::nodeBegin)
+  {
+    return;
+  }
+  if (isCounted(event.node.elm()))
+  {
+    addNode(source, form, event.node);
+  }
+  else if (event.node.isGroup()) // what is in it belongs to the group around it
+  {
+    open_.resize(static_cast<size_t>(event.node.depth));
+    open_.push_back(open_.empty() ? 0 : open_.back());
+  }
+}
+
+bool Schema::isCounted(uint16_t elm) const
+{
+  return options_.ends || !layout::isEndElement(elm);
 }
 
 uint32_t Schema::childOf(uint32_t parent, uint16_t elm)
@@ -178,24 +197,43 @@ void Schema::addText(ByteSource& source, const Form& form, const Node& node, Pat
   {
     return;
   }
-  const uint64_t room = options_.mostTexts > ~uint64_t{0} / kBytesOfText
-                            ? ~uint64_t{0}
-                            : options_.mostTexts * kBytesOfText;
+  const uint64_t room = roomForTexts();
   // Bytes are told apart as they are shown, which is twice as long.
   auto text = plainText(source, form, node, room - texts.bytes);
   if (text && texts.seen.contains(*text))
   {
+    if (isPart_)
+    {
+      texts.inOrder.back().repeat = std::max(texts.inOrder.back().repeat, node.size());
+    }
     return;
   }
   if (!text || text->size() > room - texts.bytes || texts.count == options_.mostTexts)
   {
-    texts.more = true;
-    texts.seen = {};
+    endTexts(texts);
     return;
   }
   texts.bytes += text->size();
   ++texts.count;
-  texts.seen.insert(std::move(*text));
+  const auto place = texts.seen.insert(std::move(*text)).first;
+  if (isPart_)
+  {
+    texts.inOrder.push_back({&*place, node.size(), 0});
+  }
+}
+
+uint64_t Schema::roomForTexts() const
+{
+  return options_.mostTexts > ~uint64_t{0} / kBytesOfText ? ~uint64_t{0} : options_.mostTexts * kBytesOfText;
+}
+
+void Schema::endTexts(Texts& texts) const
+{
+  texts.more = true;
+  if (!isPart_)
+  {
+    texts.seen = {};
+  }
 }
 
 SchemaEntry Schema::entryOf(const PathNode& path)

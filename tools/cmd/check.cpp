@@ -163,18 +163,19 @@ int run(const Invocation& invocation)
   const Choice choice(invocation);
   Stream stream = openStream(invocation, true);
   Findings findings(invocation, stream, choice);
-  Checker checker(
-      stream.bytes(), stream.form(), [&](RuleId rule) { return choice.wants(rule); },
-      [&](const Finding& finding) { findings.put(finding); },
-      invocation.has("--json") ? PathStyle::whole : PathStyle::brief);
+  CheckTotals totals;
+  if (stream.isStream())
   {
+    const unsigned jobs = jobsOf(invocation);
     Progress progress("check", stream.bytes());
-    while (stream.isStream() && checker.step())
-    {
-      progress.at(checker.position());
-    }
+    totals = check(stream.bytes(), stream.form(),
+                   {.wanted = [&](RuleId rule) { return choice.wants(rule); },
+                    .sink = [&](const Finding& finding) { findings.put(finding); },
+                    .style = invocation.has("--json") ? PathStyle::whole : PathStyle::brief,
+                    .progress = [&](uint64_t offset) { jobs > 1 ? progress.reach(offset) : progress.at(offset); },
+                    .threads = jobs});
   }
-  const Status status = findings.finish(checker.nodes(), checker.endElements());
+  const Status status = findings.finish(totals.nodes, totals.endElements);
   tellStatistics(invocation, stream.bytes());
   return status;
 }
@@ -195,6 +196,7 @@ const Registration registration{{
                  .help = "only this rule, also when it is a note",
                  .many = true},
                 {.names = "--notes", .help = "tell notes, too"},
+                jobsOption(),
                 {.names = "--strict", .help = "tell notes, and let them count as defects"},
                 {.names = "--rules", .help = "print what is looked for, as Markdown, and no more"}},
     .examples = {{"tav check x.tav", "what is wrong with x.tav"},

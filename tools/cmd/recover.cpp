@@ -152,7 +152,8 @@ int run(const Invocation& invocation)
                           {.search = invocation.number("--search").value_or(kNoOffset),
                            .listed = kMostListed,
                            .makeFile = Temporary::make,
-                           .progress = [&](uint64_t offset) { progress.at(offset); }});
+                           .progress = [&](uint64_t offset) { progress.at(offset); },
+                           .threads = jobsOf(invocation)});
     // In a file of a kind that many programs know, a few bytes that look like nodes are none.
     const bool chance = stream.kind && outcome.taken.totals.kept < stream.bytes().size() / 2;
     if (outcome.taken.totals.nodes == 0 || chance)
@@ -194,6 +195,7 @@ const Registration registration{{
                  .required = true},
                 {.names = "--json", .help = "the report as JSON"},
                 {.names = "--report", .kind = ValueKind::file, .value = "FILE", .help = "write the report to FILE"},
+                jobsOption(),
                 {.names = "--search",
                  .kind = ValueKind::number,
                  .value = "BYTES",

@@ -24,11 +24,12 @@ Status addFile(const Invocation& invocation, const std::string& name, Schema& sc
     Stream stream = openStream(invocation, name, invocation.number("--from").value_or(0));
     DamageNotices notices(stream);
     {
+      const unsigned jobs = jobsOf(invocation);
       Progress progress("schema " + stream.source->name(), stream.bytes());
-      schema.add(stream.bytes(), stream.form(), [&](const Walker& walker, const Event& event) {
-        progress.at(event.offset);
-        notices.see(walker, event);
-      });
+      schema.add(stream.bytes(), stream.form(),
+                 {.passed = [&](PassedOver passed) { notices.add(std::move(passed)); },
+                  .progress = [&](uint64_t offset) { jobs > 1 ? progress.reach(offset) : progress.at(offset); },
+                  .threads = jobs});
     }
     tellStatistics(invocation, stream.bytes());
     return notices.tell();
@@ -170,7 +171,8 @@ const Registration registration{{
                  .kind = ValueKind::number,
                  .value = "N",
                  .help = "count up to N different texts of a path, 10000 unless given"},
-                {.names = "--ends", .help = "count what only ends a group, too"}},
+                {.names = "--ends", .help = "count what only ends a group, too"},
+                jobsOption()},
     .examples = {{"tav schema x.tav", "what is in a file"},
                  {"tav schema *.tav --json | jq -r 'select(.distinct == 1) | .path'", "texts that never change"}},
     .run = run,

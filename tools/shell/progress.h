@@ -31,6 +31,15 @@ public:
     }
   }
 
+  /// The same for who calls seldom.
+  void reach(uint64_t bytes)
+  {
+    if (active_)
+    {
+      show(bytes);
+    }
+  }
+
 private:
   void show(uint64_t bytes);
 

@@ -1,5 +1,7 @@
 #include "tools/shell/session.h"
 
+#include <algorithm>
+#include <thread>
 #include <utility>
 
 #include "tav/inspect.hpp"
@@ -44,6 +46,21 @@ std::vector<uint16_t> requireIds(const std::string& option, const std::string& n
                   similar.empty() ? "'tav elements' lists the names" : "did you mean " + similar + "?");
   }
   return ids;
+}
+
+unsigned jobsOf(const Invocation& invocation)
+{
+  constexpr uint64_t most = 256;
+  const uint64_t jobs = invocation.number("--jobs").value_or(1);
+  return static_cast<unsigned>(std::min(jobs != 0 ? jobs : std::thread::hardware_concurrency(), most));
+}
+
+OptionSpec jobsOption()
+{
+  return {.names = "-j,--jobs",
+          .kind = ValueKind::number,
+          .value = "N",
+          .help = "work on a file of 4 MiB or more with N processors, 1 unless given; 0: with all of them"};
 }
 
 uint64_t ringBytes(const Invocation& invocation)

@@ -39,6 +39,10 @@ std::vector<uint16_t> requireIds(const std::string& option, const std::string& n
 /// Bytes of memory for pages: --ring.
 uint64_t ringBytes(const Invocation& invocation);
 
+/// Threads that work on one file: --jobs; 0 means as many as there are processors.
+unsigned jobsOf(const Invocation& invocation);
+OptionSpec jobsOption();
+
 /// Opens a file, from an offset on, and recognises its form; options override. Throws Failure with kTooDamaged when it
 /// is no stream. With `lenient`, such a file is handed out all the same, with the most likely form.
 Stream openStream(const Invocation& invocation, const std::string& path, uint64_t from, bool lenient = false);

@@ -35,6 +35,10 @@ public:
   /// `style` is that of the findings' paths; whole ones are given down to 4,000 levels.
   TAV_INSPECT_API Checker(ByteSource& source, const Form& form, std::function<bool(RuleId)> wanted, Sink sink,
                           PathStyle style = PathStyle::whole);
+  /// Goes on where a walk stands, before which `isPlain`. `rootEnded`: a root has ended before. Without a sink,
+  /// findings are counted alone.
+  TAV_INSPECT_API Checker(ByteSource& source, const Form& form, std::function<bool(RuleId)> wanted, Sink sink,
+                          PathStyle style, const Walker::State& state, bool rootEnded);
 
   /// Goes on by one piece of the file; false at its end.
   TAV_INSPECT_API bool step();
@@ -43,6 +47,12 @@ public:
   /// End elements are structure: they are counted apart.
   uint64_t nodes() const { return nodes_; }
   uint64_t endElements() const { return endElements_; }
+  uint64_t findings() const { return findings_; }
+  uint64_t damages() const { return damages_; } ///< runs of damaged bytes
+  bool rootEnded() const { return rootEnded_; }
+  const Walker& walker() const { return walker_; }
+  /// Whether what is said of the rest of the stream depends on the walk and on `rootEnded` alone.
+  TAV_INSPECT_API bool isPlain() const;
 
 private:
   struct Group
@@ -60,6 +70,7 @@ private:
     bool damagedTail = false; ///< damage since the last child
   };
 
+  void enter(const Node& node);
   void found(RuleId rule, uint64_t offset, uint64_t length, std::string sentence, bool otherStream = false);
   void beginNode();
   void beginGroup();
@@ -90,10 +101,33 @@ private:
   std::vector<Group> groups_{}; ///< the first stands for the file
   uint64_t nodes_ = 0;
   uint64_t endElements_ = 0;
+  uint64_t findings_ = 0;
+  uint64_t damages_ = 0;
   uint64_t paddingCut_ = 0; ///< bytes of padding that the last data element lacks at the end of the file
   uint64_t deepOpen_ = 0;   ///< groups below the deepest level that is told of that were never closed
   bool rootEnded_ = false;
   bool deepTold_ = false;
 };
+
+struct CheckOptions
+{
+  std::function<bool(RuleId)> wanted{}; ///< which rules to look for; nothing: all that are no notes
+  Checker::Sink sink{};
+  PathStyle style = PathStyle::whole;       ///< of the findings' paths
+  std::function<void(uint64_t)> progress{}; ///< is told by offset how far the work is
+  unsigned threads = 1;                     ///< that work on it; the caller's is one of them
+  uint64_t partBytes = 0;                   ///< how long the parts are that threads take; 0: by the file's size
+};
+
+struct CheckTotals
+{
+  uint64_t nodes = 0;
+  uint64_t endElements = 0;
+};
+
+/// Checks a whole file in one form, as a Checker does. The callbacks are called by the caller's thread, with findings
+/// in the same order for any number of threads. Of a file of less than 4 MiB, and where it is full of findings, one
+/// thread does all the work. Throws Error, and what the callbacks throw.
+TAV_INSPECT_API CheckTotals check(ByteSource& source, const Form& form, const CheckOptions& options);
 
 } // namespace tav::inspect

@@ -58,6 +58,7 @@ struct RecoverOptions
   std::function<void(const Loss&)> lost{};     ///< is told of each run of lost bytes, in their order
   std::function<void(const Doubt&)> doubted{}; ///< is told of each node that may be none
   std::function<void(uint64_t)> progress{};    ///< is told by offset how far the work is
+  unsigned threads = 1;                        ///< that search a damaged file for eye catchers
 };
 
 /// Appends a sound stream of all nodes that are whole: groups are closed, sizes, paddings and pairs made anew. A group
@@ -99,6 +100,7 @@ struct RecoverBestOptions
   size_t listed = 1000;                     ///< losses that an account keeps, and doubts
   ScratchMaker makeFile = makeScratch;      ///< for what each form that is tried has saved
   std::function<void(uint64_t)> progress{}; ///< is told by offset how far the work is
+  unsigned threads = 1;                     ///< that search a damaged file for eye catchers
 };
 
 /// As `recover`, in the form that keeps most. Where the start is damaged, nothing but the outcome shows the form: all

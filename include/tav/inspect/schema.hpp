@@ -13,6 +13,7 @@
 #include <vector>
 
 #include "tav/inspect/api.hpp"
+#include "tav/inspect/damageWatch.hpp"
 #include "tav/inspect/node.hpp"
 #include "tav/inspect/source.hpp"
 #include "tav/inspect/walker.hpp"
@@ -28,6 +29,15 @@ struct SchemaOptions
 };
 
 inline constexpr uint64_t kBytesOfText = 128;
+
+/// How a stream is added.
+struct SchemaWork
+{
+  DamageWatch::Sink passed{};               ///< is told of damage, by the caller's thread
+  std::function<void(uint64_t)> progress{}; ///< is told by offset how far the work is, likewise
+  unsigned threads = 1;                     ///< that work on it; the caller's is one of them
+  uint64_t partBytes = 0;                   ///< how long the parts are that threads take; 0: by the file's size
+};
 
 /// All nodes of one path.
 struct SchemaEntry
@@ -45,7 +55,8 @@ struct SchemaEntry
 };
 
 /// Collects the paths of any number of streams. Memory grows with the number of different paths, the depth, and the
-/// texts that are told apart; not with the number of nodes. Used by one thread.
+/// texts that are told apart; not with the number of nodes. Used by one thread, which others help where it is asked
+/// for.
 class Schema
 {
 public:
@@ -58,6 +69,9 @@ public:
   TAV_INSPECT_API void add(ByteSource& source, const Form& form,
                            const std::function<void(const Walker&, const Event&)>& seen = {});
 
+  /// The same with several threads, with the same outcome; of a file of less than 4 MiB, one does all the work.
+  TAV_INSPECT_API void add(ByteSource& source, const Form& form, const SchemaWork& work);
+
   /// Different paths so far.
   size_t paths() const { return nodes_.size() - 1; }
 
@@ -67,6 +81,8 @@ public:
                             uint64_t mostSteps = 4000) const;
 
 private:
+  class Job;
+
   /// Orders numbers of all widths and timestamps.
   using Rank = std::array<uint64_t, 4>;
   struct Bound
@@ -75,9 +91,17 @@ private:
     std::string text{};
     uint16_t type = 0;
   };
+  /// A text of a part of a stream that was new in it, with what it takes to say what the whole stream makes of it.
+  struct NewText
+  {
+    const std::string* text;
+    uint64_t size;   ///< of its node
+    uint64_t repeat; ///< of the largest node behind it, before the next new text, with a text that was not new
+  };
   struct Texts
   {
     std::unordered_set<std::string> seen{};
+    std::vector<NewText> inOrder{}; ///< of a part
     uint64_t bytes = 0;
     uint64_t count = 0;
     bool more = false;
@@ -94,6 +118,14 @@ private:
     std::unique_ptr<Texts> texts{};
   };
 
+  void enter(const Walker::State& state);
+  void see(ByteSource& source, const Form& form, const Event& event);
+  bool isCounted(uint16_t elm) const;
+  void merge(const Schema& part);
+  void mergePath(const PathNode& part, PathNode& path) const;
+  void mergeTexts(const Texts& part, Texts& texts) const;
+  void endTexts(Texts& texts) const;
+  uint64_t roomForTexts() const;
   uint32_t childOf(uint32_t parent, uint16_t elm);
   void addNode(ByteSource& source, const Form& form, const Node& node);
   void addValue(ByteSource& source, const Form& form, const Node& node, PathNode& path) const;
@@ -104,6 +136,7 @@ private:
 
   SchemaOptions options_;
   Dictionary dictionary_{}; ///< of all sources; where they say different things, the first is right
+  bool isPart_ = false; ///< of one that is made of parts
   std::vector<PathNode> nodes_{};
   std::unordered_map<uint64_t, uint32_t> children_{}; ///< by parent and element
   std::vector<uint32_t> open_{};                      ///< the nodes on the way to the place, level by level

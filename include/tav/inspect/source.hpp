@@ -90,6 +90,14 @@ public:
   uint64_t bytesRead() const { return bytesRead_; }
   /// Calls of the storage's `read` so far.
   uint64_t readCalls() const { return readCalls_; }
+  /// Counts what another object has read of the same storage.
+  void countReads(const ByteSource& other)
+  {
+    bytesRead_ += other.bytesRead_;
+    readCalls_ += other.readCalls_;
+  }
+  /// Memory for pages.
+  uint64_t ringBytes() const { return uint64_t{maxPages_} * kPage; }
 
   /// The storage underneath, for a handle of the library. Its cursor is shared: this object may be used again when
   /// the handle is done.

@@ -7,7 +7,7 @@
 
 #include "inspect/document/streamWalk.h"
 #include "inspect/streams.h"
-#include "inspect/writtenDown.h"
+#include "support/writtenDown.h"
 
 using namespace tav::inspect;
 using test::Bytes;

@@ -1,0 +1,104 @@
+// W10: a file by one thread and by two in the same run, and what a plan costs.
+//   tav_parts [MIB]        the stream's length, 64 unless given
+#include <algorithm>
+#include <chrono>
+#include <cstdint>
+#include <cstdio>
+#include <cstdlib>
+#include <ctime>
+#include <functional>
+#include <span>
+#include <string>
+#include <vector>
+
+#include "tav/inspect.hpp"
+#include "tav/tav.hpp"
+
+namespace
+{
+
+using namespace tav::inspect;
+
+/// One group of small leaves, or hosts of 20 leaves each.
+std::vector<std::byte> stream(uint64_t bytes, bool flat)
+{
+  std::vector<std::byte> made(bytes + (bytes >> 3U) + 4096);
+  tav::Writer writer{std::span(made)};
+  {
+    tav::Group system = writer.group(TAV_ELM_CMN_SYSTEM);
+    for (uint32_t i = 0; writer.size() < bytes; ++i)
+    {
+      if (flat)
+      {
+        system.add(TAV_ELM_CMN_CPU_ONLINE, i);
+        continue;
+      }
+      tav::Group host = system.group(TAV_ELM_CMN_HOST);
+      for (uint32_t k = 0; k < 20; ++k)
+      {
+        k % 5 == 0 ? host.add(TAV_ELM_CMN_HOST_NAME, "ada") : host.add(TAV_ELM_CMN_CPU_ONLINE, i + k);
+      }
+    }
+  }
+  writer.finish();
+  made.resize(writer.bytes().size());
+  return made;
+}
+
+struct Cost
+{
+  double seconds = 0;
+  double processor = 0; ///< of all threads
+};
+
+/// The least of a few runs.
+Cost costOf(const std::function<void()>& work)
+{
+  constexpr int runs = 5;
+  Cost best{1e9, 1e9};
+  for (int i = 0; i < runs; ++i)
+  {
+    const std::clock_t used = std::clock();
+    const auto begin = std::chrono::steady_clock::now();
+    work();
+    const std::chrono::duration<double> passed = std::chrono::steady_clock::now() - begin;
+    best.seconds = std::min(best.seconds, passed.count());
+    best.processor = std::min(best.processor, static_cast<double>(std::clock() - used) / CLOCKS_PER_SEC);
+  }
+  return best;
+}
+
+void compare(const std::string& what, const std::function<void(unsigned)>& work)
+{
+  const Cost one = costOf([&] { work(1); });
+  const Cost two = costOf([&] { work(2); });
+  std::printf("W10/%s: one thread %.1f ms, two %.1f ms: %.2f times as fast; work in all %.3f times as much\n",
+              what.c_str(), one.seconds * 1e3, two.seconds * 1e3, one.seconds / two.seconds,
+              two.processor / one.processor);
+}
+
+void measure(uint64_t mebibytes, bool flat)
+{
+  const std::vector<std::byte> bytes = stream(mebibytes << 20U, flat);
+  const std::string name = flat ? "flat" : "hosts";
+  ByteSource source("x", std::span(reinterpret_cast<const uint8_t*>(bytes.data()), bytes.size()));
+  size_t parts = 0;
+  const Cost planned = costOf([&] { parts = plan(source, Form{}).size(); });
+  std::printf("W10/plan_%s: %.2f ms for %zu parts: %.2f ms a GB\n", name.c_str(), planned.seconds * 1e3, parts,
+              planned.seconds * 1e12 / static_cast<double>(bytes.size()));
+  compare("check_" + name, [&](unsigned threads) { (void)check(source, {}, {.threads = threads}); });
+  compare("schema_" + name, [&](unsigned threads) {
+    Schema schema;
+    schema.add(source, {}, {.threads = threads});
+  });
+}
+
+} // namespace
+
+int main(int argc, char** argv)
+{
+  const uint64_t mebibytes = argc > 1 ? std::strtoull(argv[1], nullptr, 10) : 64;
+  measure(mebibytes, true);
+  measure(mebibytes, false);
+  return 0;
+}

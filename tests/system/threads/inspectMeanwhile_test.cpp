@@ -1,0 +1,73 @@
+/// Several threads look into one file: what they find is what one finds.
+#include <algorithm>
+#include <cstddef>
+#include <memory>
+#include <span>
+#include <string>
+#include <vector>
+
+#include <gtest/gtest.h>
+
+#include "tav/inspect.hpp"
+#include "tav/tav.hpp"
+
+namespace
+{
+
+using namespace tav::inspect;
+
+std::vector<std::byte> stream()
+{
+  tav::Writer writer;
+  {
+    tav::Group system = writer.group(TAV_ELM_CMN_SYSTEM, {.eyeSize = true});
+    for (uint32_t i = 0; i < 3000; ++i)
+    {
+      tav::Group host = system.group(TAV_ELM_CMN_HOST, {.eyeSize = i % 2 == 0});
+      host.add(TAV_ELM_CMN_HOST_NAME, std::string(1 + i % 40, 'x'));
+      host.add(TAV_ELM_CMN_CPU_ONLINE, i);
+    }
+  }
+  writer.finish();
+  std::vector<std::byte> bytes(writer.bytes().begin(), writer.bytes().end());
+  std::fill_n(bytes.begin() + 100'000, 300, std::byte{0xEE});
+  return bytes;
+}
+
+/// A source of which nobody knows that it is memory: all threads read one storage.
+std::unique_ptr<ByteSource> sourceOf(std::vector<std::byte>& bytes)
+{
+  return std::make_unique<ByteSource>("x", std::make_unique<TAVSSMemory>(bytes.data(), bytes.size()), 64 * 1024);
+}
+
+std::string found(std::vector<std::byte>& bytes, unsigned threads)
+{
+  const auto source = sourceOf(bytes);
+  std::string text;
+  const auto sink = [&](const Finding& finding) { text += finding.path + " " + finding.sentence + "\n"; };
+  const CheckTotals totals = check(*source, {}, {.sink = sink, .threads = threads, .partBytes = 5000});
+  Schema schema;
+  schema.add(*source, {},
+             {.passed = [&](const PassedOver& passed) { text += passed.path + passed.sentence; },
+              .threads = threads,
+              .partBytes = 5000});
+  schema.each(PathStyle::whole, [&](const SchemaEntry& entry) {
+    text += entry.path + " " + std::to_string(entry.count) + " " + entry.least.value_or("") + "\n";
+  });
+  const auto scratch = makeScratch();
+  PatchFile out(scratch->file());
+  text += std::to_string(recover(*source, {}, out, {.threads = threads}).kept);
+  return text + " " + std::to_string(totals.nodes);
+}
+
+} // namespace
+
+TEST(InspectMeanwhile, FindsWhatOneThreadFinds)
+{
+  std::vector<std::byte> bytes = stream();
+  const std::string one = found(bytes, 1);
+  for (const unsigned threads : {2U, 3U, 8U})
+  {
+    EXPECT_EQ(found(bytes, threads), one);
+  }
+}

@@ -1,0 +1,233 @@
+// Several threads answer as one does: the same findings, paths and counts in the same order.
+#include <algorithm>
+#include <stdexcept>
+#include <string>
+#include <vector>
+
+#include <gmock/gmock.h>
+
+#include "inspect/streams.h"
+
+using namespace tav::inspect;
+using test::Bytes;
+
+namespace
+{
+
+/// A few streams of all kinds in one file, some of them damaged.
+Bytes mixture(uint64_t seed)
+{
+  Bytes bytes = test::namedStream(seed, seed % 2 == 1, seed % 3 == 1);
+  for (uint64_t i = 0; i < seed % 3; ++i)
+  {
+    Bytes more = i % 2 == 0 ? test::bytesOfTree(test::randomTree(seed * 3 + i, {.depth = 6, .width = 9}))
+                            : test::namedStream(seed * 5 + i, seed % 4 == 1);
+    more.insert(more.begin(), seed % 5 == 0 ? 40 : 0, uint8_t{0});
+    bytes.insert(bytes.end(), more.begin(), more.end());
+  }
+  for (uint64_t i = 0; i < seed / 3 % 4; ++i)
+  {
+    bytes = test::damaged(bytes, seed + i);
+  }
+  return bytes;
+}
+
+/// One group with many small children, texts that repeat and numbers among them, and a group now and then.
+Bytes longGroup(unsigned count, bool pairs)
+{
+  tav::Writer writer;
+  {
+    tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM, {.eyeSize = pairs});
+    for (unsigned i = 0; i < count; ++i)
+    {
+      root.add(TAV_ELM_CMN_HOST_NAME, std::string(1 + i * 7919U % 211U, 'a'), {.eyeSize = pairs});
+      root.add(TAV_ELM_CMN_CPU_ONLINE, i * 2654435761U, {.eyeSize = pairs});
+      if (i % 50 == 49)
+      {
+        tav::Group host = root.group(TAV_ELM_CMN_HOST, {.eyeSize = pairs});
+        host.add(TAV_ELM_CMN_HOST_NAME, std::to_string(i / 2));
+      }
+    }
+  }
+  writer.finish();
+  const auto* const first = reinterpret_cast<const uint8_t*>(writer.bytes().data());
+  return {first, first + writer.bytes().size()};
+}
+
+std::string checked(const Bytes& bytes, const tav::inspect::Form& form, bool notes, unsigned threads, uint64_t part)
+{
+  ByteSource source("x", std::span<const uint8_t>(bytes));
+  std::string text;
+  const auto totals = check(source, form,
+                            {.wanted = [&](RuleId rule) { return notes || !ruleOf(rule).note; },
+                             .sink =
+                                 [&](const Finding& found) {
+                                   text += std::to_string(found.offset) + "+" + std::to_string(found.length) + " " +
+                                           found.path + ": " + found.sentence + (found.otherStream ? "!" : "") +
+                                           " [" + std::string(ruleOf(found.rule).id) + "]\n";
+                                 },
+                             .threads = threads,
+                             .partBytes = part});
+  return text + std::to_string(totals.nodes) + " " + std::to_string(totals.endElements);
+}
+
+std::string shaped(const Bytes& bytes, const tav::inspect::Form& form, uint64_t mostTexts, bool ends, unsigned threads,
+                   uint64_t part)
+{
+  ByteSource source("x", std::span<const uint8_t>(bytes));
+  Schema schema({.mostTexts = mostTexts, .ends = ends});
+  std::string text;
+  const SchemaWork work{.passed = [&](const PassedOver& passed) { text += passed.path + " " + passed.sentence + "\n"; },
+                        .threads = threads,
+                        .partBytes = part};
+  schema.add(source, form, work);
+  schema.add(source, form, work);
+  schema.each(PathStyle::whole, [&](const SchemaEntry& entry) {
+    text += entry.path + " " + std::to_string(entry.count) + " " + entry.least.value_or("-") + " " +
+            entry.greatest.value_or("-") + " " + std::to_string(entry.leastType) + " " +
+            std::to_string(entry.distinct.value_or(0)) + (entry.more ? "+" : "");
+    for (const uint16_t type : entry.types)
+    {
+      text += " " + std::to_string(type);
+    }
+    text += "\n";
+  });
+  return text;
+}
+
+} // namespace
+
+TEST(Parallel, ChecksAsOneThreadDoes)
+{
+  for (uint64_t seed = 0; seed < test::casesOf(60).count; ++seed)
+  {
+    SCOPED_TRACE(seed);
+    const Bytes bytes = mixture(seed);
+    const tav::inspect::Form form{.swapped = seed % 2 == 1, .aligned = seed % 3 == 1};
+    for (const bool notes : {false, true})
+    {
+      const std::string one = checked(bytes, form, notes, 1, 0);
+      for (const uint64_t part : {30U, 300U})
+      {
+        EXPECT_EQ(checked(bytes, form, notes, 2, part), one);
+        EXPECT_EQ(checked(bytes, form, notes, 5, part), one);
+      }
+    }
+  }
+}
+
+TEST(Parallel, ChecksLongGroupsAsOneThreadDoes)
+{
+  for (uint64_t seed = 0; seed < test::casesOf(12).count; ++seed)
+  {
+    SCOPED_TRACE(seed);
+    Bytes bytes = longGroup(700, seed % 2 == 1);
+    for (uint64_t i = 0; i < seed / 2; ++i)
+    {
+      bytes = test::damaged(bytes, seed * 7 + i);
+    }
+    const std::string one = checked(bytes, {}, seed % 3 == 0, 1, 0);
+    for (const uint64_t part : {500U, 9000U})
+    {
+      EXPECT_EQ(checked(bytes, {}, seed % 3 == 0, 2, part), one);
+      EXPECT_EQ(checked(bytes, {}, seed % 3 == 0, 3, part), one);
+    }
+  }
+}
+
+TEST(Parallel, FindsTheSamePlacesAmongMoreSiblingsThanAreCounted)
+{
+  tav::Writer writer;
+  {
+    tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM);
+    for (unsigned i = 0; i < 4000; ++i)
+    {
+      root.add(static_cast<uint16_t>(100 + i * 7 % 300), uint32_t{i}); // ids that nobody knows: a finding each
+      root.add(TAV_ELM_CMN_CPU_ONLINE, uint32_t{i});
+    }
+  }
+  writer.finish();
+  const auto* const first = reinterpret_cast<const uint8_t*>(writer.bytes().data());
+  const Bytes bytes(first, first + writer.bytes().size());
+  const std::string one = checked(bytes, {}, true, 1, 0);
+  EXPECT_EQ(checked(bytes, {}, true, 3, 1000), one);
+  EXPECT_EQ(checked(bytes, {}, true, 3, 30'000), one);
+}
+
+TEST(Parallel, CollectsTheShapeAsOneThreadDoes)
+{
+  for (uint64_t seed = 0; seed < test::casesOf(60).count; ++seed)
+  {
+    SCOPED_TRACE(seed);
+    const Bytes bytes = mixture(seed);
+    const tav::inspect::Form form{.swapped = seed % 2 == 1, .aligned = seed % 3 == 1};
+    const uint64_t texts = seed % 4 == 0 ? 10'000 : seed % 4;
+    const std::string one = shaped(bytes, form, texts, seed % 5 == 0, 1, 0);
+    for (const uint64_t part : {30U, 300U})
+    {
+      EXPECT_EQ(shaped(bytes, form, texts, seed % 5 == 0, 3, part), one);
+    }
+  }
+}
+
+TEST(Parallel, CountsTextsAsOneThreadDoes)
+{
+  const Bytes bytes = longGroup(900, false);
+  for (const uint64_t texts : {0U, 1U, 2U, 10U, 50U, 150U, 180U, 200U, 210U, 211U, 212U, 1000U})
+  {
+    SCOPED_TRACE(texts);
+    const std::string one = shaped(bytes, {}, texts, false, 1, 0);
+    for (const uint64_t part : {1000U, 20'000U})
+    {
+      EXPECT_EQ(shaped(bytes, {}, texts, false, 2, part), one);
+    }
+  }
+}
+
+TEST(Parallel, TakesAsMuchOfAFileAsOneThreadDoesAndCountsIt)
+{
+  const Bytes bytes = longGroup(20'000, true);
+  auto storage = std::make_unique<TAVSSMemory>(const_cast<uint8_t*>(bytes.data()), bytes.size());
+  ByteSource source("x", std::move(storage));
+  const auto totals = check(source, {}, {.threads = 2, .partBytes = 100'000});
+  EXPECT_EQ(totals.nodes, 1U + 40'000 + 2 * 400);
+  EXPECT_GE(source.bytesRead(), bytes.size());
+  EXPECT_LT(source.bytesRead(), bytes.size() * 3);
+}
+
+TEST(Parallel, EndsWithWhatTheCallbackThrows)
+{
+  Bytes bytes = longGroup(3000, false);
+  std::fill_n(bytes.begin() + static_cast<ptrdiff_t>(bytes.size() / 2), 600, uint8_t{0xEE});
+  ByteSource source("x", std::span<const uint8_t>(bytes));
+  const auto sink = [](const Finding&) { throw std::runtime_error("enough"); };
+  EXPECT_THROW(check(source, {}, {.sink = sink, .threads = 3, .partBytes = 2000}), std::runtime_error);
+  const auto progress = [](uint64_t) { throw std::runtime_error("enough"); };
+  EXPECT_THROW(check(source, {}, {.progress = progress, .threads = 3, .partBytes = 2000}), std::runtime_error);
+}
+
+TEST(Parallel, RecoversAsOneThreadDoes)
+{
+  for (uint64_t seed = 0; seed < 4; ++seed)
+  {
+    Bytes bytes;
+    for (unsigned i = 0; i < 4; ++i)
+    {
+      const Bytes more = longGroup(5000, seed % 2 == 0);
+      bytes.insert(bytes.end(), more.begin(), more.end());
+      std::fill_n(bytes.end() - 300'000, 20 * seed, uint8_t{0xEE});
+    }
+    ASSERT_GT(bytes.size(), size_t{2} << 20U);
+    std::vector<Bytes> made;
+    std::vector<uint64_t> lost;
+    for (const unsigned threads : {1U, 3U})
+    {
+      ByteSource source("x", std::span<const uint8_t>(bytes));
+      test::Made out;
+      lost.push_back(recover(source, {}, out.file(), {.threads = threads}).lost);
+      made.push_back(out.bytes());
+    }
+    EXPECT_EQ(made[0], made[1]);
+    EXPECT_EQ(lost[0], lost[1]);
+  }
+}
