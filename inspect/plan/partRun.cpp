@@ -109,8 +109,8 @@ PartRun::~PartRun()
   {
     const std::lock_guard lock(mutex_);
     stop_.store(true);
+    changed_.notify_all();
   }
-  changed_.notify_all();
   for (std::thread& thread : threads_)
   {
     thread.join();

@@ -42,7 +42,7 @@ struct Part
   Form form{};                          ///< of the stream that it begins in
   uint64_t streamOffset = 0;            ///< where the walk in this form began
   bool wide = true;                     ///< the next root is expected to have a 64-bit header
-  bool guessed = false;                 ///< no sizes lead to `offset` from the file's start on: its bytes look like a seam
+  bool guessed = false;                 ///< its bytes look like a seam; no sizes lead there from the start
   bool afterDamage = false;             ///< there is damage directly before it
   std::vector<PartGroup> around{};      ///< from the root inwards; empty: between streams
   std::optional<uint64_t> firstChild{}; ///< children of the innermost group before it, where that is known
