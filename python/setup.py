@@ -1,4 +1,5 @@
 """Builds the compiled part of the package by the project's CMake, with its libraries inside."""
+import os
 import pathlib
 import re
 import shutil
@@ -19,13 +20,14 @@ def version() -> str:
 class BuildByCMake(build_ext):
     def build_extension(self, ext: Extension) -> None:
         build = pathlib.Path(self.build_temp).resolve()
-        options = {"CMAKE_BUILD_TYPE": "Release", "BUILD_SHARED_LIBS": "OFF", "TAV_BUILD_PYTHON": "ON", "TAV_BUILD_TESTS": "OFF",
-                   "TAV_BUILD_TOOLS": "OFF", "TAV_BUILD_EXAMPLES": "OFF", "TAV_INSTALL": "OFF",
-                   "Python3_EXECUTABLE": sys.executable, "CMAKE_MODULE_LINKER_FLAGS": "-static-libstdc++ -static-libgcc -s"}
-        subprocess.run(["cmake", "-S", str(ROOT), "-B", str(build), *(f"-D{name}={value}" for name, value in options.items())],
-                       check=True)
-        jobs = ["--parallel", str(self.parallel)] if self.parallel else ["--parallel"]
-        subprocess.run(["cmake", "--build", str(build), "--target", "tav_python", *jobs], check=True)
+        options = {"CMAKE_BUILD_TYPE": "Release", "BUILD_SHARED_LIBS": "OFF", "TAV_BUILD_PYTHON": "ON",
+                   "TAV_BUILD_TESTS": "OFF", "TAV_BUILD_TOOLS": "OFF", "TAV_BUILD_EXAMPLES": "OFF", "TAV_INSTALL": "OFF",
+                   "Python3_EXECUTABLE": sys.executable,
+                   "CMAKE_MODULE_LINKER_FLAGS": "-static-libstdc++ -static-libgcc -s"}
+        given = [f"-D{name}={value}" for name, value in options.items()]
+        subprocess.run(["cmake", "-S", str(ROOT), "-B", str(build), *given], check=True)
+        jobs = str(self.parallel or os.cpu_count() or 1)
+        subprocess.run(["cmake", "--build", str(build), "--target", "tav_python", "--parallel", jobs], check=True)
         made = build / "python" / self.get_ext_filename(ext.name)
         target = pathlib.Path(self.get_ext_fullpath(ext.name))
         target.parent.mkdir(parents=True, exist_ok=True)
