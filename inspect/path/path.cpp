@@ -71,7 +71,10 @@ public:
   }
 
   /// Empty where there is none.
-  std::string_view tagOf(uint16_t elm) const { return places_[elm] == 0 ? std::string_view() : tags_[places_[elm] - 1]; }
+  std::string_view tagOf(uint16_t elm) const
+  {
+    return places_[elm] == 0 ? std::string_view() : tags_[places_[elm] - 1];
+  }
 
 private:
   std::vector<std::string_view> tags_{};

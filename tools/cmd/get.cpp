@@ -275,7 +275,8 @@ private:
   {
     const Node& node = found.node;
     nlohmann::ordered_json object;
-    object["path"] = node.depth <= kMostSteps ? found.path(PathStyle::whole) : offsetPath(node, found.source.dictionary());
+    object["path"] =
+        node.depth <= kMostSteps ? found.path(PathStyle::whole) : offsetPath(node, found.source.dictionary());
     object["offset"] = node.offset();
     object["size"] = node.size();
     object["type"] = typeText(node.type());

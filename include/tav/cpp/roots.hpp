@@ -15,8 +15,8 @@ namespace detail
 {
 
 /// The root at an offset, or behind the zeros that are there, and where it ends. TAV_RC_NO_MORE_CHILDREN when nothing
-/// but zeros is left, TAV_RC_BAD_CHILD_HDR where something else than a root is. `file`: what is read, where it is known, for
-/// its holes.
+/// but zeros is left, TAV_RC_BAD_CHILD_HDR where something else than a root is. `file`: what is read, where it is
+/// known, for its holes.
 TAV_API uint32_t findRoot(TAVHandle& handle, KORHFile* file, const StreamForm& form, uint64_t from, uint64_t& root,
                           uint64_t& end) noexcept;
 

@@ -136,7 +136,7 @@ private:
 
   SchemaOptions options_;
   Dictionary dictionary_{}; ///< of all sources; where they say different things, the first is right
-  bool isPart_ = false; ///< of one that is made of parts
+  bool isPart_ = false;     ///< of one that is made of parts
   std::vector<PathNode> nodes_{};
   std::unordered_map<uint64_t, uint32_t> children_{}; ///< by parent and element
   std::vector<uint32_t> open_{};                      ///< the nodes on the way to the place, level by level
