@@ -247,8 +247,10 @@ void Checker::checkText()
 {
   const Node& node = event_.node;
   const bool utf8 = node.type() == TAV_TYPE_UTF8_STRING;
-  const bool asked = wanted_(RuleId::utf8Invalid) || wanted_(RuleId::stringNul) || wanted_(RuleId::stringHigh);
-  if (!asked || (!utf8 && node.type() != TAV_TYPE_ASCII_STRING))
+  const auto isAsked = [&] {
+    return wanted_(RuleId::utf8Invalid) || wanted_(RuleId::stringNul) || wanted_(RuleId::stringHigh);
+  };
+  if ((!utf8 && node.type() != TAV_TYPE_ASCII_STRING) || !isAsked())
   {
     return;
   }

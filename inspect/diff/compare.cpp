@@ -1,3 +1,4 @@
+#include <algorithm>
 #include <cstdlib>
 #include <string>
 #include <vector>
@@ -154,7 +155,7 @@ bool Comparer::samePayload(const Row& a, const Row& b)
   }
   for (uint64_t at = 0; at < a.size; at += kPiece)
   {
-    if (a_.piece(a, at, kPiece) != b_.piece(b, at, kPiece))
+    if (!std::ranges::equal(a_.piece(a, at, kPiece), b_.piece(b, at, kPiece)))
     {
       return false;
     }

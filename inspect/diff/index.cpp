@@ -203,7 +203,7 @@ uint64_t DiffIndex::payloadHash(const Row& row)
   mix(hash, row.size);
   for (uint64_t at = 0; at < row.size;)
   {
-    const std::vector<uint8_t> bytes = piece(row, at, kPiece);
+    const std::span<const uint8_t> bytes = piece(row, at, kPiece);
     if (bytes.empty())
     {
       break;
@@ -219,19 +219,19 @@ uint64_t DiffIndex::payloadHash(const Row& row)
   return hash == 0 ? 1 : hash;
 }
 
-std::vector<uint8_t> DiffIndex::piece(const Row& row, uint64_t at, uint64_t most)
+std::span<const uint8_t> DiffIndex::piece(const Row& row, uint64_t at, uint64_t most)
 {
-  std::vector<uint8_t> bytes(static_cast<size_t>(std::min({most, row.size - at, source_.size()})));
-  bytes.resize(source_.read(row.payload + at, bytes));
+  piece_.resize(static_cast<size_t>(std::min({most, row.size - at, source_.size()})));
+  piece_.resize(source_.read(row.payload + at, piece_));
   const SwapRule rule = typeInfo(row.type).swapRule;
   if (!form_.swapped || row.isDamaged() || (at != 0 && rule != SwapRule::all64))
   {
-    return bytes;
+    return piece_;
   }
-  const uint64_t prefix = row.size < swapUnitLength(rule) ? 0 : swappedPrefix(rule, bytes.size());
-  const std::vector<uint8_t> stored(bytes.begin(), bytes.begin() + static_cast<ptrdiff_t>(prefix));
-  swapPayload(rule, stored.data(), bytes.data(), prefix);
-  return bytes;
+  const uint64_t prefix = row.size < swapUnitLength(rule) ? 0 : swappedPrefix(rule, piece_.size());
+  const std::vector<uint8_t> stored(piece_.begin(), piece_.begin() + static_cast<ptrdiff_t>(prefix));
+  swapPayload(rule, stored.data(), piece_.data(), prefix);
+  return piece_;
 }
 
 void DiffIndex::append(const Row& row)

@@ -5,6 +5,7 @@
 
 #include <array>
 #include <cstdint>
+#include <span>
 #include <string>
 #include <vector>
 
@@ -48,8 +49,9 @@ public:
   uint64_t rows() const { return count_; }
   Row row(uint64_t number);
 
-  /// A part of a payload in host order; pieces must be asked for from the front, in multiples of 8 bytes.
-  std::vector<uint8_t> piece(const Row& row, uint64_t at, uint64_t most);
+  /// A part of a payload in host order, valid until the next call; pieces must be asked for from the front, in
+  /// multiples of 8 bytes.
+  std::span<const uint8_t> piece(const Row& row, uint64_t at, uint64_t most);
 
   std::string path(uint64_t number);
   /// "Uint32 8", "group of 3 nodes"; values are cut.
@@ -87,6 +89,7 @@ private:
   uint64_t prefixSteps_ = 0;
   uint64_t ignoredDepth_ = kNoRow; ///< of the node that is being left out
   std::vector<Open> open_{};
+  std::vector<uint8_t> piece_{};
   std::vector<Row> window_{}; ///< rows at hand, from `windowStart_` on
   uint64_t windowStart_ = 0;
 };

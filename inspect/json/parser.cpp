@@ -1,6 +1,7 @@
 #include "inspect/json/parser.h"
 
-#include <utility>
+#include <algorithm>
+#include <array>
 
 #include "tav/inspect/value.hpp"
 
@@ -14,6 +15,16 @@ bool isDigit(int c)
 {
   return c >= '0' && c <= '9';
 }
+
+/// Characters of a string that stand for themselves.
+constexpr auto kPlain = [] {
+  std::array<bool, 256> table{};
+  for (size_t byte = 0x20; byte < table.size(); ++byte)
+  {
+    table[byte] = byte != '"' && byte != '\\';
+  }
+  return table;
+}();
 
 void appendUtf8(std::string& text, uint32_t point)
 {
@@ -57,12 +68,8 @@ void JsonParser::fail(const std::string& expected)
 
 int JsonParser::peekBehindBlanks()
 {
-  int c = peek();
-  while (c == ' ' || c == '\t' || c == '\r' || c == '\n')
-  {
-    c = text_.snextc();
-  }
-  return c;
+  text_.skipBlanks();
+  return peek();
 }
 
 void JsonParser::parseValue()
@@ -94,7 +101,10 @@ bool JsonParser::startValue()
       return false;
     }
     return true;
-  case '"': handler_.string(readString()); return false;
+  case '"':
+    readString();
+    handler_.string(token_);
+    return false;
   case 'n':
     readWord("null");
     handler_.null();
@@ -157,7 +167,8 @@ void JsonParser::readKey()
   {
     fail("a key");
   }
-  handler_.key(readString()); // so that what is said of a key gives its place
+  readString();
+  handler_.key(token_); // here, so that what is said of a key gives its place
   if (peekBehindBlanks() != ':')
   {
     fail("a colon");
@@ -165,36 +176,43 @@ void JsonParser::readKey()
   text_.sbumpc();
 }
 
-std::string JsonParser::readString()
+/// Appends the characters that belong to a token to it, and goes past them.
+template<class Belongs>
+void JsonParser::take(Belongs belongs)
+{
+  for (bool more = true; more && peek() != Traits::eof();)
+  {
+    const std::string_view bytes = text_.atHand();
+    const auto end = std::find_if_not(bytes.begin(), bytes.end(), belongs);
+    token_.append(bytes.begin(), end);
+    text_.skip(static_cast<size_t>(end - bytes.begin()));
+    more = end == bytes.end();
+  }
+}
+
+void JsonParser::readString()
 {
   text_.sbumpc();
-  std::string text;
-  for (int c = peek(); c != '"'; c = peek())
+  token_.clear();
+  const auto plain = [](char c) { return kPlain[static_cast<uint8_t>(c)]; };
+  for (take(plain); peek() != '"'; take(plain))
   {
-    if (c < 0x20) // a control character, or the end, which is below zero
+    if (peek() != '\\') // a control character, or the end
     {
-      fail(c == Traits::eof() ? "the end of a string"
-                              : "a character of a string; control characters are written as \\u00..");
+      fail(peek() == Traits::eof() ? "the end of a string"
+                                   : "a character of a string; control characters are written as \\u00..");
     }
     text_.sbumpc();
-    if (c == '\\')
-    {
-      readEscape(text);
-    }
-    else
-    {
-      text += Traits::to_char_type(c);
-    }
+    readEscape();
   }
   text_.sbumpc();
-  if (!isUtf8(text))
+  if (!isUtf8(token_))
   {
     throw JsonSyntaxError("a string is no UTF-8");
   }
-  return text;
 }
 
-void JsonParser::readEscape(std::string& text)
+void JsonParser::readEscape()
 {
   static constexpr std::string_view letters = "\"\\/bfnrt";
   static constexpr std::string_view characters = "\"\\/\b\f\n\r\t";
@@ -203,7 +221,7 @@ void JsonParser::readEscape(std::string& text)
   if (const size_t at = c == Traits::eof() ? none : letters.find(Traits::to_char_type(c)); at != none)
   {
     text_.sbumpc();
-    text += characters[at];
+    token_ += characters[at];
     return;
   }
   if (c != 'u')
@@ -230,7 +248,7 @@ void JsonParser::readEscape(std::string& text)
   {
     fail("the first half of a surrogate pair before this");
   }
-  appendUtf8(text, point);
+  appendUtf8(token_, point);
 }
 
 uint32_t JsonParser::readHex4()
@@ -251,61 +269,58 @@ uint32_t JsonParser::readHex4()
   return value;
 }
 
-void JsonParser::readDigits(std::string& digits)
+void JsonParser::readDigits()
 {
   if (!isDigit(peek()))
   {
     fail("a digit");
   }
-  for (int c = peek(); isDigit(c); c = text_.snextc())
-  {
-    digits += Traits::to_char_type(c);
-  }
+  take([](char c) { return isDigit(c); });
 }
 
 void JsonParser::readNumber()
 {
-  std::string text;
-  const auto take = [&] { text += Traits::to_char_type(text_.sbumpc()); };
+  token_.clear();
+  const auto takeOne = [&] { token_ += Traits::to_char_type(text_.sbumpc()); };
   if (const int c = peek(); c != '-' && !isDigit(c))
   {
     fail("a value");
   }
   if (peek() == '-')
   {
-    take();
+    takeOne();
   }
   if (peek() == '0')
   {
-    take();
+    takeOne();
   }
   else
   {
-    readDigits(text);
+    readDigits();
   }
   bool whole = true;
   if (peek() == '.')
   {
     whole = false;
-    take();
-    readDigits(text);
+    takeOne();
+    readDigits();
   }
   if (peek() == 'e' || peek() == 'E')
   {
     whole = false;
-    take();
+    takeOne();
     if (peek() == '+' || peek() == '-')
     {
-      take();
+      takeOne();
     }
-    readDigits(text);
+    readDigits();
   }
   if (!whole)
   {
-    handler_.fraction(std::move(text));
+    handler_.fraction(token_);
     return;
   }
-  handler_.integer(text == "-0" ? std::string("0") : std::move(text));
+  handler_.integer(token_ == "-0" ? std::string_view("0") : token_);
 }
 
 void JsonParser::readWord(const char* word)

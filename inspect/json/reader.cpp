@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <utility>
 
+#include "inspect/path/names.h"
 #include "tav/inspect/path.hpp"
 #include "tav/inspect/problem.hpp"
 #include "tav/inspect/value.hpp"
@@ -12,8 +13,12 @@ namespace tav::inspect
 
 std::optional<uint16_t> elementNamed(std::string_view name, const Dictionary& dictionary)
 {
+  if (const std::optional<uint16_t> id = soleIdOf(name, dictionary))
+  {
+    return id;
+  }
   const std::vector<uint16_t> ids = idsOf(name, dictionary);
-  if (ids.size() > 1)
+  if (!ids.empty())
   {
     std::string list;
     for (const uint16_t id : ids)
@@ -22,7 +27,7 @@ std::optional<uint16_t> elementNamed(std::string_view name, const Dictionary& di
     }
     throw BuildError("several elements have the name " + inspect::quoted(name) + ": " + list);
   }
-  return ids.empty() ? std::nullopt : std::optional(ids.front());
+  return std::nullopt;
 }
 
 BuildError unknownElement(std::string_view name, const Dictionary& dictionary)
@@ -169,7 +174,7 @@ void DocumentReader::startForm()
   push(Where::form);
 }
 
-void DocumentReader::key(std::string name)
+void DocumentReader::key(std::string_view name)
 {
   top().key = name;
   switch (top().where)
@@ -190,7 +195,7 @@ void DocumentReader::key(std::string name)
   }
 }
 
-void DocumentReader::documentKey(const std::string& name)
+void DocumentReader::documentKey(std::string_view name)
 {
   static constexpr std::string_view known[] = {"tav", "form", "lines", "nodes"};
   if (std::find(std::begin(known), std::end(known), name) == std::end(known))
@@ -212,7 +217,7 @@ void DocumentReader::startChild(uint16_t elm)
   draft_.properties.elm = elm;
 }
 
-void DocumentReader::startChild(const std::string& name)
+void DocumentReader::startChild(std::string_view name)
 {
   const auto elm = elementNamed(name, dictionary_);
   if (!elm)
@@ -224,13 +229,12 @@ void DocumentReader::startChild(const std::string& name)
 
 void DocumentReader::endObject()
 {
-  const Level level = top();
-  switch (level.where)
+  switch (top().where)
   {
   case Where::node:
   case Where::shortNode:
     top().key.clear();
-    endNode(level);
+    endNode(top());
     break;
   case Where::date:
     draft_.value.assign(reinterpret_cast<const char*>(&date_), sizeof date_);
@@ -264,7 +268,7 @@ void DocumentReader::beginGroup(Level& level)
   level.begun = true;
 }
 
-void DocumentReader::endNode(const Level& level)
+void DocumentReader::endNode(Level& level)
 {
   if (level.begun)
   {
@@ -280,7 +284,7 @@ void DocumentReader::endNode(const Level& level)
       draft_.properties.type ? layout::isGroupType(*draft_.properties.type) : level.where == Where::shortNode;
   if (group && draft_.given == Given::nothing)
   {
-    beginGroup(top());
+    beginGroup(level);
     encoder_.endGroup();
     return;
   }
@@ -358,7 +362,7 @@ void DocumentReader::endArray()
   close();
 }
 
-void DocumentReader::startObjectProperty(const std::string& name)
+void DocumentReader::startObjectProperty(std::string_view name)
 {
   if (name == "children" && !top().begun)
   {
@@ -375,7 +379,7 @@ void DocumentReader::startObjectProperty(const std::string& name)
   push(Where::date);
 }
 
-void DocumentReader::startArrayProperty(const std::string& name)
+void DocumentReader::startArrayProperty(std::string_view name)
 {
   if (name == "children" && !top().begun)
   {

@@ -34,7 +34,7 @@ struct Scalar
     text
   };
   Kind kind = Kind::null;
-  std::string text{}; ///< of numbers: in decimal; of truth: 1 or 0
+  std::string_view text{}; ///< of numbers: in decimal; of truth: 1 or 0
 };
 
 class DocumentReader final : private JsonHandler
@@ -50,11 +50,11 @@ public:
 private:
   void null() override;
   void boolean(bool value) override;
-  void integer(std::string digits) override;
-  void fraction(std::string text) override;
-  void string(std::string text) override;
+  void integer(std::string_view digits) override;
+  void fraction(std::string_view text) override;
+  void string(std::string_view text) override;
   void startObject() override;
-  void key(std::string name) override;
+  void key(std::string_view name) override;
   void endObject() override;
   void startArray() override;
   void endArray() override;
@@ -86,27 +86,27 @@ private:
   void push(Where where);
   void scalar(const Scalar& value);
   void scalarIn(Level& level, const Scalar& value);
-  void documentKey(const std::string& name);
-  void documentValue(const std::string& name, const Scalar& value);
-  void formValue(const std::string& name, const Scalar& value);
+  void documentKey(std::string_view name);
+  void documentValue(std::string_view name, const Scalar& value);
+  void formValue(std::string_view name, const Scalar& value);
   void startForm();
   void beginNodes();
   void startChild(uint16_t elm);
-  void startChild(const std::string& name);
-  void elementProperty(Properties& properties, const std::string& name, const Scalar& value);
+  void startChild(std::string_view name);
+  void elementProperty(Properties& properties, std::string_view name, const Scalar& value);
   void shortValue(const Scalar& value);
-  void property(const std::string& name, const Scalar& value);
-  bool headerProperty(Properties& properties, const std::string& name, const Scalar& value);
-  void valueProperty(const std::string& name, const Scalar& value);
+  void property(std::string_view name, const Scalar& value);
+  bool headerProperty(Properties& properties, std::string_view name, const Scalar& value);
+  void valueProperty(std::string_view name, const Scalar& value);
   void giveValue(const Scalar& value);
   void givePiece(const Scalar& value);
   void giveBytes(const Scalar& value);
   void setGiven(Given given);
-  void dateField(const std::string& name, const Scalar& value);
-  void startObjectProperty(const std::string& name);
-  void startArrayProperty(const std::string& name);
+  void dateField(std::string_view name, const Scalar& value);
+  void startObjectProperty(std::string_view name);
+  void startArrayProperty(std::string_view name);
   void beginGroup(Level& level);
-  void endNode(const Level& level);
+  void endNode(Level& level);
   void endLine();
   void closeTo(uint64_t depth);
   void spill();

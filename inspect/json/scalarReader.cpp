@@ -18,7 +18,7 @@ namespace
 constexpr size_t kLong = size_t{1024} * 1024; ///< bytes of a value that are kept before they are written
 
 template<class Number>
-Number wholeNumber(const std::string& name, const Scalar& value)
+Number wholeNumber(std::string_view name, const Scalar& value)
 {
   Number number{};
   const char* const end = value.text.data() + value.text.size();
@@ -27,45 +27,45 @@ Number wholeNumber(const std::string& name, const Scalar& value)
   const auto result = std::from_chars(value.text.data() + (hex ? 2 : 0), end, number, hex ? 16 : 10);
   if (!given || result.ec != std::errc() || result.ptr != end)
   {
-    throw BuildError(name + ": " + (value.kind == Scalar::Kind::null ? "null" : inspect::quoted(value.text)) +
+    throw BuildError(std::string(name) + ": " + (value.kind == Scalar::Kind::null ? std::string("null") : inspect::quoted(value.text)) +
                      " is no number that fits");
   }
   return number;
 }
 
-bool truth(const std::string& name, const Scalar& value)
+bool truth(std::string_view name, const Scalar& value)
 {
   if (value.kind != Scalar::Kind::truth)
   {
-    throw BuildError(name + " is true or false");
+    throw BuildError(std::string(name) + " is true or false");
   }
   return value.text == "1";
 }
 
-std::string hexBytes(const std::string& name, const Scalar& value)
+std::string hexBytes(std::string_view name, const Scalar& value)
 {
   std::string bytes;
   if (value.kind != Scalar::Kind::text || !appendHexBytes(bytes, value.text))
   {
-    throw BuildError(name + ": bytes are given in hexadecimal, as \"00ff\"");
+    throw BuildError(std::string(name) + ": bytes are given in hexadecimal, as \"00ff\"");
   }
   return bytes;
 }
 
-const std::string& textOf(const std::string& name, const Scalar& value)
+std::string_view textOf(std::string_view name, const Scalar& value)
 {
   if (value.kind != Scalar::Kind::text)
   {
-    throw BuildError(name + " is a text");
+    throw BuildError(std::string(name) + " is a text");
   }
   return value.text;
 }
 
-bool widthOf(const std::string& name, const Scalar& value)
+bool widthOf(std::string_view name, const Scalar& value)
 {
   if (value.kind != Scalar::Kind::integer || (value.text != "32" && value.text != "64"))
   {
-    throw BuildError(name + " is 32 or 64");
+    throw BuildError(std::string(name) + " is 32 or 64");
   }
   return value.text == "64";
 }
@@ -82,19 +82,19 @@ void DocumentReader::boolean(bool value)
   scalar({Scalar::Kind::truth, value ? "1" : "0"});
 }
 
-void DocumentReader::integer(std::string digits)
+void DocumentReader::integer(std::string_view digits)
 {
-  scalar({Scalar::Kind::integer, std::move(digits)});
+  scalar({Scalar::Kind::integer, digits});
 }
 
-void DocumentReader::fraction(std::string text)
+void DocumentReader::fraction(std::string_view text)
 {
-  scalar({Scalar::Kind::fraction, std::move(text)});
+  scalar({Scalar::Kind::fraction, text});
 }
 
-void DocumentReader::string(std::string text)
+void DocumentReader::string(std::string_view text)
 {
-  scalar({Scalar::Kind::text, std::move(text)});
+  scalar({Scalar::Kind::text, text});
 }
 
 void DocumentReader::scalar(const Scalar& value)
@@ -115,7 +115,7 @@ void DocumentReader::scalarIn(Level& level, const Scalar& value)
   case Where::form: formValue(level.key, value); return;
   case Where::node: property(level.key, value); return;
   case Where::shortNode:
-    level.key.starts_with('$') ? property(level.key.substr(1), value) : shortValue(value);
+    level.key.starts_with('$') ? property(std::string_view(level.key).substr(1), value) : shortValue(value);
     return;
   case Where::shortList: shortValue(value); return;
   case Where::repeated:
@@ -135,7 +135,7 @@ void DocumentReader::shortValue(const Scalar& value)
   encoder_.finish(draft_);
 }
 
-void DocumentReader::documentValue(const std::string& name, const Scalar& value)
+void DocumentReader::documentValue(std::string_view name, const Scalar& value)
 {
   if (name == "tav" && (value.kind != Scalar::Kind::integer || value.text != std::to_string(kJsonVersion)))
   {
@@ -148,15 +148,15 @@ void DocumentReader::documentValue(const std::string& name, const Scalar& value)
   }
   else if (name != "tav")
   {
-    fail(name + " is " + (name == "form" ? "an object" : "an array of nodes"));
+    fail(std::string(name) + " is " + (name == "form" ? "an object" : "an array of nodes"));
   }
 }
 
-void DocumentReader::formValue(const std::string& name, const Scalar& value)
+void DocumentReader::formValue(std::string_view name, const Scalar& value)
 {
   if (name == "byteOrder")
   {
-    const std::string& order = textOf(name, value);
+    const std::string_view order = textOf(name, value);
     if (order != "little" && order != "big")
     {
       throw BuildError("byteOrder is little or big");
@@ -177,7 +177,7 @@ void DocumentReader::formValue(const std::string& name, const Scalar& value)
   }
 }
 
-void DocumentReader::property(const std::string& name, const Scalar& value)
+void DocumentReader::property(std::string_view name, const Scalar& value)
 {
   const bool begun = top().begun;
   Properties& properties = begun ? encoder_.group() : draft_.properties;
@@ -198,7 +198,7 @@ void DocumentReader::property(const std::string& name, const Scalar& value)
 }
 
 /// A name that no dictionary has is taken for that of an own element: its id says which.
-void DocumentReader::elementProperty(Properties& properties, const std::string& name, const Scalar& value)
+void DocumentReader::elementProperty(Properties& properties, std::string_view name, const Scalar& value)
 {
   const bool isName = name == "element";
   const auto elm = isName ? elementNamed(textOf(name, value), dictionary_) : wholeNumber<uint16_t>(name, value);
@@ -218,7 +218,7 @@ void DocumentReader::elementProperty(Properties& properties, const std::string& 
   }
 }
 
-bool DocumentReader::headerProperty(Properties& properties, const std::string& name, const Scalar& value)
+bool DocumentReader::headerProperty(Properties& properties, std::string_view name, const Scalar& value)
 {
   if (name == "element" || name == "id")
   {
@@ -266,7 +266,7 @@ bool DocumentReader::headerProperty(Properties& properties, const std::string& n
   return true;
 }
 
-void DocumentReader::valueProperty(const std::string& name, const Scalar& value)
+void DocumentReader::valueProperty(std::string_view name, const Scalar& value)
 {
   if (name == "value")
   {
@@ -312,7 +312,7 @@ void DocumentReader::giveValue(const Scalar& value)
   if (value.kind == Scalar::Kind::null || value.kind == Scalar::Kind::fraction)
   {
     throw BuildError(value.kind == Scalar::Kind::null ? "no type holds null"
-                                                      : "no type holds " + value.text + ", only whole numbers");
+                                                      : "no type holds " + std::string(value.text) + ", only whole numbers");
   }
   if (draft_.given != Given::nothing)
   {
@@ -380,7 +380,7 @@ void DocumentReader::spill()
   encoder_.addValue(draft_);
 }
 
-void DocumentReader::dateField(const std::string& name, const Scalar& value)
+void DocumentReader::dateField(std::string_view name, const Scalar& value)
 {
   if (name == "seconds")
   {

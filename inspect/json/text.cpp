@@ -1,13 +1,15 @@
 #include "tav/inspect/jsonText.hpp"
 
+#include <algorithm>
 #include <bit>
 #include <charconv>
 #include <chrono>
-#include <cstdio>
 #include <cstring>
+#include <vector>
 
 #include "tav/inspect/value.hpp"
 #include "tav/layout.hpp"
+#include "tav/path/valueText.hpp"
 
 namespace tav::inspect
 {
@@ -117,53 +119,85 @@ bool scanZone(Scanner& scan, int& minutesEast)
 
 void appendJsonString(std::string& out, std::string_view text)
 {
-  out += '"';
-  for (const char c : text)
-  {
-    const auto byte = static_cast<uint8_t>(c);
-    switch (c)
+  static constexpr auto plain = [] {
+    std::array<bool, 256> table{};
+    for (size_t byte = 0x20; byte < table.size(); ++byte)
     {
-    case '"': out += "\\\""; break;
-    case '\\': out += "\\\\"; break;
-    case '\n': out += "\\n"; break;
-    case '\r': out += "\\r"; break;
-    case '\t': out += "\\t"; break;
-    default:
-      if (byte < 0x20 || byte == 0x7F)
-      {
-        char escape[8];
-        std::snprintf(escape, sizeof escape, "\\u%04x", unsigned{byte});
-        out += escape;
-      }
-      else
-      {
-        out += c;
-      }
+      table[byte] = byte != '"' && byte != '\\' && byte != 0x7F;
     }
+    return table;
+  }();
+  static constexpr std::string_view characters = "\"\\\n\r\t";
+  static constexpr std::string_view letters = "\"\\nrt";
+  out += '"';
+  while (!text.empty())
+  {
+    const auto special = std::find_if(text.begin(), text.end(), [](char c) { return !plain[static_cast<uint8_t>(c)]; });
+    out.append(text.begin(), special);
+    text.remove_prefix(static_cast<size_t>(special - text.begin()));
+    if (text.empty())
+    {
+      break;
+    }
+    const auto byte = static_cast<uint8_t>(text.front());
+    out += '\\';
+    if (const size_t at = characters.find(text.front()); at != std::string_view::npos)
+    {
+      out += letters[at];
+    }
+    else
+    {
+      out += "u00";
+      detail::paths::appendDigits(out, &byte, 1);
+    }
+    text.remove_prefix(1);
   }
   out += '"';
 }
 
 std::optional<std::string> jsonTypeName(uint16_t type)
 {
+  std::string name;
+  return appendJsonTypeName(name, type) ? std::optional(std::move(name)) : std::nullopt;
+}
+
+bool appendJsonTypeName(std::string& out, uint16_t type)
+{
   if (layout::isGroupType(type))
   {
-    return type == TAV_TYPE_HEADER32 ? "group32" : "group64";
+    out += type == TAV_TYPE_HEADER32 ? "group32" : "group64";
+    return true;
   }
-  return layout::typeInfo(type).known ? std::optional(typeText(type)) : std::nullopt;
+  const bool known = layout::typeInfo(type).known;
+  out += known ? typeText(type) : std::string();
+  return known;
 }
 
 std::optional<uint16_t> jsonTypeOf(std::string_view name)
 {
-  const std::string plain = plainName(name);
-  for (const uint16_t type : kTypesWithNames)
+  struct Name
   {
-    if (plain == plainName(*jsonTypeName(type)))
+    std::string written;
+    std::string plain;
+    uint16_t type;
+  };
+  static const std::vector<Name> names = [] {
+    std::vector<Name> made;
+    for (const uint16_t type : kTypesWithNames)
     {
-      return type;
+      made.push_back({*jsonTypeName(type), plainName(*jsonTypeName(type)), type});
     }
+    return made;
+  }();
+  const auto written = std::find_if(names.begin(), names.end(), [&](const Name& one) { return one.written == name; });
+  if (written != names.end())
+  {
+    return written->type;
   }
-  return plain == "header32"   ? std::optional<uint16_t>(TAV_TYPE_HEADER32)
+  const std::string plain = plainName(name);
+  const auto found = std::find_if(names.begin(), names.end(), [&](const Name& one) { return one.plain == plain; });
+  return found != names.end()  ? std::optional<uint16_t>(found->type)
+         : plain == "header32" ? std::optional<uint16_t>(TAV_TYPE_HEADER32)
          : plain == "header64" ? std::optional<uint16_t>(TAV_TYPE_HEADER64)
                                : std::nullopt;
 }
@@ -217,6 +251,12 @@ std::optional<TAVTimeStamp> parseDate(std::string_view text)
   }
   return TAVTimeStamp{static_cast<uint64_t>(seconds), static_cast<uint16_t>(fraction / 1000),
                       static_cast<uint16_t>(fraction % 1000), 0, static_cast<int16_t>(zone)};
+}
+
+bool isWholeDate(const TAVTimeStamp& stamp, std::string_view text)
+{
+  const auto back = parseDate(text);
+  return back && std::memcmp(&*back, &stamp, sizeof stamp) == 0;
 }
 
 std::optional<std::array<uint8_t, 16>> parseInt128(std::string_view text, bool isSigned)

@@ -40,12 +40,18 @@ uint64_t TextSource::line() const
 
 bool TextSource::skipBlanks()
 {
-  int_type c = sgetc();
-  while (c == ' ' || c == '\t' || c == '\r' || c == '\n')
+  const auto isBlank = [](char c) { return c == ' ' || c == '\t' || c == '\r' || c == '\n'; };
+  while (sgetc() != traits_type::eof())
   {
-    c = snextc();
+    const std::string_view bytes = atHand();
+    const auto end = std::find_if_not(bytes.begin(), bytes.end(), isBlank);
+    skip(static_cast<size_t>(end - bytes.begin()));
+    if (end != bytes.end())
+    {
+      return true;
+    }
   }
-  return c != traits_type::eof();
+  return false;
 }
 
 size_t MemoryText::fetch(std::span<char> to)

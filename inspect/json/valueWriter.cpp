@@ -4,9 +4,12 @@
 #include <utility>
 
 #include "inspect/text/bytes.h"
+#include "inspect/text/date.h"
 #include "tav/inspect/jsonText.hpp"
 #include "tav/inspect/jsonWriter.hpp"
+#include "tav/inspect/phrases.hpp"
 #include "tav/inspect/value.hpp"
+#include "tav/cpp/valueText.hpp"
 
 namespace tav::inspect
 {
@@ -35,9 +38,7 @@ void JsonWriter::putValue(const Node& node)
   const bool oneNumber = (type >= TAV_TYPE_UINT8 && type <= TAV_TYPE_SINT64) || type == TAV_TYPE_BYTE;
   if (oneNumber && size == typeInfo(type).valueSize)
   {
-    // A byte is a number, too, although it is shown in hexadecimal elsewhere.
-    putInteger(node, type == TAV_TYPE_BYTE ? std::to_string(source_.view(start).front())
-                                           : *plainText(source_, form_, node, kBlock));
+    putInteger(node);
   }
   else if ((type == TAV_TYPE_UINT128 || type == TAV_TYPE_SINT128) && size == 16)
   {
@@ -45,9 +46,7 @@ void JsonWriter::putValue(const Node& node)
   }
   else if (type == TAV_TYPE_UTC_TIMESTAMP && size == sizeof(TAVTimeStamp))
   {
-    TAVTimeStamp stamp{};
-    std::memcpy(&stamp, payloadBytes(source_, form_, node, size).data(), sizeof stamp);
-    putDate(stamp);
+    putDate(dateOf(source_, form_, node));
   }
   else if (type == TAV_TYPE_ASCII_STRING && isText(start, start + size))
   {
@@ -74,34 +73,53 @@ void JsonWriter::putValue(const Node& node)
   }
 }
 
-void JsonWriter::putInteger(const Node& node, std::string_view text)
+void JsonWriter::putInteger(const Node& node)
 {
   key("value");
-  const bool eightBytes = node.size() == 8;
-  const std::string_view digits = text.substr(text.starts_with('-') ? 1 : 0);
-  const bool quote = safe_ && eightBytes && std::stoull(std::string(digits)) > kExact;
-  put(quote ? '"' + std::string(text) + '"' : std::string(text));
+  const size_t begin = text_.size();
+  if (node.type() == TAV_TYPE_BYTE) // a number, too, although it is shown in hexadecimal elsewhere
+  {
+    appendNumber(text_, source_.view(node.payloadOffset()).front());
+    return;
+  }
+  appendPlainText(text_, source_, form_, node, kBlock);
+  if (!safe_ || node.size() != 8)
+  {
+    return;
+  }
+  const std::string digits = text_.substr(begin + (text_[begin] == '-' ? 1 : 0));
+  if (std::stoull(digits) > kExact)
+  {
+    text_.insert(begin, 1, '"');
+    text_ += '"';
+  }
 }
 
 void JsonWriter::putDate(const TAVTimeStamp& stamp)
 {
-  const std::string text = dateText(stamp);
-  const auto back = parseDate(text);
-  if (back && std::memcmp(&*back, &stamp, sizeof stamp) == 0)
+  key("value");
+  const size_t begin = text_.size();
+  text_ += '"';
+  detail::appendTime(text_, stamp);
+  if (isWholeDate(stamp, std::string_view(text_).substr(begin + 1)))
   {
-    putString("value", text);
+    text_ += '"';
     return;
   }
-  key("value");
-  put("{");
+  text_.resize(begin);
+  text_ += '{';
   firstKey_ = true;
   key("seconds");
-  put(safe_ && stamp.seconds > kExact ? '"' + std::to_string(stamp.seconds) + '"' : std::to_string(stamp.seconds));
+  const bool quote = safe_ && stamp.seconds > kExact;
+  text_ += quote ? "\"" : "";
+  appendNumber(text_, stamp.seconds);
+  text_ += quote ? "\"" : "";
   putNumber("fractionA", stamp.fractionA);
   putNumber("fractionB", stamp.fractionB);
   putNumber("further", stamp.further);
   key("offsetMinutes");
-  put(std::to_string(stamp.offsetMinutes) + "}");
+  appendNumber(text_, stamp.offsetMinutes);
+  text_ += '}';
   firstKey_ = false;
 }
 
@@ -129,19 +147,25 @@ void JsonWriter::putArray(const Node& node)
   put("]");
 }
 
+/// The bytes from an offset on, at most a piece, cut between characters. Valid until the source is asked again.
+std::string_view JsonWriter::textAt(uint64_t from, uint64_t end)
+{
+  const auto count = static_cast<size_t>(std::min<uint64_t>(kPiece + 4, end - from));
+  const std::string_view text = asText(inspect::bytesAt(source_, from, count, piece_));
+  return text.substr(0, cutAtCharacter(text, kPiece));
+}
+
 /// Whether bytes are UTF-8. They are looked at piece by piece, as they are written afterwards.
 bool JsonWriter::isText(uint64_t from, uint64_t end)
 {
   while (from < end)
   {
-    piece_.resize(static_cast<size_t>(std::min<uint64_t>(kPiece + 4, end - from)));
-    const std::string_view text = asText(std::span(piece_).first(source_.read(from, piece_)));
-    const size_t count = cutAtCharacter(text, kPiece);
-    if (count == 0 || !isUtf8(text.substr(0, count)))
+    const std::string_view text = textAt(from, end);
+    if (text.empty() || !isUtf8(text))
     {
       return false;
     }
-    from += count;
+    from += text.size();
   }
   return true;
 }
@@ -151,20 +175,16 @@ void JsonWriter::putText(uint64_t from, uint64_t end)
   key("value");
   const bool pieces = end - from > kPiece;
   put(pieces ? "[" : "");
-  std::string text;
   for (bool first = true; from < end || first; first = false)
   {
-    piece_.resize(static_cast<size_t>(std::min<uint64_t>(kPiece + 4, end - from)));
-    const std::string_view bytes = asText(std::span(piece_).first(source_.read(from, piece_)));
-    const size_t count = cutAtCharacter(bytes, kPiece);
-    text = first ? "" : ",";
-    appendJsonString(text, bytes.substr(0, count));
-    put(text);
-    if (count == 0)
+    put(first ? "" : ",");
+    const std::string_view text = textAt(from, end);
+    appendJsonString(text_, text);
+    if (text.empty())
     {
       break; // an empty text, or a file that became shorter
     }
-    from += count;
+    from += text.size();
   }
   put(pieces ? "]" : "");
 }

@@ -6,6 +6,7 @@
 #include "inspect/text/bytes.h"
 #include "tav/inspect/jsonText.hpp"
 #include "tav/inspect/path.hpp"
+#include "tav/inspect/phrases.hpp"
 #include "tav/inspect/value.hpp"
 
 namespace tav::inspect
@@ -18,12 +19,32 @@ namespace
 
 constexpr size_t kMaxIndent = 32;  ///< levels, so that deep nests do not become mostly blanks
 constexpr uint64_t kMaxSteps = 64; ///< deeper nodes are named by their offset, so that a line stays a line
+constexpr size_t kMostText = size_t{16} * 1024; ///< that is kept before it is handed over
 
 } // namespace
 
 JsonWriter::JsonWriter(ByteSource& source, const Form& form, Sink& out, JsonStyle style, bool safe)
     : source_(source), form_(form), out_(out), style_(style), safe_(safe)
 {
+}
+
+void JsonWriter::put(std::string_view text)
+{
+  text_ += text;
+  if (text_.size() > kMostText)
+  {
+    flush();
+  }
+}
+
+/// At the end of each call, too: what was written is there when the walk fails behind it.
+void JsonWriter::flush()
+{
+  if (!text_.empty())
+  {
+    out_.write(text_);
+    text_.clear();
+  }
 }
 
 void JsonWriter::begin()
@@ -44,12 +65,14 @@ void JsonWriter::begin()
   {
     key("lines");
     put("true}\n");
+    flush();
     return;
   }
   put(compact ? "," : ",\n ");
   firstKey_ = true;
   key("nodes");
   put("[");
+  flush();
 }
 
 void JsonWriter::end()
@@ -59,32 +82,31 @@ void JsonWriter::end()
   {
     put(style_ == JsonStyle::compact || firstRoot_ ? "]}\n" : "\n ]}\n");
   }
+  flush();
 }
 
 void JsonWriter::key(std::string_view name)
 {
-  if (!firstKey_)
+  const bool compact = style_ == JsonStyle::compact;
+  if (!std::exchange(firstKey_, false))
   {
-    put(style_ == JsonStyle::compact ? "," : ", ");
+    text_ += compact ? "," : ", ";
   }
-  firstKey_ = false;
-  put("\"");
-  put(name);
-  put(style_ == JsonStyle::compact ? "\":" : "\": ");
+  text_ += '"';
+  text_ += name;
+  text_ += compact ? "\":" : "\": ";
 }
 
 void JsonWriter::putNumber(std::string_view name, uint64_t value)
 {
   key(name);
-  put(std::to_string(value));
+  appendNumber(text_, value);
 }
 
 void JsonWriter::putString(std::string_view name, std::string_view value)
 {
   key(name);
-  std::string text;
-  appendJsonString(text, value);
-  put(text);
+  appendJsonString(text_, value);
 }
 
 void JsonWriter::putHex(std::string_view name, std::string_view bytes)
@@ -102,35 +124,43 @@ void JsonWriter::startItem()
   }
   if (style_ == JsonStyle::readable)
   {
-    put("\n" + std::string(2 + 2 * std::min(groups_.size(), kMaxIndent), ' '));
+    text_ += '\n';
+    text_.append(2 + 2 * std::min(groups_.size(), kMaxIndent), ' ');
   }
   put("{");
   firstKey_ = true;
 }
 
-void JsonWriter::putPlace(const std::string& path, uint64_t offset, uint64_t depth)
+void JsonWriter::putPlace(uint64_t offset, uint64_t depth)
 {
   if (style_ == JsonStyle::lines)
   {
-    putString("path", path);
+    putString("path", path_);
     putNumber("offset", offset);
     putNumber("depth", depth);
   }
 }
 
-void JsonWriter::putHead(const std::string& path, const Node& node)
+void JsonWriter::putHead(const Node& node)
 {
-  putPlace(path, node.offset(), groups_.size());
-  putString("element", elementText(node.elm(), source_.dictionary()));
+  putPlace(node.offset(), groups_.size());
+  key("element");
+  text_ += '"'; // no character of an element has to be escaped
+  appendElementText(text_, node.elm(), source_.dictionary());
+  text_ += '"';
   putNumber("id", node.elm());
   putNumber("header", node.is64() ? 64 : 32);
-  if (const auto name = jsonTypeName(node.type()))
+  key("type");
+  const size_t begin = text_.size();
+  text_ += '"';
+  if (appendJsonTypeName(text_, node.type()))
   {
-    putString("type", *name);
+    text_ += '"';
   }
   else
   {
-    putNumber("type", node.type());
+    text_.resize(begin);
+    appendNumber(text_, node.type());
   }
   const uint32_t usual = form_.aligned ? TAV_INFO_ALIGNED8 : 0;
   if (node.is64() && (node.info() & ~uint32_t{TAV_INFO_EYE_SIZE}) != usual)
@@ -149,16 +179,24 @@ void JsonWriter::putSize(uint64_t size, bool unknown)
   unknown ? putString("size", "unknown") : putNumber("size", size);
 }
 
-std::string JsonWriter::pathOf(const Walker& walker, const Event& event) const
+void JsonWriter::setPath(const Walker& walker, const Event& event)
 {
+  path_.clear();
   if (style_ != JsonStyle::lines)
   {
-    return {};
+    return;
   }
-  return event.depth <= kMaxSteps ? walker.path(event) : offsetPath(event.node, source_.dictionary());
+  event.depth <= kMaxSteps ? walker.appendPath(path_, event)
+                           : void(path_ = offsetPath(event.node, source_.dictionary()));
 }
 
 void JsonWriter::add(const Walker& walker, const Event& event)
+{
+  take(walker, event);
+  flush();
+}
+
+void JsonWriter::take(const Walker& walker, const Event& event)
 {
   switch (event.what)
   {
@@ -166,17 +204,18 @@ void JsonWriter::add(const Walker& walker, const Event& event)
     finishData();
     if (event.node.isGroup())
     {
-      beginGroup(pathOf(walker, event), event.node);
+      setPath(walker, event);
+      beginGroup(event.node);
       return;
     }
-    data_.emplace();
-    data_->node = event.node;
-    data_->path = pathOf(walker, event);
+    setPath(walker, event);
+    data_ = {.node = event.node};
+    hasData_ = true;
     return;
   case What::payload: return; // read when the node is written
-  case What::extra: data_->extra = event; return;
-  case What::padding: data_->padding = event; return;
-  case What::pair: data_->pair = event; return;
+  case What::extra: data_.extra = {event.offset, event.length}; return;
+  case What::padding: data_.padding = {event.offset, event.length}; return;
+  case What::pair: data_.pair = {event.offset, event.length}; return;
   case What::nodeEnd:
     if (event.node.isGroup())
     {
@@ -190,8 +229,9 @@ void JsonWriter::add(const Walker& walker, const Event& event)
 void JsonWriter::addDamage(const Walker& walker, const Event& event)
 {
   finishData();
+  setPath(walker, event);
   startItem();
-  putPlace(pathOf(walker, event), event.offset, groups_.size());
+  putPlace(event.offset, groups_.size());
   if (event.what == What::zeros)
   {
     putNumber("zeros", event.length);
@@ -208,10 +248,10 @@ void JsonWriter::addDamage(const Walker& walker, const Event& event)
   put(style_ == JsonStyle::lines ? "}\n" : "}");
 }
 
-void JsonWriter::beginGroup(const std::string& path, const Node& node)
+void JsonWriter::beginGroup(const Node& node)
 {
   startItem();
-  putHead(path, node);
+  putHead(node);
   groups_.push_back({node.payloadOffset(), node.size(), isSizeUnknown(node.header), hasEyeSize(node.header),
                      hasChildren64(node.header), true});
   if (style_ == JsonStyle::lines)
@@ -227,11 +267,8 @@ void JsonWriter::beginGroup(const std::string& path, const Node& node)
 void JsonWriter::endGroup(uint64_t end)
 {
   // An end element as a writer makes it, at the end of a group that asks for it, goes without saying.
-  const bool usualEnd = style_ != JsonStyle::lines && data_ && isUsualEnd(*data_);
-  if (usualEnd)
-  {
-    data_.reset();
-  }
+  const bool usualEnd = style_ != JsonStyle::lines && hasData_ && isUsualEnd(data_);
+  hasData_ = hasData_ && !usualEnd;
   finishData();
   const Group group = groups_.back();
   groups_.pop_back();
@@ -261,8 +298,8 @@ bool JsonWriter::isUsualEnd(const DataPieces& data)
     return false;
   }
   const Group& group = groups_.back();
-  const bool plain = node.type() == TAV_TYPE_BINARY && node.size() == kEyeSizeLength && !data.extra && !data.padding &&
-                     node.is64() == group.wideChildren &&
+  const bool plain = node.type() == TAV_TYPE_BINARY && node.size() == kEyeSizeLength && data.extra.length == 0 &&
+                     data.padding.length == 0 && node.is64() == group.wideChildren &&
                      (!node.is64() || node.info() == (form_.aligned ? TAV_INFO_ALIGNED8 : 0));
   if (!plain)
   {
@@ -275,17 +312,16 @@ bool JsonWriter::isUsualEnd(const DataPieces& data)
 /// Writes the data element whose pieces are complete; called when something else begins.
 void JsonWriter::finishData()
 {
-  if (data_)
+  if (std::exchange(hasData_, false))
   {
-    const DataPieces data = *std::exchange(data_, std::nullopt);
-    putData(data);
+    putData(data_);
   }
 }
 
 void JsonWriter::putData(const DataPieces& data)
 {
   startItem();
-  putHead(data.path, data.node);
+  putHead(data.node);
   if (style_ == JsonStyle::lines)
   {
     putSize(data.node.size(), false);
@@ -304,18 +340,18 @@ void JsonWriter::putRemarks(const DataPieces& data)
   {
     roundUp8Checked(end);
   }
-  if (data.extra)
+  if (data.extra.length != 0)
   {
-    putHex("extra", bytesAt(data.extra->offset, data.extra->length));
+    putHex("extra", bytesOf(data.extra));
   }
-  const std::string padding = data.padding ? bytesAt(data.padding->offset, data.padding->length) : std::string();
+  const std::string padding = bytesOf(data.padding);
   if (padding != std::string(static_cast<size_t>(end - node.size()), '\0'))
   {
     putHex("padding", padding);
   }
   if (node.is64() && hasEyeSize(node.header))
   {
-    const std::string pair = data.pair ? bytesAt(data.pair->offset, data.pair->length) : std::string();
+    const std::string pair = bytesOf(data.pair);
     if (pair != asText(encodeEyeSize(dataDistance(node.size()), form_.swapped)))
     {
       putHex("pair", pair);

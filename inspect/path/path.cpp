@@ -5,6 +5,7 @@
 #include <charconv>
 #include <unordered_map>
 
+#include "inspect/path/names.h"
 #include "tav/dictionary.hpp"
 #include "tav/inspect/phrases.hpp"
 #include "tav/inspect/problem.hpp"
@@ -64,29 +65,28 @@ public:
       const auto found = names().find(tag);
       if (isCleanName(tag) && found != names().end() && found->second == std::vector<uint16_t>{entry.id})
       {
-        tags_.push_back(tag);
         places_[entry.id] = static_cast<uint16_t>(tags_.size());
+        tags_.push_back(tag);
       }
     }
   }
 
   /// Empty where there is none.
-  std::string_view tagOf(uint16_t elm) const
-  {
-    return places_[elm] == 0 ? std::string_view() : tags_[places_[elm] - 1];
-  }
+  std::string_view tagOf(uint16_t elm) const { return tags_[places_[elm]]; }
 
 private:
-  std::vector<std::string_view> tags_{};
-  std::array<uint16_t, 65536> places_{}; ///< in `tags_`, from 1; 0: has none
+  std::vector<std::string_view> tags_{std::string_view()}; ///< the first is that of elements without one
+  std::array<uint16_t, 65536> places_{};
 };
 
-template<class Number>
-bool parseNumber(std::string_view text, Number& value, int base)
+/// "#12" or "12"
+std::optional<uint16_t> idInDigits(std::string_view name)
 {
-  const char* const end = text.data() + text.size();
-  const auto result = std::from_chars(text.data(), end, value, base);
-  return result.ec == std::errc() && result.ptr == end;
+  name.remove_prefix(name.starts_with('#') ? 1 : 0);
+  const char* const end = name.data() + name.size();
+  uint16_t id = 0;
+  const auto result = std::from_chars(name.data(), end, id);
+  return result.ec == std::errc() && result.ptr == end ? std::optional(id) : std::nullopt;
 }
 
 } // namespace
@@ -103,15 +103,16 @@ std::string elementText(uint16_t elm, const Dictionary& dictionary)
   return text;
 }
 
-void appendElementText(std::string& out, uint16_t elm, const Dictionary& dictionary)
+std::string_view clearTagOf(uint16_t elm, const Dictionary& dictionary)
 {
   static const ClearTags clear;
-  if (const OwnElement* const own = dictionary.find(elm))
-  {
-    out += own->tag;
-    return;
-  }
-  if (const std::string_view tag = clear.tagOf(elm); !tag.empty())
+  const OwnElement* const own = dictionary.find(elm);
+  return own != nullptr ? std::string_view(own->tag) : clear.tagOf(elm);
+}
+
+void appendElementText(std::string& out, uint16_t elm, const Dictionary& dictionary)
+{
+  if (const std::string_view tag = clearTagOf(elm, dictionary); !tag.empty())
   {
     out += tag;
     return;
@@ -160,6 +161,20 @@ std::string offsetPath(const Node& node, const Dictionary& dictionary)
   return path;
 }
 
+std::optional<uint16_t> soleIdOf(std::string_view name, const Dictionary& dictionary)
+{
+  if (const std::optional<uint16_t> id = idInDigits(name))
+  {
+    return id;
+  }
+  if (const OwnElement* const own = dictionary.find(name))
+  {
+    return own->id;
+  }
+  const auto found = names().find(name);
+  return found != names().end() && found->second.size() == 1 ? std::optional(found->second.front()) : std::nullopt;
+}
+
 std::vector<uint16_t> idsOf(std::string_view name)
 {
   return idsOf(name, {});
@@ -167,11 +182,9 @@ std::vector<uint16_t> idsOf(std::string_view name)
 
 std::vector<uint16_t> idsOf(std::string_view name, const Dictionary& dictionary)
 {
-  const std::string_view digits = name.starts_with('#') ? name.substr(1) : name;
-  uint16_t id = 0;
-  if (parseNumber(digits, id, 10))
+  if (const std::optional<uint16_t> id = idInDigits(name))
   {
-    return {id};
+    return {*id};
   }
   if (const OwnElement* const own = dictionary.find(name))
   {

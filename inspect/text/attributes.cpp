@@ -2,16 +2,19 @@
 
 #include <algorithm>
 #include <array>
-#include <cstring>
 #include <span>
 #include <string_view>
 #include <vector>
 
+#include "inspect/path/names.h"
+#include "inspect/text/bytes.h"
+#include "inspect/text/date.h"
 #include "tav/dictionary.hpp"
 #include "tav/inspect/jsonText.hpp"
 #include "tav/inspect/path.hpp"
 #include "tav/inspect/phrases.hpp"
 #include "tav/inspect/value.hpp"
+#include "tav/path/valueText.hpp"
 
 namespace tav::inspect
 {
@@ -21,66 +24,82 @@ namespace
 
 using detail::paths::Attribute;
 
+/// Bytes that XML can hold and that are characters of their own.
+constexpr auto kXmlBytes = [] {
+  std::array<bool, 256> table{};
+  for (size_t byte = 0; byte < 0x80; ++byte)
+  {
+    table[byte] = byte >= 0x20 || byte == '\t' || byte == '\n' || byte == '\r';
+  }
+  return table;
+}();
+
 bool isXmlText(std::string_view text)
 {
-  const auto allowed = [](char c) { return static_cast<uint8_t>(c) >= 0x20 || c == '\t' || c == '\n' || c == '\r'; };
-  return isUtf8(text) && std::all_of(text.begin(), text.end(), allowed) &&
-         text.find("\xEF\xBF\xBE") == std::string_view::npos && text.find("\xEF\xBF\xBF") == std::string_view::npos;
+  const auto other = std::find_if(text.begin(), text.end(), [](char c) { return !kXmlBytes[static_cast<uint8_t>(c)]; });
+  return other == text.end() || detail::isXmlText(std::string_view(other, text.end()));
 }
 
-std::optional<std::string> when(bool shown, std::string text)
+/// The tag of an element where it is its name in XML.
+std::string_view xmlTagOf(uint16_t elm, const Dictionary& dictionary)
 {
-  return shown ? std::optional(std::move(text)) : std::nullopt;
+  const std::string_view tag = clearTagOf(elm, dictionary);
+  const auto isFirst = [](char c) { return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || c == '_'; };
+  return !tag.empty() && isFirst(tag.front()) ? tag : std::string_view();
 }
 
-/// A part of a moment that its text does not tell.
-std::optional<std::string> partOfDate(ByteSource& source, const Form& form, const Node& node, Attribute attribute)
-{
-  if (node.isGroup() || xmlValueOf(source, node) != XmlValue::date)
-  {
-    return std::nullopt;
-  }
-  TAVTimeStamp stamp{};
-  const std::vector<uint8_t> bytes = payloadBytes(source, form, node, sizeof stamp);
-  std::memcpy(&stamp, bytes.data(), std::min(bytes.size(), sizeof stamp));
-  const auto back = parseDate(dateText(stamp));
-  const bool isWhole = back && std::memcmp(&*back, &stamp, sizeof stamp) == 0;
-  switch (attribute)
-  {
-  case Attribute::seconds: return when(!isWhole, std::to_string(stamp.seconds));
-  case Attribute::fractionA: return when(!isWhole, std::to_string(stamp.fractionA));
-  case Attribute::fractionB: return when(!isWhole, std::to_string(stamp.fractionB));
-  case Attribute::further: return when(!isWhole, std::to_string(stamp.further));
-  default: return when(!isWhole, std::to_string(stamp.offsetMinutes));
-  }
-}
-
-std::optional<std::string> codePageOf(ByteSource& source, const Form& form, const Node& node)
+void appendCodePage(std::string& out, ByteSource& source, const Form& form, const Node& node)
 {
   if (node.isGroup() || node.type() != TAV_TYPE_UTF8_STRING || xmlValueOf(source, node) != XmlValue::text)
   {
-    return std::nullopt;
+    return;
   }
   uint16_t codePage = 0;
   source.read(node.payloadOffset(), std::span(reinterpret_cast<uint8_t*>(&codePage), sizeof codePage));
   codePage = form.swapped ? kor::byteswap16(codePage) : codePage;
-  return when(codePage != kUsualCodePage, std::to_string(codePage));
-}
-
-std::optional<std::string> extraOf(ByteSource& source, const Node& node)
-{
-  if (!node.has(kExtra))
+  if (codePage != kUsualCodePage)
   {
-    return std::nullopt;
+    appendNumber(out, codePage);
   }
-  std::array<uint8_t, 2> extra{};
-  return hexText(std::span(extra).first(source.read(node.payloadOffset() + node.size(), extra)));
 }
 
-std::string eyeSizeOf(const Node& node)
+void appendExtra(std::string& out, ByteSource& source, const Node& node)
+{
+  std::array<uint8_t, 2> extra{};
+  const size_t count = source.read(node.payloadOffset() + node.size(), extra);
+  detail::paths::appendDigits(out, extra.data(), count);
+}
+
+std::string_view eyeSizeOf(const Node& node)
 {
   return node.has(kNoPair) ? "missing" : node.has(kBadPair) ? "damaged"
                                                             : "true";
+}
+
+/// What only a group tells, or a node that is none.
+void appendOfKind(std::string& out, ByteSource& source, const Form& form, const Node& node, Attribute attribute)
+{
+  if (node.isGroup())
+  {
+    if (attribute == Attribute::size && (node.has(kOpen) || node.has(kOverrun)))
+    {
+      layout::isSizeUnknown(node.header) ? void(out += "unknown") : appendNumber(out, node.size());
+    }
+    return;
+  }
+  switch (attribute)
+  {
+  case Attribute::size: return;
+  case Attribute::extra: return node.has(kExtra) ? appendExtra(out, source, node) : void();
+  case Attribute::encoding: out += xmlValueOf(source, node) == XmlValue::hex ? "hex" : ""; return;
+  case Attribute::codePage: return appendCodePage(out, source, form, node);
+  default: break;
+  }
+  const auto stamp = xmlValueOf(source, node) == XmlValue::date ? untoldDate(source, form, node) : std::nullopt;
+  if (stamp)
+  {
+    appendPartOfDate(out, *stamp, attribute);
+  }
 }
 
 } // namespace
@@ -92,9 +111,33 @@ std::string xmlNameOf(uint16_t elm)
 
 std::string xmlNameOf(uint16_t elm, const Dictionary& dictionary)
 {
-  const std::string text = elementText(elm, dictionary);
-  const bool letter = (text[0] >= 'a' && text[0] <= 'z') || (text[0] >= 'A' && text[0] <= 'Z') || text[0] == '_';
-  return letter ? text : "element";
+  std::string name;
+  appendXmlName(name, elm, dictionary);
+  return name;
+}
+
+void appendXmlName(std::string& out, uint16_t elm, const Dictionary& dictionary)
+{
+  const std::string_view tag = xmlTagOf(elm, dictionary);
+  out += tag.empty() ? "element" : tag;
+}
+
+std::optional<TAVTimeStamp> untoldDate(ByteSource& source, const Form& form, const Node& node)
+{
+  const TAVTimeStamp stamp = dateOf(source, form, node);
+  return isWholeDate(stamp, dateText(stamp)) ? std::nullopt : std::optional(stamp);
+}
+
+void appendPartOfDate(std::string& out, const TAVTimeStamp& stamp, Attribute attribute)
+{
+  switch (attribute)
+  {
+  case Attribute::seconds: return appendNumber(out, stamp.seconds);
+  case Attribute::fractionA: return appendNumber(out, stamp.fractionA);
+  case Attribute::fractionB: return appendNumber(out, stamp.fractionB);
+  case Attribute::further: return appendNumber(out, stamp.further);
+  default: return appendNumber(out, stamp.offsetMinutes);
+  }
 }
 
 bool isXmlText(ByteSource& source, uint64_t from, uint64_t end)
@@ -103,9 +146,8 @@ bool isXmlText(ByteSource& source, uint64_t from, uint64_t end)
   std::vector<uint8_t> buffer;
   while (from < end)
   {
-    buffer.resize(static_cast<size_t>(std::min<uint64_t>(piece + 4, end - from)));
-    const size_t count = source.read(from, buffer);
-    const std::string_view bytes(reinterpret_cast<const char*>(buffer.data()), count);
+    const auto count = static_cast<size_t>(std::min<uint64_t>(piece + 4, end - from));
+    const std::string_view bytes = asText(bytesAt(source, from, count, buffer));
     const size_t whole = cutAtCharacter(bytes, piece);
     if (whole == 0)
     {
@@ -143,26 +185,47 @@ XmlValue xmlValueOf(ByteSource& source, const Node& node)
 
 std::optional<std::string> attributeText(ByteSource& source, const Form& form, const Node& node, Attribute attribute)
 {
-  const bool named = xmlNameOf(node.elm(), source.dictionary()) != "element";
-  const std::string_view name = dictionary::nameOf(node.elm());
-  const uint32_t usual = form.aligned ? TAV_INFO_ALIGNED8 : 0;
-  const bool strange = node.is64() && (node.info() & ~uint32_t{TAV_INFO_EYE_SIZE}) != usual;
+  std::string text;
+  return appendAttributeText(text, source, form, node, attribute) ? std::optional(std::move(text)) : std::nullopt;
+}
+
+bool appendAttributeText(std::string& out, ByteSource& source, const Form& form, const Node& node, Attribute attribute)
+{
+  const size_t before = out.size();
   switch (attribute)
   {
-  case Attribute::id: return when(!named, std::to_string(node.elm()));
-  case Attribute::name: return when(!named && !name.empty(), std::string(name));
-  case Attribute::type: return jsonTypeName(node.type()).value_or(std::to_string(node.type()));
-  case Attribute::header: return when(node.depth == 0, node.is64() ? "64" : "32");
-  case Attribute::info: return when(strange, hexOffset(node.info()));
-  case Attribute::eyeSize: return when(layout::hasEyeSize(node.header), eyeSizeOf(node));
-  case Attribute::size:
-    return when(node.isGroup() && (node.has(kOpen) || node.has(kOverrun)),
-                layout::isSizeUnknown(node.header) ? "unknown" : std::to_string(node.size()));
-  case Attribute::extra: return node.isGroup() ? std::nullopt : extraOf(source, node);
-  case Attribute::encoding: return when(!node.isGroup() && xmlValueOf(source, node) == XmlValue::hex, "hex");
-  case Attribute::codePage: return codePageOf(source, form, node);
-  default: return partOfDate(source, form, node, attribute);
+  case Attribute::id:
+    if (xmlTagOf(node.elm(), source.dictionary()).empty())
+    {
+      appendNumber(out, node.elm());
+    }
+    break;
+  case Attribute::name:
+    if (xmlTagOf(node.elm(), source.dictionary()).empty())
+    {
+      out += dictionary::nameOf(node.elm());
+    }
+    break;
+  case Attribute::type:
+    if (!appendJsonTypeName(out, node.type()))
+    {
+      appendNumber(out, node.type());
+    }
+    break;
+  case Attribute::header: out += node.depth != 0 ? "" : node.is64() ? "64" : "32"; break;
+  case Attribute::info:
+  {
+    const uint32_t usual = form.aligned ? TAV_INFO_ALIGNED8 : 0;
+    if (node.is64() && (node.info() & ~uint32_t{TAV_INFO_EYE_SIZE}) != usual)
+    {
+      appendHexOffset(out, node.info());
+    }
+    break;
   }
+  case Attribute::eyeSize: out += layout::hasEyeSize(node.header) ? eyeSizeOf(node) : ""; break;
+  default: appendOfKind(out, source, form, node, attribute);
+  }
+  return out.size() != before;
 }
 
 } // namespace tav::inspect

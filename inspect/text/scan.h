@@ -18,6 +18,16 @@ public:
 
   void take(std::span<const uint8_t> bytes)
   {
+    bool plain = missing_ == 0;
+    for (const uint8_t byte : bytes)
+    {
+      plain &= byte != 0 && byte < 0x80;
+    }
+    if (plain) // as nearly all are: there is nothing to remember
+    {
+      position_ += bytes.size();
+      return;
+    }
     for (const uint8_t byte : bytes)
     {
       takeByte(byte);

@@ -5,6 +5,7 @@
 #include <cstring>
 
 #include "inspect/text/bytes.h"
+#include "inspect/text/date.h"
 #include "inspect/walk/prober.h"
 #include "inspect/walk/sizeSuits.h"
 #include "tav/cpp/text.hpp"
@@ -119,13 +120,7 @@ Bytes storedBytes(ByteSource& source, const Node& node, uint64_t most, std::vect
   const uint64_t size = std::min(node.size(), node.limit - std::min(node.limit, node.payloadOffset()));
   // Never more than the file has, whatever a header claims.
   const auto count = static_cast<size_t>(std::min({most, size, source.size()}));
-  const Bytes atHand = count == 0 ? Bytes() : source.view(node.payloadOffset());
-  if (atHand.size() >= count)
-  {
-    return atHand.first(count);
-  }
-  room.resize(count);
-  return Bytes(room).first(source.read(node.payloadOffset(), room));
+  return bytesAt(source, node.payloadOffset(), count, room);
 }
 
 /// A value of the right size for a decoder.
@@ -161,6 +156,16 @@ std::vector<uint8_t> payloadBytes(ByteSource& source, const Form& form, const No
     swapPayload(rule, stored.data(), bytes.data(), prefix);
   }
   return bytes;
+}
+
+TAVTimeStamp dateOf(ByteSource& source, const Form& form, const Node& node)
+{
+  TAVTimeStamp stamp{};
+  std::array<uint8_t, sizeof stamp> bytes{};
+  const auto count = static_cast<size_t>(std::min<uint64_t>(sizeof stamp, node.size()));
+  source.read(node.payloadOffset(), std::span(bytes).first(count));
+  static_cast<void>(detail::decode({TAV_TYPE_UTC_TIMESTAMP, bytes.data(), bytes.size(), form.swapped}, stamp));
+  return stamp;
 }
 
 void appendValueText(std::string& out, ByteSource& source, const Form& form, const Node& node, uint64_t most)

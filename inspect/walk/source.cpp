@@ -190,6 +190,11 @@ void ByteSource::fetch(uint64_t number, uint64_t count)
 
 const ByteSource::Page& ByteSource::page(uint64_t number)
 {
+  if (last_ < pages_.size() && pages_[last_].number == number)
+  {
+    pages_[last_].used = ++clock_;
+    return pages_[last_];
+  }
   auto found = places_.find(number);
   if (found == places_.end())
   {
@@ -204,7 +209,8 @@ const ByteSource::Page& ByteSource::page(uint64_t number)
     }
     found = places_.find(number);
   }
-  Page& result = pages_[found->second];
+  last_ = found->second;
+  Page& result = pages_[last_];
   result.used = ++clock_;
   return result;
 }

@@ -77,17 +77,12 @@ uint64_t Walker::spent() const
   return prober_->spent();
 }
 
-Event& Walker::queue(What what, uint64_t offset, uint64_t length)
+void Walker::queue(What what, uint64_t offset, uint64_t length)
 {
-  Event& event = queue_[queueCount_++];
-  event.what = what;
-  event.offset = offset;
-  event.length = length;
-  event.end = End::closed;
-  event.depth = frames_.size() - 1 + above_;
-  event.code = TAV_RC_OK;
-  event.reason.clear();
-  return event;
+  queue_[queueCount_++] = {what, offset, length};
+  shared_.end = End::closed;
+  shared_.depth = frames_.size() - 1 + above_;
+  shared_.code = TAV_RC_OK;
 }
 
 bool Walker::next(Event& event)
@@ -102,7 +97,19 @@ bool Walker::next(Event& event)
     queueHead_ = queueCount_ = 0;
     step();
   }
-  std::swap(event, queue_[queueHead_++]);
+  const Piece& piece = queue_[queueHead_++];
+  event.what = piece.what;
+  event.offset = piece.offset;
+  event.length = piece.length;
+  event.end = shared_.end;
+  event.node = shared_.node;
+  event.depth = shared_.depth;
+  event.code = shared_.code;
+  event.reason.clear();
+  if (!shared_.reason.empty())
+  {
+    event.reason.swap(shared_.reason);
+  }
   canSkip_ = event.what == What::nodeBegin && event.node.isGroup();
   return true;
 }
@@ -121,9 +128,9 @@ bool Walker::skip()
   canSkip_ = false;
   if (position_ < top.limit)
   {
-    Event& event = queue(What::skipped, position_, top.limit - position_);
-    event.node = top.node;
-    event.depth = top.node.depth;
+    queue(What::skipped, position_, top.limit - position_);
+    shared_.node = top.node;
+    shared_.depth = top.node.depth;
     position_ = top.limit;
   }
   return true;
@@ -301,8 +308,8 @@ void Walker::beginGroup(Node& node)
   frame.node = node;
   frame.wide = hasChildren64(node.header);
   frame.counts = counts_.size();
-  Event& event = queue(What::nodeBegin, node.offset(), node.headerLength());
-  event.node = node;
+  queue(What::nodeBegin, node.offset(), node.headerLength());
+  shared_.node = node;
   position_ = start;
   frames_.push_back(frame);
 }
@@ -382,10 +389,7 @@ void Walker::takeData(Node& node)
     takePair(node, limit);
   }
   queue(What::nodeEnd, position_, 0);
-  for (size_t i = 0; i < queueCount_; ++i)
-  {
-    queue_[i].node = node;
-  }
+  shared_.node = node;
   if (isEndElement(node.elm()))
   {
     afterEndElement(node);
@@ -452,10 +456,10 @@ void Walker::endByLimit()
 
 void Walker::endGroup(End end)
 {
-  Event& event = queue(What::nodeEnd, position_, 0);
-  event.end = end;
-  event.node = frames_.back().node;
-  event.depth = event.node.depth;
+  queue(What::nodeEnd, position_, 0);
+  shared_.end = end;
+  shared_.node = frames_.back().node;
+  shared_.depth = shared_.node.depth;
   counts_.resize(frames_.back().counts);
   frames_.pop_back();
   inherited_ = std::min(inherited_, frames_.size());

@@ -48,7 +48,8 @@ bool Walker::endByZeros()
     endGroup(End::byFile);
     return true;
   }
-  queue(gaveUp ? What::unread : What::zeros, position_, source_.size() - position_).node = {};
+  queue(gaveUp ? What::unread : What::zeros, position_, source_.size() - position_);
+  shared_.node = {};
   position_ = source_.size();
   return true;
 }
@@ -85,7 +86,8 @@ bool Walker::passZeros()
   {
     return false;
   }
-  queue(What::zeros, position_, end - position_).node = {};
+  queue(What::zeros, position_, end - position_);
+  shared_.node = {};
   position_ = end;
   return true;
 }
@@ -113,15 +115,11 @@ void Walker::damage(uint64_t from, uint32_t code, std::string reason)
   {
     to = std::max(from + 1, prober_->zerosStart(from)); // zeros at the end belong to the file, not to the damage
   }
-  Event& event = queue(What::damaged, from, to - from);
-  event.node = {};
-  event.code = code;
+  queue(restart.gaveUp ? What::unread : What::damaged, from, to - from);
+  shared_.node = {};
+  shared_.code = code;
   const auto other = frames_.size() == 1 ? otherStreamAt(source_, form_, from) : std::nullopt;
-  event.reason = other ? otherStreamText(*other) : std::move(reason);
-  if (restart.gaveUp)
-  {
-    event.what = What::unread;
-  }
+  shared_.reason = other ? otherStreamText(*other) : std::move(reason);
   position_ = to;
   top.lastDamage = to;
   afterDamage_ = true;

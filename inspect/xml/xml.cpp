@@ -2,10 +2,12 @@
 
 #include <algorithm>
 #include <initializer_list>
+#include <string>
 #include <utility>
 #include <vector>
 
 #include "inspect/text/bytes.h"
+#include "inspect/text/date.h"
 #include "tav/inspect/attributes.hpp"
 #include "tav/inspect/jsonText.hpp"
 #include "tav/inspect/phrases.hpp"
@@ -23,25 +25,30 @@ using detail::paths::Attribute;
 constexpr size_t kPiece = size_t{48} * 1024;
 constexpr uint64_t kMaxIndent = 32;
 constexpr uint64_t kMaxNumber = 64; ///< bytes of the longest value that is one number or date
+constexpr size_t kMostText = size_t{16} * 1024; ///< that is kept before it is handed over
 
-std::string escaped(std::string_view text, bool attribute)
+/// Appends text; in attributes also quotation marks and what a reader would make a blank are escaped.
+void appendEscaped(std::string& out, std::string_view text, bool attribute)
 {
-  std::string out;
-  for (const char c : text)
+  for (size_t at = 0; !text.empty(); text.remove_prefix(at))
   {
-    switch (c)
+    at = std::min(text.find_first_of(attribute ? "&<>\r\"\n\t" : "&<>\r"), text.size());
+    out += text.substr(0, at);
+    if (at == text.size())
+    {
+      return;
+    }
+    switch (text[at++])
     {
     case '&': out += "&amp;"; break;
     case '<': out += "&lt;"; break;
     case '>': out += "&gt;"; break;
     case '\r': out += "&#13;"; break;
-    case '"': out += attribute ? "&quot;" : "\""; break;
-    case '\n': out += attribute ? "&#10;" : "\n"; break;
-    case '\t': out += attribute ? "&#9;" : "\t"; break;
-    default: out += c;
+    case '"': out += "&quot;"; break;
+    case '\n': out += "&#10;"; break;
+    default: out += "&#9;"; break;
     }
   }
-  return out;
 }
 
 /// Writes the events of a walk as XML.
@@ -53,16 +60,28 @@ public:
 
   void begin()
   {
-    out_.write("<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<tav");
+    put("<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<tav");
     attribute("byteOrder", form_.swapped != kor::isLittleEndian ? "little" : "big");
     attribute("root", form_.root64 ? "64" : "32");
     attribute("aligned", form_.aligned ? "true" : "false");
-    out_.write(">\n");
+    put(">\n");
+    flush();
   }
 
-  void end() { out_.write("</tav>\n"); }
+  void end()
+  {
+    put("</tav>\n");
+    flush();
+  }
 
   void add(const Event& event)
+  {
+    take(event);
+    flush();
+  }
+
+private:
+  void take(const Event& event)
   {
     switch (event.what)
     {
@@ -74,7 +93,7 @@ public:
       if (event.node.isGroup())
       {
         indent(event.depth);
-        out_.write("</" + xmlNameOf(event.node.elm(), source_.dictionary()) + ">\n");
+        endTag(event.node);
       }
       return;
     case What::damaged:
@@ -84,12 +103,39 @@ public:
     }
   }
 
-private:
-  void indent(uint64_t depth) { out_.write(std::string(static_cast<size_t>(1 + std::min(depth, kMaxIndent)), ' ')); }
+  void put(std::string_view text)
+  {
+    text_ += text;
+    if (text_.size() > kMostText)
+    {
+      flush();
+    }
+  }
+
+  /// At the end of each call, too: what was written is there when the walk fails behind it.
+  void flush()
+  {
+    if (!text_.empty())
+    {
+      out_.write(text_);
+      text_.clear();
+    }
+  }
+
+  void indent(uint64_t depth) { text_.append(static_cast<size_t>(1 + std::min(depth, kMaxIndent)), ' '); }
 
   void attribute(std::string_view name, std::string_view value)
   {
-    out_.write(" " + std::string(name) + "=\"" + escaped(value, true) + "\"");
+    text_ += ' ';
+    text_ += name;
+    text_ += "=\"";
+    appendEscaped(text_, value, true);
+    text_ += '"';
+  }
+
+  void attribute(Attribute which, std::string_view value)
+  {
+    attribute(detail::paths::kAttributeNames[static_cast<size_t>(which)], value);
   }
 
   void attributes(const Node& node, std::initializer_list<Attribute> which);
@@ -97,9 +143,16 @@ private:
   void beginGroup(const Node& node)
   {
     beginTag(node);
-    out_.write(">\n");
+    put(">\n");
+  }
+  void endTag(const Node& node)
+  {
+    text_ += "</";
+    appendXmlName(text_, node.elm(), source_.dictionary());
+    put(">\n");
   }
   void putData(const Node& node);
+  void putDate(const Node& node);
   void putArray(const Node& node);
   void putText(uint64_t from, uint64_t end);
   void putHex(uint64_t from, uint64_t length);
@@ -110,13 +163,15 @@ private:
   Form form_;
   Sink& out_;
   std::vector<uint8_t> buffer_{};
+  std::string text_{};  ///< what is not handed over yet
+  std::string value_{}; ///< of an attribute
 };
 
-/// The bytes from an offset on, at most a piece, cut between characters.
+/// The bytes from an offset on, at most a piece, cut between characters. Valid until the source is asked again.
 std::string_view XmlWriter::piece(uint64_t from, uint64_t end)
 {
-  buffer_.resize(static_cast<size_t>(std::min<uint64_t>(kPiece + 4, end - from)));
-  const std::string_view bytes = asText(std::span(buffer_).first(source_.read(from, buffer_)));
+  const auto count = static_cast<size_t>(std::min<uint64_t>(kPiece + 4, end - from));
+  const std::string_view bytes = asText(bytesAt(source_, from, count, buffer_));
   return bytes.substr(0, cutAtCharacter(bytes, kPiece));
 }
 
@@ -124,16 +179,18 @@ void XmlWriter::attributes(const Node& node, std::initializer_list<Attribute> wh
 {
   for (const Attribute one : which)
   {
-    if (const auto text = attributeText(source_, form_, node, one))
+    value_.clear();
+    if (appendAttributeText(value_, source_, form_, node, one))
     {
-      attribute(detail::paths::kAttributeNames[static_cast<size_t>(one)], *text);
+      attribute(one, value_);
     }
   }
 }
 
 void XmlWriter::beginTag(const Node& node)
 {
-  out_.write("<" + xmlNameOf(node.elm(), source_.dictionary()));
+  text_ += '<';
+  appendXmlName(text_, node.elm(), source_.dictionary());
   attributes(node, {Attribute::id, Attribute::name, Attribute::type, Attribute::header, Attribute::info,
                     Attribute::eyeSize, Attribute::size, Attribute::extra});
 }
@@ -144,12 +201,11 @@ void XmlWriter::putData(const Node& node)
   beginTag(node);
   switch (xmlValueOf(source_, node))
   {
-  case XmlValue::number: out_.write(">" + plainText(source_, form_, node, kMaxNumber).value_or("")); break;
-  case XmlValue::date:
-    attributes(node, {Attribute::seconds, Attribute::fractionA, Attribute::fractionB, Attribute::further,
-                      Attribute::offsetMinutes});
-    out_.write(">" + plainText(source_, form_, node, kMaxNumber).value_or(""));
+  case XmlValue::number:
+    text_ += '>';
+    appendPlainText(text_, source_, form_, node, kMaxNumber);
     break;
+  case XmlValue::date: putDate(node); break;
   case XmlValue::text:
     attributes(node, {Attribute::codePage});
     putText(start + (node.type() == TAV_TYPE_UTF8_STRING ? 2 : 0), start + node.size());
@@ -157,28 +213,46 @@ void XmlWriter::putData(const Node& node)
   case XmlValue::array: putArray(node); break;
   default:
     attribute("encoding", "hex");
-    out_.write(">");
+    put(">");
     putHex(start, node.size());
   }
-  out_.write("</" + xmlNameOf(node.elm(), source_.dictionary()) + ">\n");
+  endTag(node);
+}
+
+/// With the parts that its text does not tell.
+void XmlWriter::putDate(const Node& node)
+{
+  if (const auto stamp = untoldDate(source_, form_, node))
+  {
+    for (const Attribute part : {Attribute::seconds, Attribute::fractionA, Attribute::fractionB, Attribute::further,
+                                 Attribute::offsetMinutes})
+    {
+      value_.clear();
+      appendPartOfDate(value_, *stamp, part);
+      attribute(part, value_);
+    }
+  }
+  text_ += '>';
+  appendPlainText(text_, source_, form_, node, kMaxNumber);
 }
 
 void XmlWriter::putArray(const Node& node)
 {
-  out_.write(">");
+  put(">");
   bool first = true;
   for (uint64_t at = node.payloadOffset(); at < node.payloadOffset() + node.size(); at += 8)
   {
     uint64_t number = 0;
     source_.read(at, std::span(reinterpret_cast<uint8_t*>(&number), sizeof number));
     number = form_.swapped ? kor::byteswap64(number) : number;
-    out_.write((std::exchange(first, false) ? "" : " ") + std::to_string(number));
+    put(std::exchange(first, false) ? "" : " ");
+    appendNumber(text_, number);
   }
 }
 
 void XmlWriter::putText(uint64_t from, uint64_t end)
 {
-  out_.write(">");
+  put(">");
   while (from < end)
   {
     const std::string_view bytes = piece(from, end);
@@ -186,7 +260,8 @@ void XmlWriter::putText(uint64_t from, uint64_t end)
     {
       return;
     }
-    out_.write(escaped(bytes, false));
+    appendEscaped(text_, bytes, false);
+    put({});
     from += bytes.size();
   }
 }
@@ -201,7 +276,7 @@ void XmlWriter::putHex(uint64_t from, uint64_t length)
     {
       return; // the file became shorter
     }
-    out_.write(hexText(buffer_));
+    put(hexText(buffer_));
   }
 }
 
@@ -211,7 +286,7 @@ void XmlWriter::putDamage(const Event& event)
   const bool zeros = event.what == What::zeros;
   const std::string name = zeros ? "zeros" : event.what == What::damaged ? "damaged"
                                                                          : "unread";
-  out_.write("<" + name);
+  put("<" + name);
   attribute("offset", hexOffset(event.offset));
   attribute("length", std::to_string(event.length));
   if (event.what == What::damaged)
@@ -219,11 +294,11 @@ void XmlWriter::putDamage(const Event& event)
     attribute("reason", event.reason);
     attribute("encoding", "hex");
   }
-  out_.write(zeros ? "/>\n" : ">");
+  put(zeros ? "/>\n" : ">");
   if (!zeros)
   {
     putHex(event.offset, event.length);
-    out_.write("</" + name + ">\n");
+    put("</" + name + ">\n");
   }
 }
 

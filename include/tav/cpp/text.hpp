@@ -64,6 +64,10 @@ inline size_t characterLength(std::string_view text) noexcept
 
 inline bool isUtf8(std::string_view text) noexcept
 {
+  if (isAscii(text))
+  {
+    return true;
+  }
   while (!text.empty())
   {
     const size_t length = characterLength(text);

@@ -19,6 +19,9 @@ namespace tav::inspect
 TAV_INSPECT_API std::string xmlNameOf(uint16_t elm);
 TAV_INSPECT_API std::string xmlNameOf(uint16_t elm, const Dictionary& dictionary);
 
+/// Appends it.
+TAV_INSPECT_API void appendXmlName(std::string& out, uint16_t elm, const Dictionary& dictionary);
+
 /// Whether XML can hold the text of a part of the file: no control characters but tab and line ends, no U+FFFE and
 /// U+FFFF.
 TAV_INSPECT_API bool isXmlText(ByteSource& source, uint64_t from, uint64_t end);
@@ -39,5 +42,9 @@ TAV_INSPECT_API XmlValue xmlValueOf(ByteSource& source, const Node& node);
 /// An attribute of a node; nothing where it has none of this name.
 TAV_INSPECT_API std::optional<std::string> attributeText(ByteSource& source, const Form& form, const Node& node,
                                                          detail::paths::Attribute attribute);
+
+/// Appends it; false, and nothing, where there is none.
+TAV_INSPECT_API bool appendAttributeText(std::string& out, ByteSource& source, const Form& form, const Node& node,
+                                         detail::paths::Attribute attribute);
 
 } // namespace tav::inspect

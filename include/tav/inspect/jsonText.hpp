@@ -25,6 +25,9 @@ TAV_INSPECT_API void appendJsonString(std::string& out, std::string_view text);
 /// "group32", "group64", "Uint32", "ASCII String"; nothing for a type that has no name.
 TAV_INSPECT_API std::optional<std::string> jsonTypeName(uint16_t type);
 
+/// Appends it; false, and nothing, for a type that has no name.
+TAV_INSPECT_API bool appendJsonTypeName(std::string& out, uint16_t type);
+
 /// The type of a name, in any case and with or without blanks; also "TAV_TYPE_UINT32".
 TAV_INSPECT_API std::optional<uint16_t> jsonTypeOf(std::string_view name);
 
@@ -35,6 +38,9 @@ TAV_INSPECT_API bool appendHexBytes(std::string& out, std::string_view text);
 /// whole milliseconds in A and the microseconds of the millisecond in B. Nothing when the text is no date, or when a
 /// timestamp cannot hold it.
 TAV_INSPECT_API std::optional<TAVTimeStamp> parseDate(std::string_view text);
+
+/// Whether a text, which `dateText` made of a moment, tells all of it.
+TAV_INSPECT_API bool isWholeDate(const TAVTimeStamp& stamp, std::string_view text);
 
 /// The 16 bytes, in host order, of a decimal number; nothing when it is none or does not fit.
 TAV_INSPECT_API std::optional<std::array<uint8_t, 16>> parseInt128(std::string_view text, bool isSigned);

@@ -131,6 +131,7 @@ private:
   uint64_t expected_ = 0; ///< the page that comes next when reading goes straight on
   uint64_t run_ = 0;      ///< pages read one after the other
   std::vector<Page> pages_{};
+  size_t last_ = 0; ///< the page that was asked for last, which is mostly asked for again
   std::unordered_map<uint64_t, size_t> places_{};
   std::vector<uint8_t> buffer_{};
   std::function<void(uint64_t)> told_{};

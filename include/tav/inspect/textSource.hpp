@@ -28,6 +28,10 @@ public:
   const std::string& name() const { return name_; }
   uint64_t position() const { return base_ + static_cast<uint64_t>(gptr() - eback()); }
   uint64_t line() const;
+  /// What comes next, as far as it is at hand; nothing when that has to be fetched first, and at the end of the text.
+  std::string_view atHand() const { return {gptr(), static_cast<size_t>(egptr() - gptr())}; }
+  /// Goes past characters that are at hand.
+  void skip(size_t count) { gbump(static_cast<int>(count)); }
   /// Skips blanks; false at the end of the text.
   bool skipBlanks();
 

@@ -161,6 +161,12 @@ private:
     uint16_t elm;
     uint64_t count;
   };
+  struct Piece
+  {
+    What what = What::unread;
+    uint64_t offset = 0;
+    uint64_t length = 0;
+  };
   struct Frame
   {
     Node node{};
@@ -190,7 +196,7 @@ private:
   void damage(uint64_t from, uint32_t code, std::string reason);
   std::string whyNot(const TAVHeader& header, uint64_t limit) const;
   uint64_t countChild(uint16_t elm);
-  Event& queue(What what, uint64_t offset, uint64_t length);
+  void queue(What what, uint64_t offset, uint64_t length);
 
   ByteSource& source_;
   Form form_;
@@ -207,7 +213,8 @@ private:
   bool canSkip_ = false;
   bool leans_ = false;
   size_t inherited_ = 0;
-  std::array<Event, 8> queue_{};
+  std::array<Piece, 8> queue_{};
+  Event shared_{}; ///< what the pieces in the queue have in common
   size_t queueHead_ = 0;
   size_t queueCount_ = 0;
 };

@@ -1,6 +1,6 @@
 #include <random>
-#include <sstream>
 #include <string>
+#include <string_view>
 #include <utility>
 
 #include <gmock/gmock.h>
@@ -19,11 +19,11 @@ class Notes final : public JsonHandler
 public:
   void null() override { text += "null "; }
   void boolean(bool value) override { text += value ? "true " : "false "; }
-  void integer(std::string digits) override { text += "i" + digits + " "; }
-  void fraction(std::string given) override { text += "f" + given + " "; }
-  void string(std::string given) override { text += "'" + given + "' "; }
+  void integer(std::string_view digits) override { text += "i" + std::string(digits) + " "; }
+  void fraction(std::string_view given) override { text += "f" + std::string(given) + " "; }
+  void string(std::string_view given) override { text += "'" + std::string(given) + "' "; }
   void startObject() override { text += "{ "; }
-  void key(std::string name) override { text += name + ": "; }
+  void key(std::string_view name) override { text += std::string(name) + ": "; }
   void endObject() override { text += "} "; }
   void startArray() override { text += "[ "; }
   void endArray() override { text += "] "; }
@@ -34,7 +34,7 @@ public:
 /// What a handler is told of a text; "" and the reason when it is no JSON.
 std::pair<std::string, std::string> parsed(const std::string& text)
 {
-  std::stringbuf buffer(text);
+  MemoryText buffer("text", text);
   Notes notes;
   try
   {
@@ -63,7 +63,7 @@ struct Refusal
 /// Whether a text is one JSON value and nothing else.
 bool isAccepted(const std::string& text)
 {
-  std::stringbuf buffer(text);
+  MemoryText buffer("text", text);
   Notes notes;
   try
   {
@@ -135,7 +135,7 @@ INSTANTIATE_TEST_SUITE_P(
 
 TEST(JsonParser, ReadsOneValueAndLeavesWhatStandsBehindIt)
 {
-  std::stringbuf buffer("[1] {\"a\": 2}");
+  MemoryText buffer("text", "[1] {\"a\": 2}");
   Notes notes;
   JsonParser parser(buffer, notes);
   parser.parseValue();
@@ -147,7 +147,8 @@ TEST(JsonParser, ReadsOneValueAndLeavesWhatStandsBehindIt)
 TEST(JsonParser, TakesAMillionLevelsWithoutRecursion)
 {
   constexpr size_t depth = 1'000'000;
-  std::stringbuf buffer(std::string(depth, '[') + std::string(depth, ']'));
+  const std::string text = std::string(depth, '[') + std::string(depth, ']');
+  MemoryText buffer("text", text);
   Notes notes;
   JsonParser(buffer, notes).parseValue();
   EXPECT_EQ(notes.text.size(), depth * 4);
