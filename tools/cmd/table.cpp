@@ -334,9 +334,9 @@ const Registration registration{{
                  .value = "OUT",
                  .help = "where the table goes, standard output unless given"}},
     .examples = {{"tav table day.tav --each /system --col time=timestamp --col host/hostName", "a series as CSV"},
-                 {"tav table *.tav --each //db --col name=db_name --col ../hostName --file > dbs.csv",
-                  "every database of many files"},
-                 {"tav table day.tav --each /system --col time=timestamp --col n=rows_read --counter n --rate",
+                 {"tav table *.tav --each //host --col hostName --col ../timestamp --file > hosts.csv",
+                  "every host of many files"},
+                 {"tav table day.tav --each /system --col time=timestamp --col n=tq_rows_read --counter n --rate",
                   "rates of a counter"}},
     .run = run,
 }};
