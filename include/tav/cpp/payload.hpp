@@ -72,7 +72,7 @@ struct ReaderState
   /// by itself would read all that is between, or as much as it holds.
   void goTo(uint64_t offset) noexcept
   {
-    if (!isBuffered() || !core::hasNeverTraced())
+    if (!isBuffered())
     {
       return;
     }
