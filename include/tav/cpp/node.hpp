@@ -376,21 +376,25 @@ private:
   {
     if (reference != nullptr && state_->isBuffered())
     {
-      goBehind(*reference);
+      if (const uint32_t rc = goBehind(*reference); rc != TAV_RC_OK)
+      {
+        return rc;
+      }
     }
     return tavGetNextChild(0, state_->handle, &parent_, reference, &data_);
   }
 
   /// Brings a ring to the sibling of a node; that of an open group is searched through all that is between.
-  void goBehind(const TAVHeader& header) const noexcept
+  uint32_t goBehind(const TAVHeader& header) const noexcept
   {
     const core::Node node = core::nodeOf(header);
     uint64_t length = 0;
     if (!core::isOpen(node) && core::lengthOf(state_->handle->alignMode == 1, node, length) &&
         layout::addChecked(length, node.offset()))
     {
-      state_->goTo(length);
+      return state_->goTo(length);
     }
+    return TAV_RC_OK;
   }
 
   /// Before a walk that somebody asks for.
@@ -434,8 +438,8 @@ private:
     }
     TAVHeaderData again{};
     ++state_->fetches;
-    state_->goTo(offset());
-    uint32_t rc = tavReadNodeInt(0, state_->handle, offset(), layout::is64(data_.header), &again);
+    uint32_t rc = state_->goTo(offset());
+    rc = rc == TAV_RC_OK ? tavReadNodeInt(0, state_->handle, offset(), layout::is64(data_.header), &again) : rc;
     if (rc == TAV_RC_OK && (layout::sizeOf(again.header) != size() || layout::typeOf(again.header) != type()))
     {
       rc = TAV_RC_OUTSIDE_PARENT;

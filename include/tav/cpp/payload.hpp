@@ -70,22 +70,24 @@ struct ReaderState
 
   /// Before a look at a place that a ring may not cache. One that is far from what it does is read by a page: the ring
   /// by itself would read all that is between, or as much as it holds.
-  void goTo(uint64_t offset) noexcept
+  uint32_t goTo(uint64_t offset) noexcept
   {
     if (!isBuffered())
     {
-      return;
+      return TAV_RC_OK;
     }
     TAVCircularBuf& ring = *handle->pCircularBuf;
     if (core::runAt(ring, offset).length != 0)
     {
-      return;
+      return TAV_RC_OK;
     }
     const uint64_t end = ring.headOffset + core::cachedBytes(ring);
     if (ring.empty != 0 || offset < end || offset - end >= ring.pageSize)
     {
-      ring.reposition(offset, 0, 0); // what fails fails again where the place is looked at
+      const uint32_t rc = ring.reposition(offset, 0, 0);
+      return rc == TAV_RC_END_OF_STORAGE || rc == TAV_RC_END_OF_DATA ? TAV_RC_OK : rc; // the look itself says so
     }
+    return TAV_RC_OK;
   }
 
   /// The handle is given away: a plain operation can give it another storage.

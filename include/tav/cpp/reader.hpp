@@ -348,8 +348,8 @@ private:
   uint32_t readAt(uint64_t offset, Width width, Node& node) const noexcept
   {
     return read(node, [=, this](TAVHandle& used, TAVHeaderData& data) {
-      state_->goTo(offset);
-      return tavReadNodeInt(0, &used, offset, width == Width::bits64, &data);
+      const uint32_t rc = state_->goTo(offset);
+      return rc != TAV_RC_OK ? rc : tavReadNodeInt(0, &used, offset, width == Width::bits64, &data);
     });
   }
 
