@@ -19,7 +19,7 @@ def version() -> str:
 
 class BuildByCMake(build_ext):
     def build_extension(self, ext: Extension) -> None:
-        build = pathlib.Path(self.build_temp).resolve()
+        build = ROOT / "build" / "wheel"
         options = {"CMAKE_BUILD_TYPE": "Release", "BUILD_SHARED_LIBS": "OFF", "TAV_BUILD_PYTHON": "ON",
                    "TAV_BUILD_TESTS": "OFF", "TAV_BUILD_TOOLS": "OFF", "TAV_BUILD_EXAMPLES": "OFF", "TAV_INSTALL": "OFF",
                    "Python3_EXECUTABLE": sys.executable,
