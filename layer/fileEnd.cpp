@@ -51,11 +51,16 @@ public:
       }
       bool whole = endOfGroup(root) < content_;
       rc = whole ? rc : endsWell(root, whole);
+      at = whole ? endOfGroup(root) : at;
       if (rc == TAV_RC_OK && !whole)
       {
-        return walk(root);
+        rc = walk(root);
+        at = found_.end;
       }
-      at = endOfGroup(root);
+      if (rc != TAV_RC_OK || !found_.open.empty())
+      {
+        return rc;
+      }
     }
     return rc;
   }
@@ -196,6 +201,13 @@ private:
   /// Past a data element, unless it is cut: then it goes on behind the end of the file, or its pair is not there.
   uint32_t pass(const TAVHeader& node, uint64_t end, uint64_t& at)
   {
+    const bool endsGroup =
+        layout::elmOf(node) == TAV_ELM_CMN_END_HDR_EYE_SIZE && layout::isSizeUnknown(levels_.back().group);
+    if (endsGroup && levels_.size() == 1 && end >= content_)
+    {
+      isCut_ = true; // the root's size could not be written: it is closed once more, for readers to pass it
+      return TAV_RC_OK;
+    }
     if (end > bytes_.size())
     {
       isCut_ = true;
@@ -214,7 +226,7 @@ private:
       }
     }
     at = end;
-    if (layout::elmOf(node) == TAV_ELM_CMN_END_HDR_EYE_SIZE && layout::isSizeUnknown(levels_.back().group))
+    if (endsGroup)
     {
       levels_.pop_back(); // its size could not be written
     }

@@ -109,7 +109,7 @@ inline uint32_t continueAt(TAVHandle& handle, const FileEnd& found, size_t left)
   for (TAVHeader group : found.open)
   {
     layout::HeaderFields fields = layout::fieldsOf(group);
-    fields.size = TAV_SIZE_UNKNOWN; // all ones in either width
+    fields.size = 0; // with an unknown size the close would keep it to itself that the size could not be written
     layout::setHeader(fields, layout::is64(group), group);
     if (const uint32_t rc = handle.pHdrStack->push(&group); rc != TAV_RC_OK)
     {

@@ -6,7 +6,8 @@ import struct
 import unittest
 
 from layout import EYE_SIZE, Form
-from support import EMULATOR, SANITIZED, ToolTest, bytes_of_hex, generate, tav, tav_in_little_memory, tree_rows
+from support import (EMULATOR, SANITIZED, ToolTest, bytes_of_hex, generate, nodes_of, tav, tav_in_little_memory,
+                     tree_rows)
 
 OPEN = 2**64 - 1
 LITTLE = Form(big=False)
@@ -122,6 +123,7 @@ class Hostile(ToolTest):
 
     def test_info_of_a_sparse_file_of_8_GiB_is_quick(self):
         path = self.snapshot()
+        count = len(nodes_of(path))
         os.truncate(path, 8 << 30)
         best = 60.0
         for _ in range(5):
@@ -129,7 +131,7 @@ class Hostile(ToolTest):
             result = tav("info", path)
             best = min(best, processor_time() - before)
             self.assertEqual(result.status, 0, result.out)
-            self.assertIn("nodes             16,", result.out)
+            self.assertIn(f"nodes             {count},", result.out)
         self.assertLess(best, 1.0 if SANITIZED else 0.05)
 
     def test_get_of_an_early_match_reads_a_hundredth(self):

@@ -1,4 +1,5 @@
 /// Writers that go on behind the last stream of a file.
+#include <algorithm>
 #include <fstream>
 
 #include <gmock/gmock.h>
@@ -291,6 +292,36 @@ TEST_P(LayerAppend, ClosesARootThatNobodyGoesOnWith)
   EXPECT_EQ(numbers(), (Numbers{{0, 1, 77}, {60}}));
   tav::Writer writer(file_.path, kResume, options());
   EXPECT_FALSE(writer.resumed().isOpen()) << "nothing was left open";
+}
+
+TEST_P(LayerAppend, SetsASizeThatCouldNotBeWrittenAndLosesNoRootBehindIt)
+{
+  if (!GetParam().pairs)
+  {
+    return; // without an end element such a root is an open one
+  }
+  for (const uint32_t rootsBehind : {0U, 2U})
+  {
+    SCOPED_TRACE(rootsBehind);
+    tav::Writer before(options());
+    put(before, 0, 3);
+    for (uint32_t i = 0; i < rootsBehind; ++i)
+    {
+      put(before, 10 * (i + 1), 2);
+    }
+    before.finish();
+    const Bytes sound = bytesOf(before.bytes());
+    Bytes bytes = sound;
+    std::fill_n(bytes.begin(), 8, uint8_t{0xFF}); // the size of the first root
+    store(file_.path, bytes);
+    tav::Writer writer(file_.path, {.append = true}, options());
+    put(writer, 60, 1);
+    writer.finish();
+    const Bytes after = contentOf(file_.path);
+    ASSERT_GT(after.size(), sound.size());
+    EXPECT_EQ(Bytes(after.begin(), after.begin() + static_cast<ptrdiff_t>(sound.size())),
+              rootsBehind == 0 ? sound : bytes);
+  }
 }
 
 TEST_P(LayerAppend, RefusesAnOpenRootWhereThatIsAsked)
