@@ -34,10 +34,10 @@ def program(*arguments: str, status: int = 0, stdin: bytes = b"") -> bytes:
     return done.stdout
 
 
-def program_nodes(path: str | os.PathLike[str]) -> list[dict[str, object]]:
+def program_nodes(path: str | os.PathLike[str], *options: str) -> list[dict[str, object]]:
     """The nodes of a file, as the program tells them: no end elements, no other parts."""
-    lines = program("json", str(path), "--lines").decode().splitlines()
-    nodes = [json.loads(line) for line in lines[1:]]
+    lines = program("json", str(path), "--lines", *options).decode().split("\n")  # of which texts have others, too
+    nodes = [json.loads(line) for line in lines[1:] if line]
     return [node for node in nodes if node.get("id", 65000) < 65000]
 
 
