@@ -2,7 +2,7 @@
 #include <sys/statvfs.h>
 
 #include "tools/host/machineParts.h"
-#include "tools/host/procFile.h"
+#include "tools/host/procFilePosix.h"
 
 namespace tav::host
 {

@@ -4,7 +4,7 @@
 
 #include "tools/host/machine.h"
 #include "tools/host/machineParts.h"
-#include "tools/host/procFile.h"
+#include "tools/host/procFilePosix.h"
 
 namespace tav::host
 {

@@ -2,7 +2,7 @@
 #include <dirent.h>
 
 #include "tools/host/machineParts.h"
-#include "tools/host/procFile.h"
+#include "tools/host/procFilePosix.h"
 
 namespace tav::host
 {

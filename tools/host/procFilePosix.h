@@ -1,4 +1,4 @@
-/// @file procFile.h
+/// @file procFilePosix.h
 /// Files in which the system tells of itself, as those below /proc.
 #pragma once
 
