@@ -1,5 +1,6 @@
 // Rows of nodes as Python sees them: buffers of plain values, and arrays of objects that it has made to be filled.
 #include "python/src/names.h"
+#include "python/src/places.h"
 #include "python/src/rows.h"
 #include "python/src/values.h"
 
@@ -36,19 +37,9 @@ Rows& rowsOf(PyObject* self)
 }
 
 template<class T>
-PyObject* makeBuffer(PyObject* owner, Column<T>& column, const char* format)
+PyObject* bufferOf(PyObject* owner, Column<T>& column, const char* format)
 {
-  auto* const buffer = PyObject_New(BufferObject, bufferType);
-  if (buffer == nullptr)
-  {
-    throw Raised{};
-  }
-  buffer->owner = Py_NewRef(owner);
-  buffer->items = column.data();
-  buffer->count = static_cast<Py_ssize_t>(rowsOf(owner).count());
-  buffer->itemSize = sizeof(T);
-  buffer->format = format;
-  return reinterpret_cast<PyObject*>(buffer);
+  return makeBuffer(owner, column.data(), rowsOf(owner).count(), sizeof(T), format).release();
 }
 
 int getBuffer(PyObject* self, Py_buffer* view, int flags)
@@ -98,62 +89,19 @@ PyObject* column(PyObject* self, PyObject* argument)
     Rows& rows = rowsOf(self);
     const std::string name = bytesOfText(argument);
     // clang-format off
-    if (name == "parent") return makeBuffer(self, rows.parent, "q");
-    if (name == "depth") return makeBuffer(self, rows.depth, "I");
-    if (name == "offset") return makeBuffer(self, rows.offset, "Q");
-    if (name == "size") return makeBuffer(self, rows.size, "Q");
-    if (name == "id") return makeBuffer(self, rows.id, "H");
-    if (name == "key") return makeBuffer(self, rows.key, "H");
-    if (name == "kind") return makeBuffer(self, rows.kind, "B");
-    if (name == "number") return makeBuffer(self, rows.number, rows.hasUpper ? "Q" : "q");
-    if (name == "time") return makeBuffer(self, rows.time, "q");
+    if (name == "parent") return bufferOf(self, rows.parent, "q");
+    if (name == "depth") return bufferOf(self, rows.depth, "I");
+    if (name == "offset") return bufferOf(self, rows.offset, "Q");
+    if (name == "size") return bufferOf(self, rows.size, "Q");
+    if (name == "id") return bufferOf(self, rows.id, "H");
+    if (name == "key") return bufferOf(self, rows.key, "H");
+    if (name == "kind") return bufferOf(self, rows.kind, "B");
+    if (name == "number") return bufferOf(self, rows.number, rows.hasUpper ? "Q" : "q");
+    if (name == "time") return bufferOf(self, rows.time, "q");
     // clang-format on
     raise(PyExc_KeyError, "there is no such column");
   });
 }
-
-/// The places of an array of objects, which holds None or nothing at each of them.
-class Places
-{
-public:
-  Places(PyObject* array, size_t count)
-  {
-    done(PyObject_GetBuffer(array, &view_, PyBUF_WRITABLE | PyBUF_FORMAT | PyBUF_C_CONTIGUOUS));
-    const bool isRight = std::string_view(view_.format) == "O" &&
-                         static_cast<size_t>(view_.len) == count * sizeof(PyObject*);
-    if (!isRight)
-    {
-      PyBuffer_Release(&view_);
-      raise(PyExc_ValueError, "an array of as many objects as rows is expected");
-    }
-  }
-  Places(const Places&) = delete;
-  Places& operator=(const Places&) = delete;
-  ~Places()
-  {
-    Py_SET_REFCNT(Py_None, Py_REFCNT(Py_None) - nones_);
-    PyBuffer_Release(&view_);
-  }
-
-  /// Takes the object over.
-  void put(size_t row, PyObject* object)
-  {
-    auto* const places = static_cast<PyObject**>(view_.buf);
-    PyObject* const before = std::exchange(places[row], object);
-    if (before == Py_None) [[likely]]
-    {
-      ++nones_; // given back at once: they are most of the work
-    }
-    else
-    {
-      Py_XDECREF(before);
-    }
-  }
-
-private:
-  Py_ssize_t nones_ = 0;
-  Py_buffer view_{};
-};
 
 Ref numberAt(const Rows& rows, size_t row)
 {
@@ -259,6 +207,21 @@ PyType_Spec rowsSpec = {"tav._tav.Rows", sizeof(RowsObject), 0, kFlags, rowsSlot
 PyType_Spec bufferSpec = {"tav._tav.Buffer", sizeof(BufferObject), 0, kFlags, bufferSlots};
 
 } // namespace
+
+Ref makeBuffer(PyObject* owner, void* items, size_t count, size_t itemSize, const char* format)
+{
+  auto* const buffer = PyObject_New(BufferObject, bufferType);
+  if (buffer == nullptr)
+  {
+    throw Raised{};
+  }
+  buffer->owner = Py_NewRef(owner);
+  buffer->items = items;
+  buffer->count = static_cast<Py_ssize_t>(count);
+  buffer->itemSize = static_cast<Py_ssize_t>(itemSize);
+  buffer->format = format;
+  return Ref(reinterpret_cast<PyObject*>(buffer));
+}
 
 PyObject* columnsOf(ReaderObject& reader, bool withPaths, PyObject* progress)
 {

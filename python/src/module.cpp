@@ -18,6 +18,7 @@ PyMethodDef functions[] = {{"recognise", recognise, METH_VARARGS, nullptr},
                            {"from_json", fromJson, METH_VARARGS, nullptr},
                            {"recover", recover, METH_VARARGS, nullptr},
                            {"set", setValues, METH_VARARGS, nullptr},
+                           {"read_table", readTable, METH_VARARGS, nullptr},
                            {"extract", extract, METH_VARARGS, nullptr},
                            {}};
 
@@ -33,6 +34,7 @@ PyObject* makeModule()
   addNode(module.get());
   addWalks(module.get());
   addColumns(module.get());
+  addTable(module.get());
   addWriter(module.get());
   done(PyModule_AddStringConstant(module.get(), "__version__", TAV_VERSION));
   return module.release();

@@ -29,6 +29,9 @@ public:
     }
   }
 
+  /// Looks now.
+  void look() { look(told_); }
+
   /// Takes the interpreter again, for good.
   void hold() noexcept
   {

@@ -12,6 +12,8 @@ namespace
 
 using inspect::OnDamage;
 
+PyTypeObject* readerType = nullptr;
+
 ReaderObject& readerOf(PyObject* self)
 {
   return *reinterpret_cast<ReaderObject*>(self);
@@ -175,6 +177,11 @@ PyObject* columns(PyObject* self, PyObject* arguments, PyObject* named)
   return callHelper("tav._columns", "columns", self, arguments, named);
 }
 
+PyObject* table(PyObject* self, PyObject* arguments, PyObject* named)
+{
+  return callHelper("tav._table", "table", self, arguments, named);
+}
+
 PyObject* getDamage(PyObject* self, void*)
 {
   return guarded([&] {
@@ -249,6 +256,10 @@ PyMethodDef methods[] = {
      "(datetime64[ns]), bytes; with path=True path, which costs more than all the others. Behind each of parent,\n"
      "number, text, time and bytes is a bool array 'parent_valid', 'number_valid' and so on: where it is False\n"
      "the row has no such value. number is int64, or uint64 or object (int) where a value needs it; never a float."},
+    {"table", asFunction(table), METH_VARARGS | METH_KEYWORDS,
+     "table($self, /, each, columns, *, join=None, progress=None)\n--\n\n"
+     "A row for each node that the path `each` leads to, in one pass: Table. columns: {name: path from there}; the\n"
+     "first value where a path leads to several, or all of them with the text `join` between them."},
     {"_columns", asFunction(rawColumns), METH_VARARGS | METH_KEYWORDS, nullptr},
     {"close", close, METH_NOARGS,
      "close($self, /)\n--\n\nLets go of the file. Nodes and walks raise TavError from now on; payloads live on."},
@@ -334,9 +345,18 @@ Opened& useDocument(const ReaderObject& reader)
   return opened;
 }
 
+ReaderObject& readerObjectOf(PyObject* object)
+{
+  if (Py_TYPE(object) != readerType)
+  {
+    raise(PyExc_TypeError, "a reader is expected");
+  }
+  return readerOf(object);
+}
+
 void addReader(PyObject* module)
 {
-  makeType(module, spec, "Reader");
+  readerType = makeType(module, spec, "Reader");
 }
 
 } // namespace tav::python

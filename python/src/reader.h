@@ -139,10 +139,17 @@ PyObject* loadRoots(ReaderObject& reader);
 /// The columns of all nodes as Python makes arrays of them: see columns.cpp.
 PyObject* columnsOf(ReaderObject& reader, bool withPaths, PyObject* progress);
 
+/// The reader that an object is; TypeError for another one.
+ReaderObject& readerObjectOf(PyObject* object);
+
+/// The function _tav.read_table.
+PyObject* readTable(PyObject* module, PyObject* arguments);
+
 void addReader(PyObject* module);
 void addNode(PyObject* module);
 void addWalks(PyObject* module);
 void addColumns(PyObject* module);
 void addWriter(PyObject* module);
+void addTable(PyObject* module);
 
 } // namespace tav::python

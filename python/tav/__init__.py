@@ -16,12 +16,13 @@ from typing import Any, Callable, Iterable, Mapping, Optional, Union
 
 from . import _tav
 from ._results import Change, Damage, Difference, Doubt, Extracted, Finding, Form, Loss, Report, SchemaEntry, Side
-from ._tav import Group, Node, Reader, TavError, Writer, __version__
+from ._table import read_table
+from ._tav import Group, Node, Reader, Table, TavError, Writer, __version__
 
 __all__ = [
     "Change", "Damage", "Difference", "Doubt", "Extracted", "Finding", "Form", "Group", "Loss", "Node", "Reader",
-    "Report", "SchemaEntry", "Side", "TavError", "Writer", "__version__", "check", "diff", "extract", "from_json",
-    "open", "recognise", "recover", "schema", "set", "to_json",
+    "Report", "SchemaEntry", "Side", "Table", "TavError", "Writer", "__version__", "check", "diff", "extract", "from_json",
+    "open", "read_table", "recognise", "recover", "schema", "set", "to_json",
 ]
 
 Path = Union[str, "os.PathLike[str]"]

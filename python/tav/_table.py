@@ -1,0 +1,94 @@
+"""Tables of nodes as arrays of NumPy and frames of pandas."""
+from __future__ import annotations
+
+import glob
+import os
+from typing import TYPE_CHECKING, Any, Callable, Iterable, Iterator, Mapping, Optional, Union
+
+from . import _tav
+
+if TYPE_CHECKING:
+    import pandas  # type: ignore[import]
+
+_Progress = Optional[Callable[[int, int], object]]
+_PLAIN = {"uint64": "uint64", "int64": "int64", "time": "datetime64[ns]"}
+
+
+def table(reader: _tav.Reader, each: str, columns: Mapping[str, str], *, join: Optional[str] = None,
+          progress: _Progress = None) -> _tav.Table:
+    """See Reader.table."""
+    return _tav.read_table([reader], each, list(columns.items()), join, progress)
+
+
+def _arrays(of: _tav.Table) -> Iterator[tuple[str, str, Any, Any]]:
+    """Name, type, values and whether each is there; of objects None says that it is not."""
+    import numpy as np
+
+    for i, (name, kind) in enumerate(of.columns.items()):
+        if kind in _PLAIN:
+            values, valid = of._plain(i)
+            yield name, kind, np.frombuffer(values, _PLAIN[kind]), np.frombuffer(valid, bool)
+        else:
+            array = np.empty(len(of), object)
+            of._fill(i, array)
+            yield name, kind, array, None
+
+
+def to_numpy(of: _tav.Table) -> dict[str, Any]:
+    """See Table.to_numpy."""
+    import numpy as np
+
+    result = {}
+    for name, kind, values, valid in _arrays(of):
+        has_gaps = kind in ("uint64", "int64") and not valid.all()
+        masked: Any = np.ma.masked_array
+        result[name] = masked(values, ~valid) if has_gaps else values
+    return result
+
+
+def to_pandas(of: _tav.Table) -> pandas.DataFrame:
+    """See Table.to_pandas."""
+    import pandas as pd
+
+    series: dict[str, Any] = {}
+    for name, kind, values, valid in _arrays(of):
+        if kind in ("uint64", "int64"):
+            series[name] = pd.arrays.IntegerArray(values, ~valid)
+        elif kind == "time":
+            series[name] = pd.DatetimeIndex(values, tz="UTC")
+        else:
+            series[name] = values
+    return pd.DataFrame(series, index=pd.RangeIndex(len(of)))
+
+
+def paths_of(paths: Union[str, os.PathLike[str], Iterable[Any]]) -> list[Any]:
+    """Files of a path, of a pattern or of several of them, each pattern's in the order of their names."""
+    given = [paths] if isinstance(paths, (str, bytes, bytearray, memoryview, os.PathLike)) else list(paths)
+    found: list[Any] = []
+    for each in given:
+        pattern = os.fsdecode(each) if isinstance(each, (str, os.PathLike)) else ""
+        if not glob.has_magic(pattern) or os.path.exists(pattern):
+            found.append(each)
+            continue
+        matches = sorted(glob.glob(pattern, recursive=True))
+        if not matches:
+            raise FileNotFoundError(f"no file is called {pattern}")
+        found += matches
+    return found
+
+
+def read_table(paths: Union[str, os.PathLike[str], Iterable[Any]], each: str, columns: Mapping[str, str], *,
+               join: Optional[str] = None, on_damage: str = "stop", byte_order: Optional[str] = None,
+               root: Optional[int] = None, align: Optional[bool] = None,
+               progress: _Progress = None) -> pandas.DataFrame:
+    """A row for each node that the path `each` leads to, of any number of files one after the other.
+
+    paths: a path, a pattern as of glob, or several of them; columns: {name: path from the row's node}
+    join: the text between the values where a path leads to several; without it the first is taken
+    """
+    def readers() -> Iterator[_tav.Reader]:
+        for path in paths_of(paths):
+            with _tav.Reader(path, byte_order=byte_order, root=root, align=align, on_damage=on_damage) as reader:
+                yield reader
+
+    return to_pandas(_tav.read_table(readers(), each, list(columns.items()), join, progress))
