@@ -1,5 +1,6 @@
 #include <set>
 #include <sys/statvfs.h>
+#include <unistd.h>
 
 #include "tools/host/machineParts.h"
 #include "tools/host/procFilePosix.h"

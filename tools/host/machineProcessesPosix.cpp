@@ -1,5 +1,6 @@
 #include <algorithm>
 #include <dirent.h>
+#include <unistd.h>
 
 #include "tools/host/machineParts.h"
 #include "tools/host/procFilePosix.h"

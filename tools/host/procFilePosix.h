@@ -4,26 +4,16 @@
 
 #include <charconv>
 #include <cstdint>
-#include <fcntl.h>
 #include <optional>
 #include <string>
 #include <string_view>
-#include <unistd.h>
 
 namespace tav::host
 {
-/// The whole of a file, empty when it cannot be read. `folder` is the descriptor of the one that `path` is in.
-inline std::string contentOf(const char* path, int folder = AT_FDCWD)
-{
-  std::string text;
-  const int file = ::openat(folder, path, O_RDONLY | O_CLOEXEC);
-  if (file < 0) return text;
-  char piece[4096];
-  for (ssize_t count = 0; (count = ::read(file, piece, sizeof piece)) > 0;)
-    text.append(piece, static_cast<size_t>(count));
-  ::close(file);
-  return text;
-}
+/// The whole of a file, empty when it cannot be read.
+std::string contentOf(const char* path);
+/// The same in a folder that is open, by its descriptor.
+std::string contentOf(const char* path, int folder);
 
 /// Takes words, which blanks separate, and lines from the front of a text.
 class Words
