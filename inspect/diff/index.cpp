@@ -128,7 +128,7 @@ void DiffIndex::add(const Event& event, bool ignore)
   }
   if (event.what == What::nodeEnd && event.node.isGroup())
   {
-    endGroup();
+    endGroup(event.offset);
   }
   if (event.what == What::damaged)
   {
@@ -174,11 +174,12 @@ void DiffIndex::addData(const Row& given)
   append(row);
 }
 
-void DiffIndex::endGroup()
+void DiffIndex::endGroup(uint64_t end)
 {
   Open open = open_.back();
   open_.pop_back();
   open.row.next = count_;
+  open.row.size = end - open.row.payload;
   mix(open.row.hash, open.row.elm);
   mix(open.row.hash, open.row.info);
   for (const uint64_t key : open.keys)

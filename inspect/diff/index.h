@@ -23,7 +23,7 @@ inline constexpr uint64_t kNoRow = ~uint64_t{0};
 struct Row
 {
   uint64_t offset = 0;
-  uint64_t size = 0; ///< of the payload of a data element, or of the damaged bytes
+  uint64_t size = 0; ///< of the payload, to the end of a group, or of the damaged bytes
   uint64_t next = 0; ///< the row behind the node and all below it
   uint64_t parent = kNoRow;
   uint64_t ordinal = 0;
@@ -47,6 +47,7 @@ public:
             const std::function<void(const Walker&, const Event&)>& seen);
 
   uint64_t rows() const { return count_; }
+  const Form& form() const { return form_; }
   Row row(uint64_t number);
 
   /// A part of a payload in host order, valid until the next call; pieces must be asked for from the front, in
@@ -73,7 +74,7 @@ private:
   void begin(const Walker& walker, const Event& event);
   void add(const Event& event, bool ignore);
   void addData(const Row& given);
-  void endGroup();
+  void endGroup(uint64_t end);
   Row rowOf(const Event& event) const;
   uint64_t payloadHash(const Row& row);
   void append(const Row& row);

@@ -27,7 +27,8 @@ Number wholeNumber(std::string_view name, const Scalar& value)
   const auto result = std::from_chars(value.text.data() + (hex ? 2 : 0), end, number, hex ? 16 : 10);
   if (!given || result.ec != std::errc() || result.ptr != end)
   {
-    throw BuildError(std::string(name) + ": " + (value.kind == Scalar::Kind::null ? std::string("null") : inspect::quoted(value.text)) +
+    throw BuildError(std::string(name) + ": " +
+                     (value.kind == Scalar::Kind::null ? std::string("null") : inspect::quoted(value.text)) +
                      " is no number that fits");
   }
   return number;
@@ -311,8 +312,9 @@ void DocumentReader::giveValue(const Scalar& value)
 {
   if (value.kind == Scalar::Kind::null || value.kind == Scalar::Kind::fraction)
   {
-    throw BuildError(value.kind == Scalar::Kind::null ? "no type holds null"
-                                                      : "no type holds " + std::string(value.text) + ", only whole numbers");
+    throw BuildError(value.kind == Scalar::Kind::null
+                         ? "no type holds null"
+                         : "no type holds " + std::string(value.text) + ", only whole numbers");
   }
   if (draft_.given != Given::nothing)
   {

@@ -5,11 +5,11 @@
 
 #include "inspect/text/bytes.h"
 #include "inspect/text/date.h"
+#include "tav/cpp/valueText.hpp"
 #include "tav/inspect/jsonText.hpp"
 #include "tav/inspect/jsonWriter.hpp"
 #include "tav/inspect/phrases.hpp"
 #include "tav/inspect/value.hpp"
-#include "tav/cpp/valueText.hpp"
 
 namespace tav::inspect
 {

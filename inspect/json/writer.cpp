@@ -17,8 +17,8 @@ using namespace tav::layout;
 namespace
 {
 
-constexpr size_t kMaxIndent = 32;  ///< levels, so that deep nests do not become mostly blanks
-constexpr uint64_t kMaxSteps = 64; ///< deeper nodes are named by their offset, so that a line stays a line
+constexpr size_t kMaxIndent = 32;               ///< levels, so that deep nests do not become mostly blanks
+constexpr uint64_t kMaxSteps = 64;              ///< deeper nodes are named by their offset, so that a line stays a line
 constexpr size_t kMostText = size_t{16} * 1024; ///< that is kept before it is handed over
 
 } // namespace

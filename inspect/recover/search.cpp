@@ -57,14 +57,16 @@ uint64_t RecoverySearch::firstSure(uint64_t from, uint64_t to, bool wide)
   {
     return std::min(to, sureAt_);
   }
-  std::array<uint8_t, 4096 + kHeaderSize64> window{};
+  std::array<uint8_t, 4096 + kHeaderSize64> window;
   const uint64_t length = kHeaderSize32;
   uint64_t at = known ? sureAt_ : from;
   bool done = false;
   while (at < to && !done)
   {
-    const size_t got = source_.read(at, window);
-    std::fill(window.begin() + static_cast<ptrdiff_t>(got), window.end(), uint8_t{0});
+    // Most are texts of a few bytes: no more is read than the tests look at.
+    const auto bytes = std::span(window).first(static_cast<size_t>(std::min<uint64_t>(4096, to - at) + kHeaderSize64));
+    const size_t got = source_.read(at, bytes);
+    std::fill(bytes.begin() + static_cast<ptrdiff_t>(got), bytes.end(), uint8_t{0});
     const uint64_t tests = std::min<uint64_t>({4096, to - at, got < length ? 0 : got - length + 1});
     if (tests == 0)
     {

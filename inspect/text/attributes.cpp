@@ -37,7 +37,7 @@ constexpr auto kXmlBytes = [] {
 bool isXmlText(std::string_view text)
 {
   const auto other = std::find_if(text.begin(), text.end(), [](char c) { return !kXmlBytes[static_cast<uint8_t>(c)]; });
-  return other == text.end() || detail::isXmlText(std::string_view(other, text.end()));
+  return other == text.end() || detail::isXmlText(text.substr(static_cast<size_t>(other - text.begin())));
 }
 
 /// The tag of an element where it is its name in XML.
@@ -212,7 +212,10 @@ bool appendAttributeText(std::string& out, ByteSource& source, const Form& form,
       appendNumber(out, node.type());
     }
     break;
-  case Attribute::header: out += node.depth != 0 ? "" : node.is64() ? "64" : "32"; break;
+  case Attribute::header:
+    out += node.depth != 0 ? "" : node.is64() ? "64"
+                                              : "32";
+    break;
   case Attribute::info:
   {
     const uint32_t usual = form.aligned ? TAV_INFO_ALIGNED8 : 0;

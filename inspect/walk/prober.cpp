@@ -58,12 +58,18 @@ bool Prober::header(uint64_t offset, bool wide, uint64_t limit, TAVHeader& out) 
   {
     return false;
   }
-  std::array<uint8_t, kHeaderSize64> bytes{};
-  if (source_.read(offset, std::span(bytes).first(static_cast<size_t>(length))) != length)
+  std::array<uint8_t, kHeaderSize64> room{};
+  const std::span<const uint8_t> atHand = source_.view(offset);
+  const uint8_t* bytes = atHand.data();
+  if (atHand.size() < length)
   {
-    return false;
+    if (source_.read(offset, std::span(room).first(static_cast<size_t>(length))) != length)
+    {
+      return false;
+    }
+    bytes = room.data();
   }
-  decodeHeader(bytes.data(), wide, form_.swapped, out);
+  decodeHeader(bytes, wide, form_.swapped, out);
   out.nodeOffset = offset;
   return true;
 }

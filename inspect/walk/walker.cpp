@@ -52,6 +52,7 @@ Walker Walker::through(ByteSource& source, const Form& form, const Mark& mark)
   for (Frame& frame : walker.frames_)
   {
     frame.counts = 0;
+    frame.counted = 0;
   }
   return walker;
 }
@@ -203,7 +204,8 @@ void Walker::begin(TAVHeader& header)
       belief = Belief::followed;
     }
   }
-  Node node;
+  Node& node = shared_.node; // of what will be in the queue
+  node = {};
   node.header = header;
   node.depth = frames_.size() - 1 + above_;
   node.parentOffset = frames_.size() > 1 ? top.node.offset() : kNoOffset;
@@ -309,7 +311,6 @@ void Walker::beginGroup(Node& node)
   frame.wide = hasChildren64(node.header);
   frame.counts = counts_.size();
   queue(What::nodeBegin, node.offset(), node.headerLength());
-  shared_.node = node;
   position_ = start;
   frames_.push_back(frame);
 }
@@ -389,7 +390,6 @@ void Walker::takeData(Node& node)
     takePair(node, limit);
   }
   queue(What::nodeEnd, position_, 0);
-  shared_.node = node;
   if (isEndElement(node.elm()))
   {
     afterEndElement(node);
@@ -468,7 +468,9 @@ void Walker::endGroup(End end)
 uint64_t Walker::countChild(uint16_t elm)
 {
   Frame& top = frames_.back();
-  for (size_t i = top.counts; i < counts_.size(); ++i)
+  const uint64_t bit = uint64_t{1} << (elm % 64);
+  const size_t first = (top.counted & bit) != 0 ? top.counts : counts_.size();
+  for (size_t i = first; i < counts_.size(); ++i)
   {
     if (counts_[i].elm == elm)
     {
@@ -479,6 +481,7 @@ uint64_t Walker::countChild(uint16_t elm)
   {
     return 0;
   }
+  top.counted |= bit;
   counts_.push_back({elm, 1});
   return 1;
 }

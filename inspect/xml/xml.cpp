@@ -24,7 +24,7 @@ using detail::paths::Attribute;
 
 constexpr size_t kPiece = size_t{48} * 1024;
 constexpr uint64_t kMaxIndent = 32;
-constexpr uint64_t kMaxNumber = 64; ///< bytes of the longest value that is one number or date
+constexpr uint64_t kMaxNumber = 64;             ///< bytes of the longest value that is one number or date
 constexpr size_t kMostText = size_t{16} * 1024; ///< that is kept before it is handed over
 
 /// Appends text; in attributes also quotation marks and what a reader would make a blank are escaped.

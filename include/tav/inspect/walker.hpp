@@ -172,6 +172,7 @@ private:
     Node node{};
     uint64_t limit = 0;
     size_t counts = 0;       ///< where its children's counts begin
+    uint64_t counted = 0;    ///< a bit for each id that is among them: where it is not set, the id is new
     uint64_t lastDamage = 0; ///< end of the last damaged piece among its children
     bool wide = false;       ///< children have 64-bit headers
     bool open = false;       ///< an end element ends it
