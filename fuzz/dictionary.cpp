@@ -6,6 +6,7 @@
 
 #include "fuzz/input.h"
 #include "tav/inspect.hpp"
+#include "tav/path/compiled.hpp"
 
 namespace
 {
@@ -14,7 +15,10 @@ using namespace tav::inspect;
 
 void demand(bool holds, const char* what)
 {
-  if (!holds) throw std::runtime_error(what);
+  if (!holds)
+  {
+    throw std::runtime_error(what);
+  }
 }
 
 void look(const Dictionary& names)
@@ -54,7 +58,10 @@ Dictionary read(const std::string& name, std::string_view text)
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
 {
-  if (size > fuzz::kLargest) return 0;
+  if (size > fuzz::kLargest)
+  {
+    return 0;
+  }
   fuzz::Input input(data, size);
   const std::string text = input.text(255);
   const auto rest = input.rest();

@@ -16,7 +16,10 @@ using namespace tav::inspect;
 
 void demand(bool holds, const char* what)
 {
-  if (!holds) throw std::runtime_error(what);
+  if (!holds)
+  {
+    throw std::runtime_error(what);
+  }
 }
 
 std::string inOneWalk(ByteSource& source, const Form& form)
@@ -65,7 +68,10 @@ std::string checked(ByteSource& source, const Form& form, unsigned threads, uint
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
 {
-  if (size > fuzz::kLargest) return 0;
+  if (size > fuzz::kLargest)
+  {
+    return 0;
+  }
   fuzz::Input input(data, size);
   const uint8_t flags = input.byte();
   const Form form{.swapped = (flags & 1U) != 0, .root64 = (flags & 4U) == 0, .aligned = (flags & 2U) != 0};

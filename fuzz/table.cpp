@@ -15,7 +15,10 @@ using namespace tav::inspect;
 
 void demand(bool holds, const char* what)
 {
-  if (!holds) throw std::runtime_error(what);
+  if (!holds)
+  {
+    throw std::runtime_error(what);
+  }
 }
 
 struct Asked
@@ -48,7 +51,10 @@ Found read(ByteSource& source, const Form& form, const TableQuery& query, OnDama
                         found.told += std::to_string(passed.offset) + passed.reason + '\n';
                       }});
   while (reader.next(table, 5)) demand(table.rows() > found.rows, "a batch without rows"), found.rows = table.rows();
-  if (reader.stopped()) found.told += problemLine(*reader.stopped());
+  if (reader.stopped())
+  {
+    found.told += problemLine(*reader.stopped());
+  }
   for (uint64_t row = 0; row < table.rows(); ++row)
   {
     for (size_t column = 0; column < table.columns().size(); ++column)
@@ -74,7 +80,10 @@ Found read(ByteSource& source, const Form& form, const TableQuery& query, OnDama
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
 {
-  if (size > fuzz::kLargest) return 0;
+  if (size > fuzz::kLargest)
+  {
+    return 0;
+  }
   fuzz::Input input(data, size);
   const unsigned flags = input.byte();
   const Asked& asked = kAsked[input.byte() % kAsked.size()];

@@ -247,7 +247,10 @@ uint32_t KORHFile::syncData()
 
 uint32_t KORHFile::findData(uint64_t offset, uint64_t* pFound) const
 {
-  if (pFound == nullptr || offset > static_cast<uint64_t>(INT64_MAX)) return TAV_RC_BAD_PARAM;
+  if (pFound == nullptr || offset > static_cast<uint64_t>(INT64_MAX))
+  {
+    return TAV_RC_BAD_PARAM;
+  }
   *pFound = offset;
   return native_ == kNoFile ? KOR_RC_NOT_OPEN : findDataNative(native_, offset, *pFound);
 }
@@ -291,20 +294,29 @@ KORFileMapping::~KORFileMapping()
 
 uint32_t KORFileMapping::map(const KORHFile& file)
 {
-  if (pBytes_ != nullptr) return KOR_RC_BUSY;
+  if (pBytes_ != nullptr)
+  {
+    return KOR_RC_BUSY;
+  }
   return file.native_ == kNoFile ? KOR_RC_NOT_OPEN : mapNative(file.native_, pBytes_, size_);
 }
 
 void KORFileMapping::unmap()
 {
-  if (pBytes_ != nullptr) unmapNative(pBytes_, size_);
+  if (pBytes_ != nullptr)
+  {
+    unmapNative(pBytes_, size_);
+  }
   pBytes_ = nullptr;
   size_ = 0;
 }
 
 void KORFileMapping::readAhead()
 {
-  if (pBytes_ != nullptr) readAheadNative(pBytes_, size_);
+  if (pBytes_ != nullptr)
+  {
+    readAheadNative(pBytes_, size_);
+  }
 }
 
 uint32_t korSyncFolderOf(const char* pPath)

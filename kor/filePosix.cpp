@@ -253,17 +253,35 @@ uint32_t findDataNative(intptr_t file, uint64_t offset, uint64_t& found)
   found = offset;
 #if defined(SEEK_DATA)
   const off_t here = ::lseek(descriptor(file), 0, SEEK_CUR);
-  if (here < 0) return TAV_RC_OK; // it has no places
+  if (here < 0) // it has no places
+  {
+    return TAV_RC_OK;
+  }
   const off_t data = ::lseek(descriptor(file), static_cast<off_t>(offset), SEEK_DATA);
   const int error = data < 0 ? errno : 0;
-  if (::lseek(descriptor(file), here, SEEK_SET) != here) return codeOfSystemError(errno);
-  if (data >= 0) found = static_cast<uint64_t>(data);
-  if (error != ENXIO) return TAV_RC_OK;
+  if (::lseek(descriptor(file), here, SEEK_SET) != here)
+  {
+    return codeOfSystemError(errno);
+  }
+  if (data >= 0)
+  {
+    found = static_cast<uint64_t>(data);
+  }
+  if (error != ENXIO)
+  {
+    return TAV_RC_OK;
+  }
   // Nothing is behind it, or it is behind the end itself.
   struct stat status = {};
-  if (::fstat(descriptor(file), &status) != 0) return codeOfSystemError(errno);
+  if (::fstat(descriptor(file), &status) != 0)
+  {
+    return codeOfSystemError(errno);
+  }
   const auto size = static_cast<uint64_t>(status.st_size);
-  if (S_ISREG(status.st_mode) && size > offset) found = size;
+  if (S_ISREG(status.st_mode) && size > offset)
+  {
+    found = size;
+  }
 #endif
   return TAV_RC_OK;
 }
@@ -271,10 +289,19 @@ uint32_t findDataNative(intptr_t file, uint64_t offset, uint64_t& found)
 uint32_t mapNative(intptr_t file, void*& bytes, uint64_t& size)
 {
   struct stat status = {};
-  if (::fstat(descriptor(file), &status) != 0) return codeOfSystemError(errno);
-  if (!S_ISREG(status.st_mode) || status.st_size <= 0) return TAV_RC_NOT_SUPPORTED;
+  if (::fstat(descriptor(file), &status) != 0)
+  {
+    return codeOfSystemError(errno);
+  }
+  if (!S_ISREG(status.st_mode) || status.st_size <= 0)
+  {
+    return TAV_RC_NOT_SUPPORTED;
+  }
   const auto length = static_cast<uint64_t>(status.st_size);
-  if (length > SIZE_MAX) return TAV_RC_NO_MEMORY;
+  if (length > SIZE_MAX)
+  {
+    return TAV_RC_NO_MEMORY;
+  }
   void* const mapped =
       ::mmap(nullptr, static_cast<std::size_t>(length), PROT_READ, MAP_SHARED, descriptor(file), 0);
   if (mapped == MAP_FAILED)

@@ -248,25 +248,49 @@ uint32_t findDataNative(intptr_t file, uint64_t offset, uint64_t& found)
   const bool known = DeviceIoControl(handleOf(file), FSCTL_QUERY_ALLOCATED_RANGES, &asked, sizeof asked, &first,
                                      sizeof first, &got, nullptr) != 0 ||
                      GetLastError() == ERROR_MORE_DATA;
-  if (!known) return TAV_RC_OK;
+  if (!known)
+  {
+    return TAV_RC_OK;
+  }
   const uint64_t data = static_cast<uint64_t>(got == 0 ? size.QuadPart : first.FileOffset.QuadPart);
-  if (data > offset) found = data; // a range that the offset lies in may be told from its start on
+  if (data > offset) // a range that the offset lies in may be told from its start on
+  {
+    found = data;
+  }
   return TAV_RC_OK;
 }
 
 uint32_t mapNative(intptr_t file, void*& bytes, uint64_t& size)
 {
   LARGE_INTEGER length{};
-  if (GetFileType(handleOf(file)) != FILE_TYPE_DISK) return TAV_RC_NOT_SUPPORTED;
-  if (!GetFileSizeEx(handleOf(file), &length)) return codeOfSystemError(GetLastError());
-  if (length.QuadPart <= 0) return TAV_RC_NOT_SUPPORTED;
-  if (static_cast<uint64_t>(length.QuadPart) > SIZE_MAX) return TAV_RC_NO_MEMORY;
+  if (GetFileType(handleOf(file)) != FILE_TYPE_DISK)
+  {
+    return TAV_RC_NOT_SUPPORTED;
+  }
+  if (!GetFileSizeEx(handleOf(file), &length))
+  {
+    return codeOfSystemError(GetLastError());
+  }
+  if (length.QuadPart <= 0)
+  {
+    return TAV_RC_NOT_SUPPORTED;
+  }
+  if (static_cast<uint64_t>(length.QuadPart) > SIZE_MAX)
+  {
+    return TAV_RC_NO_MEMORY;
+  }
   const HANDLE section = CreateFileMappingW(handleOf(file), nullptr, PAGE_READONLY, 0, 0, nullptr);
-  if (section == nullptr) return transferCodeOf(GetLastError());
+  if (section == nullptr)
+  {
+    return transferCodeOf(GetLastError());
+  }
   void* const mapped = MapViewOfFile(section, FILE_MAP_READ, 0, 0, static_cast<SIZE_T>(length.QuadPart));
   const DWORD error = mapped == nullptr ? GetLastError() : ERROR_SUCCESS;
   CloseHandle(section); // the view holds it
-  if (mapped == nullptr) return transferCodeOf(error);
+  if (mapped == nullptr)
+  {
+    return transferCodeOf(error);
+  }
   bytes = mapped;
   size = static_cast<uint64_t>(length.QuadPart);
   return TAV_RC_OK;

@@ -109,7 +109,7 @@ void DictionaryReader::startObject()
   behind_ = static_cast<size_t>(source_.position());
 }
 
-void DictionaryReader::key(std::string name)
+void DictionaryReader::key(std::string_view name)
 {
   const size_t at = tokenStart();
   if (depth_ == 1)
@@ -128,13 +128,13 @@ void DictionaryReader::key(std::string name)
     {
       fail(at, "the key " + quoted(name) + " is given twice");
     }
-    seen_.push_back(name);
-    key_ = std::move(name);
+    seen_.emplace_back(name);
+    key_ = name;
   }
   behind_ = static_cast<size_t>(source_.position());
 }
 
-void DictionaryReader::startElement(const std::string& id)
+void DictionaryReader::startElement(std::string_view id)
 {
   element_ = {};
   seen_.clear();
@@ -148,7 +148,7 @@ void DictionaryReader::startElement(const std::string& id)
   if (dictionary::detail::placeOf(element_.id) < dictionary::entries().size())
   {
     const dictionary::Entry& entry = dictionary::entries()[dictionary::detail::placeOf(element_.id)];
-    fail(elementAt_, "the id " + id +
+    fail(elementAt_, "the id " + std::string(id) +
                          (detail::paths::isElement(entry)
                               ? " is that of " + quoted(detail::paths::withoutBlanks(entry.tag)) + " in"
                               : " lies among those of") +
@@ -156,11 +156,11 @@ void DictionaryReader::startElement(const std::string& id)
   }
   if (const auto [before, isNew] = ids_.emplace(element_.id, element_.place); !isNew)
   {
-    fail(elementAt_, "the id " + id + " is given twice, first at " + before->second);
+    fail(elementAt_, "the id " + std::string(id) + " is given twice, first at " + before->second);
   }
 }
 
-void DictionaryReader::string(std::string text)
+void DictionaryReader::string(std::string_view text)
 {
   if (depth_ < 2)
   {
@@ -169,7 +169,7 @@ void DictionaryReader::string(std::string text)
   if (key_ == "tag")
   {
     tagAt_ = tokenStart();
-    element_.tag = std::move(text);
+    element_.tag = text;
   }
   else if (key_ == "kind")
   {
@@ -177,12 +177,12 @@ void DictionaryReader::string(std::string text)
   }
   else
   {
-    (key_ == "unit" ? element_.unit : element_.text) = std::move(text);
+    (key_ == "unit" ? element_.unit : element_.text) = text;
   }
   behind_ = static_cast<size_t>(source_.position());
 }
 
-void DictionaryReader::setKind(const std::string& name)
+void DictionaryReader::setKind(std::string_view name)
 {
   for (const ElementKind kind : {ElementKind::gauge, ElementKind::counter, ElementKind::text})
   {

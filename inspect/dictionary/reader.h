@@ -28,11 +28,11 @@ public:
 private:
   void null() override { refuse(); }
   void boolean(bool) override { refuse(); }
-  void integer(std::string) override { refuse(); }
-  void fraction(std::string) override { refuse(); }
-  void string(std::string text) override;
+  void integer(std::string_view) override { refuse(); }
+  void fraction(std::string_view) override { refuse(); }
+  void string(std::string_view text) override;
   void startObject() override;
-  void key(std::string name) override;
+  void key(std::string_view name) override;
   void endObject() override;
   void startArray() override { refuse(); }
   void endArray() override {}
@@ -42,8 +42,8 @@ private:
   size_t tokenStart() const;
   std::string placeOf(size_t at) const;
   std::string nextPlace(size_t at);
-  void startElement(const std::string& id);
-  void setKind(const std::string& name);
+  void startElement(std::string_view id);
+  void setKind(std::string_view name);
   void endElement();
 
   /// A place in the text, as people count it.

@@ -89,15 +89,42 @@ PyObject* column(PyObject* self, PyObject* argument)
     Rows& rows = rowsOf(self);
     const std::string name = bytesOfText(argument);
     // clang-format off
-    if (name == "parent") return bufferOf(self, rows.parent, "q");
-    if (name == "depth") return bufferOf(self, rows.depth, "I");
-    if (name == "offset") return bufferOf(self, rows.offset, "Q");
-    if (name == "size") return bufferOf(self, rows.size, "Q");
-    if (name == "id") return bufferOf(self, rows.id, "H");
-    if (name == "key") return bufferOf(self, rows.key, "H");
-    if (name == "kind") return bufferOf(self, rows.kind, "B");
-    if (name == "number") return bufferOf(self, rows.number, rows.hasUpper ? "Q" : "q");
-    if (name == "time") return bufferOf(self, rows.time, "q");
+    if (name == "parent")
+    {
+      return bufferOf(self, rows.parent, "q");
+    }
+    if (name == "depth")
+    {
+      return bufferOf(self, rows.depth, "I");
+    }
+    if (name == "offset")
+    {
+      return bufferOf(self, rows.offset, "Q");
+    }
+    if (name == "size")
+    {
+      return bufferOf(self, rows.size, "Q");
+    }
+    if (name == "id")
+    {
+      return bufferOf(self, rows.id, "H");
+    }
+    if (name == "key")
+    {
+      return bufferOf(self, rows.key, "H");
+    }
+    if (name == "kind")
+    {
+      return bufferOf(self, rows.kind, "B");
+    }
+    if (name == "number")
+    {
+      return bufferOf(self, rows.number, rows.hasUpper ? "Q" : "q");
+    }
+    if (name == "time")
+    {
+      return bufferOf(self, rows.time, "q");
+    }
     // clang-format on
     raise(PyExc_KeyError, "there is no such column");
   });

@@ -88,9 +88,15 @@ Pager::Pager(const std::string& command)
 {
   int ends[2];
   std::fflush(stdout);
-  if (::pipe(ends) != 0) return;
+  if (::pipe(ends) != 0)
+  {
+    return;
+  }
   process_ = ::fork();
-  if (process_ == 0) becomePager(command, ends);
+  if (process_ == 0)
+  {
+    becomePager(command, ends);
+  }
   ::close(ends[0]);
   if (process_ > 0)
   {
@@ -103,7 +109,10 @@ Pager::Pager(const std::string& command)
 
 Pager::~Pager()
 {
-  if (process_ <= 0) return;
+  if (process_ <= 0)
+  {
+    return;
+  }
   std::fflush(stdout);
   ::dup2(before_, STDOUT_FILENO); // the command comes to the end of its input
   ::close(before_);

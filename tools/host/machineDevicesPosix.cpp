@@ -53,7 +53,10 @@ std::vector<DiskFacts> lookAtDisks()
     line.skip(2);
     disk.busyTime = line.number();
     // What has never been used, a loop device for instance, is none that anybody asks for.
-    if (disk.reads.value_or(0) + disk.writes.value_or(0) != 0 && isDisk(disk.name)) disks.push_back(std::move(disk));
+    if (disk.reads.value_or(0) + disk.writes.value_or(0) != 0 && isDisk(disk.name))
+    {
+      disks.push_back(std::move(disk));
+    }
   }
   return disks;
 }
@@ -90,7 +93,10 @@ std::vector<NetworkFacts> lookAtNetworks()
   for (Words line{{}}; networks.size() < kMostDevices && lines.nextLine(line);)
   {
     const std::string_view word = line.next();
-    if (!word.ends_with(":")) continue; // above the table
+    if (!word.ends_with(":")) // above the table
+    {
+      continue;
+    }
     NetworkFacts network{.name = std::string(word.substr(0, word.size() - 1))};
     const auto take = [&line](TransferFacts& way) {
       for (Fact* const fact : {&way.bytes, &way.packets, &way.errors, &way.drops}) *fact = line.number();

@@ -13,7 +13,10 @@ namespace
 void describeSystem(MachineFacts& facts)
 {
   utsname name{};
-  if (::uname(&name) != 0) return;
+  if (::uname(&name) != 0)
+  {
+    return;
+  }
   facts.hostName = name.nodename;
   facts.machine = name.machine;
   facts.osName = name.sysname;
@@ -42,7 +45,10 @@ Fact hundredths(std::string_view word)
   uint64_t whole = 0;
   uint64_t part = 0;
   const size_t dot = word.find('.');
-  if (dot == std::string_view::npos || word.size() != dot + 3) return std::nullopt;
+  if (dot == std::string_view::npos || word.size() != dot + 3)
+  {
+    return std::nullopt;
+  }
   const char* const end = word.data() + word.size();
   const bool isNumber = std::from_chars(word.data(), word.data() + dot, whole).ec == std::errc() &&
                         std::from_chars(word.data() + dot + 1, end, part).ec == std::errc();

@@ -14,7 +14,10 @@ std::optional<ProcessFacts> processOf(const std::string& text, uint64_t id, uint
 {
   const size_t begin = text.find('(');
   const size_t end = text.rfind(')');
-  if (begin == std::string::npos || end == std::string::npos || end < begin) return std::nullopt;
+  if (begin == std::string::npos || end == std::string::npos || end < begin)
+  {
+    return std::nullopt;
+  }
   ProcessFacts process{.id = id, .name = text.substr(begin + 1, end - begin - 1)};
   Words words(std::string_view(text).substr(end + 1));
   words.skip(11);
@@ -42,23 +45,35 @@ std::vector<ProcessFacts> lookAtProcesses(std::map<uint64_t, uint64_t>& times)
 {
   std::vector<ProcessFacts> busiest;
   DIR* const folder = ::opendir("/proc");
-  if (folder == nullptr) return busiest;
+  if (folder == nullptr)
+  {
+    return busiest;
+  }
   const uint64_t tick = 1000 / static_cast<uint64_t>(std::max(1L, ::sysconf(_SC_CLK_TCK)));
   std::map<uint64_t, uint64_t> now;
   while (const dirent* const entry = ::readdir(folder))
   {
     const std::string name = entry->d_name;
     const Fact id = Words(name).number();
-    if (!id) continue;
+    if (!id)
+    {
+      continue;
+    }
     auto process = processOf(contentOf((name + "/stat").c_str(), ::dirfd(folder)), *id, tick);
-    if (!process) continue; // it has ended meanwhile
+    if (!process) // it has ended meanwhile
+    {
+      continue;
+    }
     const auto before = times.find(*id);
     // A number can come again: a process that has had less time is another one.
     const uint64_t counted = before == times.end() || before->second > process->time ? 0 : before->second;
     process->recent = process->time - counted;
     now.emplace(*id, process->time);
     busiest.insert(std::upper_bound(busiest.begin(), busiest.end(), *process, isBusier), std::move(*process));
-    if (busiest.size() > kMostProcesses) busiest.pop_back();
+    if (busiest.size() > kMostProcesses)
+    {
+      busiest.pop_back();
+    }
   }
   ::closedir(folder);
   times = std::move(now);

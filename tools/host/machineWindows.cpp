@@ -45,7 +45,10 @@ void describeMemory(MemoryFacts& memory)
 {
   MEMORYSTATUSEX status{};
   status.dwLength = sizeof status;
-  if (!GlobalMemoryStatusEx(&status)) return;
+  if (!GlobalMemoryStatusEx(&status))
+  {
+    return;
+  }
   memory.total = status.ullTotalPhys;
   memory.free = memory.available = status.ullAvailPhys;
   // The page file's numbers count the memory in.

@@ -24,7 +24,10 @@ public:
 
   bool nextLine(Words& line)
   {
-    if (text_.empty()) return false;
+    if (text_.empty())
+    {
+      return false;
+    }
     const size_t end = text_.find('\n');
     line = Words(text_.substr(0, end));
     text_.remove_prefix(end == std::string_view::npos ? text_.size() : end + 1);
@@ -59,13 +62,19 @@ inline std::optional<uint64_t> numberAfter(const std::string& text, std::string_
 {
   Words lines(text);
   for (Words line{{}}; lines.nextLine(line);)
-    if (line.next() == word) return line.number();
+    if (line.next() == word)
+    {
+      return line.number();
+    }
   return std::nullopt;
 }
 
 inline std::optional<uint64_t> times(std::optional<uint64_t> number, uint64_t factor)
 {
-  if (number) *number *= factor;
+  if (number)
+  {
+    *number *= factor;
+  }
   return number;
 }
 } // namespace tav::host

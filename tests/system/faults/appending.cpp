@@ -30,7 +30,10 @@ void prepare(const std::string& path)
   {
     tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM, {.eyeSize = true});
     for (uint32_t i = 0; i < kBefore; ++i) root.add(TAV_ELM_CMN_CPU_ONLINE, i);
-    if (!isLast) continue;
+    if (!isLast)
+    {
+      continue;
+    }
     const auto bytes = writer.bytes();
     std::ofstream(path, std::ios::binary)
         .write(reinterpret_cast<const char*>(bytes.data()), static_cast<std::streamsize>(bytes.size()));
@@ -95,7 +98,10 @@ std::vector<uint32_t> numbersIn(const std::string& path)
   {
     for (const tav::Node& node : root.children())
     {
-      if (node.elm() == TAV_ELM_CMN_CPU_ONLINE) all.push_back(node.as<uint32_t>());
+      if (node.elm() == TAV_ELM_CMN_CPU_ONLINE)
+      {
+        all.push_back(node.as<uint32_t>());
+      }
     }
   }
   return all;

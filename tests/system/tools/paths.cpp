@@ -28,7 +28,8 @@ std::string read(const tav::Reader& reader, const tav::Path& path)
   std::string found;
   for (const tav::Node& node : reader.find(path))
   {
-    found += " " + std::to_string(node.offset());
+    found += ' ';
+    found += std::to_string(node.offset());
   }
   return found;
 }
