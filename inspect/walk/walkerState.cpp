@@ -31,6 +31,7 @@ void Walker::State::forget()
   for (Frame& frame : frames)
   {
     frame.counts = 0;
+    frame.counted = 0;
     frame.lastDamage = 0;
   }
 }
@@ -50,6 +51,7 @@ bool Walker::State::join(const State& before, size_t shared)
       const Frame& known = before.frames[i];
       const size_t end = i + 1 < before.frames.size() ? before.frames[i + 1].counts : before.counts.size();
       frame.lastDamage = frame.lastDamage != 0 ? frame.lastDamage : known.lastDamage;
+      frame.counted |= known.counted;
       frame.node = known.node;
       all.insert(all.end(), before.counts.begin() + static_cast<ptrdiff_t>(known.counts),
                  before.counts.begin() + static_cast<ptrdiff_t>(end));
