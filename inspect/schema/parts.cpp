@@ -117,6 +117,7 @@ private:
 
 void Schema::add(ByteSource& source, const Form& form, const SchemaWork& work)
 {
+  dictionary_ = dictionary_.over(source.dictionary());
   const std::vector<Part> parts = partsFor(source, form, work.threads, work.partBytes);
   Job job(*this, form, work);
   if (!parts.empty())

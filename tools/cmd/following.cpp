@@ -133,7 +133,7 @@ FoundNode foundIn(const Arrival& arrival)
 OptionSpec followOption()
 {
   return {.names = "--follow",
-          .help = "go on as the file grows, until interrupted; also over files that take its place"};
+          .help = "go on as the file grows, or another takes its place"};
 }
 
 Status followFile(const Invocation& invocation, FollowTold told, Output& out)

@@ -69,8 +69,7 @@ std::string helpText()
   }
   // A terminal has 24 lines: what is about the program itself is in one.
   text += "\n'tav help COMMAND' tells more, with examples; 'tav completion SHELL' is for bash, zsh and fish.\n"
-          "Exit status: 0 fine; 1 findings, differences or no match; 2 wrong usage or trouble with\n"
-          "the system; 3 too damaged to go on.\n";
+          "Exit status: 0 fine; 1 findings or no match; 2 wrong usage or trouble; 3 too damaged to go on.\n";
   return text;
 }
 

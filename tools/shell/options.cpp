@@ -88,7 +88,7 @@ const std::vector<OptionSpec>& globalOptions()
       {.names = "--dictionary",
        .kind = ValueKind::input,
        .value = "FILE",
-       .help = "names of own elements, as JSON; before TAV_DICTIONARY and what lies beside a file",
+       .help = "names of own elements; before those of TAV_DICTIONARY",
        .many = true,
        .concern = kNames},
       {.names = "--ring",

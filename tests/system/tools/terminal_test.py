@@ -235,7 +235,7 @@ class Progress(TerminalTest):
     def test_it_is_shown_inside_one_long_payload(self):
         path = self.long_stream()
         form = ("--byte-order", "little", "--root", "64", "--no-align")
-        for command in (["json", path], ["xml", path], ["hex", path], ["get", path, "/**", "--raw", "--all"]):
+        for command in (["xml", path], ["get", path, "/**", "--raw", "--all"]): # json and hex pass over holes
             with self.subTest(command[0]):
                 run, ours = self.start(*command, *form, terminal=("stderr",), other=os.devnull)
                 self.assertRegex(self.read(ours, until=r"s left"), command[0] + r": [\d.]+ \w+ of 16(\.0)? GiB")
@@ -258,7 +258,7 @@ class Progress(TerminalTest):
 class Interrupt(TerminalTest):
     def test_an_interrupt_leaves_neither_half_a_file_nor_a_temporary_one(self):
         path = self.long_stream()
-        for command, number in (("recover", signal.SIGINT), ("recover", signal.SIGTERM), ("json", signal.SIGINT),
+        for command, number in (("recover", signal.SIGINT), ("recover", signal.SIGTERM), ("xml", signal.SIGINT),
                                 ("xml", signal.SIGTERM)):
             with self.subTest(command=command, signal=number.name):
                 target = self.folder / "target"
