@@ -28,7 +28,7 @@ ROOMS = {
     "dictionary": {"dictionary", "format", "trace", "kor"},
     "core": {"core", "storage", "format", "trace", "kor"},
     "api": {"api", "core", "storage", "dictionary", "format", "trace", "kor"},
-    "layer": {"layer"},
+    "layer": {"layer", "dictionary"},
     "inspect": {"inspect"},
     "tools": {"tools"},
     "python": {"python"},

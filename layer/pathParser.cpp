@@ -6,7 +6,7 @@
 #include <system_error>
 #include <utility>
 
-#include "tav/cpp/nearest.hpp"
+#include "layer/elementNames.h"
 #include "tav/layout.hpp"
 #include "tav/path/names.hpp"
 

@@ -14,8 +14,8 @@
 #include <utility>
 #include <vector>
 
+#include "layer/elementNames.h"
 #include "tav/cpp/ranges.hpp"
-#include "tav/dictionary.hpp"
 #include "tav/path/compare.hpp"
 #include "tav/path/compiled.hpp"
 #include "tav/path/valueText.hpp"
@@ -272,10 +272,10 @@ private:
   /// Whether the XML form calls an element by its tag.
   bool hasXmlName(uint16_t elm) const
   {
-    const std::string_view tag = dictionary::tagOf(elm);
+    const std::string_view tag = elementTag(elm);
     return tag.empty() ? std::binary_search(ownTags.begin(), ownTags.end(), elm)
                        : tag.find(' ') == std::string_view::npos &&
-                             paths::idsNamed(tag) == std::vector<uint16_t>{elm};
+                             idsNamed(tag) == std::vector<uint16_t>{elm};
   }
 
   std::optional<std::string> headerAttribute(const Node& node, paths::Attribute attribute) const
@@ -289,8 +289,8 @@ private:
     {
     case Attribute::id: return when(!hasXmlName(node.elm()), std::to_string(node.elm()));
     case Attribute::name:
-      return when(!dictionary::nameOf(node.elm()).empty() && !hasXmlName(node.elm()),
-                  std::string(dictionary::nameOf(node.elm())));
+      return when(!elementName(node.elm()).empty() && !hasXmlName(node.elm()),
+                  std::string(elementName(node.elm())));
     case Attribute::type:
       return node.type() == TAV_TYPE_HEADER32   ? "group32"
              : node.type() == TAV_TYPE_HEADER64 ? "group64"

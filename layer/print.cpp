@@ -5,11 +5,11 @@
 #include <string>
 #include <string_view>
 
+#include "layer/elementNames.h"
 #include "tav/cpp/print.hpp"
 #include "tav/cpp/ranges.hpp"
 #include "tav/cpp/stack.hpp"
 #include "tav/cpp/valueText.hpp"
-#include "tav/dictionary.hpp"
 
 namespace tav::detail
 {
@@ -133,12 +133,12 @@ private:
 
   static std::string_view tagName(uint16_t elm) noexcept
   {
-    const std::string_view tag = dictionary::tagOf(elm);
+    const std::string_view tag = elementTag(elm);
     return tag.empty() ? "element" : tag;
   }
   static std::string_view enumName(uint16_t elm) noexcept
   {
-    const std::string_view name = dictionary::nameOf(elm);
+    const std::string_view name = elementName(elm);
     return name.empty() ? "Unknown Element" : name;
   }
 
@@ -153,7 +153,7 @@ private:
       return;
     }
     text_.append("<").append(tagName(node.elm()));
-    if (dictionary::tagOf(node.elm()).empty())
+    if (elementTag(node.elm()).empty())
     {
       text_.append(" id=\"").append(std::to_string(node.elm())) += '"';
     }

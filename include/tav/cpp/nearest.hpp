@@ -2,11 +2,8 @@
 /// The name that a misspelt one may have meant.
 #pragma once
 
-#include <array>
 #include <cstddef>
 #include <string_view>
-
-#include "tav/dictionary.hpp"
 
 namespace tav::detail
 {
@@ -41,32 +38,6 @@ inline size_t editDistance(std::string_view left, std::string_view right, size_t
 constexpr size_t mostSlips(std::string_view word) noexcept
 {
   return 1 + word.size() / 4;
-}
-
-/// The tag that comes nearest to a name that no element has, of the dictionary's and the own ones; empty when none is
-/// near.
-inline std::string_view nearestTag(std::string_view name, dictionary::OwnNames own = {}) noexcept
-{
-  std::string_view nearest;
-  if (name.size() <= kLongestMisspelt)
-  {
-    std::array<size_t, kLongestMisspelt + 1> row{};
-    size_t least = mostSlips(name) + 1;
-    const auto consider = [&](std::string_view tag) {
-      const size_t distance = editDistance(name, tag, row.data());
-      nearest = distance < least ? tag : nearest;
-      least = distance < least ? distance : least;
-    };
-    for (const dictionary::OwnName& entry : own)
-    {
-      consider(entry.tag);
-    }
-    for (const dictionary::Entry& entry : dictionary::entries())
-    {
-      entry.constant == "INVALID_ELEMENT" ? void() : consider(entry.tag);
-    }
-  }
-  return nearest;
 }
 
 } // namespace tav::detail

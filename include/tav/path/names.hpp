@@ -6,13 +6,10 @@
 #include <array>
 #include <cstddef>
 #include <cstdint>
-#include <iterator>
-#include <string>
 #include <string_view>
 #include <vector>
 
 #include "tav/dictionary.hpp"
-#include "tav/layout.hpp"
 #include "tav/path/decimal.hpp"
 
 namespace tav::detail::paths
@@ -67,58 +64,6 @@ inline void putInOrder(std::vector<uint16_t>& ids)
 {
   std::sort(ids.begin(), ids.end());
   ids.erase(std::unique(ids.begin(), ids.end()), ids.end());
-}
-
-/// The ids that bear a name, ascending: several elements can share a tag. Empty when no element has it.
-inline std::vector<uint16_t> idsNamed(std::string_view name, dictionary::OwnNames own = {})
-{
-  std::vector<uint16_t> ids;
-  for (const dictionary::Entry& entry : dictionary::entries())
-  {
-    const std::array names = namesOf(entry);
-    if (isElement(entry) && std::find(names.begin(), names.end(), name) != names.end())
-    {
-      ids.push_back(entry.id);
-    }
-  }
-  for (const dictionary::OwnName& entry : own)
-  {
-    if (entry.tag == name)
-    {
-      ids.push_back(entry.id);
-    }
-  }
-  putInOrder(ids);
-  return ids;
-}
-
-/// The ids whose tags a pattern describes, ascending; those of elements that only end a group where there is no other.
-inline std::vector<uint16_t> idsLike(std::string_view stars, dictionary::OwnNames own = {})
-{
-  std::string pattern; // where stars follow each other, one says the same
-  std::unique_copy(stars.begin(), stars.end(), std::back_inserter(pattern),
-                   [](char left, char right) { return left == '*' && right == '*'; });
-  std::vector<uint16_t> ids;
-  for (const dictionary::Entry& entry : dictionary::entries())
-  {
-    if (isElement(entry) && isLike(withoutBlanks(entry.tag), pattern))
-    {
-      ids.push_back(entry.id);
-    }
-  }
-  for (const dictionary::OwnName& entry : own)
-  {
-    if (isLike(entry.tag, pattern))
-    {
-      ids.push_back(entry.id);
-    }
-  }
-  if (std::any_of(ids.begin(), ids.end(), [](uint16_t id) { return !layout::isEndElement(id); }))
-  {
-    ids.erase(std::remove_if(ids.begin(), ids.end(), layout::isEndElement), ids.end());
-  }
-  putInOrder(ids);
-  return ids;
 }
 
 /// What the XML form shows of a node as attributes.
