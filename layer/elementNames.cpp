@@ -28,7 +28,7 @@ constexpr char kNames[] =
 /// Where they begin, and where the last one ends.
 constexpr auto kStarts = [] {
   constexpr size_t lengths[] = {
-#define TAV_ELEMENT(id, constant, enumName, tagName) sizeof enumName,
+#define TAV_ELEMENT(id, constant, enumName, tagName) sizeof(enumName),
 #define TAV_ELEMENT_PLACEHOLDER(id) sizeof "INVALID_ELEMENT",
 #include "tav/elements.def"
   };
@@ -106,21 +106,21 @@ std::vector<uint16_t> idsNamed(std::string_view name, dictionary::OwnNames own)
   return ids;
 }
 
-std::vector<uint16_t> idsLike(std::string_view stars, dictionary::OwnNames own)
+std::vector<uint16_t> idsLike(std::string_view pattern, dictionary::OwnNames own)
 {
-  std::string pattern; // where stars follow each other, one says the same
-  std::unique_copy(stars.begin(), stars.end(), std::back_inserter(pattern),
+  std::string shorter; // where stars follow each other, one says the same
+  std::unique_copy(pattern.begin(), pattern.end(), std::back_inserter(shorter),
                    [](char left, char right) { return left == '*' && right == '*'; });
   std::vector<uint16_t> ids;
   forEachElement([&](uint16_t id, std::string_view /*enumName*/, std::string_view tag) {
-    if (paths::isLike(paths::withoutBlanks(tag), pattern))
+    if (paths::isLike(paths::withoutBlanks(tag), shorter))
     {
       ids.push_back(id);
     }
   });
   for (const dictionary::OwnName& entry : own)
   {
-    if (paths::isLike(entry.tag, pattern))
+    if (paths::isLike(entry.tag, shorter))
     {
       ids.push_back(entry.id);
     }

@@ -79,6 +79,7 @@ private:
                               const std::function<void(uint64_t)>* progress) const
   {
     const auto wanted = [this](RuleId rule) { return wanted_[static_cast<size_t>(rule)]; };
+    // NOLINTNEXTLINE(modernize-make-unique): clang 14 makes no aggregate of arguments in parentheses
     return std::unique_ptr<Walk>(
         new Walk{Checker(source, form_, wanted, std::move(sink), options_.style, state, rootEnded), progress});
   }

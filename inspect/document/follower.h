@@ -56,7 +56,7 @@ private:
   bool nextChild();
   bool takeChild(const TAVHeader& child);
   bool waits(uint32_t rc, bool isLarge);
-  void arrive(const TAVHeader& node, const TAVHeader& before);
+  void arrive(const TAVHeader& header, const TAVHeader& before);
   void hand(const std::function<void(const Arrival&)>& to, const Node& node, std::span<const Node> above);
   void handRead(const TAVHeader& node);
   Node nodeOf(const TAVHeader& header) const;

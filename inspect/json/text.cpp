@@ -132,7 +132,8 @@ void appendJsonString(std::string& out, std::string_view text)
   out += '"';
   while (!text.empty())
   {
-    const auto special = std::find_if(text.begin(), text.end(), [](char c) { return !plain[static_cast<uint8_t>(c)]; });
+    const std::string_view::iterator special =
+        std::find_if(text.begin(), text.end(), [](char c) { return !plain[static_cast<uint8_t>(c)]; });
     out.append(text.begin(), special);
     text.remove_prefix(static_cast<size_t>(special - text.begin()));
     if (text.empty())

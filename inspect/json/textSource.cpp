@@ -44,7 +44,7 @@ bool TextSource::skipBlanks()
   while (sgetc() != traits_type::eof())
   {
     const std::string_view bytes = atHand();
-    const auto end = std::find_if_not(bytes.begin(), bytes.end(), isBlank);
+    const std::string_view::iterator end = std::find_if_not(bytes.begin(), bytes.end(), isBlank);
     skip(static_cast<size_t>(end - bytes.begin()));
     if (end != bytes.end())
     {

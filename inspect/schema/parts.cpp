@@ -106,6 +106,7 @@ public:
 private:
   std::unique_ptr<Walk> begin(ByteSource& source, const Walker::State& state) const
   {
+    // NOLINTNEXTLINE(modernize-make-unique): clang 14 makes no aggregate of arguments in parentheses
     return std::unique_ptr<Walk>(
         new Walk{Walker::from(source, form_, state), static_cast<bool>(work_.passed), &work_.progress});
   }

@@ -81,12 +81,14 @@ private:
     uint32_t up = 0;    ///< the row is so many levels above; of the rows' own routes 0
     uint32_t route = 0; ///< those of the rows come first
     uint32_t taken = 0;
+    // NOLINTNEXTLINE(modernize-use-nullptr): the zero is in the comparison that the compiler makes
     auto operator<=>(const Thread&) const = default;
   };
   struct Key
   {
     std::vector<Thread> threads{};
     bool watched = false; ///< inside a row with columns that are looked up
+    // NOLINTNEXTLINE(modernize-use-nullptr): the zero is in the comparison that the compiler makes
     auto operator<=>(const Key&) const = default;
   };
   struct State

@@ -208,6 +208,7 @@ void TableChunk::forgetMark()
 void TableChunk::goBack(const Mark& mark)
 {
   cut(mark.rows);
+  // NOLINTNEXTLINE(modernize-loop-convert): clang 14 does not compile the reversed view of the standard library
   for (auto entry = log_.rbegin(); entry != log_.rend(); ++entry)
   {
     Column& column = columns_[entry->column];

@@ -21,7 +21,7 @@ namespace tav::inspect
 class ExactWalk
 {
 public:
-  ExactWalk(Filling& filling)
+  explicit ExactWalk(Filling& filling)
       : filling_(filling) {}
 
   /// The bytes of a closed group from its header to its end. The filling has entered it. False when it gave up, at

@@ -36,7 +36,8 @@ constexpr auto kXmlBytes = [] {
 
 bool isXmlText(std::string_view text)
 {
-  const auto other = std::find_if(text.begin(), text.end(), [](char c) { return !kXmlBytes[static_cast<uint8_t>(c)]; });
+  const std::string_view::iterator other =
+      std::find_if(text.begin(), text.end(), [](char c) { return !kXmlBytes[static_cast<uint8_t>(c)]; });
   return other == text.end() || detail::isXmlText(text.substr(static_cast<size_t>(other - text.begin())));
 }
 

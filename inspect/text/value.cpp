@@ -82,7 +82,7 @@ void appendEscaped(std::string& out, std::string_view text, bool inQuotes)
   const Plain& plain = plains[inQuotes ? 1 : 0];
   while (!text.empty())
   {
-    const auto special =
+    const std::string_view::iterator special =
         std::find_if(text.begin(), text.end(), [&](char c) { return !plain[static_cast<uint8_t>(c)]; });
     out.append(text.begin(), special);
     text.remove_prefix(static_cast<size_t>(special - text.begin()));
