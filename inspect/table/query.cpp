@@ -62,8 +62,8 @@ bool staysInRoot(const paths::Compiled& path)
 } // namespace
 
 CompiledQuery::CompiledQuery(std::string_view eachText, std::vector<TableColumn> givenColumns,
-                             std::optional<std::string> givenJoiner)
-    : each(pathOf(eachText)), columns(std::move(givenColumns)), joiner(std::move(givenJoiner))
+                             std::optional<std::string> givenJoiner, const Dictionary& dictionary)
+    : each(pathOf(eachText, dictionary)), columns(std::move(givenColumns)), joiner(std::move(givenJoiner))
 {
   const paths::Compiled& rows = each.compiled();
   eachIsPlain = std::all_of(rows.main.begin(), rows.main.end(),
@@ -79,7 +79,7 @@ CompiledQuery::CompiledQuery(std::string_view eachText, std::vector<TableColumn>
   columnPaths.reserve(columns.size());
   for (const TableColumn& column : columns)
   {
-    columnPaths.push_back(pathOf(column.path));
+    columnPaths.push_back(pathOf(column.path, dictionary));
   }
   for (uint32_t i = 0; i < columnPaths.size(); ++i)
   {
@@ -105,8 +105,9 @@ void CompiledQuery::addColumn(uint32_t column)
   }
 }
 
-TableQuery::TableQuery(std::string_view each, std::vector<TableColumn> columns, std::optional<std::string> joiner)
-    : compiled_(std::make_shared<const CompiledQuery>(each, std::move(columns), std::move(joiner)))
+TableQuery::TableQuery(std::string_view each, std::vector<TableColumn> columns, std::optional<std::string> joiner,
+                       const Dictionary& dictionary)
+    : compiled_(std::make_shared<const CompiledQuery>(each, std::move(columns), std::move(joiner), dictionary))
 {
 }
 

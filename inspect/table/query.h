@@ -34,7 +34,7 @@ struct CompiledQuery
   };
 
   CompiledQuery(std::string_view eachText, std::vector<TableColumn> givenColumns,
-                std::optional<std::string> givenJoiner);
+                std::optional<std::string> givenJoiner, const Dictionary& dictionary);
   CompiledQuery(const CompiledQuery&) = delete;
   CompiledQuery& operator=(const CompiledQuery&) = delete;
 

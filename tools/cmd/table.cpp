@@ -4,8 +4,10 @@
 #include <set>
 
 #include "tav/inspect.hpp"
+#include "tav/path/compiled.hpp"
 #include "tools/cmd/tableRates.h"
 #include "tools/cmd/tableRows.h"
+#include "tools/shell/dictionary.h"
 #include "tools/shell/options.h"
 #include "tools/shell/output.h"
 #include "tools/shell/progress.h"
@@ -72,7 +74,7 @@ class Tabler
 public:
   explicit Tabler(const Invocation& invocation)
       : invocation_(invocation), labels_(labelsOf(invocation)),
-        query_(invocation.text("--each"), columnsOf(invocation), joinerOf(invocation)),
+        dictionary_(dictionaryFor(invocation, invocation.arguments().front())), query_(queryFor(dictionary_)),
         onDamage_(invocation.text("--on-damage", "stop") == "skip" ? OnDamage::skip : OnDamage::stop)
   {
     check();
@@ -105,6 +107,11 @@ private:
     return invocation.has("--join") ? std::optional(invocation.text("--join")) : std::nullopt;
   }
 
+  TableQuery queryFor(const Dictionary& dictionary) const
+  {
+    return {invocation_.text("--each"), columnsOf(invocation_), joinerOf(invocation_), dictionary};
+  }
+
   void check() const
   {
     const std::vector<std::string>& files = invocation_.arguments();
@@ -129,12 +136,27 @@ private:
   }
 
   /// Where it is decided what a column counts, and in what unit.
-  static OutColumn described(const TableColumn& column, const std::vector<std::string>& counters)
+  OutColumn described(const TableColumn& column, const std::vector<std::string>& counters) const
   {
     OutColumn about{.name = column.name, .help = column.path};
-    about.isCounter = about.name.ends_with("_total") ||
+    const OwnElement* const element = ownElementOf(column.path);
+    about.isCounter = about.name.ends_with("_total") || (element != nullptr && element->kind == ElementKind::counter) ||
                       std::find(counters.begin(), counters.end(), about.name) != counters.end();
+    if (element != nullptr)
+    {
+      about.unit = element->unit;
+      about.help = element->text.empty() ? about.help : element->text;
+    }
     return about;
+  }
+
+  /// What a path leads to, where that is one own element.
+  const OwnElement* ownElementOf(const std::string& text) const
+  {
+    const Path path = pathOf(text, dictionary_);
+    const detail::paths::Compiled& compiled = path.compiled();
+    const bool isOne = compiled.main.size() == 1 && !compiled.routes[compiled.main.front()].steps.empty();
+    return isOne ? dictionary_.find(compiled.routes[compiled.main.front()].steps.back().only) : nullptr;
   }
 
   void nameColumns()
@@ -176,7 +198,8 @@ private:
     if (std::none_of(columns_.begin(), columns_.end(), [](const OutColumn& column) { return column.isCounter; }))
     {
       throw Failure("table: --rate: no column is a counter",
-                    "--counter NAME says that a column is one; those whose names end in _total are");
+                    "--counter NAME says that a column is one; those whose names end in _total are, and what a "
+                    "dictionary file calls one");
     }
   }
 
@@ -198,18 +221,26 @@ private:
       report(error.problem());
       return kTrouble;
     }
-    return readStream(name, *stream, writer);
+    try
+    {
+      return readStream(name, *stream, queryFor(stream->bytes().dictionary()), writer);
+    }
+    catch (const Error& error) // the names of own elements are those of this file
+    {
+      report(error.problem());
+      return kFindings;
+    }
   }
 
-  Status readStream(const std::string& name, Stream& stream, RowWriter& writer)
+  Status readStream(const std::string& name, Stream& stream, const TableQuery& query, RowWriter& writer)
   {
     DamageNotices notices(stream);
-    TableReader reader(stream.bytes(), stream.form(), query_,
+    TableReader reader(stream.bytes(), stream.form(), query,
                        {.onDamage = onDamage_, .passedOver = [&](const PassedOver& passed) { notices.add(passed); }});
     try
     {
       Progress progress("table " + stream.source->name(), stream.bytes());
-      writeRows(name, reader, writer);
+      writeRows(name, query, reader, writer);
     }
     catch (const Error& error)
     {
@@ -226,7 +257,7 @@ private:
     return kFindings;
   }
 
-  void writeRows(const std::string& name, TableReader& reader, RowWriter& writer)
+  void writeRows(const std::string& name, const TableQuery& query, TableReader& reader, RowWriter& writer)
   {
     constexpr uint64_t batch = 4096;
     OutRow row(columns_.size());
@@ -239,11 +270,11 @@ private:
     {
       row[first++] = {.own = label.text, .isOwn = true, .isText = true};
     }
-    for (Table rows(query_); reader.next(rows, batch); rows = Table(query_))
+    for (Table rows(query); reader.next(rows, batch); rows = Table(query))
     {
       for (uint64_t i = 0; i < rows.rows(); ++i)
       {
-        for (size_t column = 0; column < query_.columns().size(); ++column)
+        for (size_t column = 0; column < query.columns().size(); ++column)
         {
           row[first + column] = {.cell = rows.cell(column, i)};
         }
@@ -256,7 +287,8 @@ private:
 
   const Invocation& invocation_;
   std::vector<NamedText> labels_;
-  TableQuery query_;
+  Dictionary dictionary_; ///< of the first file
+  TableQuery query_;      ///< with its names
   OnDamage onDamage_;
   std::vector<OutColumn> columns_{};
   std::optional<Rates> rates_{};
@@ -284,7 +316,8 @@ const Registration registration{{
         "missing, and numbers of 128 bits as texts.\n\n"
         "--rate puts in place of a counter's value what it rose by in a second since the row before, by the first\n"
         "time in the rows, from file to file. The first cell is empty, and so is one where the counter went down,\n"
-        "which begins it anew. Counters are columns whose names end in _total, and those that --counter names.\n\n"
+        "which begins it anew. Counters are columns whose names end in _total, those that --counter\n"
+        "names, and own elements that a dictionary file calls counters.\n\n"
         "--format openmetrics makes a page of metrics of one snapshot: numbers are samples, gauges or counters, and\n"
         "the texts of a row its labels, which no two rows may share.\n\n"
         "At damage a file ends with its rows so far, those whose nodes had ended; --on-damage skip goes on behind it.\n"

@@ -13,6 +13,7 @@
 
 #include "tav/inspect/api.hpp"
 #include "tav/inspect/damageWatch.hpp"
+#include "tav/inspect/dictionary.hpp"
 #include "tav/inspect/document.hpp"
 #include "tav/inspect/problem.hpp"
 #include "tav/inspect/source.hpp"
@@ -36,9 +37,10 @@ public:
   /// `joiner`: what stands between the values where a column's path leads to several, which makes the column text;
   /// without it the first value is taken. Paths that begin with no slash begin, that of the rows, at the roots, those
   /// of the columns at the row's node. A group that a column's path leads to has no value and is passed over.
+  /// `dictionary`: names of own elements in paths.
   /// @throws Error as pathOf
   TAV_INSPECT_API TableQuery(std::string_view each, std::vector<TableColumn> columns,
-                             std::optional<std::string> joiner = {});
+                             std::optional<std::string> joiner = {}, const Dictionary& dictionary = {});
 
   TAV_INSPECT_API const std::vector<TableColumn>& columns() const noexcept;
 

@@ -42,6 +42,19 @@ class OwnNames(Folder):
         only = self.out("tree", self.stream, "--only", "job_owner").splitlines()
         self.assertEqual([line.split()[2] for line in only], ["/system/jobs/job_owner", "/system/jobs[2]/job_owner"])
 
+    def test_tables_take_them_and_know_what_counts(self):
+        self.assertEqual(self.out("table", self.stream, "--each", "//jobs", "--col", "job_owner"),
+                         "job_owner\nx\ny\n")
+        names = {**NAMES, "40001": {**NAMES["40001"], "kind": "counter", "unit": "jobs"}}
+        self.names.write_text(json.dumps(names))
+        page = self.out("table", self.stream, "--each", "/system", "--col", "waiting_jobs=queueDepth",
+                        "--format", "openmetrics")
+        self.assertEqual(page.splitlines(), ["# TYPE waiting_jobs counter", "# UNIT waiting_jobs jobs",
+                                             "# HELP waiting_jobs waiting jobs", "waiting_jobs_total 7", "# EOF"])
+        result = tav("table", self.stream, "--each", "//jobs", "--col", "job_owner")
+        self.assertEqual((result.status, result.out), (1, ""))
+        self.assertIn("no element is called 'jobs'", result.err)
+
     def test_paths_lead_to_them(self):
         self.assertEqual(self.out("get", self.stream, "/system[queueDepth > 6]/jobs[job_owner='y']/job_owner"), "y\n")
         self.out("extract", self.stream, "//jobs", "-o", self.folder / "jobs.tav")
