@@ -16,6 +16,7 @@ show() { printf '\n$ %s\n' "$*"; "$@"; }
 # Findings (status 1) are what some of these commands are asked for.
 look() { show "$@" || (($? == 1)); }
 
+names=$PWD/packaging/snapshot-names.json
 PATH=$PWD/build/release/tools:$PWD/build/release/examples:$PATH
 show snapshot "$work/snapshot.tav"
 cd "$work"
@@ -41,6 +42,9 @@ show tav snapshot --append --every 1s --count 10 -o series.tav
 sleep 1
 kill "$watching" # on a terminal Ctrl-C ends it; what a script starts beside itself takes no interrupts
 wait "$watching" || true
-show tav get series.tav --all /system/timestamp /system/host/cpu/cpuTotalUsage
+export TAV_DICTIONARY=$names
+printf '\n$ export TAV_DICTIONARY=snapshot-names.json # what the snapshots have beside the built-in elements\n'
+show tav table series.tav --each /system --col time=timestamp --col usage=host/cpu/cpuTotalUsage \
+  --col load=host/systemLoad/loadAverage1 --col switches=host/systemLoad/contextSwitches --rate
 show tav schema series.tav
 show tav check series.tav
