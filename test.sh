@@ -13,15 +13,24 @@ passed=0
 failed=0
 skipped=0
 
+# processor_seconds: what the processes that have ended took so far, which another load on the machine does not change.
+processor_seconds()
+{
+  awk 'NR == 2 { gsub(/[ms]/, " "); print int($1 * 60 + $2 + $3 * 60 + $4) }' "$work/times"
+}
+
 # stage TITLE COMMAND...: runs the command under a header and prints how long it took.
 stage()
 {
-  local title=$1 start=$SECONDS
+  local title=$1 start=$SECONDS busy
   shift
   [[ $title =~ ${TAV_STAGES:-.} ]] || return 0
   printf '\n== %s\n' "$title"
+  times >"$work/times"
+  busy=$(processor_seconds)
   "$@"
-  printf '== %s: %d s\n' "$title" $((SECONDS - start))
+  times >"$work/times"
+  printf '== %s: %d s, %d s of the processors\n' "$title" $((SECONDS - start)) $(($(processor_seconds) - busy))
 }
 
 totals()

@@ -26,7 +26,7 @@ constexpr char kNames[] =
     ;
 
 /// Where they begin, and where the last one ends.
-constexpr auto kStarts = [] {
+constexpr auto kStarts = []() {
   constexpr size_t lengths[] = {
 #define TAV_ELEMENT(id, constant, enumName, tagName) sizeof(enumName),
 #define TAV_ELEMENT_PLACEHOLDER(id) sizeof "INVALID_ELEMENT",

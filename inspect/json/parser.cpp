@@ -17,7 +17,7 @@ bool isDigit(int c)
 }
 
 /// Characters of a string that stand for themselves.
-constexpr auto kPlain = [] {
+constexpr auto kPlain = []() {
   std::array<bool, 256> table{};
   for (size_t byte = 0x20; byte < table.size(); ++byte)
   {

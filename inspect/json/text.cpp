@@ -119,7 +119,7 @@ bool scanZone(Scanner& scan, int& minutesEast)
 
 void appendJsonString(std::string& out, std::string_view text)
 {
-  static constexpr auto plain = [] {
+  static constexpr auto plain = []() {
     std::array<bool, 256> table{};
     for (size_t byte = 0x20; byte < table.size(); ++byte)
     {
@@ -182,7 +182,7 @@ std::optional<uint16_t> jsonTypeOf(std::string_view name)
     std::string plain;
     uint16_t type;
   };
-  static const std::vector<Name> names = [] {
+  static const std::vector<Name> names = []() {
     std::vector<Name> made;
     for (const uint16_t type : kTypesWithNames)
     {

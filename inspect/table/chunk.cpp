@@ -97,7 +97,8 @@ void TableChunk::putWide(Column& to, uint64_t row, CellKind kind, const RawCell&
 void TableChunk::putTime(Column& to, uint64_t row, const RawCell& value)
 {
   TAVTimeStamp stamp{};
-  static_cast<void>(detail::decode(detail::RawValue{value.type, value.bytes, value.size, value.swap}, stamp));
+  const detail::RawValue raw{value.type, value.bytes, value.size, value.swap};
+  static_cast<void>(detail::decode(raw, stamp));
   if (stamp.seconds > kLastSecond) [[unlikely]]
   {
     stamp.offsetMinutes = 0;
@@ -107,8 +108,9 @@ void TableChunk::putTime(Column& to, uint64_t row, const RawCell& value)
     return;
   }
   to.kinds[row] = static_cast<uint8_t>(CellKind::time);
-  to.cells[row] =
-      stamp.seconds * kNanoseconds + uint64_t{stamp.fractionA} * 1'000'000 + uint64_t{stamp.fractionB} * 1000;
+  const uint64_t milliseconds = stamp.fractionA;
+  const uint64_t microseconds = stamp.fractionB;
+  to.cells[row] = stamp.seconds * kNanoseconds + milliseconds * 1'000'000 + microseconds * 1000;
 }
 
 void TableChunk::setOther(Column& to, uint64_t row, const RawCell& value)

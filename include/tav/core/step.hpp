@@ -206,6 +206,7 @@ struct RingLevel
 {
   using Spot = uint64_t;
 
+  // cppcheck-suppress passedByValue ; a number
   [[gnu::always_inline]] bool find(Spot spot, Place& place) const
   {
     return spot < end && bytes.find(spot, kHeaderSize64, place);
