@@ -106,8 +106,7 @@ check_kaitai()
 
 check_documents()
 {
-  mkdir -p build
-  doxygen docs/Doxyfile
+  docs/site/build.sh
   tests/system/docs/check_links.py .
 }
 
@@ -349,7 +348,7 @@ case ${1:-} in
     stage "g++" build_and_test release
     ;;
   --full)
-    stage "packages" cmake/install-packages.sh build test full platforms python
+    stage "packages" cmake/install-packages.sh build test full platforms python site
     # The same sources are compiled again and again, at every place where the project is checked out.
     export CMAKE_CXX_COMPILER_LAUNCHER=ccache CCACHE_BASEDIR=$PWD CCACHE_NOHASHDIR=1
     export CCACHE_SLOPPINESS=pch_defines,time_macros,include_file_mtime,include_file_ctime

@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # Installs the Debian packages of the named groups that are missing. This is the one list of them.
 #   cmake/install-packages.sh GROUP...        groups: build, test, full, platforms, bench, coverage, kaitai,
-#                                            python
+#                                            python, site
 set -euo pipefail
 
 declare -A groups=(
@@ -11,6 +11,7 @@ declare -A groups=(
   [full]="clang clang-format clang-tidy cppcheck libclang-rt-dev ccache doxygen lintian dpkg-dev gzip abigail-tools valgrind"
   [kaitai]="nodejs npm"
   [python]="g++ cmake ninja-build nlohmann-json3-dev python3-dev python3-pytest python3-hypothesis python3-numpy python3-pandas mypy"
+  [site]="doxygen python3-sphinx python3-myst-parser furo"
   [coverage]="gcovr qemu-user-static"
   [platforms]="clang libc++-dev libc++abi-dev googletest ccache qemu-user-static g++-s390x-linux-gnu g++-mingw-w64-x86-64-posix wine64 wine"
 )
