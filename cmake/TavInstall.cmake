@@ -20,7 +20,7 @@ install(TARGETS tav_inspect
 install(DIRECTORY include/tav
   DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}
   COMPONENT development
-  FILES_MATCHING PATTERN "*.h" PATTERN "*.hpp" PATTERN "*.def")
+  FILES_MATCHING PATTERN "*.h" PATTERN "*.hpp" PATTERN "*.cppm" PATTERN "*.def")
 
 set(packageDir "${CMAKE_INSTALL_LIBDIR}/cmake/tav")
 install(EXPORT tavTargets NAMESPACE tav:: DESTINATION ${packageDir} COMPONENT development)
