@@ -1,0 +1,42 @@
+#!/usr/bin/env bash
+# Builds what a release consists of: the Debian packages and the site, and the faces whose folders are there.
+#   packaging/build.sh FOLDER [PART...]        FOLDER: where they go; parts: packages site python page sql; all unless named
+# The same tree gives the same bytes wherever and whenever it is built: SOURCE_DATE_EPOCH is the time in them, that of the
+# last change in CHANGELOG.md unless it is set.
+set -euo pipefail
+cd "$(dirname "${BASH_SOURCE[0]}")/.."
+umask 022
+export LC_ALL=C TZ=UTC
+
+(($# >= 1)) || { echo "usage: $0 FOLDER [PART...]" >&2; exit 2; }
+mkdir -p "$1"
+out=$(cd "$1" && pwd)
+shift
+parts=("$@")
+((${#parts[@]} > 0)) || parts=(packages site python page sql)
+: "${SOURCE_DATE_EPOCH:=$(date -d "$(grep -m 1 -oE '[0-9]{4}-[0-9]{2}-[0-9]{2}' CHANGELOG.md || echo 2026-11-22)" +%s)}"
+export SOURCE_DATE_EPOCH
+
+work=$(mktemp -d)
+trap 'rm -rf "$work"' EXIT
+quietly() { "$@" >"$work/log" 2>&1 || { cat "$work/log" >&2; return 1; }; }
+
+build_packages()
+{
+  cmake/install-packages.sh build
+  quietly cmake --preset package
+  quietly cmake --build --preset package --parallel "$(nproc)"
+  quietly cpack --config build/package/CPackConfig.cmake -B "$work/packages"
+  find "$work/packages" -maxdepth 1 -name '*.deb' -exec cp {} "$out/" \;
+}
+
+build_site()
+{
+  quietly docs/site/build.sh "$work/site"
+  tar -C "$work" --sort=name --mtime="@$SOURCE_DATE_EPOCH" --owner=0 --group=0 --numeric-owner -cf - site |
+    gzip -9n >"$out/tav-site-$(cmake/version.sh).tar.gz"
+}
+
+for part in "${parts[@]}"; do
+  "build_$part"
+done

@@ -1,0 +1,94 @@
+"""A release is refused where it could not be made again, and what it is made of is told."""
+
+import json
+import os
+import pathlib
+import shutil
+import subprocess
+import tempfile
+import unittest
+
+ROOT = pathlib.Path(__file__).resolve().parents[3]
+NAMED = {"GIT_AUTHOR_NAME": "a", "GIT_AUTHOR_EMAIL": "a@b", "GIT_COMMITTER_NAME": "a", "GIT_COMMITTER_EMAIL": "a@b"}
+
+
+def run(folder, *command):
+    return subprocess.run(command, cwd=folder, capture_output=True, text=True, timeout=120, env={**os.environ, **NAMED})
+
+
+@unittest.skipUnless(shutil.which("git"), "a history needs git")
+class Refusals(unittest.TestCase):
+    """On a copy of the tree's scripts, with a history of its own."""
+
+    def setUp(self):
+        self.folder = tempfile.TemporaryDirectory()
+        self.addCleanup(self.folder.cleanup)
+        self.tree = pathlib.Path(self.folder.name) / "tree"
+        for name in ("packaging", "cmake"):
+            run(ROOT, "mkdir", "-p", self.tree)
+            self.assertEqual(run(ROOT, "cp", "-r", name, self.tree / name).returncode, 0)
+        (self.tree / "CMakeLists.txt").write_text((ROOT / "CMakeLists.txt").read_text())
+        self.version = run(self.tree, "cmake/version.sh").stdout.strip()
+        self.assertRegex(self.version, r"^\d+\.\d+\.\d+$")
+        (self.tree / "CHANGELOG.md").write_text(f"# Changelog\n\n## [{self.version}] - 2026-01-02\n")
+        for command in (["init", "-q"], ["add", "-A"], ["commit", "-qm", "all"]):
+            self.assertEqual(run(self.tree, "git", *command).returncode, 0)
+
+    def refused(self, why, *arguments):
+        out = self.tree.parent / "out"
+        found = run(self.tree, "packaging/release.sh", out, *arguments)
+        self.assertEqual(found.returncode, 1, found.stderr[-400:])
+        self.assertIn(why, found.stderr)
+        self.assertFalse(out.exists())
+
+    def commit(self):
+        self.assertEqual(run(self.tree, "git", "commit", "-qam", "more").returncode, 0)
+
+    def test_a_tree_with_changes(self):
+        (self.tree / "new").write_text("")
+        self.refused("changes that are in no commit")
+
+    def test_a_changelog_without_the_version(self):
+        (self.tree / "CHANGELOG.md").write_text("# Changelog\n\n## [Unreleased]\n")
+        self.commit()
+        self.refused("no dated section")
+
+    def test_versions_that_differ(self):
+        place = self.tree / "packaging" / "vcpkg" / "vcpkg.json"
+        place.write_text(place.read_text().replace(self.version, "9.9.9"))
+        self.commit()
+        self.refused("the version is not the same everywhere")
+
+    def test_a_missing_key(self):
+        self.refused("there is no key", "/nowhere/key")
+
+    def test_a_folder_that_is_there(self):
+        found = run(self.tree, "packaging/release.sh", self.tree)
+        self.assertEqual(found.returncode, 1)
+        self.assertIn("exists already", found.stderr)
+
+
+class Contents(unittest.TestCase):
+    def test_an_artefact_is_told_with_its_digest_and_its_parts(self):
+        with tempfile.TemporaryDirectory() as name:
+            folder = pathlib.Path(name)
+            (folder / "tav-1.2.3.tar.gz").write_bytes(b"abc")
+            found = subprocess.run([ROOT / "packaging" / "sbom.py", "1.2.3", folder], capture_output=True, text=True)
+            self.assertEqual(found.returncode, 0, found.stderr)
+            told = json.loads((folder / "tav-1.2.3.tar.gz.spdx.json").read_text())
+        self.assertEqual(told["spdxVersion"], "SPDX-2.3")
+        self.assertEqual(told["packages"][0]["checksums"][0]["checksumValue"],
+                         "ba7816bf8f01cfea414140de5dae2223b00361a396177a9cb410ff61f20015ad")
+        identities = {package["SPDXID"] for package in told["packages"]} | {"SPDXRef-DOCUMENT"}
+        for relation in told["relationships"]:
+            self.assertIn(relation["spdxElementId"], identities)
+            self.assertIn(relation["relatedSpdxElement"], identities)
+
+    def test_nothing_to_tell_of_is_a_failure(self):
+        with tempfile.TemporaryDirectory() as name:
+            found = subprocess.run([ROOT / "packaging" / "sbom.py", "1.2.3", name], capture_output=True, text=True)
+            self.assertEqual(found.returncode, 1)
+
+
+if __name__ == "__main__":
+    unittest.main()
