@@ -5,7 +5,7 @@
 #   ./test.sh --full   what CI runs: the checks of the sources, both compilers, the sanitizers, fuzzing, packages,
 #                      most of s390x and Windows
 #   ./test.sh --face python   the Python package
-#   ./test.sh --platforms   all that is tested of libc++, s390x under qemu, Windows under wine
+#   ./test.sh --platforms   all that is tested of libc++, s390x and aarch64 under qemu, Windows under wine
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")"
 
@@ -303,6 +303,11 @@ check_s390x()
   check_platform s390x tests "" "qemu-s390x-static -L /usr/s390x-linux-gnu" "$@"
 }
 
+check_aarch64()
+{
+  check_platform aarch64 tests "" "qemu-aarch64-static -L /usr/aarch64-linux-gnu" "$@"
+}
+
 check_windows()
 {
   check_platform windows bin .exe "$PWD/cmake/run-windows.sh" "$@"
@@ -312,6 +317,7 @@ platforms()
 {
   stage "libc++" check_libcxx "${rooms[@]}"
   stage "s390x, big-endian" check_s390x "${rooms[@]}"
+  stage "aarch64" check_aarch64 "${rooms[@]}"
   stage "Windows" check_windows "${rooms[@]}"
 }
 

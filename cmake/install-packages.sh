@@ -13,7 +13,7 @@ declare -A groups=(
   [python]="g++ cmake ninja-build nlohmann-json3-dev python3-dev python3-pytest python3-hypothesis python3-numpy python3-pandas mypy"
   [site]="doxygen python3-sphinx python3-myst-parser furo"
   [coverage]="gcovr qemu-user-static"
-  [platforms]="clang libc++-dev libc++abi-dev googletest ccache qemu-user-static g++-s390x-linux-gnu g++-mingw-w64-x86-64-posix wine64 wine"
+  [platforms]="clang libc++-dev libc++abi-dev googletest ccache qemu-user-static g++-s390x-linux-gnu g++-aarch64-linux-gnu g++-mingw-w64-x86-64-posix wine64 wine"
 )
 
 if (($# == 0)); then

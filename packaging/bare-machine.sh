@@ -1,0 +1,75 @@
+#!/usr/bin/env bash
+# The packages on a Debian that has nothing: a root made by debootstrap, `apt install` of what packaging/build.sh made,
+# and the first page of each face's documents in it. With --source also the README's two commands, which begin without a
+# compiler. Takes minutes and half a gigabyte; needs root. Debian's packages come from where this machine has its own from.
+#   packaging/bare-machine.sh PACKAGES_FOLDER [--source]
+set -euo pipefail
+cd "$(dirname "${BASH_SOURCE[0]}")/.."
+
+(($# >= 1)) || { echo "usage: $0 PACKAGES_FOLDER [--source]" >&2; exit 2; }
+packages=$(cd "$1" && pwd)
+((EUID == 0)) || { echo "$0: run as root" >&2; exit 1; }
+command -v debootstrap >/dev/null || { apt-get update -qq && apt-get install -y -qq --no-install-recommends debootstrap; } >/dev/null
+
+release=$(. /etc/os-release && echo "$VERSION_CODENAME")
+mirror=$(apt-get indextargets --format '$(REPO_URI)' "Created-By: Packages" "Codename: $release" | head -n 1)
+[[ -n $mirror ]] || mirror=http://deb.debian.org/debian
+work=$(mktemp -d)
+root=$work/root
+cleanup()
+{
+  umount -l "$root/proc" "$root/dev" 2>/dev/null || true
+  rm -rf --one-file-system "$work"
+}
+trap cleanup EXIT
+
+echo "== a root with nothing in it"
+debootstrap --variant=minbase "$release" "$root" "$mirror" >"$work/log" 2>&1 || { tail -n 30 "$work/log"; exit 1; }
+mount -t proc proc "$root/proc"
+mount --rbind /dev "$root/dev"
+for setting in /etc/apt/sources.list /etc/apt/sources.list.d /etc/apt/apt.conf.d /etc/apt/trusted.gpg.d /etc/resolv.conf /etc/hosts /usr/share/keyrings; do
+  if [[ -e $setting ]]; then cp -rL "$setting" "$root$(dirname "$setting")/"; fi
+done
+inside() { chroot "$root" /usr/bin/env -i PATH=/usr/sbin:/usr/bin:/sbin:/bin HOME=/root LC_ALL=C.UTF-8 DEBIAN_FRONTEND=noninteractive "$@"; }
+quietly() { "$@" >"$work/log" 2>&1 || { tail -n 40 "$work/log"; exit 1; }; }
+quietly inside apt-get update
+if inside sh -c 'command -v c++ cc python3'; then echo "the root is not bare"; exit 1; fi
+
+echo "== apt install"
+mkdir "$root/packages"
+cp "$packages"/*.deb "$root/packages/"
+quietly inside sh -c 'apt-get install -y --no-install-recommends /packages/*.deb'
+
+echo "== the program"
+inside tav snapshot -o /root/day.tav
+inside tav check /root/day.tav
+inside tav get /root/day.tav /system/host/hostName
+inside sh -c 'tav json /root/day.tav | tav build - -o /root/again.tav && tav diff /root/day.tav /root/again.tav'
+
+if compgen -G "$packages/python3-tav_*.deb" >/dev/null; then
+  echo "== Python"
+  inside python3 -c 'import tav; print(tav.open("/root/day.tav").find("/system/host/hostName").value, len(tav.check("/root/day.tav")))'
+fi
+
+echo "== C and C++"
+quietly inside apt-get install -y --no-install-recommends g++ pkg-config libc6-dev
+mkdir "$root/programs"
+cp tests/system/install/outside/*.c* examples/layer_tour.cpp "$root/programs/"
+for program in main:tav inspect:tav-inspect kor:kor; do
+  inside sh -c "g++ -std=c++20 /programs/${program%%:*}.cpp -o /programs/p \$(pkg-config --cflags --libs ${program##*:}) && /programs/p"
+done
+inside sh -c 'gcc -std=c99 -Wpedantic -Werror /programs/c.c -o /programs/p $(pkg-config --cflags --libs tav-inspect) && /programs/p'
+
+echo "== apt remove"
+quietly inside sh -c 'apt-get purge -y $(dpkg-query -W -f "\${Package}\n" | grep -E "^(lib)?tav|^python3-tav")'
+left=$(find "$root/usr" "$root/etc" -name '*tav*' -not -path '*/apt/*' | grep -vE '/(share/perl|octave)' || true)
+[[ -z $left ]] || { echo "left behind: $left"; exit 1; }
+
+if [[ ${2:-} == --source ]]; then
+  echo "== the two commands of the README"
+  mkdir "$root/source"
+  git archive HEAD | tar -x -C "$root/source"
+  quietly inside apt-get purge -y g++ g++-12 gcc gcc-12 cpp
+  inside sh -c 'cd /source && ./demo.sh && ./test.sh'
+fi
+echo "the packages install, run and go on a bare machine"
