@@ -11,7 +11,7 @@ declare -A groups=(
   [full]="clang clang-19 clang-format clang-tidy cppcheck libclang-rt-dev ccache doxygen lintian dpkg-dev gzip abigail-tools valgrind"
   [kaitai]="nodejs npm"
   [python]="g++ cmake ninja-build nlohmann-json3-dev python3-dev python3-pytest python3-hypothesis python3-numpy python3-pandas mypy"
-  [site]="doxygen python3-sphinx python3-myst-parser furo"
+  [site]="python3-rich doxygen python3-sphinx python3-myst-parser furo"
   [coverage]="gcovr qemu-user-static"
   [platforms]="clang libc++-dev libc++abi-dev googletest ccache qemu-user-static g++-s390x-linux-gnu g++-aarch64-linux-gnu g++-mingw-w64-x86-64-posix wine64 wine"
 )

@@ -62,7 +62,7 @@ def main():
     (folder / "docs" / "reference.md").write_text(REFERENCE, encoding="utf-8")
     index = folder / "index.md"
     text = index.read_text(encoding="utf-8")
-    table = text[text.index("## Documents"):]
+    table = text[text.index("## Where to go"):text.index("## Limits")]
     told = list(dict.fromkeys(re.findall(r"\]\((docs/[a-z0-9_-]+\.md)\)", table)))
     rest = sorted({str(page) for page in pages} - set(told))
     text += contents("Documents", told) + contents("More", ["docs/reference", *rest, *ABOUT])
