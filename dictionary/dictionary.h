@@ -2,15 +2,12 @@
 /// The element dictionary: two names for an element id. Constant data, so any thread may look up at any time.
 #pragma once
 
-#include <array>
 #include <cstddef>
 #include <cstdint>
-#include <string_view>
 
 /// One element in a 64-bit slot of which only the 16 bits of the id are compared; the others say where its two strings
 /// begin among those of the dictionary. Pointers in their place would cost 115 KB of relocations in the library, which
-/// every process that loads it would have to apply. Where both places are one, the string is the tag name and the enum
-/// name follows from it: so do five of six, and another 55 KB need not be stored.
+/// every process that loads it would have to apply.
 struct TAVElementEntry
 {
   uint64_t id : 16;
@@ -38,30 +35,6 @@ inline constexpr size_t kElementRangeCount = 10;
 /// Both names of an id without an entry.
 inline constexpr const char* kUnknownElement = "Unknown Element";
 
-/// An enum name. It holds its characters itself: most are put together from the tag name and stand nowhere else.
-class EnumName
-{
-public:
-  /// Room for the longest and its NUL; that it is enough is checked where the table is made.
-  static constexpr size_t kRoom = 96;
-
-  explicit EnumName(std::string_view text);
-
-  /// The enum name that follows from a tag name.
-  static EnumName fromTag(const char* tagName);
-
-  /// Valid as long as this is.
-  // NOLINTNEXTLINE(google-explicit-constructor): a name is a text, wherever one is wanted
-  operator std::string_view() const { return {text_.data(), length_}; }
-  const char* c_str() const { return text_.data(); }
-
-private:
-  EnumName() = default;
-
-  std::array<char, kRoom> text_;
-  size_t length_ = 0;
-};
-
 /// The directory: kElementRangeCount ranges, then an all-zero record.
 const TAVElementRange* elementDirectory();
 
@@ -73,14 +46,14 @@ const TAVElementEntry* findInRange(const TAVElementRange& range, uint16_t id);
 /// The entry of an id, or null when no range has one. Cost: at most five comparisons and an index.
 const TAVElementEntry* findElement(uint16_t id);
 
-/// The enum name of an entry of the directory.
-EnumName enumNameOf(const TAVElementEntry& entry);
+/// The enum name of an entry of the directory. The string lives for ever.
+const char* enumNameOf(const TAVElementEntry& entry);
 
 /// The tag name of an entry of the directory. The string lives for ever.
 const char* tagNameOf(const TAVElementEntry& entry);
 
-/// The enum name of an id, kUnknownElement when it has no entry.
-EnumName elementEnumName(uint16_t id);
+/// The enum name of an id, kUnknownElement when it has no entry. The string lives for ever.
+const char* elementEnumName(uint16_t id);
 
 /// The tag name of an id, kUnknownElement when it has no entry. The string lives for ever.
 const char* elementTagName(uint16_t id);

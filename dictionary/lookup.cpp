@@ -106,10 +106,10 @@ const TAVElementEntry* findElement(uint16_t id)
   return findInRange(elementDirectory()[rangeFor(id)], id);
 }
 
-EnumName elementEnumName(uint16_t id)
+const char* elementEnumName(uint16_t id)
 {
   const TAVElementEntry* entry = findElement(id);
-  return entry != nullptr ? enumNameOf(*entry) : EnumName(kUnknownElement);
+  return entry != nullptr ? enumNameOf(*entry) : kUnknownElement;
 }
 
 const char* elementTagName(uint16_t id)

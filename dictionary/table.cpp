@@ -1,9 +1,7 @@
 /// @file table.cpp
 /// The entries and the range directory, made from elements.def at compile time.
 #include "dictionary/dictionary.h"
-#include "dictionary/namingRule.h"
 
-#include <algorithm>
 #include <array>
 #include <iterator>
 #include <string_view>
@@ -32,24 +30,12 @@ constexpr std::string_view kPlaceholderTagName = "invalid_element";
 
 constexpr size_t kEntryCount = std::size(kListed);
 
-/// Which enum names follow from the tag names. A constant of its own, as are the next two: a compiler takes only so
-/// many steps to find the value of one.
-constexpr std::array<bool, kEntryCount> kFollows = [] {
-  std::array<bool, kEntryCount> follows{};
-  for (size_t i = 0; i < kEntryCount; ++i)
-  {
-    follows[i] = followsFromTag(kListed[i].enumName, kListed[i].tagName);
-  }
-  return follows;
-}();
-
+/// A constant of its own: a compiler takes only so many steps to find the value of one.
 constexpr size_t kStringBytes = [] {
   size_t bytes = kPlaceholderEnumName.size() + kPlaceholderTagName.size() + 2;
-  for (size_t i = 0; i < kEntryCount; ++i)
+  for (const Listed& element : kListed)
   {
-    const Listed& element = kListed[i];
-    bytes += element.tagName.empty() ? 0 : element.tagName.size() + 1;
-    bytes += element.tagName.empty() || kFollows[i] ? 0 : element.enumName.size() + 1;
+    bytes += element.tagName.empty() ? 0 : element.enumName.size() + element.tagName.size() + 2;
   }
   return bytes;
 }();
@@ -82,9 +68,8 @@ constexpr Table makeTable()
   {
     const Listed& element = kListed[i];
     const bool placeholder = element.tagName.empty();
+    const size_t enumName = placeholder ? placeholderEnumName : table.add(element.enumName);
     const size_t tagName = placeholder ? placeholderTagName : table.add(element.tagName);
-    const size_t enumName = placeholder ? placeholderEnumName : kFollows[i] ? tagName
-                                                                            : table.add(element.enumName);
     table.entries[i].id = element.id;
     table.entries[i].enumNamePlace = enumName & 0xFFFFFF;
     table.entries[i].tagNamePlace = tagName & 0xFFFFFF;
@@ -95,8 +80,6 @@ constexpr Table makeTable()
 constexpr Table kTable = makeTable();
 
 static_assert(kTable.used == kStringBytes && kStringBytes <= 0xFFFFFF);
-static_assert(std::all_of(std::begin(kListed), std::end(kListed),
-                          [](const Listed& element) { return element.enumName.size() < EnumName::kRoom; }));
 
 struct Bounds
 {
@@ -152,10 +135,9 @@ const TAVElementRange* elementDirectory()
   return kDirectory.data();
 }
 
-EnumName enumNameOf(const TAVElementEntry& entry)
+const char* enumNameOf(const TAVElementEntry& entry)
 {
-  const char* const text = kTable.strings.data() + entry.enumNamePlace;
-  return entry.enumNamePlace == entry.tagNamePlace ? EnumName::fromTag(text) : EnumName(text);
+  return kTable.strings.data() + entry.enumNamePlace;
 }
 
 const char* tagNameOf(const TAVElementEntry& entry)

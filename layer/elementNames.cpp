@@ -4,6 +4,7 @@
 #include <array>
 #include <cstddef>
 #include <iterator>
+#include <span>
 #include <string>
 
 #include "dictionary/dictionary.h"
@@ -17,33 +18,7 @@ namespace tav::detail
 namespace
 {
 
-/// The enum names, one behind another: the library's table puts most of them together when they are printed, and what
-/// is handed out here lives for ever.
-constexpr char kNames[] =
-#define TAV_ELEMENT(id, constant, enumName, tagName) enumName "\0"
-#define TAV_ELEMENT_PLACEHOLDER(id) "INVALID_ELEMENT\0"
-#include "tav/elements.def"
-    ;
-
-/// Where they begin, and where the last one ends.
-constexpr auto kStarts = []() {
-  constexpr size_t lengths[] = {
-#define TAV_ELEMENT(id, constant, enumName, tagName) sizeof(enumName),
-#define TAV_ELEMENT_PLACEHOLDER(id) sizeof "INVALID_ELEMENT",
-#include "tav/elements.def"
-  };
-  std::array<uint32_t, std::size(lengths) + 1> starts{};
-  for (size_t i = 0; i < std::size(lengths); ++i)
-  {
-    starts[i + 1] = static_cast<uint32_t>(starts[i] + lengths[i]);
-  }
-  return starts;
-}();
-
-std::string_view nameAt(size_t place) noexcept
-{
-  return {kNames + kStarts[place], kStarts[place + 1] - kStarts[place] - 1};
-}
+constexpr std::string_view kPlaceholder = "INVALID_ELEMENT";
 
 /// The constant of an element is its enum name without the blanks that a few of these have around them, and without the
 /// remark that one has behind it.
@@ -57,13 +32,11 @@ std::string_view constantOf(std::string_view enumName) noexcept
 template<class Visit>
 void forEachElement(Visit visit)
 {
-  size_t place = 0;
   for (const TAVElementRange* range = inside::elementDirectory(); range->count != 0; ++range)
   {
-    for (uint64_t i = 0; i < range->count; ++i, ++place)
+    for (const TAVElementEntry& entry : std::span(range->pEntries, range->count))
     {
-      const TAVElementEntry& entry = range->pEntries[i];
-      if (const std::string_view name = nameAt(place); name != "INVALID_ELEMENT")
+      if (const std::string_view name = inside::enumNameOf(entry); name != kPlaceholder)
       {
         visit(static_cast<uint16_t>(entry.id), name, std::string_view(inside::tagNameOf(entry)));
       }
@@ -81,8 +54,8 @@ std::string_view elementTag(uint16_t id) noexcept
 
 std::string_view elementName(uint16_t id) noexcept
 {
-  const size_t place = dictionary::detail::placeOf(id);
-  return place + 1 < kStarts.size() ? nameAt(place) : std::string_view();
+  const TAVElementEntry* const entry = inside::findElement(id);
+  return entry != nullptr ? std::string_view(inside::enumNameOf(*entry)) : std::string_view();
 }
 
 std::vector<uint16_t> idsNamed(std::string_view name, dictionary::OwnNames own)

@@ -29,7 +29,7 @@ TEST_P(IdWithoutEntry, IsAnUnknownElementInBothLookups)
   for (uint32_t id = GetParam().first; id <= GetParam().last; ++id)
   {
     const auto wanted = static_cast<uint16_t>(id);
-    ASSERT_THAT(elementEnumName(wanted).c_str(), StrEq("Unknown Element")) << id;
+    ASSERT_THAT(elementEnumName(wanted), StrEq("Unknown Element")) << id;
     ASSERT_THAT(elementTagName(wanted), StrEq("Unknown Element")) << id;
     ASSERT_EQ(findElement(wanted), nullptr) << id;
   }
@@ -68,8 +68,8 @@ TEST(ElementLookup, AgreesWithTheListForAllIds)
   {
     const auto wanted = static_cast<uint16_t>(id);
     const ListedElement* listed = firstListed(wanted);
-    const EnumName name = elementEnumName(wanted);
-    ASSERT_EQ(std::string_view(name), listed != nullptr ? listed->enumName : "Unknown Element") << id;
+    const std::string_view name = elementEnumName(wanted);
+    ASSERT_EQ(name, listed != nullptr ? listed->enumName : "Unknown Element") << id;
     ASSERT_EQ(elementTagName(wanted), listed != nullptr ? listed->tagName : "Unknown Element") << id;
   }
 }
@@ -79,14 +79,14 @@ TEST(ElementLookup, FindsTheEntryOfTheId)
   const TAVElementEntry* entry = findElement(60102);
   ASSERT_NE(entry, nullptr);
   EXPECT_EQ(entry->id, 60102U);
-  EXPECT_THAT(enumNameOf(*entry).c_str(), StrEq("TAV_ELM_CMN_HOST"));
+  EXPECT_THAT(enumNameOf(*entry), StrEq("TAV_ELM_CMN_HOST"));
   EXPECT_THAT(tagNameOf(*entry), StrEq("host"));
 }
 
 TEST(ElementLookup, GivesIdTwentyToTheDocumentRoot)
 {
   EXPECT_EQ(findElement(20), elementDirectory()[1].pEntries);
-  EXPECT_THAT(elementEnumName(20).c_str(), StrEq("TAV_ELM_CMN_DOC_ROOT"));
+  EXPECT_THAT(elementEnumName(20), StrEq("TAV_ELM_CMN_DOC_ROOT"));
   EXPECT_THAT(elementTagName(20), StrEq("docRoot"));
 }
 
@@ -94,13 +94,13 @@ TEST(ElementLookup, KeepsASecondEntryForIdTwentyThatItNeverGives)
 {
   const TAVElementEntry& hidden = elementDirectory()[4].pEntries[19];
   EXPECT_EQ(hidden.id, 20U);
-  EXPECT_THAT(enumNameOf(hidden).c_str(), StrEq("SQLM_ELM_COLLECTED"));
+  EXPECT_THAT(enumNameOf(hidden), StrEq("SQLM_ELM_COLLECTED"));
   EXPECT_THAT(tagNameOf(hidden), StrEq("collected"));
 }
 
 TEST(ElementLookup, ShowsThePlaceholderOfAnUnusedId)
 {
-  EXPECT_THAT(elementEnumName(250).c_str(), StrEq("INVALID_ELEMENT"));
+  EXPECT_THAT(elementEnumName(250), StrEq("INVALID_ELEMENT"));
   EXPECT_THAT(elementTagName(250), StrEq("invalid_element"));
 }
 
@@ -112,7 +112,7 @@ TEST(ElementLookup, HasNoEntryJustBelowTheDocumentElements)
 
 TEST(ElementLookup, EndsTheLargestRangeAtItsLastId)
 {
-  EXPECT_THAT(elementEnumName(46280).c_str(), StrEq("SQLM_ELM_DBM_CFG_MEM_FCM_PARALLELISM_INT"));
+  EXPECT_THAT(elementEnumName(46280), StrEq("SQLM_ELM_DBM_CFG_MEM_FCM_PARALLELISM_INT"));
   EXPECT_THAT(elementTagName(46280), StrEq("dbm_cfg_mem_fcm_parallelism_int"));
   EXPECT_THAT(elementTagName(46281), StrEq("Unknown Element"));
 }

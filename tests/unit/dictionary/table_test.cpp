@@ -39,7 +39,7 @@ uint64_t fingerprint(const TAVElementRange& range)
   uint64_t hash = 0xcbf29ce484222325;
   for (const TAVElementEntry& entry : entriesOf(range))
   {
-    const std::string line = std::to_string(entry.id) + '|' + enumNameOf(entry).c_str() + '|' + tagNameOf(entry) + '\n';
+    const std::string line = std::to_string(entry.id) + '|' + enumNameOf(entry) + '|' + tagNameOf(entry) + '\n';
     for (const char character : line)
     {
       hash = (hash ^ static_cast<unsigned char>(character)) * 0x100000001b3;
@@ -102,8 +102,8 @@ TEST_P(DirectoryRange, HoldsConsecutiveIdsToItsLast)
 
 TEST_P(DirectoryRange, BeginsAndEndsWithItsNames)
 {
-  EXPECT_THAT(enumNameOf(entriesOf(range()).front()).c_str(), StrEq(expected().firstName));
-  EXPECT_THAT(enumNameOf(entriesOf(range()).back()).c_str(), StrEq(expected().lastName));
+  EXPECT_THAT(enumNameOf(entriesOf(range()).front()), StrEq(expected().firstName));
+  EXPECT_THAT(enumNameOf(entriesOf(range()).back()), StrEq(expected().lastName));
 }
 
 TEST_P(DirectoryRange, HoldsTheNamesThatItAlwaysHeld)
@@ -127,7 +127,7 @@ class CommonElement : public ::testing::TestWithParam<ExpectedNames>
 
 TEST_P(CommonElement, HasItsTwoNames)
 {
-  EXPECT_THAT(elementEnumName(GetParam().id).c_str(), StrEq(GetParam().enumName));
+  EXPECT_THAT(elementEnumName(GetParam().id), StrEq(GetParam().enumName));
   EXPECT_THAT(elementTagName(GetParam().id), StrEq(GetParam().tagName));
 }
 
@@ -266,8 +266,7 @@ TEST(ElementTable, KeepsTheBlankBeforeTheScanSharingNames)
 
 TEST(ElementTable, KeepsTheBlanksAndTheCommentBehindOneName)
 {
-  const std::string held(elementEnumName(kTrackedNameId));
-  const std::string_view name = held;
+  const std::string_view name = elementEnumName(kTrackedNameId);
   const std::string start = "SQLM_ELM_MAX_PARTITION" + std::string(35, ' ');
   ASSERT_TRUE(name.starts_with(start));
   const std::string_view comment = name.substr(start.size());
@@ -279,8 +278,8 @@ TEST(ElementTable, KeepsTheBlanksAndTheCommentBehindOneName)
 
 TEST(ElementTable, KeepsTwoNamesWithAMisspelledPrefix)
 {
-  EXPECT_THAT(elementEnumName(46145).c_str(), StrEq("SQLM_EML_FMP_EXEC_HIST_ROUTINE_ID"));
-  EXPECT_THAT(elementEnumName(46146).c_str(), StrEq("SQLM_EML_FMP_EXEC_HIST_TIMESTAMP"));
+  EXPECT_THAT(elementEnumName(46145), StrEq("SQLM_EML_FMP_EXEC_HIST_ROUTINE_ID"));
+  EXPECT_THAT(elementEnumName(46146), StrEq("SQLM_EML_FMP_EXEC_HIST_TIMESTAMP"));
 }
 
 TEST(ElementTable, KeepsTheBlankBehindOneTag)
