@@ -30,6 +30,31 @@ struct Asked
   uint64_t* last = nullptr; ///< how many there are, 0: not counted yet
 };
 
+/// What a walk calls at each node or value until it answers false; what it was made of lives longer than it. Walks
+/// that are the same for all callers are compiled once.
+template<class... Arguments>
+class Visitor
+{
+public:
+  template<class Visit>
+  // NOLINTNEXTLINE(google-explicit-constructor): whatever can be called so is one
+  Visitor(const Visit& visit) noexcept
+      : visit_(&visit), call_([](const void* made, Arguments... arguments) -> bool {
+          return (*static_cast<const Visit*>(made))(arguments...);
+        })
+  {
+  }
+
+  bool operator()(Arguments... arguments) const
+  {
+    return call_(visit_, arguments...);
+  }
+
+private:
+  const void* visit_;
+  bool (*call_)(const void*, Arguments...);
+};
+
 /// Answers what the expressions of one path ask.
 template<class Tree>
 class Conditions
@@ -72,6 +97,9 @@ public:
 
 private:
   using Kind = Expression::Kind;
+  using PlaceVisitor = Visitor<const Place&>;
+  using NodeVisitor = Visitor<const Route&, const Place&>;
+  using ValueVisitor = Visitor<const Value&>;
 
   [[nodiscard]] const Expression& expression(uint32_t index) const noexcept
   {
@@ -179,20 +207,24 @@ private:
   }
 
   /// Calls `visit` for every node that the routes lead to until it returns false; whether it never did.
-  template<class Visit>
-  bool visitAll(const Expression& nodes, const At& at, const Visit& visit)
+  bool visitAll(const Expression& nodes, const At& at, const NodeVisitor& visit)
   {
     return std::all_of(nodes.routes.begin(), nodes.routes.end(), [&](uint32_t index) {
       const Route& route = path_.routes[index];
       return visitRoute(route, at, [&](const Place& place) { return visit(route, place); });
     });
   }
-  template<class Visit>
-  bool visitRoute(const Route& route, const At& at, const Visit& visit);
+  bool visitRoute(const Route& route, const At& at, const PlaceVisitor& visit);
+
+  /// What a route asks of the node that it leads to.
+  bool valueOf(const Route& route, const Place& place, Value& value)
+  {
+    return route.attribute != Attribute::none ? tree_.attribute(place, route.attribute, value)
+                                              : tree_.value(place, value);
+  }
 
   /// As visitAll, for values.
-  template<class Visit>
-  bool visitValues(uint32_t index, const At& at, const Visit& visit)
+  bool visitValues(uint32_t index, const At& at, const ValueVisitor& visit)
   {
     const Expression& operand = expression(index);
     if (operand.kind == Kind::text)
@@ -205,9 +237,7 @@ private:
     }
     return visitAll(operand, at, [&](const Route& route, const Place& place) {
       Value value;
-      const bool isThere = route.attribute != Attribute::none ? tree_.attribute(place, route.attribute, value)
-                                                              : tree_.value(place, value);
-      return !isThere || visit(value);
+      return !valueOf(route, place, value) || visit(value);
     });
   }
 
@@ -224,8 +254,7 @@ private:
     uint64_t first = ~uint64_t{0}; // of several routes the one that leads to the first node
     const auto take = [&](const Route& route, const Place& place) {
       Value value;
-      const bool isThere = route.attribute != Attribute::none ? tree_.attribute(place, route.attribute, value)
-                                                              : tree_.value(place, value);
+      const bool isThere = valueOf(route, place, value);
       if (route.attribute != Attribute::none && !isThere)
       {
         return true;

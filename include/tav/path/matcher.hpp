@@ -284,8 +284,7 @@ private:
 };
 
 template<class Tree>
-template<class Visit>
-bool Conditions<Tree>::visitRoute(const Route& route, const At& at, const Visit& visit)
+bool Conditions<Tree>::visitRoute(const Route& route, const At& at, const PlaceVisitor& visit)
 {
   const auto isNode = [&](size_t levels) {
     return levels <= at.line.size() && !tree_.isAbove(at.line[at.line.size() - levels]);
