@@ -72,20 +72,27 @@ void perFile(benchmark::State& state, Pass&& pass)
   state.SetBytesProcessed(state.iterations() * static_cast<int64_t>(kFileBytes));
 }
 
+/// Reads the file page by page, and adds up what `sumOf` says of each.
+template<class Sum>
+uint64_t sumPages(int fd, std::vector<char>& page, Sum sumOf)
+{
+  uint64_t sum = 0;
+  for (size_t at = 0; at < kFileBytes; at += page.size())
+  {
+    if (::pread(fd, page.data(), page.size(), static_cast<off_t>(at)) < 0)
+    {
+      std::abort();
+    }
+    sum += sumOf(page);
+  }
+  return sum;
+}
+
 void preadPages(benchmark::State& state, size_t pageSize)
 {
   std::vector<char> page(pageSize);
   perFile(state, [&](int fd) {
-    uint64_t s = 0;
-    for (size_t at = 0; at < kFileBytes; at += pageSize)
-    {
-      if (::pread(fd, page.data(), pageSize, static_cast<off_t>(at)) < 0)
-      {
-        std::abort();
-      }
-      s += sumWords(page.data(), pageSize);
-    }
-    return s;
+    return sumPages(fd, page, [](const std::vector<char>& bytes) { return sumWords(bytes.data(), bytes.size()); });
   });
 }
 void pwritePages(benchmark::State& state, size_t pageSize)
@@ -261,7 +268,9 @@ void pwriteCalls(benchmark::State& state)
   perFile(state, [](int fd) { return writeByCalls(fd); });
 }
 
-void preadCalls(benchmark::State& state)
+/// Reads the pages that writeByCalls has written; `sumOf` adds up the payloads of one.
+template<class Sum>
+void preadWritten(benchmark::State& state, Sum sumOf)
 {
   const int made = ::open(path().c_str(), O_RDWR);
   writeByCalls(made);
@@ -269,15 +278,7 @@ void preadCalls(benchmark::State& state)
   std::vector<char> page(kPageBytes);
   uint64_t wrong = 0;
   perFile(state, [&](int fd) {
-    uint64_t sum = 0;
-    for (size_t at = 0; at < kFileBytes; at += kPageBytes)
-    {
-      if (::pread(fd, page.data(), kPageBytes, static_cast<off_t>(at)) < 0)
-      {
-        std::abort();
-      }
-      sum += sumPageByCalls(page);
-    }
+    const uint64_t sum = sumPages(fd, page, sumOf);
     wrong += sum != kPiecesSum;
     return sum;
   });
@@ -287,8 +288,13 @@ void preadCalls(benchmark::State& state)
   }
 }
 
-/// An own page filled where it stands, without a call: the floor of a ring whose steps are in the caller's code. Each
-/// page is read before it is written, as a ring has to.
+void preadCalls(benchmark::State& state)
+{
+  preadWritten(state, sumPageByCalls);
+}
+
+/// Pieces added to a page in place, without a call: the floor of a ring whose steps are in the caller's code. Each page
+/// is read before it is written, as a ring has to.
 void pwriteInPlace(benchmark::State& state)
 {
   std::vector<char> page(kPageBytes);
@@ -315,39 +321,25 @@ void pwriteInPlace(benchmark::State& state)
   });
 }
 
-/// The same walked.
+uint64_t sumPageInPlace(const std::vector<char>& page)
+{
+  uint64_t sum = 0;
+  const char* const end = page.data() + kPagePieces * kPieceBytes;
+  for (const char* node = page.data(); node < end;)
+  {
+    floor0::Header header;
+    std::memcpy(&header, node, sizeof header);
+    node += sizeof header;
+    sum += sumWords(node, header.size);
+    node += header.size;
+  }
+  return sum;
+}
+
+/// The same pages, walked in place.
 void preadInPlace(benchmark::State& state)
 {
-  const int made = ::open(path().c_str(), O_RDWR);
-  writeByCalls(made);
-  ::close(made);
-  std::vector<char> page(kPageBytes);
-  uint64_t wrong = 0;
-  perFile(state, [&](int fd) {
-    uint64_t sum = 0;
-    for (size_t at = 0; at < kFileBytes; at += kPageBytes)
-    {
-      if (::pread(fd, page.data(), kPageBytes, static_cast<off_t>(at)) < 0)
-      {
-        std::abort();
-      }
-      const char* const end = page.data() + kPagePieces * kPieceBytes;
-      for (const char* node = page.data(); node < end;)
-      {
-        floor0::Header header;
-        std::memcpy(&header, node, sizeof header);
-        node += sizeof header;
-        sum += sumWords(node, header.size);
-        node += header.size;
-      }
-    }
-    wrong += sum != kPiecesSum;
-    return sum;
-  });
-  if (wrong != 0)
-  {
-    state.SkipWithError("what was written reads back otherwise");
-  }
+  preadWritten(state, sumPageInPlace);
 }
 
 void stdioRead(benchmark::State& state, size_t buffer, bool unlocked)

@@ -9,6 +9,7 @@
 #include "kor/windows.h"
 #include "tools/host/host.h"
 #include "tools/host/interruptedFiles.h"
+#include "tools/host/interrupts.h"
 
 #include <shellapi.h> // behind the system's main header
 
@@ -19,32 +20,20 @@ using kor::widen;
 
 namespace
 {
-// What a signal's handler may look at.
-InterruptedFiles<wchar_t> filesToRemove;
-volatile std::sig_atomic_t held = 0;
-volatile std::sig_atomic_t waiting = 0; ///< the number of a signal that came while it was held
-
-volatile std::sig_atomic_t catching = 0;
-volatile std::sig_atomic_t caught = 0;
+InterruptedFiles<wchar_t> filesToRemove; // which the handler of a signal may look at
+} // namespace
 
 extern "C" void endBySignal(int number)
 {
-  if (catching != 0 && number == SIGINT)
+  if (!endsNow(number))
   {
-    caught = 1;
     std::signal(number, endBySignal); // which each signal resets
-    return;
-  }
-  if (held != 0)
-  {
-    waiting = number;
     return;
   }
   filesToRemove.each([](const wchar_t* path) { DeleteFileW(path); });
   std::signal(number, SIG_DFL);
   std::raise(number);
 }
-} // namespace
 
 std::vector<std::string> commandLine(int argc, char** argv)
 {
@@ -118,36 +107,6 @@ void keepOnInterrupt(const std::string& path)
   {
     filesToRemove.drop(wide);
   }
-}
-
-HeldInterrupts::HeldInterrupts()
-{
-  held = 1;
-}
-
-HeldInterrupts::~HeldInterrupts()
-{
-  held = 0;
-  if (waiting != 0)
-  {
-    endBySignal(waiting);
-  }
-}
-
-CaughtInterrupt::CaughtInterrupt()
-{
-  caught = 0;
-  catching = 1;
-}
-
-CaughtInterrupt::~CaughtInterrupt()
-{
-  catching = 0;
-}
-
-bool CaughtInterrupt::hasCome()
-{
-  return caught != 0;
 }
 
 uint64_t processId()
