@@ -1,5 +1,7 @@
 """How the bytes of a stream are laid out, stated without the library for the tests in Python. What writes streams for them
 (encode, planted) and what reads them (oracle, recovering) takes it from here."""
+from typing import NamedTuple
+
 from support import BIG_ENDIAN
 
 EYE = 0xC0DED5EEDDEC0DED
@@ -8,6 +10,14 @@ ALIGNED = 0x00100000
 GROUP32, GROUP64 = 1, 2
 ASCII, UINT32, UINT64, STAMP, BINARY, UTF8, ARRAY = 50, 55, 57, 100, 101, 102, 106
 MARKER, END = 65000, 65001
+
+
+class Header(NamedTuple):
+    """As it is in a file; without bits where it has 32 bits."""
+    size: int
+    info: int
+    kind: int
+    elm: int
 
 
 class Form:
@@ -40,13 +50,21 @@ class Form:
             return self.number(size, 8) + self.number(info, 4) + self.number(kind, 2) + self.number(elm, 2)
         return self.number(size, 4) + self.number(kind, 2) + self.number(elm, 2)
 
+    def number_at(self, made, at, width, order=None):
+        return int.from_bytes(made[at:at + width], order or self.order)
+
+    def header_at(self, made, at, wide):
+        """The header in these bytes, whatever they are."""
+        fields = ((0, 8), (8, 4), (12, 2), (14, 2)) if wide else ((0, 4), (4, 0), (4, 2), (6, 2))
+        return Header(*(self.number_at(made, at + place, width) for place, width in fields))
+
     def info(self, flags):
         """As a writer of this form has it in the file."""
         return flags | (ALIGNED if self.align else 0)
 
-    def padding(self, length):
-        """What is behind a payload of so many bytes."""
-        return bytes(-length % 8 if self.align else 0)
+    def padding(self, length, info=0):
+        """What is behind a payload of so many bytes; `info` as in the file."""
+        return bytes(-length % 8 if self.align or info & ALIGNED else 0)
 
     def pair(self, length, order=None):
         """Behind a data element whose payload has so many bytes."""

@@ -1,6 +1,6 @@
 """Tells which nodes of a damaged stream have to come back: from the tree that was written, and from what became of its
 bytes. It searches for nothing and knows nothing of the program."""
-from planted import ALIGNED, ARRAY, BINARY, END, EYE, EYE_SIZE, HOST, NAMED, SIZES, FREE
+from planted import ARRAY, BINARY, END, EYE_SIZE, FREE, SIZES
 from support import tav
 
 KINDS = (1, 2, *SIZES, *FREE)
@@ -100,13 +100,6 @@ class Oracle:
         for child in node.children:
             self.visit(child, inner, intact, due, places)
 
-    def header_at(self, place, wide):
-        """Size, bits and type as they stand in the file."""
-        def number(at, width):
-            return int.from_bytes(self.damaged.bytes[place + at:place + at + width], self.form.order)
-
-        return (number(0, 8), number(8, 4), number(12, 2)) if wide else (number(0, 4), 0, number(4, 2))
-
     def covered(self, places):
         """Where bytes are, by the file, the payload of a node: the size of a data element without a pair leads exactly from
         its header to another node or to the end of a group, and either the size is damaged or the payload. The file is then,
@@ -128,10 +121,10 @@ class Oracle:
                 place = node.offset + shift
                 if shift in self.intact(node) or place < 0 or node.payload_offset + shift > len(self.damaged.bytes):
                     continue
-                size, info, kind = self.header_at(place, node.wide)
+                size, info, kind, _ = self.form.header_at(self.damaged.bytes, place, node.wide)
                 if info & EYE_SIZE or not (kind == BINARY or (kind == ARRAY and size % 8 == 0) or SIZES.get(kind) == size):
                     continue
-                end = node.payload_offset + shift + size + (-size % 8 if self.form.align or info & ALIGNED else 0)
+                end = node.payload_offset + shift + size + len(self.form.padding(size, info))
                 if end in ends:
                     hidden.append((node.payload_offset + shift, end))
         return hidden

@@ -9,7 +9,7 @@ import tempfile
 import unittest
 
 from oracle import ELEMENTS
-from planted import ALIGNED, ARRAY, BINARY, END, EYE, EYE_SIZE, NAMED, Form, Node, encode, random_form, random_tree
+from planted import ARRAY, BINARY, END, EYE, EYE_SIZE, NAMED, Form, Node, encode, random_form, random_tree
 from recovering import identity, missing, read_back, recovered
 from support import ToolTest, generate, tav
 
@@ -91,22 +91,15 @@ class Judge:
         for node in self.root.walk():
             if node.is_group or self.whole(node.offset, node.payload_offset) or node.payload_offset > len(self.damaged):
                 continue
-            size, info, kind = self.header_of(node)
+            size, info, kind, _ = self.form.header_at(self.damaged, node.offset, node.wide)
             if info & EYE_SIZE or not (kind == BINARY or (kind == ARRAY and size % 8 == 0)):
                 continue
-            end = node.payload_offset + size + (-size % 8 if self.form.align or info & ALIGNED else 0)
+            end = node.payload_offset + size + len(self.form.padding(size, info))
             group = node.parent
             inside = group is None or end <= (group.end_element.offset if group.end_element else group.end)
             if node.end < end and end in places and inside:
                 hidden.append((node.end, end))
         return hidden
-
-    def header_of(self, node):
-        """Size, bits and type as they stand in the damaged file."""
-        def number(at, width):
-            return int.from_bytes(self.damaged[node.offset + at:node.offset + at + width], self.form.order)
-
-        return (number(0, 8), number(8, 4), number(12, 2)) if node.wide else (number(0, 4), 0, number(4, 2))
 
     def visit(self, node, due):
         if self.own(node):
@@ -267,7 +260,7 @@ class EmptyRoot(ToolTest):
                 report, saved = self.saved(made + behind, form)
                 self.assertEqual((report["lost"], report["groupsClosed"]), (root.end - root.payload_offset, 1))
                 width = 8 if form.wide else 4
-                size = len(behind).to_bytes(width, form.order)
+                size = form.number(len(behind), width)
                 self.assertEqual(saved, size + made[width:root.payload_offset] + behind)
 
     def test_a_root_with_a_damaged_end_element_takes_what_follows_when_it_lost_all_it_held(self):
@@ -280,19 +273,19 @@ class EmptyRoot(ToolTest):
                 report, saved = self.saved(made + behind, form)
                 self.assertEqual((report["lost"], report["groupsMade"]), (16, 0))
                 width = 8 if form.wide else 4
-                size = len(behind).to_bytes(width, form.order)
+                size = form.number(len(behind), width)
                 self.assertEqual(saved, size + made[width:root.payload_offset] + behind)
 
     def test_a_root_that_asks_for_no_end_element_takes_what_follows_the_one_it_has(self):
         for form in (form for form in FORMS if form.wide):
-            pair = EYE.to_bytes(8, form.order) + (32).to_bytes(8, form.order)
+            pair = form.pair(16)
             root = Node(NAMED[0], 2, children=[Node(END, BINARY, pair)])
             node = Node(NAMED[1], 57, bytes(range(8)))
             made, behind = encode(form, root), encode(form, node)
             with self.subTest(form=form.options()):
                 report, saved = self.saved(made + behind, form)
                 self.assertEqual((report["lost"], report["groupsMade"]), (0, 0))
-                self.assertEqual(saved, len(behind).to_bytes(8, form.order) + made[8:root.payload_offset] + behind)
+                self.assertEqual(saved, form.number(len(behind), 8) + made[8:root.payload_offset] + behind)
 
     def test_an_empty_root_is_closed_where_a_surer_root_of_another_width_follows_whatever_its_name(self):
         """Read with 32-bit headers, what follows are nodes, too, of a kind: their sizes lead to the end."""

@@ -2,8 +2,9 @@
 import json
 import unittest
 
+from layout import END, EYE, EYE_SIZE, GROUP32, GROUP64, UTF8, header_length
 from oracle import ELEMENTS, KINDS
-from planted import ALIGNED, END, EYE, EYE_SIZE, HOST, NAMED, SIZES
+from planted import HOST, NAMED, SIZES
 from support import tav
 
 
@@ -17,20 +18,16 @@ class Unsound(AssertionError):
 
 def read_back(made, form):
     """The nodes of a sound stream, by their sizes alone."""
-    def number(at, width):
-        return int.from_bytes(made[at:at + width], form.order)
-
     def begins(at, end, wide, info):
         """Whether a pair, a node or the end is here, not two bytes farther on."""
         if info & EYE_SIZE:
-            return number(at, 8) == EYE or int.from_bytes(made[at:at + 8], HOST) == EYE
+            return EYE in (form.number_at(made, at, 8), form.number_at(made, at, 8, HOST))
         if at == end or at + 2 == end:
             return at == end
         return likeness(at, wide) >= likeness(at + 2, wide)
 
     def likeness(at, wide):
-        kind, elm = (number(at + 12, 2), number(at + 14, 2)) if wide else (number(at + 4, 2), number(at + 6, 2))
-        size = number(at, 8 if wide else 4)
+        size, _, kind, elm = form.header_at(made, at, wide)
         if kind not in KINDS or size != SIZES.get(kind, size) or size > len(made) - at:
             return 0
         return 2 if elm in (*NAMED, END) else 1 if elm in ELEMENTS else 0
@@ -54,18 +51,16 @@ def read_back(made, form):
 
     def node_at(at, end, wide):
         """Where the next node begins, the node with what is inside, and where else the next one could begin."""
-        size, kind, elm = (number(at, 8), number(at + 12, 2), number(at + 14, 2)) if wide else (
-            number(at, 4), number(at + 4, 2), number(at + 6, 2))
-        info = number(at + 8, 4) if wide else 0
-        start = at + (16 if wide else 8)
+        size, info, kind, elm = form.header_at(made, at, wide)
+        start = at + header_length(wide)
         if start + size > end:
             raise Unsound(f"the node at {at:#x} of the saved stream ends outside its parent")
-        if kind in (1, 2):
-            return start + size, [(elm, kind, None), *nodes(start, start + size, wide and kind == 2)], None
+        if kind in (GROUP32, GROUP64):
+            return start + size, [(elm, kind, None), *nodes(start, start + size, wide and kind == GROUP64)], None
         node = [(elm, kind, bytes(made[start:start + size]))] if elm != END else []
-        plain = start + size + (-size % 8 if form.align or info & ALIGNED else 0)
+        plain = start + size + len(form.padding(size, info))
         pair = 16 if info & EYE_SIZE else 0
-        if kind != 102:
+        if kind != UTF8:
             return plain + pair, node, None
         ways = [plain + pair, plain + 2 + pair]
         likely = 0 if begins(plain, end, wide, info) else 1
