@@ -108,9 +108,6 @@ inline uint32_t continueAt(TAVHandle& handle, const FileEnd& found, size_t left)
   handle.streamBytes = found.end;
   for (TAVHeader group : found.open)
   {
-    layout::HeaderFields fields = layout::fieldsOf(group);
-    fields.size = 0; // with an unknown size the close would keep it to itself that the size could not be written
-    layout::setHeader(fields, layout::is64(group), group);
     if (const uint32_t rc = handle.pHdrStack->push(&group); rc != TAV_RC_OK)
     {
       return rc;
@@ -118,7 +115,7 @@ inline uint32_t continueAt(TAVHandle& handle, const FileEnd& found, size_t left)
   }
   for (size_t open = found.open.size(); open > left; --open)
   {
-    if (const uint32_t rc = tavCloseHeader(0, &handle); rc != TAV_RC_OK)
+    if (const uint32_t rc = WriterState::endGroup(handle, 0); rc != TAV_RC_OK)
     {
       return causeOf(rc, &handle);
     }

@@ -95,6 +95,7 @@ public:
     state_ = std::move(other.state_);
     isResumed_ = other.isResumed_;
     isAppended_ = other.isAppended_;
+    canShrink_ = other.canShrink_;
     durable_ = std::move(other.durable_);
     return *this;
   }
@@ -323,6 +324,7 @@ private:
     {
       durable_.name(path);
     }
+    canShrink_ = !korIsDevice(path.c_str());
     return opened.code != TAV_RC_OK ? opened : detail::FileOutcome{open(state_->owned.get(), options)};
   }
 
@@ -371,7 +373,7 @@ private:
     {
       rc = state_->handle->pCircularBuf->reset(); // tavTermHandle would hide a failure
     }
-    if (rc == TAV_RC_OK && isAppended_)
+    if (rc == TAV_RC_OK && (isAppended_ || (state_->tookBack && canShrink_)))
     {
       rc = static_cast<TAVSSFile&>(*state_->owned).pFile->setSize(state_->handle->streamBytes);
     }
@@ -418,6 +420,7 @@ private:
   detail::WriterRef state_;
   bool isResumed_ = false;
   bool isAppended_ = false; ///< to a file, which ends with the stream
+  bool canShrink_ = false;  ///< a file that was opened by its path, and no device
   detail::Durable durable_;
 };
 

@@ -87,6 +87,7 @@ struct WriterState
   bool isFinished = false;
   uint32_t unclosed = TAV_RC_OK; ///< what closing the file answered
   Watch* watch = nullptr;        ///< then nothing takes the fast way
+  bool tookBack = false;         ///< a group: in a file bytes of it can stand behind the stream
   bool isShared = false;         ///< the handle was given away: plain operations can open and close groups
 
   WriterState() = default;
@@ -325,13 +326,34 @@ struct WriterState
     uint32_t rc = reserve(0);
     if (rc == TAV_RC_OK)
     {
-      rc = told(tavCloseHeader(how, handle));
+      rc = told(endGroup(*handle, how));
+      tookBack = tookBack || (rc == TAV_RC_OK && how != 0);
     }
     if (rc == TAV_RC_OK && block != nullptr && handle->streamBytes < end)
     {
       block->takeBack(handle->streamBytes, end);
     }
     return rc;
+  }
+
+  /// tavCloseHeader, with the size by which it does what is wanted here. Of a group whose size is not known it would
+  /// keep it to itself that the size could not be written; a group that is taken back has none again.
+  static uint32_t endGroup(TAVHandle& of, uint64_t how) noexcept
+  {
+    const TAVHdrStack& stack = *of.pHdrStack;
+    if (stack.count != 0)
+    {
+      TAVHeader& group = stack.pEntries[stack.count - 1];
+      if (layout::is64(group))
+      {
+        group.hdr64.size = how == 0 ? 0 : TAV_SIZE_UNKNOWN;
+      }
+      else
+      {
+        group.hdr32.size = how == 0 ? 0 : layout::kSizeUnknown32;
+      }
+    }
+    return tavCloseHeader(how, &of);
   }
 
   /// The code of a plain operation, and the cause where the code hides it.

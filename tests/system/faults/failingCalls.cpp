@@ -6,6 +6,7 @@
 #include <cerrno>
 #include <cstdarg>
 #include <cstddef>
+#include <cstdio>
 #include <dlfcn.h>
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -199,4 +200,28 @@ int lockFile(int file, int operation) noexcept
 {
   static const auto real = next<int (*)(int, int)>("flock");
   return fails(Kind::lock) ? -1 : real(file, operation);
+}
+
+EXPORTED int fsync(int file)
+{
+  static const auto real = next<int (*)(int)>("fsync");
+  return fails(Kind::sync) ? -1 : real(file);
+}
+
+EXPORTED int fdatasync(int file)
+{
+  static const auto real = next<int (*)(int)>("fdatasync");
+  return fails(Kind::sync) ? -1 : real(file);
+}
+
+EXPORTED int ftruncate(int file, off_t size) noexcept
+{
+  static const auto real = next<int (*)(int, off_t)>("ftruncate");
+  return fails(Kind::resize) ? -1 : real(file, size);
+}
+
+EXPORTED int remove(const char* path) noexcept
+{
+  static const auto real = next<int (*)(const char*)>("remove");
+  return fails(Kind::remove) ? -1 : real(path);
 }

@@ -16,9 +16,14 @@ enum class Kind : uint8_t
   write,
   seek,
   stat,
-  lock
+  lock,
+  sync,
+  resize,
+  remove
 };
-inline constexpr unsigned kKinds = 8;
+inline constexpr unsigned kKinds = 11;
+inline constexpr const char* kKindNames[kKinds] = {"malloc", "open", "close", "read", "write", "seek",
+                                                   "stat", "lock", "sync", "resize", "remove"};
 
 /// An error that is none: the call transfers one byte only.
 inline constexpr int kShort = -1;

@@ -18,8 +18,6 @@ namespace
 
 using namespace faults;
 
-constexpr const char* kKindNames[kKinds] = {"malloc", "open", "close", "read", "write", "seek", "stat", "lock"};
-
 /// A fault, and the code that is to arrive.
 struct Fault
 {

@@ -280,6 +280,78 @@ TEST_P(LayerAppend, ResumesTheRootThatAKilledWriterLeft)
   EXPECT_EQ(numbers(), (Numbers{{0, 1, 77, 50, 51}, {60}}));
 }
 
+TEST_P(LayerAppend, TakesBackTheRootThatItHasResumed)
+{
+  writeFile(1, 2);
+  const Bytes before = contentOf(file_.path);
+  for (const bool goesOn : {false, true})
+  {
+    SCOPED_TRACE(goesOn);
+    store(file_.path, before);
+    {
+      auto killed = std::make_unique<tav::Writer>(file_.path, kAppend, options());
+      tav::Group open = killed->group(TAV_ELM_CMN_SYSTEM, group());
+      fill(open, 10, 3);
+      killed.reset(); // before the group, which nobody closes then
+    }
+    tav::Writer writer(file_.path, kResume, options());
+    tav::Group root = writer.resumed();
+    ASSERT_TRUE(root.isOpen());
+    fill(root, 20, 3);
+    root.abandon();
+    writer.flush();
+    {
+      const tav::Reader meanwhile(file_.path, options());
+      std::vector<bool> open;
+      for (const tav::Node& there : meanwhile.roots())
+      {
+        open.push_back(there.isOpen());
+      }
+      EXPECT_EQ(open, (std::vector<bool>{false, true})) << "whoever reads meanwhile sees no root that is closed";
+    }
+    if (goesOn)
+    {
+      put(writer, 60, 1);
+    }
+    writer.finish();
+    EXPECT_EQ(std::filesystem::file_size(file_.path), writer.size());
+    EXPECT_EQ(numbers(), goesOn ? (Numbers{{1, 2}, {60}}) : (Numbers{{1, 2}}));
+  }
+}
+
+TEST_P(LayerAppend, NothingIsLeftOfALastRootThatWasTakenBack)
+{
+  for (const tav::FileOptions& how : {tav::FileOptions{}, kAppend, tav::FileOptions{.overwrite = true},
+                                      tav::FileOptions{.overwrite = true, .inPlace = true}})
+  {
+    for (const uint32_t hosts : {1U, 4000U})
+    {
+      for (const bool goesOn : {false, true})
+      {
+        SCOPED_TRACE(std::to_string(hosts) + (goesOn ? " hosts, and another root" : " hosts"));
+        std::filesystem::remove(file_.path);
+        tav::Writer writer(file_.path, how, options());
+        put(writer, 1, 2);
+        tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM, group());
+        fill(root, 10, hosts);
+        writer.flush();
+        root.abandon();
+        if (goesOn)
+        {
+          put(writer, 30, 1);
+        }
+        writer.finish();
+        EXPECT_EQ(numbers(), goesOn ? (Numbers{{1, 2}, {30}}) : (Numbers{{1, 2}}));
+        EXPECT_EQ(std::filesystem::file_size(file_.path), writer.size());
+        tav::Writer next(file_.path, kAppend, options());
+        put(next, 40, 1);
+        next.finish();
+        EXPECT_EQ(numbers().back(), std::vector<uint32_t>{40});
+      }
+    }
+  }
+}
+
 TEST_P(LayerAppend, ClosesARootThatNobodyGoesOnWith)
 {
   store(file_.path, openStream(2));
