@@ -6,7 +6,7 @@ set -euo pipefail
 
 declare -A groups=(
   [build]="g++ cmake ninja-build nlohmann-json3-dev"
-  [test]="libgtest-dev libgmock-dev pkg-config python3 binutils jq libxml2-utils python3-lxml zsh fish file shared-mime-info"
+  [test]="libgtest-dev libgmock-dev pkg-config python3 binutils jq libxml2-utils python3-lxml python3-prometheus-client zsh fish file shared-mime-info"
   [bench]="libbenchmark-dev libbson-dev libmsgpack-dev libcbor-dev libflatbuffers-dev libebml-dev rapidjson-dev libpugixml-dev pkg-config valgrind binutils python3 python3-matplotlib"
   [full]="clang clang-19 clang-format clang-tidy cppcheck libclang-rt-dev ccache doxygen lintian dpkg-dev gzip abigail-tools valgrind"
   [kaitai]="nodejs npm"

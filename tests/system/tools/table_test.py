@@ -2,7 +2,9 @@
 import csv
 import io
 import json
+import os
 import random
+import shutil
 import sqlite3
 import subprocess
 import unittest
@@ -36,6 +38,17 @@ class Table(Folder):
         result = tav("table", *arguments, **more)
         self.assertEqual(result.status, status, result.err)
         return result
+
+    def in_python(self, needed, code, text):
+        """What the system's Python, which has the system's packages, prints of a text."""
+        if not os.path.exists("/usr/bin/python3"):
+            self.skipTest("there is no system's Python")
+        begin = f"import sys\ntry:\n    {needed}\nexcept ImportError:\n    sys.exit(77)\n"
+        done = subprocess.run(["/usr/bin/python3", "-c", begin + code], input=text, capture_output=True, check=False)
+        if done.returncode == 77:
+            self.skipTest(f"there is nothing to {needed}")
+        self.assertEqual(done.returncode, 0, done.stderr.decode())
+        return done.stdout.decode()
 
     def rows(self, *arguments, status=0):
         return list(csv.reader(io.StringIO(self.table(*arguments, status=status).raw.decode(), newline="")))
@@ -71,19 +84,70 @@ class Formats(Table):
                          (sum(range(len(self.TEXTS))), len(self.TEXTS), len(self.TEXTS) + 1))
 
     def test_pandas_takes_it(self):
-        code = ("import io, sys\ntry:\n import pandas\nexcept ImportError:\n sys.exit(77)\n"
-                "t = pandas.read_csv(sys.stdin.buffer, dtype={'cpuOnline': 'Int64'}, keep_default_na=False,"
-                " na_values={'cpuOnline': ['']})\n"
-                "print(list(t.columns), int(t.cpuOnline.sum()), int(t.cpuOnline.isna().sum()), t.name[2])")
-        try:
-            done = subprocess.run(["/usr/bin/python3", "-c", code], input=self.table(self.texts(), *self.ARGUMENTS).raw,
-                                  capture_output=True, check=False)
-        except FileNotFoundError:
-            self.skipTest("there is no system's Python")
-        if done.returncode == 77:
-            self.skipTest("there is no pandas")
-        self.assertEqual(done.stdout.decode(), f"['name', 'cpuOnline', 'memTotal'] {sum(range(len(self.TEXTS)))} 1 a\"b\n",
-                         done.stderr)
+        self.assertEqual(self.in_python("import pandas", """
+t = pandas.read_csv(sys.stdin.buffer, dtype={'cpuOnline': 'Int64'}, keep_default_na=False, na_values={'cpuOnline': ['']})
+print(list(t.columns), int(t.cpuOnline.sum()), int(t.cpuOnline.isna().sum()), t.name[2])
+""", self.table(self.texts(), *self.ARGUMENTS).raw), f"['name', 'cpuOnline', 'memTotal'] {sum(range(len(self.TEXTS)))} 1 a\"b\n")
+
+    def numbers(self):
+        """Numbers of 64 and 128 bits at their ends, times, missing and empty texts."""
+        return self.stream({"element": "system", "children": [{"element": "host", "children": children} for children in (
+            [leaf("cpuOnline", 2**64 - 1, "Uint64"), leaf("memTotal", 2**128 - 1, "Uint128"), leaf("memFree", -2**63, "Sint64"),
+             leaf("timestamp", "2024-02-29T23:59:59.000001Z", "UTC Timestamp"), leaf("hostName", "")],
+            [leaf("cpuOnline", 2**53 + 1, "Uint64"), leaf("memFree", 2**63 - 1, "Sint64"),
+             leaf("timestamp", "1970-01-01T01:00:00+01:00", "UTC Timestamp")],
+            [leaf("cpuOnline", 0), leaf("hostName", "007"), leaf("memTotal", 2**64, "Uint128")])]}, "numbers.tav")
+
+    NUMBERS = ("--each", "/system/host", *(word for name in ("cpuOnline", "memTotal", "memFree", "timestamp", "hostName")
+                                           for word in ("--col", name)))
+
+    def test_pandas_reads_numbers_and_times_exactly(self):
+        # Numbers beyond 64 bits stay texts, and so do columns of large ones with gaps, which pandas reads as floating ones.
+        code = """
+for options in ({}, {'sep': '\\t'}):
+    if options: text = text.replace(',', '\\t')
+    t = pandas.read_csv(io.StringIO(text), dtype={'cpuOnline': 'uint64', 'memTotal': str, 'memFree': str, 'hostName': str},
+                        parse_dates=['timestamp'], **options)
+    print([int(x) for x in t.cpuOnline], [None if pandas.isna(x) else int(x) for x in t.memTotal],
+          [None if pandas.isna(x) else int(x) for x in t.memFree], t.timestamp[0].isoformat(), t.timestamp[1].isoformat(),
+          pandas.isna(t.timestamp[2]), t.hostName[2])
+"""
+        code = "import io\ntext = sys.stdin.read()\n" + code
+        line = (f"[{2**64 - 1}, {2**53 + 1}, 0] [{2**128 - 1}, None, {2**64}] [{-2**63}, {2**63 - 1}, None] "
+                "2024-02-29T23:59:59.000001+00:00 1970-01-01T00:00:00+00:00 True 007\n")
+        self.assertEqual(self.in_python("import pandas", code, self.table(self.numbers(), *self.NUMBERS).raw), line * 2)
+
+    def test_spreadsheets_tell_missing_from_empty(self):
+        # What a spreadsheet takes for CSV; without quotation marks, an empty cell is a missing one.
+        text = self.table(self.numbers(), *self.NUMBERS, "--crlf").raw.decode()
+        self.assertEqual(csv.Sniffer().sniff(text).delimiter, ",")
+        rows = list(csv.DictReader(io.StringIO(text, newline=""), dialect="excel", strict=True))
+        self.assertEqual([row["hostName"] for row in rows], ["", "", "007"])
+        self.assertEqual([line.split(",")[-1] for line in text.split("\r\n")[1:3]], ['""', ""])
+        self.assertEqual([row["timestamp"] for row in rows],
+                         ["2024-02-29T23:59:59.000001Z", "1970-01-01T00:00:00.000000Z", ""])
+        tabs = list(csv.reader(io.StringIO(self.table(self.numbers(), *self.NUMBERS, "--format", "tsv").out, newline=""),
+                               delimiter="\t", quoting=csv.QUOTE_NONE, strict=True))
+        self.assertEqual(tabs[1:], [[cell or "" for cell in row.values()] for row in rows])
+
+    @unittest.skipUnless(shutil.which("libreoffice"), "libreoffice is not installed")
+    def test_an_office_reads_it(self):
+        (self.folder / "t.csv").write_bytes(self.table(self.texts(), *self.ARGUMENTS).raw)
+        done = subprocess.run(["libreoffice", "--headless", f"-env:UserInstallation=file://{self.folder}/profile",
+                               "--convert-to", "fods", "--outdir", self.folder, self.folder / "t.csv"],
+                              capture_output=True, check=False)
+        self.assertEqual(done.returncode, 0, done.stderr)
+        self.assertEqual((self.folder / "t.fods").read_text().count("<table:table-row"), len(self.TEXTS) + 2)
+
+    def test_a_database_reads_numbers_and_times_exactly(self):
+        rows = self.rows(self.numbers(), *self.NUMBERS)
+        base = sqlite3.connect(":memory:")
+        self.addCleanup(base.close)
+        base.execute("create table t(n numeric, m text, f integer, time text, name text)")
+        base.executemany("insert into t values (nullif(?, ''), nullif(?, ''), nullif(?, ''), nullif(?, ''), ?)", rows[1:])
+        self.assertEqual(base.execute("select min(f), max(f), count(f) from t").fetchone(), (-2**63, 2**63 - 1, 2))
+        self.assertEqual(base.execute("select m from t where m is not null").fetchall(), [(str(2**128 - 1),), (str(2**64),)])
+        self.assertEqual(base.execute("select strftime('%s', max(time)), count(time) from t").fetchone(), ("1709251199", 2))
 
     def test_tsv_escapes_what_ends_cells(self):
         lines = self.table(self.texts(), *self.ARGUMENTS, "--format", "tsv").raw.decode().split("\n")
@@ -263,6 +327,46 @@ class Metrics(Table):
             "# TYPE up gauge", "# HELP up cpuOnline", *[f"up{{{label}}} {i}" for i, label in enumerate(labels)],
             "# TYPE read counter", "# HELP read memTotal",
             *[f"read_total{{{label}}} {2**63 + i}" for i, label in enumerate(labels)], "# EOF", ""])
+
+    def page(self):
+        """A page with everything on it: counters, gauges, units, times, labels and helps that have to be escaped."""
+        names = {"40001": {"tag": "queue_depth", "kind": "gauge", "unit": "1", "text": "jobs that\nwait in \\ order"},
+                 "40002": {"tag": "jobs_done", "kind": "counter"}, "40003": {"tag": "up_seconds", "kind": "gauge", "unit": "seconds"}}
+        (self.folder / "own.json").write_text(json.dumps(names))
+        document = {"element": "system", "children": [{"element": "host", "children": [
+            leaf("hostName", name), leaf("#40001", -i, "Sint32"), leaf("#40002", 2**53 + 2 * i, "Uint64"), leaf("#40003", i),
+            leaf("memTotal", 2**100, "Uint128"), leaf("timestamp", "2024-05-01T10:20:30.5Z", "UTC Timestamp")]}
+            for i, name in enumerate(("ada", 'g"r\\a\nce', "h\u00e4", ""))]}
+        return self.metrics(document, "--dictionary", self.folder / "own.json", "--each", "/system/host", "--col", "host=hostName",
+                            "--col", "queue_depth", "--col", "jobs_done", "--col", "up_seconds", "--col", "mem=memTotal",
+                            "--col", "seen=timestamp", "--label", "job=x").raw
+
+    def test_a_parser_of_metrics_takes_it(self):
+        found = self.in_python("from prometheus_client.openmetrics import parser", """
+import json
+families = parser.text_string_to_metric_families(sys.stdin.read())
+print(json.dumps([[f.name, f.type, f.unit, f.documentation, [[s.name, s.labels, s.value] for s in f.samples]] for f in families]))
+""", self.page())
+        labels = [{"job": "x", "host": name} for name in ("ada", 'g"r\\a\nce', "h\u00e4", "")]
+
+        def samples(name, values):
+            return [[name, label, value] for label, value in zip(labels, values)]
+        self.assertEqual(json.loads(found), [
+            ["queue_depth", "gauge", "", "jobs that\nwait in \\ order", samples("queue_depth", [-i for i in range(4)])],
+            ["jobs_done", "counter", "", "jobs_done", samples("jobs_done_total", [2**53 + 2 * i for i in range(4)])],
+            ["up_seconds", "gauge", "seconds", "up_seconds", samples("up_seconds", range(4))],
+            ["mem", "gauge", "", "memTotal", samples("mem", [2**100] * 4)],
+            ["seen", "gauge", "", "timestamp", samples("seen", [1714558830.5] * 4)]])
+
+    @unittest.skipUnless(shutil.which("promtool"), "promtool is not installed")
+    def test_promtool_reads_it(self):
+        # 3: it was read, and something is not as its authors would name it.
+        done = subprocess.run(["promtool", "check", "metrics"], input=self.page(), capture_output=True, check=False)
+        self.assertIn(done.returncode, (0, 3), done.stderr)
+        self.assertNotIn(b"error", done.stderr)
+        broken = subprocess.run(["promtool", "check", "metrics"], input=self.page().replace(b"} ", b" "), capture_output=True,
+                                check=False)
+        self.assertEqual(broken.returncode, 1, broken.stderr)
 
     def test_rows_that_nothing_tells_apart_are_refused(self):
         document = {"element": "system", "children": [{"element": "host", "children": [leaf("cpuOnline", 1)]}] * 2}
