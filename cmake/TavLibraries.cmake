@@ -1,4 +1,5 @@
-# libkor, libtav and libtav-inspect from the rooms' objects, and tav_internal for the tests.
+# libkor, libtav and libtav-inspect from the rooms' objects, and tav_internal for the tests and
+# for what holds them all.
 
 # tav_add_library(NAME ALIAS ROOM...): the library and its name for users, tav::ALIAS.
 function(tav_add_library name alias)
@@ -45,7 +46,7 @@ tav_add_library(tav_inspect inspect inspect)
 target_link_libraries(tav_inspect PUBLIC tav)
 set_target_properties(tav_inspect PROPERTIES OUTPUT_NAME tav-inspect EXPORT_NAME inspect)
 
-if(TAV_BUILD_TESTS OR TAV_BUILD_BENCH)
+if(TAV_BUILD_TESTS OR TAV_BUILD_BENCH OR TAV_BUILD_DUCKDB)
   set(objects)
   foreach(room IN LISTS TAV_ROOMS ITEMS inspect)
     list(APPEND objects $<TARGET_OBJECTS:${room}_objects>)

@@ -3,7 +3,7 @@
 
     check-rooms.py [ROOT]
 
-Includes point one way: tools, python -> inspect -> layer -> api -> core -> storage, dictionary -> format -> trace -> kor. The
+Includes point one way: tools, python, duckdb -> inspect -> layer -> api -> core -> storage, dictionary -> format -> trace -> kor. The
 system, its headers and the byte order are kor's business, which has a file a platform: names that end in Posix or Windows. What the
 program alone asks of the system is in tools/host, by the same rule. No other source asks for the platform, tests and
 examples included. What keeps a compiler from its work stands in one file. The inspection library names no option of the
@@ -32,6 +32,7 @@ ROOMS = {
     "inspect": {"inspect"},
     "tools": {"tools"},
     "python": {"python"},
+    "duckdb": {"duckdb"},
     "include": set(),
 }
 # The installed part of core: which of it the rooms below may use.
@@ -55,7 +56,8 @@ PLATFORM_FILE = re.compile(r"^(kor/(\w+(Posix|Windows)\.cpp|windows\.h)|tools/ho
 # Sources that are no room: they may include what they like, but must not ask for the platform.
 BESIDE = ("tests", "examples", "bench", "fuzz")
 # Libraries of others that a room may use.
-THIRD_PARTY = {"tools": ("CLI/", "nlohmann/"), "python": ("Python.h", "datetime.h", "structmember.h")}
+THIRD_PARTY = {"tools": ("CLI/", "nlohmann/"), "python": ("Python.h", "datetime.h", "structmember.h"),
+               "duckdb": ("duckdb_extension.h",)}
 
 # A namespace of the users' own names, in a source that is not installed.
 USERS_NAMESPACE = re.compile(r"^\s*namespace\s+tav\s*(\{|$)")
@@ -152,7 +154,7 @@ def check_tree(root):
     findings = []
     for room in (*ROOMS, *BESIDE):
         for path in sorted((root / room).rglob("*")):
-            if path.suffix not in (".h", ".hpp", ".cpp", ".def"):
+            if "node_modules" in path.parts or path.suffix not in (".h", ".hpp", ".cpp", ".def"):
                 continue
             files += 1
             name = path.relative_to(root).as_posix()

@@ -74,4 +74,32 @@ CellKind ColumnType::kind() const
   return is64 ? CellKind::signed64 : CellKind::signed128;
 }
 
+TableTypes::TableTypes(const TableQuery& query)
+    : types_(query.columns().size())
+{
+}
+
+TableTypes::~TableTypes() = default;
+
+void TableTypes::see(const Table& table)
+{
+  for (const auto& chunk : table.chunks())
+  {
+    for (size_t i = 0; i < types_.size(); ++i)
+    {
+      types_[i].see(*chunk, i);
+    }
+  }
+}
+
+CellKind TableTypes::type(size_t column) const
+{
+  return types_[column].kind();
+}
+
+bool TableTypes::exceedsSigned(size_t column) const
+{
+  return types_[column].exceedsSigned();
+}
+
 } // namespace tav::inspect

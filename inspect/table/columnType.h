@@ -20,13 +20,16 @@ public:
   /// Whether a number has more than the 38 digits that decimals of 128 bits hold.
   bool exceedsDecimal() const { return exceedsDecimal_; }
 
+  /// Whether an unsigned number of 128 bits does not fit into a signed one.
+  bool exceedsSigned() const { return exceedsSigned_; }
+
 private:
   void seeWide(const Cell& cell);
   bool has(CellKind kind) const { return (kinds_ >> static_cast<unsigned>(kind) & 1U) != 0; }
 
   unsigned kinds_ = 0;         ///< a bit a kind
   uint64_t most64_ = 0;        ///< the greatest of the unsigned ones with 64 bits
-  bool exceedsSigned_ = false; ///< an unsigned one with 128 bits does not fit into a signed one
+  bool exceedsSigned_ = false;
   bool exceedsDecimal_ = false;
 };
 

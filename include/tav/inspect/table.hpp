@@ -124,6 +124,28 @@ private:
   std::vector<uint64_t> starts_{0}; ///< the first row of each chunk, and behind the last one
 };
 
+class ColumnType;
+
+/// The types that columns have over any number of tables of one query, which need not be kept for that.
+class TableTypes
+{
+public:
+  TAV_INSPECT_API explicit TableTypes(const TableQuery& query);
+  TAV_INSPECT_API ~TableTypes();
+  TableTypes(const TableTypes&) = delete;
+  TableTypes& operator=(const TableTypes&) = delete;
+
+  /// Looks at the cells of a table.
+  TAV_INSPECT_API void see(const Table& table);
+  /// As Table::type of all tables so far, one behind the other.
+  TAV_INSPECT_API CellKind type(size_t column) const;
+  /// Whether an unsigned number of 128 bits is among the cells that a signed one does not hold.
+  TAV_INSPECT_API bool exceedsSigned(size_t column) const;
+
+private:
+  std::vector<ColumnType> types_;
+};
+
 struct TableOptions
 {
   OnDamage onDamage = OnDamage::stop;

@@ -1,0 +1,80 @@
+/// Columns of the engine's chunks as they are filled.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+#include <string>
+#include <string_view>
+
+#include "duckdb/src/engine.h"
+#include "tav/inspect/value.hpp"
+
+namespace tav::sql
+{
+
+/// One column of a chunk.
+class Vector
+{
+public:
+  Vector(duckdb_data_chunk chunk, idx_t column)
+      : vector_(duckdb_data_chunk_get_vector(chunk, column)), data_(duckdb_vector_get_data(vector_)) {}
+
+  template<class T>
+  void put(idx_t row, T value)
+  {
+    static_cast<T*>(data_)[row] = value;
+  }
+  template<class T>
+  T* all()
+  {
+    return static_cast<T*>(data_);
+  }
+  void putNull(idx_t row)
+  {
+    if (validity_ == nullptr)
+    {
+      duckdb_vector_ensure_validity_writable(vector_);
+      validity_ = duckdb_vector_get_validity(vector_);
+    }
+    validity_[row / 64] &= ~(uint64_t{1} << row % 64);
+  }
+  void putHuge(idx_t row, uint64_t low, uint64_t high)
+  {
+    put(row, duckdb_hugeint{low, static_cast<int64_t>(high)});
+  }
+  void putBytes(idx_t row, std::string_view bytes)
+  {
+    constexpr size_t inlined = sizeof(duckdb_string_t::value.inlined.inlined);
+    if (bytes.size() <= inlined)
+    {
+      duckdb_string_t text{};
+      text.value.inlined.length = static_cast<uint32_t>(bytes.size());
+      if (!bytes.empty())
+      {
+        std::memcpy(text.value.inlined.inlined, bytes.data(), bytes.size());
+      }
+      put(row, text);
+      return;
+    }
+    duckdb_vector_assign_string_element_len(vector_, row, bytes.data(), bytes.size());
+  }
+  /// What is no UTF-8 stands as escapes.
+  void putText(idx_t row, std::string_view text)
+  {
+    if (inspect::isUtf8(text))
+    {
+      putBytes(row, text);
+      return;
+    }
+    const std::string escaped = inspect::quoted(text);
+    putBytes(row, std::string_view(escaped).substr(1, escaped.size() - 2));
+  }
+
+private:
+  duckdb_vector vector_;
+  void* data_;
+  uint64_t* validity_ = nullptr;
+};
+
+} // namespace tav::sql
