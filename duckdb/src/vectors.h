@@ -59,6 +59,8 @@ public:
     }
     duckdb_vector_assign_string_element_len(vector_, row, bytes.data(), bytes.size());
   }
+  /// The same text or bytes as a row before.
+  void repeat(idx_t row, idx_t before) { put(row, static_cast<duckdb_string_t*>(data_)[before]); }
   /// What is no UTF-8 stands as escapes.
   void putText(idx_t row, std::string_view text)
   {

@@ -26,6 +26,7 @@
 #include "tav/inspect/jsonWriter.hpp"
 #include "tav/inspect/locate.hpp"
 #include "tav/inspect/node.hpp"
+#include "tav/inspect/nodeColumns.hpp"
 #include "tav/inspect/patchFile.hpp"
 #include "tav/inspect/path.hpp"
 #include "tav/inspect/phrases.hpp"

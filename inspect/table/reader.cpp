@@ -5,7 +5,7 @@
 #include "inspect/document/state.h"
 #include "inspect/document/streamWalk.h"
 #include "inspect/path/walkedTree.h"
-#include "inspect/table/exactWalk.h"
+#include "inspect/walk/exactWalk.h"
 #include "inspect/table/filling.h"
 #include "tav/inspect/table.hpp"
 
@@ -24,7 +24,7 @@ class TableReader::State
 public:
   State(ByteSource& source, const Form& form, const TableQuery& query, const TableOptions& options)
       : source_(source), query_(query), sought_(query.compiled().sought), options_(options), matcher_(compiled().each),
-        filling_(compiled()), exact_(filling_),
+        filling_(compiled()), exact_(told_),
         walk_(
             source, form, [this](const PassedOver& passed) { passOver(passed); }, options.start),
         line_(1), known_(sought_.size())
@@ -58,6 +58,28 @@ private:
   {
     uint64_t offset = kNoOffset;
     uint64_t row = 0;
+  };
+
+  /// The filling as the exact steps tell it of nodes.
+  struct Told
+  {
+    bool enter(const core::Node& group)
+    {
+      const Automaton::Move move = filling.meet(group.elm());
+      const bool isWanted = !filling.automaton().isDead(move.state);
+      if (isWanted || move.isRow)
+      {
+        filling.enter(move);
+        isWanted ? void() : filling.leave();
+      }
+      return isWanted;
+    }
+    void leave() { filling.leave(); }
+    [[gnu::always_inline]] void data(const core::Node& node, const uint8_t* payload, bool swap)
+    {
+      filling.data(filling.meet(node.elm()), {node.type(), payload, node.size(), swap});
+    }
+    Filling& filling;
   };
 
   const CompiledQuery& compiled() const { return query_.compiled(); }
@@ -275,7 +297,8 @@ private:
   TableOptions options_;
   PathMatcher matcher_; ///< of the rows, when they are not plain
   Filling filling_;
-  ExactWalk exact_;
+  Told told_{filling_};
+  ExactWalk<Told> exact_;
   StreamWalk walk_;
   Event event_{};
   WalkedTree tree_{};

@@ -1,13 +1,22 @@
-#include "inspect/table/exactWalk.h"
+/// Goes through a group whose every node is as a writer makes it, by the exact steps.
+#pragma once
 
+#include <cstdint>
 #include <cstring>
+#include <span>
+#include <utility>
+#include <vector>
 
 #include "inspect/walk/sizeSuits.h"
+#include "tav/core/bytes.hpp"
+#include "tav/core/step.hpp"
+#include "tav/inspect/node.hpp"
+#include "tav/tav.h"
 
 namespace tav::inspect
 {
 
-namespace
+namespace exact
 {
 
 template<class Form>
@@ -83,34 +92,80 @@ bool pairEnds(const Bytes& bytes, const core::Node& group, const core::Level& be
          below.end - layout::kEyeSizeLength - group.offset() == layout::addSaturated(distance, missing);
 }
 
-} // namespace
+} // namespace exact
 
+/// Goes from node to node by the steps of tav::core, over bytes in memory. At whatever leaves a Walker a choice, it
+/// gives up: an open group, a size that does not suit its type or its level, bytes of padding or of a pair that are not
+/// there, strings behind which two bytes more may stand. So a group that it gets through has the nodes that a Walker
+/// finds in it, and no damage.
+///
+/// `Sink` is told of the nodes: `enter` of a group, and says whether it wants what is in it, `leave` of that one's end, `data`
+/// of a data element. Offsets count from the group's first byte.
+template<class Sink>
+class ExactWalk
+{
+public:
+  explicit ExactWalk(Sink& sink)
+      : sink_(sink) {}
+
+  /// The bytes of a closed group from its header to its end. The sink has entered it. False when it gave up, at
+  /// `reached()`: what the sink was told is to be taken back.
+  bool through(std::span<const uint8_t> bytes, const Form& form, bool wide);
+
+  /// Whether groups have been taken for plain so far: in this machine's order, without paddings and pairs. Then the
+  /// same bytes are to be tried again after a failure, from which on they are not.
+  bool expectMore() { return std::exchange(plain_, false); }
+
+  /// Offset in the bytes of the node at which it gave up.
+  uint64_t reached() const { return reached_; }
+
+private:
+  enum class Way : uint8_t
+  {
+    down,
+    up,
+    notHere
+  };
+  struct Around
+  {
+    core::Level level;
+    core::Node group;
+  };
+
+  template<class Bytes>
+  bool walk(const Bytes& bytes, const core::Node& group);
+  template<bool wide, class Bytes>
+  Way onLevel(const Bytes& bytes, const core::Level& level, bool first, core::Node& node);
+  template<class Bytes>
+  Way enter(const Bytes& bytes, const core::Node& group, const core::Level& level);
+
+  Sink& sink_;
+  std::vector<Around> around_{};
+  uint64_t reached_ = 0;
+  bool plain_ = true;
+};
+
+template<class Sink>
 template<class Bytes>
-ExactWalk::Way ExactWalk::enter(const Bytes& bytes, const core::Node& group, const core::Level& level)
+typename ExactWalk<Sink>::Way ExactWalk<Sink>::enter(const Bytes& bytes, const core::Node& group, const core::Level& level)
 {
   if (!group.wide() && group.type() == TAV_TYPE_HEADER64)
   {
     return Way::notHere;
   }
-  const Automaton::Move move = filling_.meet(group.elm());
-  if (!filling_.automaton().isDead(move.state))
+  if (sink_.enter(group))
   {
-    filling_.enter(move);
     around_.push_back({level, group});
     return Way::down;
   }
-  if (move.isRow)
-  {
-    filling_.enter(move);
-    filling_.leave();
-  }
-  const bool sure = (group.info() & TAV_INFO_EYE_SIZE) == 0 || pairEnds(bytes, group, core::levelBelowClosed(group));
+  const bool sure = (group.info() & TAV_INFO_EYE_SIZE) == 0 || exact::pairEnds(bytes, group, core::levelBelowClosed(group));
   return sure ? Way::up : Way::notHere;
 }
 
 /// Goes on on a level to a group that is wanted, or to its end.
+template<class Sink>
 template<bool wide, class Bytes>
-ExactWalk::Way ExactWalk::onLevel(const Bytes& bytes, const core::Level& level, bool first, core::Node& node)
+typename ExactWalk<Sink>::Way ExactWalk<Sink>::onLevel(const Bytes& bytes, const core::Level& level, bool first, core::Node& node)
 {
   constexpr uint64_t header = core::lengthOfHeader(wide);
   for (core::Node before = node;; before = node, first = false)
@@ -141,17 +196,18 @@ ExactWalk::Way ExactWalk::onLevel(const Bytes& bytes, const core::Level& level, 
     }
     const bool suits = layout::typeInfo(node.type()).known && sizeSuits(node.type(), node.size());
     const bool bare = core::isBare(node) && !bytes.form.alignAll;
-    if (!suits || (!bare && !endsWell(bytes, node, level.end)) ||
-        (node.type() == TAV_TYPE_UTF8_STRING && !endsAtItsSize(bytes, node, level.end))) [[unlikely]]
+    if (!suits || (!bare && !exact::endsWell(bytes, node, level.end)) ||
+        (node.type() == TAV_TYPE_UTF8_STRING && !exact::endsAtItsSize(bytes, node, level.end))) [[unlikely]]
     {
       return Way::notHere;
     }
-    filling_.data(filling_.meet(node.elm()), {node.type(), place.header + header, node.size(), bytes.form.swap});
+    sink_.data(node, place.header + header, bytes.form.swap);
   }
 }
 
+template<class Sink>
 template<class Bytes>
-bool ExactWalk::walk(const Bytes& bytes, const core::Node& group)
+bool ExactWalk<Sink>::walk(const Bytes& bytes, const core::Node& group)
 {
   core::Level level = core::levelBelowClosed(group);
   core::Node node = group;
@@ -173,14 +229,15 @@ bool ExactWalk::walk(const Bytes& bytes, const core::Node& group)
     {
       return true;
     }
-    filling_.leave();
+    sink_.leave();
     node = around_.back().group;
     level = around_.back().level;
     around_.pop_back();
   }
 }
 
-bool ExactWalk::through(std::span<const uint8_t> bytes, const Form& form, bool wide)
+template<class Sink>
+bool ExactWalk<Sink>::through(std::span<const uint8_t> bytes, const Form& form, bool wide)
 {
   TAVHandle handle{};
   handle.pDirectData = const_cast<uint8_t*>(bytes.data()); // which is only read
@@ -189,7 +246,7 @@ bool ExactWalk::through(std::span<const uint8_t> bytes, const Form& form, bool w
   handle.alignMode = form.aligned ? 1 : 0;
   const core::Node group{0, layout::decodeFields(bytes.data(), wide, form.swapped), wide};
   const bool isPlain = plain_ && !form.swapped && !form.aligned;
-  return isPlain ? walk(Block<core::HostForm>(handle), group) : walk(Block<core::AnyForm>(handle), group);
+  return isPlain ? walk(exact::Block<core::HostForm>(handle), group) : walk(exact::Block<core::AnyForm>(handle), group);
 }
 
 } // namespace tav::inspect

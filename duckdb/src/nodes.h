@@ -1,0 +1,89 @@
+/// The parts of files that the threads of one scan of nodes share.
+#pragma once
+
+#include <condition_variable>
+#include <cstdint>
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "duckdb/src/given.h"
+#include "tav/inspect/nodeColumns.hpp"
+
+namespace tav::sql
+{
+
+/// A large file in parts. A part is read before it is known whether the one before ends where it begins; its rows count
+/// when all before it do.
+class PartedFile
+{
+public:
+  PartedFile(std::string file, std::vector<inspect::Part> parts)
+      : name(std::move(file)), parts_(std::move(parts)) {}
+
+  size_t count() const { return parts_.size(); }
+  inspect::Part part(size_t number);
+
+  /// What the rows before a part were.
+  struct Before
+  {
+    uint64_t rows = 0;
+    std::vector<int64_t> around{}; ///< the rows that the groups around the part are, by level
+  };
+
+  /// Waits until all parts before this one count. Then this one does, too, and it is told what was before it; or it does
+  /// not begin where the one before ended: then nothing, and it is to be read once more as `part` gives it now. Throws
+  /// Error where one before has failed.
+  std::optional<Before> settle(size_t number, uint64_t rows, const std::vector<int64_t>& open,
+                               const inspect::PartEnd& end);
+  /// The part cannot be read: those behind it do not wait for it any more.
+  void fail();
+
+  const std::string name;
+
+private:
+  std::mutex mutex_{};
+  std::condition_variable changed_{};
+  std::vector<inspect::Part> parts_;
+  std::vector<inspect::PartEnd> ends_{}; ///< of those that count
+  Before behind_{};
+  bool failed_ = false;
+};
+
+/// What a thread reads next: a file, or a part of one.
+struct NodeTask
+{
+  std::string file{};
+  std::shared_ptr<PartedFile> parted{}; ///< null: the whole file
+  size_t part = 0;
+};
+
+/// Hands out files, and parts of large ones, in their order.
+class NodeTasks
+{
+public:
+  /// `whole`: no file is cut.
+  NodeTasks(const Given& given, bool whole)
+      : given_(given), whole_(whole) {}
+
+  std::optional<NodeTask> next();
+  /// How many there are, about.
+  uint64_t count() const;
+
+private:
+  static constexpr uint64_t kLarge = uint64_t{16} << 20U; ///< bytes from which on a file is cut
+  static constexpr uint64_t kPart = uint64_t{4} << 20U;
+
+  uint64_t sizeOf(const std::string& file) const;
+
+  const Given& given_;
+  bool whole_;
+  std::mutex mutex_{};
+  size_t file_ = 0;
+  std::shared_ptr<PartedFile> parted_{}; ///< of which parts are left
+  size_t part_ = 0;
+};
+
+} // namespace tav::sql

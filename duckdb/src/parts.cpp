@@ -1,0 +1,99 @@
+// Large files in parts, which several threads read.
+#include <algorithm>
+#include <filesystem>
+#include <system_error>
+#include <utility>
+
+#include "duckdb/src/nodes.h"
+#include "tav/inspect/problem.hpp"
+
+namespace tav::sql
+{
+
+inspect::Part PartedFile::part(size_t number)
+{
+  const std::lock_guard lock(mutex_);
+  return parts_[number];
+}
+
+std::optional<PartedFile::Before> PartedFile::settle(size_t number, uint64_t rows, const std::vector<int64_t>& open,
+                                                     const inspect::PartEnd& end)
+{
+  std::unique_lock lock(mutex_);
+  changed_.wait(lock, [&] { return failed_ || ends_.size() == number; });
+  if (failed_)
+  {
+    throw inspect::Error(inspect::Problem{.file = name, .sentence = "a part of the file before this one cannot be read"});
+  }
+  ends_.push_back(end);
+  if (inspect::mendParts(std::span(parts_).first(number + 1), ends_))
+  {
+    ends_.pop_back();
+    return {};
+  }
+  Before before = behind_;
+  behind_.rows += rows;
+  behind_.around.clear();
+  for (const int64_t row : open)
+  {
+    const bool isBefore = row < 0;
+    behind_.around.push_back(isBefore ? before.around[static_cast<size_t>(-2 - row)]
+                                      : static_cast<int64_t>(before.rows) + row);
+  }
+  changed_.notify_all();
+  return before;
+}
+
+void PartedFile::fail()
+{
+  const std::lock_guard lock(mutex_);
+  failed_ = true;
+  changed_.notify_all();
+}
+
+uint64_t NodeTasks::sizeOf(const std::string& file) const
+{
+  std::error_code ec;
+  const uint64_t size = std::filesystem::file_size(file, ec);
+  return ec ? 0 : size;
+}
+
+uint64_t NodeTasks::count() const
+{
+  uint64_t count = 0;
+  for (const std::string& file : given_.files)
+  {
+    const uint64_t size = whole_ ? 0 : sizeOf(file);
+    count += size < kLarge ? 1 : size / kPart + 1;
+  }
+  return count;
+}
+
+std::optional<NodeTask> NodeTasks::next()
+{
+  const std::lock_guard lock(mutex_);
+  if (parted_ == nullptr)
+  {
+    if (file_ == given_.files.size())
+    {
+      return {};
+    }
+    const std::string& file = given_.files[file_++];
+    if (whole_ || sizeOf(file) < kLarge)
+    {
+      return NodeTask{.file = file};
+    }
+    const inspect::Document document = given_.open(file);
+    parted_ = std::make_shared<PartedFile>(
+        file, inspect::plan(document.source(), {.targetBytes = kPart, .form = given_.form}));
+    part_ = 0;
+  }
+  NodeTask task{parted_->name, parted_, part_++};
+  if (part_ == parted_->count())
+  {
+    parted_.reset();
+  }
+  return task;
+}
+
+} // namespace tav::sql

@@ -1,0 +1,281 @@
+#include <algorithm>
+#include <array>
+#include <span>
+#include <utility>
+
+#include "inspect/columns/addRow.h"
+#include "inspect/walk/exactWalk.h"
+
+namespace tav::inspect
+{
+
+namespace
+{
+
+constexpr uint64_t kMostAtOnce = uint64_t{4} * 1024 * 1024; ///< bytes of a group that is read by the exact steps
+constexpr size_t kMostText = size_t{16} * 1024 * 1024;      ///< of paths that are handed out at once
+
+/// All of a file.
+Part wholeOf(const ByteSource& source, const Form& form)
+{
+  Part part;
+  part.size = source.size();
+  part.form = form;
+  part.wide = form.root64;
+  return part;
+}
+
+uint16_t keyOf(uint32_t info)
+{
+  return static_cast<uint16_t>(info & TAV_INFO_KEY_MASK);
+}
+
+} // namespace
+
+class NodeReader::State
+{
+public:
+  State(ByteSource& source, const Part& part, const NodeReaderOptions& options)
+      : source_(source), options_(options), exact_(told_),
+        walk_(source, part, [this](const PassedOver& passed) { passOver(passed); })
+  {
+    for (size_t level = 0; level < part.around.size(); ++level)
+    {
+      open_.push_back(-2 - static_cast<int64_t>(level));
+    }
+  }
+
+  bool read(NodeColumns& out, size_t rows)
+  {
+    columns_ = &out;
+    const size_t before = out.count();
+    size_t texts = 0;
+    while (!done_ && out.count() - before < rows && texts < kMostText)
+    {
+      done_ = !step(texts);
+    }
+    return out.count() != before;
+  }
+
+  const std::optional<Problem>& stopped() const { return stopped_; }
+  PartEnd end() const { return walk_.end(); }
+
+  /// Of the groups around the place, at the end.
+  const std::vector<int64_t>& open()
+  {
+    open_.resize(std::min(open_.size(), walk_.walker().depth()));
+    return open_;
+  }
+
+private:
+  /// The columns as the exact steps tell them of nodes.
+  struct Told
+  {
+    bool enter(const core::Node& group)
+    {
+      state.add(factsOf(group, nullptr, false), true);
+      return true;
+    }
+    void leave() { state.open_.pop_back(); }
+    [[gnu::always_inline]] void data(const core::Node& node, const uint8_t* payload, bool swap)
+    {
+      if (!layout::isEndElement(node.elm())) [[likely]]
+      {
+        state.add(factsOf(node, state.options_.values ? payload : nullptr, swap), false);
+      }
+    }
+    NodeFacts factsOf(const core::Node& node, const uint8_t* payload, bool swap) const
+    {
+      return {state.base_ + node.offset(), node.size(), state.open_.size(), node.elm(), node.type(), keyOf(node.info()),
+              swap, payload};
+    }
+    State& state;
+  };
+
+  [[gnu::always_inline]] void add(const NodeFacts& facts, bool isGroup)
+  {
+    columns_->addRow(facts, open_.empty() ? NodeColumns::kNoParent : open_.back());
+    if (isGroup)
+    {
+      open_.push_back(static_cast<int64_t>(rows_));
+    }
+    ++rows_;
+  }
+
+  void passOver(const PassedOver& passed)
+  {
+    if (options_.onDamage == OnDamage::skip)
+    {
+      options_.passedOver ? options_.passedOver(passed) : void();
+    }
+    else if (!stopped_)
+    {
+      stopped_ = Problem{.file = source_.name(),
+                         .offset = passed.offset,
+                         .path = passed.path,
+                         .sentence = passed.reason,
+                         .code = passed.code};
+    }
+  }
+
+  bool step(size_t& texts)
+  {
+    const bool more = walk_.next(event_) && !stopped_;
+    if (more && event_.what == What::nodeBegin && !isEndPiece(event_))
+    {
+      begin();
+      if (options_.paths)
+      {
+        columns_->paths.push_back(walk_.walker().path(event_));
+        texts += columns_->paths.back().size();
+      }
+      else if (event_.node.isGroup())
+      {
+        goThrough();
+      }
+    }
+    return more;
+  }
+
+  void begin()
+  {
+    const Node& node = event_.node;
+    const bool isGroup = node.isGroup();
+    open_.resize(std::min(open_.size(), static_cast<size_t>(event_.depth)));
+    const uint8_t* const payload = isGroup || !options_.values ? nullptr : payloadOf(node);
+    add({node.offset(), node.size(), event_.depth, node.elm(), node.type(), keyOf(node.info()), walk_.form().swapped,
+         payload},
+        isGroup);
+  }
+
+  /// The payload, where it is whole: in memory, or in what the columns keep. Numbers are only looked at.
+  const uint8_t* payloadOf(const Node& node)
+  {
+    const uint64_t from = node.payloadOffset();
+    const uint64_t size = node.size();
+    if (from > source_.size() || size > source_.size() - from)
+    {
+      return nullptr;
+    }
+    if (source_.isMemory())
+    {
+      return source_.view(from).data();
+    }
+    uint8_t* to = small_.data();
+    const bool isSmall = size <= small_.size() && isWord(node.type(), size);
+    if (!isSmall)
+    {
+      auto kept = std::make_shared<std::vector<uint8_t>>(static_cast<size_t>(size) + 1);
+      to = kept->data();
+      columns_->keep(std::move(kept));
+    }
+    return source_.read(from, std::span(to, static_cast<size_t>(size))) == size ? to : nullptr;
+  }
+
+  /// Whether the value goes into a column as it is read.
+  static bool isWord(uint16_t type, uint64_t size)
+  {
+    const bool isNumber = type == TAV_TYPE_BYTE || (tav::detail::isIntegerType(type) && type != TAV_TYPE_UINT128 &&
+                                                    type != TAV_TYPE_SINT128);
+    return (isNumber || type == TAV_TYPE_UTC_TIMESTAMP) && sizeSuits(type, size);
+  }
+
+  /// Reads a group by the exact steps, unless it is one that they are known to give up in. Of a group around it the
+  /// Walker then goes on, so that each byte is gone through twice at the most.
+  void goThrough()
+  {
+    const Node& node = event_.node;
+    const uint64_t size = node.limit - node.offset();
+    const bool fails = node.offset() <= failed_ && failed_ < node.limit;
+    if (node.has(kOpen) || node.has(kOverrun) || size > kMostAtOnce || fails || node.offset() < notBefore_)
+    {
+      return;
+    }
+    const std::span<const uint8_t> bytes = bytesOf(node.offset(), size);
+    while (bytes.size() == size && !tryExact(bytes) && exact_.expectMore())
+    {
+    }
+  }
+
+  bool tryExact(std::span<const uint8_t> bytes)
+  {
+    const Node& node = event_.node;
+    const size_t count = columns_->count();
+    const uint64_t rows = rows_;
+    base_ = node.offset();
+    const bool done = exact_.through(bytes, walk_.form(), node.is64());
+    open_.resize(static_cast<size_t>(event_.depth) + 1);
+    if (done && walk_.skip())
+    {
+      return true;
+    }
+    failed_ = done ? failed_ : node.offset() + exact_.reached();
+    notBefore_ = done ? node.limit : notBefore_;
+    columns_->cut(count);
+    rows_ = rows;
+    return done;
+  }
+
+  std::span<const uint8_t> bytesOf(uint64_t offset, uint64_t size)
+  {
+    if (source_.isMemory())
+    {
+      return source_.view(offset).first(static_cast<size_t>(size));
+    }
+    auto bytes = std::make_shared<std::vector<uint8_t>>(static_cast<size_t>(size));
+    bytes->resize(source_.read(offset, *bytes));
+    const std::span<const uint8_t> all = *bytes;
+    columns_->keep(std::move(bytes));
+    return all;
+  }
+
+  ByteSource& source_;
+  NodeReaderOptions options_;
+  NodeColumns* columns_ = nullptr;
+  Told told_{*this};
+  ExactWalk<Told> exact_;
+  std::optional<Problem> stopped_{};
+  PartWalk walk_;
+  Event event_{};
+  std::vector<int64_t> open_{}; ///< the rows of the groups around, by level
+  uint64_t rows_ = 0;           ///< so far
+  uint64_t base_ = 0;           ///< of the group that the exact steps are in
+  uint64_t failed_ = kNoOffset; ///< where the exact steps gave up last
+  uint64_t notBefore_ = 0;      ///< they are not tried before
+  std::array<uint8_t, 16> small_{};
+  bool done_ = false;
+};
+
+NodeReader::NodeReader(ByteSource& source, const Form& form, const NodeReaderOptions& options)
+    : NodeReader(source, wholeOf(source, form), options)
+{
+}
+
+NodeReader::NodeReader(ByteSource& source, const Part& part, const NodeReaderOptions& options)
+    : state_(std::make_unique<State>(source, part, options))
+{
+}
+
+NodeReader::~NodeReader() = default;
+
+bool NodeReader::next(NodeColumns& out, size_t rows)
+{
+  return state_->read(out, std::max<size_t>(rows, 1));
+}
+
+const std::optional<Problem>& NodeReader::stopped() const noexcept
+{
+  return state_->stopped();
+}
+
+PartEnd NodeReader::end() const
+{
+  return state_->end();
+}
+
+const std::vector<int64_t>& NodeReader::open() const noexcept
+{
+  return state_->open();
+}
+
+} // namespace tav::inspect
