@@ -1,0 +1,45 @@
+// Makes the page: one HTML file of the sources in page/ and the module.
+//   node bundle.mjs MODULE.wasm OUT.html
+import { createHash } from "node:crypto";
+import { mkdirSync, readFileSync, writeFileSync } from "node:fs";
+import { dirname, join } from "node:path";
+import { gzipSync } from "node:zlib";
+import { buildSync, transformSync } from "esbuild";
+
+const MOST_PAGE = 300 * 1024;
+const MOST_MODULE = 150 * 1024;
+
+const here = dirname(new URL(import.meta.url).pathname);
+const [modulePath, out] = process.argv.slice(2);
+const source = (name) => readFileSync(join(here, "page", name), "utf8");
+
+function bundled(name) {
+  const { outputFiles } = buildSync({
+    entryPoints: [join(here, "page", name)], bundle: true, write: false, minify: true, format: "iife",
+    target: ["chrome103", "firefox113", "safari16.4"], charset: "utf8", legalComments: "none",
+  });
+  return outputFiles[0].text.trimEnd().replaceAll("</script", "<\\/script");
+}
+
+const hashOf = (text) => `'sha256-${createHash("sha256").update(text).digest("base64")}'`;
+const script = bundled("main.js");
+const style = transformSync(source("style.css"), { loader: "css", minify: true }).code.trimEnd();
+const packed = gzipSync(readFileSync(modulePath), { level: 9 });
+const policy = [
+  "default-src 'none'",
+  `script-src ${hashOf(script)} 'wasm-unsafe-eval'`,
+  `style-src ${hashOf(style)}`,
+  "worker-src blob:",
+  "img-src data:",
+  "base-uri 'none'",
+  "form-action 'none'",
+].join("; ");
+const parts = { POLICY: policy, STYLE: style, SCRIPT: script, WORKER: bundled("worker.js"), MODULE: packed.toString("base64") };
+const page = source("index.html").replace(/%([A-Z]+)%/g, (_, name) => parts[name]);
+
+mkdirSync(dirname(out), { recursive: true });
+writeFileSync(out, page);
+const kilobytes = (bytes) => `${Math.ceil(bytes / 1024)} KB`;
+console.log(`${out}: ${kilobytes(Buffer.byteLength(page))}, its module ${kilobytes(packed.length)}`);
+const rest = Buffer.byteLength(page) - parts.MODULE.length;
+console.log(`the page without its module: ${kilobytes(rest)}`);
