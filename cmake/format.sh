@@ -10,7 +10,7 @@ cd "$(dirname "${BASH_SOURCE[0]}")/.."
 
 sources()
 {
-  find . \( -path ./build -o -path ./.git \) -prune -o \( -name '*.h' -o -name '*.hpp' -o -name '*.cpp' \) -print0
+  find . \( -path ./build -o -path ./.git -o -path ./web/node_modules \) -prune -o \( -name '*.h' -o -name '*.hpp' -o -name '*.cpp' \) -print0
 }
 
 # FILE:LINE of each line that is too long.

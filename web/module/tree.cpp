@@ -40,7 +40,7 @@ Level::Level(const Walker& walker, const Event& group)
 }
 
 Level::Cursor::Cursor(Level& level, const Mark& mark)
-    : level_(level), walker_(std::make_unique<Walker>(Walker::from(level.source_, mark.form, mark.state))),
+    : level_(level), walker_(std::make_unique<Walker>(Walker::from(level.source_, mark.form, mark.state, kBudget))),
       streamOffset_(mark.streamOffset)
 {
 }
@@ -65,8 +65,8 @@ bool Level::Cursor::goOnInOtherForm(const Event& event)
   if (other)
   {
     const Form form = ownForm(level_.source_, *other, event.offset);
-    walker_ = std::make_unique<Walker>(level_.source_, form,
-                                       inspect::WalkStart{.offset = event.offset, .wide = form.root64});
+    walker_ = std::make_unique<Walker>(
+        level_.source_, form, inspect::WalkStart{.offset = event.offset, .wide = form.root64, .budget = kBudget});
     streamOffset_ = event.offset;
   }
   return other.has_value();
@@ -143,6 +143,7 @@ bool Level::count(uint64_t most)
       {
         mark->row = rows_;
         marks_.push_back(std::move(*mark));
+        counting_ = std::make_unique<Cursor>(*this, marks_.back()); // as whoever reads from there does
       }
     }
     if (!counting_->next(event))

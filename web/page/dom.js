@@ -6,9 +6,9 @@ export function h(name, attributes = {}, ...children) {
   for (const [key, value] of Object.entries(attributes)) {
     if (typeof value === "function") {
       element.addEventListener(key.slice(2), value);
-    } else if (value === true) {
+    } else if (value === true && !key.startsWith("aria-")) {
       element.setAttribute(key, "");
-    } else if (value !== false && value !== undefined) {
+    } else if (value !== undefined && (value !== false || key.startsWith("aria-"))) {
       element.setAttribute(key, String(value));
     }
   }

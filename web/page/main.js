@@ -5,7 +5,7 @@ import { Bytes } from "./bytes.js";
 import { byId, copy, counted, fill, h, hex } from "./dom.js";
 import { setUpPanels } from "./panels.js";
 
-export const page = {
+export const page = globalThis.tavPage = {
   given: undefined, // {name, file}
   choice: { order: 0, bits: 0, padding: 0, dictionary: "" },
   engine: undefined,
@@ -18,15 +18,29 @@ export function say(text, isBad = false) {
   byId("status").classList.toggle("bad", isBad);
 }
 
-export function complain(error) {
+let pending = 0;
+
+/** Runs what a user asked for: says what is wrong with it, and that it goes on. */
+export async function run(what) {
+  ++pending;
+  document.body.setAttribute("aria-busy", "true");
+  try {
+    await what();
+  } catch (error) {
+    complain(error);
+  } finally {
+    document.body.setAttribute("aria-busy", String(--pending > 0));
+  }
+}
+
+function complain(error) {
   if (!(error instanceof Stopped)) {
     say(error.hint ? `${error.message}. ${error.hint}` : error.message, true);
   }
 }
 
 const tree = new Tree(byId("tree"), showRow);
-const bytes = new Bytes(byId("bytes"), (offset) => goTo(offset, false).catch(complain));
-tree.onCounted = () => { document.documentElement.dataset.counted = tree.rows; };
+const bytes = new Bytes(byId("bytes"), (offset) => run(() => goTo(offset)));
 
 /** Goes to the innermost node around an offset. */
 export async function goTo(offset) {
@@ -129,35 +143,33 @@ const copies = {
 function setUp() {
   byId("open").addEventListener("change", (event) => {
     const [file] = event.target.files;
-    file && open(file).catch(complain);
+    file && run(() => open(file));
   });
   addEventListener("dragover", (event) => event.preventDefault());
   addEventListener("drop", (event) => {
     event.preventDefault();
     const [file] = event.dataTransfer.files;
-    file && open(file).catch(complain);
+    file && run(() => open(file));
   });
   for (const name of ["order", "bits", "padding"]) {
     byId(name).addEventListener("change", (event) => {
       page.choice[name] = Number(event.target.value);
-      page.given && reopen().catch(complain);
+      page.given && run(reopen);
     });
   }
   for (const button of document.querySelectorAll("[data-copy]")) {
-    button.addEventListener("click", async () => {
-      try {
-        const text = await copies[button.dataset.copy]();
-        await copy(text);
-        document.documentElement.dataset.copied = text;
-        say(`copied ${counted(text.length, "character")}`);
-      } catch (error) {
-        complain(error);
+    button.addEventListener("click", () => run(async () => {
+      if (page.place === undefined) {
+        throw new Error("nothing is selected");
       }
-    });
+      const text = await copies[button.dataset.copy]();
+      await copy(text);
+      say(`copied ${counted(text.length, "character")}`);
+    }));
   }
   addEventListener("hashchange", () => {
     const wanted = new URLSearchParams(location.hash.slice(1)).get("path");
-    wanted && page.engine && goToPath(wanted).catch(complain);
+    wanted && page.engine && run(() => goToPath(wanted));
   });
   setUpPanels();
 }

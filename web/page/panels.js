@@ -2,7 +2,7 @@
 import { Engine, Stopped } from "./engine.js";
 import { byId, counted, fill, h, hex, save } from "./dom.js";
 import { drawPlot } from "./plot.js";
-import { complain, goTo, page, reopen, say } from "./main.js";
+import { goTo, page, reopen, run, say } from "./main.js";
 
 const MOST = 10_000; // places that are listed
 const MOST_ROWS = 1_000_000;
@@ -48,7 +48,7 @@ class Places {
       return;
     }
     this.#waiting.push(h("li", {}, h("button", { type: "button", class: "place", "data-offset": offset,
-      onclick: () => goTo(offset).catch(complain) },
+      onclick: () => run(() => goTo(offset)) },
       ...texts.filter((text) => text).map((text, i) => h("span", { class: `part${i}` }, text)))));
     this.pending ??= requestAnimationFrame(() => this.put());
   }
@@ -86,7 +86,7 @@ async function find() {
       places.add(row.offset, row.path ?? hex(row.offset), row.value ?? counted(row.length ?? 0, "byte"));
       if (first) {
         first = false;
-        goTo(row.offset).catch(complain);
+        run(() => goTo(row.offset));
       }
     },
   });
@@ -201,7 +201,7 @@ async function takeNames() {
 }
 
 function on(id, what) {
-  byId(id).addEventListener("click", () => (page.engine ? what().catch(complain) : say("open a file first", true)));
+  byId(id).addEventListener("click", () => (page.engine ? run(what) : say("open a file first", true)));
 }
 
 function choose(tab) {
@@ -225,9 +225,13 @@ export function setUpPanels() {
     document.body.classList.remove("working");
     say("stopped");
   });
-  byId("names").addEventListener("change", () => takeNames().catch((error) => {
-    page.choice.dictionary = "";
-    complain(error);
+  byId("names").addEventListener("change", () => run(async () => {
+    try {
+      await takeNames();
+    } catch (error) {
+      page.choice.dictionary = "";
+      throw error;
+    }
   }));
   byId("saveTable").addEventListener("click", () =>
     save(new Blob(csvOf(table), { type: "text/csv" }), `${page.given.name}.csv`));

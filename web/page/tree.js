@@ -2,6 +2,7 @@
 import { h, hex, counted } from "./dom.js";
 import { Rows } from "./rows.js";
 
+const UNREAD = "not looked at here: too many bytes that are no nodes; checking goes through them";
 const PAGE = 64; // rows that are asked for at once
 
 /** The children of one node that is open. */
@@ -102,7 +103,6 @@ export class Tree {
         this.view.later();
       }
     }
-    this.onCounted?.();
   }
 
   /** A row's data; undefined, and drawn again later, while it is on its way. */
@@ -165,7 +165,7 @@ export class Tree {
         isGroup ? (isOpen ? "▾" : "▸") : ""),
       h("span", { class: "name" }, data.step ?? `${data.kind}: ${counted(data.length, "byte")}`),
       h("span", { class: "type" }, data.type ?? ""),
-      h("span", { class: "value" }, data.value ?? data.reason ?? "", data.unit && data.unit !== "1" ? ` ${data.unit}` : ""),
+      h("span", { class: "value" }, data.value ?? (data.kind === "unread" ? UNREAD : data.reason ?? ""), data.unit && data.unit !== "1" ? ` ${data.unit}` : ""),
       h("span", { class: "remark" }, (data.remarks ?? []).join(", ")),
       h("span", { class: "offset" }, hex(data.offset)),
     );

@@ -1,0 +1,105 @@
+// A browser with the page, and what the tests do in it.
+import { mkdtempSync, existsSync, readdirSync, readFileSync, rmSync, writeFileSync } from "node:fs";
+import { tmpdir } from "node:os";
+import { join } from "node:path";
+import { pathToFileURL } from "node:url";
+import puppeteer from "puppeteer-core";
+
+const PAGE = join(import.meta.dirname, "../dist/tav.html");
+const BROWSER = process.env.TAV_BROWSER ?? "/usr/bin/chromium";
+
+export const folder = mkdtempSync(join(tmpdir(), "tav-page-"));
+
+let browser;
+
+export async function start() {
+  browser = await puppeteer.launch({
+    executablePath: BROWSER,
+    args: process.getuid() === 0 ? ["--no-sandbox"] : [],
+  });
+}
+
+export async function end() {
+  await browser?.close();
+  rmSync(folder, { recursive: true, force: true });
+}
+
+/** Writes a file for the page. */
+export function made(name, bytes) {
+  const path = join(folder, name);
+  writeFileSync(path, bytes);
+  return path;
+}
+
+/** The page in a tab of its own, from the disk unless an address is given. `page.requests`: what it asked for. */
+export async function visit({ address = pathToFileURL(PAGE).href, ...viewport } = {}) {
+  const page = await browser.newPage();
+  await page.setViewport({ width: 1200, height: 800, ...viewport });
+  page.requests = [];
+  page.errors = [];
+  page.on("request", (request) => page.requests.push(request.url()));
+  page.on("pageerror", (error) => page.errors.push(error.message));
+  page.on("console", (message) => message.type() === "error" && page.errors.push(message.text()));
+  await page.goto(address);
+  return page;
+}
+
+/** Waits until what was asked for is done. */
+export async function settled(page) {
+  await page.waitForFunction(() => document.body.getAttribute("aria-busy") === "false", { timeout: 60_000 });
+}
+
+export async function open(page, path) {
+  await (await page.$("#open")).uploadFile(path);
+  await settled(page);
+}
+
+export async function click(page, selector) {
+  await page.$eval(selector, (element) => element.click());
+  await settled(page);
+}
+
+export async function tab(page, name) {
+  await page.$eval(`#tab${name}`, (element) => element.click());
+}
+
+export const textOf = (page, selector) => page.$eval(selector, (element) => element.textContent);
+
+/** The rows of the tree that are in view, as {name, type, value}. */
+export async function rows(page) {
+  await page.waitForFunction(() => document.querySelectorAll("#tree .coming").length === 0);
+  return page.$$eval("#tree .row", (all) => all.map((row) => ({
+    name: row.querySelector(".name").textContent,
+    type: row.querySelector(".type").textContent,
+    value: row.querySelector(".value").textContent,
+    selected: row.getAttribute("aria-selected") === "true",
+  })));
+}
+
+/** What the page shows of the selected node. */
+export const node = (page) => page.$$eval("#node dt", (names) =>
+  Object.fromEntries(names.map((name) => [name.textContent, name.nextElementSibling.textContent])));
+
+export async function find(page, how, what) {
+  await tab(page, "Find");
+  await page.select("#findHow", how);
+  await page.$eval("#findWhat", (input, value) => { input.value = value; }, what);
+  await click(page, "#findRun");
+}
+
+/** The file that a click saves. */
+export async function saved(page, selector) {
+  const target = mkdtempSync(join(folder, "saved-"));
+  const session = await browser.target().createCDPSession();
+  await session.send("Browser.setDownloadBehavior", { behavior: "allow", downloadPath: target });
+  await page.$eval(selector, (element) => element.click());
+  const end = Date.now() + 20_000;
+  while (Date.now() < end) {
+    const [name] = readdirSync(target).filter((file) => !file.endsWith(".crdownload"));
+    if (name !== undefined && existsSync(join(target, name))) {
+      return { name, path: join(target, name), bytes: readFileSync(join(target, name)) };
+    }
+    await new Promise((resolve) => setTimeout(resolve, 50));
+  }
+  throw new Error("nothing was saved");
+}

@@ -1,0 +1,212 @@
+// What goes through a whole file: check, recover, compare, table, own names; and what a click saves.
+import assert from "node:assert/strict";
+import { after, before, test } from "node:test";
+import { click, end, find, made, node, open, rows, saved, settled, start, tab, textOf, visit } from "./browser.mjs";
+import { CPU_ONLINE, HOST, HOST_NAME, SYSTEM, golden, goldenNames, group, hosts, many, number, text, time } from "./streams.mjs";
+
+before(start);
+after(end);
+
+const items = (page, list) => page.$$eval(`#${list} li`, (all) => all.map((item) => item.textContent));
+
+async function check(page) {
+  await tab(page, "Check");
+  await click(page, "#checkRun");
+  return items(page, "findings");
+}
+
+async function recover(page) {
+  await tab(page, "Recover");
+  await click(page, "#recoverRun");
+  return page.$$eval("#account dt", (names) =>
+    Object.fromEntries(names.map((name) => [name.textContent, name.nextElementSibling.textContent])));
+}
+
+/** The second of two hosts' names claims more than there is. */
+function damaged() {
+  const bytes = hosts("ada", "grace", "hedy");
+  const at = bytes.indexOf("grace") - 2 - 16;
+  bytes.fill(0xff, at, at + 3);
+  return { bytes, at };
+}
+
+test("checking a sound file finds nothing", async () => {
+  const page = await visit();
+  await open(page, made("sound.tav", hosts("ada")));
+  assert.deepEqual(await check(page), []);
+  assert.match(await textOf(page, "#status"), /^4 nodes, 0 findings/);
+  await page.close();
+});
+
+test("a finding leads to its place", async () => {
+  const page = await visit();
+  const { bytes, at } = damaged();
+  await open(page, made("damaged.tav", bytes));
+  const found = await check(page);
+  assert.ok(found.length > 0);
+  assert.match(found.join("\n"), new RegExp(`0x${at.toString(16)}`));
+  await find(page, "offset", "0");
+  await tab(page, "Check");
+  await click(page, `#findings [data-offset="${at}"]`);
+  assert.equal((await node(page)).offset, `0x${at.toString(16)}`);
+  await page.close();
+});
+
+test("recovering accounts for every byte, and what a click saves is sound", async () => {
+  const page = await visit();
+  const { bytes } = damaged();
+  await open(page, made("broken.tav", bytes));
+  const account = await recover(page);
+  const [, all, kept, lost, unread] = /^(\d+) = (\d+) kept \+ (\d+) lost \+ (\d+) unread$/.exec(account.bytes).map(Number);
+  assert.equal(all, bytes.length);
+  assert.equal(kept + lost + unread, all);
+  assert.ok(lost > 0);
+  const file = await saved(page, "#saveRecovered");
+  assert.equal(file.name, "broken.recovered.tav");
+  assert.equal(file.bytes.length, Number(/^[\d,]+/.exec(account.written)[0].replaceAll(",", "")));
+  await open(page, file.path);
+  assert.deepEqual(await check(page), []);
+  await find(page, "path", "//hostName[.='hedy']");
+  assert.equal((await node(page)).value, "hedy");
+  await page.close();
+});
+
+test("damaged golden files are gone through to their ends", async () => {
+  const page = await visit();
+  for (const name of goldenNames()) {
+    const whole = golden(name);
+    for (const [what, harm] of [["cut", (b) => b.subarray(0, b.length - 3)], ["flipped", (b) => {
+      b.fill(0xff, 17, 20);
+      return b;
+    }]]) {
+      const bytes = harm(Buffer.from(whole));
+      await open(page, made(`${name}.${what}.tav`, bytes));
+      if (/no stream/.test(await textOf(page, "#form"))) {
+        continue;
+      }
+      await check(page);
+      assert.match(await textOf(page, "#status"), /findings?/, `${name} ${what}`);
+      const account = await recover(page);
+      assert.equal(Number(/^\d+/.exec(account.bytes)[0]), bytes.length, `${name} ${what}`);
+    }
+  }
+  assert.deepEqual(page.errors, []);
+  await page.close();
+});
+
+test("two files are compared, and a difference leads to its place", async () => {
+  const page = await visit();
+  await open(page, made("before.tav", hosts("ada", "grace")));
+  const other = hosts("ada", "grace");
+  other.writeUInt32LE(77, other.length - 4);
+  await tab(page, "Diff");
+  await click(page, "#diffRun");
+  assert.equal(await textOf(page, "#status"), "there is no other file yet");
+  await (await page.$("#other")).uploadFile(made("after.tav", other));
+  await click(page, "#diffRun");
+  const found = await items(page, "differences");
+  assert.equal(found.length, 1);
+  assert.match(found[0], /^changed.*\/system\/host\[2\]\/cpuOnline.*9 -> 77$/);
+  await click(page, "#differences button");
+  assert.equal((await node(page)).path, "/system/host[2]/cpuOnline");
+  await (await page.$("#other")).uploadFile(made("same.tav", hosts("ada", "grace")));
+  await click(page, "#diffRun");
+  assert.equal(await textOf(page, "#status"), "no difference");
+  await page.close();
+});
+
+test("a table is saved as CSV and drawn over time", async () => {
+  const page = await visit();
+  const stream = group(SYSTEM, ...[8, 5, 7].map((processors, i) =>
+    group(HOST, time(974, 1_700_000_000 + 60 * i), text(HOST_NAME, i === 1 ? 'a,"b"' : "ada"), number(CPU_ONLINE, processors))));
+  await open(page, made("series.tav", stream));
+  await tab(page, "Table");
+  await page.$eval("#each", (input) => { input.value = "//host"; });
+  await page.$eval("#columns", (input) => { input.value = "when=insert_timestamp\nname=hostName\ncpuOnline\nosName"; });
+  await click(page, "#tableRun");
+  assert.equal(await textOf(page, "#status"), "3 rows");
+  const lines = await page.$$eval("#plot polyline", (all) => all.map((line) => line.getAttribute("points").split(" ").length));
+  assert.deepEqual(lines, [3]);
+  assert.match(await textOf(page, "#plot"), /2023-11-14T22:13:20/);
+  const file = await saved(page, "#saveTable");
+  assert.equal(file.name, "series.tav.csv");
+  assert.equal(file.bytes.toString(), "when,name,cpuOnline,osName\n" +
+    "2023-11-14T22:13:20.000000Z,ada,8,\n" +
+    '2023-11-14T22:14:20.000000Z,"a,""b""",5,\n' +
+    "2023-11-14T22:15:20.000000Z,ada,7,\n");
+  await page.close();
+});
+
+test("own names are shown with their units and meaning", async () => {
+  const page = await visit();
+  await open(page, made("own.tav", group(SYSTEM, number(40001, 7))));
+  assert.equal((await rows(page))[1].name, "#40001");
+  const names = { 40001: { tag: "queueDepth", kind: "gauge", unit: "jobs", text: "waiting <b>now</b>" } };
+  await (await page.$("#names")).uploadFile(made("names.json", JSON.stringify(names)));
+  await settled(page);
+  await find(page, "path", "//queueDepth");
+  const told = await node(page);
+  assert.equal(told.meaning, "waiting <b>now</b>");
+  assert.equal(told.unit, "jobs");
+  await (await page.$("#names")).uploadFile(made("bad.json", '{"40001": 5}'));
+  await settled(page);
+  assert.match(await textOf(page, "#status"), /line 1/);
+  await page.close();
+});
+
+test("a node is copied as a path, JSON, C++ and Python", async () => {
+  const page = await visit();
+  await open(page, made("copies.tav", hosts("ada")));
+  await find(page, "path", "//hostName");
+  await page.evaluate(() => {
+    navigator.clipboard.writeText = async (text) => { globalThis.copied = text; };
+  });
+  const copied = async (how) => {
+    await click(page, `[data-copy=${how}]`);
+    return page.evaluate(() => globalThis.copied);
+  };
+  assert.equal(await copied("path"), "/system/host/hostName");
+  assert.deepEqual(JSON.parse((await copied("json")).trim().split("\n").at(-1)).value, "ada");
+  assert.match(await copied("cpp"), /document\.find\("\/system\/host\/hostName"\)/);
+  assert.match(await copied("python"), /reader\.findall\("\/system\/host\/hostName"\)/);
+  await page.close();
+});
+
+test("the page answers while a file is checked, says how far it is, and stops", async () => {
+  const page = await visit();
+  await open(page, made("long.tav", many(2_000_000)));
+  await tab(page, "Check");
+  await page.evaluate(() => {
+    globalThis.tasks = [];
+    globalThis.told = new Set();
+    new PerformanceObserver((list) => globalThis.tasks.push(...list.getEntries().map((entry) => entry.duration)))
+      .observe({ type: "longtask" });
+    setInterval(() => globalThis.told.add(document.querySelector("#progress").value), 5);
+  });
+  await click(page, "#checkRun");
+  assert.match(await textOf(page, "#status"), /^2,000,001 nodes, 0 findings/);
+  const [tasks, told] = await page.evaluate(() => [globalThis.tasks, globalThis.told.size]);
+  assert.ok(told > 3, `progress was told ${told} times`);
+  console.log(`check of 2,000,000 nodes: ${await textOf(page, "#status")}; longest tasks ${tasks.join() || "below 50 ms"}`);
+  assert.deepEqual(tasks, []);
+  await page.$eval("#checkRun", (button) => button.click());
+  await page.waitForFunction(() => document.querySelector("#progress").value > 0);
+  await click(page, "#stop");
+  assert.equal(await textOf(page, "#status"), "stopped");
+  await find(page, "offset", "16");
+  assert.equal((await node(page)).value, "0");
+  await page.close();
+});
+
+test("every change of one byte leaves the page alive", async () => {
+  const page = await visit();
+  const whole = hosts("ada");
+  for (let at = 0; at < whole.length; at += 5) {
+    const bytes = Buffer.from(whole);
+    bytes[at] ^= 0x81;
+    await open(page, made("changed.tav", bytes));
+    await rows(page);
+  }
+  assert.deepEqual(page.errors, []);
+  await page.close();
+});
