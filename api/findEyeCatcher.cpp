@@ -96,7 +96,7 @@ uint32_t readDistance(TAVHandle& handle, const Span& span, uint64_t& distance)
       return rc;
     }
   }
-  distance = std::bit_cast<uint64_t>(bytes);
+  distance = kor::bitCast<uint64_t>(bytes);
   return TAV_RC_OK;
 }
 

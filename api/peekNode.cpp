@@ -120,7 +120,7 @@ uint32_t peekBytes(TAVCircularBuf& ring, uint64_t offset, uint8_t* to, uint64_t 
     uint64_t piece = std::min(cached, length);
     if (piece != 0)
     {
-      std::memcpy(to, ring.pRing + index, piece);
+      std::memcpy(to, ring.pRing + index, static_cast<size_t>(piece));
     }
     else
     {

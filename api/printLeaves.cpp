@@ -28,7 +28,7 @@ bool isCommon(const HeaderFields& fields)
 char* writeText(char* to, const uint8_t* data, uint64_t size)
 {
   const auto* text = reinterpret_cast<const char*>(data);
-  const uint64_t length = lengthOfText(text, size);
+  const size_t length = lengthOfText(text, static_cast<size_t>(size));
   std::memcpy(to, text, length);
   return to + length;
 }

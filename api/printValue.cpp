@@ -29,7 +29,7 @@ void printString(TAVPrintCtx& ctx, const TAVHeaderData& node)
   }
   do
   {
-    const uint64_t some = std::min(length, longestPiece);
+    const auto some = static_cast<size_t>(std::min(length, longestPiece));
     if (put(ctx, 0, {text, lengthOfText(text, some)}) < some)
     {
       return;

@@ -33,10 +33,10 @@ template<class Value>
 }
 
 /// The characters before a NUL, all when there is none.
-inline uint64_t lengthOfText(const char* text, uint64_t size)
+inline size_t lengthOfText(const char* text, size_t size)
 {
   const void* const nul = std::memchr(text, '\0', size);
-  return nul != nullptr ? static_cast<uint64_t>(static_cast<const char*>(nul) - text) : size;
+  return nul != nullptr ? static_cast<size_t>(static_cast<const char*>(nul) - text) : size;
 }
 
 [[gnu::noinline]] inline char* writeTimestamp(char* to, const TAVTimeStamp& timestamp)

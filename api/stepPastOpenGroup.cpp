@@ -3,7 +3,6 @@
 
 #include <algorithm>
 #include <array>
-#include <bit>
 
 #include "api/fetchBytes.h"
 #include "api/findNodeFromIndex.h"
@@ -55,7 +54,7 @@ bool hasOpenSize(TAVHandle& handle, uint64_t offset)
   {
     return false;
   }
-  size = std::bit_cast<uint64_t>(bytes);
+  size = kor::bitCast<uint64_t>(bytes);
   return size == TAV_SIZE_UNKNOWN;
 }
 

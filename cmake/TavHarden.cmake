@@ -6,7 +6,7 @@ include(CheckCXXCompilerFlag)
 option(TAV_HARDEN "Harden the libraries and the program" ${PROJECT_IS_TOP_LEVEL})
 
 set(TAV_HARDENED OFF)
-if(TAV_HARDEN AND UNIX AND NOT APPLE AND NOT TAV_SANITIZE AND CMAKE_CXX_COMPILER_ID MATCHES "GNU|Clang")
+if(TAV_HARDEN AND UNIX AND NOT APPLE AND NOT EMSCRIPTEN AND NOT TAV_SANITIZE AND CMAKE_CXX_COMPILER_ID MATCHES "GNU|Clang")
   set(TAV_HARDENED ON)
   set(TAV_HARDEN_FLAGS -fstack-protector-strong -Wformat -Werror=format-security)
   foreach(flag IN ITEMS -fstack-clash-protection -fcf-protection) # not every processor has them

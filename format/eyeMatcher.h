@@ -1,6 +1,7 @@
 /// Recognising eye catchers in a run of bytes.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 
 #include "format/layout.h"
@@ -31,8 +32,8 @@ private:
   /// As `scan`, byte by byte.
   const uint8_t* follow(const uint8_t* at, const uint8_t* end);
 
-  uint64_t native_ = 0; // bytes matched so far
-  uint64_t reversed_ = 0;
+  size_t native_ = 0; // bytes matched so far
+  size_t reversed_ = 0;
 };
 
 } // namespace tav::inside

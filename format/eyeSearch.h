@@ -2,18 +2,18 @@
 #pragma once
 
 #include <array>
-#include <bit>
 #include <cstdint>
 
 #include "format/layout.h"
+#include "tav/byteOrder.h"
 
 namespace tav::inside
 {
 
 using EyeBytes = std::array<uint8_t, kEyeLength>;
 
-inline constexpr auto kNativeEye = std::bit_cast<EyeBytes>(TAV_EYE_CATCHER);
-inline constexpr auto kReversedEye = std::bit_cast<EyeBytes>(kor::byteswap64(TAV_EYE_CATCHER));
+inline constexpr auto kNativeEye = kor::bitCast<EyeBytes>(TAV_EYE_CATCHER);
+inline constexpr auto kReversedEye = kor::bitCast<EyeBytes>(kor::byteswap64(TAV_EYE_CATCHER));
 
 /// Finds the first eye catcher, of either byte order, that lies whole in [at, end).
 ///

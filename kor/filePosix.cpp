@@ -282,6 +282,8 @@ uint32_t findDataNative(intptr_t file, uint64_t offset, uint64_t& found)
   {
     found = size;
   }
+#else
+  static_cast<void>(file);
 #endif
   return TAV_RC_OK;
 }

@@ -11,8 +11,6 @@ namespace
 {
 using tav::kor::Lock;
 
-static_assert(sizeof(std::size_t) == sizeof(uint64_t), "block sizes are 64-bit");
-
 /// Stands in front of every reserved block's KOR_MEM_RESERVE bytes.
 struct alignas(std::max_align_t) Reserved
 {
@@ -127,7 +125,7 @@ void* allocatePlain(uint64_t size)
   {
     return nullptr;
   }
-  return ::operator new(size, std::nothrow);
+  return ::operator new(static_cast<std::size_t>(size), std::nothrow);
 }
 
 void* allocateReserved(uint64_t size, const void* ownerBytes)

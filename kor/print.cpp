@@ -1,4 +1,7 @@
+#include <algorithm>
 #include <cstdarg>
+#include <cstddef>
+#include <cstdint>
 #include <cstdio>
 
 #include "tav/kor.h"
@@ -18,9 +21,11 @@ uint32_t korSnprintf(char* pBuffer, uint64_t bufferSize, const char* pFormat, ..
     return TAV_RC_BAD_PARAM;
   }
 
+  // No buffer is larger than this; the size of one that is said to be may not even be a number here.
+  const auto room = static_cast<std::size_t>(std::min<uint64_t>(bufferSize, PTRDIFF_MAX));
   va_list arguments;
   va_start(arguments, pFormat);
-  const int wanted = std::vsnprintf(pBuffer, bufferSize, pFormat, arguments);
+  const int wanted = std::vsnprintf(pBuffer, room, pFormat, arguments);
   va_end(arguments);
 
   if (wanted < 0)

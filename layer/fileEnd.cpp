@@ -97,7 +97,7 @@ private:
       {
         return rc != TAV_RC_OK ? rc : KOR_RC_IO_ERROR;
       }
-      for (; got != 0 && piece[got - 1] == 0; --got)
+      for (; got != 0 && piece[static_cast<size_t>(got - 1)] == 0; --got)
       {
       }
       content_ -= length - got;

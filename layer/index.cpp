@@ -351,7 +351,7 @@ private:
     const uint32_t first = firstOf(parent, step.only);
     if (place != 0)
     {
-      const bool isThere = place <= end - first && entries_[first + place - 1].elm == step.only;
+      const bool isThere = place <= end - first && entries_[static_cast<uint32_t>(first + place - 1)].elm == step.only;
       return !isThere || take(static_cast<uint32_t>(first + place - 1));
     }
     for (uint32_t child = first; child != end && entries_[child].elm == step.only; ++child)

@@ -76,7 +76,7 @@ uint64_t findPage(const TAVCircularBuf& ring, uint64_t index)
   return page;
 }
 /// What came to the class later is where there was padding: programs that know the class without it fit.
-static_assert(sizeof(TAVCircularBuf) == 88);
+static_assert(sizeof(TAVCircularBuf) == (sizeof(void*) == 8 ? 88 : 72));
 
 /// The next smaller ring to try: a quarter less, and 1 page after 2 or 3.
 uint64_t fewerPages(uint64_t pages)
@@ -126,7 +126,7 @@ uint32_t TAVCircularBuf::allocate()
       {
         pRing = static_cast<uint8_t*>(ring);
         pPageFlags = static_cast<uint8_t*>(flags);
-        std::memset(pPageFlags, 0, 2 * pageCount);
+        std::memset(pPageFlags, 0, static_cast<size_t>(2 * pageCount));
         return TAV_RC_OK;
       }
       korMemFree(&ring, 0, 0, kUnit, kRefusedLine);
@@ -225,7 +225,7 @@ void TAVCircularBuf::deliver(TAVCBUserArea& area, const uint8_t* first, bool cop
 {
   if (copy)
   {
-    std::memcpy(area.pChunk, first, area.chunkLength);
+    std::memcpy(area.pChunk, first, static_cast<size_t>(area.chunkLength));
   }
   else
   {
@@ -279,13 +279,13 @@ uint32_t TAVCircularBuf::writeCached(uint64_t index, uint64_t offset, const uint
   if (index > tail)
   {
     copied = std::min(size, ringSize - index);
-    std::memcpy(pRing + index, data, copied);
+    std::memcpy(pRing + index, data, static_cast<size_t>(copied));
     index = 0;
   }
   if (copied < size && index <= tail)
   {
     const uint64_t piece = std::min(size - copied, tail - index + 1);
-    std::memcpy(pRing + index, data + copied, piece);
+    std::memcpy(pRing + index, data + copied, static_cast<size_t>(piece));
     copied += piece;
   }
   if (copied == size)

@@ -280,7 +280,7 @@ void TAVCircularBuf::zeroPending(uint64_t index, uint64_t length)
   while (length != 0)
   {
     const uint64_t piece = std::min(length, pageSize - index % pageSize);
-    std::memset(pRing + index, 0, piece);
+    std::memset(pRing + index, 0, static_cast<size_t>(piece));
     pPageFlags[2 * pageOf(index)] = 1;
     length -= piece;
     index = index + piece < ringSize ? index + piece : 0;

@@ -120,7 +120,7 @@ uint32_t TAVSSMemory::read(uint64_t wanted, void** ppData, uint64_t bufSize, uin
   else
   {
     length = std::min(length, bufSize);
-    std::memcpy(*ppData, pBuffer + position, length);
+    std::memcpy(*ppData, pBuffer + position, static_cast<size_t>(length));
   }
   *pRead = length;
   position += length;
@@ -137,7 +137,7 @@ uint32_t TAVSSMemory::write(const void* pData, uint64_t size, uint64_t* pWritten
       frame.require(110, position < bufferSize, TAV_RC_END_OF_STORAGE) &&
       frame.require(50, size <= bufferSize - position, TAV_RC_END_OF_STORAGE))
   {
-    std::memmove(pBuffer + position, pData, size); // the bytes may lie in the block themselves
+    std::memmove(pBuffer + position, pData, static_cast<size_t>(size)); // the bytes may lie in the block themselves
     position += size;
     *pWritten = size;
     frame.dump(100, size, position);

@@ -1,5 +1,5 @@
 /// @file byteOrder.h
-/// The processor's byte order and the reversal of bytes. Everything else asks here.
+/// The processor's byte order, the reversal of bytes, and bytes taken for a value. Everything else asks here.
 #pragma once
 
 #include <bit>
@@ -41,6 +41,17 @@ constexpr uint64_t byteswap64(uint64_t value) noexcept
 #else
   return (static_cast<uint64_t>(byteswap32(static_cast<uint32_t>(value))) << 32) |
          byteswap32(static_cast<uint32_t>(value >> 32));
+#endif
+}
+
+/// The bytes of a value as those of another type: std::bit_cast, also where the standard library has none yet.
+template<class To, class From>
+constexpr To bitCast(const From& from) noexcept
+{
+#if defined(__cpp_lib_bit_cast)
+  return std::bit_cast<To>(from);
+#else
+  return __builtin_bit_cast(To, from);
 #endif
 }
 } // namespace tav::kor

@@ -4,7 +4,6 @@
 #pragma once
 
 #include <array>
-#include <bit>
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
@@ -415,12 +414,12 @@ inline EyeSizeBytes encodeEyeSize(uint64_t distance, bool swap)
 {
   const std::array<uint64_t, 2> words{swap ? kor::byteswap64(TAV_EYE_CATCHER) : TAV_EYE_CATCHER,
                                       swap ? kor::byteswap64(distance) : distance};
-  return std::bit_cast<EyeSizeBytes>(words);
+  return kor::bitCast<EyeSizeBytes>(words);
 }
 
 inline EyeSize decodeEyeSize(const EyeSizeBytes& bytes, bool swap)
 {
-  const auto words = std::bit_cast<std::array<uint64_t, 2>>(bytes);
+  const auto words = kor::bitCast<std::array<uint64_t, 2>>(bytes);
   return {swap ? kor::byteswap64(words[0]) : words[0], swap ? kor::byteswap64(words[1]) : words[1]};
 }
 

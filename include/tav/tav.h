@@ -11,7 +11,7 @@
 #include "tav/kor.h"
 #include "tav/types.h"
 
-static_assert(sizeof(void*) == 8, "libtav builds for 64-bit platforms");
+static_assert(sizeof(void*) == 8 || sizeof(void*) == 4, "addresses have 64 or 32 bits; offsets have 64 everywhere");
 
 #if defined(TAV_STATIC)
 #define TAV_API

@@ -7,7 +7,6 @@
 #include <memory>
 #include <optional>
 #include <span>
-#include <stop_token>
 #include <string>
 #include <utility>
 #include <vector>
@@ -25,10 +24,10 @@ class Follower
 public:
   using OnNode = std::function<void(const tav::Node&)>;
 
-  Follower(std::string path, const DocumentOptions& options, const OnNode& onNode, std::stop_token stop)
+  Follower(std::string path, const DocumentOptions& options, const OnNode& onNode, StopToken stop)
       : path_(std::move(path)), options_(options), onNode_(onNode), stop_(std::move(stop)) {}
   /// The same for who wants to know more than the nodes.
-  Follower(std::string path, const DocumentOptions& options, const FollowTold& told, std::stop_token stop)
+  Follower(std::string path, const DocumentOptions& options, const FollowTold& told, StopToken stop)
       : path_(std::move(path)), options_(options), told_(told), stop_(std::move(stop)) {}
 
   /// Reads all that is there now, also of a file that took the place. Returns how many nodes were new. With `quiet`
@@ -76,7 +75,7 @@ private:
   DocumentOptions options_;
   OnNode onNode_{};
   FollowTold told_{};
-  std::stop_token stop_;
+  StopToken stop_;
   bool quiet_ = false;
   bool isMissing_ = false;                ///< and that was told
   std::unique_ptr<ByteSource> file_{};    ///< whose storage sees the file as it is at any time

@@ -1,7 +1,6 @@
 #include "tav/inspect/jsonText.hpp"
 
 #include <algorithm>
-#include <bit>
 #include <charconv>
 #include <chrono>
 #include <cstring>
@@ -304,7 +303,7 @@ std::optional<std::array<uint8_t, 16>> parseInt128(std::string_view text, bool i
     std::swap(words[0], words[3]);
     std::swap(words[1], words[2]);
   }
-  return std::bit_cast<std::array<uint8_t, 16>>(words);
+  return kor::bitCast<std::array<uint8_t, 16>>(words);
 }
 
 size_t cutAtCharacter(std::string_view text, size_t most)

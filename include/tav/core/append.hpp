@@ -50,7 +50,7 @@ inline void encodePayload(uint16_t type, bool swap, const uint8_t* payload, uint
                                           uint64_t size, uint64_t length)
 {
   const uint64_t position = handle.streamBytes;
-  std::memmove(to, payload, size);
+  std::memmove(to, payload, static_cast<size_t>(size));
   moveBehind(handle, node, position, length);
   return TAV_RC_OK;
 }

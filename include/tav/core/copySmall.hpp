@@ -33,7 +33,7 @@ inline constexpr uint64_t kLongestSmall = 32;
   const auto* const from = static_cast<const uint8_t*>(bytes);
   if (length > kLongestSmall)
   {
-    std::memmove(to, from, length);
+    std::memmove(to, from, static_cast<size_t>(length));
   }
   else if (length > 16)
   {

@@ -6,8 +6,12 @@
 #include <cstdint>
 #include <functional>
 #include <span>
-#include <stop_token>
 #include <string>
+#if __has_include(<stop_token>)
+#include <stop_token>
+#else
+#include <atomic>
+#endif
 
 #include "tav/inspect/api.hpp"
 #include "tav/inspect/damageWatch.hpp"
@@ -17,10 +21,27 @@
 namespace tav::inspect
 {
 
+#if defined(__cpp_lib_jthread)
+using StopToken = std::stop_token;
+#else
+/// Where the standard library has no std::stop_token: the part of it that is asked for, over a flag of the caller's.
+class StopToken
+{
+public:
+  StopToken() = default;
+  explicit StopToken(const std::atomic<bool>& asked)
+      : asked_(&asked) {}
+  bool stop_requested() const noexcept { return asked_ != nullptr && asked_->load(std::memory_order_relaxed); }
+
+private:
+  const std::atomic<bool>* asked_ = nullptr;
+};
+#endif
+
 /// How a file is followed.
 struct FollowOptions
 {
-  std::stop_token stop{};               ///< ends it, at the latest after a tenth of a second
+  StopToken stop{};                     ///< ends it, at the latest after a tenth of a second
   std::chrono::milliseconds timeout{0}; ///< ends it when no node has come for so long; 0: nothing does
   bool existing = true;                 ///< begins with what is there already
 };
