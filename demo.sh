@@ -16,6 +16,7 @@ show() { printf '\n$ %s\n' "$*"; "$@"; }
 # Findings (status 1) are what some of these commands are asked for.
 look() { show "$@" || (($? == 1)); }
 
+page=$PWD/web/dist/tav.html
 names=$PWD/packaging/snapshot-names.json
 PATH=$PWD/build/release/tools:$PWD/build/release/examples:$PATH
 show snapshot "$work/snapshot.tav"
@@ -48,3 +49,7 @@ show tav table series.tav --each /system --col time=timestamp --col usage=host/c
   --col load=host/systemLoad/loadAverage1 --col switches=host/systemLoad/contextSwitches --rate
 show tav schema series.tav
 show tav check series.tav
+
+if [[ -f $page ]]; then
+  printf '\n# A browser looks into streams, too, without a server: open this page and drop a file on it\nfile://%s\n' "$page"
+fi

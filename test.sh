@@ -5,6 +5,7 @@
 #   ./test.sh --full   what CI runs: the checks of the sources, both compilers, the sanitizers, fuzzing, packages,
 #                      most of s390x and Windows
 #   ./test.sh --face python   the Python package
+#   ./test.sh --face browser  the page, in Chromium
 #   ./test.sh --platforms   all that is tested of libc++, s390x and aarch64 under qemu, Windows under wine
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")"
@@ -279,6 +280,32 @@ check_python()
   count_python
 }
 
+check_browser()
+{
+  local status=0
+  web/build.sh >"$work/build.log" 2>&1 || { tail -n 40 "$work/build.log"; return 1; }
+  (cd web && npm test --silent -- --test-reporter=tap) >"$work/tests.log" 2>&1 || status=$?
+  count_browser
+  if ((status != 0)); then
+    sed -n '/^not ok/,/^  \.\.\./p' "$work/tests.log"
+    return 1
+  fi
+}
+
+# Adds to the totals what node counted. A run without a test is a failure.
+count_browser()
+{
+  local good bad out
+  good=$(sed -n 's/^# pass //p' "$work/tests.log")
+  bad=$(sed -n 's/^# fail //p' "$work/tests.log")
+  out=$(sed -n 's/^# skipped //p' "$work/tests.log")
+  passed=$((passed + good))
+  failed=$((failed + bad))
+  skipped=$((skipped + out))
+  echo "$((good + bad)) tests, $bad failed, $out skipped"
+  ((good > 0)) || { tail -n 40 "$work/tests.log"; return 1; }
+}
+
 # Adds to the totals what pytest's report counts.
 count_python()
 {
@@ -332,6 +359,7 @@ full()
   stage "Kaitai" check_kaitai
   stage "g++" build_and_test release
   stage "Python" check_python
+  stage "browser" check_browser
   stage "clang++" check_clang
   stage "static libraries" check_static
   stage "link-time optimisation" check_link_time
@@ -354,23 +382,34 @@ case ${1:-} in
     stage "g++" build_and_test release
     ;;
   --full)
-    stage "packages" cmake/install-packages.sh build test full platforms python site
+    stage "packages" cmake/install-packages.sh build test full platforms python browser site
     # The same sources are compiled again and again, at every place where the project is checked out.
     export CMAKE_CXX_COMPILER_LAUNCHER=ccache CCACHE_BASEDIR=$PWD CCACHE_NOHASHDIR=1
     export CCACHE_SLOPPINESS=pch_defines,time_macros,include_file_mtime,include_file_ctime
     full
     ;;
   --face)
-    [[ ${2:-} == python ]] || { echo "usage: $0 --face python" >&2; exit 2; }
-    stage "packages" cmake/install-packages.sh python
-    stage "Python" check_python
+    case ${2:-} in
+      python)
+        stage "packages" cmake/install-packages.sh python
+        stage "Python" check_python
+        ;;
+      browser)
+        stage "packages" cmake/install-packages.sh browser
+        stage "browser" check_browser
+        ;;
+      *)
+        echo "usage: $0 --face python|browser" >&2
+        exit 2
+        ;;
+    esac
     ;;
   --platforms)
     stage "packages" cmake/install-packages.sh build test platforms
     platforms
     ;;
   *)
-    echo "usage: $0 [--full | --face python | --platforms]" >&2
+    echo "usage: $0 [--full | --face python|browser | --platforms]" >&2
     exit 2
     ;;
 esac

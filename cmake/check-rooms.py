@@ -3,11 +3,11 @@
 
     check-rooms.py [ROOT]
 
-Includes point one way: tools, python, duckdb -> inspect -> layer -> api -> core -> storage, dictionary -> format -> trace -> kor. The
-system, its headers and the byte order are kor's business, which has a file a platform: names that end in Posix or Windows. What the
-program alone asks of the system is in tools/host, by the same rule. No other source asks for the platform, tests and
-examples included. What keeps a compiler from its work stands in one file. The inspection library names no option of the
-program.
+Includes point one way: tools, python, duckdb, web -> inspect -> layer -> api -> core -> storage, dictionary -> format ->
+trace -> kor. The system, its headers and the byte order are kor's business, which has a file a platform: names that end
+in Posix, Windows or Browser. What the program alone asks of the system is in tools/host, by the same rule. No other
+source asks for the platform, tests and examples included. What keeps a compiler from its work stands in one file. The
+inspection library names no option of the program.
 
 What of core is compiled into programs is installed, in include/tav/core/: the rooms below core do not use it, but for
 the header that storage shares with it.
@@ -33,6 +33,7 @@ ROOMS = {
     "tools": {"tools"},
     "python": {"python"},
     "duckdb": {"duckdb"},
+    "web": {"web"},
     "include": set(),
 }
 # The installed part of core: which of it the rooms below may use.

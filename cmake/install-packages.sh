@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # Installs the Debian packages of the named groups that are missing. This is the one list of them.
 #   cmake/install-packages.sh GROUP...        groups: build, test, full, platforms, bench, coverage, kaitai,
-#                                            python, site
+#                                            python, browser, site
 set -euo pipefail
 
 declare -A groups=(
@@ -12,6 +12,7 @@ declare -A groups=(
   [kaitai]="nodejs npm"
   [python]="g++ cmake ninja-build nlohmann-json3-dev python3-dev python3-pytest python3-hypothesis python3-numpy python3-pandas mypy"
   [site]="python3-rich doxygen python3-sphinx python3-myst-parser furo"
+  [browser]="g++ cmake ninja-build emscripten nodejs npm chromium"
   [coverage]="gcovr qemu-user-static"
   [platforms]="clang libc++-dev libc++abi-dev googletest ccache qemu-user-static g++-s390x-linux-gnu g++-aarch64-linux-gnu g++-mingw-w64-x86-64-posix wine64 wine"
 )

@@ -10,6 +10,9 @@
 /// `isLineBuffered`: how a standard stream passes on what is written to it                    | | fileWatch…      |
 /// `FileWatch`: waiting for a file to grow; looking ten times a second will do                |
 ///
+/// In a browser there is no system: kor/fileBrowser.cpp, which the page is built with, asks the worker around the
+/// module.
+///
 /// The byte order is asked for in tav/byteOrder.h, how symbols are exported in tav/decl.h, and what separates folders
 /// in tav/kor.h. The program asks for more: tools/host/host.h (terminals, open files, signals) and
 /// tools/host/machine.h.

@@ -80,7 +80,7 @@ private:
   static constexpr uint64_t kStep = 256; ///< rows from one mark to the next
   /// Bytes between two marks that may be searched for nodes, or for the end of zeros: the tree answers while somebody
   /// waits. What is behind them is one row, which says so.
-  static constexpr uint64_t kBudget = uint64_t{16} << 20U;
+  static constexpr uint64_t kBudget = uint64_t{4} << 20U;
 
   const Mark& markBefore(uint64_t row) const;
 

@@ -21,7 +21,7 @@ export class Bytes {
     element.addEventListener("keydown", (event) => this.#key(event));
   }
 
-  show(file) {
+  open(file) {
     this.#file = file;
     this.#pieces.clear();
     this.#cursor = 0;
@@ -32,7 +32,12 @@ export class Bytes {
   mark(marked) {
     this.#marked = marked;
     this.#cursor = marked.from;
-    this.view.show(Math.floor(marked.from / WIDE));
+    this.show();
+  }
+
+  /** Scrolls to where it stands; again when there is more or less room. */
+  show() {
+    this.view.show(Math.floor(this.#cursor / WIDE));
   }
 
   #byte(offset) {

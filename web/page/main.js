@@ -77,7 +77,7 @@ export async function reopen() {
   document.title = `${page.given.name} · tav`;
   fill(byId("file"), `${page.given.name}, ${counted(page.given.file.size, "byte")}`);
   showForm(engine.opened);
-  bytes.show(page.given.file);
+  bytes.open(page.given.file);
   await tree.show(engine);
   document.dispatchEvent(new Event("opened"));
   const wanted = new URLSearchParams(location.hash.slice(1)).get("path");
@@ -104,6 +104,7 @@ async function showRow(place, row) {
   const told = await page.engine.call("tavNode", { numbers: [place.level, BigInt(place.row)] });
   if (page.place === place) {
     showNode(told);
+    bytes.show();
   }
 }
 

@@ -6,28 +6,47 @@ import { goTo, page, reopen, run, say } from "./main.js";
 
 const MOST = 10_000; // places that are listed
 const MOST_ROWS = 1_000_000;
-let running; // the engine of the work that goes on
+let running; // the work that goes on
+
+class Work {
+  isStopped = false;
+
+  async begin() {
+    this.engine = await Engine.of(page.given, page.choice);
+    if (this.isStopped) {
+      this.stop();
+      throw new Stopped();
+    }
+    return this.engine;
+  }
+
+  stop() {
+    this.isStopped = true;
+    this.engine?.stop();
+  }
+}
 
 /** Runs an export in a worker of its own, with a stop button and how far it is. */
 async function work(name, { texts = [], numbers = [], onPiece, prepare } = {}) {
   running?.stop();
-  const engine = await Engine.of(page.given, page.choice);
-  running = engine;
+  const mine = new Work();
+  running = mine;
   const bar = byId("progress");
   const begun = performance.now();
   bar.value = 0;
   document.body.classList.add("working");
   try {
+    const engine = await mine.begin();
     await prepare?.(engine);
     const answer = await engine.call(name, {
       texts, numbers, onPiece, onProgress: (offset) => { bar.value = offset / Math.max(1, page.given.file.size); },
     });
     return { answer, engine, seconds: (performance.now() - begun) / 1000 };
   } catch (error) {
-    engine.stop();
+    mine.stop();
     throw error;
   } finally {
-    if (running === engine) {
+    if (running === mine) {
       document.body.classList.remove("working");
     }
   }
@@ -182,7 +201,7 @@ function showTable() {
   const numbers = table.kinds.flatMap((kind, i) => (kind === "number" ? [i] : []));
   const time = table.kinds.indexOf("time");
   byId("saveTable").hidden = table.rows.length === 0;
-  byId("plot").hidden = numbers.length === 0;
+  byId("plot").toggleAttribute("hidden", numbers.length === 0); // of SVG elements `hidden` is no property
   drawPlot(byId("plot"), table, time, numbers);
 }
 
@@ -221,8 +240,7 @@ export function setUpPanels() {
   on("tableRun", makeTable);
   byId("findForm").addEventListener("submit", (event) => event.preventDefault());
   byId("stop").addEventListener("click", () => {
-    running?.stop(new Stopped());
-    document.body.classList.remove("working");
+    running?.stop();
     say("stopped");
   });
   byId("names").addEventListener("change", () => run(async () => {
@@ -254,6 +272,6 @@ export function setUpPanels() {
     }
     byId("saveRecovered").hidden = true;
     byId("saveTable").hidden = true;
-    byId("plot").hidden = true;
+    byId("plot").toggleAttribute("hidden", true);
   });
 }

@@ -2,10 +2,10 @@
 import { mkdtempSync, existsSync, readdirSync, readFileSync, rmSync, writeFileSync } from "node:fs";
 import { tmpdir } from "node:os";
 import { join } from "node:path";
-import { pathToFileURL } from "node:url";
+import { fileURLToPath, pathToFileURL } from "node:url";
 import puppeteer from "puppeteer-core";
 
-const PAGE = join(import.meta.dirname, "../dist/tav.html");
+const PAGE = join(fileURLToPath(new URL(".", import.meta.url)), "../dist/tav.html");
 const BROWSER = process.env.TAV_BROWSER ?? "/usr/bin/chromium";
 
 export const folder = mkdtempSync(join(tmpdir(), "tav-page-"));

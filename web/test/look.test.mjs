@@ -1,9 +1,10 @@
 // Looking into a file: tree, values, bytes, form, finding, keys.
 import assert from "node:assert/strict";
 import { after, before, test } from "node:test";
-import { truncateSync, writeFileSync } from "node:fs";
-import { click, end, find, folder, made, node, open, rows, settled, start, textOf, visit } from "./browser.mjs";
-import { CPU_ONLINE, HOST_NAME, SYSTEM, golden, goldenNames, group, hosts, many, number, text } from "./streams.mjs";
+import { readFileSync, truncateSync, writeFileSync } from "node:fs";
+import { createServer } from "node:http";
+import { click, end, find, made, node, open, rows, settled, start, textOf, visit } from "./browser.mjs";
+import { HOST_NAME, SYSTEM, golden, goldenNames, group, hosts, many, text } from "./streams.mjs";
 
 before(start);
 after(end);
@@ -172,6 +173,21 @@ test("the page asks for nothing but itself", async () => {
   assert.match(refused, /TypeError/);
   assert.match(page.errors.join(), /Content Security Policy/);
   await page.close();
+});
+
+test("a link to a path of a served page leads there", async () => {
+  const server = createServer((_, answer) => {
+    answer.setHeader("content-type", "text/html");
+    answer.end(readFileSync(new URL("../dist/tav.html", import.meta.url)));
+  });
+  await new Promise((resolve) => server.listen(0, "127.0.0.1", resolve));
+  const page = await visit({ address: `http://127.0.0.1:${server.address().port}/#path=/system/host%5B2%5D/hostName` });
+  await open(page, made("link.tav", hosts("ada", "grace")));
+  assert.equal((await node(page)).value, "grace");
+  await page.evaluate(() => { location.hash = "#path=/system/host/cpuOnline"; });
+  await page.waitForFunction(() => document.querySelector("#node dd").textContent === "/system/host/cpuOnline");
+  await page.close();
+  server.close();
 });
 
 test("on a telephone nothing is cut off, and colours follow the system", async () => {

@@ -1,8 +1,9 @@
 // Streams for the tests, made by hand: little-endian, 64-bit headers, nothing padded. The golden files are the others.
 import { readFileSync, readdirSync } from "node:fs";
 import { join } from "node:path";
+import { fileURLToPath } from "node:url";
 
-const GOLDEN = join(import.meta.dirname, "../../tests/golden");
+const GOLDEN = join(fileURLToPath(new URL(".", import.meta.url)), "../../tests/golden");
 
 export const SYSTEM = 60100;
 export const HOST = 60102;
