@@ -4,8 +4,7 @@
 #   TAV_STAGES=REGEX   only the stages whose titles match
 #   ./test.sh --full   what CI runs: the checks of the sources, both compilers, the sanitizers, fuzzing, packages,
 #                      most of s390x and Windows
-#   ./test.sh --face python   the Python package
-#   ./test.sh --face browser  the page, in Chromium
+#   ./test.sh --face NAME   one face: python (the package), sql (the extension for DuckDB), browser (the page, in Chromium)
 #   ./test.sh --platforms   all that is tested of libc++, s390x and aarch64 under qemu, Windows under wine
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")"
@@ -320,6 +319,37 @@ count_python()
   ((tests > out && bad == 0))
 }
 
+# Node.js has an npm of its own where it does not come from Debian.
+sql_packages()
+{
+  { command -v node && command -v npm; } >/dev/null || cmake/install-packages.sh sql
+}
+
+# The extension for DuckDB, in the engine that duckdb/package.json names.
+check_sql()
+{
+  build release -DTAV_BUILD_DUCKDB=ON --target tav_duckdb tav_tool tav_generate
+  npm --prefix duckdb install --no-save --ignore-scripts --no-audit --no-fund --silent >"$work/npm.log" 2>&1 ||
+    { cat "$work/npm.log"; return 1; }
+  node --test --test-reporter=tap duckdb/tests/*.test.mjs >"$work/tests.log" ||
+    { grep -A 40 -E '^ *not ok' "$work/tests.log"; return 1; }
+  count_sql
+}
+
+# Adds to the totals what the runner counts.
+count_sql()
+{
+  local tests bad out
+  tests=$(awk '/^# tests / { sum += $3 } END { print sum + 0 }' "$work/tests.log")
+  bad=$(awk '/^# (fail|cancelled) / { sum += $3 } END { print sum + 0 }' "$work/tests.log")
+  out=$(awk '/^# (skipped|todo) / { sum += $3 } END { print sum + 0 }' "$work/tests.log")
+  passed=$((passed + tests - bad - out))
+  failed=$((failed + bad))
+  skipped=$((skipped + out))
+  echo "$tests tests, $bad failed, $out skipped"
+  ((tests > out && bad == 0))
+}
+
 check_libcxx()
 {
   check_platform libcxx tests "" "" "$@"
@@ -359,6 +389,7 @@ full()
   stage "Kaitai" check_kaitai
   stage "g++" build_and_test release
   stage "Python" check_python
+  stage "SQL" check_sql
   stage "browser" check_browser
   stage "clang++" check_clang
   stage "static libraries" check_static
@@ -383,6 +414,7 @@ case ${1:-} in
     ;;
   --full)
     stage "packages" cmake/install-packages.sh build test full platforms python browser site
+    stage "packages of SQL" sql_packages
     # The same sources are compiled again and again, at every place where the project is checked out.
     export CMAKE_CXX_COMPILER_LAUNCHER=ccache CCACHE_BASEDIR=$PWD CCACHE_NOHASHDIR=1
     export CCACHE_SLOPPINESS=pch_defines,time_macros,include_file_mtime,include_file_ctime
@@ -394,12 +426,16 @@ case ${1:-} in
         stage "packages" cmake/install-packages.sh python
         stage "Python" check_python
         ;;
+      sql)
+        stage "packages" sql_packages
+        stage "SQL" check_sql
+        ;;
       browser)
         stage "packages" cmake/install-packages.sh browser
         stage "browser" check_browser
         ;;
       *)
-        echo "usage: $0 --face python|browser" >&2
+        echo "usage: $0 --face python|sql|browser" >&2
         exit 2
         ;;
     esac
@@ -409,7 +445,7 @@ case ${1:-} in
     platforms
     ;;
   *)
-    echo "usage: $0 [--full | --face python|browser | --platforms]" >&2
+    echo "usage: $0 [--full | --face python|sql|browser | --platforms]" >&2
     exit 2
     ;;
 esac

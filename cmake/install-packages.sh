@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # Installs the Debian packages of the named groups that are missing. This is the one list of them.
 #   cmake/install-packages.sh GROUP...        groups: build, test, full, platforms, bench, coverage, kaitai,
-#                                            python, browser, site
+#                                            python, sql, browser, site
 set -euo pipefail
 
 declare -A groups=(
@@ -11,6 +11,7 @@ declare -A groups=(
   [full]="clang clang-19 clang-format clang-tidy cppcheck libclang-rt-dev ccache doxygen lintian dpkg-dev gzip abigail-tools valgrind"
   [kaitai]="nodejs npm"
   [python]="g++ cmake ninja-build nlohmann-json3-dev python3-dev python3-pytest python3-hypothesis python3-numpy python3-pandas mypy"
+  [sql]="g++ cmake ninja-build nlohmann-json3-dev libgtest-dev libgmock-dev python3 nodejs npm"
   [site]="python3-rich doxygen python3-sphinx python3-myst-parser furo"
   [browser]="g++ cmake ninja-build emscripten nodejs npm chromium"
   [coverage]="gcovr qemu-user-static"

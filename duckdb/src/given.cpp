@@ -1,5 +1,8 @@
 #include "duckdb/src/given.h"
 
+#include <filesystem>
+#include <optional>
+#include <system_error>
 #include <utility>
 
 #include "duckdb/src/files.h"
@@ -104,6 +107,15 @@ inspect::Document Given::open(const std::string& file) const
   options.form = form;
   options.dictionary = dictionary;
   return inspect::Document(std::filesystem::path(file), options);
+}
+
+void Given::requireLength(const std::string& file, const inspect::Document& document)
+{
+  std::error_code ec;
+  if (std::filesystem::file_size(file, ec) < document.source().size())
+  {
+    throw inspect::Error(inspect::Problem{.file = file, .sentence = "was made shorter while it was read"});
+  }
 }
 
 void addParameters(duckdb_table_function function)

@@ -21,6 +21,9 @@ struct Given
   /// Opens one of the files. Throws Error, with its name.
   inspect::Document open(const std::string& file) const;
 
+  /// Throws Error where a file has become shorter since it was opened: what was read of it then is not all.
+  static void requireLength(const std::string& file, const inspect::Document& document);
+
   std::vector<std::string> files{};
   inspect::FormChoice form{};
   inspect::OnDamage onDamage = inspect::OnDamage::stop;

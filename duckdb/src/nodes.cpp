@@ -100,6 +100,7 @@ void NodeThread::readPart(const NodeScan& scan, const NodeTask& task)
       columns_.clear();
       inspect::NodeReader reader(document_->source(), task.parted->part(task.part), scan.options);
       reader.next(columns_, ~size_t{0});
+      Given::requireLength(file_, *document_);
       const std::vector<int64_t> open = reader.open();
       auto before = task.parted->settle(task.part, columns_.count(), open, reader.end());
       if (before && reader.stopped())
@@ -124,7 +125,9 @@ void NodeThread::readWhole()
 {
   rows_.first += columns_.count();
   columns_.clear();
-  if (reader_->next(columns_, duckdb_vector_size()))
+  const bool more = reader_->next(columns_, duckdb_vector_size());
+  Given::requireLength(file_, *document_);
+  if (more)
   {
     return;
   }

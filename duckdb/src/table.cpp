@@ -98,6 +98,7 @@ public:
     {
       throw inspect::Error(*reader_.stopped());
     }
+    Given::requireLength(name, document_);
     return more;
   }
 

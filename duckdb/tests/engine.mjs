@@ -1,6 +1,7 @@
 // The engine with the extension in it, and the program `tav` beside it.
+import assert from 'node:assert/strict';
 import {spawnSync} from 'node:child_process';
-import {mkdtempSync, rmSync} from 'node:fs';
+import {mkdtempSync, readFileSync, readdirSync, rmSync} from 'node:fs';
 import {tmpdir} from 'node:os';
 import {dirname, join, resolve} from 'node:path';
 import {fileURLToPath} from 'node:url';
@@ -33,17 +34,17 @@ export async function value(connection, sql)
 }
 
 /** What a program of the build prints. */
-export function program(name, args, {status = 0, input} = {})
+export function program(name, args, {status, input} = {})
 {
   const done = spawnSync(join(build, name), args, {input, maxBuffer: 1 << 30});
-  if (done.status !== status)
+  if (status !== undefined && done.status !== status)
   {
     throw new Error(`${name} ${args.join(' ')}: ${done.status}: ${done.stderr}`);
   }
   return done.stdout;
 }
 
-export const tav = (args, options) => program('tools/tav', args, options).toString();
+export const tav = (args, options = {}) => program('tools/tav', args, {status: 0, ...options}).toString();
 
 /** A folder that goes with the process. */
 export function folder()
@@ -51,4 +52,35 @@ export function folder()
   const made = mkdtempSync(join(tmpdir(), 'tav-sql-'));
   process.on('exit', () => rmSync(made, {recursive: true, force: true}));
   return made;
+}
+
+/** Writes a stream of a JSON document, as `tav build` reads it. */
+export function make(file, document, ...options)
+{
+  tav(['build', '-', '-o', file, '--force', ...options], {input: JSON.stringify(document)});
+  return file;
+}
+
+/** The bytes of a golden vector. */
+export function golden(name)
+{
+  const lines = readFileSync(join(root, 'tests/golden', name), 'latin1').split('\n');
+  return Buffer.from(lines.map((line) => line.replace(/#.*/, '')).join('').replace(/\s/g, ''), 'hex');
+}
+
+export const goldenNames = readdirSync(join(root, 'tests/golden')).filter((name) => name.endsWith('.hex')).sort();
+
+/** Whether two queries have the same rows, each as often. */
+export async function same(connection, a, b)
+{
+  const counts = await rows(connection, `
+    SELECT (SELECT count(*) FROM (${a})) AS a, (SELECT count(*) FROM (${b})) AS b,
+           (SELECT count(*) FROM (${a} EXCEPT ALL ${b})) AS more, (SELECT count(*) FROM (${b} EXCEPT ALL ${a})) AS less`);
+  if (counts[0].more !== 0n || counts[0].less !== 0n || counts[0].a !== counts[0].b)
+  {
+    const more = await rows(connection, `${a} EXCEPT ALL ${b} LIMIT 5`);
+    const less = await rows(connection, `${b} EXCEPT ALL ${a} LIMIT 5`);
+    assert.deepEqual({count: counts[0].a, rows: more}, {count: counts[0].b, rows: less});
+  }
+  return Number(counts[0].a);
 }

@@ -78,7 +78,9 @@ inline ValueKind NodeColumns::classify(const tav::detail::RawValue& raw, size_t 
   case TAV_TYPE_SINT64: return takeNumber<int64_t>(raw, row);
   case TAV_TYPE_UINT128:
   case TAV_TYPE_SINT128: return raw.size == 2 * sizeof(uint64_t) ? ValueKind::wide : ValueKind::bytes;
-  case TAV_TYPE_BYTE: number[row] = raw.size == 1 ? *raw.bytes : 0; return raw.size == 1 ? ValueKind::number : ValueKind::bytes;
+  case TAV_TYPE_BYTE:
+    number[row] = raw.size == 1 ? *raw.bytes : 0;
+    return raw.size == 1 ? ValueKind::number : ValueKind::bytes;
   case TAV_TYPE_UTC_TIMESTAMP: return takeTime(raw, row);
   case TAV_TYPE_ASCII_STRING: return ValueKind::text;
   case TAV_TYPE_UTF8_STRING: return raw.size >= sizeof(uint16_t) ? ValueKind::text : ValueKind::bytes;

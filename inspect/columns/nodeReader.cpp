@@ -5,6 +5,8 @@
 
 #include "inspect/columns/addRow.h"
 #include "inspect/walk/exactWalk.h"
+#include "inspect/walk/mostCounts.h"
+#include "tav/inspect/path.hpp"
 
 namespace tav::inspect
 {
@@ -30,13 +32,88 @@ uint16_t keyOf(uint32_t info)
   return static_cast<uint16_t>(info & TAV_INFO_KEY_MASK);
 }
 
+/// The paths of nodes, one after another: of each the last step is new.
+class Paths
+{
+public:
+  explicit Paths(const Dictionary& dictionary)
+      : dictionary_(dictionary) {}
+
+  /// The path of a node at a depth, whose place among its siblings is known.
+  const std::string& of(const Node& node, size_t depth)
+  {
+    lengths_.resize(std::min(lengths_.size(), depth + 1));
+    path_.resize(lengths_.back());
+    appendStep(path_, node, dictionary_);
+    if (node.isGroup())
+    {
+      lengths_.push_back(path_.size());
+    }
+    return path_;
+  }
+
+  /// What follows is below the last node, and the places are counted here, as a Walker counts them.
+  void beginCounting()
+  {
+    counts_.clear();
+    starts_.assign(1, 0);
+  }
+  const std::string& counted(const core::Node& node, uint64_t offset)
+  {
+    Node seen;
+    core::toHeader(node, seen.header);
+    seen.header.nodeOffset = offset;
+    seen.ordinal = count(node.elm());
+    if (seen.isGroup())
+    {
+      starts_.push_back(counts_.size());
+    }
+    return of(seen, lengths_.size() - 1);
+  }
+  /// So many groups are around the group whose children come next.
+  void backTo(size_t depth) { lengths_.resize(std::min(lengths_.size(), depth + 2)); }
+  void leave()
+  {
+    counts_.resize(starts_.back());
+    starts_.pop_back();
+    lengths_.pop_back();
+  }
+
+private:
+  struct Count
+  {
+    uint16_t elm;
+    uint64_t count;
+  };
+
+  uint64_t count(uint16_t elm)
+  {
+    for (size_t i = starts_.back(); i < counts_.size(); ++i)
+    {
+      if (counts_[i].elm == elm)
+      {
+        return ++counts_[i].count;
+      }
+    }
+    const bool isFull = counts_.size() - starts_.back() == kMostCounts;
+    isFull ? void() : counts_.push_back({elm, 1});
+    return isFull ? 0 : 1;
+  }
+
+  Dictionary dictionary_;
+  std::string path_{};
+  std::vector<size_t> lengths_{0}; ///< of the paths of the groups around, by level
+  std::vector<Count> counts_{};
+  std::vector<size_t> starts_{}; ///< where the counts of a level begin
+};
+
 } // namespace
 
 class NodeReader::State
 {
 public:
   State(ByteSource& source, const Part& part, const NodeReaderOptions& options)
-      : source_(source), options_(options), exact_(told_),
+      : source_(source), options_(options), paths_(source.dictionary()), exact_(told_),
         walk_(source, part, [this](const PassedOver& passed) { passOver(passed); })
   {
     for (size_t level = 0; level < part.around.size(); ++level)
@@ -49,10 +126,10 @@ public:
   {
     columns_ = &out;
     const size_t before = out.count();
-    size_t texts = 0;
-    while (!done_ && out.count() - before < rows && texts < kMostText)
+    texts_ = 0;
+    while (!done_ && out.count() - before < rows && texts_ < kMostText)
     {
-      done_ = !step(texts);
+      done_ = !step();
     }
     return out.count() != before;
   }
@@ -74,14 +151,21 @@ private:
     bool enter(const core::Node& group)
     {
       state.add(factsOf(group, nullptr, false), true);
-      return true;
+      const bool goesOn = !state.options_.paths || state.addPath(group);
+      goesOn ? void() : leave();
+      return goesOn;
     }
-    void leave() { state.open_.pop_back(); }
+    void leave()
+    {
+      state.open_.pop_back();
+      state.options_.paths ? state.paths_.leave() : void();
+    }
     [[gnu::always_inline]] void data(const core::Node& node, const uint8_t* payload, bool swap)
     {
       if (!layout::isEndElement(node.elm())) [[likely]]
       {
         state.add(factsOf(node, state.options_.values ? payload : nullptr, swap), false);
+        state.options_.paths ? static_cast<void>(state.addPath(node)) : void();
       }
     }
     NodeFacts factsOf(const core::Node& node, const uint8_t* payload, bool swap) const
@@ -118,7 +202,29 @@ private:
     }
   }
 
-  bool step(size_t& texts)
+  void addText(const std::string& path)
+  {
+    columns_->paths.push_back(path);
+    texts_ += path.size();
+  }
+
+  /// Of a node that the exact steps have come to; false when there is too much text, and they have to give up.
+  bool addPath(const core::Node& node)
+  {
+    if (texts_ < kMostText)
+    {
+      addText(paths_.counted(node, base_ + node.offset()));
+      return true;
+    }
+    tooLong_ = true;
+    if (node.group())
+    {
+      static_cast<void>(paths_.counted(node, base_ + node.offset())); // which is left again
+    }
+    return false;
+  }
+
+  bool step()
   {
     const bool more = walk_.next(event_) && !stopped_;
     if (more && event_.what == What::nodeBegin && !isEndPiece(event_))
@@ -126,10 +232,9 @@ private:
       begin();
       if (options_.paths)
       {
-        columns_->paths.push_back(walk_.walker().path(event_));
-        texts += columns_->paths.back().size();
+        addText(paths_.of(event_.node, static_cast<size_t>(event_.depth)));
       }
-      else if (event_.node.isGroup())
+      if (event_.node.isGroup())
       {
         goThrough();
       }
@@ -202,18 +307,23 @@ private:
     const Node& node = event_.node;
     const size_t count = columns_->count();
     const uint64_t rows = rows_;
+    const size_t texts = texts_;
     base_ = node.offset();
-    const bool done = exact_.through(bytes, walk_.form(), node.is64());
+    tooLong_ = false;
+    paths_.beginCounting();
+    const bool done = exact_.through(bytes, walk_.form(), node.is64()) && !tooLong_;
     open_.resize(static_cast<size_t>(event_.depth) + 1);
+    paths_.backTo(static_cast<size_t>(event_.depth));
     if (done && walk_.skip())
     {
       return true;
     }
-    failed_ = done ? failed_ : node.offset() + exact_.reached();
-    notBefore_ = done ? node.limit : notBefore_;
+    failed_ = done || tooLong_ ? failed_ : node.offset() + exact_.reached();
+    notBefore_ = done || tooLong_ ? node.limit : notBefore_;
     columns_->cut(count);
     rows_ = rows;
-    return done;
+    texts_ = texts;
+    return done || tooLong_;
   }
 
   std::span<const uint8_t> bytesOf(uint64_t offset, uint64_t size)
@@ -232,6 +342,7 @@ private:
   ByteSource& source_;
   NodeReaderOptions options_;
   NodeColumns* columns_ = nullptr;
+  Paths paths_;
   Told told_{*this};
   ExactWalk<Told> exact_;
   std::optional<Problem> stopped_{};
@@ -243,6 +354,8 @@ private:
   uint64_t failed_ = kNoOffset; ///< where the exact steps gave up last
   uint64_t notBefore_ = 0;      ///< they are not tried before
   std::array<uint8_t, 16> small_{};
+  size_t texts_ = 0;     ///< bytes of the paths that are handed out next
+  bool tooLong_ = false; ///< the exact steps came to too many of them
   bool done_ = false;
 };
 
