@@ -69,6 +69,47 @@ std::vector<NamedText> labelsOf(const Invocation& invocation)
   return labels;
 }
 
+/// A text as SQL has it.
+std::string quotedForSql(const std::string& text)
+{
+  std::string quoted = "'";
+  for (const char c : text)
+  {
+    quoted += c == '\'' ? "''" : std::string(1, c);
+  }
+  return quoted + "'";
+}
+
+/// The statement by which DuckDB writes the same table as Parquet.
+std::string parquetStatement(const Invocation& invocation)
+{
+  const auto listed = [](const std::vector<std::string>& items) {
+    std::string list;
+    for (const std::string& item : items)
+    {
+      list += (list.empty() ? "" : ", ") + item;
+    }
+    return list;
+  };
+  std::vector<std::string> files;
+  for (const std::string& file : invocation.arguments())
+  {
+    files.push_back(quotedForSql(file));
+  }
+  std::vector<std::string> columns;
+  for (const TableColumn& column : columnsOf(invocation))
+  {
+    columns.push_back(quotedForSql(column.name) + ": " + quotedForSql(column.path));
+  }
+  const std::string join = invocation.has("--join") ? ", join := " + quotedForSql(invocation.text("--join")) : "";
+  const std::string file = invocation.has("--file") ? ", filename := true" : "";
+  const std::string damage = invocation.text("--on-damage", "stop") == "skip" ? ", on_damage := 'skip'" : "";
+  const std::string out = invocation.text("--output", "-");
+  return "COPY (FROM read_tav_table([" + listed(files) + "], each := " + quotedForSql(invocation.text("--each")) +
+         ", columns := {" + listed(columns) + "}" + join + file + damage + ")) TO " +
+         quotedForSql(out == "-" ? "table.parquet" : out) + " (FORMAT parquet)";
+}
+
 class Tabler
 {
 public:
@@ -122,8 +163,8 @@ private:
     }
     if (format == "parquet")
     {
-      throw Failure("table: this build writes no Parquet",
-                    "what reads the table with --format csv or jsonl can write it, DuckDB for instance");
+      throw Failure("table: Parquet is written by DuckDB with the extension 'tav', which docs/sql.md tells how to get",
+                    "there it is: " + shown(parquetStatement(invocation_), stderr));
     }
     if (format == "openmetrics" && invocation_.has("--rate"))
     {
@@ -354,7 +395,7 @@ const Registration registration{{
                 {.names = "--format",
                  .kind = ValueKind::choice,
                  .value = "FORMAT",
-                 .help = "what is written: csv unless given; parquet is not written yet",
+                 .help = "what is written: csv unless given; for parquet, what DuckDB is to be told",
                  .choices = {"csv", "tsv", "jsonl", "openmetrics", "parquet"}},
                 {.names = "--crlf", .help = "end lines with CR LF"},
                 {.names = "--on-damage",
