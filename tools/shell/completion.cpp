@@ -57,7 +57,9 @@ std::string bash()
 {
   std::string text = "# bash completion for tav\n_tav()\n{\n  local word=${COMP_WORDS[COMP_CWORD]} "
                      "before=${COMP_WORDS[COMP_CWORD-1]}\n"
-                     "  local command=${COMP_WORDS[1]}\n  COMPREPLY=()\n  if ((COMP_CWORD == 1)); then\n"
+                     "  local command=${COMP_WORDS[1]}\n  COMPREPLY=()\n"
+                     "  if [[ $word == '=' ]]; then word=; elif [[ $before == '=' ]]; then "
+                     "before=${COMP_WORDS[COMP_CWORD-2]}; fi\n  if ((COMP_CWORD == 1)); then\n"
                      "    COMPREPLY=($(compgen -W '" +
                      commandNames() +
                      " --help --version' -- \"$word\"))\n    return\n  fi\n  case $command:$before in\n";

@@ -59,6 +59,24 @@ std::string unquoted(std::string_view typed)
   return word.starts_with("~/") && !home.empty() ? home.front() + word.substr(1) : word;
 }
 
+/// Words as they were typed: bash makes three of those that have a sign of equality outside of quotation marks. The
+/// value of an option is a word of its own.
+std::vector<std::string> putTogether(const std::vector<std::string>& parts)
+{
+  std::vector<std::string> words;
+  for (size_t i = 0; i < parts.size(); ++i)
+  {
+    if (parts[i] != "=" || words.empty())
+    {
+      words.push_back(parts[i]);
+      continue;
+    }
+    const std::string value = i + 1 < parts.size() ? parts[++i] : std::string();
+    words.back().starts_with("--") ? words.push_back(value) : void(words.back() += "=" + value);
+  }
+  return words;
+}
+
 /// How help calls the argument at a place; the last ones repeat, alone or as a pair.
 std::string argumentAt(const Command& command, size_t place)
 {
@@ -218,7 +236,8 @@ std::string fileOf(const Typed& typed)
   return arguments.empty() ? std::string() : arguments[second ? 1 : 0];
 }
 
-void offer(const Typed& typed, std::string word)
+/// `part`: the shell puts what is offered in the place of what stands behind a column's name alone.
+void offer(const Typed& typed, std::string word, bool part)
 {
   const size_t sign = typed.name.starts_with("[NAME=]") ? word.find('=') : std::string::npos;
   const std::string label = sign == std::string::npos ? "" : word.substr(0, sign + 1);
@@ -242,7 +261,7 @@ void offer(const Typed& typed, std::string word)
   Output out("-");
   for (const std::string& name : namesAt(source, found.form, path, begun->next))
   {
-    out.write(label + begun->kept + slash + begun->steps + name + "\n");
+    out.write((part ? "" : label) + begun->kept + slash + begun->steps + name + "\n");
   }
   out.commit();
 }
@@ -261,9 +280,13 @@ int completeWords(const std::vector<std::string>& words)
     return kFindings;
   }
   std::vector<std::string> line(words.begin() + 1, words.end());
+  bool part = false;
   if (words.front() == "bash")
   {
     std::transform(line.begin(), line.end(), line.begin(), unquoted);
+    const std::string last = line.back() == "=" ? "" : line.back();
+    line = putTogether(line);
+    part = line.back() != last;
   }
   const Command* const command = findCommand(line.front());
   if (command == nullptr)
@@ -278,7 +301,7 @@ int completeWords(const std::vector<std::string>& words)
   }
   try
   {
-    offer(typed, line.back());
+    offer(typed, line.back(), part);
   }
   catch (const std::exception&) // of a line that is being typed, nothing is told
   {

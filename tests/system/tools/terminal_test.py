@@ -298,7 +298,8 @@ class Completion(TerminalTest):
     def test_bash_offers_commands_options_and_choices(self):
         script = self.script("bash")
         for line, wanted in ((["tav", "sn"], ["snapshot"]), (["tav", "tree", "--dep"], ["--depth"]),
-                             (["tav", "tree", "--byte-order", "sw"], ["swapped"])):
+                             (["tav", "tree", "--byte-order", "sw"], ["swapped"]),
+                             (["tav", "tree", "--byte-order", "=", "sw"], ["swapped"])):
             words = " ".join(f"'{word}'" for word in line)
             done = subprocess.run(["bash", "-c", f". '{script}'; COMP_WORDS=({words}); COMP_CWORD={len(line) - 1}; _tav; "
                                                  "printf '%s\\n' \"${COMPREPLY[@]}\""], capture_output=True, timeout=PATIENCE)
@@ -336,6 +337,13 @@ class Completion(TerminalTest):
                              (["get", f"'{path}'", "'/system/ho"], ["/system/host"]),
                              (["get", "--all", path, "/system/host/"], ["/system/host/hostName", "/system/host/cpu"]),
                              (["hex", path, "--path", "//cpuO"], ["//cpuOnline"]), (["get", path, "/system/x"], []),
+                             # bash makes three words of one with a sign of equality
+                             (["hex", path, "--path", "=", "//cpuO"], ["//cpuOnline"]),
+                             (["table", path, "--each", "=", "/system/ho"], ["/system/host"]),
+                             (["table", path, "--each", "="], ["/system"]),
+                             (["table", path, "--each", "=", "/system", "--col", "n", "=", "host/ho"], ["host/hostName"]),
+                             (["table", path, "--each", "/system", "--col", "=", "n", "=", "host/ho"], ["host/hostName"]),
+                             (["table", path, "--each", "/system", "--col", "'n=host/ho'"], ["n=host/hostName"]),
                              (["get", path, self.folder / "x.t"], []), (["get", self.folder / "x.tav.n"], [path.name + ".names.json"])):
             words = " ".join(f'"{word}"' for word in [TAV[0], *line])
             done = subprocess.run(["bash", "-c", f". '{script}'; COMP_WORDS=({words}); COMP_CWORD={len(line)}; _tav; "
