@@ -28,20 +28,32 @@ std::string_view constantOf(std::string_view enumName) noexcept
   return words.substr(0, words.find(' '));
 }
 
-/// Calls with the id, the enum name and the tag of each element, in the order of the dictionary.
-template<class Visit>
-void forEachElement(Visit visit)
+/// Calls with the id, the enum name and the tag of each element whose tag or enum name may be one that is meant, by its
+/// first character, in the order of the dictionary.
+template<class MayBe, class Visit>
+void forEachElement(MayBe mayBe, Visit visit)
 {
   for (const TAVElementRange* range = inside::elementDirectory(); range->count != 0; ++range)
   {
     for (const TAVElementEntry& entry : std::span(range->pEntries, range->count))
     {
-      if (const std::string_view name = inside::enumNameOf(entry); name != kPlaceholder)
+      const char* const tag = inside::tagNameOf(entry);
+      const char* const enumName = inside::enumNameOf(entry);
+      if (!mayBe(*tag) && !mayBe(*enumName))
       {
-        visit(static_cast<uint16_t>(entry.id), name, std::string_view(inside::tagNameOf(entry)));
+        continue;
+      }
+      if (const std::string_view name = enumName; name != kPlaceholder)
+      {
+        visit(static_cast<uint16_t>(entry.id), name, std::string_view(tag));
       }
     }
   }
+}
+
+bool anyMayBe(char /*first*/) noexcept
+{
+  return true;
 }
 
 } // namespace
@@ -61,7 +73,10 @@ std::string_view elementName(uint16_t id) noexcept
 std::vector<uint16_t> idsNamed(std::string_view name, dictionary::OwnNames own)
 {
   std::vector<uint16_t> ids;
-  forEachElement([&](uint16_t id, std::string_view enumName, std::string_view tag) {
+  // Nearly all of the thousands of names begin with another character, and need no closer look. Some have blanks before.
+  const char first = name.empty() ? '\0' : name.front();
+  const auto mayBe = [first](char c) { return c == first || static_cast<unsigned char>(c) <= ' '; };
+  forEachElement(mayBe, [&](uint16_t id, std::string_view enumName, std::string_view tag) {
     const bool isTag = tag == name || paths::withoutBlanks(tag) == name;
     if (isTag || enumName == name || paths::withoutBlanks(enumName) == name || constantOf(enumName) == name)
     {
@@ -85,7 +100,7 @@ std::vector<uint16_t> idsLike(std::string_view pattern, dictionary::OwnNames own
   std::unique_copy(pattern.begin(), pattern.end(), std::back_inserter(shorter),
                    [](char left, char right) { return left == '*' && right == '*'; });
   std::vector<uint16_t> ids;
-  forEachElement([&](uint16_t id, std::string_view /*enumName*/, std::string_view tag) {
+  forEachElement(anyMayBe, [&](uint16_t id, std::string_view /*enumName*/, std::string_view tag) {
     if (paths::isLike(paths::withoutBlanks(tag), shorter))
     {
       ids.push_back(id);
@@ -124,7 +139,7 @@ std::string_view nearestTag(std::string_view name, dictionary::OwnNames own) noe
   {
     consider(entry.tag);
   }
-  forEachElement([&](uint16_t, std::string_view, std::string_view tag) { consider(tag); });
+  forEachElement(anyMayBe, [&](uint16_t, std::string_view, std::string_view tag) { consider(tag); });
   return nearest;
 }
 

@@ -6,7 +6,8 @@ import shlex
 import struct
 import unittest
 
-from support import ToolTest, generate, nodes_of, tav, tree_rows
+from hostile_test import processor_time
+from support import SANITIZED, ToolTest, generate, nodes_of, tav, tree_rows
 
 
 class Paths(ToolTest):
@@ -135,14 +136,36 @@ class Paths(ToolTest):
         self.assertEqual((found.out, found.status), ("bob\n", 1))
         self.assertIn("0x20", found.err)
 
-    def test_hostile_paths_end_in_a_sentence(self):
+    # Paths that somebody made to keep a program busy, and whether they are paths. 128 KiB are as long as a word can be.
+    HOSTILE = (("/host" * 10000, True), ("//*" * 5000, True), ("[" * 120000, False), ("host[" * 20000, False),
+               ("//*[.//*" * 30 + "]" * 30, True), ("//.." * 100, False), ("host[" + "(" * 120000, False),
+               ("//host[" + "not(" * 30 + "cpu" + ")" * 30 + "]/nothing", None), ("host[" + "a or " * 20000 + "a]", None),
+               ("//*[" + "*[" * 60 + "cpu" + "]" * 61, True), ("host" + "[1]" * 30000, None), ("*" * 100000, False))
+
+    def test_hostile_paths_end_in_a_sentence_in_every_command(self):
         path = self.snapshot()
-        for hostile, status in (("/host" * 10000, 1), ("//*" * 5000, 1), ("[" * 100000, 2), ("host[" * 20000, 2),
-                                ("//*[.//*" * 30 + "]" * 30, 1), ("//.." * 100, 2), ("host[" + "(" * 100000, 2)):
-            with self.subTest(path=hostile[:20]):
-                result = tav("get", path, hostile)
-                self.assertEqual((result.status, result.out), (status, ""))
-                self.assertTrue(result.err.startswith("tav: "))
+        out = self.folder / "out.tav"
+        commands = {"get": ("get", path, "{}"), "get --all": ("get", path, "--all", "{}"), "set": ("set", path, "{}", "1"),
+                    "table --each": ("table", path, "--each", "{}", "--col", "cpu"), "hex --path": ("hex", path, "--path", "{}"),
+                    "table --col": ("table", path, "--each", "/system", "--col", "{}"),
+                    "extract": ("extract", path, "{}", "-o", out), "diff --path-a": ("diff", path, "--path-a", "{}", "--path-b", "/"),
+                    "diff --path-b": ("diff", path, path, "--path-b", "{}"), "diff --ignore": ("diff", path, path, "--ignore", "{}")}
+        content = path.read_bytes()
+        for hostile, is_path in self.HOSTILE:
+            for name, words in commands.items():
+                with self.subTest(path=hostile[:20], command=name):
+                    before = processor_time()
+                    result = tav(*[hostile if word == "{}" else word for word in words])
+                    used = processor_time() - before
+                    # A column without values, and nothing to leave out, are no findings.
+                    fine = (0,) if name in ("table --col", "diff --ignore") else ()
+                    self.assertIn(result.status, (2,) if is_path is False else (1, 2, *fine) if is_path is None else (1, *fine),
+                                  result.err[:500])
+                    self.assertTrue(result.err.startswith("tav: ") or result.status in fine or name.startswith("table"),
+                                    result.err[:500])
+                    self.assertFalse(out.exists())
+                    self.assertLess(used, 20 if SANITIZED else 1)
+        self.assertEqual(path.read_bytes(), content)
 
     def test_a_misspelt_name_gets_a_hint(self):
         self.assertIn("did you mean host?", tav("get", self.snapshot(), "/system/hostt").err)
