@@ -73,7 +73,8 @@ std::string_view elementName(uint16_t id) noexcept
 std::vector<uint16_t> idsNamed(std::string_view name, dictionary::OwnNames own)
 {
   std::vector<uint16_t> ids;
-  // Nearly all of the thousands of names begin with another character, and need no closer look. Some have blanks before.
+  // Nearly all of the thousands of names begin with another character, and need no closer look;
+  // some begin with blanks.
   const char first = name.empty() ? '\0' : name.front();
   const auto mayBe = [first](char c) { return c == first || static_cast<unsigned char>(c) <= ' '; };
   forEachElement(mayBe, [&](uint16_t id, std::string_view enumName, std::string_view tag) {
