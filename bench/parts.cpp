@@ -87,6 +87,15 @@ void measure(uint64_t mebibytes, bool flat)
   std::printf("W10/plan_%s: %.2f ms for %zu parts: %.2f ms a GB\n", name.c_str(), planned.seconds * 1e3, parts,
               planned.seconds * 1e12 / static_cast<double>(bytes.size()));
   compare("check_" + name, [&](unsigned threads) { (void)check(source, {}, {.threads = threads}); });
+  const TableQuery query(flat ? "/system/cpuOnline" : "/system/host", {{"n", flat ? "." : "cpuOnline"}});
+  compare("table_" + name, [&](unsigned threads) {
+    uint64_t rows = 0;
+    readTable(source, {}, query, {.threads = threads}, [&](const Table& some) { rows += some.rows(); });
+    if (rows < mebibytes)
+    {
+      std::printf("W10/table_%s: rows are missing\n", name.c_str());
+    }
+  });
   compare("schema_" + name, [&](unsigned threads) {
     Schema schema;
     schema.add(source, {}, {.threads = threads});

@@ -42,6 +42,7 @@ public:
     const Walker& walker() const { return checker.walker(); }
     bool isSpoilt() const { return checker.findings() + checker.damages() != 0; }
     bool isPlain() const { return checker.isPlain(); }
+    bool leansOnDamage() const { return walker().leansOnDamage(); }
 
     Checker checker;
     const std::function<void(uint64_t)>* progress;

@@ -34,6 +34,7 @@ bool standsAt(const Walker& walk, const Part& part);
 ///     const Walker& walker() const
 ///     bool isSpoilt() const                            it has met what only the whole walk can tell of
 ///     bool isPlain() const                             nothing before the place has a say behind it, but for the walk
+///     bool leansOnDamage() const                       as Walker's
 ///   std::unique_ptr<Walk> tryFrom(source, state)       called by any thread
 ///   std::unique_ptr<Walk> goOnFrom(source, state)      the others by the caller's
 ///   void take(Walk&)                                   what was found in it comes next
@@ -58,7 +59,8 @@ public:
     for (size_t i = 0; i < parts_.size();)
     {
       const Try one = run.await(i) ? std::exchange(tries_[i], Try{}) : Try{};
-      i = one.walk != nullptr && join(sure, one) ? i + 1 : goOn(run.source(), sure, i);
+      const bool joined = one.walk != nullptr && join(sure, one);
+      i = joined && one.seam ? i + 1 : goOn(run.source(), sure, i);
       job_.reached(i < parts_.size() ? parts_[i].offset : source_.size());
       run.passTo(i);
     }
@@ -69,6 +71,7 @@ private:
   {
     std::shared_ptr<Walk> walk{}; ///< null: of no use
     Walker::State end{};
+    bool seam = false; ///< the next part begins there
   };
 
   Try tryPart(const std::atomic<bool>& stop, ByteSource& source, size_t i)
@@ -81,14 +84,16 @@ private:
     {
       if (!walk->step())
       {
-        return isLast ? Try{std::move(walk), walker.state()} : Try{};
+        return isLast ? Try{std::move(walk), walker.state(), true} : Try{};
       }
       if (walk->isSpoilt() || stop.load(std::memory_order_relaxed))
       {
         return {};
       }
     }
-    return standsAt(walker, parts_[i + 1]) && walk->isPlain() ? Try{std::move(walk), walker.state()} : Try{};
+    // What it has found is right wherever it ends, as when it stepped over a group that goes on beyond the part.
+    const bool seam = standsAt(walker, parts_[i + 1]);
+    return walk->isPlain() ? Try{std::move(walk), walker.state(), seam} : Try{};
   }
 
   bool join(Walker::State& sure, const Try& one)
@@ -97,7 +102,7 @@ private:
     const bool wasDamaged = std::any_of(sure.frames.begin(), sure.frames.end(),
                                         [](const auto& frame) { return frame.lastDamage != 0; });
     Walker::State end = one.end;
-    if ((walker.leansOnDamage() && wasDamaged) || !end.join(sure, walker.inherited()))
+    if ((one.walk->leansOnDamage() && wasDamaged) || !end.join(sure, walker.inherited()))
     {
       return false;
     }

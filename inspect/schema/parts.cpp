@@ -39,6 +39,7 @@ public:
                                 (event.what == What::nodeEnd && event.node.isGroup() && event.node.has(kOverrun)));
     }
     static bool isPlain() { return true; }
+    bool leansOnDamage() const { return walker_.leansOnDamage(); }
     void reach(uint64_t offset) const
     {
       if (*progress)

@@ -89,6 +89,11 @@ void TableChunk::putWide(Column& to, uint64_t row, CellKind kind, const RawCell&
     words = {static_cast<uint64_t>(number.high), number.low};
   }
   to.kinds[row] = static_cast<uint8_t>(kind);
+  putHalves(to, row, words);
+}
+
+void TableChunk::putHalves(Column& to, uint64_t row, const std::array<uint64_t, 2>& words)
+{
   to.cells[row] = heap_.size();
   const auto* const first = reinterpret_cast<const uint8_t*>(words.data());
   heap_.insert(heap_.end(), first, first + sizeof words);
@@ -151,11 +156,15 @@ void TableChunk::putAny(uint32_t column, uint64_t row, const RawCell& value)
 /// Values that are joined are text from the first on. A text has room for as much again when it has to be moved.
 void TableChunk::join(uint32_t column, uint64_t row, const RawCell& value)
 {
-  Column& to = columns_[column];
   TableChunk one(1, std::nullopt);
   one.addRow();
   one.put(0, 0, value);
-  const std::string text = cellText(one.cell(0, 0));
+  joinText(column, row, cellText(one.cell(0, 0)));
+}
+
+void TableChunk::joinText(uint32_t column, uint64_t row, std::string_view text)
+{
+  Column& to = columns_[column];
   const bool isFirst = to.kinds[row] == 0;
   if (row < loggedBelow_)
   {
@@ -181,6 +190,34 @@ void TableChunk::join(uint32_t column, uint64_t row, const RawCell& value)
   std::copy(joiner_->begin(), joiner_->end(), place + kSizeBytes + size);
   std::copy(text.begin(), text.end(), place + kSizeBytes + size + joiner_->size());
   std::memcpy(place, &joined, sizeof joined);
+}
+
+void TableChunk::merge(uint64_t row, const TableChunk& from, uint64_t fromRow)
+{
+  for (uint32_t i = 0; i < columns_.size(); ++i)
+  {
+    Column& to = columns_[i];
+    const Cell cell = from.cell(i, fromRow);
+    if (cell.kind == CellKind::missing || (joiner_ == nullptr && to.kinds[row] != 0))
+    {
+      continue;
+    }
+    if (joiner_ != nullptr)
+    {
+      joinText(i, row, cell.text);
+      continue;
+    }
+    to.kinds[row] = static_cast<uint8_t>(cell.kind);
+    to.cells[row] = cell.number;
+    if (cell.kind == CellKind::text || cell.kind == CellKind::bytes)
+    {
+      putText(to, row, cell.kind, reinterpret_cast<const uint8_t*>(cell.text.data()), cell.text.size());
+    }
+    else if (cell.kind == CellKind::unsigned128 || cell.kind == CellKind::signed128)
+    {
+      putHalves(to, row, {cell.high, cell.number});
+    }
+  }
 }
 
 void TableChunk::copy(uint32_t column, uint64_t fromRow, uint64_t row)
@@ -243,8 +280,8 @@ void TableChunk::cut(uint64_t rows)
 Cell TableChunk::cell(size_t column, uint64_t row) const
 {
   const Column& from = columns_[column];
-  Cell cell{.kind = static_cast<CellKind>(from.kinds[row])};
-  const uint64_t value = from.cells[row];
+  Cell cell{.kind = kind(column, row)};
+  const uint64_t value = from.cells[first_ + row];
   switch (cell.kind)
   {
   case CellKind::missing: break;

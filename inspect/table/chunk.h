@@ -1,6 +1,7 @@
 /// Rows of a table as they are filled.
 #pragma once
 
+#include <array>
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
@@ -31,11 +32,11 @@ public:
   explicit TableChunk(size_t columns, const std::optional<std::string>& joiner)
       : columns_(columns), joiner_(joiner ? &*joiner : nullptr) {}
 
-  uint64_t rows() const { return rows_; }
+  uint64_t rows() const { return rows_ - first_; }
   size_t columns() const { return columns_.size(); }
-  const uint8_t* kinds(size_t column) const { return columns_[column].kinds.data(); }
-  const uint64_t* cells(size_t column) const { return columns_[column].cells.data(); }
-  CellKind kind(size_t column, uint64_t row) const { return static_cast<CellKind>(columns_[column].kinds[row]); }
+  const uint8_t* kinds(size_t column) const { return columns_[column].kinds.data() + first_; }
+  const uint64_t* cells(size_t column) const { return columns_[column].cells.data() + first_; }
+  CellKind kind(size_t column, uint64_t row) const { return static_cast<CellKind>(kinds(column)[row]); }
   Cell cell(size_t column, uint64_t row) const;
 
   /// A row without values.
@@ -82,6 +83,13 @@ public:
   /// Takes the rows from one on away.
   void cut(uint64_t rows);
 
+  /// Puts what a row of another chunk has behind what is in a row of this one, as if it had been put here. Nothing may
+  /// have been dropped of the other one.
+  void merge(uint64_t row, const TableChunk& from, uint64_t fromRow);
+  /// Takes the first rows away, of which nothing is asked any more. The numbers of rows in `kinds`, `cells`, `kind` and
+  /// `cell` begin behind them; elsewhere they stay.
+  void dropFirst(uint64_t rows) { first_ = rows; }
+
 private:
   struct Column
   {
@@ -103,8 +111,10 @@ private:
 
   void grow();
   void join(uint32_t column, uint64_t row, const RawCell& value);
+  void joinText(uint32_t column, uint64_t row, std::string_view text);
   void putText(Column& to, uint64_t row, CellKind kind, const uint8_t* bytes, uint64_t size);
   void putWide(Column& to, uint64_t row, CellKind kind, const RawCell& value);
+  void putHalves(Column& to, uint64_t row, const std::array<uint64_t, 2>& words);
   void putTime(Column& to, uint64_t row, const RawCell& value);
   void setOther(Column& to, uint64_t row, const RawCell& value);
   uint64_t sizeAt(uint64_t place) const;
@@ -139,6 +149,7 @@ private:
   std::vector<Column> columns_;
   const std::string* joiner_;
   uint64_t rows_ = 0;
+  uint64_t first_ = 0; ///< those before were dropped
   uint64_t capacity_ = 0;
   std::vector<uint8_t> heap_{}; ///< sizes with their bytes, and 128-bit numbers, the upper half first
   uint64_t loggedBelow_ = 0;    ///< what is put into rows before it is written down, to come back to the mark

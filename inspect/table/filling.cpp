@@ -25,23 +25,34 @@ void Filling::otherData(const Automaton::Move& move, const RawCell& value)
   }
 }
 
-void Filling::dropOpenRows()
+std::vector<uint64_t> Filling::openRows() const
 {
+  std::vector<uint64_t> rows;
   for (const Level& level : levels_)
   {
     if (level.row != kNoRow)
     {
-      chunk_->cut(level.row);
-      break;
+      rows.push_back(level.row);
     }
+  }
+  return rows;
+}
+
+uint64_t Filling::dropOpenRows()
+{
+  const std::vector<uint64_t> rows = openRows();
+  if (!rows.empty())
+  {
+    chunk_->cut(rows.front());
   }
   levels_.resize(1);
   open_ = 0;
+  return rows.empty() ? kNoRow : rows.front();
 }
 
-std::shared_ptr<const TableChunk> Filling::take()
+std::shared_ptr<TableChunk> Filling::take()
 {
-  std::shared_ptr<const TableChunk> rows = std::move(chunk_);
+  std::shared_ptr<TableChunk> rows = std::move(chunk_);
   begin();
   return rows;
 }

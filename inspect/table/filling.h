@@ -81,10 +81,12 @@ public:
 
   /// Rows whose nodes have not ended yet.
   bool hasOpenRows() const { return open_ != 0; }
-  /// Takes the rows from the first one on away whose node has not ended.
-  void dropOpenRows();
-  /// The rows so far, when none is open.
-  std::shared_ptr<const TableChunk> take();
+  /// The open rows, from the outermost inwards.
+  std::vector<uint64_t> openRows() const;
+  /// Takes the rows from the first one on away whose node has not ended, and says which that is.
+  uint64_t dropOpenRows();
+  /// The rows so far. What goes on is put into others.
+  std::shared_ptr<TableChunk> take();
   /// Keeps the automaton small, between nodes.
   void tidy();
 

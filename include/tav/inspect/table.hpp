@@ -153,6 +153,13 @@ struct TableOptions
   uint64_t end = ~uint64_t{0};    ///< roots that begin there or behind are not read
   bool onlyWalker = false;        ///< takes every node by the Walker's steps: slow, for comparisons
   DamageWatch::Sink passedOver{}; ///< is told of the damage that `skip` passes over
+  /// `readTable` works on a source of 4 MiB or more with so many threads, with the same result. All callbacks are
+  /// called by the caller's. Where a path asks for more than names on the way down, each root is one thread's work;
+  /// where it asks for more than one root, all is.
+  unsigned threads = 1;
+  uint64_t partBytes = 0;                   ///< how long the parts are that threads take; 0: by the source's size
+  uint64_t batchRows = 65536;               ///< that `readTable` hands out at once, or more where they come together
+  std::function<void(uint64_t)> progress{}; ///< with several threads: all before this offset was read
 };
 
 /// Reads rows in one pass over a source, every stream in it in its own form. Memory: the rows that are not handed out
@@ -184,6 +191,12 @@ private:
   class State;
   std::unique_ptr<State> state_;
 };
+
+/// Hands all rows of a source out in pieces, in their order. Returns the damage at which reading has stopped. Throws
+/// Error when the source does, and what the callbacks throw.
+TAV_INSPECT_API std::optional<Problem> readTable(ByteSource& source, const Form& form, const TableQuery& query,
+                                                 const TableOptions& options,
+                                                 const std::function<void(const Table&)>& rows);
 
 /// All rows of a source. Throws Error at damage unless it is skipped.
 TAV_INSPECT_API Table readTable(ByteSource& source, const Form& form, const TableQuery& query,

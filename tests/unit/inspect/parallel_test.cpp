@@ -95,7 +95,151 @@ std::string shaped(const Bytes& bytes, const tav::inspect::Form& form, uint64_t 
   return text;
 }
 
+TableQuery asked(std::string_view each, const std::vector<std::string>& paths, std::optional<std::string> joiner = {})
+{
+  std::vector<TableColumn> columns;
+  for (const std::string& path : paths)
+  {
+    columns.push_back({path, path});
+  }
+  return {each, columns, std::move(joiner)};
+}
+
+/// Rows of roots, of groups, of data elements, inside of each other; columns of all kinds.
+const std::vector<TableQuery>& tables()
+{
+  static const std::vector<TableQuery> all = {
+      asked("//*", {".", "cpuOnline", "*"}),
+      asked("//*", {".", "host/*", "*"}, "+"),
+      asked("//host", {"hostName", "memTotal", "host/cpuOnline"}),
+      asked("/*", {"*", "*/*", "host/host/*"}, ","),
+      asked("/*", {"cpuOnline", "hostName", "host/memTotal", "host/hostName"}),
+      asked("/*/*", {"cpuOnline", "../memTotal"}),
+      asked("//host", {"hostName", ".//cpuOnline", "*[2]"}),
+      asked("//host[cpuOnline]", {"memTotal", ".//hostName"}),
+      asked("/*[2]", {"cpuOnline"}),
+      asked("/system/host", {"hostName"}),
+      asked("/system", {"#60101"}),
+  };
+  return all;
+}
+
+std::string tabled(const Bytes& bytes, const tav::inspect::Form& form, const TableQuery& query, OnDamage onDamage,
+                   unsigned threads, uint64_t part)
+{
+  ByteSource source("x", std::span<const uint8_t>(bytes));
+  std::string text;
+  std::string told;
+  const auto stopped = readTable(source, form, query,
+                                 {.onDamage = onDamage,
+                                  .passedOver =
+                                      [&](const PassedOver& passed) {
+                                        told += passed.path + " " + passed.sentence + "\n";
+                                      },
+                                  .threads = threads,
+                                  .partBytes = part,
+                                  .batchRows = 7},
+                                 [&](const Table& rows) {
+                                   for (uint64_t row = 0; row < rows.rows(); ++row)
+                                   {
+                                     for (size_t column = 0; column < rows.columns().size(); ++column)
+                                     {
+                                       const Cell cell = rows.cell(column, row);
+                                       text += std::to_string(static_cast<int>(cell.kind)) + cellText(cell) + "|";
+                                     }
+                                     text += "\n";
+                                   }
+                                 });
+  return text + told + (stopped ? problemLine(*stopped) : "");
+}
+
+void expectSameTables(const Bytes& bytes, const tav::inspect::Form& form, const std::vector<uint64_t>& parts)
+{
+  for (size_t i = 0; i < tables().size(); ++i)
+  {
+    for (const OnDamage onDamage : {OnDamage::stop, OnDamage::skip})
+    {
+      SCOPED_TRACE("table " + std::to_string(i) + (onDamage == OnDamage::skip ? " skip" : " stop"));
+      const std::string one = tabled(bytes, form, tables()[i], onDamage, 1, 0);
+      for (const uint64_t part : parts)
+      {
+        ASSERT_EQ(tabled(bytes, form, tables()[i], onDamage, static_cast<unsigned>(2 + part % 3), part), one) << part;
+      }
+    }
+  }
+}
+
 } // namespace
+
+TEST(Parallel, MakesTablesOfRandomTreesAsOneThreadDoes)
+{
+  for (uint64_t seed = 0; seed < test::casesOf(40).count; ++seed)
+  {
+    SCOPED_TRACE(seed);
+    const Bytes bytes = mixture(seed);
+    const tav::inspect::Form form{.swapped = seed % 2 == 1, .aligned = seed % 3 == 1};
+    expectSameTables(bytes, form, {30, 300, bytes.size() / 64 + 1, bytes.size() / 2 + 1});
+  }
+}
+
+TEST(Parallel, MakesTablesOfRootsAsOneThreadDoes)
+{
+  for (uint64_t seed = 0; seed < test::casesOf(6).count; ++seed)
+  {
+    SCOPED_TRACE(seed);
+    Bytes bytes;
+    for (uint64_t i = 0; i < 30; ++i)
+    {
+      const Bytes more = test::namedStream(seed * 31 + i);
+      bytes.insert(bytes.end(), more.begin(), more.end());
+    }
+    for (uint64_t i = 0; i < seed / 2; ++i)
+    {
+      bytes = test::damaged(bytes, seed * 7 + i);
+    }
+    expectSameTables(bytes, {}, {100, 1000, bytes.size() / 3});
+  }
+}
+
+TEST(Parallel, MakesTablesOfLongGroupsAsOneThreadDoes)
+{
+  for (uint64_t seed = 0; seed < test::casesOf(8).count; ++seed)
+  {
+    SCOPED_TRACE(seed);
+    Bytes bytes = longGroup(300, seed % 2 == 1);
+    for (uint64_t i = 0; i < seed / 2; ++i)
+    {
+      bytes = test::damaged(bytes, seed * 7 + i);
+    }
+    expectSameTables(bytes, {}, {500, 9000});
+  }
+}
+
+TEST(Parallel, MakesNoRowsOfWhatIsForgedInAPayload)
+{
+  // A payload, longer than several parts, that holds what its siblings look like, eye catchers and rows included.
+  const Bytes inner = longGroup(300, true);
+  tav::Writer writer;
+  {
+    tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM, {.eyeSize = true});
+    for (unsigned i = 0; i < 400; ++i)
+    {
+      if (i == 200)
+      {
+        root.add(TAV_ELM_CMN_HOST_NAME, std::as_bytes(std::span(inner).subspan(16)));
+      }
+      tav::Group host = root.group(TAV_ELM_CMN_HOST, {.eyeSize = true});
+      host.add(TAV_ELM_CMN_HOST_NAME, "ada", {.eyeSize = true});
+      host.add(TAV_ELM_CMN_CPU_ONLINE, uint32_t{i}, {.eyeSize = true});
+    }
+  }
+  writer.finish();
+  const auto* const first = reinterpret_cast<const uint8_t*>(writer.bytes().data());
+  const Bytes bytes(first, first + writer.bytes().size());
+  expectSameTables(bytes, {}, {2000, 9000});
+  const std::string hosts = tabled(bytes, {}, asked("//host", {"cpuOnline"}), OnDamage::stop, 3, 2000);
+  EXPECT_EQ(std::count(hosts.begin(), hosts.end(), '\n'), 400);
+}
 
 TEST(Parallel, ChecksAsOneThreadDoes)
 {
