@@ -16,34 +16,17 @@ namespace
 
 constexpr size_t kWidestPath = 60; ///< longer ones push the rest of their line to the right
 
-/// Adds one file. What ends its reading is told, and ends nothing else.
 Status addFile(const Invocation& invocation, const std::string& name, Schema& schema)
 {
-  try
-  {
-    Stream stream = openStream(invocation, name, invocation.number("--from").value_or(0));
-    DamageNotices notices(stream);
-    {
-      const unsigned jobs = jobsOf(invocation);
-      Progress progress("schema " + stream.source->name(), stream.bytes());
-      schema.add(stream.bytes(), stream.form(),
-                 {.passed = [&](PassedOver passed) { notices.add(std::move(passed)); },
-                  .progress = [&](uint64_t offset) { jobs > 1 ? progress.reach(offset) : progress.at(offset); },
-                  .threads = jobs});
-    }
-    tellStatistics(invocation, stream.bytes());
-    return notices.tell();
-  }
-  catch (const Failure& failure)
-  {
-    report(failure.problem);
-    return failure.status;
-  }
-  catch (const Error& error)
-  {
-    report(error.problem());
-    return kTrouble;
-  }
+  return forFile(invocation, name, [&](Stream& stream, DamageNotices& notices) {
+    const unsigned jobs = jobsOf(invocation);
+    Progress progress("schema " + stream.source->name(), stream.bytes());
+    schema.add(stream.bytes(), stream.form(),
+               {.passed = [&](PassedOver passed) { notices.add(std::move(passed)); },
+                .progress = [&](uint64_t offset) { jobs > 1 ? progress.reach(offset) : progress.at(offset); },
+                .threads = jobs});
+    return kFine;
+  });
 }
 
 std::string typesText(const SchemaEntry& entry)

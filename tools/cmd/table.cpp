@@ -244,63 +244,42 @@ private:
     }
   }
 
-  /// Adds one file. What ends its reading is told, and ends nothing else.
   Status readFile(const std::string& name, RowWriter& writer)
   {
-    std::optional<Stream> stream;
-    try
-    {
-      stream.emplace(openStream(invocation_, name, invocation_.number("--from").value_or(0)));
-    }
-    catch (const Failure& failure)
-    {
-      report(failure.problem);
-      return failure.status;
-    }
-    catch (const Error& error)
-    {
-      report(error.problem());
-      return kTrouble;
-    }
-    try
-    {
-      return readStream(name, *stream, queryFor(stream->bytes().dictionary()), writer);
-    }
-    catch (const Error& error) // the names of own elements are those of this file
-    {
-      report(error.problem());
-      return kFindings;
-    }
-  }
-
-  Status readStream(const std::string& name, Stream& stream, const TableQuery& query, RowWriter& writer)
-  {
-    DamageNotices notices(stream);
-    TableReader reader(stream.bytes(), stream.form(), query,
-                       {.onDamage = onDamage_, .passedOver = [&](const PassedOver& passed) { notices.add(passed); }});
-    try
-    {
+    return forFile(invocation_, name, [&](Stream& stream, DamageNotices& notices) {
+      useNamesOf(stream.bytes().dictionary());
+      const unsigned jobs = jobsOf(invocation_);
       Progress progress("table " + stream.source->name(), stream.bytes());
-      writeRows(name, query, reader, writer);
-    }
-    catch (const Error& error)
-    {
-      report(error.problem());
-      return std::max(notices.tell(), kTrouble);
-    }
-    tellStatistics(invocation_, stream.bytes());
-    const Status status = notices.tell();
-    if (!reader.stopped())
-    {
-      return status;
-    }
-    report(*reader.stopped());
-    return kFindings;
+      OutRow row = beginRow(name);
+      const auto stopped =
+          readTable(stream.bytes(), stream.form(), query_,
+                    {.onDamage = onDamage_,
+                     .passedOver = [&](const PassedOver& passed) { notices.add(passed); },
+                     .threads = jobs,
+                     .batchRows = 4096,
+                     .progress = [&](uint64_t offset) { jobs > 1 ? progress.reach(offset) : void(); }},
+                    [&](const Table& rows) { writeRows(rows, row, writer); });
+      if (stopped)
+      {
+        report(*stopped);
+      }
+      return stopped ? kFindings : kFine;
+    });
   }
 
-  void writeRows(const std::string& name, const TableQuery& query, TableReader& reader, RowWriter& writer)
+  /// Reads the paths anew where own elements have other names than in the file before.
+  void useNamesOf(const Dictionary& dictionary)
   {
-    constexpr uint64_t batch = 4096;
+    if (dictionary_ != dictionary)
+    {
+      query_ = queryFor(dictionary);
+      dictionary_ = dictionary;
+    }
+  }
+
+  /// A row with the columns that are the same in all of a file.
+  OutRow beginRow(const std::string& name) const
+  {
     OutRow row(columns_.size());
     size_t first = 0;
     if (invocation_.has("--file"))
@@ -311,24 +290,27 @@ private:
     {
       row[first++] = {.own = label.text, .isOwn = true, .isText = true};
     }
-    for (Table rows(query); reader.next(rows, batch); rows = Table(query))
+    return row;
+  }
+
+  void writeRows(const Table& rows, OutRow& row, RowWriter& writer)
+  {
+    const size_t first = columns_.size() - query_.columns().size();
+    for (uint64_t i = 0; i < rows.rows(); ++i)
     {
-      for (uint64_t i = 0; i < rows.rows(); ++i)
+      for (size_t column = 0; column < query_.columns().size(); ++column)
       {
-        for (size_t column = 0; column < query.columns().size(); ++column)
-        {
-          row[first + column] = {.cell = rows.cell(column, i)};
-        }
-        rates_ ? rates_->apply(row) : void();
-        writer.row(row);
+        row[first + column] = {.cell = rows.cell(column, i)};
       }
-      rows_ += rows.rows();
+      rates_ ? rates_->apply(row) : void();
+      writer.row(row);
     }
+    rows_ += rows.rows();
   }
 
   const Invocation& invocation_;
   std::vector<NamedText> labels_;
-  Dictionary dictionary_; ///< of the first file
+  Dictionary dictionary_; ///< of the file at hand, the first one to begin with
   TableQuery query_;      ///< with its names
   OnDamage onDamage_;
   std::vector<OutColumn> columns_{};
@@ -406,7 +388,8 @@ const Registration registration{{
                 {.names = "-o,--output",
                  .kind = ValueKind::file,
                  .value = "OUT",
-                 .help = "where the table goes, standard output unless given"}},
+                 .help = "where the table goes, standard output unless given"},
+                jobsOption()},
     .examples = {{"tav table day.tav --each /system --col time=timestamp --col host/hostName", "a series as CSV"},
                  {"tav table *.tav --each //host --col hostName --col ../timestamp --file > hosts.csv",
                   "every host of many files"},

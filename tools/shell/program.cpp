@@ -116,7 +116,7 @@ int runProgram(int argc, char** argv)
   catch (const Error& error)
   {
     report(withHint(error.problem()));
-    return error.trouble() == Trouble::notFound ? kFindings : kTrouble;
+    return statusOf(error);
   }
   catch (const ClosedPipe&)
   {

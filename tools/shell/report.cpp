@@ -39,6 +39,11 @@ std::string shown(std::string_view text, std::FILE* where)
   return host::isTerminal(where) ? forTerminal(text) : std::string(text);
 }
 
+Status statusOf(const Error& error)
+{
+  return error.trouble() == Trouble::notFound ? kFindings : kTrouble;
+}
+
 Failure::Failure(Status exitStatus, Problem what)
     : std::runtime_error(what.sentence), status(exitStatus), problem(std::move(what))
 {

@@ -39,6 +39,9 @@ std::string shown(std::string_view text, std::FILE* where = stdout);
 /// Prints `tav: sentence` to standard error.
 void report(std::string_view sentence);
 
+/// The exit status when the library cannot go on.
+Status statusOf(const Error& error);
+
 /// Ends a command: thrown wherever it cannot go on, caught in main, which reports the problem and exits.
 class Failure : public std::runtime_error
 {

@@ -1,6 +1,7 @@
 #include "tools/shell/session.h"
 
 #include <algorithm>
+#include <optional>
 #include <thread>
 #include <utility>
 
@@ -143,6 +144,35 @@ Status DamageNotices::tell() const
                                "; 'tav check' tells all"});
   }
   return places_ == 0 ? kFine : kFindings;
+}
+
+Status forFile(const Invocation& invocation, const std::string& name,
+               const std::function<Status(Stream&, DamageNotices&)>& work)
+{
+  std::optional<Stream> stream;
+  std::optional<DamageNotices> notices;
+  Status status = kFine;
+  try
+  {
+    try
+    {
+      stream.emplace(openStream(invocation, name, invocation.number("--from").value_or(0)));
+    }
+    catch (const Failure& failure)
+    {
+      report(failure.problem);
+      return failure.status;
+    }
+    notices.emplace(*stream);
+    status = work(*stream, *notices);
+    tellStatistics(invocation, stream->bytes());
+  }
+  catch (const Error& error)
+  {
+    report(withHint(error.problem()));
+    status = statusOf(error);
+  }
+  return notices ? std::max(status, notices->tell()) : status;
 }
 
 void tellStatistics(const Invocation& invocation, const ByteSource& source)

@@ -2,6 +2,7 @@
 /// What nearly every command begins with: the file named on its command line, opened and recognised.
 #pragma once
 
+#include <functional>
 #include <memory>
 #include <string>
 #include <vector>
@@ -78,6 +79,11 @@ private:
   uint64_t places_ = 0;
   DamageWatch watch_;
 };
+
+/// Works on one of several files, from --from on. What is no stream, and an Error, is told, and what was passed over
+/// until then, and ends nothing else. Returns the highest status.
+Status forFile(const Invocation& invocation, const std::string& name,
+               const std::function<Status(Stream&, DamageNotices&)>& work);
 
 /// Remembers how much was read for --stats. Called when a source is done with.
 void tellStatistics(const Invocation& invocation, const ByteSource& source);

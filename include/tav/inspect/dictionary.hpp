@@ -3,6 +3,7 @@
 /// owners write. docs/tav.md describes the form.
 #pragma once
 
+#include <algorithm>
 #include <cstdint>
 #include <memory>
 #include <span>
@@ -64,6 +65,16 @@ public:
 
   /// Both; where they say different things of an id or of a tag, this one is right.
   TAV_INSPECT_API Dictionary over(const Dictionary& lower) const;
+
+  /// Whether both have the same elements, wherever they are given.
+  friend bool operator==(const Dictionary& a, const Dictionary& b) noexcept
+  {
+    const auto isSame = [](const OwnElement& x, const OwnElement& y) {
+      return x.id == y.id && x.tag == y.tag && x.kind == y.kind && x.unit == y.unit && x.text == y.text;
+    };
+    return a.state_ == b.state_ || std::equal(a.elements().begin(), a.elements().end(), b.elements().begin(),
+                                              b.elements().end(), isSame);
+  }
 
   bool isEmpty() const noexcept { return state_ == nullptr; }
 

@@ -55,6 +55,25 @@ class OwnNames(Folder):
         self.assertEqual((result.status, result.out), (1, ""))
         self.assertIn("no element is called 'jobs'", result.err)
 
+    def test_in_a_table_of_many_files_each_has_the_names_beside_it(self):
+        files = []
+        for i, tag in enumerate(("40001", "40002", "40001", None, "40001")):
+            files.append(self.folder / f"{i}.tav")
+            document = {"system": {"#40001": 1, "#40002": 2, "hostName": f"host{i}"}}
+            self.run_tav("build", "-o", files[-1], stdin=json.dumps(document).encode())
+            if tag:
+                (self.folder / f"{i}.tav.names.json").write_text(json.dumps({tag: {"tag": "queueDepth"}}))
+        result = tav("table", *files, "--each", "/system", "--col", "hostName", "--col", "queueDepth")
+        self.assertEqual((result.status, result.out), (1, "hostName,queueDepth\nhost0,1\nhost1,2\nhost2,1\nhost4,1\n"))
+        self.assertIn("no element is called 'queueDepth'", result.err)
+
+    def test_what_cannot_be_read_is_told_with_what_helps(self):
+        for command in (("table", "--each", "/system", "--col", "hostName"), ("schema",)):
+            with self.subTest(command=command):
+                many, one = tav(*command, self.stream, "-", "--spool-limit", 1, stdin=b"xx"), tav("tree", "-", "--spool-limit", 1, stdin=b"xx")
+                self.assertEqual((many.status, many.err), (2, one.err))
+                self.assertEqual(many.out, tav(*command, self.stream).out)
+
     def test_paths_lead_to_them(self):
         self.assertEqual(self.out("get", self.stream, "/system[queueDepth > 6]/jobs[job_owner='y']/job_owner"), "y\n")
         self.out("extract", self.stream, "//jobs", "-o", self.folder / "jobs.tav")

@@ -3,7 +3,10 @@ import unittest
 
 from support import ToolTest, generate, tav
 
-COMMANDS = (("check",), ("check", "--json"), ("check", "--notes"), ("schema",), ("schema", "--json"), ("schema", "--ends"))
+COMMANDS = (("check",), ("check", "--json"), ("check", "--notes"), ("schema",), ("schema", "--json"), ("schema", "--ends"),
+            ("table", "--each", "//*", "--col", "x=.", "--col", "*"), ("table", "--each", "/*", "--col", "*/*", "--join", "+"),
+            ("table", "--each", "//host", "--col", "hostName", "--col", ".//cpuOnline", "--on-damage", "skip"),
+            ("table", "--each", "/*/*", "--col", "#307", "--file", "--format", "jsonl"))
 
 
 class Jobs(ToolTest):

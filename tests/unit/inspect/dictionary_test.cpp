@@ -165,6 +165,15 @@ TEST_P(WrongDictionary, IsToldWithItsPlace)
 INSTANTIATE_TEST_SUITE_P(All, WrongDictionary, ::testing::ValuesIn(kWrong),
                          [](const auto& row) { return std::string(row.param.name); });
 
+TEST(Dictionary, IsEqualWithTheSameElementsWhereverTheyAreGiven)
+{
+  EXPECT_EQ(Dictionary(), Dictionary());
+  EXPECT_EQ(read(kTwo), read(kTwo, "other.json"));
+  EXPECT_NE(read(kTwo), Dictionary());
+  EXPECT_NE(read(kTwo), read(R"({"40001": {"tag": "queueDepth"}, "40002": {"tag": "jobs_done", "kind": "counter"}})"));
+  EXPECT_NE(read(R"({"40001": {"tag": "queueDepth"}})"), read(R"({"40002": {"tag": "queueDepth"}})"));
+}
+
 TEST(Dictionary, TwoOfOneRankMustAgree)
 {
   const Dictionary one = read(kTwo, "a.json");
