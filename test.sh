@@ -113,6 +113,7 @@ check_documents()
 check_thread()
 {
   build tsan --target kor_tests trace_tests threads_tests
+  local -x TAV_MEANWHILE_MS=5000
   run_tests tsan --label-regex '^(kor|trace|threads)$'
 }
 
@@ -243,7 +244,9 @@ check_sanitizers()
   local -x UBSAN_OPTIONS=print_stacktrace=1
   run_rooms asan-clang tests "" "${roomsHere[@]}"
   run_properties asan-clang tests ""
-  run_tests asan-clang --label-regex '^(tools|fuzz|faults|disk|kill)$' --exclude-regex "^($slow)$"
+  # A writer and three readers for some seconds; tests/system/threads/meanwhile.sh does it for a minute.
+  local -x TAV_MEANWHILE_MS=5000
+  run_tests asan-clang --label-regex '^(tools|fuzz|faults|disk|kill|threads)$' --exclude-regex "^($slow)$"
 }
 
 # With clang++ the tests run where libc++ and the sanitizers are; here the libraries, the program and the examples.

@@ -21,7 +21,7 @@ constexpr uint32_t kValues = 20;
 
 std::chrono::milliseconds lasting()
 {
-  const char* const wanted = std::getenv("TAV_MEANWHILE_MS"); // a minute on demand
+  const char* const wanted = std::getenv("TAV_MEANWHILE_MS"); // a minute: meanwhile.sh
   return std::chrono::milliseconds(wanted != nullptr ? std::strtoll(wanted, nullptr, 10) : 1500);
 }
 
@@ -140,9 +140,12 @@ TEST(ReadersMeanwhile, SeeClosedGroupsWholeAndAllThatWasFlushed)
 {
   const auto end = std::chrono::steady_clock::now() + lasting();
   uint64_t walks = 0;
+  uint64_t files = 0;
   do
   {
     walks += runRound();
+    ++files;
   } while (std::chrono::steady_clock::now() < end && !HasFailure());
-  std::printf("%llu walks\n", static_cast<unsigned long long>(walks));
+  std::printf("%llu files, %llu walks through them\n", static_cast<unsigned long long>(files),
+              static_cast<unsigned long long>(walks));
 }

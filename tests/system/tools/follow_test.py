@@ -159,6 +159,23 @@ class Follow(ToolTest):
         self.assertEqual(following.take(), ["/system/cpuOnline\t5"])
         self.assert_quiet_end(following)
 
+    def test_a_file_that_was_removed_is_read_on_until_another_one_comes(self):
+        self.append(group(SYSTEM, number(1)))
+        following = self.follow("get", "//cpuOnline", "--paths")
+        self.assertEqual(following.take(), ["/system/cpuOnline\t1"])
+        with self.path.open("ab", buffering=0) as writer:
+            self.path.unlink()
+            self.assertIn("there is no such file", following.note())
+            writer.write(group(SYSTEM, number(2)))  # its writer knows nothing of it
+            self.assertEqual(following.take(), ["/system[2]/cpuOnline\t2"])
+            self.append(group(SYSTEM, number(3), number(4)))
+            self.assertIn("a file has appeared", following.note())
+            self.assertEqual(following.take(2), ["/system/cpuOnline\t3", "/system/cpuOnline[2]\t4"])
+            writer.write(group(SYSTEM, number(5)))  # nobody reads it any more
+            self.append(group(SYSTEM, number(6)))
+            self.assertEqual(following.take(), ["/system[2]/cpuOnline\t6"])
+        self.assert_quiet_end(following)
+
     def test_files_that_a_recorder_changes_are_followed_through_a_link(self):
         with subprocess.Popen([*TAV, "snapshot", "--append", "--every", "50ms", "--rotate", "1", "-o",
                                str(self.folder / "r-%n.tav")]) as writer:
