@@ -96,9 +96,16 @@ void appendOne(Recorder& recorder, bool pairs, const SnapshotMaker& make, Width 
   const auto now = std::chrono::system_clock::now();
   make([&](std::span<const std::byte> nodes) {
     Group root = recorder.group(TAV_ELM_CMN_SYSTEM, {.children = children, .eyeSize = pairs});
-    root.add(SQLM_ELM_ATTR_TIMESTAMP, now, {.eyeSize = pairs});
-    root.addStream(children, nodes);
-    root.close();
+    try
+    {
+      root.add(SQLM_ELM_ATTR_TIMESTAMP, now, {.eyeSize = pairs});
+      root.addStream(children, nodes);
+      root.close();
+    }
+    catch (const std::system_error& error)
+    {
+      throw Failure(kTrouble, Problem{.file = recorder.path().text(), .sentence = error.what()});
+    }
   });
 }
 

@@ -61,6 +61,19 @@ inline void findEnd(KORHFile& file, const StreamOptions* given, FileEnd& found)
   found.outcome.code = findEnd(file, given != nullptr ? &form : nullptr, EndTaker{found, take, takeOpen});
 }
 
+/// An open root of which nothing but the header is whole goes like a node that was cut: closed as an empty group it
+/// would look as if the next root were in it.
+inline void dropEmptyRoot(FileEnd& found)
+{
+  const bool isEmpty = found.open.size() == 1 &&
+                       found.end == found.open[0].nodeOffset + layout::headerLength(found.open[0].hdrType);
+  if (isEmpty)
+  {
+    found.end = found.open[0].nodeOffset;
+    found.open.clear();
+  }
+}
+
 /// Opens a file to go on behind its last stream. Nothing in it changes before all is known to be well; then it ends
 /// where that stream does.
 inline FileEnd openToAppend(const FilePath& path, const FileOptions& options, const StreamOptions* given,
@@ -88,6 +101,10 @@ inline FileEnd openToAppend(const FilePath& path, const FileOptions& options, co
   {
     found.outcome = {TAV_RC_NOT_SUPPORTED, "the last root, at " + offsetText(found.open[0].nodeOffset) +
                                                ", was never closed, and the options refuse that"};
+  }
+  if (found.outcome.code == TAV_RC_OK && options.openRoot == OpenRoot::close)
+  {
+    dropEmptyRoot(found);
   }
   if (found.outcome.code == TAV_RC_OK)
   {

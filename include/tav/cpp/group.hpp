@@ -135,10 +135,12 @@ public:
   Group group(ElementId, const GroupOptions&, std::error_code&) && = delete;
   Group group(ElementId, std::error_code&) && = delete;
 
-  /// Closes the group; afterwards it takes nothing more. After a failure it is still open.
+  /// Closes the group; afterwards it takes nothing more. After a failure it is still open, but for a Recorder's root
+  /// that is closed and cannot be synced.
   void close()
   {
-    detail::demand(end(0), "closing a group", [this] { return tell(); });
+    const uint32_t before = level_;
+    detail::demand(end(0), "closing a group", [&] { return before == level_ ? tell() : detail::Told{}; });
   }
   void close(std::error_code& ec) noexcept
   {

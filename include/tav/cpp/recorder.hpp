@@ -186,13 +186,13 @@ public:
       return {TAV_RC_BAD_PARAM, "the recording is finished"};
     }
     FileOutcome outcome;
-    if (writer_ && isDue())
+    if (writer_ && (isDue() || hasVanished()))
     {
       outcome = endFile();
     }
     if (outcome.code == TAV_RC_OK && !writer_)
     {
-      outcome = openNext();
+      outcome = files_.isNumbered() ? openNext() : openFile({.append = true});
     }
     opened_ = korSteadyTime();
     return outcome;
@@ -237,7 +237,16 @@ private:
   {
     const bool isFull = options_.maxBytes != 0 && writer_->size() >= options_.maxBytes;
     const bool isOld = options_.maxAge.nanoseconds() != 0 && korSteadyTime() - begun_ >= options_.maxAge.nanoseconds();
-    return writer_->size() != 0 && files_.isNumbered() && (isFull || isOld || writer_->durable_.hasFailed());
+    const bool isOver = writer_->state_->handle == nullptr || writer_->durable_.hasFailed();
+    return writer_->size() != 0 && files_.isNumbered() && (isFull || isOld || isOver);
+  }
+
+  /// Whether somebody has removed the file, renamed it, or put another one in its place: what is written into it now
+  /// would not be found.
+  [[nodiscard]] bool hasVanished() const
+  {
+    const Owner<TAVSideStorage>& file = writer_->state_->owned;
+    return file != nullptr && !static_cast<TAVSSFile&>(*file).pFile->isAt(path().c_str());
   }
 
   FileOutcome openFile(const FileOptions& options)
@@ -260,20 +269,42 @@ private:
   /// The file behind this one. Older ones go when it is there.
   FileOutcome openNext()
   {
-    ++number_;
-    const FileOutcome outcome = openFile({});
+    const uint64_t before = number_;
+    FileOutcome outcome{KOR_RC_FILE_EXISTS};
+    const int attempts = files_.isNumbered() ? 100 : 1;
+    for (int attempt = 0; attempt < attempts && outcome.code == KOR_RC_FILE_EXISTS; ++attempt)
+    {
+      ++number_;
+      outcome = openFile({});
+      if (outcome.code == KOR_RC_FILE_EXISTS && files_.isNumbered())
+      {
+        outcome.code = passOver();
+      }
+    }
     if (outcome.code != TAV_RC_OK)
     {
-      --number_;
+      number_ = before;
       return outcome;
     }
     const uint32_t rc = options_.keep != 0 ? files_.removeAllBut(options_.keep) : TAV_RC_OK;
     return {rc, rc == TAV_RC_OK ? "" : "older files cannot be removed; the recording can go on"};
   }
 
+  /// Another file has come where the next one was to be, or an attempt that failed has left it: the next one goes
+  /// behind all that are there.
+  uint32_t passOver()
+  {
+    std::vector<uint64_t> numbers;
+    const uint32_t rc = files_.list(numbers);
+    number_ = numbers.empty() || numbers.back() < number_ ? number_ : numbers.back();
+    return rc == TAV_RC_OK ? KOR_RC_FILE_EXISTS : rc;
+  }
+
   FileOutcome endFile()
   {
-    uint32_t rc = options_.syncEvery && !writer_->durable_.hasFailed() ? syncNow() : TAV_RC_OK;
+    const bool isEnded = writer_->state_->handle == nullptr; // closing the file failed, which is told once
+    const bool syncs = options_.syncEvery && !isEnded && !writer_->durable_.hasFailed();
+    uint32_t rc = syncs ? syncNow() : TAV_RC_OK;
     rc = rc == TAV_RC_OK ? writer_->end() : rc;
     if (rc != TAV_RC_OK)
     {
@@ -299,9 +330,10 @@ private:
 /// Records roots one after another into files that change between them, and goes on in the last one after a crash. In a
 /// path like "day-%n.tav" %n is the number of the file; without it there is one file, which grows. A last file that
 /// cannot be gone on with, being damaged or of another form, stays as it is, and the next number begins; so it does
-/// behind a sync that failed, after which nothing is sure of the file. It has no
-/// thread: times are looked at by the calls, and by those of its groups. A failure comes up at the call that meets it.
-/// Used by one thread at a time. Move-only.
+/// behind a sync that failed, after which nothing is sure of the file, and when the file was removed, renamed or
+/// replaced meanwhile, which is looked at before each root; without a %n the file is made anew then. It has no thread:
+/// times are looked at by the calls, and by those of its groups. A failure comes up at the call that meets it. Used by
+/// one thread at a time. Move-only.
 class Recorder
 {
 public:
@@ -343,9 +375,17 @@ public:
   {
     current("flushing a recording").flush();
   }
+  void flush(std::error_code& ec) noexcept
+  {
+    report(ec, [&ec](Writer& writer) { writer.flush(ec); });
+  }
   void sync()
   {
     current("syncing a recording").sync();
+  }
+  void sync(std::error_code& ec) noexcept
+  {
+    report(ec, [&ec](Writer& writer) { writer.sync(ec); });
   }
 
   /// Ends the recording, of which syncEvery syncs the last bytes. TAV_RC_BAD_PARAM while a group is open.
@@ -374,6 +414,12 @@ private:
   {
     detail::demand(recording_ && recording_->writer() ? TAV_RC_OK : TAV_RC_BAD_PARAM, what);
     return *recording_->writer();
+  }
+  template<class Push>
+  void report(std::error_code& ec, const Push& push) noexcept
+  {
+    const bool isOpen = recording_ && recording_->writer();
+    isOpen ? push(*recording_->writer()) : detail::report(TAV_RC_BAD_PARAM, ec);
   }
 
   detail::Owner<detail::Recording> recording_;

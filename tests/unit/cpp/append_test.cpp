@@ -264,6 +264,38 @@ TEST_P(LayerAppend, KeepsEachNodeThatIsWhole)
   EXPECT_EQ(most, 4U);
 }
 
+TEST_P(LayerAppend, DropsARootOfWhichNothingButTheHeaderIsWhole)
+{
+  tav::Writer whole(options());
+  put(whole, 1, 2);
+  tav::Writer known(options());
+  put(known, 10, 3);
+  known.finish();
+  tav::Writer open(options());
+  const tav::Group root = open.group(TAV_ELM_CMN_SYSTEM, group());
+  const Bytes before = bytesOf(whole.bytes());
+  const size_t header = options().root == tav::Width::bits64 ? 16 : 8;
+  for (const Bytes& from : {bytesOf(known.bytes()), bytesOf(open.bytes())}) // with its size, and without
+  {
+    for (size_t size = 1; size <= std::min(from.size(), header + header - 1); ++size)
+    {
+      SCOPED_TRACE(size);
+      Bytes bytes = before;
+      bytes.insert(bytes.end(), from.begin(), from.begin() + static_cast<std::ptrdiff_t>(size));
+      store(file_.path, bytes);
+      tav::Writer writer(file_.path, kAppend, options());
+      put(writer, 60, 1);
+      writer.finish();
+      ASSERT_EQ(numbers(), (Numbers{{1, 2}, {60}}));
+    }
+    store(file_.path, Bytes(from.begin(), from.begin() + static_cast<std::ptrdiff_t>(header)));
+    tav::Writer writer(file_.path, kAppend, options());
+    put(writer, 60, 1);
+    writer.finish();
+    EXPECT_EQ(numbers(), (Numbers{{60}})) << "it was the only one";
+  }
+}
+
 TEST_P(LayerAppend, ResumesTheRootThatAKilledWriterLeft)
 {
   store(file_.path, openStream(2));

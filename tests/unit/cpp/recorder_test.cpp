@@ -225,6 +225,30 @@ TEST_F(LayerRecorder, ThatIsMovedGoesOn)
   EXPECT_EQ(thrownBy([&] { add(first, 1); }), TAV_RC_BAD_PARAM); // NOLINT(bugprone-use-after-move)
 }
 
+TEST_F(LayerRecorder, PassesOverANumberThatIsTaken)
+{
+  tav::Recorder recorder(path, {.maxBytes = 1});
+  add(recorder, 1);
+  put("day-2.tav", "");
+  put("day-40.tav", "somebody's");
+  add(recorder, 2);
+  recorder.finish();
+  EXPECT_EQ(names(), (Names{"day-1.tav", "day-2.tav", "day-40.tav", "day-41.tav"}));
+  EXPECT_EQ(numbersIn("day-41.tav"), (Numbers{2}));
+}
+
+TEST_F(LayerRecorder, HasTwinsThatThrowNothing)
+{
+  tav::Recorder recorder(path);
+  EXPECT_EQ(givenBy([&](std::error_code& ec) { recorder.flush(ec); }), TAV_RC_OK);
+  add(recorder, 1);
+  EXPECT_EQ(givenBy([&](std::error_code& ec) { recorder.sync(ec); }), TAV_RC_OK);
+  EXPECT_EQ(numbersIn("day-1.tav"), (Numbers{1}));
+  recorder.finish();
+  EXPECT_EQ(givenBy([&](std::error_code& ec) { recorder.sync(ec); }), TAV_RC_BAD_PARAM);
+  EXPECT_EQ(givenBy([&](std::error_code& ec) { recorder.flush(ec); }), TAV_RC_BAD_PARAM);
+}
+
 TEST_F(LayerRecorder, TellsAFolderThatIsNotThere)
 {
   EXPECT_EQ(thrownBy([&] { tav::Recorder recorder(folder_.path / "none" / "day-%n.tav"); }), KOR_RC_NO_SUCH_FILE);
