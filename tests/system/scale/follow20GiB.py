@@ -1,7 +1,9 @@
 #!/usr/bin/env python3
-"""Appends to a file of 20 GiB, follows it and reads at its end, in the memory that an empty one takes. By hand: it writes the file.
+"""Appends to a file of 20 GiB, follows it and reads at its end, in the memory that an empty one takes. By hand: it takes minutes.
 
-    tests/system/scale/follow20GiB.py [PROGRAM] [GIB]        default: build/release/tools/tav, 20; TMPDIR has the room
+    tests/system/scale/follow20GiB.py [PROGRAM] [GIB]        default: build/release/tools/tav, 20; in TMPDIR
+
+The file has holes where the values of its elements are, so that it takes some hundred MiB where holes take nothing.
 
 A line for each step with an empty and with the large file: seconds, and the most memory that the process had. Ends with 1
 where a step takes more than 8 MiB more with the large one. Rings are of 1 MiB: of larger ones an empty file fills less.
@@ -16,15 +18,19 @@ import time
 
 MIB = 1 << 20
 ROOT = 16 * MIB  # of one root: what a recorder writes in some hours
+ELEMENT = MIB // 4
 
 
 def write(path, gib):
-    """Roots of 16 MiB one behind another, each of elements of 64 KiB."""
-    element = struct.pack("<QIHH", (64 << 10) - 16, 0, 101, 60101) + b"\x5a" * ((64 << 10) - 16)
-    content = struct.pack("<QIHH", (ROOT >> 16) * len(element), 0, 2, 60100) + element * (ROOT >> 16)
+    """Roots of 16 MiB one behind another, each of elements of 256 KiB whose values are zeros but for their last byte."""
+    header = struct.pack("<QIHH", ELEMENT - 16, 0, 101, 60101)
     with path.open("wb") as file:
         while file.tell() < gib << 30:
-            file.write(content)
+            file.write(struct.pack("<QIHH", ROOT, 0, 2, 60100))
+            for _ in range(ROOT // ELEMENT):
+                file.write(header)
+                file.seek(ELEMENT - 17, 1)
+                file.write(b"\x5a")
 
 
 def measured(command, lines=None):

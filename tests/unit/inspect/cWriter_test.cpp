@@ -1,4 +1,5 @@
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include <gmock/gmock.h>
@@ -59,7 +60,6 @@ TEST(C, RefusesWrongStepsOfAWriter)
   EXPECT_EQ(tav_finish(&made.writer, &bytes, &size), TAV_RC_BAD_PARAM);
   EXPECT_EQ(made.writer, writer);
   EXPECT_THAT(tav_writer_message(writer), HasSubstr("open"));
-  EXPECT_EQ(tav_add_text(writer, 1, "\xFF", 1), TAV_RC_BAD_PARAM);
   EXPECT_EQ(tav_add_text(writer, 1, nullptr, 0), TAV_RC_BAD_PARAM);
   EXPECT_EQ(tav_add_bytes(writer, 1, nullptr, 0), TAV_RC_BAD_PARAM);
   EXPECT_EQ(tav_add_time(writer, 1, -1), TAV_RC_OUTSIDE_PARENT);
@@ -70,6 +70,26 @@ TEST(C, RefusesWrongStepsOfAWriter)
   EXPECT_EQ(tav_finish(&made.writer, &bytes, nullptr), TAV_RC_BAD_PARAM);
   EXPECT_EQ(made.finish().size(), 16U);
   EXPECT_EQ(tav_finish(&made.writer, &bytes, &size), TAV_RC_BAD_PARAM);
+}
+
+TEST(C, RefusesTextThatIsNoUtf8AndAddsNothing)
+{
+  CWriter made;
+  tav_writer* const writer = made.writer;
+  ASSERT_EQ(tav_begin(writer, TAV_ELM_CMN_SYSTEM, 0), TAV_RC_OK);
+  const std::string_view refused[] = {
+      "\xFF", "\x80", "\xE4rger", "abcdefgh\xE4", // a byte of another code page, at the beginning and at the end
+      "\xC3", "\xE2\x82", "\xF0\x9F\x98",         // a character that is cut
+      "\xC0\x80", "\xC1\xBF", "\xE0\x9F\xBF",     // longer than it has to be
+      "\xED\xA0\x80", "\xF4\x90\x80\x80"};        // half of a pair, and beyond the last character
+  for (const std::string_view text : refused)
+  {
+    EXPECT_EQ(tav_add_text(writer, TAV_ELM_CMN_HOST_NAME, text.data(), text.size()), TAV_RC_BAD_PARAM);
+    EXPECT_THAT(tav_writer_message(writer), HasSubstr("UTF-8"));
+  }
+  EXPECT_EQ(tav_add_text(writer, TAV_ELM_CMN_HOST_NAME, "\xE4", 0), TAV_RC_OK) << "as many bytes as were said";
+  EXPECT_EQ(tav_end(writer), TAV_RC_OK);
+  EXPECT_EQ(made.finish().size(), 16U + 16U);
 }
 
 TEST(C, RefusesAWriterThatIsNone)
