@@ -210,7 +210,7 @@ void fillColumn(Vector& to, size_t column, const NodeRows& nodes, size_t from, s
   case kText: fillTexts(to, rows); break;
   case kTime: fillTimes(to, rows); break;
   case kBytes: fillBytes(to, rows); break;
-  default: each([&](size_t i, size_t row) { to.putText(i, rows.all.paths[row]); });
+  default: each([&](size_t i, size_t row) { to.putBytes(i, rows.all.paths[row]); });
   }
 }
 

@@ -42,8 +42,10 @@ void bindNodes(duckdb_bind_info info)
 struct NodeScan
 {
   NodeScan(const NodesCall& call, std::vector<size_t> columns)
-      : given(call.given), wanted(std::move(columns)),
-        options{.onDamage = given.onDamage, .values = wants(kNumber) || wants(kText) || wants(kTime) || wants(kBytes), .paths = wants(kPath)},
+      : given(call.given),
+        wanted(std::move(columns)), options{.onDamage = given.onDamage,
+                                            .values = wants(kNumber) || wants(kText) || wants(kTime) || wants(kBytes),
+                                            .paths = wants(kPath)},
         tasks(given, options.paths)
   {
   }

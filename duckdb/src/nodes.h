@@ -33,9 +33,9 @@ public:
     std::vector<int64_t> around{}; ///< the rows that the groups around the part are, by level
   };
 
-  /// Waits until all parts before this one count. Then this one does, too, and it is told what was before it; or it does
-  /// not begin where the one before ended: then nothing, and it is to be read once more as `part` gives it now. Throws
-  /// Error where one before has failed.
+  /// Waits until all parts before this one count. Then this one does, too, and it is told what was before it; or it
+  /// does not begin where the one before ended: then nothing, and it is to be read once more as `part` gives it now.
+  /// Throws Error where one before has failed.
   std::optional<Before> settle(size_t number, uint64_t rows, const std::vector<int64_t>& open,
                                const inspect::PartEnd& end);
   /// The part cannot be read: those behind it do not wait for it any more.

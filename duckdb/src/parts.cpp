@@ -23,7 +23,8 @@ std::optional<PartedFile::Before> PartedFile::settle(size_t number, uint64_t row
   changed_.wait(lock, [&] { return failed_ || ends_.size() == number; });
   if (failed_)
   {
-    throw inspect::Error(inspect::Problem{.file = name, .sentence = "a part of the file before this one cannot be read"});
+    throw inspect::Error(
+        inspect::Problem{.file = name, .sentence = "a part of the file before this one cannot be read"});
   }
   ends_.push_back(end);
   if (inspect::mendParts(std::span(parts_).first(number + 1), ends_))

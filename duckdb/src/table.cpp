@@ -123,8 +123,8 @@ duckdb_type typeOf(const inspect::TableTypes& types, size_t column)
   }
 }
 
-/// A column's type follows from all of its values, so they are all looked at before the engine is told. Returns how many
-/// rows there are.
+/// A column's type follows from all of its values, so they are all looked at before the engine is told. Returns how
+/// many rows there are.
 uint64_t findTypes(TableCall& call)
 {
   inspect::TableTypes types(call.query);
@@ -250,7 +250,8 @@ bool advance(TableScan& scan, TableThread& thread)
 
 [[noreturn]] void failAsChanged(const std::string& file)
 {
-  throw inspect::Error(inspect::Problem{.file = file, .sentence = "changed while the query ran: its values have other types now"});
+  throw inspect::Error(
+      inspect::Problem{.file = file, .sentence = "changed while the query ran: its values have other types now"});
 }
 
 /// Puts a cell into a column whose type holds it: the types are those of all cells.

@@ -27,8 +27,8 @@ private:
   void seeWide(const Cell& cell);
   bool has(CellKind kind) const { return (kinds_ >> static_cast<unsigned>(kind) & 1U) != 0; }
 
-  unsigned kinds_ = 0;         ///< a bit a kind
-  uint64_t most64_ = 0;        ///< the greatest of the unsigned ones with 64 bits
+  unsigned kinds_ = 0;  ///< a bit a kind
+  uint64_t most64_ = 0; ///< the greatest of the unsigned ones with 64 bits
   bool exceedsSigned_ = false;
   bool exceedsDecimal_ = false;
 };

@@ -99,8 +99,8 @@ bool pairEnds(const Bytes& bytes, const core::Node& group, const core::Level& be
 /// there, strings behind which two bytes more may stand. So a group that it gets through has the nodes that a Walker
 /// finds in it, and no damage.
 ///
-/// `Sink` is told of the nodes: `enter` of a group, and says whether it wants what is in it, `leave` of that one's end, `data`
-/// of a data element. Offsets count from the group's first byte.
+/// `Sink` is told of the nodes: `enter` of a group, and says whether it wants what is in it, `leave` of that one's end,
+/// `data` of a data element. Offsets count from the group's first byte.
 template<class Sink>
 class ExactWalk
 {
@@ -147,7 +147,8 @@ private:
 
 template<class Sink>
 template<class Bytes>
-typename ExactWalk<Sink>::Way ExactWalk<Sink>::enter(const Bytes& bytes, const core::Node& group, const core::Level& level)
+typename ExactWalk<Sink>::Way ExactWalk<Sink>::enter(const Bytes& bytes, const core::Node& group,
+                                                     const core::Level& level)
 {
   if (!group.wide() && group.type() == TAV_TYPE_HEADER64)
   {
@@ -158,14 +159,16 @@ typename ExactWalk<Sink>::Way ExactWalk<Sink>::enter(const Bytes& bytes, const c
     around_.push_back({level, group});
     return Way::down;
   }
-  const bool sure = (group.info() & TAV_INFO_EYE_SIZE) == 0 || exact::pairEnds(bytes, group, core::levelBelowClosed(group));
+  const bool sure =
+      (group.info() & TAV_INFO_EYE_SIZE) == 0 || exact::pairEnds(bytes, group, core::levelBelowClosed(group));
   return sure ? Way::up : Way::notHere;
 }
 
 /// Goes on on a level to a group that is wanted, or to its end.
 template<class Sink>
 template<bool wide, class Bytes>
-typename ExactWalk<Sink>::Way ExactWalk<Sink>::onLevel(const Bytes& bytes, const core::Level& level, bool first, core::Node& node)
+typename ExactWalk<Sink>::Way ExactWalk<Sink>::onLevel(const Bytes& bytes, const core::Level& level, bool first,
+                                                       core::Node& node)
 {
   constexpr uint64_t header = core::lengthOfHeader(wide);
   for (core::Node before = node;; before = node, first = false)
