@@ -18,6 +18,57 @@ namespace
 constexpr uint64_t kMargin = kHeaderSize64; ///< bytes that a test at one offset looks at
 constexpr uint64_t kWindow = uint64_t{64} * 1024;
 
+/// A window of a source, which is filled as far as somebody looks: most searches end soon.
+class Window
+{
+public:
+  explicit Window(ByteSource& source)
+      : source_(source)
+  {
+  }
+
+  /// To an offset. What the limit or the source ends before is zeros.
+  void moveTo(uint64_t offset, uint64_t limit)
+  {
+    offset_ = offset;
+    length_ = static_cast<size_t>(std::min<uint64_t>(bytes_.size(), limit - offset));
+    filled_ = 0;
+  }
+
+  /// The bytes that a test at one offset looks at.
+  const uint8_t* at(uint64_t index)
+  {
+    if (index + kMargin > filled_)
+    {
+      fill(std::clamp(2 * filled_, static_cast<size_t>(index + kMargin), bytes_.size()));
+    }
+    return bytes_.data() + index;
+  }
+
+  std::span<const uint8_t> whole()
+  {
+    fill(bytes_.size());
+    return bytes_;
+  }
+
+private:
+  void fill(size_t end)
+  {
+    const size_t wanted = std::min(end, length_);
+    const size_t got =
+        wanted > filled_ ? source_.read(offset_ + filled_, std::span(bytes_).subspan(filled_, wanted - filled_)) : 0;
+    std::fill(bytes_.begin() + static_cast<ptrdiff_t>(filled_ + got), bytes_.begin() + static_cast<ptrdiff_t>(end),
+              uint8_t{0});
+    filled_ = end;
+  }
+
+  ByteSource& source_;
+  uint64_t offset_ = 0;
+  size_t length_ = 0;
+  size_t filled_ = 0;
+  std::array<uint8_t, kWindow + kMargin> bytes_; ///< not cleared: that took longer than most searches
+};
+
 uint16_t load16(const uint8_t* bytes, bool swap)
 {
   uint16_t value = 0;
@@ -274,7 +325,7 @@ bool Prober::restartByPair(const uint8_t* bytes, uint64_t offset, uint64_t from,
 
 Restart Prober::findRestart(uint64_t from, bool wide, bool eitherWidth, uint64_t limit)
 {
-  std::array<uint8_t, kWindow + kMargin> window{};
+  Window window(source_);
   Restart restart{limit};
   if (spent_ > budget_)
   {
@@ -283,13 +334,11 @@ Restart Prober::findRestart(uint64_t from, bool wide, bool eitherWidth, uint64_t
   }
   for (uint64_t at = from; at < limit;)
   {
-    const auto length = static_cast<size_t>(std::min<uint64_t>(window.size(), limit - at));
-    const size_t got = source_.read(at, std::span(window).first(length));
-    std::fill(window.begin() + static_cast<ptrdiff_t>(got), window.end(), uint8_t{0});
+    window.moveTo(at, limit);
     const uint64_t tests = std::min<uint64_t>(kWindow, limit - at);
     for (uint64_t i = 0; i < tests; ++i)
     {
-      const uint8_t* const bytes = window.data() + i;
+      const uint8_t* const bytes = window.at(i);
       const uint64_t offset = at + i;
       if (offset > from && (restartAt(bytes, offset, wide, limit) ||
                             (eitherWidth && restartAt(bytes, offset, !wide, limit))))
@@ -302,7 +351,7 @@ Restart Prober::findRestart(uint64_t from, bool wide, bool eitherWidth, uint64_t
       }
     }
     spent_ += tests;
-    at = std::min(limit, source_.pastHole(at + tests, window, kMargin));
+    at = std::min(limit, source_.pastHole(at + tests, window.whole(), kMargin));
     if (spent_ > budget_)
     {
       restart.gaveUp = at < limit;

@@ -190,11 +190,6 @@ void ByteSource::fetch(uint64_t number, uint64_t count)
 
 const ByteSource::Page& ByteSource::page(uint64_t number)
 {
-  if (last_ < pages_.size() && pages_[last_].number == number)
-  {
-    pages_[last_].used = ++clock_;
-    return pages_[last_];
-  }
   auto found = places_.find(number);
   if (found == places_.end())
   {
@@ -225,8 +220,15 @@ std::span<const uint8_t> ByteSource::view(uint64_t offset)
   {
     return memory_.subspan(static_cast<size_t>(offset));
   }
-  const Page& found = page(offset / kPage);
-  return std::span<const uint8_t>(found.bytes).subspan(static_cast<size_t>(offset % kPage));
+  // Most looks are at the page of the one before: told here, without a call.
+  const bool isSame = last_ < pages_.size() && pages_[last_].number == offset / kPage;
+  const Page& found = isSame ? pages_[last_] : page(offset / kPage);
+  if (isSame)
+  {
+    pages_[last_].used = ++clock_;
+  }
+  const auto at = static_cast<size_t>(offset % kPage);
+  return {found.bytes.data() + at, found.bytes.size() - at};
 }
 
 uint64_t ByteSource::zerosUntil(uint64_t offset)
