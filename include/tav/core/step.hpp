@@ -245,6 +245,7 @@ template<class AnyLevel>
     return false;
   }
   node.header.hdr64 = {size, found.info(), found.type(), found.elm()};
+  node.header.hdrType = TAV_HDR_64; // as it is, but a compiler that reads it here leaves out later looks at it
   node.header.nodeOffset = place.offset;
   node.pDataBuf = place.header + kHeaderSize64;
   node.dataBufSize = level.take(place, size);
