@@ -134,6 +134,28 @@ def memory(bench, folder, stream_bytes):
         stream.unlink(missing_ok=True)
 
 
+def processors(bench, mebibytes):
+    """W10: what one thread and two take of the same stream."""
+    found = {}
+    for line in run([bench / "tav_parts", mebibytes]).splitlines():
+        plan = re.match(r"W10/(plan_\w+): ([\d.]+) ms for (\d+) parts: ([\d.]+) ms a GB", line)
+        both = re.match(r"W10/(\w+): one thread ([\d.]+) ms, two ([\d.]+) ms: ([\d.]+) .* in all ([\d.]+) times", line)
+        if plan:
+            found[plan[1]] = {"ms": float(plan[2]), "parts": int(plan[3]), "ms_a_gb": float(plan[4])}
+        elif both:
+            found[both[1]] = {"one_ms": float(both[2]), "two_ms": float(both[3]), "faster": float(both[4]), "work": float(both[5])}
+    if not found:
+        sys.exit("measure.py: tav_parts told nothing")
+    return {"mebibytes": mebibytes, "ways": found}
+
+
+def files(bench, folder, mebibytes):
+    """The table of file_access, row by row."""
+    lines = run([bench / "file_access", pathlib.Path(folder) / "tav-bench-access", mebibytes]).splitlines()
+    rows = [[cell.strip() for cell in line.strip("|").split("|")] for line in lines]
+    return {"mebibytes": mebibytes, "head": rows[0], "rows": rows[2:]}
+
+
 def startup(bench, rounds):
     empty, opens = bench / "tav_startup_empty", bench / "tav_startup"
     taken = {empty: [], opens: []}
@@ -179,6 +201,8 @@ def main():
         "times": summarize(times(bench, QUICK_GROUPS if quick else GROUPS)),
         "instructions": instructions(bench, 1 if quick else DOUBLINGS),
         "memory": memory(bench, folder, (16 << 20) if quick else (4 << 30)),
+        "processors": processors(bench, 8 if quick else 64),
+        "files": files(bench, folder, 8 if quick else 100),
         "startup": startup(bench, 5 if quick else 200),
         "compile": compiling.measured(1 if quick else compiling.ROUNDS),
         "library": {name: stripped_bytes(arguments.build, name) for name in ("libtav.so", "libkor.so")},

@@ -60,29 +60,36 @@ double ownSeconds()
   return static_cast<double>(used.tv_sec) + static_cast<double>(used.tv_nsec) * 1e-9;
 }
 
-/// The least of a few runs.
 Cost costOf(const std::function<void()>& work)
 {
-  constexpr int runs = 5;
-  Cost best{1e9, 1e9, 0};
-  for (int i = 0; i < runs; ++i)
-  {
-    const std::clock_t used = std::clock();
-    const double usedHere = ownSeconds();
-    const auto begin = std::chrono::steady_clock::now();
-    work();
-    const std::chrono::duration<double> passed = std::chrono::steady_clock::now() - begin;
-    best.seconds = std::min(best.seconds, passed.count());
-    best.processor = std::min(best.processor, static_cast<double>(std::clock() - used) / CLOCKS_PER_SEC);
-    best.own += (ownSeconds() - usedHere) / runs;
-  }
-  return best;
+  const std::clock_t used = std::clock();
+  const double usedHere = ownSeconds();
+  const auto begin = std::chrono::steady_clock::now();
+  work();
+  const std::chrono::duration<double> passed = std::chrono::steady_clock::now() - begin;
+  return {passed.count(), static_cast<double>(std::clock() - used) / CLOCKS_PER_SEC, ownSeconds() - usedHere};
 }
 
+void takeRound(Cost& best, const Cost& round, int rounds)
+{
+  best = {std::min(best.seconds, round.seconds), std::min(best.processor, round.processor),
+          best.own + round.own / rounds};
+}
+
+constexpr Cost kNone{1e9, 1e9, 0};
+
+/// One thread and two take turns, so that what disturbs the machine disturbs both; each is told by its best run. Where
+/// no two processors are free, two threads cannot be faster: the work in all shows what splitting costs.
 void compare(const std::string& what, const std::function<void(unsigned)>& work)
 {
-  const Cost one = costOf([&] { work(1); });
-  const Cost two = costOf([&] { work(2); });
+  constexpr int rounds = 9;
+  Cost one = kNone;
+  Cost two = kNone;
+  for (int i = 0; i < rounds; ++i)
+  {
+    takeRound(one, costOf([&] { work(1); }), rounds);
+    takeRound(two, costOf([&] { work(2); }), rounds);
+  }
   std::printf("W10/%s: one thread %.1f ms, two %.1f ms: %.2f times as fast; work in all %.3f times as much, the "
               "caller's thread did %.2f of what one does\n",
               what.c_str(), one.seconds * 1e3, two.seconds * 1e3, one.seconds / two.seconds,
@@ -95,7 +102,12 @@ void measure(uint64_t mebibytes, bool flat)
   const std::string name = flat ? "flat" : "hosts";
   ByteSource source("x", std::span(reinterpret_cast<const uint8_t*>(bytes.data()), bytes.size()));
   size_t parts = 0;
-  const Cost planned = costOf([&] { parts = plan(source, Form{}).size(); });
+  constexpr int rounds = 5;
+  Cost planned = kNone;
+  for (int i = 0; i < rounds; ++i)
+  {
+    takeRound(planned, costOf([&] { parts = plan(source, Form{}).size(); }), rounds);
+  }
   std::printf("W10/plan_%s: %.2f ms for %zu parts: %.2f ms a GB\n", name.c_str(), planned.seconds * 1e3, parts,
               planned.seconds * 1e12 / static_cast<double>(bytes.size()));
   compare("check_" + name, [&](unsigned threads) { (void)check(source, {}, {.threads = threads}); });
