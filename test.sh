@@ -94,7 +94,7 @@ check_static_analysis()
   cppcheck --enable=warning,performance,portability --inconclusive --std=c++20 --language=c++ --inline-suppr --quiet \
     --error-exitcode=1 -j "$(nproc)" -I include -I . -DTAV_VERSION='""' \
     --template='{file}:{line}: {severity}: {id}: {message}' \
-    kor trace format storage dictionary core api layer inspect include tools examples
+    kor trace format storage dictionary core api layer inspect include tools examples web/module
 }
 
 # The description of the format for other languages, compiled, finds what the library finds.

@@ -34,7 +34,11 @@ const policy = [
   "base-uri 'none'",
   "form-action 'none'",
 ].join("; ");
-const parts = { POLICY: policy, STYLE: style, SCRIPT: script, WORKER: bundled("worker.js"), MODULE: packed.toString("base64") };
+const escaped = (text) => text.replaceAll("&", "&amp;").replaceAll("<", "&lt;");
+const licences = [readFileSync(join(here, "../LICENSE"), "utf8"), source("licences.txt")].join("\n");
+const parts = {
+  LICENCES: escaped(licences),
+  POLICY: policy, STYLE: style, SCRIPT: script, WORKER: bundled("worker.js"), MODULE: packed.toString("base64") };
 const page = source("index.html").replace(/%([A-Z]+)%/g, (_, name) => parts[name]);
 
 mkdirSync(dirname(out), { recursive: true });

@@ -4,7 +4,7 @@ import { byId, counted, fill, h, hex, save } from "./dom.js";
 import { drawPlot } from "./plot.js";
 import { goTo, page, reopen, run, say } from "./main.js";
 
-const MOST = 10_000; // places that are listed
+const MOST = 2000; // places that are listed
 const MOST_ROWS = 1_000_000;
 let running; // the work that goes on
 
@@ -74,7 +74,7 @@ class Places {
 
   put() {
     this.pending = undefined;
-    this.list.append(...this.#waiting.splice(0, 200));
+    this.list.append(...this.#waiting.splice(0, 50));
     if (this.#waiting.length > 0) {
       this.pending = requestAnimationFrame(() => this.put());
     }

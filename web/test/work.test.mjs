@@ -198,6 +198,37 @@ test("the page answers while a file is checked, says how far it is, and stops", 
   await page.close();
 });
 
+test("the page answers while many places are listed", async () => {
+  const page = await visit();
+  await open(page, made("places.tav", many(100_000)));
+  await page.evaluate(() => {
+    globalThis.tasks = [];
+    new PerformanceObserver((list) => globalThis.tasks.push(...list.getEntries().map((entry) => entry.duration)))
+      .observe({ type: "longtask" });
+  });
+  await find(page, "text", "cpuonline");
+  assert.equal(await textOf(page, "#status"), "the first 2,000 places");
+  await page.waitForFunction(() => document.querySelectorAll("#found li").length === 2000);
+  assert.deepEqual(await page.evaluate(() => globalThis.tasks), []);
+  await page.close();
+});
+
+test("files that were opened before leave nothing behind", async () => {
+  const page = await visit();
+  const path = made("again.tav", many(1000));
+  const memory = new Set();
+  for (let i = 0; i < 20; ++i) {
+    await open(page, path);
+    await check(page);
+    await recover(page);
+    memory.add(await page.evaluate(() => globalThis.tavPage.engine.memory()));
+  }
+  assert.equal(memory.size, 1);
+  await page.waitForFunction(() => true);
+  assert.equal(page.workers().length, 1, "that of the tree");
+  await page.close();
+});
+
 test("every change of one byte leaves the page alive", async () => {
   const page = await visit();
   const whole = hosts("ada");

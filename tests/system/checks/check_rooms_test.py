@@ -46,6 +46,8 @@ class CheckRooms(unittest.TestCase):
             ("tests/support/platformWindows.cpp", "#include <psapi.h>"),
             ("tests/kor/filePosix_test.cpp", "#if defined(__SANITIZE_THREAD__)"),
             ("tools/options.cpp", "#include <CLI/CLI.hpp>"),
+            ("web/module/tree.cpp", '#include "web/module/tree.h"'),
+            ("web/module/tree.cpp", '#include "tav/inspect.hpp"'),
             ("include/tav/kor.h", "#if defined(_WIN32)"),
         ]:
             with self.subTest(name=name, line=line):
@@ -54,6 +56,8 @@ class CheckRooms(unittest.TestCase):
     def test_refuses_what_points_up_or_sideways(self):
         for name, line in [
             ("kor/file.cpp", '#include "format/layout.h"'),
+            ("web/module/tree.cpp", '#include "inspect/document/streamWalk.h"'),
+            ("inspect/walk/walker.cpp", '#include "web/module/tree.h"'),
             ("kor/file.cpp", '#include "tav/tav.h"'),
             ("include/tav/kor.h", '#include "tav/tav.h"'),
             ("kor/file.cpp", '#include "trace/traceFrame.h"'),
@@ -155,6 +159,13 @@ class CheckRooms(unittest.TestCase):
             files, found = check_rooms.check_tree(root)
         self.assertEqual(files, 1)
         self.assertEqual(found, ["format/a.cpp:2: format must not include api/b.h"])
+
+    def test_looks_at_no_packages_of_others(self):
+        with tempfile.TemporaryDirectory() as root:
+            package = pathlib.Path(root) / "web" / "node_modules" / "one"
+            package.mkdir(parents=True)
+            (package / "one.h").write_text("#include <unistd.h>\n")
+            self.assertEqual(check_rooms.check_tree(pathlib.Path(root)), (0, []))
 
     def test_fails_on_an_empty_tree(self):
         with tempfile.TemporaryDirectory() as folder:
