@@ -44,8 +44,8 @@ export class Engine {
 
   #take(data) {
     const waiting = this.#calls.get(data.id);
-    if (data.piece !== undefined) {
-      waiting?.onPiece?.(data.piece);
+    if (data.pieces !== undefined) {
+      data.pieces.forEach((piece) => waiting?.onPiece?.(piece));
     } else if (data.progress !== undefined) {
       waiting?.onProgress?.(data.progress);
     } else {

@@ -1,10 +1,11 @@
 // What goes through the whole file: find, check, recover, compare, table; and own names.
 import { Engine, Stopped } from "./engine.js";
 import { byId, counted, fill, h, hex, save } from "./dom.js";
+import { Rows } from "./rows.js";
 import { drawPlot } from "./plot.js";
 import { goTo, page, reopen, run, say } from "./main.js";
 
-const MOST = 2000; // places that are listed
+const MOST = 10_000; // places that are listed
 const MOST_ROWS = 1_000_000;
 let running; // the work that goes on
 
@@ -52,32 +53,40 @@ async function work(name, { texts = [], numbers = [], onPiece, prepare } = {}) {
   }
 }
 
-/** A list whose items lead to places. Items come by hundreds of a second, so they are put in by frames. */
+const lists = new Map(); // id -> {view, places}
+
+/** A list whose items lead to places. Those in view are elements. */
 class Places {
-  #waiting = [];
-  #count = 0;
+  #items = [];
 
   constructor(id) {
-    this.list = byId(id);
-    this.list.replaceChildren();
+    if (!lists.has(id)) {
+      const list = {};
+      list.view = new Rows(byId(id), { height: 24, count: () => list.places.count, make: (i) => list.places.make(i) });
+      lists.set(id, list);
+    }
+    this.list = lists.get(id);
+    this.list.places = this;
+    this.list.view.scrollTo(0);
+  }
+
+  get count() {
+    return this.#items.length;
   }
 
   add(offset, ...texts) {
-    if (++this.#count > MOST) {
-      return;
+    if (this.count < MOST) {
+      this.#items.push({ offset, texts: texts.filter((text) => text) });
+      this.list.view.later();
     }
-    this.#waiting.push(h("li", {}, h("button", { type: "button", class: "place", "data-offset": offset,
-      onclick: () => run(() => goTo(offset)) },
-      ...texts.filter((text) => text).map((text, i) => h("span", { class: `part${i}` }, text)))));
-    this.pending ??= requestAnimationFrame(() => this.put());
   }
 
-  put() {
-    this.pending = undefined;
-    this.list.append(...this.#waiting.splice(0, 50));
-    if (this.#waiting.length > 0) {
-      this.pending = requestAnimationFrame(() => this.put());
-    }
+  make(index) {
+    const { offset, texts } = this.#items[index];
+    return h("div", { role: "listitem", "aria-posinset": index + 1, "aria-setsize": this.count },
+      h("button", { type: "button", class: "place", "data-offset": offset, title: texts.join("\n"),
+        onclick: () => run(() => goTo(offset)) },
+      ...texts.map((text, i) => h("span", { class: `part${i}` }, text))));
   }
 }
 
@@ -267,9 +276,11 @@ export function setUpPanels() {
   });
   document.addEventListener("opened", () => {
     running?.stop();
-    for (const id of ["found", "findings", "lost", "account", "differences", "cells"]) {
-      byId(id).replaceChildren();
+    for (const id of ["found", "findings", "lost", "differences"]) {
+      new Places(id);
     }
+    fill(byId("account"));
+    fill(byId("cells"));
     byId("saveRecovered").hidden = true;
     byId("saveTable").hidden = true;
     byId("plot").toggleAttribute("hidden", true);

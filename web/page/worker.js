@@ -1,6 +1,7 @@
 // The worker around the module: it has the files that the page was given, reads slices of them when the module asks,
 // and keeps the files that the module makes. A message is a call: {id, name, ...}; answers carry its id.
 const CHUNK = 1 << 20;
+const MOST_PIECES = 100;
 const decoder = new TextDecoder();
 const encoder = new TextEncoder();
 
@@ -8,6 +9,7 @@ let module; // the module's exports
 let memory;
 let current = 0; // the call that is answered
 let toldAt = 0;
+let pieces = []; // of the answer, not sent yet
 const given = new Map(); // name -> File
 const made = new Map(); // name -> MadeFile
 const open = [];
@@ -128,16 +130,28 @@ const host = {
     return 0;
   },
   emit(at, size) {
-    postMessage({ id: current, piece: JSON.parse(textAt(at, size)) });
+    pieces.push(JSON.parse(textAt(at, size)));
+    if (pieces.length === MOST_PIECES || performance.now() - toldAt > 50) {
+      handOver();
+    }
   },
   progress(offset) {
     const now = performance.now();
     if (now - toldAt > 50) {
-      toldAt = now;
+      handOver();
       postMessage({ id: current, progress: Number(offset) });
     }
   },
 };
+
+/** Sends what was emitted: each message costs the page a task. */
+function handOver() {
+  toldAt = performance.now();
+  if (pieces.length > 0) {
+    postMessage({ id: current, pieces });
+    pieces = [];
+  }
+}
 
 /** What the C library under the module asks of a system: there is none. */
 function systemOf(compiled) {
@@ -170,7 +184,9 @@ function put(slot, text) {
 /** Calls an export with texts and numbers, and returns its answer. */
 function call(name, texts, numbers) {
   texts.forEach((text, slot) => put(slot, text));
+  pieces = [];
   module[name](...numbers);
+  handOver();
   return JSON.parse(textAt(module.tavAnswer(), module.tavAnswerSize()));
 }
 

@@ -87,6 +87,25 @@ export async function find(page, how, what) {
   await click(page, "#findRun");
 }
 
+/**
+ * Milliseconds of the processor that the longest task of the page took while something was done. Of the processor, since
+ * a busy machine makes any task long by the clock.
+ */
+export async function longestTask(page, work) {
+  const path = join(folder, "trace.json");
+  await page.tracing.start({ path, categories: ["toplevel", "devtools.timeline"] });
+  await work();
+  await page.tracing.stop();
+  const { traceEvents } = JSON.parse(readFileSync(path, "utf8"));
+  const threadOf = ({ pid, tid }) => `${pid}/${tid}`;
+  const pages = new Set(traceEvents.filter(({ name, args }) => name === "thread_name" && args.name === "CrRendererMain").map(threadOf));
+  const tasks = traceEvents.filter((event) => event.name === "ThreadControllerImpl::RunTask" && pages.has(threadOf(event)));
+  if (tasks.length < 10) {
+    throw new Error(`the trace has ${tasks.length} tasks`);
+  }
+  return Math.max(...tasks.map(({ tdur }) => tdur ?? 0)) / 1000;
+}
+
 /** The file that a click saves. */
 export async function saved(page, selector) {
   const target = mkdtempSync(join(folder, "saved-"));
