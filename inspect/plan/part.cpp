@@ -118,28 +118,36 @@ bool isSeam(const Part& behind, const Part& next)
          std::equal(behind.around.begin(), behind.around.end(), next.around.begin(), next.around.end(), isSameGroup);
 }
 
+Part behindOf(const Part& part, const PartEnd& end)
+{
+  // What the walk through a part does not know is what was lost before it.
+  const std::vector<PartGroup>& before = part.around;
+  Part behind = end.behind;
+  for (size_t k = 0; k < end.shared && k < before.size() && k < behind.around.size(); ++k)
+  {
+    behind.around[k].damaged = behind.around[k].damaged || before[k].damaged;
+  }
+  return behind;
+}
+
+bool holdsBehind(const Part& behind, const Part& part, const PartEnd& end)
+{
+  return isSeam(behind, part) && (!end.leans || behind.around == part.around);
+}
+
 std::optional<size_t> mendParts(std::span<Part> parts, std::span<const PartEnd> ends)
 {
   Part behind;
   for (size_t i = 0; i < parts.size() && i < ends.size(); ++i)
   {
     Part& part = parts[i];
-    const bool knowsDamage =
-        i == 0 || !ends[i].leans ||
-        std::equal(behind.around.begin(), behind.around.end(), part.around.begin(), part.around.end());
-    if (i != 0 && (!isSeam(behind, part) || !knowsDamage))
+    if (i != 0 && !holdsBehind(behind, part, ends[i]))
     {
       behind.size = part.end() - std::min(part.end(), behind.offset);
       part = std::move(behind);
       return i;
     }
-    // What the walk through a part does not know is what was lost before it.
-    const std::vector<PartGroup> before = i == 0 ? part.around : std::move(behind.around);
-    behind = ends[i].behind;
-    for (size_t k = 0; k < ends[i].shared && k < before.size() && k < behind.around.size(); ++k)
-    {
-      behind.around[k].damaged = behind.around[k].damaged || before[k].damaged;
-    }
+    behind = behindOf(i == 0 ? part : behind, ends[i]);
   }
   return std::nullopt;
 }

@@ -2,7 +2,9 @@
 #pragma once
 
 #include <cstdint>
+#include <vector>
 
+#include "inspect/document/streamWalk.h"
 #include "tav/inspect/plan.hpp"
 #include "tav/inspect/walker.hpp"
 
@@ -11,6 +13,12 @@ namespace tav::inspect
 
 /// Where the walk through a part begins. Throws Error for a part that cannot be one of the file.
 Walker::State stateOf(ByteSource& source, const Part& part);
+
+/// The groups around a place as a walk has given them out, from the root inwards.
+std::vector<Event> groupsAround(const Walker::State& state);
+
+/// What a walk through a part has found when it has come to its end.
+PartEnd endOf(const StreamWalk& walk);
 
 /// The part that begins where a walk stands. `streamOffset`: where the walk in its form began.
 Part partAt(const Walker::State& state, const Form& form, uint64_t streamOffset);

@@ -1,12 +1,35 @@
 // Walks through parts of files.
 #include <utility>
 
-#include "inspect/document/streamWalk.h"
 #include "inspect/plan/partState.h"
 #include "tav/inspect/plan.hpp"
 
 namespace tav::inspect
 {
+
+std::vector<Event> groupsAround(const Walker::State& state)
+{
+  std::vector<Event> around;
+  for (size_t i = 1; i < state.frames.size(); ++i)
+  {
+    Event& event = around.emplace_back();
+    event.what = What::nodeBegin;
+    event.node = state.frames[i].node;
+    event.offset = event.node.offset();
+    event.length = event.node.headerLength();
+    event.depth = event.node.depth;
+  }
+  return around;
+}
+
+PartEnd endOf(const StreamWalk& walk)
+{
+  const Walker& walker = walk.walker();
+  const size_t shared = walker.inherited();
+  return {.behind = partAt(walker.state(), walker.form(), walk.streamOffset()),
+          .leans = walker.leansOnDamage(),
+          .shared = shared == 0 ? 0 : shared - 1};
+}
 
 PartWalk::PartWalk(ByteSource& source, const Part& part, DamageWatch::Sink passed, Streams streams)
     : end_(part.end())
@@ -18,14 +41,9 @@ PartWalk::PartWalk(ByteSource& source, const Part& part, DamageWatch::Sink passe
   }
   walk_ = std::make_unique<StreamWalk>(source, part.form, std::move(passed), state, part.streamOffset,
                                        streams == Streams::everyForm);
-  for (size_t i = 1; i < state.frames.size(); ++i)
+  around_ = groupsAround(state);
+  for (const Event& event : around_)
   {
-    Event& event = around_.emplace_back();
-    event.what = What::nodeBegin;
-    event.node = state.frames[i].node;
-    event.offset = event.node.offset();
-    event.length = event.node.headerLength();
-    event.depth = event.node.depth;
     walk_->see(event);
   }
 }
@@ -58,11 +76,7 @@ const Form& PartWalk::form() const
 
 PartEnd PartWalk::end() const
 {
-  const Walker& walk = walk_->walker();
-  const size_t shared = walk.inherited();
-  return {.behind = partAt(walk.state(), walk.form(), walk_->streamOffset()),
-          .leans = walk.leansOnDamage(),
-          .shared = shared == 0 ? 0 : shared - 1};
+  return endOf(*walk_);
 }
 
 PartEnd walkPart(ByteSource& source, const Part& part, const std::function<void(const Walker&, const Event&)>& seen,

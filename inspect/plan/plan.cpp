@@ -25,7 +25,7 @@ std::vector<Part> cut(ByteSource& source, const Form& form, const PlanOptions& o
     target = std::max(target, size / options.maxParts + 1);
   }
   const auto window = source.window(0, kRing);
-  return Planner(*window, form, everyForm).run(target);
+  return Planner(*window, form, everyForm, options.maxDepth).run(target);
 }
 
 constexpr uint64_t kWorthCutting = uint64_t{4} << 20U;

@@ -35,8 +35,8 @@ uint32_t kindOf(const TAVHeader& header)
 
 } // namespace
 
-Planner::Planner(ByteSource& source, const Form& form, bool everyForm)
-    : source_(source), everyForm_(everyForm)
+Planner::Planner(ByteSource& source, const Form& form, bool everyForm, size_t maxDepth)
+    : source_(source), everyForm_(everyForm), maxDepth_(std::min(maxDepth, kMostLevels))
 {
   Part whole;
   whole.form = form;
@@ -67,7 +67,7 @@ std::vector<Part> Planner::run(uint64_t target)
 bool Planner::canCut() const
 {
   const Walker& walk = walk_->walker();
-  return walk.isBetween() && walk.depth() <= kMostLevels && !walk.isAfterDamage() &&
+  return walk.isBetween() && walk.depth() <= maxDepth_ && !walk.isAfterDamage() &&
          (walk.place() == 0 || walk.place() > walk_->streamOffset());
 }
 
@@ -160,7 +160,7 @@ void Planner::see(const Event& event, uint64_t target, uint64_t slack)
       level.kinds.insert(kindOf(event.node.header));
     }
   }
-  const bool goesIn = event.node.isGroup() && depth < kMostLevels && event.node.limit > addSaturated(target, slack);
+  const bool goesIn = event.node.isGroup() && depth < maxDepth_ && event.node.limit > addSaturated(target, slack);
   if (event.node.isGroup() && !goesIn)
   {
     walk_->skip(); // where it cannot be skipped, its children are gone through
@@ -171,7 +171,7 @@ void Planner::see(const Event& event, uint64_t target, uint64_t slack)
 bool Planner::guess(uint64_t target)
 {
   const Walker& walk = walk_->walker();
-  const size_t depth = std::min(walk.depth(), levels_.size() - 1);
+  const size_t depth = std::min({walk.depth(), maxDepth_, levels_.size() - 1});
   elms_.reset();
   inner_ = 0;
   for (size_t i = 0; i <= depth && walk.limitAt(i) > target; ++i)

@@ -19,7 +19,8 @@ namespace tav::inspect
 class Planner
 {
 public:
-  Planner(ByteSource& source, const Form& form, bool everyForm);
+  /// `maxDepth`: the most groups around a part.
+  Planner(ByteSource& source, const Form& form, bool everyForm, size_t maxDepth);
 
   /// The parts, each about `target` bytes long.
   std::vector<Part> run(uint64_t target);
@@ -46,6 +47,7 @@ private:
 
   ByteSource& source_;
   bool everyForm_;
+  size_t maxDepth_;
   std::optional<StreamWalk> walk_{};
   Event event_{};
   std::vector<Level> levels_{}; ///< of the groups around the place, by depth, the file's first

@@ -14,6 +14,13 @@ class TableReader::State : public TableReading
 public:
   using TableReading::TableReading;
 
+  State(ByteSource& source, const Part& part, const Walker::State& at, const TableQuery& query,
+        const TableOptions& options)
+      : TableReading(source, part.form, query, options, at, part.streamOffset)
+  {
+    confineTo(part, at);
+  }
+
   /// Whether there are rows.
   bool read(uint64_t wanted)
   {
@@ -26,6 +33,11 @@ public:
 
 TableReader::TableReader(ByteSource& source, const Form& form, const TableQuery& query, const TableOptions& options)
     : state_(std::make_unique<State>(source, form, query, options))
+{
+}
+
+TableReader::TableReader(ByteSource& source, const TableQuery& query, const Part& part, const TableOptions& options)
+    : state_(std::make_unique<State>(source, part, stateOf(source, part), query, options))
 {
 }
 
@@ -44,6 +56,11 @@ bool TableReader::next(Table& out, uint64_t rows)
 const std::optional<Problem>& TableReader::stopped() const noexcept
 {
   return state_->stopped();
+}
+
+PartEnd TableReader::end() const
+{
+  return state_->end();
 }
 
 std::optional<Problem> readTable(ByteSource& source, const Form& form, const TableQuery& query,

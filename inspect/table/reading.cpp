@@ -2,6 +2,8 @@
 
 #include <utility>
 
+#include "inspect/table/cut.h"
+
 namespace tav::inspect
 {
 
@@ -17,25 +19,34 @@ TableReading::TableReading(ByteSource& source, const Form& form, const TableQuer
 }
 
 TableReading::TableReading(ByteSource& source, const Form& form, const TableQuery& query, const TableOptions& options,
-                           const Walker::State& state)
+                           const Walker::State& state, uint64_t streamOffset)
     : source_(source), query_(query), sought_(query.compiled().sought), options_(options), matcher_(compiled().each),
       filling_(compiled()), exact_(told_),
       walk_(
-          source, form, [this](const PassedOver& passed) { passOver(passed); }, state, 0, true),
+          source, form, [this](const PassedOver& passed) { passOver(passed); }, state, streamOffset, true),
       line_(1), known_(sought_.size())
 {
   tree_.source = &source;
   tree_.looks = true;
-  for (size_t i = 1; i < state.frames.size(); ++i)
+  for (const Event& group : groupsAround(state))
   {
-    Event group;
-    group.what = What::nodeBegin;
-    group.node = state.frames[i].node;
-    group.offset = group.node.offset();
-    group.depth = group.node.depth;
     walk_.see(group);
     filling_.enter(Automaton::Move(filling_.meet(group.node.elm())));
   }
+}
+
+void TableReading::confineTo(const Part& part, const Walker::State& state)
+{
+  if (!stateAtCut(filling_.automaton(), compiled(), state))
+  {
+    throw Error(Problem{.file = source_.name(),
+                        .offset = part.offset,
+                        .sentence = "a table of these rows cannot be cut here",
+                        .code = TAV_RC_BAD_PARAM});
+  }
+  options_.end = ~uint64_t{0};
+  knowsPaths_ = part.offset == 0;
+  partEnd_ = part.end();
 }
 
 std::shared_ptr<TableChunk> TableReading::take()
@@ -54,15 +65,22 @@ void TableReading::passOver(const PassedOver& passed)
   {
     stopped_ = Problem{.file = source_.name(),
                        .offset = passed.offset,
-                       .path = passed.path,
+                       .path = knowsPaths_ ? passed.path : std::string(),
                        .sentence = passed.reason,
                        .code = passed.code};
   }
 }
 
+bool TableReading::isBehindPart() const
+{
+  const Walker& walker = walk_.walker();
+  return walker.place() >= partEnd_ && partEnd_ < source_.size() && walker.isBetween() && !filling_.hasOpenRows() &&
+         (walker.depth() == 0 || cutsInGroups(compiled()));
+}
+
 bool TableReading::step()
 {
-  if (done_)
+  if (done_ || isBehindPart())
   {
     return false;
   }
@@ -158,7 +176,9 @@ void TableReading::goThrough()
   const Node& node = event_.node;
   const uint64_t size = node.limit - node.offset();
   const bool fails = node.offset() <= failed_ && failed_ < node.limit;
-  if (node.has(kOpen) || node.has(kOverrun) || size > mostAtOnce(options_) || fails || node.offset() < notBefore_)
+  const bool isCut = node.limit > partEnd_ && partEnd_ < source_.size();
+  if (node.has(kOpen) || node.has(kOverrun) || size > mostAtOnce(options_) || fails || isCut ||
+      node.offset() < notBefore_)
   {
     return;
   }

@@ -10,6 +10,7 @@
 
 #include "inspect/document/streamWalk.h"
 #include "inspect/path/walkedTree.h"
+#include "inspect/plan/partState.h"
 #include "inspect/table/filling.h"
 #include "inspect/walk/exactWalk.h"
 #include "tav/inspect/table.hpp"
@@ -32,7 +33,7 @@ public:
   /// A walk that goes on where another one stands, or is believed to, whose first stream has this form. Its first rows
   /// are those of the groups around the place that have one.
   TableReading(ByteSource& source, const Form& form, const TableQuery& query, const TableOptions& options,
-               const Walker::State& state);
+               const Walker::State& state, uint64_t streamOffset = 0);
   TableReading(const TableReading&) = delete;
   TableReading& operator=(const TableReading&) = delete;
 
@@ -49,6 +50,12 @@ public:
   const std::optional<Problem>& stopped() const { return stopped_; }
   /// When it has stopped: the first row whose node had not ended. It was taken away with all behind it.
   uint64_t dropped() const { return dropped_; }
+
+  /// Reads the rows that begin in a part of the file and no others, by the constructor that is given its state. Throws
+  /// Error for a part in which they cannot be told from those before and behind it.
+  void confineTo(const Part& part, const Walker::State& state);
+  /// Of a part, behind its last event.
+  PartEnd end() const { return endOf(walk_); }
 
   const Walker& walker() const { return walk_.walker(); }
   /// Whether it goes on in a stream of another form than the one in which it began.
@@ -90,6 +97,8 @@ private:
   const CompiledQuery& compiled() const { return query_.compiled(); }
 
   void passOver(const PassedOver& passed);
+  /// Whether the part is read. A row that has begun in it is read to its end.
+  bool isBehindPart() const;
   void begin();
   void takeData(const Automaton::Move& move);
   RawCell valueOf(const Node& node);
@@ -123,6 +132,8 @@ private:
   uint64_t failed_ = kNoOffset; ///< where the exact steps gave up last
   uint64_t notBefore_ = 0;      ///< they are not tried before
   uint64_t dropped_ = Filling::kNoRow;
+  bool knowsPaths_ = true; ///< places are counted from the file's start
+  uint64_t partEnd_ = kNoOffset;
   uint64_t begin_ = 0; ///< of the stream that it began in
   bool done_ = false;
 };

@@ -19,6 +19,10 @@ PyMethodDef functions[] = {{"recognise", recognise, METH_VARARGS, nullptr},
                            {"recover", recover, METH_VARARGS, nullptr},
                            {"set", setValues, METH_VARARGS, nullptr},
                            {"read_table", readTable, METH_VARARGS, nullptr},
+                           {"read_part", readPart, METH_VARARGS, nullptr},
+                           {"plan", plan, METH_VARARGS, nullptr},
+                           {"behind_of", behindOf, METH_VARARGS, nullptr},
+                           {"holds_behind", holdsBehind, METH_VARARGS, nullptr},
                            {"extract", extract, METH_VARARGS, nullptr},
                            {}};
 

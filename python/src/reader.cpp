@@ -257,9 +257,10 @@ PyMethodDef methods[] = {
      "number, text, time and bytes is a bool array 'parent_valid', 'number_valid' and so on: where it is False\n"
      "the row has no such value. number is int64, or uint64 or object (int) where a value needs it; never a float."},
     {"table", asFunction(table), METH_VARARGS | METH_KEYWORDS,
-     "table($self, /, each, columns, *, join=None, progress=None)\n--\n\n"
+     "table($self, /, each, columns, *, join=None, part=None, progress=None)\n--\n\n"
      "A row for each node that the path `each` leads to, in one pass: Table. columns: {name: path from there}; the\n"
-     "first value where a path leads to several, or all of them with the text `join` between them."},
+     "first value where a path leads to several, or all of them with the text `join` between them. part: of tav.plan;\n"
+     "only the rows that begin in it."},
     {"_columns", asFunction(rawColumns), METH_VARARGS | METH_KEYWORDS, nullptr},
     {"close", close, METH_NOARGS,
      "close($self, /)\n--\n\nLets go of the file. Nodes and walks raise TavError from now on; payloads live on."},

@@ -142,8 +142,12 @@ PyObject* columnsOf(ReaderObject& reader, bool withPaths, PyObject* progress);
 /// The reader that an object is; TypeError for another one.
 ReaderObject& readerObjectOf(PyObject* object);
 
-/// The function _tav.read_table.
+/// Functions of the module about tables, and the parts of files that they are read by.
 PyObject* readTable(PyObject* module, PyObject* arguments);
+PyObject* readPart(PyObject* module, PyObject* arguments);
+PyObject* plan(PyObject* module, PyObject* arguments);
+PyObject* behindOf(PyObject* module, PyObject* arguments);
+PyObject* holdsBehind(PyObject* module, PyObject* arguments);
 
 void addReader(PyObject* module);
 void addNode(PyObject* module);

@@ -1,12 +1,15 @@
 // tav.Table: rows of nodes, with columns by paths.
+#include <algorithm>
 #include <cstdlib>
 #include <deque>
 #include <memory>
 #include <new>
 
+#include "python/src/job.h"
 #include "python/src/places.h"
 #include "python/src/reader.h"
 #include "tav/inspect/arrow.hpp"
+#include "tav/inspect/plan.hpp"
 #include "tav/inspect/problem.hpp"
 #include "tav/inspect/table.hpp"
 
@@ -58,13 +61,10 @@ inspect::TableQuery queryOf(PyObject* each, PyObject* columns, PyObject* joiner)
   return {bytesOfText(each), std::move(wanted), std::move(between)};
 }
 
-/// Reads all rows of a source, with looks for interrupts in between.
-void readRows(inspect::Table& out, const Opened& opened, const inspect::TableQuery& query,
-              const inspect::TableOptions& options, Pass& pass)
+/// Reads rows until there are so many, or no more, with looks for interrupts in between.
+void readRows(inspect::Table& out, inspect::TableReader& rows, uint64_t most, Pass& pass)
 {
-  const auto source = opened.input.source();
-  inspect::TableReader rows(*source, opened.document.form(), query, options);
-  while (rows.next(out))
+  while (out.rows() < most && rows.next(out, std::min(most - out.rows(), inspect::TableReader::kBatch)))
   {
     pass.look();
   }
@@ -72,6 +72,48 @@ void readRows(inspect::Table& out, const Opened& opened, const inspect::TableQue
   {
     throw inspect::Error(*rows.stopped());
   }
+}
+
+inspect::TableOptions optionsOf(Opened& opened)
+{
+  inspect::TableOptions options{.onDamage = opened.onDamage};
+  options.passedOver = [&opened](const inspect::PassedOver& passed) {
+    opened.passedOver.emplace(std::pair(passed.offset, passed.rule), passed.length);
+  };
+  return options;
+}
+
+inspect::Part partOfNumbers(PyObject* numbers)
+{
+  const Ref items = made(PySequence_Fast(numbers, "the numbers of a part are expected"));
+  std::vector<uint64_t> words;
+  for (Py_ssize_t i = 0; i < PySequence_Fast_GET_SIZE(items.get()); ++i)
+  {
+    words.push_back(PyLong_AsUnsignedLongLong(PySequence_Fast_GET_ITEM(items.get(), i)));
+    done(PyErr_Occurred() != nullptr ? -1 : 0);
+  }
+  return inspect::partOf(words);
+}
+
+Ref numbersOfPart(const inspect::Part& part)
+{
+  const std::vector<uint64_t> words = inspect::numbersOf(part);
+  Ref tuple = made(PyTuple_New(static_cast<Py_ssize_t>(words.size())));
+  for (size_t i = 0; i < words.size(); ++i)
+  {
+    PyTuple_SET_ITEM(tuple.get(), static_cast<Py_ssize_t>(i), numberOf(words[i]).release());
+  }
+  return tuple;
+}
+
+/// What `read_part` has given as a part's end.
+inspect::PartEnd endOfNumbers(PyObject* end)
+{
+  PyObject* behind = nullptr;
+  int leans = 0;
+  unsigned long long shared = 0;
+  done(PyArg_ParseTuple(end, "OpK", &behind, &leans, &shared) - 1);
+  return {.behind = partOfNumbers(behind), .leans = leans != 0, .shared = static_cast<size_t>(shared)};
 }
 
 PyObject* makeTable(std::unique_ptr<inspect::Table> table)
@@ -183,6 +225,21 @@ Ref longOf(const Cell& cell)
                                     kor::isLittleEndian ? 1 : 0, isSigned ? 1 : 0));
 }
 
+/// The kind that a column is to be read as.
+CellKind kindOf(PyObject* name)
+{
+  const std::string wanted = bytesOfText(name);
+  for (const CellKind kind : {CellKind::unsigned64, CellKind::signed64, CellKind::unsigned128, CellKind::signed128,
+                              CellKind::time, CellKind::bytes})
+  {
+    if (wanted == nameOf(kind))
+    {
+      return kind;
+    }
+  }
+  return CellKind::text;
+}
+
 /// A cell in a column of objects: of a column of texts each value is its text.
 Ref objectAt(const Cell& cell, CellKind kind)
 {
@@ -206,10 +263,11 @@ PyObject* fillColumn(PyObject* self, PyObject* arguments)
   return guarded([&] {
     PyObject* number = nullptr;
     PyObject* array = nullptr;
-    done(PyArg_ParseTuple(arguments, "OO", &number, &array) - 1);
+    PyObject* type = nullptr;
+    done(PyArg_ParseTuple(arguments, "OOU", &number, &array, &type) - 1);
     const inspect::Table& table = tableOf(self);
     const size_t column = columnOf(table, number);
-    const CellKind kind = table.type(column);
+    const CellKind kind = kindOf(type);
     Places places(array, table.rows());
     for (size_t row = 0; row < table.rows(); ++row)
     {
@@ -362,24 +420,112 @@ PyObject* readTable(PyObject*, PyObject* arguments)
     PyObject* columns = nullptr;
     PyObject* joiner = nullptr;
     PyObject* progress = nullptr;
-    done(PyArg_ParseTuple(arguments, "OUOOO", &readers, &each, &columns, &joiner, &progress) - 1);
+    unsigned long long most = 0;
+    done(PyArg_ParseTuple(arguments, "OUOOOK", &readers, &each, &columns, &joiner, &progress, &most) - 1);
     PyObject* const told = progressOf(progress);
     const inspect::TableQuery query = queryOf(each, columns, joiner);
     auto table = std::make_unique<inspect::Table>(query);
     const Ref walk = made(PyObject_GetIter(readers));
-    while (const Ref item = Ref(PyIter_Next(walk.get())))
+    while (table->rows() < most)
     {
+      const Ref item(PyIter_Next(walk.get()));
+      if (!item)
+      {
+        break;
+      }
       ReaderObject& reader = readerObjectOf(item.get());
       Opened& opened = useDocument(reader);
-      inspect::TableOptions options{.onDamage = opened.onDamage};
-      options.passedOver = [&opened](const inspect::PassedOver& passed) {
-        opened.passedOver.emplace(std::pair(passed.offset, passed.rule), passed.length);
-      };
       Searching searching(reader, told);
-      readRows(*table, opened, query, options, searching.pass());
+      const auto source = opened.input.source();
+      inspect::TableReader rows(*source, opened.document.form(), query, optionsOf(opened));
+      readRows(*table, rows, most, searching.pass());
     }
     done(PyErr_Occurred() != nullptr ? -1 : 0);
     return makeTable(std::move(table));
+  });
+}
+
+PyObject* readPart(PyObject*, PyObject* arguments)
+{
+  return guarded([&] {
+    PyObject* object = nullptr;
+    PyObject* numbers = nullptr;
+    PyObject* each = nullptr;
+    PyObject* columns = nullptr;
+    PyObject* joiner = nullptr;
+    PyObject* progress = nullptr;
+    done(PyArg_ParseTuple(arguments, "OOUOOO", &object, &numbers, &each, &columns, &joiner, &progress) - 1);
+    PyObject* const told = progressOf(progress);
+    const inspect::TableQuery query = queryOf(each, columns, joiner);
+    const inspect::Part part = partOfNumbers(numbers);
+    auto table = std::make_unique<inspect::Table>(query);
+    inspect::PartEnd end;
+    {
+      ReaderObject& reader = readerObjectOf(object);
+      Opened& opened = useDocument(reader);
+      Searching searching(reader, told);
+      const auto source = opened.input.source();
+      inspect::TableReader rows(*source, query, part, optionsOf(opened));
+      readRows(*table, rows, ~uint64_t{0}, searching.pass());
+      end = rows.end();
+    }
+    const Ref made = Ref(makeTable(std::move(table)));
+    return tav::python::made(Py_BuildValue("(O(NOK))", made.get(), numbersOfPart(end.behind).release(),
+                                           end.leans ? Py_True : Py_False,
+                                           static_cast<unsigned long long>(end.shared)))
+        .release();
+  });
+}
+
+PyObject* plan(PyObject*, PyObject* arguments)
+{
+  return guarded([&] {
+    PyObject* what = nullptr;
+    PyObject* form = nullptr;
+    unsigned long long size = 0;
+    PyObject* each = nullptr;
+    PyObject* columns = nullptr;
+    PyObject* joiner = nullptr;
+    done(PyArg_ParseTuple(arguments, "OOKOOO", &what, &form, &size, &each, &columns, &joiner) - 1);
+    const Job job(what, form);
+    const inspect::Form& found = job.form();
+    const inspect::PlanOptions options{
+        .targetBytes = size,
+        .form = {.swapped = found.swapped, .root64 = found.root64, .aligned = found.aligned}};
+    const auto query = each == Py_None ? std::nullopt : std::optional(queryOf(each, columns, joiner));
+    std::vector<inspect::Part> parts;
+    {
+      const Pass pass(nullptr, 0);
+      parts = query ? inspect::planTable(*job.source, *query, options) : inspect::plan(*job.source, options);
+    }
+    Ref list = made(PyList_New(0));
+    for (const inspect::Part& part : parts)
+    {
+      done(PyList_Append(list.get(), numbersOfPart(part).get()));
+    }
+    return list.release();
+  });
+}
+
+PyObject* behindOf(PyObject*, PyObject* arguments)
+{
+  return guarded([&] {
+    PyObject* part = nullptr;
+    PyObject* end = nullptr;
+    done(PyArg_ParseTuple(arguments, "OO", &part, &end) - 1);
+    return numbersOfPart(inspect::behindOf(partOfNumbers(part), endOfNumbers(end))).release();
+  });
+}
+
+PyObject* holdsBehind(PyObject*, PyObject* arguments)
+{
+  return guarded([&] {
+    PyObject* behind = nullptr;
+    PyObject* part = nullptr;
+    PyObject* end = nullptr; // None: it was not reached
+    done(PyArg_ParseTuple(arguments, "OOO", &behind, &part, &end) - 1);
+    const inspect::PartEnd reached = end == Py_None ? inspect::PartEnd{} : endOfNumbers(end);
+    return PyBool_FromLong(inspect::holdsBehind(partOfNumbers(behind), partOfNumbers(part), reached) ? 1 : 0);
   });
 }
 

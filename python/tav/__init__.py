@@ -10,19 +10,21 @@ word (ValueError).
 from __future__ import annotations
 
 import datetime
+import importlib
 import os
 import tempfile
 from typing import Any, Callable, Iterable, Mapping, Optional, Union
 
 from . import _tav
 from ._results import Change, Damage, Difference, Doubt, Extracted, Finding, Form, Loss, Report, SchemaEntry, Side
+from ._parts import Part, check_word, plan
 from ._table import read_table
 from ._tav import Group, Node, Reader, Table, TavError, Writer, __version__
 
 __all__ = [
-    "Change", "Damage", "Difference", "Doubt", "Extracted", "Finding", "Form", "Group", "Loss", "Node", "Reader",
-    "Report", "SchemaEntry", "Side", "Table", "TavError", "Writer", "__version__", "check", "diff", "extract", "from_json",
-    "open", "read_table", "recognise", "recover", "schema", "set", "to_json",
+    "Change", "Damage", "Difference", "Doubt", "Extracted", "Finding", "Form", "Group", "Loss", "Node", "Part",
+    "Reader", "Report", "SchemaEntry", "Side", "Table", "TavError", "Writer", "__version__", "check", "diff", "extract",
+    "from_json", "open", "plan", "read_table", "recognise", "recover", "schema", "set", "to_json",
 ]
 
 Path = Union[str, "os.PathLike[str]"]
@@ -36,9 +38,15 @@ def open(source: Source, *, byte_order: Optional[str] = None, root: Optional[int
     return Reader(source, byte_order=byte_order, root=root, align=align, on_damage=on_damage)
 
 
+def __getattr__(name: str) -> Any:
+    """tav.dask, which needs dask, is imported when it is asked for."""
+    if name == "dask":
+        return importlib.import_module("tav.dask")
+    raise AttributeError(f"module 'tav' has no attribute {name!r}")
+
+
 def _skips(on_damage: str) -> bool:
-    if on_damage not in ("stop", "skip"):
-        raise ValueError("on_damage is 'stop' or 'skip'")
+    check_word(on_damage)
     return on_damage == "skip"
 
 

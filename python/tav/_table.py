@@ -6,32 +6,65 @@ import os
 from typing import TYPE_CHECKING, Any, Callable, Iterable, Iterator, Mapping, Optional, Union
 
 from . import _tav
+from ._parts import Part
 
 if TYPE_CHECKING:
     import pandas  # type: ignore[import]
 
+_ALL = 2**64 - 1
 _Progress = Optional[Callable[[int, int], object]]
 _PLAIN = {"uint64": "uint64", "int64": "int64", "time": "datetime64[ns]"}
 
 
 def table(reader: _tav.Reader, each: str, columns: Mapping[str, str], *, join: Optional[str] = None,
-          progress: _Progress = None) -> _tav.Table:
+          part: Optional[Part] = None, progress: _Progress = None) -> _tav.Table:
     """See Reader.table."""
-    return _tav.read_table([reader], each, list(columns.items()), join, progress)
+    if part is not None:
+        return _tav.read_part(reader, part.numbers, each, list(columns.items()), join, progress)[0]
+    return _tav.read_table([reader], each, list(columns.items()), join, progress, _ALL)
 
 
-def _arrays(of: _tav.Table) -> Iterator[tuple[str, str, Any, Any]]:
+def _kind_as(name: str, kind: str, wanted: str, values: Any, valid: Any) -> str:
+    """The type that a column is given out in; ValueError where its values do not fit it."""
+    if kind == wanted or wanted == "text":
+        return wanted
+    if not valid.any():
+        return wanted
+    numbers = ("uint64", "int64", "uint128", "int128")
+    if {kind, wanted} == {"uint64", "int64"} and not ((values.view("int64") < 0) & valid).any():
+        return wanted
+    if kind in numbers[:2] and (wanted == "int128" or (wanted == "uint128" and kind == "uint64")):
+        return wanted
+    raise ValueError(f"the column {name!r} has values of the type {kind}, not {wanted}: types={{{name!r}: ...}} names "
+                     f"one that suits all rows, such as 'text'")
+
+
+def _arrays(of: _tav.Table, types: Optional[Mapping[str, str]] = None) -> Iterator[tuple[str, str, Any, Any]]:
     """Name, type, values and whether each is there; of objects None says that it is not."""
     import numpy as np
 
     for i, (name, kind) in enumerate(of.columns.items()):
+        wanted = (types or {}).get(name, kind)
+        values: Any = None
+        valid: Any = None
         if kind in _PLAIN:
             values, valid = of._plain(i)
-            yield name, kind, np.frombuffer(values, _PLAIN[kind]), np.frombuffer(valid, bool)
-        else:
-            array = np.empty(len(of), object)
-            of._fill(i, array)
-            yield name, kind, array, None
+            values, valid = np.frombuffer(values, _PLAIN[kind]), np.frombuffer(valid, bool)
+        elif kind != wanted and wanted != "text":
+            values = np.empty(len(of), object)
+            of._fill(i, values, kind)
+            valid = np.fromiter((value is not None for value in values), bool, len(of))
+        wanted = _kind_as(name, kind, wanted, values, valid)
+        if wanted not in _PLAIN:
+            values = np.empty(len(of), object)
+            of._fill(i, values, wanted)
+            valid = None
+        elif kind not in _PLAIN:  # which has no values
+            values = np.full(len(of), "NaT", _PLAIN[wanted]) if wanted == "time" else np.zeros(len(of), _PLAIN[wanted])
+        elif kind != wanted:
+            values = np.full(len(of), "NaT", _PLAIN[wanted]) if wanted == "time" else values.view("uint64").view(
+                _PLAIN[wanted])
+        yield name, wanted, values, valid
 
 
 def to_numpy(of: _tav.Table) -> dict[str, Any]:
@@ -46,12 +79,12 @@ def to_numpy(of: _tav.Table) -> dict[str, Any]:
     return result
 
 
-def to_pandas(of: _tav.Table) -> pandas.DataFrame:
-    """See Table.to_pandas."""
+def to_pandas(of: _tav.Table, types: Optional[Mapping[str, str]] = None) -> pandas.DataFrame:
+    """See Table.to_pandas. types: of columns, where they are not to follow from the values."""
     import pandas as pd
 
     series: dict[str, Any] = {}
-    for name, kind, values, valid in _arrays(of):
+    for name, kind, values, valid in _arrays(of, types):
         if kind in ("uint64", "int64"):
             series[name] = pd.arrays.IntegerArray(values, ~valid)
         elif kind == "time":
@@ -91,4 +124,4 @@ def read_table(paths: Union[str, os.PathLike[str], Iterable[Any]], each: str, co
             with _tav.Reader(path, byte_order=byte_order, root=root, align=align, on_damage=on_damage) as reader:
                 yield reader
 
-    return to_pandas(_tav.read_table(readers(), each, list(columns.items()), join, progress))
+    return to_pandas(_tav.read_table(readers(), each, list(columns.items()), join, progress, _ALL))

@@ -63,6 +63,7 @@ struct PlanOptions
 {
   uint64_t targetBytes = 0; ///< about how long a part is; 0: from 1 to 16 MiB, by the file's size
   size_t maxParts = 0;      ///< parts are longer where there would be more; 0: any number
+  size_t maxDepth = 64;     ///< groups around a part, at most; 0: parts begin with roots. No more than 64
   FormChoice form{};        ///< what is known of the form; the rest is found out
 };
 
@@ -126,6 +127,13 @@ TAV_INSPECT_API PartEnd walkPart(ByteSource& source, const Part& part,
 
 /// Whether a part begins where a walk stands, and in the same groups. Damage before it is left out: see PartEnd::leans.
 TAV_INSPECT_API bool isSeam(const Part& behind, const Part& next);
+
+/// Where the one walk over the file stands when it has come through a part, which began where that walk came by:
+/// `end.behind`, and what it knows of damage before the part. Its size is 0.
+TAV_INSPECT_API Part behindOf(const Part& part, const PartEnd& end);
+
+/// Whether what was found in a part is what the one walk finds there, which stands at `behind`. `end` is the part's.
+TAV_INSPECT_API bool holdsBehind(const Part& behind, const Part& part, const PartEnd& end);
 
 /// Finds the first part that does not begin as the one before it ended, and puts it right: it begins there, and has to
 /// be walked through once more. Returns its place among the parts; nothing when all parts together are the file, and

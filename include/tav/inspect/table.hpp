@@ -15,6 +15,7 @@
 #include "tav/inspect/damageWatch.hpp"
 #include "tav/inspect/dictionary.hpp"
 #include "tav/inspect/document.hpp"
+#include "tav/inspect/plan.hpp"
 #include "tav/inspect/problem.hpp"
 #include "tav/inspect/source.hpp"
 #include "tav/inspect/walker.hpp"
@@ -174,6 +175,10 @@ public:
   /// `source` outlives the reader.
   TAV_INSPECT_API TableReader(ByteSource& source, const Form& form, const TableQuery& query,
                               const TableOptions& options = {});
+  /// The rows that begin in a part of `planTable`; the options' start and end are of no account. Throws Error for a
+  /// part in which such rows cannot be told from those before and behind it.
+  TAV_INSPECT_API TableReader(ByteSource& source, const TableQuery& query, const Part& part,
+                              const TableOptions& options = {});
   TAV_INSPECT_API ~TableReader();
   TableReader(const TableReader&) = delete;
   TableReader& operator=(const TableReader&) = delete;
@@ -184,6 +189,9 @@ public:
 
   /// The damage at which reading has stopped. The rows before it have been handed out: those whose nodes had ended.
   TAV_INSPECT_API const std::optional<Problem>& stopped() const noexcept;
+
+  /// Of a part, when `next` has returned false and nothing has stopped it: where it ended.
+  TAV_INSPECT_API PartEnd end() const;
 
   static constexpr uint64_t kBatch = 65536;
 
@@ -197,6 +205,11 @@ private:
 TAV_INSPECT_API std::optional<Problem> readTable(ByteSource& source, const Form& form, const TableQuery& query,
                                                  const TableOptions& options,
                                                  const std::function<void(const Table&)>& rows);
+
+/// Cuts a file as `plan` does, only where a table can be read apart: the rows behind follow from the bytes behind. Rows
+/// by names are cut anywhere outside of rows, others between roots, or not at all.
+TAV_INSPECT_API std::vector<Part> planTable(ByteSource& source, const TableQuery& query,
+                                            const PlanOptions& options = {});
 
 /// All rows of a source. Throws Error at damage unless it is skipped.
 TAV_INSPECT_API Table readTable(ByteSource& source, const Form& form, const TableQuery& query,

@@ -1,3 +1,4 @@
+#include <algorithm>
 #include <map>
 #include <optional>
 #include <random>
@@ -355,6 +356,137 @@ TEST(TableAtDamage, HasTheRowsBeforeItAndSaysWhereItIs)
       {.onDamage = OnDamage::skip, .passedOver = [&](const PassedOver& place) { passed.push_back(place.offset); }});
   EXPECT_EQ(rowsOf(skipped), (Rows{{"\"ada\""}, {"\"\""}, {"-"}}));
   EXPECT_THAT(passed, ElementsAre(second + 16));
+}
+
+namespace
+{
+
+/// The rows of all parts, each by a reader of its own, as engines elsewhere put them together. `mended` counts the
+/// parts whose beginnings were no places of the walk.
+Rows rowsInParts(ByteSource& source, const TableQuery& query, uint64_t target, OnDamage onDamage, size_t& mended)
+{
+  Rows rows;
+  Part behind;
+  for (const Part& planned : planTable(source, query, {.targetBytes = target}))
+  {
+    Part part = planned;
+    for (bool isSure = false; !isSure;)
+    {
+      Table table(query);
+      TableReader reader(source, query, part, {.onDamage = onDamage});
+      while (reader.next(table))
+      {
+      }
+      EXPECT_FALSE(reader.stopped().has_value());
+      isSure = part.offset == 0 || holdsBehind(behind, part, reader.end());
+      if (!isSure)
+      {
+        const uint64_t end = std::max(part.end(), behind.offset);
+        part = behind;
+        part.size = end - part.offset;
+        mended += 1;
+        continue;
+      }
+      part.around = part.offset == 0 ? part.around : behind.around;
+      behind = behindOf(part, reader.end());
+      const Rows found = rowsOf(table);
+      rows.insert(rows.end(), found.begin(), found.end());
+    }
+  }
+  return rows;
+}
+
+} // namespace
+
+TEST_P(TableOfAForm, InPartsIsTheWholeAlsoWhereItIsDamaged)
+{
+  const auto [swap, align, pairs] = GetParam();
+  Bytes bytes;
+  for (int i = 0; i < 3; ++i)
+  {
+    const Bytes more = hosts(swap, align, pairs);
+    bytes.insert(bytes.end(), more.begin(), more.end());
+  }
+  std::mt19937_64 random(20);
+  size_t parts = 0;
+  size_t again = 0;
+  for (int round = 0; round < 4; ++round)
+  {
+    const uint64_t target = 16 + random() % 300;
+    for (const Question& question : kQuestions)
+    {
+      SCOPED_TRACE(std::string(question.each) + " by " + std::to_string(target) + ", round " + std::to_string(round));
+      const TableQuery query = queryOf(question.each, question.columns, question.joiner);
+      ByteSource source("x", std::span<const uint8_t>(bytes));
+      parts += planTable(source, query, {.targetBytes = target}).size() - 1;
+      const Recognition found = recognise(source);
+      EXPECT_EQ(rowsInParts(source, query, target, OnDamage::skip, again),
+                rowsOf(readTable(source, found.form, query, {.onDamage = OnDamage::skip})));
+    }
+    bytes[100 + random() % (bytes.size() - 100)] = static_cast<uint8_t>(random());
+  }
+  EXPECT_GT(parts, 100U);
+}
+
+TEST(TableInParts, FindsOutASeamThatIsForgedInAPayload)
+{
+  tav::Writer inner;
+  for (int i = 0; i < 200; ++i)
+  {
+    inner.group(TAV_ELM_CMN_HOST).add(TAV_ELM_CMN_HOST_NAME, "forged");
+  }
+  const Bytes forged = bytesOf(inner);
+  tav::Writer writer;
+  {
+    tav::Group system = writer.group(TAV_ELM_CMN_SYSTEM);
+    for (int i = 0; i < 3000; ++i)
+    {
+      tav::Group host = system.group(TAV_ELM_CMN_HOST);
+      host.add(TAV_ELM_CMN_HOST_NAME, std::to_string(i));
+      if (i % 100 == 50)
+      {
+        host.add(1002, std::as_bytes(std::span(forged)));
+      }
+    }
+  }
+  const Bytes bytes = bytesOf(writer);
+  ByteSource source("x", std::span<const uint8_t>(bytes));
+  const TableQuery query = queryOf("/system/host", {"hostName"});
+  size_t again = 0;
+  for (const uint64_t target : {3000U, 5000U, 20000U})
+  {
+    EXPECT_EQ(rowsInParts(source, query, target, OnDamage::stop, again), rowsOf(readTable(source, {}, query)));
+  }
+  EXPECT_GT(again, 0U);
+}
+
+TEST(TableInParts, AreCutOnlyWhereTheRowsBehindFollowFromTheBytesBehind)
+{
+  tav::Writer writer;
+  for (int i = 0; i < 4; ++i)
+  {
+    tav::Group system = writer.group(TAV_ELM_CMN_SYSTEM);
+    for (int k = 0; k < 100; ++k)
+    {
+      system.group(TAV_ELM_CMN_HOST).add(TAV_ELM_CMN_HOST_NAME, std::to_string(k));
+    }
+  }
+  const Bytes bytes = bytesOf(writer);
+  ByteSource source("x", std::span<const uint8_t>(bytes));
+  const auto partsOf = [&](const TableQuery& query) { return planTable(source, query, {.targetBytes = 500}).size(); };
+  EXPECT_GT(partsOf(queryOf("/system/host", {"hostName"})), 8U);
+  EXPECT_EQ(partsOf(queryOf("/system", {"host/hostName"})), 4U);
+  EXPECT_EQ(partsOf(queryOf("/system/host", {"hostName", "../osName"})), 4U);
+  EXPECT_EQ(partsOf(queryOf("/system/host[3]", {"hostName"})), 4U);
+  EXPECT_EQ(partsOf(queryOf("/system[2]/host", {"hostName"})), 1U);
+  for (const Part& part : planTable(source, queryOf("/host/system", {"hostName"}), {.targetBytes = 500}))
+  {
+    EXPECT_TRUE(part.around.empty()); // no part begins in a group that has no rows
+  }
+
+  const auto parts = planTable(source, queryOf("/system/host", {"hostName"}), {.targetBytes = 500});
+  ASSERT_FALSE(parts[1].around.empty());
+  EXPECT_THROW(TableReader(source, queryOf("/system", {"host/hostName"}), parts[1]), Error);
 }
 
 TEST(TableInParts, IsTheWholeWhenTheyAreAppended)
