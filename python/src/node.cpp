@@ -60,17 +60,11 @@ void deleteNode(PyObject* self)
 {
   PyTypeObject* const type = Py_TYPE(self);
   NodeObject& node = nodeOf(self);
-  NodeObject* parent = node.parent;
+  NodeObject* const parent = node.parent;
   Py_DECREF(node.reader);
   PyObject_Free(self);
   Py_DECREF(type);
-  while (parent != nullptr && Py_REFCNT(parent) == 1) // one after the other: nodes can be nested deeply
-  {
-    NodeObject* const next = std::exchange(parent->parent, nullptr);
-    Py_DECREF(parent);
-    parent = next;
-  }
-  Py_XDECREF(parent);
+  releaseChain(parent, &NodeObject::parent);
 }
 
 PyObject* getTag(PyObject* self, void*)

@@ -152,6 +152,19 @@ void* asSlot(Function* function) noexcept
 /// A type from its slots, added to the module where it has a name there.
 PyTypeObject* makeType(PyObject* module, PyType_Spec& spec, const char* name);
 
+/// Lets go of an object that keeps the one around it, and so on: one after the other, as they can be nested deeply.
+template<class Object>
+void releaseChain(Object* object, Object* Object::*outer) noexcept
+{
+  while (object != nullptr && Py_REFCNT(object) == 1)
+  {
+    Object* const next = std::exchange(object->*outer, nullptr);
+    Py_DECREF(object);
+    object = next;
+  }
+  Py_XDECREF(object);
+}
+
 /// The name in a table of keywords, which older headers want as plain pointers.
 char** keywords(const char* const* names) noexcept;
 

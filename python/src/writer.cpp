@@ -287,17 +287,11 @@ void deleteGroup(PyObject* self)
   PyTypeObject* const type = Py_TYPE(self);
   GroupObject& group = groupOf(self);
   std::destroy_at(&group.group);
-  GroupObject* outer = group.outer;
+  GroupObject* const outer = group.outer;
   Py_DECREF(group.writer);
   PyObject_Free(self);
   Py_DECREF(type);
-  while (outer != nullptr && Py_REFCNT(outer) == 1) // one after the other: groups can be nested deeply
-  {
-    GroupObject* const next = std::exchange(outer->outer, nullptr);
-    Py_DECREF(outer);
-    outer = next;
-  }
-  Py_XDECREF(outer);
+  releaseChain(outer, &GroupObject::outer);
 }
 
 PyObject* openGroup(PyObject* self, PyObject* arguments, PyObject* named)
