@@ -30,6 +30,23 @@ void seek(KORHFile& file, const std::string& name, uint64_t offset)
   }
 }
 
+/// Opens a file to be written into, and nobody else's meanwhile.
+void openAlone(const std::string& path, KORHFile& file)
+{
+  KORFileOpenParam open;
+  open.pPath = path.c_str();
+  open.options = KOR_FILE_UPDATE;
+  KORFileLockParam lock;
+  lock.word1 = 1; // nobody else's
+  lock.word2 = 2; // without waiting
+  uint32_t code = file.open(&open);
+  code = code == TAV_RC_OK ? file.lock(&lock) : code;
+  if (code != TAV_RC_OK)
+  {
+    failAt(path, code);
+  }
+}
+
 } // namespace
 
 class Editor::Work
@@ -265,6 +282,20 @@ void Editor::requireSameSizes() const
 void Editor::writeInto(KORHFile& file)
 {
   work_->writeInto(file);
+}
+
+void Editor::writeInPlace(const std::string& path)
+{
+  work_->requireSameSizes();
+  KORHFile file;
+  openAlone(path, file);
+  work_->writeInto(file);
+  uint32_t code = file.sync();
+  code = code == TAV_RC_OK ? file.close() : code;
+  if (code != TAV_RC_OK)
+  {
+    failAt(path, code);
+  }
 }
 
 void Editor::writeNew(PatchFile& out, const std::function<void(uint64_t)>& progress)

@@ -40,37 +40,6 @@ Ref reportTuple(const inspect::Outcome& outcome)
                             pieceList(account.losses).release(), pieceList(account.doubts).release()));
 }
 
-/// The file of a source, open to be written into, and nobody else's meanwhile.
-void openInPlace(const std::string& path, KORHFile& file)
-{
-  KORFileOpenParam open;
-  open.pPath = path.c_str();
-  open.options = KOR_FILE_UPDATE;
-  KORFileLockParam lock;
-  lock.word1 = 1; // nobody else's
-  lock.word2 = 2; // without waiting
-  uint32_t code = file.open(&open);
-  code = code == TAV_RC_OK ? file.lock(&lock) : code;
-  if (code != TAV_RC_OK)
-  {
-    inspect::failAt(path, code);
-  }
-}
-
-void writeInPlace(const std::string& path, inspect::Editor& editor)
-{
-  editor.requireSameSizes();
-  KORHFile file;
-  openInPlace(path, file);
-  editor.writeInto(file);
-  uint32_t code = file.sync();
-  code = code == TAV_RC_OK ? file.close() : code;
-  if (code != TAV_RC_OK)
-  {
-    inspect::failAt(path, code);
-  }
-}
-
 std::vector<inspect::Assignment> assignmentsOf(PyObject* pairs)
 {
   const Ref items = made(PySequence_Fast(pairs, "pairs of path and value are expected"));
@@ -184,7 +153,7 @@ PyObject* setValues(PyObject*, PyObject* arguments)
       }
       else
       {
-        writeInPlace(job.input.name, editor);
+        editor.writeInPlace(job.input.name);
       }
     }
     const Ref bytes = product ? product->result() : Ref(none());

@@ -49,36 +49,6 @@ std::optional<uint16_t> typeOf(const Invocation& invocation)
   return type;
 }
 
-/// The file itself, open for what is to be written into it, and nobody else's meanwhile.
-void openInPlace(const std::string& path, KORHFile& file)
-{
-  KORFileOpenParam open;
-  open.pPath = path.c_str();
-  open.options = KOR_FILE_UPDATE;
-  KORFileLockParam lock;
-  lock.word1 = 1; // nobody else's
-  lock.word2 = 2; // without waiting
-  uint32_t code = file.open(&open);
-  code = code == TAV_RC_OK ? file.lock(&lock) : code;
-  if (code != TAV_RC_OK)
-  {
-    failAt(path, code);
-  }
-}
-
-void writeInPlace(const std::string& path, Editor& editor)
-{
-  KORHFile file;
-  openInPlace(path, file);
-  editor.writeInto(file);
-  uint32_t code = file.sync();
-  code = code == TAV_RC_OK ? file.close() : code;
-  if (code != TAV_RC_OK)
-  {
-    failAt(path, code);
-  }
-}
-
 void requirePlace(const std::string& path)
 {
   std::error_code error;
@@ -127,8 +97,7 @@ int run(const Invocation& invocation)
   progress.reset();
   if (inPlace)
   {
-    editor.requireSameSizes();
-    writeInPlace(name, editor);
+    editor.writeInPlace(name);
   }
   else
   {

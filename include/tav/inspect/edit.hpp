@@ -60,6 +60,10 @@ public:
   /// may be closed by now.
   TAV_INSPECT_API void writeInto(KORHFile& file);
 
+  /// The same of the file with this name, which nobody else may have locked, and which is on the device behind it.
+  /// Throws Error, naming the file.
+  TAV_INSPECT_API void writeInPlace(const std::string& path);
+
   /// Appends the whole stream with the new values. Sizes of the groups around them, and the distances in the pairs
   /// behind them, follow; every other byte stays as it is. Throws Error.
   TAV_INSPECT_API void writeNew(PatchFile& out, const std::function<void(uint64_t)>& progress = {});

@@ -78,6 +78,8 @@ public:
     ASSERT_EQ(file.open(&param), TAV_RC_OK);
   }
 
+  const std::string& path() const { return path_; }
+
   Bytes bytes() const
   {
     std::ifstream file(path_, std::ios::binary);
@@ -131,6 +133,19 @@ TEST_P(EditInAForm, AValueOfTheSameSizeIsWrittenIntoTheFile)
   Editor editor(source, form, assign("**/cpuOnline", "4711"));
   editor.requireSameSizes();
   editor.writeInto(file);
+  EXPECT_EQ(differences(bytes, disk.bytes(), form), "/system/host/cpuOnline  Uint32  8 -> 4711\n");
+}
+
+TEST_P(EditInAForm, AFileIsChangedWhereItIsOrAsAWholeNot)
+{
+  const OnDisk disk(bytes);
+  Editor longer(source, form, assign("**/hostName", "grace"));
+  EXPECT_THROW(longer.writeInPlace(disk.path()), Error);
+  Editor editor(source, form, assign("**/cpuOnline", "4711"));
+  EXPECT_THROW(editor.writeInPlace(disk.path() + ".nothing"), Error);
+  EXPECT_FALSE(std::filesystem::exists(disk.path() + ".nothing"));
+  EXPECT_EQ(disk.bytes(), bytes);
+  editor.writeInPlace(disk.path());
   EXPECT_EQ(differences(bytes, disk.bytes(), form), "/system/host/cpuOnline  Uint32  8 -> 4711\n");
 }
 
