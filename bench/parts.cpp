@@ -1,5 +1,5 @@
-// W10: a file by one thread and by two in the same run, and what a plan costs. On a busy machine the time that passes says
-// little: the share of the processors' time that the caller's thread used says how well the work was divided.
+// W10: a file by one thread and by two in the same run, and what a plan costs. On a busy machine the time that passes
+// says little: the share of the processors' time that the caller's thread used says how well the work was divided.
 //   tav_parts [MIB]        the stream's length, 64 unless given
 #include <algorithm>
 #include <chrono>
