@@ -237,7 +237,7 @@ std::string fileOf(const Typed& typed)
 }
 
 /// `part`: the shell puts what is offered in the place of what stands behind a column's name alone.
-void offer(const Typed& typed, std::string word, bool part)
+void offer(const Typed& typed, const std::string& word, bool part)
 {
   const size_t sign = typed.name.starts_with("[NAME=]") ? word.find('=') : std::string::npos;
   const std::string label = sign == std::string::npos ? "" : word.substr(0, sign + 1);
@@ -258,10 +258,13 @@ void offer(const Typed& typed, std::string word, bool part)
   const std::string rows = isRelative && !begun->steps.starts_with('/') ? typed.invocation.text("--each") + "/" : "";
   const Path path = pathOf(rows + begun->steps + "*", source.dictionary());
   const std::string slash = begun->steps.empty() && begun->next.empty() && !isRelative ? "/" : "";
+  const std::string typedSteps = (part ? "" : label) + begun->kept + slash + begun->steps;
   Output out("-");
   for (const std::string& name : namesAt(source, found.form, path, begun->next))
   {
-    out.write((part ? "" : label) + begun->kept + slash + begun->steps + name + "\n");
+    out.write(typedSteps);
+    out.write(name);
+    out.write("\n");
   }
   out.commit();
 }

@@ -136,7 +136,7 @@ public:
   {
     target_ = target.path;
     lock_ = lock;
-    const FileOutcome held = hold();
+    FileOutcome held = hold();
     if (held.code != TAV_RC_OK)
     {
       return held;
@@ -221,7 +221,7 @@ inline FileOutcome openForWriting(const FilePath& path, const FileOptions& optio
   constexpr uint64_t made = KOR_FILE_UPDATE | KOR_FILE_CREATE;
   if (!options.overwrite)
   {
-    const FileOutcome fresh = openLocked(path, made | KOR_FILE_EXCLUSIVE, options.lock, storage);
+    FileOutcome fresh = openLocked(path, made | KOR_FILE_EXCLUSIVE, options.lock, storage);
     if (!fresh.sentence.empty() && fresh.code != KOR_RC_LOCKED && fresh.code != KOR_RC_BUSY)
     {
       korRemoveFile(path.c_str()); // it was made, and cannot be locked

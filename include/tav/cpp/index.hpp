@@ -31,6 +31,7 @@ public:
   };
 
   virtual ~IndexTable() = default;
+  IndexTable& operator=(const IndexTable&) = delete;
 
   [[nodiscard]] virtual IndexTable* copy() const = 0;
   /// Whether a path is looked up here; else it takes a walk.
@@ -42,7 +43,6 @@ public:
 protected:
   IndexTable() = default;
   IndexTable(const IndexTable&) = default;
-  IndexTable& operator=(const IndexTable&) = delete;
 };
 
 /// Makes an index by a walk; after a failure it has what comes before the damage.

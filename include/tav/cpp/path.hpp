@@ -126,7 +126,7 @@ inline std::vector<Node> collect(FindRange&& range)
 inline std::optional<Node> firstOf(FindRange&& range)
 {
   const auto first = range.begin();
-  return first == range.end() ? std::nullopt : std::optional(*first);
+  return first == std::default_sentinel ? std::nullopt : std::optional(*first);
 }
 
 } // namespace detail

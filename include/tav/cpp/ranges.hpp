@@ -446,14 +446,14 @@ inline std::optional<Node> Node::next() const
 {
   ChildRange behind = siblings();
   const auto first = behind.begin();
-  return first == behind.end() ? std::nullopt : std::optional(*first);
+  return first == std::default_sentinel ? std::nullopt : std::optional(*first);
 }
 
 inline std::optional<Node> Node::next(std::error_code& ec) const
 {
   ChildRange behind = siblings(ec);
   const auto first = behind.begin();
-  return first == behind.end() ? std::nullopt : std::optional(*first);
+  return first == std::default_sentinel ? std::nullopt : std::optional(*first);
 }
 
 } // namespace tav

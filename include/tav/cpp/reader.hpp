@@ -44,6 +44,7 @@ public:
     detail::report(openBytes(bytes, options), ec);
   }
   template<detail::TemporaryBytes T>
+  // NOLINTNEXTLINE(bugprone-forwarding-reference-overload): readers are no bytes
   explicit Reader(T&& bytes, const StreamOptions& options = {}) = delete;
   template<detail::TemporaryBytes T>
   Reader(T&& bytes, const StreamOptions& options, std::error_code& ec) = delete;

@@ -112,7 +112,7 @@ inline void appendTime(std::string& to, const TAVTimeStamp& stamp)
     to += " s";
     return;
   }
-  constexpr int64_t daySeconds = 24 * 60 * 60;
+  constexpr int64_t daySeconds = int64_t{24} * 60 * 60;
   const int64_t seconds = static_cast<int64_t>(stamp.seconds) + shift;
   const int64_t days = (seconds >= 0 ? seconds : seconds - (daySeconds - 1)) / daySeconds;
   const auto clock = static_cast<uint32_t>(seconds - days * daySeconds);

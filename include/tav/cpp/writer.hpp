@@ -17,8 +17,9 @@ namespace tav
 
 namespace detail
 {
+// NOLINTNEXTLINE(cppcoreguidelines-virtual-class-destructor): as where it is defined
 class Recording;
-}
+} // namespace detail
 
 /// Writes one stream. Owns its handle, its file or its buffer; used by one thread at a time. Move-only.
 /// Call finish() at the end: a writer that is merely destroyed cannot tell that its last pages could not be written.

@@ -2,6 +2,7 @@
 /// Values as the expressions in a path compare them.
 #pragma once
 
+#include <compare>
 #include <cstdint>
 #include <optional>
 #include <string>
@@ -26,17 +27,16 @@ struct Value
   std::string text{};
 };
 
-template<class Order>
-bool holds(Operator comparison, const Order& order) noexcept
+inline bool holds(Operator comparison, std::partial_ordering order) noexcept
 {
   switch (comparison)
   {
-  case Operator::equal: return order == 0;
-  case Operator::unequal: return order != 0;
-  case Operator::less: return order < 0;
-  case Operator::lessOrEqual: return order <= 0;
-  case Operator::greater: return order > 0;
-  default: return order >= 0;
+  case Operator::equal: return std::is_eq(order);
+  case Operator::unequal: return std::is_neq(order);
+  case Operator::less: return std::is_lt(order);
+  case Operator::lessOrEqual: return std::is_lteq(order);
+  case Operator::greater: return std::is_gt(order);
+  default: return std::is_gteq(order);
   }
 }
 
@@ -50,7 +50,7 @@ inline bool compare(Operator comparison, const Value& left, const Value& right) 
   const bool equality = comparison == Operator::equal || comparison == Operator::unequal;
   if (!number && (equality || onlyText))
   {
-    return holds(comparison, left.text.compare(right.text));
+    return holds(comparison, left.text.compare(right.text) <=> 0);
   }
   const std::optional<Decimal> a = onlyText ? std::nullopt : decimalOf(left.text);
   const std::optional<Decimal> b = onlyText ? std::nullopt : decimalOf(right.text);

@@ -81,7 +81,7 @@ inline std::strong_ordering operator<=>(const Decimal& left, const Decimal& righ
 
 inline bool operator==(const Decimal& left, const Decimal& right) noexcept
 {
-  return (left <=> right) == 0;
+  return std::is_eq(left <=> right);
 }
 
 } // namespace tav::detail::paths

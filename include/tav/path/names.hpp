@@ -6,6 +6,7 @@
 #include <array>
 #include <cstddef>
 #include <cstdint>
+#include <iterator>
 #include <string_view>
 #include <vector>
 
@@ -94,8 +95,8 @@ inline constexpr std::array<std::string_view, 16> kAttributeNames = {
 /// Attribute::none for a name that no attribute has.
 inline Attribute attributeNamed(std::string_view name) noexcept
 {
-  const auto found = std::find(kAttributeNames.begin() + 1, kAttributeNames.end(), name);
-  return found == kAttributeNames.end() ? Attribute::none : static_cast<Attribute>(found - kAttributeNames.begin());
+  const auto place = std::find(kAttributeNames.begin() + 1, kAttributeNames.end(), name) - kAttributeNames.begin();
+  return place == std::ssize(kAttributeNames) ? Attribute::none : static_cast<Attribute>(place);
 }
 
 } // namespace tav::detail::paths

@@ -84,10 +84,9 @@ public:
   {
     retainPath(*path_);
   }
-  SharedPath& operator=(const SharedPath& other) noexcept
+  SharedPath& operator=(SharedPath other) noexcept
   {
-    retainPath(*other.path_);
-    releasePath(*std::exchange(path_, other.path_));
+    std::swap(path_, other.path_);
     return *this;
   }
   ~SharedPath()
