@@ -84,8 +84,7 @@ run_tests()
 check_tidy()
 {
   cmake --preset clang -DTAV_BUILD_TESTS=OFF -DTAV_BUILD_TOOLS=OFF >"$work/configure.log" || { cat "$work/configure.log"; return 1; }
-  find kor trace format storage dictionary api layer inspect -name '*.cpp' ! -name '*Windows.cpp' -print0 |
-    xargs -0 -n 2 -P "$(nproc)" clang-tidy --quiet -p build/clang 2>"$work/tidy.log" || { cat "$work/tidy.log"; return 1; }
+  cmake/tidy.py build/clang
 }
 
 # cppcheck follows values further than a compiler does. A finding that is none is told so beside the line, with the reason.
