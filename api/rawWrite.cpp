@@ -21,8 +21,8 @@ uint32_t rawWrite(TAVHandle& handle, uint64_t& position, const void* bytes, uint
     {
       if (length != 0)
       {
-        std::memmove(handle.pDirectData + position, bytes,
-                     static_cast<size_t>(length)); // the bytes may lie in the block themselves
+        // The bytes may lie in the block themselves.
+        std::memmove(handle.pDirectData + position, bytes, static_cast<size_t>(length));
         position += length;
       }
       frame.dump(100, position);

@@ -174,7 +174,7 @@ private:
     while (wanted != 0 && chunk_ < table_.chunks().size())
     {
       const TableChunk& chunk = *table_.chunks()[chunk_];
-      const uint64_t count = std::min(wanted, chunk.rows() - row_);
+      const auto count = static_cast<size_t>(std::min<uint64_t>(wanted, chunk.rows() - row_));
       if (count != 0)
       {
         rows.push_back({&chunk, row_, count});
@@ -194,7 +194,7 @@ private:
   uint64_t batchRows_;
   std::vector<ArrowColumn> columns_{};
   size_t chunk_ = 0;
-  uint64_t row_ = 0;
+  size_t row_ = 0;
 };
 
 /// Does a step of the stream; an error number when it throws.

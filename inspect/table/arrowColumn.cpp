@@ -26,7 +26,7 @@ void eachRow(const std::vector<RowRun>& rows, const Visit& visit)
 {
   for (const RowRun& run : rows)
   {
-    for (uint64_t row = run.first; row < run.first + run.count; ++row)
+    for (size_t row = run.first; row < run.first + run.count; ++row)
     {
       visit(*run.chunk, row);
     }
@@ -49,7 +49,7 @@ uint64_t fillBitmap(const std::vector<RowRun>& rows, size_t column, std::vector<
   out.resize(static_cast<size_t>(lengthOf(rows) / 8 + 1));
   uint64_t at = 0;
   uint64_t missing = 0;
-  eachRow(rows, [&](const TableChunk& chunk, uint64_t row) {
+  eachRow(rows, [&](const TableChunk& chunk, size_t row) {
     const unsigned isThere = chunk.kinds(column)[row] != 0 ? 1 : 0;
     out[static_cast<size_t>(at / 8)] |= static_cast<uint8_t>(isThere << at % 8);
     missing += 1 - isThere;
@@ -107,7 +107,7 @@ ArrowColumn::ArrowColumn(const Table& table, size_t column, bool dictionaries)
   chooseText(table, dictionaries && layout_ == Layout::texts);
 }
 
-std::string ArrowColumn::textOf(const TableChunk& chunk, uint64_t row) const
+std::string ArrowColumn::textOf(const TableChunk& chunk, size_t row) const
 {
   const Cell cell = chunk.cell(column_, row);
   return layout_ == Layout::bytes ? std::string(cell.text) : wellFormed(cellText(cell));
@@ -124,7 +124,7 @@ void ArrowColumn::chooseText(const Table& table, bool dictionaries)
   uint64_t bytes = 0;
   for (const auto& chunk : table.chunks())
   {
-    for (uint64_t row = 0; row < chunk->rows(); ++row)
+    for (size_t row = 0; row < chunk->rows(); ++row)
     {
       const std::string text = textOf(*chunk, row);
       const bool isThere = chunk->kind(column_, row) != CellKind::missing;
@@ -189,7 +189,7 @@ void ArrowColumn::fillWords(const std::vector<RowRun>& rows, std::vector<uint8_t
 
 void ArrowColumn::fillDecimals(const std::vector<RowRun>& rows, std::vector<uint8_t>& out) const
 {
-  eachRow(rows, [&](const TableChunk& chunk, uint64_t row) {
+  eachRow(rows, [&](const TableChunk& chunk, size_t row) {
     const Cell cell = chunk.cell(column_, row);
     const bool isNegative = cell.kind == CellKind::signed64 && (cell.number >> 63U) != 0;
     const uint64_t high = isNegative ? ~uint64_t{0} : cell.high;
@@ -200,7 +200,7 @@ void ArrowColumn::fillDecimals(const std::vector<RowRun>& rows, std::vector<uint
 
 void ArrowColumn::fillNumbers(const std::vector<RowRun>& rows, std::vector<uint8_t>& out) const
 {
-  eachRow(rows, [&](const TableChunk& chunk, uint64_t row) {
+  eachRow(rows, [&](const TableChunk& chunk, size_t row) {
     const bool isThere = chunk.kind(column_, row) != CellKind::missing;
     append(out, isThere ? numbers_->known(textOf(chunk, row)) : uint32_t{0});
   });
@@ -211,7 +211,7 @@ void ArrowColumn::fillTexts(const std::vector<RowRun>& rows, std::vector<uint8_t
                             std::vector<uint8_t>& out) const
 {
   append(offsets, Offset{0});
-  eachRow(rows, [&](const TableChunk& chunk, uint64_t row) {
+  eachRow(rows, [&](const TableChunk& chunk, size_t row) {
     const std::string text = textOf(chunk, row);
     out.insert(out.end(), text.begin(), text.end());
     append(offsets, static_cast<Offset>(out.size()));

@@ -44,8 +44,8 @@ private:
 struct RowRun
 {
   const TableChunk* chunk;
-  uint64_t first;
-  uint64_t count;
+  size_t first;
+  size_t count;
 };
 
 class ArrowColumn
@@ -68,7 +68,7 @@ private:
   };
 
   void chooseText(const Table& table, bool dictionaries);
-  std::string textOf(const TableChunk& chunk, uint64_t row) const;
+  std::string textOf(const TableChunk& chunk, size_t row) const;
   void fillWords(const std::vector<RowRun>& rows, std::vector<uint8_t>& out) const;
   void fillDecimals(const std::vector<RowRun>& rows, std::vector<uint8_t>& out) const;
   void fillNumbers(const std::vector<RowRun>& rows, std::vector<uint8_t>& out) const;

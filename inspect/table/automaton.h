@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <map>
 #include <span>
+#include <tuple>
 #include <unordered_map>
 #include <vector>
 
@@ -88,8 +89,11 @@ private:
   {
     std::vector<Thread> threads{};
     bool watched = false; ///< inside a row with columns that are looked up
-    // NOLINTNEXTLINE(modernize-use-nullptr): the zero is in the comparison that the compiler makes
-    auto operator<=>(const Key&) const = default;
+    /// By its parts: not every standard library has the three-way comparison of vectors.
+    bool operator<(const Key& other) const
+    {
+      return std::tie(threads, watched) < std::tie(other.threads, other.watched);
+    }
   };
   struct State
   {

@@ -28,7 +28,7 @@ uint64_t signedNumber(const RawCell& value)
 
 void TableChunk::grow()
 {
-  constexpr uint64_t fewest = 256;
+  constexpr size_t fewest = 256;
   capacity_ = std::max(fewest, 2 * capacity_);
   for (Column& column : columns_)
   {
@@ -60,11 +60,12 @@ uint64_t TableChunk::newText(const uint8_t* bytes, uint64_t size, uint64_t room)
   return place;
 }
 
-void TableChunk::putText(Column& to, uint64_t row, CellKind kind, const uint8_t* bytes, uint64_t size)
+void TableChunk::putText(Column& to, size_t row, CellKind kind, const uint8_t* bytes, uint64_t size)
 {
   to.kinds[row] = static_cast<uint8_t>(kind);
+  const auto length = static_cast<size_t>(size);
   const bool repeats = to.lastText != kNone && sizeAt(to.lastText) == size &&
-                       (size == 0 || std::memcmp(heap_.data() + to.lastText + kSizeBytes, bytes, size) == 0);
+                       (size == 0 || std::memcmp(heap_.data() + to.lastText + kSizeBytes, bytes, length) == 0);
   if (!repeats)
   {
     to.lastText = newText(bytes, size, size);
@@ -72,7 +73,7 @@ void TableChunk::putText(Column& to, uint64_t row, CellKind kind, const uint8_t*
   to.cells[row] = to.lastText;
 }
 
-void TableChunk::putWide(Column& to, uint64_t row, CellKind kind, const RawCell& value)
+void TableChunk::putWide(Column& to, size_t row, CellKind kind, const RawCell& value)
 {
   const detail::RawValue raw{value.type, value.bytes, value.size, value.swap};
   std::array<uint64_t, 2> words{};
@@ -92,14 +93,14 @@ void TableChunk::putWide(Column& to, uint64_t row, CellKind kind, const RawCell&
   putHalves(to, row, words);
 }
 
-void TableChunk::putHalves(Column& to, uint64_t row, const std::array<uint64_t, 2>& words)
+void TableChunk::putHalves(Column& to, size_t row, const std::array<uint64_t, 2>& words)
 {
   to.cells[row] = heap_.size();
   const auto* const first = reinterpret_cast<const uint8_t*>(words.data());
   heap_.insert(heap_.end(), first, first + sizeof words);
 }
 
-void TableChunk::putTime(Column& to, uint64_t row, const RawCell& value)
+void TableChunk::putTime(Column& to, size_t row, const RawCell& value)
 {
   TAVTimeStamp stamp{};
   const detail::RawValue raw{value.type, value.bytes, value.size, value.swap};
@@ -118,7 +119,7 @@ void TableChunk::putTime(Column& to, uint64_t row, const RawCell& value)
   to.cells[row] = stamp.seconds * kNanoseconds + milliseconds * 1'000'000 + microseconds * 1000;
 }
 
-void TableChunk::setOther(Column& to, uint64_t row, const RawCell& value)
+void TableChunk::setOther(Column& to, size_t row, const RawCell& value)
 {
   const auto put = [&](CellKind kind, uint64_t number) {
     to.kinds[row] = static_cast<uint8_t>(kind);
@@ -147,14 +148,14 @@ void TableChunk::setOther(Column& to, uint64_t row, const RawCell& value)
   }
 }
 
-void TableChunk::putAny(uint32_t column, uint64_t row, const RawCell& value)
+void TableChunk::putAny(uint32_t column, size_t row, const RawCell& value)
 {
   const bool suits = layout::typeInfo(value.type).known && sizeSuits(value.type, value.size);
   put(column, row, suits ? value : RawCell{TAV_TYPE_BINARY, value.bytes, value.size, false});
 }
 
 /// Values that are joined are text from the first on. A text has room for as much again when it has to be moved.
-void TableChunk::join(uint32_t column, uint64_t row, const RawCell& value)
+void TableChunk::join(uint32_t column, size_t row, const RawCell& value)
 {
   TableChunk one(1, std::nullopt);
   one.addRow();
@@ -162,7 +163,7 @@ void TableChunk::join(uint32_t column, uint64_t row, const RawCell& value)
   joinText(column, row, cellText(one.cell(0, 0)));
 }
 
-void TableChunk::joinText(uint32_t column, uint64_t row, std::string_view text)
+void TableChunk::joinText(uint32_t column, size_t row, std::string_view text)
 {
   Column& to = columns_[column];
   const bool isFirst = to.kinds[row] == 0;
@@ -192,7 +193,7 @@ void TableChunk::joinText(uint32_t column, uint64_t row, std::string_view text)
   std::memcpy(place, &joined, sizeof joined);
 }
 
-void TableChunk::merge(uint64_t row, const TableChunk& from, uint64_t fromRow)
+void TableChunk::merge(size_t row, const TableChunk& from, size_t fromRow)
 {
   for (uint32_t i = 0; i < columns_.size(); ++i)
   {
@@ -220,7 +221,7 @@ void TableChunk::merge(uint64_t row, const TableChunk& from, uint64_t fromRow)
   }
 }
 
-void TableChunk::copy(uint32_t column, uint64_t fromRow, uint64_t row)
+void TableChunk::copy(uint32_t column, size_t fromRow, size_t row)
 {
   Column& to = columns_[column];
   to.kinds[row] = to.kinds[fromRow];
@@ -267,7 +268,7 @@ void TableChunk::goBack(const Mark& mark)
   forgetMark();
 }
 
-void TableChunk::cut(uint64_t rows)
+void TableChunk::cut(size_t rows)
 {
   for (Column& column : columns_)
   {
@@ -277,7 +278,7 @@ void TableChunk::cut(uint64_t rows)
   rows_ = rows;
 }
 
-Cell TableChunk::cell(size_t column, uint64_t row) const
+Cell TableChunk::cell(size_t column, size_t row) const
 {
   const Column& from = columns_[column];
   Cell cell{.kind = kind(column, row)};

@@ -32,15 +32,15 @@ public:
   explicit TableChunk(size_t columns, const std::optional<std::string>& joiner)
       : columns_(columns), joiner_(joiner ? &*joiner : nullptr) {}
 
-  uint64_t rows() const { return rows_ - first_; }
+  size_t rows() const { return rows_ - first_; }
   size_t columns() const { return columns_.size(); }
   const uint8_t* kinds(size_t column) const { return columns_[column].kinds.data() + first_; }
   const uint64_t* cells(size_t column) const { return columns_[column].cells.data() + first_; }
-  CellKind kind(size_t column, uint64_t row) const { return static_cast<CellKind>(kinds(column)[row]); }
-  Cell cell(size_t column, uint64_t row) const;
+  CellKind kind(size_t column, size_t row) const { return static_cast<CellKind>(kinds(column)[row]); }
+  Cell cell(size_t column, size_t row) const;
 
   /// A row without values.
-  uint64_t addRow()
+  size_t addRow()
   {
     if (rows_ == capacity_) [[unlikely]]
     {
@@ -50,7 +50,7 @@ public:
   }
 
   /// A data element's value, of a size that suits its type. Taken when it is the first, or joined to those before.
-  [[gnu::always_inline]] void put(uint32_t column, uint64_t row, const RawCell& value)
+  [[gnu::always_inline]] void put(uint32_t column, size_t row, const RawCell& value)
   {
     Column& to = columns_[column];
     if (joiner_ != nullptr || to.kinds[row] != 0) [[unlikely]]
@@ -66,29 +66,29 @@ public:
   }
 
   /// The same of any size.
-  void putAny(uint32_t column, uint64_t row, const RawCell& value);
+  void putAny(uint32_t column, size_t row, const RawCell& value);
 
   /// Gives a cell the value of another one in its column.
-  void copy(uint32_t column, uint64_t fromRow, uint64_t row);
+  void copy(uint32_t column, size_t fromRow, size_t row);
 
   /// A place to come back to. Only the last one can be.
   struct Mark
   {
-    uint64_t rows = 0;
+    size_t rows = 0;
     size_t heap = 0;
   };
   Mark mark();
   void forgetMark();
   void goBack(const Mark& mark);
   /// Takes the rows from one on away.
-  void cut(uint64_t rows);
+  void cut(size_t rows);
 
   /// Puts what a row of another chunk has behind what is in a row of this one, as if it had been put here. Nothing may
   /// have been dropped of the other one.
-  void merge(uint64_t row, const TableChunk& from, uint64_t fromRow);
+  void merge(size_t row, const TableChunk& from, size_t fromRow);
   /// Takes the first rows away, of which nothing is asked any more. The numbers of rows in `kinds`, `cells`, `kind` and
   /// `cell` begin behind them; elsewhere they stay.
-  void dropFirst(uint64_t rows) { first_ = rows; }
+  void dropFirst(size_t rows) { first_ = rows; }
 
 private:
   struct Column
@@ -101,7 +101,7 @@ private:
   struct Logged
   {
     uint32_t column;
-    uint64_t row;
+    size_t row;
     uint8_t kind;
     uint64_t cell;
     uint64_t size;
@@ -110,13 +110,13 @@ private:
   static constexpr uint64_t kNone = ~uint64_t{0};
 
   void grow();
-  void join(uint32_t column, uint64_t row, const RawCell& value);
-  void joinText(uint32_t column, uint64_t row, std::string_view text);
-  void putText(Column& to, uint64_t row, CellKind kind, const uint8_t* bytes, uint64_t size);
-  void putWide(Column& to, uint64_t row, CellKind kind, const RawCell& value);
-  void putHalves(Column& to, uint64_t row, const std::array<uint64_t, 2>& words);
-  void putTime(Column& to, uint64_t row, const RawCell& value);
-  void setOther(Column& to, uint64_t row, const RawCell& value);
+  void join(uint32_t column, size_t row, const RawCell& value);
+  void joinText(uint32_t column, size_t row, std::string_view text);
+  void putText(Column& to, size_t row, CellKind kind, const uint8_t* bytes, uint64_t size);
+  void putWide(Column& to, size_t row, CellKind kind, const RawCell& value);
+  void putHalves(Column& to, size_t row, const std::array<uint64_t, 2>& words);
+  void putTime(Column& to, size_t row, const RawCell& value);
+  void setOther(Column& to, size_t row, const RawCell& value);
   uint64_t sizeAt(uint64_t place) const;
   uint64_t newText(const uint8_t* bytes, uint64_t size, uint64_t room);
 
@@ -128,7 +128,7 @@ private:
     return static_cast<uint64_t>(static_cast<int64_t>(value.swap ? unswapped(number) : number));
   }
 
-  [[gnu::always_inline]] void set(Column& to, uint64_t row, const RawCell& value)
+  [[gnu::always_inline]] void set(Column& to, size_t row, const RawCell& value)
   {
     const auto put = [&](CellKind kind, uint64_t number) {
       to.kinds[row] = static_cast<uint8_t>(kind);
@@ -148,9 +148,9 @@ private:
 
   std::vector<Column> columns_;
   const std::string* joiner_;
-  uint64_t rows_ = 0;
-  uint64_t first_ = 0; ///< those before were dropped
-  uint64_t capacity_ = 0;
+  size_t rows_ = 0;
+  size_t first_ = 0; ///< those before were dropped
+  size_t capacity_ = 0;
   std::vector<uint8_t> heap_{}; ///< sizes with their bytes, and 128-bit numbers, the upper half first
   uint64_t loggedBelow_ = 0;    ///< what is put into rows before it is written down, to come back to the mark
   std::vector<Logged> log_{};

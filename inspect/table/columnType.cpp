@@ -18,7 +18,7 @@ void ColumnType::see(const TableChunk& chunk, size_t column)
 {
   const uint8_t* const kinds = chunk.kinds(column);
   const uint64_t* const cells = chunk.cells(column);
-  for (uint64_t row = 0; row < chunk.rows(); ++row)
+  for (size_t row = 0; row < chunk.rows(); ++row)
   {
     const auto kind = static_cast<CellKind>(kinds[row]);
     kinds_ |= 1U << kinds[row];

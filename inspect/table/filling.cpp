@@ -10,7 +10,7 @@ void Filling::begin()
 
 void Filling::otherData(const Automaton::Move& move, const RawCell& value)
 {
-  const uint64_t own = move.isRow ? chunk_->addRow() : kNoRow;
+  const size_t own = move.isRow ? chunk_->addRow() : kNoRow;
   const auto put = [&](const Automaton::Target& target) {
     chunk_->put(target.column, target.up == 0 ? own : rowAt(target.up), value);
   };

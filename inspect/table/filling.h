@@ -18,13 +18,13 @@ namespace tav::inspect
 class Filling
 {
 public:
-  static constexpr uint64_t kNoRow = ~uint64_t{0};
+  static constexpr size_t kNoRow = ~size_t{0};
 
   struct Level
   {
     uint32_t state = Automaton::kAbove;
-    uint32_t move = 0;     ///< of the child before
-    uint64_t row = kNoRow; ///< that the group is
+    uint32_t move = 0;   ///< of the child before
+    size_t row = kNoRow; ///< that the group is
   };
 
   explicit Filling(const CompiledQuery& query)
@@ -58,9 +58,9 @@ public:
   }
 
   /// The node is a group. Returns its row.
-  uint64_t enter(const Automaton::Move& move)
+  size_t enter(const Automaton::Move& move)
   {
-    const uint64_t row = move.isRow ? chunk_->addRow() : kNoRow;
+    const size_t row = move.isRow ? chunk_->addRow() : kNoRow;
     open_ += move.isRow ? 1 : 0;
     levels_.push_back({move.state, 0, row});
     return row;
@@ -95,7 +95,7 @@ private:
   void otherData(const Automaton::Move& move, const RawCell& value);
 
   /// The row so many levels above the node at hand.
-  uint64_t rowAt(uint32_t up) const { return levels_[levels_.size() - up].row; }
+  size_t rowAt(uint32_t up) const { return levels_[levels_.size() - up].row; }
 
   const CompiledQuery& query_;
   Automaton automaton_;

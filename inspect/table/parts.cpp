@@ -118,14 +118,14 @@ public:
       dropOpenRows();
       return;
     }
-    for (uint64_t row = 0; row < inherited; ++row)
+    for (size_t row = 0; row < inherited; ++row)
     {
       const OpenRow& begun = open_[static_cast<size_t>(row)];
       begun.chunk->merge(begun.row, *chunk, row);
     }
     open_.resize(static_cast<size_t>(
-        std::count_if(open.begin(), open.end(), [inherited](uint64_t row) { return row < inherited; })));
-    for (const uint64_t row : open)
+        std::count_if(open.begin(), open.end(), [inherited](size_t row) { return row < inherited; })));
+    for (const size_t row : open)
     {
       if (row >= inherited)
       {
@@ -152,7 +152,7 @@ private:
   struct OpenRow
   {
     std::shared_ptr<TableChunk> chunk;
-    uint64_t row;
+    size_t row;
   };
 
   /// Rows come in the order in which their nodes begin.

@@ -125,7 +125,7 @@ void TableReading::begin()
     line_.resize(static_cast<size_t>(event_.depth) + 1);
     line_.push_back(tree_.placeOf(walk_.walker(), event_));
   }
-  const uint64_t row = filling_.chunk().rows(); // if it is one
+  const size_t row = filling_.chunk().rows(); // if it is one
   node.isGroup() ? static_cast<void>(filling_.enter(move)) : takeData(move);
   if (move.isRow)
   {
@@ -217,7 +217,7 @@ std::span<const uint8_t> TableReading::bytesOf(uint64_t offset, uint64_t size)
   return buffer_;
 }
 
-void TableReading::seek(uint64_t row)
+void TableReading::seek(size_t row)
 {
   for (size_t i = 0; i < sought_.size(); ++i)
   {
@@ -242,7 +242,7 @@ void TableReading::seek(uint64_t row)
   }
 }
 
-void TableReading::search(const SoughtColumn& sought, uint64_t row)
+void TableReading::search(const SoughtColumn& sought, size_t row)
 {
   const size_t levels = std::min(sought.above, line_.size() - 1);
   const size_t top = sought.absolute ? 0 : line_.size() - 1 - levels;
@@ -264,7 +264,7 @@ void TableReading::search(const SoughtColumn& sought, uint64_t row)
   }
 }
 
-bool TableReading::take(uint32_t column, uint64_t row, const Place& place)
+bool TableReading::take(uint32_t column, size_t row, const Place& place)
 {
   if (!place.node.isGroup())
   {

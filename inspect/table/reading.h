@@ -40,7 +40,7 @@ public:
   /// Goes on by an event; false at the end, or at damage where that stops reading.
   bool step();
 
-  uint64_t rows() { return filling_.chunk().rows(); }
+  size_t rows() { return filling_.chunk().rows(); }
   bool hasOpenRows() const { return filling_.hasOpenRows(); }
   /// The rows whose nodes have not ended, from the outermost inwards.
   std::vector<uint64_t> openRows() const { return filling_.openRows(); }
@@ -69,7 +69,7 @@ private:
   struct Known
   {
     uint64_t offset = kNoOffset;
-    uint64_t row = 0;
+    size_t row = 0;
   };
 
   /// The filling as the exact steps tell it of nodes.
@@ -109,10 +109,10 @@ private:
   bool tryExact(std::span<const uint8_t> bytes);
   std::span<const uint8_t> bytesOf(uint64_t offset, uint64_t size);
   /// Looks the row's columns up whose paths are not plain.
-  void seek(uint64_t row);
-  void search(const SoughtColumn& sought, uint64_t row);
+  void seek(size_t row);
+  void search(const SoughtColumn& sought, size_t row);
   /// Whether more values are wanted.
-  bool take(uint32_t column, uint64_t row, const Place& place);
+  bool take(uint32_t column, size_t row, const Place& place);
 
   ByteSource& source_;
   TableQuery query_;

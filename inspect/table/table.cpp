@@ -80,7 +80,7 @@ Cell Table::cell(size_t column, uint64_t row) const
 {
   const auto behind = std::upper_bound(starts_.begin(), starts_.end(), row);
   const auto chunk = static_cast<size_t>(behind - starts_.begin()) - 1;
-  return chunks_[chunk]->cell(column, row - starts_[chunk]);
+  return chunks_[chunk]->cell(column, static_cast<size_t>(row - starts_[chunk]));
 }
 
 CellKind Table::type(size_t column) const

@@ -122,7 +122,13 @@ private:
     {
       return TAV_RC_NO_MEMORY;
     }
-    const uint64_t twice = 2 * storage_.bufferSize;
+    // No block is larger than half of all addresses: up to there the next one is twice as large.
+    constexpr auto largest = static_cast<uint64_t>(PTRDIFF_MAX);
+    if (more > largest)
+    {
+      return TAV_RC_NO_MEMORY;
+    }
+    const uint64_t twice = storage_.bufferSize > largest / 2 ? largest : 2 * storage_.bufferSize;
     const uint64_t size = more > twice ? more : twice;
     auto* const block = static_cast<uint8_t*>(std::realloc(storage_.pBuffer, static_cast<size_t>(size)));
     if (block == nullptr)
