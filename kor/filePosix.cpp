@@ -17,6 +17,12 @@ namespace
 {
 static_assert(sizeof(off_t) == 8, "file offsets are 64-bit");
 
+#if defined(__EMSCRIPTEN__)
+constexpr bool kMappingCopies = true; ///< all of the file: no mapping is better, as rings need less memory
+#else
+constexpr bool kMappingCopies = false;
+#endif
+
 /// The code of a failed transfer or lock: the descriptor is our own, so it is the direction that does not fit.
 uint32_t transferCodeOf(int error)
 {
@@ -295,7 +301,7 @@ uint32_t mapNative(intptr_t file, void*& bytes, uint64_t& size)
   {
     return codeOfSystemError(errno);
   }
-  if (!S_ISREG(status.st_mode) || status.st_size <= 0)
+  if (kMappingCopies || !S_ISREG(status.st_mode) || status.st_size <= 0)
   {
     return TAV_RC_NOT_SUPPORTED;
   }
