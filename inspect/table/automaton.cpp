@@ -75,7 +75,11 @@ void Automaton::stepEach(const Thread& thread, uint16_t elm, Met& met) const
 void Automaton::stepColumn(const Thread& thread, uint16_t elm, Met& met) const
 {
   const std::vector<Step>& steps = stepsOf(thread.route);
-  if (!steps[thread.taken].matches(elm))
+  if (thread.taken > 0 && steps[thread.taken - 1].axis == Axis::descendantOrSelf && !layout::isEndElement(elm))
+  {
+    addColumn({thread.up + 1, thread.route, thread.taken}, met);
+  }
+  if (steps[thread.taken].axis != Axis::child || !steps[thread.taken].matches(elm))
   {
     return;
   }
@@ -84,7 +88,18 @@ void Automaton::stepColumn(const Thread& thread, uint16_t elm, Met& met) const
     met.targets.push_back({thread.up + 1, query_.chains[thread.route - eachRoutes_].column});
     return;
   }
-  met.key.threads.push_back({thread.up + 1, thread.route, thread.taken + 1});
+  addColumn({thread.up + 1, thread.route, thread.taken + 1}, met);
+}
+
+/// The last step is one to a child.
+void Automaton::addColumn(Thread thread, Met& met) const
+{
+  const std::vector<Step>& steps = stepsOf(thread.route);
+  met.key.threads.push_back(thread);
+  for (; steps[thread.taken].axis == Axis::descendantOrSelf; ++thread.taken)
+  {
+    met.key.threads.push_back({thread.up, thread.route, thread.taken + 1});
+  }
 }
 
 void Automaton::beginRow(Met& met) const
@@ -96,7 +111,7 @@ void Automaton::beginRow(Met& met) const
       met.targets.push_back({0, query_.chains[i].column});
       continue;
     }
-    met.key.threads.push_back({0, eachRoutes_ + i, 0});
+    addColumn({0, eachRoutes_ + i, 0}, met);
   }
   met.key.watched = met.key.watched || !query_.sought.empty();
 }

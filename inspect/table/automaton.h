@@ -113,6 +113,7 @@ private:
   void stepEach(const Thread& thread, uint16_t elm, Met& met) const;
   void addEach(uint32_t route, uint32_t taken, bool star, Met& met) const;
   void stepColumn(const Thread& thread, uint16_t elm, Met& met) const;
+  void addColumn(Thread thread, Met& met) const;
   void beginRow(Met& met) const;
 
   const std::vector<detail::paths::Step>& stepsOf(uint32_t route) const

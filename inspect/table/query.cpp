@@ -90,8 +90,14 @@ CompiledQuery::CompiledQuery(std::string_view eachText, std::vector<TableColumn>
 void CompiledQuery::addColumn(uint32_t column)
 {
   const paths::Compiled& path = columnPaths[column].compiled();
+  // Of rows inside of each other, as many levels would have to be kept in mind as there are.
+  const bool rowsNest = !eachIsPlain || std::any_of(eachRoutes.begin(), eachRoutes.end(), [](const auto* steps) {
+    return std::any_of(steps->begin(), steps->end(), [](const Step& step) { return step.axis != Axis::child; });
+  });
   const auto isChain = [&](uint32_t index) {
-    return !path.routes[index].absolute && isPlain(path.routes[index], false);
+    const Route& route = path.routes[index];
+    const bool endsInChild = route.steps.empty() || route.steps.back().axis == Axis::child;
+    return !route.absolute && isPlain(route, !rowsNest && endsInChild);
   };
   if (!std::all_of(path.main.begin(), path.main.end(), isChain))
   {

@@ -26,7 +26,7 @@ struct SoughtColumn
 
 struct CompiledQuery
 {
-  /// Children by names, one after another, from the row's node.
+  /// Children by names, one after another, from the row's node; where no row is inside of another one, levels, too.
   struct Chain
   {
     uint32_t column = 0;

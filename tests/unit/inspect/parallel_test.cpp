@@ -116,6 +116,7 @@ const std::vector<TableQuery>& tables()
       asked("/*", {"cpuOnline", "hostName", "host/memTotal", "host/hostName"}),
       asked("/*/*", {"cpuOnline", "../memTotal"}),
       asked("//host", {"hostName", ".//cpuOnline", "*[2]"}),
+      asked("/*/*", {".//cpuOnline", "*//*"}),
       asked("//host[cpuOnline]", {"memTotal", ".//hostName"}),
       asked("/*[2]", {"cpuOnline"}),
       asked("/system/host", {"hostName"}),

@@ -334,6 +334,41 @@ TEST(TableOfRandomTrees, IsTheSameByTheExactStepsAndByTheWalkerWhateverTheDamage
   }
 }
 
+TEST(TableOfRandomTrees, HasWhatIsAnyNumberOfLevelsBelowARow)
+{
+  // A condition that always holds makes the reader look each column up by itself.
+  const std::vector<std::string> columns = {".//cpuOnline", "host//hostName", ".//host/*", ".//host//memTotal", ".//*",
+                                            "*//*", ".//*//*", ".//system//*"};
+  const auto rows = [&](ByteSource& source, const tav::inspect::Form& form, const char* each, bool sought,
+                        const std::optional<std::string>& joiner) {
+    std::vector<std::string> paths = columns;
+    for (std::string& path : paths)
+    {
+      path += sought ? "[@type]" : "";
+    }
+    return rowsOf(readTable(source, form, queryOf(each, paths, joiner), {.onDamage = OnDamage::skip}));
+  };
+  const test::Cases cases = test::casesOf(100);
+  for (uint64_t seed = cases.first; seed < cases.first + cases.count; ++seed)
+  {
+    SCOPED_TRACE(seed);
+    const tav::inspect::Form form{.swapped = seed % 2 == 0, .root64 = true, .aligned = seed % 3 == 0};
+    const Bytes sound = test::namedStream(seed, form.swapped, form.aligned);
+    for (const Bytes& bytes : {sound, test::damaged(sound, seed)})
+    {
+      ByteSource source("x", std::span<const uint8_t>(bytes));
+      for (const char* const each : {"/*", "/*/*", "/system/host", "/system | /system/host", "//host"})
+      {
+        SCOPED_TRACE(each);
+        for (const auto& joiner : {std::optional<std::string>(), std::optional<std::string>("+")})
+        {
+          ASSERT_EQ(rows(source, form, each, false, joiner), rows(source, form, each, true, joiner));
+        }
+      }
+    }
+  }
+}
+
 TEST(TableAtDamage, HasTheRowsBeforeItAndSaysWhereItIs)
 {
   Bytes bytes = hosts(false, false, false);
