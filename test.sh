@@ -285,7 +285,7 @@ check_browser()
 {
   local status=0
   web/build.sh >"$work/build.log" 2>&1 || { tail -n 40 "$work/build.log"; return 1; }
-  (cd web && npm test --silent -- --test-reporter=tap) >"$work/tests.log" 2>&1 || status=$?
+  (cd web && npm test --silent) >"$work/tests.log" 2>&1 || status=$?
   count_browser
   if ((status != 0)); then
     sed -n '/^not ok/,/^  \.\.\./p' "$work/tests.log"
