@@ -46,8 +46,14 @@ ValueKind NodeColumns::takeNumber(const tav::detail::RawValue& raw, size_t row)
   {
     return ValueKind::bytes;
   }
-  number[row] = std::is_signed_v<Number> ? static_cast<uint64_t>(static_cast<int64_t>(value))
-                                         : static_cast<uint64_t>(value);
+  if constexpr (std::is_signed_v<Number>)
+  {
+    number[row] = static_cast<uint64_t>(static_cast<int64_t>(value));
+  }
+  else
+  {
+    number[row] = value;
+  }
   return ValueKind::number;
 }
 

@@ -1,0 +1,163 @@
+// Rows of nodes against a walk that takes every node by itself.
+#include <map>
+#include <memory>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include <gmock/gmock.h>
+
+#include "inspect/document/streamWalk.h"
+#include "inspect/streams.h"
+#include "tav/inspect/nodeColumns.hpp"
+
+using namespace tav::inspect;
+using test::Bytes;
+
+namespace
+{
+
+/// A row as a line.
+std::string line(int64_t parent, uint64_t offset, uint64_t size, uint64_t depth, unsigned elm, unsigned type,
+                 const std::string& path)
+{
+  std::string text;
+  for (const uint64_t number : {static_cast<uint64_t>(parent), offset, size, depth, uint64_t{elm}, uint64_t{type}})
+  {
+    text += std::to_string(number) + ' ';
+  }
+  return text + path;
+}
+
+struct RowsSeen
+{
+  std::vector<std::string> rows{};
+  std::vector<std::string> damage{};
+};
+
+RowsSeen byWalker(const Bytes& bytes, const tav::inspect::Form& form)
+{
+  RowsSeen seen;
+  ByteSource source("x", std::span<const uint8_t>(bytes));
+  StreamWalk walk(source, form,
+                  [&](const PassedOver& passed) { seen.damage.push_back(hexOffset(passed.offset) + passed.sentence); });
+  std::map<uint64_t, int64_t> rowOf;
+  for (Event event; walk.next(event);)
+  {
+    if (event.what == What::nodeBegin && !isEndPiece(event))
+    {
+      const tav::inspect::Node& node = event.node;
+      const int64_t parent = node.parentOffset == kNoOffset ? NodeColumns::kNoParent : rowOf.at(node.parentOffset);
+      rowOf[node.offset()] = static_cast<int64_t>(seen.rows.size());
+      seen.rows.push_back(line(parent, node.offset(), node.size(), event.depth, node.elm(), node.type(),
+                               walk.walker().path(event)));
+    }
+  }
+  return seen;
+}
+
+std::unique_ptr<ByteSource> sourceOf(const Bytes& bytes, bool inMemory)
+{
+  if (inMemory)
+  {
+    return std::make_unique<ByteSource>("x", std::span<const uint8_t>(bytes));
+  }
+  auto storage = std::make_unique<TAVSSMemory>(const_cast<uint8_t*>(bytes.data()), bytes.size());
+  return std::make_unique<ByteSource>("x", std::move(storage)); // read in pages, as a file
+}
+
+/// `rows`: so many at a time.
+RowsSeen byReader(const Bytes& bytes, const tav::inspect::Form& form, bool paths, size_t rows)
+{
+  RowsSeen seen;
+  const auto source = sourceOf(bytes, rows != 7);
+  const auto told = [&](const PassedOver& passed) { seen.damage.push_back(hexOffset(passed.offset) + passed.sentence); };
+  NodeReader reader(*source, form, {.onDamage = OnDamage::skip, .paths = paths, .passedOver = told});
+  for (NodeColumns columns; reader.next(columns, rows); columns.clear())
+  {
+    for (size_t i = 0; i < columns.count(); ++i)
+    {
+      seen.rows.push_back(line(columns.parent[i], columns.offset[i], columns.size[i], columns.depth[i], columns.id[i],
+                               columns.type[i], paths ? columns.paths[i] : std::string()));
+    }
+  }
+  return seen;
+}
+
+void expectEqual(const Bytes& bytes, const tav::inspect::Form& form)
+{
+  RowsSeen expected = byWalker(bytes, form);
+  for (const size_t rows : {size_t{1}, size_t{7}, NodeReader::kBatch})
+  {
+    const RowsSeen found = byReader(bytes, form, true, rows);
+    ASSERT_EQ(found.rows, expected.rows);
+    ASSERT_EQ(found.damage, expected.damage);
+  }
+  for (std::string& row : expected.rows)
+  {
+    row.resize(row.rfind(' ') + 1);
+  }
+  ASSERT_EQ(byReader(bytes, form, false, 3).rows, expected.rows);
+}
+
+} // namespace
+
+TEST(NodeRows, AreTheNodesOfAWalkOverRandomTrees)
+{
+  for (uint64_t seed = 1; seed <= 60; ++seed)
+  {
+    SCOPED_TRACE(seed);
+    const test::Tree tree = test::randomTree(seed, {.depth = 6, .width = 12});
+    const Bytes bytes = test::bytesOfTree(tree);
+    ByteSource source("x", std::span<const uint8_t>(bytes));
+    const tav::inspect::Form form = recognise(source).form;
+    expectEqual(bytes, form);
+    expectEqual(test::damaged(bytes, seed), form);
+    expectEqual(test::damaged(test::damaged(bytes, seed + 100), seed), form);
+  }
+}
+
+TEST(NodeRows, AreThoseBeforeTheDamageWhenReadingStops)
+{
+  for (uint64_t seed = 1; seed <= 30; ++seed)
+  {
+    SCOPED_TRACE(seed);
+    const Bytes bytes = test::damaged(test::bytesOfTree(test::randomTree(seed, {.depth = 5, .width = 9})), seed);
+    ByteSource source("x", std::span<const uint8_t>(bytes));
+    const tav::inspect::Form form = recognise(source).form;
+    const RowsSeen expected = byWalker(bytes, form);
+    NodeReader reader(source, form);
+    NodeColumns columns;
+    while (reader.next(columns, 5))
+    {
+    }
+    ASSERT_EQ(reader.stopped().has_value(), !expected.damage.empty());
+    ASSERT_LE(columns.count(), expected.rows.size());
+    ASSERT_TRUE(reader.stopped() || columns.count() == expected.rows.size());
+  }
+}
+
+TEST(NodeRows, HaveTheirValuesInTheColumnOfTheirKind)
+{
+  tav::Writer writer;
+  {
+    tav::Group system = writer.group(TAV_ELM_CMN_SYSTEM);
+    system.add(TAV_ELM_CMN_CPU_ONLINE, int32_t{-7});
+    system.add(TAV_ELM_CMN_HOST_NAME, "ada");
+    system.add(TAV_ELM_CMN_CPU_SPEED, tav::Uint128{.high = 1, .low = 2});
+  }
+  writer.finish();
+  const auto* const first = reinterpret_cast<const uint8_t*>(writer.bytes().data());
+  ByteSource source("x", std::span(first, writer.bytes().size()));
+  NodeReader reader(source, tav::inspect::Form{});
+  NodeColumns columns;
+  ASSERT_TRUE(reader.next(columns));
+  ASSERT_EQ(columns.count(), 4U);
+  EXPECT_EQ(columns.kind[0], ValueKind::none);
+  EXPECT_EQ(columns.kind[1], ValueKind::number);
+  EXPECT_EQ(static_cast<int64_t>(columns.number[1]), -7);
+  EXPECT_EQ(columns.kind[2], ValueKind::text);
+  EXPECT_EQ(std::string(reinterpret_cast<const char*>(columns.rest(2).bytes), columns.rest(2).length()), "ada");
+  EXPECT_EQ(columns.kind[3], ValueKind::wide);
+  EXPECT_EQ(columns.parent[3], 0);
+}
