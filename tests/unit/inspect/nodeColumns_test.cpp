@@ -71,7 +71,9 @@ RowsSeen byReader(const Bytes& bytes, const tav::inspect::Form& form, bool paths
 {
   RowsSeen seen;
   const auto source = sourceOf(bytes, rows != 7);
-  const auto told = [&](const PassedOver& passed) { seen.damage.push_back(hexOffset(passed.offset) + passed.sentence); };
+  const auto told = [&](const PassedOver& passed) {
+    seen.damage.push_back(hexOffset(passed.offset) + passed.sentence);
+  };
   NodeReader reader(*source, form, {.onDamage = OnDamage::skip, .paths = paths, .passedOver = told});
   for (NodeColumns columns; reader.next(columns, rows); columns.clear())
   {
