@@ -22,6 +22,7 @@ constexpr uint64_t kWindow = uint64_t{64} * 1024;
 class Window
 {
 public:
+  // cppcheck-suppress uninitMemberVar ; the bytes are filled before they are looked at
   explicit Window(ByteSource& source)
       : source_(source)
   {
