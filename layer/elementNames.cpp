@@ -35,7 +35,7 @@ void forEachElement(MayBe mayBe, Visit visit)
 {
   for (const TAVElementRange* range = inside::elementDirectory(); range->count != 0; ++range)
   {
-    for (const TAVElementEntry& entry : std::span(range->pEntries, range->count))
+    for (const TAVElementEntry& entry : std::span(range->pEntries, static_cast<size_t>(range->count)))
     {
       const char* const tag = inside::tagNameOf(entry);
       const char* const enumName = inside::enumNameOf(entry);

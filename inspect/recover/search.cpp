@@ -12,13 +12,13 @@ using namespace tav::layout;
 
 bool RecoverySearch::findNext(uint64_t from, uint64_t to, Candidate& found)
 {
-  constexpr uint64_t kWindow = uint64_t{16} * 1024;
-  std::vector<uint8_t> window(kWindow + kHeaderSize64);
+  constexpr uint64_t kAtOnce = uint64_t{16} * 1024;
+  std::vector<uint8_t> window(kAtOnce + kHeaderSize64);
   for (uint64_t at = from; at < to;)
   {
     std::fill(window.begin(), window.end(), uint8_t{0});
     source_.read(at, window);
-    const uint64_t tests = std::min(kWindow, to - at);
+    const uint64_t tests = std::min(kAtOnce, to - at);
     for (uint64_t i = 0; i < tests; ++i)
     {
       if (isFound(window.data() + i, at + i, from, to, found))

@@ -25,9 +25,9 @@ void Filling::otherData(const Automaton::Move& move, const RawCell& value)
   }
 }
 
-std::vector<uint64_t> Filling::openRows() const
+std::vector<size_t> Filling::openRows() const
 {
-  std::vector<uint64_t> rows;
+  std::vector<size_t> rows;
   for (const Level& level : levels_)
   {
     if (level.row != kNoRow)
@@ -40,7 +40,7 @@ std::vector<uint64_t> Filling::openRows() const
 
 uint64_t Filling::dropOpenRows()
 {
-  const std::vector<uint64_t> rows = openRows();
+  const std::vector<size_t> rows = openRows();
   if (!rows.empty())
   {
     chunk_->cut(rows.front());

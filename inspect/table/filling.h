@@ -82,7 +82,7 @@ public:
   /// Rows whose nodes have not ended yet.
   bool hasOpenRows() const { return open_ != 0; }
   /// The open rows, from the outermost inwards.
-  std::vector<uint64_t> openRows() const;
+  std::vector<size_t> openRows() const;
   /// Takes the rows from the first one on away whose node has not ended, and says which that is.
   uint64_t dropOpenRows();
   /// The rows so far. What goes on is put into others.

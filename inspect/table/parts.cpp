@@ -80,7 +80,7 @@ public:
     bool leansOnDamage() const { return looks_ || walker().leansOnDamage(); }
 
     TableReading reading;
-    uint64_t inherited; ///< rows of groups around the place where it began
+    size_t inherited; ///< rows of groups around the place where it began
 
   private:
     TableOptions withSink(TableOptions options)
@@ -109,8 +109,8 @@ public:
 
   void take(Walk& walk)
   {
-    const std::vector<uint64_t> open = walk.reading.openRows();
-    const uint64_t inherited = std::exchange(walk.inherited, 0);
+    const std::vector<size_t> open = walk.reading.openRows();
+    const size_t inherited = std::exchange(walk.inherited, 0);
     const std::shared_ptr<TableChunk> chunk = walk.reading.take();
     stopped_ = walk.reading.stopped();
     if (stopped_ && walk.reading.dropped() < inherited)

@@ -43,7 +43,7 @@ public:
   size_t rows() { return filling_.chunk().rows(); }
   bool hasOpenRows() const { return filling_.hasOpenRows(); }
   /// The rows whose nodes have not ended, from the outermost inwards.
-  std::vector<uint64_t> openRows() const { return filling_.openRows(); }
+  std::vector<size_t> openRows() const { return filling_.openRows(); }
   /// The rows so far.
   std::shared_ptr<TableChunk> take();
 

@@ -243,7 +243,7 @@ uint32_t decodeNumber(const RawValue& raw, T& out) noexcept
     {
       return TAV_RC_OUTSIDE_PARENT;
     }
-    out = static_cast<T>(number);
+    out = static_cast<T>(number); // NOLINT(bugprone-signed-char-misuse): a number, which keeps its sign
     return TAV_RC_OK;
   };
   const auto read = [&](auto number) {

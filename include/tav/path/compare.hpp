@@ -29,15 +29,17 @@ struct Value
 
 inline bool holds(Operator comparison, std::partial_ordering order) noexcept
 {
+  // NOLINTBEGIN(modernize-use-nullptr): orders compare with 0; not every standard library has std::is_eq
   switch (comparison)
   {
-  case Operator::equal: return std::is_eq(order);
-  case Operator::unequal: return std::is_neq(order);
-  case Operator::less: return std::is_lt(order);
-  case Operator::lessOrEqual: return std::is_lteq(order);
-  case Operator::greater: return std::is_gt(order);
-  default: return std::is_gteq(order);
+  case Operator::equal: return order == 0;
+  case Operator::unequal: return order != 0;
+  case Operator::less: return order < 0;
+  case Operator::lessOrEqual: return order <= 0;
+  case Operator::greater: return order > 0;
+  default: return order >= 0;
   }
+  // NOLINTEND(modernize-use-nullptr)
 }
 
 /// Equal are two texts of the same characters or, beside a number, two of the same value. The order is that of numbers;

@@ -81,7 +81,7 @@ inline std::strong_ordering operator<=>(const Decimal& left, const Decimal& righ
 
 inline bool operator==(const Decimal& left, const Decimal& right) noexcept
 {
-  return std::is_eq(left <=> right);
+  return (left <=> right) == 0; // NOLINT(modernize-use-nullptr): as orders compare
 }
 
 } // namespace tav::detail::paths

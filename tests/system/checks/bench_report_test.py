@@ -59,11 +59,13 @@ class Tables(unittest.TestCase):
         self.assertEqual(report.kind("pread_1MiB_40B_pieces"), "peer")
         self.assertEqual(report.kind("pread_1MiB_40B_floor_api"), "floor")
 
-    def test_relate_goals_to_the_floor_of_the_same_run(self):
-        must, aim = W1.goal
-        self.assertAlmostEqual(must, 5 / 1.16)
-        self.assertAlmostEqual(aim, 3.3 / 1.16)
+    def test_relate_goals_that_are_rates_to_the_floor_of_the_same_run(self):
         self.assertAlmostEqual(W6.goal[0], 33.7 / 25)
+
+    def test_judge_an_entry_by_its_own_goal(self):
+        lines = report.goal_table({"times": taken(floor=1, layer=2.3, tavAddElement=2.3)})
+        judged = {line.split("`")[1]: line.split("|")[-2].strip() for line in lines[2:]}
+        self.assertEqual(judged, {"layer": "missed", "tavAddElement": "aim met"})
 
     def test_judge_by_the_ratio(self):
         self.assertEqual([report.verdict(ratio, (4, 2)) for ratio in (1.9, 2, 2.1, 4, 4.1)],

@@ -211,7 +211,8 @@ class Follow(ToolTest):
     def test_a_file_that_is_not_there_is_waited_for(self):
         following = self.follow("get", "//cpuOnline")
         self.assertIn("there is no such file; waiting for one", following.note())
-        self.append(group(SYSTEM, number(1), number(2)))
+        self.append(group(SYSTEM, number(1), number(2)), path=self.path.with_suffix(".new"))
+        self.path.with_suffix(".new").rename(self.path)  # as a whole: an empty one would be told of
         self.assertIn("a file has appeared", following.note())
         self.assertEqual(following.take(2), ["1", "2"])
         self.assert_quiet_end(following)
