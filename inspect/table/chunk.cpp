@@ -174,6 +174,7 @@ void TableChunk::joinText(uint32_t column, size_t row, std::string_view text)
   if (isFirst)
   {
     to.kinds[row] = static_cast<uint8_t>(CellKind::text);
+    // cppcheck-suppress danglingTemporaryLifetime ; the bytes are copied, and their place is a number
     to.cells[row] = newText(reinterpret_cast<const uint8_t*>(text.data()), text.size(), text.size());
     to.rooms[row] = text.size();
     return;
