@@ -7,8 +7,6 @@ version=$(cmake/version.sh)
 # FILE and the expression that finds the version in it, once.
 places=(
   packaging/vcpkg/vcpkg.json '"version-semver": "([^"]+)"'
-  web/package.json '"version": "([^"]+)"'
-  duckdb/package.json '"version": "([^"]+)"'
 )
 status=0
 for ((i = 0; i < ${#places[@]}; i += 2)); do

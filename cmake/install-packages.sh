@@ -1,6 +1,6 @@
 #!/usr/bin/env bash
 # Installs the Debian packages of the named groups that are missing. This is the one list of them.
-#   cmake/install-packages.sh GROUP...        groups: build, test, full, platforms, bench, coverage, kaitai,
+#   cmake/install-packages.sh GROUP...        groups: build, test, full, platforms, bench, coverage, package, kaitai,
 #                                            python, sql, browser, wasm, site
 set -euo pipefail
 
@@ -9,6 +9,7 @@ declare -A groups=(
   [test]="libgtest-dev libgmock-dev pkg-config python3 binutils jq libxml2-utils python3-lxml python3-prometheus-client zsh fish file shared-mime-info"
   [bench]="libbenchmark-dev libbson-dev libmsgpack-dev libcbor-dev libflatbuffers-dev libebml-dev rapidjson-dev libpugixml-dev pkg-config valgrind binutils python3 python3-matplotlib"
   [full]="clang clang-19 clang-format clang-tidy cppcheck libclang-rt-dev ccache doxygen lintian dpkg-dev gzip abigail-tools valgrind"
+  [package]="g++ cmake ninja-build nlohmann-json3-dev dpkg-dev gzip file"
   [kaitai]="nodejs npm"
   [python]="g++ cmake ninja-build nlohmann-json3-dev python3-dev python3-pytest python3-hypothesis python3-numpy python3-pandas python3-dask python3-distributed python3-matplotlib python3-ipykernel python3-nbclient python3-nbformat mypy"
   [sql]="g++ cmake ninja-build nlohmann-json3-dev libgtest-dev libgmock-dev python3 nodejs npm"

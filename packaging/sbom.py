@@ -4,7 +4,7 @@
     sbom.py VERSION FOLDER
 
 What an artefact needs is read out of itself, where its kind says so (packages, wheels). What was compiled or copied into
-one is told by bundled.json, which the build of the page and of the extension are held against.
+one is told by bundled.json, by patterns of names.
 """
 
 import datetime
