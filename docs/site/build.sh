@@ -19,7 +19,7 @@ docs/site/lay_out.py . "$work/source"
 mkdir -p build
 doxygen docs/Doxyfile
 cp -r build/reference/html "$work/source/extra/reference"
-if [[ -f build/web/tav.html ]]; then cp build/web/tav.html "$work/source/extra/"; fi
+if [[ -f web/dist/tav.html ]]; then cp web/dist/tav.html "$work/source/extra/"; fi
 
 TAV_VERSION=$(cmake/version.sh) /usr/bin/python3 -m sphinx -q -W --keep-going -b html "$work/source" "$work/site"
 docs/site/check_site.py "$work/site"
