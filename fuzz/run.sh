@@ -2,7 +2,7 @@
 # Fuzzes for a time or a number of times: builds the preset `fuzz`, runs each target from its corpus and all findings
 # of the past, and fails on a new finding. What is new in a corpus and what was found stays in build/fuzz-work.
 #   fuzz/run.sh SECONDS [TARGET...]      targets: read write layer c path dictionary table plan tool recover build; all unless some are named
-#   fuzz/run.sh fixed [TARGET...]        the same inputs in every run, as many as take about a minute: a fast machine
+#   fuzz/run.sh fixed [TARGET...]        the same inputs in every run, as many as take about half a minute: a fast machine
 #                                        finds nothing that a slow one has passed
 # To reproduce: build/fuzz/fuzz/fuzz_TARGET FILE. A finding becomes a file in fuzz/findings/TARGET, which every build
 # runs as a test from then on.
@@ -19,7 +19,7 @@ if (($# == 0)) || [[ ! $1 =~ ^([0-9]+|fixed)$ ]]; then
 fi
 seconds=$1
 shift
-declare -A executions=([read]=70000 [write]=20000 [layer]=140000 [c]=5000 [path]=3000 [dictionary]=60000 [table]=20000 [plan]=4000 [tool]=20000 [recover]=90000 [build]=17000)
+declare -A executions=([read]=35000 [write]=10000 [layer]=70000 [c]=2500 [path]=1500 [dictionary]=30000 [table]=10000 [plan]=2000 [tool]=10000 [recover]=45000 [build]=8500)
 targets=("$@")
 ((${#targets[@]} > 0)) || targets=(read write layer c path dictionary table plan tool recover build)
 
