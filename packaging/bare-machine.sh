@@ -30,7 +30,7 @@ mount --rbind /dev "$root/dev"
 for setting in /etc/apt/sources.list /etc/apt/sources.list.d /etc/apt/apt.conf.d /etc/apt/trusted.gpg.d /etc/resolv.conf /etc/hosts /usr/share/keyrings; do
   if [[ -e $setting ]]; then cp -rL "$setting" "$root$(dirname "$setting")/"; fi
 done
-inside() { chroot "$root" /usr/bin/env -i PATH=/usr/sbin:/usr/bin:/sbin:/bin HOME=/root LC_ALL=C.UTF-8 DEBIAN_FRONTEND=noninteractive "$@"; }
+inside() { chroot "$root" /usr/bin/env -i PATH=/usr/sbin:/usr/bin:/sbin:/bin HOME=/tmp LC_ALL=C.UTF-8 DEBIAN_FRONTEND=noninteractive "$@"; }
 quietly() { "$@" >"$work/log" 2>&1 || { tail -n 40 "$work/log"; exit 1; }; }
 quietly inside apt-get update
 if inside sh -c 'command -v c++ cc python3'; then echo "the root is not bare"; exit 1; fi
@@ -41,14 +41,14 @@ cp "$packages"/*.deb "$root/packages/"
 quietly inside sh -c 'apt-get install -y --no-install-recommends /packages/*.deb'
 
 echo "== the program"
-inside tav snapshot -o /root/day.tav
-inside tav check /root/day.tav
-inside tav get /root/day.tav /system/host/hostName
-inside sh -c 'tav json /root/day.tav | tav build - -o /root/again.tav && tav diff /root/day.tav /root/again.tav'
+inside tav snapshot -o /tmp/day.tav
+inside tav check /tmp/day.tav
+inside tav get /tmp/day.tav /system/host/hostName
+inside sh -c 'tav json /tmp/day.tav | tav build - -o /tmp/again.tav && tav diff /tmp/day.tav /tmp/again.tav'
 
 if compgen -G "$packages/python3-tav_*.deb" >/dev/null; then
   echo "== Python"
-  inside python3 -c 'import tav; print(tav.open("/root/day.tav").find("/system/host/hostName").value, len(tav.check("/root/day.tav")))'
+  inside python3 -c 'import tav; print(tav.open("/tmp/day.tav").find("/system/host/hostName").value, len(tav.check("/tmp/day.tav")))'
 fi
 
 echo "== C and C++"
