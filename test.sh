@@ -323,12 +323,6 @@ count_python()
   ((tests > out && bad == 0))
 }
 
-# Node.js has an npm of its own where it does not come from Debian.
-sql_packages()
-{
-  { command -v node && command -v npm; } >/dev/null || cmake/install-packages.sh sql
-}
-
 # The extension for DuckDB, in the engine that duckdb/package.json names.
 check_sql()
 {
@@ -417,8 +411,7 @@ case ${1:-} in
     stage "g++" build_and_test release
     ;;
   --full)
-    stage "packages" cmake/install-packages.sh build test full platforms python browser site
-    stage "packages of SQL" sql_packages
+    stage "packages" cmake/install-packages.sh build test full platforms python sql browser site
     # The same sources are compiled again and again, at every place where the project is checked out.
     export CMAKE_CXX_COMPILER_LAUNCHER=ccache CCACHE_BASEDIR=$PWD CCACHE_NOHASHDIR=1
     export CCACHE_SLOPPINESS=pch_defines,time_macros,include_file_mtime,include_file_ctime
@@ -431,7 +424,7 @@ case ${1:-} in
         stage "Python" check_python
         ;;
       sql)
-        stage "packages" sql_packages
+        stage "packages" cmake/install-packages.sh sql
         stage "SQL" check_sql
         ;;
       browser)

@@ -40,8 +40,12 @@ if ! command -v apt-get >/dev/null || ! command -v dpkg-query >/dev/null; then
   exit 1
 fi
 
+# Node.js often does not come from Debian, and then its npm does not either.
+declare -A commands=([nodejs]=node [npm]=npm)
+
 missing=()
 for name in "${wanted[@]}"; do
+  if [[ -n ${commands[$name]:-} ]] && command -v "${commands[$name]}" >/dev/null; then continue; fi
   # shellcheck disable=SC2016  # the variable is dpkg-query's, not the shell's
   [[ $(dpkg-query -W -f='${db:Status-Status}' "$name" 2>/dev/null) == installed ]] || missing+=("$name")
 done
