@@ -103,11 +103,12 @@ class RecordTrouble(ToolTest):
         folder.mkdir()
         with subprocess.Popen([*TAV, "snapshot", "--append", "--every", "10ms", "-o", str(folder / "x.tav")],
                               stderr=subprocess.PIPE, text=True) as series:
-            self.assertTrue(until((folder / "x.tav").exists))
+            path = folder / "x.tav"
+            self.assertTrue(until(lambda: path.exists() and path.stat().st_size and times(path)))
             folder.rename(self.folder / "other")
             self.assertEqual(series.wait(timeout=PATIENCE), 2)
             self.assertIn("KOR_RC_NO_SUCH_FILE", series.stderr.read())
-        self.assertEqual(tav("check", self.folder / "other" / "x.tav").status, 0)
+        self.assertEqual(tav("check", self.folder / "other" / "x.tav").status, 0)  # what was stored stays whole
 
 
 if __name__ == "__main__":
