@@ -211,8 +211,10 @@ class EndElements(ToolTest):
 
 class Snapshot(ToolTest):
     def test_a_32_bit_root_is_that_of_32_bit_headers(self):
-        narrow = self.snapshot("--root", "32").read_bytes()
-        self.assertEqual(narrow[:4], self.snapshot("--hdr32").read_bytes()[:4])
+        layout = Form()
+        root = layout.header_at(self.snapshot("--root", "32").read_bytes(), 0, wide=False)
+        other = layout.header_at(self.snapshot("--hdr32").read_bytes(), 0, wide=False)
+        self.assertEqual(root[1:], other[1:])  # their sizes differ as the machine goes on
         info = tav("info", self.snapshot("--root", "32")).out
         self.assertIn("root header       32-bit\n", info)
         self.assertIn("headers           32-bit\n", info)
