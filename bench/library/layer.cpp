@@ -174,12 +174,14 @@ BENCHMARK(findText)->Name("W3/layer_path_text");
 
 void print(benchmark::State& state)
 {
-  const size_t expected = library::printPlain(library::encoded(), library::encodedSize(), {0, nullptr, 0, devNull()},
-                                              library::kXml);
-  perTree(state, [=]() -> size_t {
+  const auto printed = [](std::FILE* stream) -> size_t {
     const tav::Reader reader(encoded());
-    const size_t printed = reader.print(devNull(), {.xml = true});
-    return printed == expected ? printed : 0;
+    return reader.print(stream, {.xml = true});
+  };
+  const size_t expected = library::checkedXmlBytes(printed);
+  perTree(state, [=]() -> size_t {
+    const size_t size = printed(devNull());
+    return size == expected ? size : 0;
   });
 }
 BENCHMARK(print)->Name("W4file/layer_print_xml");

@@ -1,6 +1,9 @@
 /// What the entries of the plain operations share.
 #pragma once
 
+#include <cstdio>
+#include <functional>
+
 #include "bench/floor.hpp"
 #include "bench/harness.hpp"
 #include "tav/tav.h"
@@ -65,6 +68,9 @@ uint64_t findPlain(TAVHandle* handle, const snapshot::Path& path, TAVHdrStack* s
 bool validatePlain(void* block, uint64_t size);
 /// Prints to `param`; returns the characters.
 size_t printPlain(void* block, uint64_t size, TAVPrintParam param, uint64_t options);
+/// The characters of the workload's XML, which `printed` writes once into a stream in memory: 0 unless every leaf and
+/// group is there with its value.
+size_t checkedXmlBytes(const std::function<size_t(std::FILE*)>& printed);
 inline constexpr uint64_t kXml = TAV_PRINT_SUBTREE | TAV_PRINT_DATA | TAV_PRINT_XML;
 /// @}
 

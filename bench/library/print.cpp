@@ -27,33 +27,10 @@ size_t count(const std::string& text, const char* piece)
   return found;
 }
 
-/// The characters of the XML, printed once into memory: 0 unless every leaf and group is there with its value.
+/// The characters of the operation's own XML.
 size_t checkedXmlBytes()
 {
-  std::string text(kTextBytes, '\0');
-  std::FILE* stream = fmemopen(text.data(), text.size(), "w");
-  const size_t printed = print({0, nullptr, 0, stream}, kXml);
-  std::fclose(stream);
-  if (printed == 0 || text[printed - 1] == '\0' || text[printed] != '\0')
-  {
-    return 0;
-  }
-  text.resize(printed);
-  size_t at = 0;
-  for (const Leaf& leaf : model().leaves) // timestamps are shown as dates
-  {
-    if (leaf.type != 't')
-    {
-      const std::string value = leaf.type == 's' ? std::string(model().bytes(leaf), leaf.size)
-                                                 : std::to_string(leaf.value);
-      at = text.find('>' + value + '<', at);
-      if (at == std::string::npos)
-      {
-        return 0;
-      }
-    }
-  }
-  return count(text, "</") == kLeaves + kGroups ? printed : 0;
+  return library::checkedXmlBytes([](std::FILE* stream) { return print({0, nullptr, 0, stream}, kXml); });
 }
 
 void printFile(benchmark::State& state)
@@ -108,4 +85,32 @@ size_t library::printPlain(void* block, uint64_t size, TAVPrintParam param, uint
   const MemoryHandle handle(block, size, TAV_OPT_READ);
   uint64_t printed = 0;
   return tavPrintSubtree(options, handle.get(), nullptr, &param, &printed) == TAV_RC_OK ? printed : 0;
+}
+
+size_t library::checkedXmlBytes(const std::function<size_t(std::FILE*)>& printed)
+{
+  std::string text(kTextBytes, '\0');
+  std::FILE* stream = fmemopen(text.data(), text.size(), "w");
+  const size_t size = printed(stream);
+  std::fclose(stream);
+  if (size == 0 || text[size - 1] == '\0' || text[size] != '\0')
+  {
+    return 0;
+  }
+  text.resize(size);
+  size_t at = 0;
+  for (const Leaf& leaf : model().leaves) // timestamps are shown as dates
+  {
+    if (leaf.type != 't')
+    {
+      const std::string value = leaf.type == 's' ? std::string(model().bytes(leaf), leaf.size)
+                                                 : std::to_string(leaf.value);
+      at = text.find('>' + value + '<', at);
+      if (at == std::string::npos)
+      {
+        return 0;
+      }
+    }
+  }
+  return count(text, "</") == kLeaves + kGroups ? size : 0;
 }
