@@ -4,6 +4,8 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <span>
+#include <string_view>
 
 /// One element in a 64-bit slot of which only the 16 bits of the id are compared; the others say where its two strings
 /// begin among those of the dictionary. Pointers in their place would cost 115 KB of relocations in the library, which
@@ -45,6 +47,13 @@ const TAVElementEntry* findInRange(const TAVElementRange& range, uint16_t id);
 
 /// The entry of an id, or null when no range has one. Cost: at most five comparisons and an index.
 const TAVElementEntry* findElement(uint16_t id);
+
+/// The places of the entries that may have this tag, by which elementAt has them, in the order of the directory; blanks
+/// around a tag do not count, and placeholders have none. About two, so look whether one does have it.
+std::span<const uint16_t> placesTagged(std::string_view tag);
+
+/// An entry by its place among those of all ranges.
+const TAVElementEntry& elementAt(size_t place);
 
 /// The enum name of an entry of the directory. The string lives for ever.
 const char* enumNameOf(const TAVElementEntry& entry);

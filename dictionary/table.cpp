@@ -135,6 +135,11 @@ const TAVElementRange* elementDirectory()
   return kDirectory.data();
 }
 
+const TAVElementEntry& elementAt(size_t place)
+{
+  return kTable.entries[place];
+}
+
 const char* enumNameOf(const TAVElementEntry& entry)
 {
   return kTable.strings.data() + entry.enumNamePlace;

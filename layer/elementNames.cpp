@@ -4,6 +4,7 @@
 #include <array>
 #include <cstddef>
 #include <iterator>
+#include <optional>
 #include <span>
 #include <string>
 
@@ -28,32 +29,42 @@ std::string_view constantOf(std::string_view enumName) noexcept
   return words.substr(0, words.find(' '));
 }
 
-/// Calls with the id, the enum name and the tag of each element whose tag or enum name may be one that is meant, by its
-/// first character, in the order of the dictionary.
-template<class MayBe, class Visit>
-void forEachElement(MayBe mayBe, Visit visit)
+/// Whether a text may be an enum name or a constant: all of these begin so, and no tag does.
+bool isEnumLike(std::string_view name) noexcept
+{
+  const std::string_view word = paths::withoutBlanks(name);
+  return word.starts_with("TAV_") || word.starts_with("SQLM_");
+}
+
+/// Calls with the id, the enum name and the tag of each element, in the order of the dictionary.
+template<class Visit>
+void forEachElement(Visit visit)
 {
   for (const TAVElementRange* range = inside::elementDirectory(); range->count != 0; ++range)
   {
     for (const TAVElementEntry& entry : std::span(range->pEntries, static_cast<size_t>(range->count)))
     {
-      const char* const tag = inside::tagNameOf(entry);
-      const char* const enumName = inside::enumNameOf(entry);
-      if (!mayBe(*tag) && !mayBe(*enumName))
+      if (const std::string_view name = inside::enumNameOf(entry); name != kPlaceholder)
       {
-        continue;
-      }
-      if (const std::string_view name = enumName; name != kPlaceholder)
-      {
-        visit(static_cast<uint16_t>(entry.id), name, std::string_view(tag));
+        visit(static_cast<uint16_t>(entry.id), name, std::string_view(inside::tagNameOf(entry)));
       }
     }
   }
 }
 
-bool anyMayBe(char /*first*/) noexcept
+/// Calls with the id of each element that has this tag.
+template<class Visit>
+void forEachTagged(std::string_view name, Visit visit)
 {
-  return true;
+  for (const uint16_t place : inside::placesTagged(paths::withoutBlanks(name)))
+  {
+    const TAVElementEntry& entry = inside::elementAt(place);
+    const std::string_view tag = inside::tagNameOf(entry);
+    if (tag == name || paths::withoutBlanks(tag) == name)
+    {
+      visit(static_cast<uint16_t>(entry.id));
+    }
+  }
 }
 
 } // namespace
@@ -73,17 +84,16 @@ std::string_view elementName(uint16_t id) noexcept
 std::vector<uint16_t> idsNamed(std::string_view name, dictionary::OwnNames own)
 {
   std::vector<uint16_t> ids;
-  // Nearly all of the thousands of names begin with another character, and need no closer look;
-  // some begin with blanks.
-  const char first = name.empty() ? '\0' : name.front();
-  const auto mayBe = [first](char c) { return c == first || static_cast<unsigned char>(c) <= ' '; };
-  forEachElement(mayBe, [&](uint16_t id, std::string_view enumName, std::string_view tag) {
-    const bool isTag = tag == name || paths::withoutBlanks(tag) == name;
-    if (isTag || enumName == name || paths::withoutBlanks(enumName) == name || constantOf(enumName) == name)
-    {
-      ids.push_back(id);
-    }
-  });
+  forEachTagged(name, [&ids](uint16_t id) { ids.push_back(id); });
+  if (isEnumLike(name))
+  {
+    forEachElement([&](uint16_t id, std::string_view enumName, std::string_view /*tag*/) {
+      if (enumName == name || paths::withoutBlanks(enumName) == name || constantOf(enumName) == name)
+      {
+        ids.push_back(id);
+      }
+    });
+  }
   for (const dictionary::OwnName& entry : own)
   {
     if (entry.tag == name)
@@ -95,13 +105,24 @@ std::vector<uint16_t> idsNamed(std::string_view name, dictionary::OwnNames own)
   return ids;
 }
 
+std::optional<uint16_t> onlyTagged(std::string_view tag) noexcept
+{
+  std::optional<uint16_t> only;
+  bool isOnly = true;
+  forEachTagged(tag, [&](uint16_t id) {
+    isOnly = isOnly && (!only || *only == id);
+    only = id;
+  });
+  return isOnly && !isEnumLike(tag) ? only : std::nullopt;
+}
+
 std::vector<uint16_t> idsLike(std::string_view pattern, dictionary::OwnNames own)
 {
   std::string shorter; // where stars follow each other, one says the same
   std::unique_copy(pattern.begin(), pattern.end(), std::back_inserter(shorter),
                    [](char left, char right) { return left == '*' && right == '*'; });
   std::vector<uint16_t> ids;
-  forEachElement(anyMayBe, [&](uint16_t id, std::string_view /*enumName*/, std::string_view tag) {
+  forEachElement([&](uint16_t id, std::string_view /*enumName*/, std::string_view tag) {
     if (paths::isLike(paths::withoutBlanks(tag), shorter))
     {
       ids.push_back(id);
@@ -140,7 +161,7 @@ std::string_view nearestTag(std::string_view name, dictionary::OwnNames own) noe
   {
     consider(entry.tag);
   }
-  forEachElement(anyMayBe, [&](uint16_t, std::string_view, std::string_view tag) { consider(tag); });
+  forEachElement([&](uint16_t, std::string_view, std::string_view tag) { consider(tag); });
   return nearest;
 }
 

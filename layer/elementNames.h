@@ -4,6 +4,7 @@
 #pragma once
 
 #include <cstdint>
+#include <optional>
 #include <string_view>
 #include <vector>
 
@@ -18,6 +19,9 @@ std::string_view elementName(uint16_t id) noexcept;
 
 /// The ids that bear a name, ascending: several elements can share a tag. Empty when no element has it.
 std::vector<uint16_t> idsNamed(std::string_view name, dictionary::OwnNames own = {});
+
+/// The id of the one element that has this tag and that nothing else is called; nothing where there are others or none.
+std::optional<uint16_t> onlyTagged(std::string_view tag) noexcept;
 
 /// The ids whose tags a pattern describes, ascending; those of elements that only end a group where there is no other.
 std::vector<uint16_t> idsLike(std::string_view pattern, dictionary::OwnNames own = {});

@@ -2,9 +2,11 @@
 #include <algorithm>
 #include <optional>
 #include <span>
+#include <string_view>
 #include <vector>
 
 #include "layer/pathTree.h"
+#include "layer/plainPath.h"
 #include "tav/cpp/path.hpp"
 #include "tav/path/matcher.hpp"
 
@@ -27,6 +29,12 @@ bool looksEverywhere(const paths::Compiled& path) noexcept
     return std::any_of(route.steps.begin(), route.steps.end(),
                        [](const paths::Step& step) { return step.axis == paths::Axis::descendantOrSelf; });
   });
+}
+
+/// Of a path with one route.
+std::span<const paths::Step> stepsOf(const paths::Compiled& path) noexcept
+{
+  return path.routes[path.main.front()].steps;
 }
 
 class NodeSearch final : public PathSearch
@@ -120,7 +128,7 @@ PathSearch* searchPath(ReaderState& state, const paths::Compiled& path, const No
 bool findStraight(const paths::Compiled& path, const Node& start, Node& found) noexcept
 {
   return path.isStraight && !path.leavesStart &&
-         NodeTree::findStraight(path.routes[path.main.front()].steps, start, found);
+         NodeTree::findStraight(stepsOf(path), start, found);
 }
 
 bool findStraightFromRoot(const paths::Compiled& path, const Node& root, Node& found) noexcept
@@ -129,9 +137,22 @@ bool findStraightFromRoot(const paths::Compiled& path, const Node& root, Node& f
   {
     return false;
   }
-  const std::span<const paths::Step> steps = path.routes[path.main.front()].steps;
+  const std::span<const paths::Step> steps = stepsOf(path);
   return steps.size() > 1 && steps.front().matches(root.elm()) &&
          NodeTree::findStraight(steps.subspan(1), root, found);
+}
+
+bool findStraight(std::string_view path, const Node& start, Node& found) noexcept
+{
+  const paths::PlainPath plain(path);
+  return !plain.steps().empty() && NodeTree::findStraight(plain.steps(), start, found);
+}
+
+bool findStraightFromRoot(std::string_view path, const Node& root, Node& found) noexcept
+{
+  const paths::PlainPath plain(path.substr(path.starts_with('/') ? 1 : 0));
+  return plain.steps().size() > 1 && plain.steps().front().only == root.elm() &&
+         NodeTree::findStraight(plain.steps().subspan(1), root, found);
 }
 
 } // namespace tav::detail

@@ -10,6 +10,8 @@
 #include <system_error>
 #include <vector>
 
+#include "core/bytes.h"
+#include "core/step.h"
 #include "tav/cpp/ranges.hpp"
 #include "tav/path/compare.hpp"
 #include "tav/path/compiled.hpp"
@@ -172,22 +174,29 @@ struct NodeTree
   /// The nodes around one, the place above the roots first and the node last. Without the way to it: the node alone.
   std::vector<Place> lineTo(const Node& node, bool fromAbove);
 
-  /// The first match of the steps of a path of plain names; see detail::findStraight.
-  static bool findStraight(std::span<const paths::Step> steps, const Node& start, Node& found) noexcept
+  /// The first match of the steps of a path of plain names; see detail::findStraight. `Step` has the id as `only`.
+  template<class Step>
+  static bool findStraight(std::span<const Step> steps, const Node& start, Node& found) noexcept
   {
     if (start.state_ == nullptr || !start.state_->isFast)
     {
       return false;
     }
+    using Block = core::BlockBytes<core::HostForm>;
+    TAVHandle& handle = *start.state_->handle;
+    const bool isPlain = core::hasNeverTraced() && Block::canRead(handle);
     TAVHeaderData nodes[2];
     nodes[0].header = start.data_.header;
     size_t current = 0;
-    for (const paths::Step& step : steps)
+    for (const Step& step : steps)
     {
-      TAVHeaderData& parent = nodes[current];
+      TAVHeader& parent = nodes[current].header;
       current ^= 1U;
-      if (!layout::isGroup(parent.header) || tavFindElmInt(start.state_->handle, &parent.header, 0, 0, 0, step.only,
-                                                           nullptr, nullptr, &nodes[current]) != TAV_RC_OK)
+      TAVHeaderData& child = nodes[current];
+      const bool isThere = layout::isGroup(parent) &&
+                           ((isPlain && core::findChild(Block(handle), handle, parent, step.only, child)) ||
+                            tavFindElmInt(&handle, &parent, 0, 0, 0, step.only, nullptr, nullptr, &child) == TAV_RC_OK);
+      if (!isThere)
       {
         return false;
       }

@@ -43,6 +43,9 @@ TAV_API PathSearch* searchPath(ReaderState& state, const paths::Compiled& path, 
 TAV_API bool findStraight(const paths::Compiled& path, const Node& start, Node& found) noexcept;
 /// The same from the stream's first node, whose name comes first.
 TAV_API bool findStraightFromRoot(const paths::Compiled& path, const Node& root, Node& found) noexcept;
+/// The same by the text, which is not kept.
+TAV_API bool findStraight(std::string_view path, const Node& start, Node& found) noexcept;
+TAV_API bool findStraightFromRoot(std::string_view path, const Node& root, Node& found) noexcept;
 
 } // namespace detail
 
@@ -197,13 +200,20 @@ inline std::optional<Node> Node::path(const Path& path) const
 
 inline std::optional<Node> Node::path(std::string_view path, std::error_code& ec) const
 {
+  Node found;
+  if (detail::findStraight(path, *this, found))
+  {
+    ec.clear();
+    return found;
+  }
   const Path parsed(path, ec);
   return ec ? std::nullopt : this->path(parsed, ec);
 }
 
 inline std::optional<Node> Node::path(std::string_view path) const
 {
-  return this->path(Path(path));
+  Node found;
+  return detail::findStraight(path, *this, found) ? std::optional(found) : this->path(Path(path));
 }
 
 } // namespace tav

@@ -139,22 +139,28 @@ public:
   /// See tav/path/path.hpp.
   [[nodiscard]] std::optional<Node> path(std::string_view path) const&
   {
-    return this->path(Path(path, "searching"));
+    const std::optional<Node> node = findStraight(path);
+    return node ? node : this->path(Path(path, "searching"));
   }
   [[nodiscard]] std::optional<Node> path(std::string_view path, std::error_code& ec) const&
   {
+    if (std::optional<Node> node = findStraight(path))
+    {
+      ec.clear();
+      return node;
+    }
     const Path parsed(path, ec);
     return ec ? std::nullopt : this->path(parsed, ec);
   }
   [[nodiscard]] std::optional<Node> path(const Path& path) const&
   {
-    std::optional<Node> node = findStraight(path);
+    std::optional<Node> node = findStraight(path.compiled());
     return node ? node : detail::firstOf(find(path));
   }
   [[nodiscard]] std::optional<Node> path(const Path& path, std::error_code& ec) const&
   {
     ec.clear();
-    std::optional<Node> node = findStraight(path);
+    std::optional<Node> node = findStraight(path.compiled());
     return node ? node : detail::firstOf(find(path, ec));
   }
   std::optional<Node> path(std::string_view path) const&& = delete;
@@ -394,13 +400,14 @@ private:
     return rc == TAV_RC_NOT_FOUND ? TAV_RC_OK : rc;
   }
 
-  /// As detail::findStraight, from the stream's first node on.
-  [[nodiscard]] std::optional<Node> findStraight(const Path& path) const noexcept
+  /// As detail::findStraight, from the stream's first node on, by a path's text or what it was compiled to.
+  template<class AnyPath>
+  [[nodiscard]] std::optional<Node> findStraight(const AnyPath& path) const noexcept
   {
     Node root;
     Node found;
     const bool isFound = state_ != nullptr && state_->isFast && readRoot(root) == TAV_RC_OK &&
-                         detail::findStraightFromRoot(path.compiled(), root, found);
+                         detail::findStraightFromRoot(path, root, found);
     return isFound ? std::optional(found) : std::nullopt;
   }
 

@@ -5,6 +5,8 @@
 
 #include <algorithm>
 #include <cstdint>
+#include <map>
+#include <optional>
 #include <string_view>
 #include <vector>
 
@@ -39,6 +41,47 @@ TEST(ElementNames, EveryNameOfAnEntryLeadsToItsId)
       const std::vector<uint16_t> ids = tav::detail::idsNamed(name);
       ASSERT_TRUE(std::binary_search(ids.begin(), ids.end(), entry.id)) << name;
     }
+  }
+}
+
+/// All names, each with the ids that bear it, found by a look at every entry.
+std::map<std::string_view, std::vector<uint16_t>> idsByName()
+{
+  std::map<std::string_view, std::vector<uint16_t>> ids;
+  for (const Entry& entry : tav::dictionary::entries())
+  {
+    if (tav::detail::paths::isElement(entry))
+    {
+      for (const std::string_view name : tav::detail::paths::namesOf(entry))
+      {
+        ids[name].push_back(entry.id);
+      }
+    }
+  }
+  for (auto& [name, found] : ids)
+  {
+    tav::detail::paths::putInOrder(found);
+  }
+  return ids;
+}
+
+TEST(ElementNames, NameLeadsToAllThatBearItAndToNothingElse)
+{
+  for (const auto& [name, ids] : idsByName())
+  {
+    ASSERT_EQ(tav::detail::idsNamed(name), ids) << name;
+    const std::optional<uint16_t> only = tav::detail::onlyTagged(name);
+    const auto bears = [name](const Entry& entry) {
+      return entry.tag == name || tav::detail::paths::withoutBlanks(entry.tag) == name;
+    };
+    const auto& all = tav::dictionary::entries();
+    const bool isTag = ids.size() == 1 && std::any_of(all.begin(), all.end(), bears);
+    ASSERT_EQ(only, isTag ? std::optional(ids.front()) : std::nullopt) << name;
+  }
+  for (const std::string_view name : {"", " ", "hostNam", "hostname", "host Name", "SQLM_ELM_", "SQLM_", "TAV_"})
+  {
+    ASSERT_EQ(tav::detail::idsNamed(name), std::vector<uint16_t>()) << name;
+    ASSERT_EQ(tav::detail::onlyTagged(name), std::nullopt) << name;
   }
 }
 

@@ -1,7 +1,12 @@
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <system_error>
 #include <utility>
 #include <vector>
 
 #include "cpp/layer.h"
+#include "tav/path/names.hpp"
 
 using namespace test;
 
@@ -226,4 +231,70 @@ TEST_F(LayerPath, MatchIsTheSameAfterTheHandleWasGivenAway)
   ASSERT_NE(reader.handle(), nullptr);
   EXPECT_EQ(reader.root().path("host/os/osName")->offset(), before);
   EXPECT_EQ(first("system/host/hostName"), "a");
+}
+
+namespace
+{
+
+/// What a text leads to when it is compiled first, as a code or an offset.
+template<class From, class Path>
+std::pair<uint32_t, uint64_t> reached(const From& from, const Path& path)
+{
+  std::error_code ec = std::make_error_code(std::errc::interrupted);
+  const std::optional<tav::Node> node = from.path(path, ec);
+  return {tav::codeOf(ec), node ? node->offset() : ~uint64_t{0}};
+}
+
+template<class From>
+std::pair<uint32_t, uint64_t> reachedCompiled(const From& from, const std::string& text)
+{
+  std::error_code ec;
+  const tav::Path path(text, ec);
+  return ec ? std::pair(tav::codeOf(ec), ~uint64_t{0}) : reached(from, path);
+}
+
+/// Texts that are read without being compiled, and such that look like them.
+std::vector<std::string> plainTexts()
+{
+  const std::string seven = "60101/60102/60103/60104/60105/60106/60107/";
+  return {"host", "host/hostName", "#60102/#60103", "60102/60103", "host/60103", "host/os/osName", "60105",
+          "060102", "host/hostName[1]", " host/hostName", "host/ hostName", "host//hostName", "/host", "host/",
+          "", "/", "#", "#host", "60102x", "65536", "99999999",
+          "65000", "65001", "endHdrEyeSize", "*", "**/hostName", "host/.", "host/..",
+          "hst", "host-name", "TAV_ELM_CMN_HOST/hostName", "TAV_ELM_CMN_HOST ", "invalid_element", "INVALID_ELEMENT",
+          "db_conn_time", "host|system", "system/host", "/system/host/hostName", "system", "system/60105", "//system",
+          seven + seven + "1", seven + seven + "1/2", seven + seven + "1/2/3"};
+}
+
+} // namespace
+
+TEST_F(LayerPath, TextLeadsWhereThePathThatIsMadeOfItLeads)
+{
+  const tav::Node root = reader.root();
+  for (const std::string& text : plainTexts())
+  {
+    EXPECT_EQ(reached(root, text), reachedCompiled(root, text)) << text;
+    EXPECT_EQ(reached(reader, text), reachedCompiled(reader, text)) << text;
+  }
+}
+
+TEST_F(LayerPath, EveryTagIsFoundByItsText)
+{
+  for (const tav::dictionary::Entry& entry : tav::dictionary::entries())
+  {
+    if (!tav::detail::paths::isElement(entry) || tav::layout::isEndElement(entry.id))
+    {
+      continue;
+    }
+    tav::Writer writer;
+    {
+      tav::Group system = writer.group(TAV_ELM_CMN_SYSTEM);
+      system.add(60105, "e");
+      system.add(static_cast<uint16_t>(entry.id), uint32_t{1});
+    }
+    writer.finish();
+    const tav::Reader one(writer.bytes());
+    const tav::Node root = one.root();
+    EXPECT_EQ(reached(root, entry.tag), reachedCompiled(root, std::string(entry.tag))) << entry.tag;
+  }
 }
