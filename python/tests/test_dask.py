@@ -15,17 +15,21 @@ import tav
 
 pytest.importorskip("dask.dataframe")
 distributed = pytest.importorskip("distributed")
+import dask  # noqa: E402  (behind the question whether it is there)
 import tav.dask  # noqa: E402  (behind what it needs)
 
 COLUMNS = {"name": "hostName", "cpus": "cpuOnline", "signed": "#1001"}
 EACH = "/system/host"
+PATIENCE = 600  # ends what hangs
 
 
 @pytest.fixture(scope="module")
 def cluster():
-    with distributed.LocalCluster(n_workers=2, threads_per_worker=1, processes=True, host="127.0.0.1",
-                                  dashboard_address=None) as made, distributed.Client(made) as client:
-        yield client
+    patient = dask.config.set({"distributed.comm.timeouts.connect": PATIENCE})  # a busy machine starts processes slowly
+    with patient, distributed.LocalCluster(n_workers=2, threads_per_worker=1, processes=True, host="127.0.0.1",
+                                           dashboard_address=None) as made:
+        with distributed.Client(made, timeout=PATIENCE) as client:
+            yield client
 
 
 def make(path, hosts: int, roots: int = 1, forge: bool = False) -> None:
@@ -121,14 +125,26 @@ def test_a_worker_that_is_killed_takes_no_rows_away(cluster, tmp_path):
     path = tmp_path / "day.tav"
     make(path, 4000)
     frame = tav.dask.read_table(path, EACH, COLUMNS, blocksize=path.stat().st_size // 40)
-    slow = frame.map_partitions(lambda part: (time.sleep(0.05), part)[1], meta=frame._meta)
-    future = cluster.compute(slow)
-    time.sleep(0.6)
-    victim = next(iter(cluster.run(os.getpid).values()))
+    begun, go = tmp_path / "begun", tmp_path / "go"
+    begun.mkdir()
+
+    def held(part):
+        """The part, when it may go on."""
+        (begun / str(os.getpid())).touch()
+        while not go.exists():
+            time.sleep(0.005)
+        return part
+
+    future = cluster.compute(frame.map_partitions(held, meta=frame._meta))
+    deadline = time.monotonic() + PATIENCE
+    while not (at_work := list(begun.iterdir())):
+        assert time.monotonic() < deadline
+        time.sleep(0.005)
     assert not future.done()
-    os.kill(victim, signal.SIGKILL)
+    os.kill(int(at_work[0].name), signal.SIGKILL)
+    go.touch()
     expected = tav.read_table(path, each=EACH, columns=COLUMNS)
-    pd.testing.assert_frame_equal(future.result(timeout=120).reset_index(drop=True), expected)
+    pd.testing.assert_frame_equal(future.result(timeout=PATIENCE).reset_index(drop=True), expected)
 
 
 def test_a_type_that_only_later_rows_have_is_told(tmp_path, monkeypatch):

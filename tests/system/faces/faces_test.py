@@ -13,7 +13,7 @@ import unittest
 import xml.etree.ElementTree
 
 sys.path.insert(0, str(pathlib.Path(__file__).resolve().parent.parent / "tools"))
-from support import tav  # noqa: E402  (behind the path that leads to it)
+from support import PATIENCE, tav, until  # noqa: E402  (behind the path that leads to it)
 
 FACE = os.environ["TAV_LAYER_FACE"]
 SEEDS = range(1, 9)
@@ -22,7 +22,7 @@ PLACES = ("", "[1]", "[2]")
 
 
 def layer(*arguments, stdin=None):
-    done = subprocess.run([FACE, *map(str, arguments)], input=stdin, capture_output=True, timeout=60)
+    done = subprocess.run([FACE, *map(str, arguments)], input=stdin, capture_output=True, timeout=PATIENCE)
     if done.returncode != 0:
         raise AssertionError(done.stderr.decode())
     return done.stdout
@@ -86,7 +86,7 @@ class Faces(unittest.TestCase):
             ended = "[not(self::endHdrEyeSize)]"
             expression = "concat(" + ",' ',".join(f"count({every[i][1]})" for i in chosen) + ")"
             counts = subprocess.run(["xmllint", "--xpath", expression.replace("*", "*" + ended), str(made)],
-                                    capture_output=True, check=True, text=True, timeout=60).stdout.split()
+                                    capture_output=True, check=True, text=True, timeout=PATIENCE).stdout.split()
             for i, count in zip(chosen, counts):
                 self.assertEqual(len(lines[i].split()), int(float(count)), f"seed {seed}, {every[i]}")
                 met += count != "0"
@@ -108,10 +108,16 @@ class Faces(unittest.TestCase):
 
     @unittest.skipIf(sys.platform == "win32", "processes end otherwise there")
     def test_a_file_that_a_killed_writer_overwrites_is_whole(self):
+        def state():
+            found = self.file.stat()
+            return found.st_ino, found.st_mtime_ns
         layer("tree", self.file, 1)
         for kill in range(30):
+            before = state()
             with subprocess.Popen([FACE, "overwrite", str(self.file)], stderr=subprocess.PIPE) as writer:
-                time.sleep(0.01 + 0.003 * kill)
+                if kill % 2 == 1:
+                    self.assertTrue(until(lambda: state() != before or writer.poll() is not None))
+                time.sleep(0.003 * kill)  # at another moment each time, whatever it is doing then
                 writer.kill()
                 writer.wait()
                 self.assertEqual(writer.stderr.read(), b"")

@@ -13,7 +13,7 @@ NAMED = {"GIT_AUTHOR_NAME": "a", "GIT_AUTHOR_EMAIL": "a@b", "GIT_COMMITTER_NAME"
 
 
 def run(folder, *command):
-    return subprocess.run(command, cwd=folder, capture_output=True, text=True, timeout=120, env={**os.environ, **NAMED})
+    return subprocess.run(command, cwd=folder, capture_output=True, text=True, timeout=600, env={**os.environ, **NAMED})
 
 
 @unittest.skipUnless(shutil.which("git"), "a history needs git")

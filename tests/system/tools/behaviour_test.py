@@ -1,5 +1,6 @@
 """Exit statuses, standard error, pipes, devices, output files and interrupts."""
 import os
+import random
 import shutil
 import signal
 import struct
@@ -40,7 +41,7 @@ class Behaviour(ToolTest):
                 self.assertTrue(result.err.startswith(f"tav: {path}: "), result.err)
 
     def test_what_is_no_stream_is_status_3(self):
-        for content in (b"", b"x", bytes(1000), b"The quick brown fox jumps over the lazy dog. " * 20, os.urandom(4096)):
+        for content in (b"", b"x", bytes(1000), b"The quick brown fox jumps over the lazy dog. " * 20, random.Random(1).randbytes(4096)):
             path = self.folder / "no.tav"
             path.write_bytes(content)
             for command in ("info", "tree", "print"):

@@ -8,7 +8,7 @@ import subprocess
 import unittest
 import xml.etree.ElementTree as ElementTree
 
-from support import BIG_ENDIAN, EMULATOR, ToolTest, tav
+from support import BIG_ENDIAN, EMULATOR, PATIENCE, ToolTest, tav
 
 STAMPS = [*EMULATOR, os.environ.get("TAV_STAMPS", "")]
 TIMESTAMP = 1005
@@ -56,7 +56,7 @@ class Time(ToolTest):
         moments = [0, 1, 999, 1000, 123456, 999999, 1000000, 1709202600123456, 253402300799999999]
         moments += [rng.randrange(253402300800000000) for _ in range(100)]
         path = self.folder / "t.tav"
-        subprocess.run([*STAMPS, str(path), *map(str, moments)], check=True, timeout=60)
+        subprocess.run([*STAMPS, str(path), *map(str, moments)], check=True, timeout=PATIENCE)
         for command, values in self.shown(path).items():
             with self.subTest(command=command):
                 self.assertEqual(values, [iso(moment) for moment in moments])
