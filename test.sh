@@ -327,7 +327,7 @@ count_python()
 check_sql()
 {
   build release -DTAV_BUILD_DUCKDB=ON --target tav_duckdb tav_tool tav_generate
-  npm --prefix duckdb install --no-save --ignore-scripts --no-audit --no-fund --silent >"$work/npm.log" 2>&1 ||
+  npm --prefix duckdb ci --ignore-scripts --no-audit --no-fund --silent >"$work/npm.log" 2>&1 ||
     { cat "$work/npm.log"; return 1; }
   node --test --test-reporter=tap duckdb/tests/*.test.mjs >"$work/tests.log" ||
     { grep -A 40 -E '^ *not ok' "$work/tests.log"; return 1; }
