@@ -1,10 +1,12 @@
 // tav table: a row for each node that a path leads to.
 #include <algorithm>
+#include <functional>
 #include <optional>
 #include <set>
 
 #include "tav/inspect.hpp"
 #include "tav/path/compiled.hpp"
+#include "tools/cmd/tableParquet.h"
 #include "tools/cmd/tableRates.h"
 #include "tools/cmd/tableRows.h"
 #include "tools/shell/dictionary.h"
@@ -69,47 +71,6 @@ std::vector<NamedText> labelsOf(const Invocation& invocation)
   return labels;
 }
 
-/// A text as SQL has it.
-std::string quotedForSql(const std::string& text)
-{
-  std::string quoted = "'";
-  for (const char c : text)
-  {
-    quoted += c == '\'' ? "''" : std::string(1, c);
-  }
-  return quoted + "'";
-}
-
-/// The statement by which DuckDB writes the same table as Parquet.
-std::string parquetStatement(const Invocation& invocation)
-{
-  const auto listed = [](const std::vector<std::string>& items) {
-    std::string list;
-    for (const std::string& item : items)
-    {
-      list += (list.empty() ? "" : ", ") + item;
-    }
-    return list;
-  };
-  std::vector<std::string> files;
-  for (const std::string& file : invocation.arguments())
-  {
-    files.push_back(quotedForSql(file));
-  }
-  std::vector<std::string> columns;
-  for (const TableColumn& column : columnsOf(invocation))
-  {
-    columns.push_back(quotedForSql(column.name) + ": " + quotedForSql(column.path));
-  }
-  const std::string join = invocation.has("--join") ? ", join := " + quotedForSql(invocation.text("--join")) : "";
-  const std::string file = invocation.has("--file") ? ", filename := true" : "";
-  const std::string damage = invocation.text("--on-damage", "stop") == "skip" ? ", on_damage := 'skip'" : "";
-  const std::string out = invocation.text("--output", "-");
-  return "COPY (FROM read_tav_table([" + listed(files) + "], each := " + quotedForSql(invocation.text("--each")) +
-         ", columns := {" + listed(columns) + "}" + join + file + damage + ")) TO " +
-         quotedForSql(out == "-" ? "table.parquet" : out) + " (FORMAT parquet)";
-}
-
 class Tabler
 {
 public:
@@ -129,6 +90,12 @@ public:
 
   Status run()
   {
+    return invocation_.text("--format") == "parquet" ? runParquet() : runText();
+  }
+
+private:
+  Status runText()
+  {
     Output out(invocation_.text("--output", "-"), invocation_.has("--force"));
     const auto writer = makeRowWriter(invocation_, out);
     writer->begin(columns_);
@@ -142,7 +109,51 @@ public:
     return rows_ == 0 ? std::max(status, kFindings) : status;
   }
 
-private:
+  /// The engine tells of damage in its own words, and not of what is passed over: so the files are read here first.
+  Status runParquet()
+  {
+    const ParquetEngine engine;
+    Output out(invocation_.text("--output", "-"), invocation_.has("--force"));
+    ParquetTable table{.each = invocation_.text("--each"), .columns = query_.columns()};
+    for (const NamedText& label : labels_)
+    {
+      table.labels.emplace_back(label.name, label.text);
+    }
+    Status status = kFine;
+    for (const std::string& name : invocation_.arguments())
+    {
+      const Status one = readFile(name, [](const Table&) {});
+      status = std::max(status, one);
+      if (one < kTrouble)
+      {
+        addTo(table, name);
+      }
+    }
+    if (stopped_)
+    {
+      throw Failure(status, {.sentence = "table: nothing is written, since Parquet is all rows or none",
+                             .hint = "'--on-damage skip' goes on behind the damage"});
+    }
+    if (!table.files.empty())
+    {
+      engine.write(table, invocation_, out);
+      out.commit();
+    }
+    return rows_ == 0 ? std::max(status, kFindings) : status;
+  }
+
+  /// A file that the engine is to read, too.
+  void addTo(ParquetTable& table, const std::string& name) const
+  {
+    if (!table.files.empty() && table.dictionary != dictionary_)
+    {
+      throw Failure("table: own elements have other names in '" + shown(name, stderr) + "' than in the files before",
+                    "--dictionary says what they are called in all");
+    }
+    table.files.push_back(name);
+    table.dictionary = dictionary_;
+  }
+
   static std::optional<std::string> joinerOf(const Invocation& invocation)
   {
     return invocation.has("--join") ? std::optional(invocation.text("--join")) : std::nullopt;
@@ -163,8 +174,7 @@ private:
     }
     if (format == "parquet")
     {
-      throw Failure("table: Parquet is written by DuckDB with the extension 'tav', which docs/sql.md tells how to get",
-                    "there it is: " + shown(parquetStatement(invocation_), stderr));
+      checkParquet(invocation_);
     }
     if (format == "openmetrics" && invocation_.has("--rate"))
     {
@@ -246,11 +256,16 @@ private:
 
   Status readFile(const std::string& name, RowWriter& writer)
   {
+    OutRow row = beginRow(name);
+    return readFile(name, [&](const Table& rows) { writeRows(rows, row, writer); });
+  }
+
+  Status readFile(const std::string& name, const std::function<void(const Table&)>& take)
+  {
     return forFile(invocation_, name, [&](Stream& stream, DamageNotices& notices) {
       useNamesOf(stream.bytes().dictionary());
       const unsigned jobs = jobsOf(invocation_);
       Progress progress("table " + stream.source->name(), stream.bytes());
-      OutRow row = beginRow(name);
       const auto stopped =
           readTable(stream.bytes(), stream.form(), query_,
                     {.onDamage = onDamage_,
@@ -258,10 +273,14 @@ private:
                      .threads = jobs,
                      .batchRows = 4096,
                      .progress = [&](uint64_t offset) { jobs > 1 ? progress.reach(offset) : void(); }},
-                    [&](const Table& rows) { writeRows(rows, row, writer); });
+                    [&](const Table& rows) {
+                      take(rows);
+                      rows_ += rows.rows();
+                    });
       if (stopped)
       {
         report(*stopped);
+        stopped_ = true;
       }
       return stopped ? kFindings : kFine;
     });
@@ -305,7 +324,6 @@ private:
       rates_ ? rates_->apply(row) : void();
       writer.row(row);
     }
-    rows_ += rows.rows();
   }
 
   const Invocation& invocation_;
@@ -316,6 +334,7 @@ private:
   std::vector<OutColumn> columns_{};
   std::optional<Rates> rates_{};
   uint64_t rows_ = 0;
+  bool stopped_ = false; ///< at damage, in one of the files
 };
 
 int run(const Invocation& invocation)
@@ -343,6 +362,9 @@ const Registration registration{{
         "names, and own elements that a dictionary file calls counters.\n\n"
         "--format openmetrics makes a page of metrics of one snapshot: numbers are samples, gauges or counters, and\n"
         "the texts of a row its labels, which no two rows may share.\n\n"
+        "--format parquet has DuckDB read the files with the extension 'tav', after they were read here. Its program\n"
+        "is 'duckdb' on PATH, or what TAV_DUCKDB names; the extension is the one that is installed there, or the file\n"
+        "that TAV_DUCKDB_EXTENSION names. At damage nothing is written then, unless it is skipped.\n\n"
         "At damage a file ends with its rows so far, those whose nodes had ended; --on-damage skip goes on behind it.\n"
         "Both are told on standard error with exit status 1, as it is when there is no row, but for the header. A\n"
         "file that cannot be read, or is no stream, is told, and the next one is read; the exit status is the highest\n"
@@ -377,7 +399,7 @@ const Registration registration{{
                 {.names = "--format",
                  .kind = ValueKind::choice,
                  .value = "FORMAT",
-                 .help = "what is written: csv unless given; for parquet, what DuckDB is to be told",
+                 .help = "what is written: csv unless given; parquet by DuckDB, if that is installed",
                  .choices = {"csv", "tsv", "jsonl", "openmetrics", "parquet"}},
                 {.names = "--crlf", .help = "end lines with CR LF"},
                 {.names = "--on-damage",

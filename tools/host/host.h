@@ -32,6 +32,9 @@ inline std::string textOf(const std::filesystem::path& path)
 /// The paths that a variable of the environment lists, as PATH does; none when it is not set.
 std::vector<std::string> pathList(const char* variable);
 
+/// Where the folders that PATH lists have a program of this name; empty when none has.
+std::string findProgram(const std::string& name);
+
 /// The parts of a text between separators, without empty ones.
 inline std::vector<std::string> separated(const std::string& text, char separator)
 {

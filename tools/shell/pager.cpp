@@ -1,29 +1,11 @@
 #include "tools/shell/pager.h"
 
-#include <algorithm>
 #include <cstdlib>
-#include <filesystem>
-#include <system_error>
-#include <vector>
 
 #include "tools/host/host.h"
 
 namespace tav::tool
 {
-
-namespace
-{
-
-bool isInstalled(const std::string& program)
-{
-  const std::vector<std::string> folders = host::pathList("PATH");
-  return std::any_of(folders.begin(), folders.end(), [&](const std::string& folder) {
-    std::error_code error;
-    return std::filesystem::exists(host::pathOf(folder) / program, error);
-  });
-}
-
-} // namespace
 
 std::string pagerCommand()
 {
@@ -33,8 +15,8 @@ std::string pagerCommand()
   {
     return {};
   }
-  const std::string command = wanted != nullptr ? wanted : isInstalled("less") ? "less"
-                                                                               : "";
+  const std::string usual = host::findProgram("less").empty() ? "" : "less";
+  const std::string command = wanted != nullptr ? wanted : usual;
   return command == "cat" ? std::string() : command;
 }
 

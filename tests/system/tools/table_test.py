@@ -12,7 +12,7 @@ from xml.etree import ElementTree
 
 from damage_test import KINDS, SOUND, STREAM, group, header, number, overwritten, host, system
 from json_test import GOLDEN, Folder, golden_bytes
-from support import EMULATOR, TAV, tav, tav_in_little_memory, until
+from support import EMULATOR, TAV, WINDOWS, tav, tav_in_little_memory, until
 
 HOSTS = ("--each", "/system/host", "--col", "n=#60111")
 FORMS = ((), ("--byte-order", "big"), ("--byte-order", "little", "--align"), ("--root", "32"), ("--eye-size",))
@@ -272,7 +272,7 @@ class Statuses(Table):
     def test_wrong_usage(self):
         path = self.file(STREAM)
         for arguments in (("--col", "x"), ("--each", "/system"), ("--each", "/system", "--col", "a["),
-                          ("--each", "/[", "--col", "host"), (*HOSTS, "--format", "parquet"), (*HOSTS, "--format", "xls"),
+                          ("--each", "/[", "--col", "host"), (*HOSTS, "--format", "xls"),
                           (*HOSTS, "--on-damage", "hope"), (*HOSTS, "--label", "x"), (*HOSTS, "--label", "a b=x"),
                           (*HOSTS, "--col", "n=host"), (*HOSTS, "--file", "--label", "file=x"), (*HOSTS, "--rate"),
                           (*HOSTS, "--counter", "m", "--rate"), (*HOSTS, "--crlf", "--format", "jsonl"),
@@ -382,6 +382,65 @@ print(json.dumps([[f.name, f.type, f.unit, f.documentation, [[s.name, s.labels, 
 
 
 @unittest.skipIf(EMULATOR, "an emulator is slow to begin")
+@unittest.skipIf(WINDOWS or EMULATOR, "the engine is started on systems that name open files")
+class Parquet(Table):
+    """What becomes of it without the engine, and with one that does not do what it should; with it: duckdb/tests."""
+
+    def parquet(self, engine, *arguments, status=2):
+        env = {**os.environ, "TAV_DUCKDB": str(engine), "TAV_DUCKDB_EXTENSION": "x"}
+        path = self.folder / "a.tav"
+        path.write_bytes(STREAM)
+        out = self.folder / "out.parquet"
+        result = self.table(path, *HOSTS, *arguments, "--format", "parquet", "-o", out, status=status, env=env)
+        self.assertEqual(sorted(os.listdir(self.folder)), sorted({"a.tav", "engine"} & set(os.listdir(self.folder))))
+        return result
+
+    def engine(self, script):
+        path = self.folder / "engine"
+        path.write_text("#!/bin/sh\n" + script)
+        path.chmod(0o755)
+        return path
+
+    def test_without_the_engine(self):
+        for engine in ("", "no-program-has-this-name"):
+            self.assertIn("'duckdb' is not there", self.parquet(engine).err)
+        self.assertIn("KOR_RC_NO_SUCH_FILE", self.parquet(self.folder / "none").err)
+        self.assertIn("the extension is not there", self.parquet(self.engine("exit 1")).err)
+
+    def test_an_engine_that_fails(self):
+        begin = "statement=$(cat)\ncase $statement in *COPY*) ;; *) exit 0 ;; esac\n"
+        for script, told in (("exit 0", "without a table"), ("printf PAR1xyz >&3", "without a table"),
+                             ("printf xyzPAR1 >&3", "without a table"), ("printf PAR1 >&3", "without a table"),
+                             ("printf PAR1abcdPAR1 >&3; exit 5", "status 5"),
+                             ("printf PAR1abcdPAR1 >&3; kill -9 $$", "status 137"), ("echo PAR1abcdPAR1; exit 0", "without a table")):
+            with self.subTest(script=script):
+                self.assertIn(told, self.parquet(self.engine(begin + script)).err)
+
+    def test_what_it_is_asked_for(self):
+        """A statement of one line, file numbers 3 and 4, and no signal that this program ignores."""
+        script = f"cat > {self.folder}/asked; printf PAR1; printf PAR1abcdPAR1 >&3; grep SigIgn /proc/self/status > {self.folder}/signals"
+        env = {**os.environ, "TAV_DUCKDB": str(self.engine(script)), "TAV_DUCKDB_EXTENSION": "a'\\b\n"}
+        path = self.folder / "a.tav"
+        path.write_bytes(STREAM)
+        names = self.folder / "names.json"
+        names.write_text('{"40001": {"tag": "own"}}')
+        result = self.table(path, *HOSTS, "--format", "parquet", "--dictionary", names, env=env)
+        self.assertEqual(result.out, "PAR1abcdPAR1")
+        asked = (self.folder / "asked").read_text().splitlines()
+        self.assertEqual(asked[0], r"LOAD E'a''\\b\x0a';")
+        self.assertEqual(asked[1:], [
+            f"SET threads = 1; COPY (SELECT c0 AS \"n\" FROM read_tav_table([E'{path}'], each := E'/system/host', "
+            "columns := {'c0': E'#60111'}, dictionary := '/dev/fd/4')) TO '/dev/fd/3' (FORMAT parquet, USE_TMP_FILE false);"])
+        if os.path.exists("/proc/self/status"):
+            ignored = int((self.folder / "signals").read_text().split()[1], 16)
+            self.assertEqual(ignored & (1 << 12 | 1 << 24), 0)  # SIGPIPE, SIGXFSZ
+
+    def test_what_does_not_go_with_it(self):
+        for arguments in (("-",), ("/dev/null",), ("--rate", "--counter", "n"), ("--from", "8"), ("--crlf",)):
+            with self.subTest(arguments=arguments):
+                self.parquet(self.engine("exit 0"), *arguments)
+
+
 class Growing(Table):
     def test_what_is_there_is_read(self):
         path = self.folder / "g.tav"
