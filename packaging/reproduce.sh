@@ -1,37 +1,68 @@
 #!/usr/bin/env bash
-# Builds artefacts twice and compares them byte by byte: in folders of different names, at different times, with other
-# time zones, languages, rights of new files and homes.
+# Builds artefacts twice and compares them byte by byte: in folders of different names and lengths, whose files were made
+# in another order, on another day, with other time zones, languages, rights of new files and homes, and without a
+# compiler's cache, which would hand out the first build's objects as the second's.
 #   packaging/reproduce.sh [PART...]        parts: as packaging/build.sh has them
 # Where they differ it says how, by diffoscope if that is there.
+#   REPRODUCE_KEEP=FOLDER   both builds' artefacts stay in FOLDER/first and FOLDER/second
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")/.."
 
 work=$(mktemp -d)
-trap 'rm -rf "$work"' EXIT
-mkdir -p "$work/one" "$work/another folder/below"
-git archive HEAD | tar -x -C "$work/one"
-git archive HEAD | tar -x -C "$work/another folder/below"
+# Where that is memory, a folder lists what was made last first, and so in another order than the first build's does.
+elsewhere=$work
+if (($(df --output=avail -k /dev/shm 2>/dev/null | tail -n 1 || echo 0) > 4 * 1024 * 1024)); then elsewhere=$(mktemp -d /dev/shm/reproduce.XXXXXX); fi
+trap 'rm -rf "$work" "$elsewhere"' EXIT
+kept=$work
+if [[ -n ${REPRODUCE_KEEP:-} ]]; then
+  mkdir -p "$REPRODUCE_KEEP"
+  kept=$(cd "$REPRODUCE_KEEP" && pwd)
+fi
+first=$work/one
+second="$elsewhere/another folder/below"
 
-(cd "$work/one" && umask 022 && env -u SOURCE_DATE_EPOCH TZ=UTC LC_ALL=C.UTF-8 HOME="$work" packaging/build.sh "$work/first" "$@")
-sleep 2 # another second in every time stamp
-find "$work/another folder" -exec touch {} +
-(cd "$work/another folder/below" && umask 077 && env -u SOURCE_DATE_EPOCH TZ=Asia/Kolkata LC_ALL=POSIX HOME=/ packaging/build.sh "$work/second" "$@")
+# made_of FOLDER ORDER...: the tree as committed, its files made in the order that the words sort them.
+made_of()
+{
+  local folder=$1
+  shift
+  mkdir -p "$folder"
+  git archive HEAD >"$work/tree.tar"
+  tar -tf "$work/tree.tar" | grep -v '/$' | LC_ALL=C "$@" >"$work/names"
+  mkdir -p "$work/plain"
+  tar -xf "$work/tree.tar" -C "$work/plain"
+  tar -C "$work/plain" --no-recursion -cf - -T "$work/names" | tar -x -C "$folder"
+  rm -rf "$work/plain"
+}
+made_of "$first" sort
+made_of "$second" sort -r
+chmod -R go-rwx "$second" # as a checkout with this umask would have it
+
+# Another day as well, if there is a clock that can be set: what a build is told of the time then differs in every part.
+cmake/install-packages.sh reproduce
+later=(faketime -f '+400d')
+without=(env -u SOURCE_DATE_EPOCH -u CMAKE_CXX_COMPILER_LAUNCHER -u CMAKE_C_COMPILER_LAUNCHER CCACHE_DISABLE=1)
+
+(cd "$first" && umask 022 && "${without[@]}" TZ=UTC LC_ALL=C.UTF-8 HOME="$work" packaging/build.sh "$kept/first" "$@")
+(cd "$second" && umask 077 && "${without[@]}" TZ=Asia/Kolkata LC_ALL=POSIX HOME="$elsewhere" "${later[@]}" packaging/build.sh "$kept/second" "$@")
 
 status=0
 count=0
-for file in "$work"/first/*; do
+for file in "$kept"/first/*; do
   name=$(basename "$file")
   count=$((count + 1))
-  if cmp -s "$file" "$work/second/$name"; then
+  if cmp -s "$file" "$kept/second/$name"; then
     echo "same bytes: $name"
   else
     status=1
     echo "DIFFERENT: $name"
-    if command -v diffoscope >/dev/null; then diffoscope --max-report-size 20000 "$file" "$work/second/$name" || true; fi
+    if [[ -e $kept/second/$name ]] && command -v diffoscope >/dev/null; then
+      diffoscope --max-report-size 20000 "$file" "$kept/second/$name" || true
+    fi
   fi
 done
-for file in "$work"/second/*; do
-  [[ -e $work/first/$(basename "$file") ]] || { echo "only in the second: $(basename "$file")"; status=1; }
+for file in "$kept"/second/*; do
+  [[ -e $kept/first/$(basename "$file") ]] || { echo "only in the second: $(basename "$file")"; status=1; }
 done
 ((count > 0)) || { echo "nothing was built"; exit 1; }
 exit "$status"
