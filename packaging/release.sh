@@ -14,6 +14,7 @@ refuse() { echo "$0: $*" >&2; exit 1; }
 version=$(cmake/version.sh)
 [[ ! -e $out ]] || refuse "$out exists already"
 [[ -z $key || -r $key ]] || refuse "there is no key $key"
+[[ -z $key ]] || command -v minisign >/dev/null || refuse "nothing can be signed without minisign"
 [[ -z $(git status --porcelain) ]] || refuse "the tree has changes that are in no commit"
 cmake/check-version.sh >&2 || refuse "the version is not the same everywhere"
 grep -qE "^## \[$version\] - [0-9]{4}-[0-9]{2}-[0-9]{2}$" CHANGELOG.md || refuse "CHANGELOG.md has no dated section for $version"
@@ -24,7 +25,7 @@ work=$(mktemp -d)
 trap 'rm -rf "$work"' EXIT
 made=$work/made
 mkdir "$made"
-git archive --format=tar --prefix="tav-$version/" HEAD | gzip -9n >"$made/tav-$version.tar.gz"
+git -c tar.umask=0022 archive --format=tar --prefix="tav-$version/" HEAD | gzip -9n >"$made/tav-$version.tar.gz"
 
 # Built from the archive: what is not in the tree is not in a release.
 tar -xzf "$made/tav-$version.tar.gz" -C "$work"

@@ -3,8 +3,9 @@
 
     sbom.py VERSION FOLDER
 
-What an artefact needs is read out of itself, where its kind says so (packages, wheels). What was compiled or copied into
-one is told by bundled.json, by patterns of names.
+What an artefact needs is read out of itself, where its kind says so (packages, wheels, libraries). What was compiled or
+copied into one is told by bundled.json, by patterns of names: with its version, or with the Debian package that it is
+copied from, whose version is asked for.
 """
 
 import datetime
@@ -39,13 +40,26 @@ def needed(path):
             name = next(name for name in wheel.namelist() if name.endswith(".dist-info/METADATA"))
             lines = wheel.read(name).decode().splitlines()
         return sorted({re.split(r"[ (;<>=!]", line.partition(":")[2].strip())[0] for line in lines if line.startswith("Requires-Dist:")})
+    if path.suffix == ".duckdb_extension":
+        run = subprocess.run(["readelf", "--dynamic", "--wide", path], check=True, capture_output=True, text=True)
+        return sorted(re.findall(r"\(NEEDED\).*\[(.+)\]", run.stdout))
     return []
+
+
+def version_of(part):
+    """As it is told, or of the Debian package without Debian's own revision."""
+    if "package" not in part:
+        return part["version"]
+    query = ["dpkg-query", "--show", "--showformat=${Version}", part["package"]]
+    run = subprocess.run(query, check=True, capture_output=True, text=True)
+    return run.stdout.rpartition("-")[0] or run.stdout
 
 
 def bundled(path):
     """What was compiled or copied into the artefact: dicts of name, version, licence."""
     parts = json.loads((HERE / "bundled.json").read_text(encoding="utf-8"))
-    return [part for pattern, found in parts.items() if re.fullmatch(pattern, path.name) for part in found]
+    found = [part for pattern, parts in parts.items() if re.fullmatch(pattern, path.name) for part in parts]
+    return [{**part, "version": version_of(part)} for part in found]
 
 
 def package(name, identity, version, licence, **more):

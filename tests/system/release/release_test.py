@@ -5,6 +5,7 @@ import os
 import pathlib
 import shutil
 import subprocess
+import sys
 import tempfile
 import unittest
 
@@ -62,6 +63,20 @@ class Refusals(unittest.TestCase):
     def test_a_missing_key(self):
         self.refused("there is no key", "/nowhere/key")
 
+    def test_a_key_that_nothing_could_sign_with(self):
+        """Before anything is built: a release that ends without its signature would have cost its whole time."""
+        key = self.tree.parent / "key"
+        key.write_text("")
+        bare = self.tree.parent / "bare"
+        bare.mkdir()
+        for name in ("bash", "env", "dirname", "sed", "git", "grep", "cat", "head"):
+            (bare / name).symlink_to(shutil.which(name))
+        found = subprocess.run([self.tree / "packaging/release.sh", self.tree.parent / "out", key], cwd=self.tree,
+                               capture_output=True, text=True, timeout=120, env={**os.environ, **NAMED, "PATH": str(bare)})
+        self.assertEqual(found.returncode, 1, found.stderr[-400:])
+        self.assertIn("minisign", found.stderr)
+        self.assertFalse((self.tree.parent / "out").exists())
+
     def test_a_folder_that_is_there(self):
         found = run(self.tree, "packaging/release.sh", self.tree)
         self.assertEqual(found.returncode, 1)
@@ -83,6 +98,26 @@ class Contents(unittest.TestCase):
         for relation in told["relationships"]:
             self.assertIn(relation["spdxElementId"], identities)
             self.assertIn(relation["relatedSpdxElement"], identities)
+
+    @unittest.skipUnless(shutil.which("readelf") and sys.platform == "linux", "no dynamic sections")
+    def test_a_library_is_told_with_what_the_loader_has_to_find_for_it(self):
+        with tempfile.TemporaryDirectory() as name:
+            folder = pathlib.Path(name)
+            shutil.copy(os.path.realpath("/proc/self/exe"), folder / "tav.duckdb_extension")
+            found = subprocess.run([ROOT / "packaging" / "sbom.py", "1.2.3", folder], capture_output=True, text=True)
+            self.assertEqual(found.returncode, 0, found.stderr)
+            told = json.loads((folder / "tav.duckdb_extension.spdx.json").read_text())
+        needed = [relation["relatedSpdxElement"] for relation in told["relationships"]
+                  if relation["relationshipType"] == "DEPENDS_ON"]
+        self.assertTrue(any(name.startswith("SPDXRef-needs-libc.") for name in needed), needed)
+
+    def test_what_is_bundled_has_a_version_or_a_package_that_has_one(self):
+        told = json.loads((ROOT / "packaging" / "bundled.json").read_text())
+        parts = [part for found in told.values() for part in found]
+        self.assertTrue(parts)
+        for part in parts:
+            self.assertEqual(len({"version", "package"} & set(part)), 1, part)
+            self.assertTrue(part["name"] and part["licence"], part)
 
     def test_nothing_to_tell_of_is_a_failure(self):
         with tempfile.TemporaryDirectory() as name:
