@@ -1,4 +1,4 @@
-/// The nodes of a stream by a face of the library, a line a node, for comparison with what was written and with the other
+/// The nodes of a stream by a face of the library, a line a node, for comparison with what was written and with other
 /// faces: offset, bits of the header, payload's bytes, type, element, depth, and the payload of a data element in hex.
 ///   nodes_face operations|layer|c FILE native|swapped 32|64 padded|plain
 #include <bit>
