@@ -26,6 +26,9 @@ if(PROJECT_IS_TOP_LEVEL)
   set(CMAKE_CXX_STANDARD 20)
   set(CMAKE_CXX_STANDARD_REQUIRED ON)
   set(CMAKE_CXX_EXTENSIONS OFF)
+  # Programs find the libraries of the build from where they lie themselves: of an absolute path the length would stay in
+  # what is installed, and the same sources would give other bytes in another folder.
+  set(CMAKE_BUILD_RPATH_USE_ORIGIN ON)
   if(WIN32)
     # Programs find their libraries beside them.
     set(CMAKE_RUNTIME_OUTPUT_DIRECTORY "${PROJECT_BINARY_DIR}/bin")

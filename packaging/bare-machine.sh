@@ -27,6 +27,7 @@ echo "== a root with nothing in it"
 debootstrap --variant=minbase "$release" "$root" "$mirror" >"$work/log" 2>&1 || { tail -n 30 "$work/log"; exit 1; }
 mount -t proc proc "$root/proc"
 mount --rbind /dev "$root/dev"
+mount --make-rslave "$root/dev" # so that taking it away takes away nothing of this machine's
 for setting in /etc/apt/sources.list /etc/apt/sources.list.d /etc/apt/apt.conf.d /etc/apt/trusted.gpg.d /etc/resolv.conf /etc/hosts /usr/share/keyrings; do
   if [[ -e $setting ]]; then cp -rL "$setting" "$root$(dirname "$setting")/"; fi
 done
@@ -59,6 +60,28 @@ for program in main:tav inspect:tav-inspect kor:kor; do
   inside sh -c "g++ -std=c++20 /programs/${program%%:*}.cpp -o /programs/p \$(pkg-config --cflags --libs ${program##*:}) && /programs/p"
 done
 inside sh -c 'gcc -std=c99 -Wpedantic -Werror /programs/c.c -o /programs/p $(pkg-config --cflags --libs tav-inspect) && /programs/p'
+
+echo "== the programs on the first pages of the documents"
+mkdir "$root/examples"
+tests/system/docs/extract_examples.py "$root/examples" README.md docs/getting-started.md docs/producers.md docs/consumers.md \
+  docs/inspect.md docs/c.md >"$work/examples"
+count=0
+while read -r path; do
+  example=/examples/$(basename "$path")
+  if [[ $path == *.c ]]; then compiler="gcc -std=c99"; else compiler="g++ -std=c++20"; fi
+  quietly inside sh -c "$compiler $example -o /programs/p \$(pkg-config --cflags --libs tav-inspect) && /programs/p"
+  count=$((count + 1))
+done <"$work/examples"
+((count >= 6)) || { echo "only $count programs on six pages"; exit 1; }
+echo "$count programs"
+
+echo "== the first program, by CMake"
+quietly inside apt-get install -y --no-install-recommends cmake make
+mkdir "$root/first"
+sed -n '/^```cmake$/,/^```$/{/^```/d; p; /^target_link_libraries/q}' docs/getting-started.md >"$root/first/CMakeLists.txt"
+cp "$root"/examples/getting-started_1.cpp "$root/first/first.cpp"
+quietly inside sh -c 'cd /first && cmake -S . -B build && cmake --build build'
+inside /first/build/first
 
 echo "== apt remove"
 quietly inside sh -c 'apt-get purge -y $(dpkg-query -W -f "\${Package}\n" | grep -E "^(lib)?tav|^python3-tav")'
