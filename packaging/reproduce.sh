@@ -5,6 +5,8 @@
 #   packaging/reproduce.sh [PART...]        parts: as packaging/build.sh has them
 # Where they differ it says how, by diffoscope if that is there.
 #   REPRODUCE_KEEP=FOLDER   both builds' artefacts stay in FOLDER/first and FOLDER/second
+#   REPRODUCE_CACHE=1       objects come from ccache, and the clock stays: a look at all that is done with objects, in
+#                           some minutes. It says nothing of the compilers.
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")/.."
 
@@ -41,10 +43,16 @@ chmod -R go-rwx "$second" # as a checkout with this umask would have it
 # Another day as well, if there is a clock that can be set: what a build is told of the time then differs in every part.
 cmake/install-packages.sh reproduce
 later=(faketime -f '+400d')
-without=(env -u SOURCE_DATE_EPOCH -u CMAKE_CXX_COMPILER_LAUNCHER -u CMAKE_C_COMPILER_LAUNCHER CCACHE_DISABLE=1)
+plainly=(env -u SOURCE_DATE_EPOCH -u CMAKE_CXX_COMPILER_LAUNCHER -u CMAKE_C_COMPILER_LAUNCHER CCACHE_DISABLE=1)
+if [[ -n ${REPRODUCE_CACHE:-} ]]; then
+  later=() # what a cache keeps would be a year younger than all else in it
+  plainly=(env -u SOURCE_DATE_EPOCH CMAKE_CXX_COMPILER_LAUNCHER=ccache CCACHE_DIR="${CCACHE_DIR:-$HOME/.cache/ccache}" CCACHE_NOHASHDIR=1)
+fi
 
-(cd "$first" && umask 022 && "${without[@]}" TZ=UTC LC_ALL=C.UTF-8 HOME="$work" packaging/build.sh "$kept/first" "$@")
-(cd "$second" && umask 077 && "${without[@]}" TZ=Asia/Kolkata LC_ALL=POSIX HOME="$elsewhere" "${later[@]}" packaging/build.sh "$kept/second" "$@")
+(cd "$first" && umask 022 &&
+  "${plainly[@]}" CCACHE_BASEDIR="$first" TZ=UTC LC_ALL=C.UTF-8 HOME="$work" packaging/build.sh "$kept/first" "$@")
+(cd "$second" && umask 077 &&
+  "${plainly[@]}" CCACHE_BASEDIR="$second" TZ=Asia/Kolkata LC_ALL=POSIX HOME="$elsewhere" "${later[@]}" packaging/build.sh "$kept/second" "$@")
 
 status=0
 count=0
