@@ -20,9 +20,10 @@ constexpr uint64_t kAbandon = 1;
 /// are, many of them share a page, and bringing it back once serves them all.
 constexpr uint32_t kMostAlone = 64;
 
-/// Writes into a file what belongs into a header that has left the ring. To bring its page back costs far more: all
-/// that the ring has is written out for it, and read again for the next node. False where that is not possible; then
-/// the ring does it, whose codes and records tell what is wrong. Storages of others get pages as ever.
+/// Writes into a file what belongs into a header that has left the ring, behind what the ring has of the group: a
+/// process that is killed then leaves no group whose size counts bytes that never came. To bring the header's page back
+/// costs far more: it is written once more itself. False where that is not possible; then the ring does it, whose codes
+/// and records tell what is wrong. Storages of others get pages as ever.
 bool writePastRing(TAVHandle& handle, uint64_t offset, const uint8_t* bytes, uint64_t length)
 {
   TAVCircularBuf* const ring = handle.pCircularBuf;
@@ -31,7 +32,7 @@ bool writePastRing(TAVHandle& handle, uint64_t offset, const uint8_t* bytes, uin
     return false;
   }
   return ring->pStorage->kind == TAV_STORAGE_FILE && !ring->isCached(offset) &&
-         ring->write(offset, bytes, length, true) == TAV_RC_OK;
+         ring->writeBefore(handle.streamBytes) == TAV_RC_OK && ring->write(offset, bytes, length, true) == TAV_RC_OK;
 }
 
 /// Writes the size of a group over the one in the stream.
