@@ -4,7 +4,7 @@ import os
 import random
 import unittest
 
-from planted import BINARY, END, EYE, EYE_SIZE, HOST, NAMED, Form, Node, encode, random_form, random_tree
+from planted import BINARY, END, EYE, EYE_SIZE, HOST, NAMED, Form, Node, encode, random_form, random_tree, recorded
 from support import ToolTest, generate, tav
 
 STREAMS = int(os.environ.get("TAV_GUESSES", "150"))
@@ -72,10 +72,10 @@ class Guess(ToolTest):
         self.assertEqual(self.wrong_guesses(deleted), [])
 
     def test_a_stream_of_32_bit_headers_is_read_as_one_wherever_it_is_cut(self):
-        made = self.snapshot("--hdr32").read_bytes()
+        made = recorded(Form(wide=False))
         for length in range(28, len(made)):
             with self.subTest(length=length):
-                self.assertEqual(self.guess(made[:length]), (HOST, False, False))
+                self.assertEqual(self.guess(made[:length]), (Form().order, False, False))
 
     def test_a_32_bit_root_with_a_damaged_type_is_not_taken_for_a_64_bit_one_together_with_its_child(self):
         for count in (1, 4, 20):
@@ -88,7 +88,7 @@ class Guess(ToolTest):
                 self.assertEqual(self.guess(made)[:2], ("little", False))
 
     def test_every_command_finds_the_nodes_before_the_cut(self):
-        path = self.write(self.snapshot("--hdr32").read_bytes()[:200])
+        path = self.write(recorded(Form(wide=False))[:200])
         self.assertEqual(tav("get", path, "/system/host/hostName").status, 0)
         self.assertIn("system", tav("tree", path).out.splitlines()[0])
 
@@ -129,7 +129,7 @@ class RecoverGuess(ToolTest):
         return json.loads(result.out) if result.status != 3 else None
 
     def test_a_plain_stream_without_its_first_8_bytes_keeps_all_the_rest(self):
-        made = self.snapshot().read_bytes()[8:]
+        made = recorded()[8:]
         report = self.recover(made)
         self.assertEqual((report["form"]["root"], report["kept"], report["lost"]), (64, len(made) - 8, 8))
         self.assertNotIn(" 0    hostName", tav("tree", self.folder / "y.tav").out)
@@ -145,14 +145,14 @@ class RecoverGuess(ToolTest):
                     self.assertGreaterEqual(self.recover(made)["nodes"], true["nodes"])
 
     def test_the_form_that_was_tried_as_well_is_named_with_what_it_keeps(self):
-        made = self.snapshot().read_bytes()[8:]
+        made = recorded()[8:]
         report = self.recover(made)
         other = report["otherForm"]
-        self.assertEqual((other["byteOrder"], other["root"]), (f"{HOST}-endian", 32))
+        self.assertEqual((other["byteOrder"], other["root"]), (f"{Form().order}-endian", 32))
         self.assertLess(other["nodes"], report["nodes"])
         text = tav("recover", self.folder / "x.tav", "-o", self.folder / "y.tav", "--force").out
         kept = f"{other['nodes']} nodes and {other['kept']} bytes would be kept"
-        self.assertIn(f"the form is a guess: read as {HOST}-endian, 32-bit root header, not padded, {kept}", text)
+        self.assertIn(f"the form is a guess: read as {Form().order}-endian, 32-bit root header, not padded, {kept}", text)
 
     def test_what_info_calls_ambiguous_is_a_guess_to_check_and_to_recover(self):
         doubts = 0
@@ -172,18 +172,18 @@ class RecoverGuess(ToolTest):
             self.assertGreater(doubts, 0)
 
     def test_where_the_form_is_given_no_other_is_tried(self):
-        made = self.snapshot().read_bytes()[8:]
-        self.assertNotIn("otherForm", self.recover(made, *Form(big=HOST == "big").options()))
+        made = recorded()[8:]
+        self.assertNotIn("otherForm", self.recover(made, *Form().options()))
 
     def test_damage_far_behind_a_sound_start_leaves_no_doubt(self):
-        made = bytearray(self.snapshot().read_bytes())
+        made = bytearray(recorded())
         made[len(made) // 2:len(made) // 2 + 20] = b"\xff" * 20
         report = self.recover(made)
         self.assertGreater(report["lost"], 0)
         self.assertNotIn("otherForm", report)
 
     def test_the_guess_is_the_same_each_time(self):
-        made = self.snapshot().read_bytes()[8:]
+        made = recorded()[8:]
         self.assertEqual(self.recover(made), self.recover(made))
 
 

@@ -5,6 +5,7 @@ import unittest
 
 from damage_test import group, header, number
 from layout import BINARY, END, Form
+from planted import recorded
 from support import ToolTest, bytes_of_hex, nodes_of, tav
 
 UNKNOWN = 2**64 - 1
@@ -108,7 +109,8 @@ class Print(ToolTest):
 
 class Tree(ToolTest):
     def test_lines_are_never_wider_than_asked_for(self):
-        path = self.snapshot()
+        path = self.folder / "x.tav"
+        path.write_bytes(recorded())
         for width in (1, 2, 5, 20, 21, 23, 30, 45):
             for options in ((), ("--paths",)):
                 with self.subTest(width=width, options=options):

@@ -134,3 +134,32 @@ def random_group(rng, form, wide, depth=3, pairs=0.5, strings=0.5, nodes=6, mixe
 
 def random_tree(rng, form, **more):
     return random_group(rng, form, form.wide, **more)
+
+
+# What a snapshot of some machine has; those of the machine that runs the tests have something else in each place each time.
+RECORDED = (60100, [(60102, [
+    (60103, "ada"), (60101, "x86_64"),
+    (60104, [(60105, "Linux"), (60107, "6.1.0-18-amd64"), (60106, "#1 SMP PREEMPT_DYNAMIC 6.1.76-1 (2024-02-01)")]),
+    (60109, [(60112, 4), (60111, 4), (60113, 2596), (60114, 2), (60116, 2), (60127, 61), (44010, 37805280), (44011, 36874330),
+             (44012, 11780680), (44013, 13214110), (44014, 95000), (44015, 46860), (44016, 55430)]),
+    (60117, [(60118, 25276518400), (60119, 12297949184), (60120, 22864396288), (60121, 0), (60122, 0), (60123, 25276518400),
+             (60124, 1942118400), (60125, 22864396288), (60126, 12297949184), (44017, 262963200), (44019, 38621184)]),
+    (44000, [(44001, 50123), (44002, 851), (44003, 902), (44004, 603), (44005, 6), (44006, 181), (44007, 72817404)]),
+    (44020, [(44021, "vda"), (44022, 1350221), (44023, 17314021376), (44024, 4060171), (44025, 93411020800)]),
+    (44027, [(44028, "/"), (44029, "ext4"), (44030, 265936306176)]),
+    *[(44032, [(44033, name), (44034, 512 * count), (44035, count)]) for name, count in (("lo", 70041), ("eth0", 811))],
+    *[(44042, [(44043, 4000 + 13 * i), (44044, name), (44045, 7000 // (i + 1)), (44046, 70000 >> i)])
+      for i, name in enumerate(("compiler", "linker", "editor", "a longer name", "sh"))]])])
+
+
+def recorded(form=None, pairs=False):
+    """A stream as a snapshot is one, with and without pairs, in a form; the same each time."""
+    form = form or Form()
+
+    def node(elm, value):
+        info = EYE_SIZE if pairs and form.wide else 0
+        if isinstance(value, list):
+            return Node(elm, 2 if form.wide else 1, children=[node(*child) for child in value], info=info)
+        return Node(elm, 50, value.encode(), info=info) if isinstance(value, str) else Node(
+            elm, 57, form.number(value, 8), info=info)
+    return bytes(encode(form, node(*RECORDED)))

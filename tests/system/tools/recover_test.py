@@ -9,7 +9,7 @@ import tempfile
 import unittest
 
 from oracle import ELEMENTS
-from planted import ARRAY, BINARY, END, EYE, EYE_SIZE, NAMED, Form, Node, encode, random_form, random_tree
+from planted import ARRAY, BINARY, END, EYE, EYE_SIZE, NAMED, Form, Node, encode, random_form, random_tree, recorded
 from recovering import identity, missing, read_back, recovered
 from support import ToolTest, generate, tav
 
@@ -460,8 +460,8 @@ class Cost(ToolTest):
 
 class Command(ToolTest):
     def damaged(self):
-        path = self.snapshot("--eye-size")
-        made = bytearray(path.read_bytes())
+        path = self.folder / "x.tav"
+        made = bytearray(recorded(pairs=True))
         made[len(made) // 2:len(made) // 2 + 30] = bytes(30)
         path.write_bytes(made)
         return path, made

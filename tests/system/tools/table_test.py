@@ -1,6 +1,7 @@
 """tav table: rows by a path, columns by paths from there, as CSV, TSV, JSON lines and metrics."""
 import csv
 import io
+import itertools
 import json
 import os
 import random
@@ -295,8 +296,10 @@ class Statuses(Table):
 
 
 class Series(Table):
+    numbers = itertools.count()
+
     def series(self, *samples):
-        return self.stream([sample(*each) for each in samples], f"{random.random()}.tav")
+        return self.stream([sample(*each) for each in samples], f"{next(self.numbers)}.tav")
 
     ARGUMENTS = ("--each", "/system", "--col", "time=timestamp", "--col", "n=cpuOnline", "--counter", "n", "--rate")
 
