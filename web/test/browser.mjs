@@ -1,5 +1,5 @@
 // A browser with the page, and what the tests do in it.
-import { mkdtempSync, existsSync, readdirSync, readFileSync, rmSync, writeFileSync } from "node:fs";
+import { mkdtempSync, readdirSync, readFileSync, rmSync, writeFileSync } from "node:fs";
 import { tmpdir } from "node:os";
 import { join } from "node:path";
 import { fileURLToPath, pathToFileURL } from "node:url";
@@ -10,11 +10,15 @@ const BROWSER = process.env.TAV_BROWSER ?? "/usr/bin/chromium";
 
 export const folder = mkdtempSync(join(tmpdir(), "tav-page-"));
 
+const PATIENCE = 600_000; // ends what hangs
+
 let browser;
 
 export async function start() {
   browser = await puppeteer.launch({
     executablePath: BROWSER,
+    timeout: PATIENCE,
+    protocolTimeout: PATIENCE,
     args: process.getuid() === 0 ? ["--no-sandbox"] : [],
   });
 }
@@ -34,6 +38,7 @@ export function made(name, bytes) {
 /** The page in a tab of its own, from the disk unless an address is given. `page.requests`: what it asked for. */
 export async function visit({ address = pathToFileURL(PAGE).href, ...viewport } = {}) {
   const page = await browser.newPage();
+  page.setDefaultTimeout(PATIENCE);
   await page.setViewport({ width: 1200, height: 800, ...viewport });
   page.requests = [];
   page.errors = [];
@@ -46,7 +51,7 @@ export async function visit({ address = pathToFileURL(PAGE).href, ...viewport } 
 
 /** Waits until what was asked for is done. */
 export async function settled(page) {
-  await page.waitForFunction(() => document.body.getAttribute("aria-busy") === "false", { timeout: 60_000 });
+  await page.waitForFunction(() => document.body.getAttribute("aria-busy") === "false");
 }
 
 export async function open(page, path) {
@@ -110,15 +115,22 @@ export async function longestTask(page, work) {
 export async function saved(page, selector) {
   const target = mkdtempSync(join(folder, "saved-"));
   const session = await browser.target().createCDPSession();
-  await session.send("Browser.setDownloadBehavior", { behavior: "allow", downloadPath: target });
+  await session.send("Browser.setDownloadBehavior", { behavior: "allow", downloadPath: target, eventsEnabled: true });
+  const ended = new Promise((resolve, reject) => {
+    const patience = setTimeout(() => reject(new Error("nothing was saved")), PATIENCE);
+    session.on("Browser.downloadProgress", ({ state }) => {
+      if (state !== "inProgress") {
+        clearTimeout(patience);
+        resolve(state);
+      }
+    });
+  });
   await page.$eval(selector, (element) => element.click());
-  const end = Date.now() + 20_000;
-  while (Date.now() < end) {
-    const [name] = readdirSync(target).filter((file) => !file.endsWith(".crdownload"));
-    if (name !== undefined && existsSync(join(target, name))) {
-      return { name, path: join(target, name), bytes: readFileSync(join(target, name)) };
-    }
-    await new Promise((resolve) => setTimeout(resolve, 50));
+  const state = await ended; // until then it has another name, or not all of its bytes
+  await session.detach();
+  const [name] = readdirSync(target);
+  if (state !== "completed" || name === undefined) {
+    throw new Error(`saving: ${state}`);
   }
-  throw new Error("nothing was saved");
+  return { name, path: join(target, name), bytes: readFileSync(join(target, name)) };
 }
