@@ -30,8 +30,10 @@ uint64_t imagesWanted()
 
 std::string pathFor(const std::string& name)
 {
-  return tav::host::textOf(std::filesystem::temp_directory_path()) + "/tav-crash-" +
-         std::to_string(tav::host::processId()) + "-" + name;
+  const std::string path = tav::host::textOf(std::filesystem::temp_directory_path()) + "/tav-crash-" +
+                           std::to_string(tav::host::processId()) + "-" + name;
+  std::filesystem::remove(path); // a process of this number may have been killed, and left it
+  return path;
 }
 
 /// What a program has to rely on from a place in the log on.

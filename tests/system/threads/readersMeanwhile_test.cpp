@@ -39,7 +39,7 @@ void record(Shared& shared)
   constexpr uint32_t most = 3000; // a reader walks all of them
   const auto end = std::chrono::steady_clock::now() + std::min(round, lasting());
   tav::Writer writer(shared.path, {.append = true}, {.ringBytes = 2U << 20U});
-  for (uint32_t i = 0; std::chrono::steady_clock::now() < end && i < most; ++i)
+  for (uint32_t i = 0; i == 0 || (std::chrono::steady_clock::now() < end && i < most); ++i)
   {
     tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM, {.eyeSize = i % 2 == 0});
     tav::Group host = root.group(TAV_ELM_CMN_HOST);

@@ -65,7 +65,7 @@ class TemporaryPath
 {
 public:
   TemporaryPath()
-      : path(std::filesystem::temp_directory_path() / nextName())
+      : path(unused())
   {
   }
   ~TemporaryPath()
@@ -79,10 +79,16 @@ public:
   const std::filesystem::path path;
 
 private:
-  static std::string nextName()
+  static std::filesystem::path unused()
   {
     static int count = 0;
-    return "tav-layer-" + std::to_string(tav::host::processId()) + "-" + std::to_string(++count);
+    const std::string name = "tav-layer-" + std::to_string(tav::host::processId()) + "-";
+    std::filesystem::path found;
+    do // a process of this number may have been killed, and left something
+    {
+      found = std::filesystem::temp_directory_path() / (name + std::to_string(++count));
+    } while (std::filesystem::exists(std::filesystem::symlink_status(found)));
+    return found;
   }
 };
 
