@@ -31,8 +31,8 @@ INSTRUCTIONS = [
     "W1/floor", "W1/tavAddElement", "W1/tavAddElement_kept_descriptor", "W1/tavAddElement_zeroed_descriptor",
     "W1/tavAddElement_initialized_descriptor", "W1/layer", "W1/layer_growing", "W2/floor", "W2/tavGetNextChild", "W2/layer_children",
     "W2/layer_descendants", "W3/floor", "W3/tavFindElmInt", "W3/tavFindElmInt_own_stack", "W3/layer_path", "index/made",
-    "W4file/tavPrintSubtree_xml", "W5/floor", "W5/tavValidateHierarchy", "ring/tavAddElement", "ring/tavGetNextChild", "ring/layer_add",
-    "ring/layer_children",
+    "W4file/tavPrintSubtree_xml", "W4file/layer_print_xml", "W5/floor", "W5/tavValidateHierarchy", "ring/tavAddElement",
+    "ring/tavGetNextChild", "ring/layer_add", "ring/layer_children",
 ]
 GROWING = ["W1/tavAddElement", "W2/tavGetNextChild", "W4file/tavPrintSubtree_xml", "W5/tavValidateHierarchy"]
 DOUBLINGS = 6

@@ -87,6 +87,12 @@ bool printXml(Streams& streams)
                              library::kXml) != 0;
 }
 
+bool printLayer(Streams& streams)
+{
+  const tav::Reader reader(std::as_bytes(std::span(streams.encoded)));
+  return reader.print(devNull(), {.xml = true}) != 0;
+}
+
 bool addThroughRing(Streams& streams)
 {
   const library::RingHandle handle(streams.buffered, TAV_OPT_WRITE);
@@ -140,6 +146,7 @@ const std::map<std::string, std::function<bool(Streams&)>> kParts = {
        });
      }},
     {"W4file/tavPrintSubtree_xml", printXml},
+    {"W4file/layer_print_xml", printLayer},
     {"W5/floor", [](Streams& s) { return floor0::validate(s.encoded.data(), s.end()) != 0; }},
     {"W5/tavValidateHierarchy", [](Streams& s) { return library::validatePlain(s.encoded.data(), s.encoded.size()); }},
     {"ring/tavAddElement", addThroughRing},

@@ -6,6 +6,7 @@
 #include <string_view>
 
 #include "layer/elementNames.h"
+#include "layer/printedText.h"
 #include "tav/cpp/print.hpp"
 #include "tav/cpp/ranges.hpp"
 #include "tav/cpp/stack.hpp"
@@ -131,10 +132,13 @@ private:
     text_.append(3 * (depth + further), ' ');
   }
 
+  static std::string_view nameOf(std::string_view tag) noexcept
+  {
+    return tag.empty() ? "element" : tag;
+  }
   static std::string_view tagName(uint16_t elm) noexcept
   {
-    const std::string_view tag = elementTag(elm);
-    return tag.empty() ? "element" : tag;
+    return nameOf(elementTag(elm));
   }
   static std::string_view enumName(uint16_t elm) noexcept
   {
@@ -152,8 +156,10 @@ private:
       text_ += "{\n";
       return;
     }
-    text_.append("<").append(tagName(node.elm()));
-    if (elementTag(node.elm()).empty())
+    tag_ = elementTag(node.elm());
+    text_ += '<';
+    text_.append(nameOf(tag_));
+    if (tag_.empty())
     {
       text_.append(" id=\"").append(std::to_string(node.elm())) += '"';
     }
@@ -163,7 +169,7 @@ private:
     }
     else if (!isWrapped())
     {
-      value_ = options_.data || options_.bare ? valueOf(node) : ValueText{};
+      options_.data || options_.bare ? takeValue(node, value_) : value_.clear();
       appendForm(value_);
     }
     text_ += '>';
@@ -173,6 +179,7 @@ private:
     }
   }
 
+  /// `onTheLine`: of a data element, whose tag was the last to be opened.
   void close(uint16_t elm, size_t depth, bool onTheLine)
   {
     if (!onTheLine || options_.headers || !options_.xml)
@@ -181,7 +188,7 @@ private:
     }
     if (options_.xml)
     {
-      text_.append("</").append(tagName(elm)) += ">\n";
+      text_.append("</", 2).append(onTheLine ? nameOf(tag_) : tagName(elm)).append(">\n", 2);
     }
     else
     {
@@ -202,7 +209,11 @@ private:
     {
       if (isValue)
       {
-        appendValue(options_.xml ? value_ : valueOf(node));
+        if (!options_.xml)
+        {
+          takeValue(node, value_);
+        }
+        appendValue(value_);
       }
       return;
     }
@@ -227,7 +238,8 @@ private:
     {
       begin(depth);
       text_ += "   ";
-      appendValue(valueOf(node));
+      takeValue(node, value_);
+      appendValue(value_);
       text_ += '\n';
     }
   }
@@ -236,36 +248,39 @@ private:
   {
     if (!isWrapped())
     {
-      appendValue(node.isGroup() ? ValueText{} : value_);
+      if (!node.isGroup())
+      {
+        appendValue(value_);
+      }
       return;
     }
     begin(depth, 1);
     text_ += "<tavData";
-    const ValueText value = node.isGroup() ? ValueText{} : valueOf(node);
-    appendForm(value);
+    node.isGroup() ? value_.clear() : takeValue(node, value_);
+    appendForm(value_);
     text_ += '>';
-    appendValue(value);
+    appendValue(value_);
     text_ += "</tavData>\n";
   }
 
   /// In XML, characters that it cannot hold become the payload's digits.
-  [[nodiscard]] ValueText valueOf(const Node& node) const
+  void takeValue(const Node& node, ValueText& value) const
   {
     if (node.size() == 0 || node.data_.pDataBuf == nullptr)
     {
-      return {};
+      return value.clear();
     }
     const RawValue raw{node.type(), node.data_.pDataBuf, node.size(), swapped_};
-    ValueText value = valueText(raw);
-    if (options_.xml && value.isText && !isXmlText(value.text))
+    showValue(value, raw);
+    if (options_.xml && value.isText && !isXmlText(value.shown))
     {
-      return bytesText(raw);
+      value.clear();
+      showBytes(value, raw);
     }
     if (!options_.xml && raw.type == TAV_TYPE_ASCII_STRING)
     {
-      value.text = value.text.substr(0, value.text.find('\0'));
+      value.shown = value.shown.substr(0, value.shown.find('\0'));
     }
-    return value;
   }
 
   /// What an element's tag says of a value that is no plain text.
@@ -285,11 +300,11 @@ private:
   {
     if (options_.xml && value.isText)
     {
-      appendXml(text_, value.text, false);
+      appendXml(text_, value.shown, false);
     }
     else
     {
-      text_ += value.text;
+      text_ += value.shown;
     }
   }
 
@@ -314,6 +329,7 @@ private:
       return;
     }
     std::array<bool, keys.size()> seen{};
+    ValueText key;
     std::error_code ec; // which the walk below the group meets again
     for (const Node& child : group.children(ec))
     {
@@ -324,7 +340,8 @@ private:
       }
       seen[place] = true;
       text_.append(" ").append(tagName(child.elm())) += "=\"";
-      appendXml(text_, valueOf(child).text, true);
+      takeValue(child, key);
+      appendXml(text_, key.shown, true);
       text_ += '"';
     }
   }
@@ -416,9 +433,10 @@ private:
   FILE* stream_;
   PrintOptions options_;
   bool swapped_;
-  std::string text_; ///< that the stream has not got yet
+  PrintedText text_; ///< that the stream has not got yet
   Stack<uint16_t> open_;
-  ValueText value_; ///< of the data element whose tag is open
+  std::string_view tag_; ///< of the node that was opened last; empty for one without a name
+  ValueText value_;      ///< of the data element whose tag is open
   uint64_t count_ = 0;
   bool failed_ = false;
 };

@@ -8,6 +8,7 @@
 #include <cstring>
 #include <string>
 #include <string_view>
+#include <utility>
 
 #include "tav/cpp/decode.hpp"
 #include "tav/cpp/text.hpp"
@@ -15,11 +16,31 @@
 namespace tav::detail
 {
 
+/// How many bytes at the start of a text are ASCII and no control characters. Looks at eight of them at a time.
+[[gnu::always_inline]] inline size_t printableLength(std::string_view text) noexcept
+{
+  constexpr uint64_t ones = 0x0101010101010101U;
+  constexpr uint64_t high = 0x80 * ones;
+  size_t at = 0;
+  for (uint64_t word = 0; at + sizeof word <= text.size(); at += sizeof word)
+  {
+    std::memcpy(&word, text.data() + at, sizeof word);
+    if (((word | (word - 0x20 * ones)) & high) != 0) // a borrow only ever comes from a byte below 0x20
+    {
+      break;
+    }
+  }
+  for (; at != text.size() && static_cast<uint8_t>(text[at]) - 0x20U < 0x60; ++at)
+  {
+  }
+  return at;
+}
+
 /// Whether XML can hold a text: well-formed UTF-8 without control characters but tab and line ends, and without U+FFFE
 /// and U+FFFF.
 inline bool isXmlText(std::string_view text) noexcept
 {
-  while (!text.empty())
+  for (text.remove_prefix(printableLength(text)); !text.empty();)
   {
     const size_t length = characterLength(text);
     const std::string_view character = text.substr(0, length);
@@ -34,38 +55,59 @@ inline bool isXmlText(std::string_view text) noexcept
   return true;
 }
 
-/// Appends a text in the form that XML takes in an element or, where line ends would become blanks, between quotes.
-inline void appendXml(std::string& to, std::string_view text, bool quoted)
+/// What stands for a character in XML, in an element or between quotes; empty for one that stands for itself.
+constexpr std::string_view xmlEscape(char c, bool quoted) noexcept
 {
-  for (const char c : text)
+  switch (c)
   {
-    switch (c)
+  case '&':
+    return "&amp;";
+  case '<':
+    return "&lt;";
+  case '>':
+    return "&gt;";
+  case '"':
+    return "&quot;";
+  case '\r':
+    return "&#13;";
+  case '\n':
+    return quoted ? "&#10;" : "";
+  case '\t':
+    return quoted ? "&#9;" : "";
+  default:
+    return "";
+  }
+}
+
+/// Characters that do not stand for themselves everywhere in XML.
+inline constexpr auto kXmlSpecial = []() {
+  std::array<bool, 256> special{};
+  for (size_t c = 0; c < special.size(); ++c)
+  {
+    special[c] = !xmlEscape(static_cast<char>(c), true).empty();
+  }
+  return special;
+}();
+
+/// Appends a text in the form that XML takes in an element or, where line ends would become blanks, between quotes.
+template<class Text>
+void appendXml(Text& to, std::string_view text, bool quoted)
+{
+  size_t done = 0;
+  for (size_t at = 0; at != text.size(); ++at)
+  {
+    if (!kXmlSpecial[static_cast<uint8_t>(text[at])]) [[likely]]
     {
-    case '&':
-      to += "&amp;";
-      break;
-    case '<':
-      to += "&lt;";
-      break;
-    case '>':
-      to += "&gt;";
-      break;
-    case '"':
-      to += "&quot;";
-      break;
-    case '\r':
-      to += "&#13;";
-      break;
-    case '\n':
-      to += quoted ? "&#10;" : "\n";
-      break;
-    case '\t':
-      to += quoted ? "&#9;" : "\t";
-      break;
-    default:
-      to += c;
+      continue;
+    }
+    const std::string_view escape = xmlEscape(text[at], quoted);
+    if (!escape.empty())
+    {
+      to.append(text.data() + done, at - done).append(escape.data(), escape.size());
+      done = at + 1;
     }
   }
+  to.append(text.data() + done, text.size() - done);
 }
 
 inline void appendHex(std::string& to, const uint8_t* bytes, size_t size)
@@ -182,21 +224,47 @@ inline std::string longText(const Sint128& number)
   return '-' + digitsOf(~high + (low == 0 ? 1 : 0), low);
 }
 
-/// A value as it is printed.
+/// A value as it is printed: characters of the stream as they stand there, or its own.
 struct ValueText
 {
-  std::string text;
+  std::string_view shown;
+  std::string text;    ///< for `shown`, of values that are no text
   bool isText = false; ///< characters of the stream, which XML has to escape and cannot always hold
   bool isHex = false;  ///< the bytes' digits, in place of a value
   uint16_t codePage = kCodePageUtf8;
+  std::array<char, 24> digits; ///< for `shown`, of numbers
+
+  ValueText() noexcept = default;
+  ValueText(const ValueText&) = delete;
+  ValueText& operator=(const ValueText&) = delete;
+
+  void clear() noexcept
+  {
+    shown = {};
+    text.clear();
+    isText = false;
+    isHex = false;
+    codePage = kCodePageUtf8;
+  }
+  void showCharacters(std::string_view characters) noexcept
+  {
+    shown = characters;
+    isText = true;
+  }
+  void showText(std::string&& own) noexcept
+  {
+    text = std::move(own);
+    shown = text;
+  }
 };
 
 template<class Number>
-std::string numberText(const RawValue& raw)
+void showNumber(ValueText& value, const RawValue& raw) noexcept
 {
   Number number{};
   static_cast<void>(decode(raw, number));
-  return std::to_string(number);
+  char* const first = value.digits.data();
+  value.shown = {first, static_cast<size_t>(std::to_chars(first, first + value.digits.size(), number).ptr - first)};
 }
 
 inline std::string wordsText(const RawValue& raw)
@@ -227,65 +295,79 @@ inline std::string hexText(const RawValue& raw)
 }
 
 /// The bytes as they stand in the stream.
-inline ValueText bytesText(const RawValue& raw)
+inline void showBytes(ValueText& value, const RawValue& raw)
 {
-  ValueText value{.text = {}, .isHex = true};
+  value.isHex = true;
   appendHex(value.text, raw.bytes, raw.length());
-  return value;
+  value.shown = value.text;
 }
 
-/// A value in the form in which the plain operation prints it, but for moments, of which it shows others. What it does
-/// not print, a type or a size without a value, is the digits of the bytes.
-inline ValueText valueText(const RawValue& raw)
+/// A value of the types that are rare, or take longer to print than to look for.
+inline void showRareValue(ValueText& value, const RawValue& raw)
 {
+  TAVTimeStamp stamp{};
+  Utf8 text;
+  Sint128 number;
+  if (decode(raw, stamp) == TAV_RC_OK)
+  {
+    appendTime(value.text, stamp);
+    value.shown = value.text;
+  }
+  else if (decode(raw, text) == TAV_RC_OK)
+  {
+    value.showCharacters(text.text);
+    value.codePage = text.codePage;
+  }
+  else if (decode(raw, number) == TAV_RC_OK)
+  {
+    value.showText(longText(number));
+  }
+  else if (raw.type == TAV_TYPE_UINT64_ARRAY && raw.size % sizeof(uint64_t) == 0)
+  {
+    value.showText(wordsText(raw));
+  }
+  else if (raw.type == TAV_TYPE_UINT8 || raw.type == TAV_TYPE_BINARY || raw.type == TAV_TYPE_UINT128)
+  {
+    value.showText(hexText(raw));
+  }
+  else
+  {
+    showBytes(value, raw);
+  }
+}
+
+/// Shows a value in the form in which the plain operation prints it, but for moments, of which it shows others. What it
+/// does not print, a type or a size without a value, is the digits of the bytes. Until the next value, and as long as
+/// the payload.
+inline void showValue(ValueText& value, const RawValue& raw)
+{
+  value.clear();
   const uint8_t exact = layout::typeInfo(raw.type).valueSize;
-  const std::string_view characters(reinterpret_cast<const char*>(raw.bytes), raw.length());
   if (exact != 0 && raw.size != exact)
   {
-    return bytesText(raw);
+    return showBytes(value, raw);
   }
   switch (raw.type)
   {
   case TAV_TYPE_ASCII_STRING:
   case TAV_TYPE_SINT8: // a character, as the plain operation prints it
   case TAV_TYPE_BYTE:
-    return {.text = std::string(characters), .isText = true};
+    return value.showCharacters({reinterpret_cast<const char*>(raw.bytes), raw.length()});
   case TAV_TYPE_UINT16:
-    return {.text = numberText<uint16_t>(raw)};
+    return showNumber<uint16_t>(value, raw);
   case TAV_TYPE_SINT16:
-    return {.text = numberText<int16_t>(raw)};
+    return showNumber<int16_t>(value, raw);
   case TAV_TYPE_UINT32:
-    return {.text = numberText<uint32_t>(raw)};
+    return showNumber<uint32_t>(value, raw);
   case TAV_TYPE_SINT32:
-    return {.text = numberText<int32_t>(raw)};
+    return showNumber<int32_t>(value, raw);
   case TAV_TYPE_UINT64:
-    return {.text = numberText<uint64_t>(raw)};
+    return showNumber<uint64_t>(value, raw);
   case TAV_TYPE_SINT64:
-    return {.text = numberText<int64_t>(raw)};
+    return showNumber<int64_t>(value, raw);
   default:
-    break;
+    return showRareValue(value, raw);
   }
-  TAVTimeStamp stamp{};
-  if (decode(raw, stamp) == TAV_RC_OK)
-  {
-    return {.text = timeText(stamp)};
-  }
-  Utf8 text;
-  if (decode(raw, text) == TAV_RC_OK)
-  {
-    return {.text = std::string(text.text), .isText = true, .codePage = text.codePage};
-  }
-  Sint128 number;
-  if (decode(raw, number) == TAV_RC_OK)
-  {
-    return {.text = longText(number)};
-  }
-  if (raw.type == TAV_TYPE_UINT64_ARRAY && raw.size % sizeof(uint64_t) == 0)
-  {
-    return {.text = wordsText(raw)};
-  }
-  const bool isDigits = raw.type == TAV_TYPE_UINT8 || raw.type == TAV_TYPE_BINARY || raw.type == TAV_TYPE_UINT128;
-  return isDigits ? ValueText{.text = hexText(raw)} : bytesText(raw);
 }
 
 } // namespace tav::detail
