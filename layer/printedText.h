@@ -11,8 +11,8 @@
 namespace tav::detail
 {
 
-/// Appends as std::string does, but in the caller's code, and what was handed over leaves its memory behind: most pieces
-/// of a print are a few characters long, for which a call costs more than the copy.
+/// Appends as std::string does, but in the caller's code: most pieces of a print are a few characters long, for which a
+/// call costs more than the copy.
 class PrintedText
 {
 public:
