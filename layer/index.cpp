@@ -37,13 +37,20 @@ public:
   }
   uint32_t find(const paths::Compiled& path, const Taker& taker) const override
   {
+    const Route& route = path.routes[path.main.front()];
     uint32_t rc = TAV_RC_OK;
     const auto visit = [&](uint32_t child, uint32_t parent) {
       Node node;
       rc = read(child, parent, node);
       return rc == TAV_RC_OK && taker.take(taker.to, node);
     };
-    eachMatch(path, *routeOf(path), visit);
+    uint32_t first = kNone;
+    uint32_t parent = 0;
+    if (path.isStraight && findStraight(route, first, parent) && !visit(first, parent))
+    {
+      return rc;
+    }
+    eachMatch(path, route, [&](uint32_t child, uint32_t group) { return child == first || visit(child, group); });
     return rc;
   }
   [[nodiscard]] size_t size() const noexcept override
@@ -176,59 +183,81 @@ private:
     }
   }
 
-  /// The place of the first child of each id below each node, two of three places used at the most.
-  void fillTable()
+  /// The places of the table in which a group's children are found: next to each other, and three for two children.
+  struct Shelf
   {
-    size_t keys = 0;
-    eachKey([&keys](uint32_t, uint32_t) { ++keys; });
-    table_.assign(keys + keys / 2 + 1, kNone);
-    eachKey([this](uint32_t parent, uint32_t child) {
-      size_t at = slotOf(parent, entries_[child].elm);
-      while (table_[at] != kNone)
-      {
-        at = at + 1 < table_.size() ? at + 1 : 0;
-      }
-      table_[at] = child;
-    });
+    size_t first;
+    uint32_t size;
+  };
+  static Shelf shelfOf(const Entry& group) noexcept
+  {
+    const auto before = [](uint64_t children) { return static_cast<size_t>(children + children / 2); };
+    const size_t first = before(group.firstChild);
+    return {first, static_cast<uint32_t>(before(uint64_t{group.firstChild} + group.childCount) - first)};
+  }
+  /// Where on its shelf an id is looked for first. Ids in a row, as most groups have them, do not meet there.
+  static uint32_t placeOn(const Shelf& shelf, uint16_t elm) noexcept
+  {
+    const uint32_t mixed = elm * 0x9E3779B9U;
+    return static_cast<uint32_t>(uint64_t{mixed} * shelf.size >> 32U);
   }
 
-  template<class Take>
-  void eachKey(const Take& take) const
+  /// The first child of each id below each node.
+  void fillTable()
   {
-    for (uint32_t parent = 0; parent < entries_.size(); ++parent)
+    table_.assign(entries_.size() + entries_.size() / 2, kNone);
+    for (const Entry& group : entries_)
     {
-      const Entry& group = entries_[parent];
+      const Shelf shelf = shelfOf(group);
       const uint32_t end = group.firstChild + group.childCount;
       for (uint32_t child = group.firstChild; child != end; ++child)
       {
-        if (child == group.firstChild || entries_[child].elm != entries_[child - 1].elm)
+        if (child != group.firstChild && entries_[child].elm == entries_[child - 1].elm)
         {
-          take(parent, child);
+          continue;
         }
+        uint32_t at = placeOn(shelf, entries_[child].elm);
+        while (table_[shelf.first + at] != kNone)
+        {
+          at = at + 1 < shelf.size ? at + 1 : 0;
+        }
+        table_[shelf.first + at] = child;
       }
     }
   }
 
-  [[nodiscard]] size_t slotOf(uint32_t parent, uint16_t elm) const noexcept
+  /// The first child with an id; kNone where there is none.
+  [[nodiscard]] uint32_t firstOf(const Entry& group, uint16_t elm) const noexcept
   {
-    const uint64_t mixed = (uint64_t{parent} << 16U | elm) * 0x9E3779B97F4A7C15;
-    return static_cast<size_t>((mixed >> 32U) * table_.size() >> 32U);
-  }
-
-  /// The first child with an id, and the end of those with it; the end of the children where there is none.
-  [[nodiscard]] uint32_t firstOf(uint32_t parent, uint16_t elm) const noexcept
-  {
-    const Entry& group = entries_[parent];
-    const uint32_t end = group.firstChild + group.childCount;
-    for (size_t at = slotOf(parent, elm); table_[at] != kNone; at = at + 1 < table_.size() ? at + 1 : 0)
+    const Shelf shelf = shelfOf(group);
+    uint32_t at = shelf.size != 0 ? placeOn(shelf, elm) : 0;
+    for (uint32_t left = shelf.size; left != 0; --left)
     {
-      const uint32_t child = table_[at];
-      if (child - group.firstChild < group.childCount && entries_[child].elm == elm)
+      const uint32_t child = table_[shelf.first + at];
+      if (child == kNone || entries_[child].elm == elm)
       {
         return child;
       }
+      at = at + 1 < shelf.size ? at + 1 : 0;
     }
-    return end;
+    return kNone;
+  }
+
+  /// By the first child of each step, which leads to the first match where it leads anywhere.
+  bool findStraight(const Route& route, uint32_t& found, uint32_t& parent) const noexcept
+  {
+    uint32_t at = 0;
+    for (const Step& step : route.steps)
+    {
+      parent = at;
+      at = firstOf(entries_[parent], step.only);
+      if (at == kNone)
+      {
+        return false;
+      }
+    }
+    found = at;
+    return true;
   }
 
   /// The route of a path that is looked up; null for one that takes a walk.
@@ -240,6 +269,10 @@ private:
     }
     const Route& route = compiled.routes[compiled.main.front()];
     const size_t count = route.steps.size();
+    if (compiled.isStraight && count <= kMostSteps) [[likely]]
+    {
+      return &route; // whose steps ask for one id each, and for none that ends a group
+    }
     bool isKnown = count != 0 && count <= kMostSteps && route.steps.back().axis == Axis::child;
     for (size_t i = 0; isKnown && i < count; ++i)
     {
@@ -348,7 +381,11 @@ private:
       return eachOfSeveral(step, place, parent, take);
     }
     const uint32_t end = entries_[parent].firstChild + entries_[parent].childCount;
-    const uint32_t first = firstOf(parent, step.only);
+    const uint32_t first = firstOf(entries_[parent], step.only);
+    if (first == kNone)
+    {
+      return true;
+    }
     if (place != 0)
     {
       const bool isThere = place <= end - first && entries_[static_cast<uint32_t>(first + place - 1)].elm == step.only;
