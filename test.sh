@@ -281,6 +281,7 @@ check_python()
   /usr/bin/python3 -m pytest -q -p no:cacheprovider --junitxml="$work/report.xml" python/tests >"$work/tests.log" 2>&1 ||
     { tail -n 60 "$work/tests.log"; return 1; }
   count_python
+  python/check-wheel.sh
 }
 
 check_browser()

@@ -1,5 +1,5 @@
 # Debian packages: libtav1 (libtav and libkor), libtav-inspect1 (the inspection library), libtav-dev (headers, CMake
-# package, pkg-config of all three), tav-tools (the program).
+# package, pkg-config of all three), tav-tools (the program), python3-tav (the Python package, where it is built).
 #   cmake --preset package && cmake --build --preset package && cpack --config build/package/CPackConfig.cmake
 # cmake/check-packages.sh does that, and installs, runs and removes them in a fresh root.
 if(NOT TAV_INSTALL OR NOT TAV_LIBRARY_TYPE STREQUAL "SHARED")
@@ -60,6 +60,23 @@ set(CPACK_DEBIAN_TOOLS_PACKAGE_DEPENDS
 set(CPACK_COMPONENT_TOOLS_DESCRIPTION "${about}This package has the program tav, which looks into streams, checks,\n\
 converts and recovers them, its man page and its completions.")
 
+if(TAV_BUILD_PYTHON)
+  find_package(Python3 3.11 REQUIRED COMPONENTS Interpreter)
+  list(APPEND CPACK_COMPONENTS_ALL python)
+  set(CPACK_DEBIAN_PYTHON_PACKAGE_NAME python3-tav)
+  set(CPACK_DEBIAN_PYTHON_PACKAGE_SECTION python)
+  math(EXPR next "${Python3_VERSION_MINOR} + 1")
+  set(CPACK_DEBIAN_PYTHON_PACKAGE_DEPENDS "libtav${TAV_ABI_VERSION} (= ${PROJECT_VERSION}-1), \
+libtav-inspect${TAV_ABI_VERSION} (= ${PROJECT_VERSION}-1), \
+python3 (>= 3.${Python3_VERSION_MINOR}), python3 (<< 3.${next})")
+  set(CPACK_DEBIAN_PYTHON_PACKAGE_SUGGESTS "python3-numpy, python3-pandas, python3-dask, python3-distributed")
+  # What Python compiles of the modules goes with them.
+  set(CPACK_DEBIAN_PYTHON_PACKAGE_CONTROL_EXTRA "${PROJECT_SOURCE_DIR}/packaging/python/postinst"
+    "${PROJECT_SOURCE_DIR}/packaging/python/prerm")
+  set(CPACK_COMPONENT_PYTHON_DESCRIPTION "${about}This package has the module tav for Python, which reads, writes and\n\
+examines them.")
+endif()
+
 # What Debian asks of every package: its licence and its history.
 set(history "${PROJECT_BINARY_DIR}/changelog.Debian")
 configure_file(packaging/changelog.in "${history}" @ONLY)
@@ -68,8 +85,12 @@ add_custom_command(OUTPUT "${history}.gz"
   DEPENDS "${history}"
   VERBATIM)
 add_custom_target(package_history ALL DEPENDS "${history}.gz")
-foreach(pair IN ITEMS "runtime;libtav${TAV_ABI_VERSION}" "inspection;libtav-inspect${TAV_ABI_VERSION}"
-    "development;libtav-dev" "tools;tav-tools")
+set(documented "runtime\;libtav${TAV_ABI_VERSION}" "inspection\;libtav-inspect${TAV_ABI_VERSION}"
+  "development\;libtav-dev" "tools\;tav-tools")
+if(TAV_BUILD_PYTHON)
+  list(APPEND documented "python\;python3-tav")
+endif()
+foreach(pair IN LISTS documented)
   list(GET pair 0 component)
   list(GET pair 1 package)
   install(FILES packaging/copyright "${history}.gz"

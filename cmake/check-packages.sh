@@ -11,11 +11,12 @@ quietly() { "$@" >"$work/log" 2>&1 || { cat "$work/log"; return 1; }; }
 
 # The compiler by the name that preset release calls it by: then a compiler cache has all objects already.
 quietly cmake -S . -B "$build" -G Ninja -DCMAKE_CXX_COMPILER=g++ -DCMAKE_BUILD_TYPE=Release -DCMAKE_INSTALL_PREFIX=/usr \
-  -DTAV_BUILD_TESTS=OFF -DTAV_BUILD_EXAMPLES=OFF -DTAV_COMPRESS_MANUAL=ON
+  -DTAV_BUILD_TESTS=OFF -DTAV_BUILD_EXAMPLES=OFF -DTAV_COMPRESS_MANUAL=ON -DTAV_BUILD_PYTHON=ON \
+  -DPython3_EXECUTABLE=/usr/bin/python3
 quietly cmake --build "$build" --parallel "$(nproc)"
 quietly cpack --config "$build/CPackConfig.cmake" -B "$work/packages"
 mapfile -t packages < <(find "$work/packages" -maxdepth 1 -name '*.deb' | sort)
-((${#packages[@]} == 4)) || { echo "expected four packages, got: ${packages[*]}"; exit 1; }
+((${#packages[@]} == 5)) || { echo "expected five packages, got: ${packages[*]}"; exit 1; }
 
 echo "== lintian"
 lintian --fail-on error --suppress-tags initial-upload-closes-no-bugs "${packages[@]}"
@@ -47,7 +48,7 @@ echo "== hardened"
 for flag in $(DEB_BUILD_MAINT_OPTIONS=hardening=+all dpkg-buildflags --export=cmdline | grep -oE -e '-(fstack-protector|fcf-protection|fstack-clash|D_FORTIFY_SOURCE|Wformat|Werror=format)[^ "]*|-Wl,-z,[a-z]+' | sort -u); do
   grep -qF -e "$flag" "$build/build.ninja" || { echo "dpkg-buildflags has $flag, the build has not"; exit 1; }
 done
-tests/system/install/hardening.py "$root/usr/bin/tav" "$libraries"/lib{kor,tav,tav-inspect}.so.1
+tests/system/install/hardening.py "$root/usr/bin/tav" "$libraries"/lib{kor,tav,tav-inspect}.so.1 "$root"/usr/lib/python3/dist-packages/tav/_tav.*.so
 
 echo "== run"
 LD_LIBRARY_PATH=$libraries "$root/usr/bin/tav" --version
@@ -80,6 +81,15 @@ if command -v systemd-analyze >/dev/null; then
   systemd-analyze verify --man=no "$work/tav-snapshot.service"
   systemd-analyze security --offline=yes --threshold=30 --no-pager "$work/tav-snapshot.service" >"$work/log" || { cat "$work/log"; exit 1; }
 fi
+
+echo "== Python"
+modules=$root/usr/lib/python3/dist-packages
+# in_root COMMAND...: with the libraries and modules of the packages, and from elsewhere, where no others lie.
+in_root() { (cd "$work" && LD_LIBRARY_PATH=$libraries PYTHONPATH=$modules PYTHONDONTWRITEBYTECODE=1 "$@"); }
+in_root /usr/bin/python3 "$PWD/python/tests/installed.py" "$modules"
+in_root /usr/bin/python3 -m mypy --strict --no-error-summary --cache-dir="$work/mypy" -c 'import tav
+reader: tav.Reader = tav.open("x.tav")'
+
 for part in tav:main tav-inspect:inspect; do
   read -ra flags <<<"$(PKG_CONFIG_PATH=$libraries/pkgconfig pkg-config --cflags --libs "${part%%:*}")"
   g++ -std=c++20 "tests/system/install/outside/${part##*:}.cpp" -o "$work/outside" "${flags[@]}"
@@ -87,7 +97,7 @@ for part in tav:main tav-inspect:inspect; do
 done
 
 echo "== remove"
-quietly dpkg_here --purge tav-tools libtav-dev libtav-inspect1 libtav1
+quietly dpkg_here --purge python3-tav tav-tools libtav-dev libtav-inspect1 libtav1
 left=$(find "$root" -type f -not -path "$root/var/lib/dpkg/*")
 [[ -z $left ]] || { echo "left behind: $left"; exit 1; }
 echo "the packages install, run and go without a trace"

@@ -1,6 +1,6 @@
 #!/usr/bin/env bash
-# Builds what a release consists of: the Debian packages, the page, the extension for SQL, and the site.
-#   packaging/build.sh FOLDER [PART...]        FOLDER: where they go; parts: packages page sql site; all unless named
+# Builds what a release consists of: the Debian packages, the wheel, the page, the extension for SQL, and the site.
+#   packaging/build.sh FOLDER [PART...]        FOLDER: where they go; parts: packages wheel page sql site; all unless named
 # The same tree gives the same bytes wherever and whenever it is built: SOURCE_DATE_EPOCH is the time in them, that of the
 # last change in CHANGELOG.md unless it is set.
 set -euo pipefail
@@ -13,7 +13,7 @@ mkdir -p "$1"
 out=$(cd "$1" && pwd)
 shift
 parts=("$@")
-((${#parts[@]} > 0)) || parts=(packages page sql site)
+((${#parts[@]} > 0)) || parts=(packages wheel page sql site)
 : "${SOURCE_DATE_EPOCH:=$(date -d "$(grep -m 1 -oE '[0-9]{4}-[0-9]{2}-[0-9]{2}' CHANGELOG.md || echo 2026-11-22)" +%s)}"
 export SOURCE_DATE_EPOCH
 
@@ -23,11 +23,18 @@ quietly() { "$@" >"$work/log" 2>&1 || { cat "$work/log" >&2; return 1; }; }
 
 build_packages()
 {
-  cmake/install-packages.sh build package
-  quietly cmake --preset package
+  cmake/install-packages.sh build package python
+  quietly cmake --preset package -DTAV_BUILD_PYTHON=ON -DPython3_EXECUTABLE=/usr/bin/python3
   quietly cmake --build --preset package --parallel "$(nproc)"
   quietly cpack --config build/package/CPackConfig.cmake -B "$work/packages"
   find "$work/packages" -maxdepth 1 -name '*.deb' -exec cp {} "$out/" \;
+}
+
+build_wheel()
+{
+  cmake/install-packages.sh python
+  quietly python/build-wheel.sh "$work/wheel"
+  cp "$work"/wheel/*.whl "$out/"
 }
 
 build_page()
