@@ -36,12 +36,16 @@ const two = await open({threads: '2'});
 
 const table = `read_tav_table('${million}', each := '//cpu', columns := {'a': 'cpuSpeed', 'b': 'hostName'})`;
 const json = `read_json('${lines}', format = 'newline_delimited', columns = {"path": 'VARCHAR', "element": 'VARCHAR', "value": 'JSON'})`;
+await one.run(`CREATE TABLE kept AS SELECT path, tag FROM '${million}'`);
+// A group for each leaf; of the groups one row is handed out, since what JavaScript makes of a million rows is its own.
+const grouped = (from) => `SELECT count(*), max(n) FROM (SELECT path, tag, count(*) AS n FROM ${from} GROUP BY ALL)`;
 const queries = {
   'count of nodes': [one, `SELECT count(*) FROM '${million}'`],
   'count of nodes, JSON lines': [one, `SELECT count(*) FROM ${json}`],
   'sum by tag': [one, `SELECT tag, count(*), sum(number) FROM '${million}' GROUP BY tag`],
-  'group by path and tag': [one, `SELECT path, tag, count(*) FROM '${million}' GROUP BY ALL`],
-  'group by path and tag, JSON lines': [one, `SELECT path, element, count(*) FROM ${json} GROUP BY ALL`],
+  'group by path and tag': [one, grouped(`'${million}'`)],
+  'group by path and tag, of a table': [one, grouped('kept')],
+  'group by path and tag, JSON lines': [one, grouped(`(SELECT path, element AS tag FROM ${json})`)],
   'mean of a column': [one, `SELECT avg(a), count(b) FROM ${table}`],
   'mean of a column, CSV': [one, `SELECT avg(cpuSpeed), count(hostName) FROM '${csv}'`],
   'sum of 100 MB, one thread': [one, `SELECT tag, sum(number) FROM '${big}' GROUP BY tag`],
@@ -79,4 +83,5 @@ ratio('count to the pass over the columns', 'count of nodes', 'pass over the col
 ratio('one thread to two', 'sum of 100 MB, one thread', 'sum of 100 MB, two threads', 'at least 1.7');
 ratio('JSON lines to nodes, count', 'count of nodes, JSON lines', 'count of nodes', 'beside');
 ratio('CSV to table', 'mean of a column, CSV', 'mean of a column', 'beside');
-console.log(`group by path and tag: ${median('group by path and tag').toFixed(2)} s (at most 0.2)`);
+const groups = ['group by path and tag', 'group by path and tag, of a table'].map(median);
+console.log(`group by path and tag: ${groups[0].toFixed(2)} s (at most 0.2), of which the engine's own are ${groups[1].toFixed(2)} s`);

@@ -85,6 +85,12 @@ void fillNumbers(Vector& to, const Rows& rows)
   }
 }
 
+std::string_view textOf(const tav::detail::RawValue& raw)
+{
+  const size_t page = raw.type == TAV_TYPE_UTF8_STRING ? sizeof(uint16_t) : 0; // the code page before the text
+  return {reinterpret_cast<const char*>(raw.bytes) + page, raw.length() - page};
+}
+
 void fillTexts(Vector& to, const Rows& rows)
 {
   for (size_t i = 0; i < rows.count; ++i)
@@ -95,9 +101,7 @@ void fillTexts(Vector& to, const Rows& rows)
     uint64_t low = 0;
     if (kind == ValueKind::text)
     {
-      const tav::detail::RawValue raw = rows.all.rest(row);
-      const size_t page = raw.type == TAV_TYPE_UTF8_STRING ? sizeof(uint16_t) : 0; // the code page before the text
-      to.putText(i, {reinterpret_cast<const char*>(raw.bytes) + page, raw.length() - page});
+      to.putText(i, textOf(rows.all.rest(row)));
     }
     else if (kind == ValueKind::wide && !wideOf(rows.all.rest(row), high, low))
     {
@@ -142,6 +146,12 @@ void fillBytes(Vector& to, const Rows& rows)
     }
     to.putBytes(i, bytes);
   }
+}
+
+void fillPaths(Vector& to, const Rows& rows)
+{
+  const NodeColumns::Texts& paths = rows.all.paths;
+  to.putJoined(rows.count, paths.joined(rows.from, rows.count), [&](idx_t i) { return paths[rows.from + i].size(); });
 }
 
 } // namespace
@@ -210,7 +220,7 @@ void fillColumn(Vector& to, size_t column, const NodeRows& nodes, size_t from, s
   case kText: fillTexts(to, rows); break;
   case kTime: fillTimes(to, rows); break;
   case kBytes: fillBytes(to, rows); break;
-  default: each([&](size_t i, size_t row) { to.putBytes(i, rows.all.paths[row]); });
+  default: fillPaths(to, rows);
   }
 }
 

@@ -45,19 +45,33 @@ public:
   }
   void putBytes(idx_t row, std::string_view bytes)
   {
-    constexpr size_t inlined = sizeof(duckdb_string_t::value.inlined.inlined);
-    if (bytes.size() <= inlined)
+    if (bytes.size() <= kInlined)
     {
-      duckdb_string_t text{};
-      text.value.inlined.length = static_cast<uint32_t>(bytes.size());
-      if (!bytes.empty())
-      {
-        std::memcpy(text.value.inlined.inlined, bytes.data(), bytes.size());
-      }
-      put(row, text);
+      putInlined(row, bytes);
       return;
     }
     duckdb_vector_assign_string_element_len(vector_, row, bytes.data(), bytes.size());
+  }
+  /// Texts or bytes of the first rows, `joined` one behind the other; `sizeOf` tells how long each is. The engine is
+  /// handed all of them at once, and each row's value is a part of that.
+  template<class SizeOf>
+  void putJoined(idx_t rows, std::string_view joined, const SizeOf& sizeOf)
+  {
+    if (rows == 0 || joined.size() <= kInlined || joined.size() > kMostJoined)
+    {
+      for (idx_t row = 0; row < rows; ++row)
+      {
+        putBytes(row, joined.substr(0, sizeOf(row)));
+        joined.remove_prefix(sizeOf(row));
+      }
+      return;
+    }
+    duckdb_vector_assign_string_element_len(vector_, 0, joined.data(), joined.size());
+    const char* at = static_cast<duckdb_string_t*>(data_)->value.pointer.ptr;
+    for (idx_t row = 0; row < rows; ++row)
+    {
+      at = putPart(row, at, sizeOf(row));
+    }
   }
   /// The same text or bytes as a row before.
   void repeat(idx_t row, idx_t before) { put(row, static_cast<duckdb_string_t*>(data_)[before]); }
@@ -74,6 +88,35 @@ public:
   }
 
 private:
+  static constexpr size_t kInlined = sizeof(duckdb_string_t::value.inlined.inlined);
+  static constexpr size_t kMostJoined = size_t{1} << 30U; ///< bytes; the engine's texts have less than twice as many
+
+  void putInlined(idx_t row, std::string_view bytes)
+  {
+    duckdb_string_t text{};
+    text.value.inlined.length = static_cast<uint32_t>(bytes.size());
+    if (!bytes.empty())
+    {
+      std::memcpy(text.value.inlined.inlined, bytes.data(), bytes.size());
+    }
+    put(row, text);
+  }
+  /// A value that lies in memory of the vector. Returns where it ends.
+  const char* putPart(idx_t row, const char* at, size_t size)
+  {
+    if (size <= kInlined)
+    {
+      putInlined(row, {at, size});
+      return at + size;
+    }
+    duckdb_string_t text{};
+    text.value.pointer.length = static_cast<uint32_t>(size);
+    std::memcpy(text.value.pointer.prefix, at, sizeof(text.value.pointer.prefix));
+    text.value.pointer.ptr = const_cast<char*>(at);
+    put(row, text);
+    return at + size;
+  }
+
   duckdb_vector vector_;
   void* data_;
   uint64_t* validity_ = nullptr;

@@ -51,14 +51,14 @@ void NodeColumns::cut(size_t rows)
     }
   }
   count_ = std::min(count_, rows);
-  paths.resize(std::min(paths.size(), rows));
+  paths.cut(rows);
 }
 
 void NodeColumns::clear()
 {
   count_ = 0;
   rests_.clear();
-  paths.clear();
+  paths.cut(0);
   kept_.clear();
 }
 

@@ -204,7 +204,7 @@ private:
 
   void addText(const std::string& path)
   {
-    columns_->paths.push_back(path);
+    columns_->paths.add(path);
     texts_ += path.size();
   }
 

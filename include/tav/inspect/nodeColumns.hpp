@@ -2,11 +2,13 @@
 /// The nodes of streams as rows, column by column.
 #pragma once
 
+#include <algorithm>
 #include <cstddef>
 #include <cstdint>
 #include <memory>
 #include <optional>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "tav/cpp/decode.hpp"
@@ -68,6 +70,37 @@ public:
     T* items_ = nullptr;
   };
 
+  /// A text for each row, one behind the other.
+  class Texts
+  {
+  public:
+    size_t size() const { return ends_.size(); }
+    std::string_view operator[](size_t row) const { return joined(row, 1); }
+    /// Those of rows that follow on each other, as one.
+    std::string_view joined(size_t row, size_t count) const
+    {
+      const size_t from = row == 0 ? 0 : ends_[row - 1];
+      return std::string_view(text_).substr(from, count == 0 ? 0 : ends_[row + count - 1] - from);
+    }
+
+  private:
+    friend class NodeColumns;
+    friend class NodeReader;
+    void add(std::string_view text)
+    {
+      text_ += text;
+      ends_.push_back(text_.size());
+    }
+    void cut(size_t rows)
+    {
+      ends_.resize(std::min(ends_.size(), rows));
+      text_.resize(ends_.empty() ? 0 : ends_.back());
+    }
+
+    std::string text_{};
+    std::vector<size_t> ends_{};
+  };
+
   NodeColumns() = default;
   TAV_INSPECT_API ~NodeColumns();
   NodeColumns(const NodeColumns&) = delete;
@@ -100,7 +133,7 @@ public:
   Column<uint16_t> type{};
   Column<uint16_t> key{};
   Column<ValueKind> kind{};
-  std::vector<std::string> paths{}; ///< where they are asked for
+  Texts paths{}; ///< where they are asked for
 
 private:
   friend class NodeReader;

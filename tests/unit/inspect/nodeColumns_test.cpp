@@ -80,7 +80,7 @@ RowsSeen byReader(const Bytes& bytes, const tav::inspect::Form& form, bool paths
     for (size_t i = 0; i < columns.count(); ++i)
     {
       seen.rows.push_back(line(columns.parent[i], columns.offset[i], columns.size[i], columns.depth[i], columns.id[i],
-                               columns.type[i], paths ? columns.paths[i] : std::string()));
+                               columns.type[i], std::string(paths ? columns.paths[i] : "")));
     }
   }
   return seen;
