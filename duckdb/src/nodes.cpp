@@ -8,7 +8,7 @@
 #include <vector>
 
 #include "duckdb/src/nodeFill.h"
-#include "duckdb/src/nodes.h"
+#include "duckdb/src/parts.h"
 
 namespace tav::sql
 {
@@ -38,6 +38,11 @@ void bindNodes(duckdb_bind_info info)
   });
 }
 
+std::vector<inspect::Part> planNodes(inspect::ByteSource& source, const inspect::PlanOptions& options)
+{
+  return inspect::plan(source, options);
+}
+
 /// What the threads of one scan share.
 struct NodeScan
 {
@@ -46,7 +51,7 @@ struct NodeScan
         wanted(std::move(columns)), options{.onDamage = given.onDamage,
                                             .values = wants(kNumber) || wants(kText) || wants(kTime) || wants(kBytes),
                                             .paths = wants(kPath)},
-        tasks(given, options.paths)
+        tasks(given, options.paths ? Tasks::Plan() : planNodes)
   {
   }
 
@@ -55,7 +60,7 @@ struct NodeScan
   const Given& given;
   std::vector<size_t> wanted;
   inspect::NodeReaderOptions options;
-  NodeTasks tasks;
+  Tasks tasks;
 };
 
 /// What one thread reads.
@@ -71,7 +76,7 @@ public:
 
 private:
   void open(const NodeScan& scan, const std::string& file);
-  void readPart(const NodeScan& scan, const NodeTask& task);
+  void readPart(const NodeScan& scan, const Task& task);
   void readWhole();
 
   std::optional<inspect::Document> document_{};
@@ -93,7 +98,7 @@ void NodeThread::open(const NodeScan& scan, const std::string& file)
   }
 }
 
-void NodeThread::readPart(const NodeScan& scan, const NodeTask& task)
+void NodeThread::readPart(const NodeScan& scan, const Task& task)
 {
   try
   {
@@ -151,7 +156,7 @@ bool NodeThread::advance(NodeScan& scan)
       continue;
     }
     columns_.clear();
-    const std::optional<NodeTask> task = scan.tasks.next();
+    const std::optional<Task> task = scan.tasks.next();
     if (!task)
     {
       return false;

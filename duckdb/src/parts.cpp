@@ -4,7 +4,7 @@
 #include <system_error>
 #include <utility>
 
-#include "duckdb/src/nodes.h"
+#include "duckdb/src/parts.h"
 #include "tav/inspect/problem.hpp"
 
 namespace tav::sql
@@ -52,25 +52,25 @@ void PartedFile::fail()
   changed_.notify_all();
 }
 
-uint64_t NodeTasks::sizeOf(const std::string& file) const
+uint64_t Tasks::sizeOf(const std::string& file) const
 {
   std::error_code ec;
   const uint64_t size = std::filesystem::file_size(file, ec);
   return ec ? 0 : size;
 }
 
-uint64_t NodeTasks::count() const
+uint64_t Tasks::count() const
 {
   uint64_t count = 0;
   for (const std::string& file : given_.files)
   {
-    const uint64_t size = whole_ ? 0 : sizeOf(file);
+    const uint64_t size = !plan_ ? 0 : sizeOf(file);
     count += size < kLarge ? 1 : size / kPart + 1;
   }
   return count;
 }
 
-std::optional<NodeTask> NodeTasks::next()
+std::optional<Task> Tasks::next()
 {
   const std::lock_guard lock(mutex_);
   if (parted_ == nullptr)
@@ -80,16 +80,16 @@ std::optional<NodeTask> NodeTasks::next()
       return {};
     }
     const std::string& file = given_.files[file_++];
-    if (whole_ || sizeOf(file) < kLarge)
+    if (!plan_ || sizeOf(file) < kLarge)
     {
-      return NodeTask{.file = file};
+      return Task{.file = file};
     }
     const inspect::Document document = given_.open(file);
     parted_ = std::make_shared<PartedFile>(
-        file, inspect::plan(document.source(), {.targetBytes = kPart, .form = given_.form}));
+        file, plan_(document.source(), {.targetBytes = kPart, .form = given_.form}));
     part_ = 0;
   }
-  NodeTask task{parted_->name, parted_, part_++};
+  Task task{parted_->name, parted_, part_++};
   if (part_ == parted_->count())
   {
     parted_.reset();

@@ -1,5 +1,5 @@
 // read_tav_table: a row for each node that a path leads to, columns by paths from there.
-#include <atomic>
+#include <algorithm>
 #include <memory>
 #include <optional>
 #include <string>
@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "duckdb/src/given.h"
+#include "duckdb/src/parts.h"
 #include "duckdb/src/vectors.h"
 #include "tav/inspect/table.hpp"
 
@@ -176,11 +177,13 @@ struct TableScan
   std::vector<size_t> wanted{};               ///< columns of the call; kFileColumn
   std::vector<size_t> places{};               ///< of the wanted columns in `query`
   std::optional<inspect::TableQuery> query{}; ///< with the columns alone that are wanted
-  std::atomic<size_t> next{0};                ///< the first file that nobody has taken
+  Tasks tasks;
 };
 
 TableScan::TableScan(const TableCall& bound, duckdb_init_info info)
-    : call(bound)
+    : call(bound), tasks(bound.given, [this](inspect::ByteSource& source, const inspect::PlanOptions& options) {
+        return inspect::planTable(source, *query, options);
+      })
 {
   std::vector<inspect::TableColumn> columns;
   for (idx_t i = 0; i < duckdb_init_get_column_count(info); ++i)
@@ -200,7 +203,9 @@ TableScan::TableScan(const TableCall& bound, duckdb_init_info info)
 /// What one thread reads.
 struct TableThread
 {
-  std::unique_ptr<FileRows> file{};
+  std::string name{};                          ///< of the file at hand
+  std::optional<inspect::Document> document{}; ///< of which parts are read
+  std::unique_ptr<FileRows> file{};            ///< read as a whole
   std::optional<Table> rows{};
   uint64_t row = 0; ///< the next one of `rows`
 };
@@ -210,7 +215,7 @@ void initTable(duckdb_init_info info)
   guarded(info, duckdb_init_set_error, [&] {
     const auto& call = *static_cast<const TableCall*>(duckdb_init_get_bind_data(info));
     auto scan = std::make_unique<TableScan>(call, info);
-    duckdb_init_set_max_threads(info, call.given.files.size());
+    duckdb_init_set_max_threads(info, scan->tasks.count());
     duckdb_init_set_init_data(info, scan.release(), destroy<TableScan>);
   });
 }
@@ -222,23 +227,80 @@ void initTableThread(duckdb_init_info info)
   });
 }
 
+/// All rows of a part. It is read once more where the parts before it do not lead to it.
+void readPart(const TableScan& scan, const Task& task, TableThread& thread)
+{
+  if (!thread.document || thread.name != task.file)
+  {
+    thread.document.emplace(scan.call.given.open(task.file));
+  }
+  try
+  {
+    for (;;)
+    {
+      thread.rows.emplace(*scan.query);
+      inspect::TableReader reader(thread.document->source(), *scan.query, task.parted->part(task.part),
+                                  {.onDamage = scan.call.given.onDamage});
+      while (reader.next(*thread.rows))
+      {
+      }
+      Given::requireLength(task.file, *thread.document);
+      const auto end = reader.stopped() ? inspect::PartEnd{} : reader.end();
+      const bool isSure = task.parted->settle(task.part, 0, {}, end).has_value();
+      if (isSure && reader.stopped())
+      {
+        throw inspect::Error(*reader.stopped());
+      }
+      if (isSure)
+      {
+        return;
+      }
+    }
+  }
+  catch (...)
+  {
+    task.parted->fail();
+    throw;
+  }
+}
+
+/// Begins with the next file, or reads a part of one; false where none is left.
+bool begin(TableScan& scan, TableThread& thread)
+{
+  const std::optional<Task> task = scan.tasks.next();
+  if (!task)
+  {
+    return false;
+  }
+  if (task->parted != nullptr)
+  {
+    readPart(scan, *task, thread);
+  }
+  else
+  {
+    thread.file = std::make_unique<FileRows>(scan.call.given, *scan.query, task->file);
+  }
+  thread.name = task->file;
+  return true;
+}
+
 /// Whether there are rows that have not been handed out.
 bool advance(TableScan& scan, TableThread& thread)
 {
   constexpr uint64_t batch = 4096;
   while (!thread.rows || thread.row == thread.rows->rows())
   {
+    thread.rows.reset();
+    thread.row = 0;
     if (thread.file == nullptr)
     {
-      const size_t file = scan.next++;
-      if (file >= scan.call.given.files.size())
+      if (!begin(scan, thread))
       {
         return false;
       }
-      thread.file = std::make_unique<FileRows>(scan.call.given, *scan.query, scan.call.given.files[file]);
+      continue;
     }
     thread.rows.emplace(*scan.query);
-    thread.row = 0;
     if (!thread.file->next(*thread.rows, batch))
     {
       thread.file.reset();
@@ -320,11 +382,11 @@ void fill(const TableScan& scan, TableThread& thread, duckdb_data_chunk output)
     {
       if (scan.wanted[i] == kFileColumn)
       {
-        to.putText(row, thread.file->name);
+        to.putText(row, thread.name);
         continue;
       }
       const Cell cell = thread.rows->cell(scan.places[i], thread.row + row);
-      putCell(to, scan.call.types[scan.wanted[i]], row, cell, buffer, thread.file->name);
+      putCell(to, scan.call.types[scan.wanted[i]], row, cell, buffer, thread.name);
     }
   }
   thread.row += count;

@@ -1,6 +1,6 @@
 // read_tav_table: a row for each node that a path leads to, as `tav table` writes it.
 import assert from 'node:assert/strict';
-import {writeFileSync} from 'node:fs';
+import {readFileSync, writeFileSync} from 'node:fs';
 import {join} from 'node:path';
 import {test} from 'node:test';
 
@@ -130,4 +130,74 @@ test('damage ends a query unless it is skipped', async () => {
   const from = (how) => `SELECT count(*) FROM read_tav_table('${file}', each := '//*', columns := {'a': '.'}, on_damage := '${how}')`;
   await assert.rejects(value(connection, from('stop')), /damaged\.tav: 0x/);
   assert.ok(await value(connection, from('skip')) > 0n);
+});
+
+/** A file of so much that it is read in parts, each row of which tells its place. */
+function large()
+{
+  const host = (i) => ({hostName: `host ${i}`, cpu: {cpuOnline: i, osName: 'a text of some length, so that the file is large'.repeat(2)}});
+  return make(join(work, 'hosts.tav'), {system: {host: Array.from({length: 110_000}, (_, i) => host(i))}});
+}
+const largeFile = large();
+
+/** The rows as `tav table` has them, by any number of threads; with one also in their order. */
+async function agreeInParts(file)
+{
+  const columns = {name: 'hostName', cpus: 'cpu/cpuOnline', os: 'cpu/osName'};
+  const table = `read_tav_table('${file}', each := '//host', columns := ${columnsOf(columns)}, on_damage := 'skip')`;
+  const count = await agree([file], '//host', columns);
+  const all = await rows(connection, `SELECT count(*) AS n, sum(hash(t)) AS sum FROM ${table} AS t`);
+  for (const threads of ['1', '2', '5'])
+  {
+    assert.deepEqual(await rows(await open({threads}), `SELECT count(*) AS n, sum(hash(t)) AS sum FROM ${table} AS t`), all);
+  }
+  const one = await open({threads: '1'});
+  const names = (await one.runAndReadAll(`SELECT name FROM ${table}`)).getColumns()[0];
+  const told = program('tools/tav', ['table', file, '--each', '//host', '--col', 'hostName', '--on-damage', 'skip', '--format', 'tsv']);
+  assert.deepEqual(names.map((name) => name ?? ''), told.toString().split('\n').slice(1, -1));
+  return count;
+}
+
+test('parts of a large file are one table', async () => {
+  assert.ok(readFileSync(largeFile).length > 16 << 20);
+  assert.equal(await agreeInParts(largeFile), 110_000);
+});
+
+test('parts of a large damaged file are one table', async () => {
+  const file = join(work, 'hostsDamaged.tav');
+  const bytes = readFileSync(largeFile);
+  for (let i = 1; i < 9; ++i)
+  {
+    const from = Math.floor(bytes.length * i / 9);
+    bytes.fill('~', from, from + 30); // which is text where it falls into one
+  }
+  writeFileSync(file, bytes);
+  assert.ok(await agreeInParts(file) > 100_000);
+  for (const threads of ['1', '3'])
+  {
+    await assert.rejects(rows(await open({threads}), `SELECT count(*) FROM read_tav_table('${file}', each := '//host', columns := {'a': 'hostName'})`),
+                         /hostsDamaged\.tav: 0x/);
+  }
+});
+
+test('places that look like nodes do not cut a table there', async () => {
+  // Payloads of as many bytes as a part, full of what is a host elsewhere.
+  const host = readFileSync(make(join(work, 'host.tav'), {host: {hostName: 'none of them', cpuOnline: 1}}));
+  const filler = 'x'.repeat(6 << 20);
+  const file = make(join(work, 'seams.tav'), {system: {host: Array.from({length: 8}, (_, n) => ({hostName: `real ${n}`, osVersion: filler}))}});
+  const bytes = readFileSync(file);
+  for (let at = 0; (at = bytes.indexOf(filler.slice(0, 1000), at)) >= 0; at += filler.length)
+  {
+    bytes.fill(host, at, at + filler.length);
+  }
+  writeFileSync(file, bytes);
+  assert.ok(readFileSync(file).length > 16 << 20);
+  assert.equal(await agreeInParts(file), 8);
+});
+
+test('streams of several forms one behind the other are one table, in parts', async () => {
+  const file = join(work, 'several.tav');
+  const other = make(join(work, 'other.tav'), {system: {host: Array(2000).fill({hostName: 'b', cpuOnline: 9})}}, '--byte-order', 'big', '--align');
+  writeFileSync(file, Buffer.concat([readFileSync(largeFile), readFileSync(other), readFileSync(largeFile)]));
+  assert.equal(await agreeInParts(file), 222_000);
 });

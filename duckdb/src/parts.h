@@ -1,16 +1,18 @@
-/// The parts of files that the threads of one scan of nodes share.
+/// The parts of files that the threads of one scan share.
 #pragma once
 
 #include <condition_variable>
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <mutex>
 #include <optional>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "duckdb/src/given.h"
-#include "tav/inspect/nodeColumns.hpp"
+#include "tav/inspect/plan.hpp"
 
 namespace tav::sql
 {
@@ -53,7 +55,7 @@ private:
 };
 
 /// What a thread reads next: a file, or a part of one.
-struct NodeTask
+struct Task
 {
   std::string file{};
   std::shared_ptr<PartedFile> parted{}; ///< null: the whole file
@@ -61,14 +63,17 @@ struct NodeTask
 };
 
 /// Hands out files, and parts of large ones, in their order.
-class NodeTasks
+class Tasks
 {
 public:
-  /// `whole`: no file is cut.
-  NodeTasks(const Given& given, bool whole)
-      : given_(given), whole_(whole) {}
+  /// Cuts a file.
+  using Plan = std::function<std::vector<inspect::Part>(inspect::ByteSource&, const inspect::PlanOptions&)>;
 
-  std::optional<NodeTask> next();
+  /// Without a plan no file is cut.
+  Tasks(const Given& given, Plan plan)
+      : given_(given), plan_(std::move(plan)) {}
+
+  std::optional<Task> next();
   /// How many there are, about.
   uint64_t count() const;
 
@@ -79,7 +84,7 @@ private:
   uint64_t sizeOf(const std::string& file) const;
 
   const Given& given_;
-  bool whole_;
+  Plan plan_;
   std::mutex mutex_{};
   size_t file_ = 0;
   std::shared_ptr<PartedFile> parted_{}; ///< of which parts are left
