@@ -288,7 +288,8 @@ check_browser()
 {
   local status=0
   web/build.sh >"$work/build.log" 2>&1 || { tail -n 40 "$work/build.log"; return 1; }
-  (cd web && npm test --silent) >"$work/tests.log" 2>&1 || status=$?
+  build release --target tav_tool
+  (cd web && TAV_TOOL=$PWD/../build/release/tools/tav npm test --silent) >"$work/tests.log" 2>&1 || status=$?
   count_browser
   if ((status != 0)); then
     sed -n '/^not ok/,/^  \.\.\./p' "$work/tests.log"

@@ -21,10 +21,12 @@ work=$(mktemp -d)
 trap 'rm -rf "$work"' EXIT
 quietly() { "$@" >"$work/log" 2>&1 || { cat "$work/log" >&2; return 1; }; }
 
+# The packages bring the page for `tav view`.
 build_packages()
 {
-  cmake/install-packages.sh build package python
-  quietly cmake --preset package -DTAV_BUILD_PYTHON=ON -DPython3_EXECUTABLE=/usr/bin/python3
+  cmake/install-packages.sh build package browser python
+  quietly web/build.sh
+  quietly cmake --preset package -DTAV_PAGE="$PWD/web/dist/tav.html" -DTAV_BUILD_PYTHON=ON -DPython3_EXECUTABLE=/usr/bin/python3
   quietly cmake --build --preset package --parallel "$(nproc)"
   quietly cpack --config build/package/CPackConfig.cmake -B "$work/packages"
   find "$work/packages" -maxdepth 1 -name '*.deb' -exec cp {} "$out/" \;

@@ -27,6 +27,7 @@ const style = transformSync(source("style.css"), { loader: "css", minify: true }
 const packed = gzipSync(readFileSync(modulePath), { level: 9 });
 const policy = [
   "default-src 'none'",
+  "connect-src 'none'", // `tav view` puts the one address in its place
   `script-src ${hashOf(script)} 'wasm-unsafe-eval'`,
   `style-src ${hashOf(style)}`,
   "worker-src blob:",

@@ -29,6 +29,9 @@ inline std::string textOf(const std::filesystem::path& path)
   return {utf8.begin(), utf8.end()};
 }
 
+/// The path of the program itself; empty where the system does not tell it.
+std::filesystem::path programPath();
+
 /// The paths that a variable of the environment lists, as PATH does; none when it is not set.
 std::vector<std::string> pathList(const char* variable);
 

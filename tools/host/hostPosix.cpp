@@ -4,6 +4,7 @@
 #include <cstdlib>
 #include <sys/ioctl.h>
 #include <sys/wait.h>
+#include <system_error>
 #include <unistd.h>
 
 #include "tools/host/host.h"
@@ -31,6 +32,12 @@ extern "C" void endBySignal(int number)
 std::vector<std::string> commandLine(int argc, char** argv)
 {
   return {argv + std::min(argc, 1), argv + argc};
+}
+
+std::filesystem::path programPath()
+{
+  std::error_code error;
+  return std::filesystem::read_symlink("/proc/self/exe", error);
 }
 
 std::vector<std::string> pathList(const char* variable)

@@ -50,6 +50,14 @@ std::vector<std::string> commandLine(int argc, char** argv)
   return texts;
 }
 
+std::filesystem::path programPath()
+{
+  constexpr size_t kLongest = 32768; // of a path, with its end
+  std::wstring path(kLongest, L'\0');
+  path.resize(GetModuleFileNameW(nullptr, path.data(), static_cast<DWORD>(path.size())));
+  return {path};
+}
+
 std::vector<std::string> pathList(const char* variable)
 {
   std::wstring name;

@@ -67,8 +67,8 @@ std::string helpText()
       text += entry(command->name, command->summary, 14);
     }
   }
-  // A terminal has 24 lines: what is about the program itself is in one.
-  text += "\n'tav help COMMAND' tells more, with examples; 'tav completion SHELL' is for bash, zsh and fish.\n"
+  // A terminal has 24 lines: what is about the program itself is in one, and none is empty before it.
+  text += "'tav help COMMAND' tells more, with examples; 'tav completion SHELL' is for bash, zsh and fish.\n"
           "Exit status: 0 fine; 1 findings or no match; 2 wrong usage or trouble; 3 too damaged to go on.\n";
   return text;
 }

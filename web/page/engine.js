@@ -23,7 +23,7 @@ export class Engine {
   static async of(given, choice) {
     const engine = new Engine();
     await engine.#begin();
-    await engine.#send({ name: "give", as: given.name, file: given.file });
+    await engine.give(given.name, given.file);
     engine.given = given;
     engine.opened = await engine.call("tavOpen", {
       texts: [given.name, choice.dictionary ?? ""],

@@ -4,6 +4,7 @@ import { Tree } from "./tree.js";
 import { Bytes } from "./bytes.js";
 import { byId, copy, counted, fill, h, hex } from "./dom.js";
 import { setUpPanels } from "./panels.js";
+import { servedFile } from "./served.js";
 
 export const page = globalThis.tavPage = {
   given: undefined, // {name, file}
@@ -176,3 +177,5 @@ function setUp() {
 }
 
 setUp();
+const served = servedFile();
+served && run(async () => open(await served));

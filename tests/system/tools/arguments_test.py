@@ -6,7 +6,7 @@ import unittest
 from support import EMULATOR, WINDOWS, ToolTest, tav
 
 COMMANDS = ("snapshot", "info", "tree", "print", "get", "hex", "elements", "json", "build", "xml", "check", "recover", "diff",
-            "schema", "table", "extract", "cat", "set", "help", "completion")
+            "schema", "table", "extract", "cat", "set", "view", "help", "completion")
 COMMON = ("--byte-order", "--root", "--align", "--no-align", "--ring", "--spool-limit", "--trace", "--trace-probe",
           "--force", "--stats")
 
@@ -120,7 +120,7 @@ class CommonOptions(ToolTest):
                     self.assertEqual(refused, option not in listed)
 
     def test_options_without_an_effect_are_not_in_the_help(self):
-        for command, options in (("elements", set()), ("help", set()), ("completion", set()),
+        for command, options in (("elements", set()), ("view", set()), ("help", set()), ("completion", set()),
                                  ("build", {"--byte-order", "--root", "--align", "--no-align", "--force"}),
                                  ("snapshot", {"--byte-order", "--root", "--align", "--no-align", "--force", "--trace",
                                                "--trace-probe"}),
