@@ -3,13 +3,14 @@
 import { createHash } from "node:crypto";
 import { mkdirSync, readFileSync, writeFileSync } from "node:fs";
 import { dirname, join } from "node:path";
+import { fileURLToPath } from "node:url";
 import { gzipSync } from "node:zlib";
 import { buildSync, transformSync } from "esbuild";
 
 const MOST_PAGE = 300 * 1024;
 const MOST_MODULE = 150 * 1024;
 
-const here = dirname(new URL(import.meta.url).pathname);
+const here = dirname(fileURLToPath(import.meta.url));
 const [modulePath, out] = process.argv.slice(2);
 const source = (name) => readFileSync(join(here, "page", name), "utf8");
 
