@@ -21,7 +21,7 @@ doxygen docs/Doxyfile
 cp -r build/reference/html "$work/source/extra/reference"
 if [[ -f web/dist/tav.html ]]; then cp web/dist/tav.html "$work/source/extra/"; fi
 
-TAV_VERSION=$(cmake/version.sh) /usr/bin/python3 -m sphinx -q -W --keep-going -b html "$work/source" "$work/site"
+TAV_VERSION=$(cmake/version.sh) /usr/bin/python3 -m sphinx -q -W --keep-going -b html -d "$work/trees" "$work/source" "$work/site"
 docs/site/check_site.py "$work/site"
 rm -rf "$site"
 mkdir -p "$(dirname "$site")"

@@ -1,6 +1,7 @@
 #!/usr/bin/env python3
 """Every link inside the built site leads to a file of it and to an anchor there; no page loads anything from elsewhere;
-the search knows words of each page.
+the search knows words of each page; and nothing in it is only the build's, or names the folder of the build, `source` beside
+it, which would make each build another one.
 
     check_site.py FOLDER
 """
@@ -46,11 +47,23 @@ def failures_of(path, page, pages):
             yield f"{path}: {target} has no such place"
 
 
+def leftovers(root):
+    """What the build left in the site."""
+    source = str(root.parent / "source").encode()
+    for path in sorted(path for path in root.rglob("*") if path.is_file()):
+        name = path.relative_to(root)
+        if any(part.startswith(".") and part != ".buildinfo" for part in name.parts):
+            yield f"{name} is nothing for readers"
+        elif source in path.read_bytes():
+            yield f"{name} names the folder that it was built from"
+
+
 def main():
     root = pathlib.Path(sys.argv[1]).resolve()
     own = [path for path in root.rglob("*.html") if "reference" not in path.relative_to(root).parts[:1]]
     pages = {path: Page(path.read_text(encoding="utf-8")) for path in own if path.name != "tav.html"}
     failures = [line for path, page in pages.items() for line in failures_of(path, page, pages)]
+    failures += leftovers(root)
     words = (root / "searchindex.js").read_text(encoding="utf-8")
     failures += [f"the search does not know {name}" for name in ("docs/tav", "docs/producers") if f'"{name}"' not in words]
     print(*failures, sep="\n", end="\n" if failures else "")
