@@ -61,7 +61,7 @@ def leftovers(root):
 def main():
     root = pathlib.Path(sys.argv[1]).resolve()
     own = [path for path in root.rglob("*.html") if "reference" not in path.relative_to(root).parts[:1]]
-    pages = {path: Page(path.read_text(encoding="utf-8")) for path in own if path.name != "tav.html"}
+    pages = {path: Page(path.read_text(encoding="utf-8")) for path in own if path != root / "tav.html"}
     failures = [line for path, page in pages.items() for line in failures_of(path, page, pages)]
     failures += leftovers(root)
     words = (root / "searchindex.js").read_text(encoding="utf-8")
