@@ -5,7 +5,6 @@ import signal
 import struct
 import subprocess
 import threading
-import time
 import unittest
 
 from support import PATIENCE, TAV, WINDOWS, ToolTest, tav, until
@@ -89,7 +88,8 @@ class Follow(ToolTest):
         self.append(group(SYSTEM, number(0)))
         self.path.unlink()
         with subprocess.Popen([*TAV, "snapshot", "--append", "--every", "20ms", "-o", str(self.path)]) as writer:
-            self.assertTrue(until(lambda: self.path.exists() and self.path.stat().st_size))
+            timestamp = "get", self.path, "/system/timestamp"
+            self.assertTrue(until(lambda: self.path.exists() and self.path.stat().st_size and tav(*timestamp).out))
             following = self.follow("get", "/system/timestamp")
             seen = following.take(12)
             writer.kill()
@@ -128,7 +128,9 @@ class Follow(ToolTest):
                                 "--paths")
         begin = self.path.stat().st_size
         self.append(group(SYSTEM, group(HOST, number(7), name("eve"), size=OPEN), size=OPEN))
-        time.sleep(0.3)
+        other = self.follow("tree")  # it does not wait for the root
+        self.assertEqual(len(other.take(8)), 8)
+        other.end()
         self.assertTrue(following.lines.empty())
         host = number(7) + name("eve") + number(8)
         with self.path.open("r+b") as file:
