@@ -15,7 +15,8 @@ options=(-std=c++20 -Wall -Wextra -Wpedantic -Werror)
 sed 's|^#include "tav/tav.hpp"$|import tav;|' "$root/examples/layer_tour.cpp" >"$work/layer_tour.cpp"
 grep -qx 'import tav;' "$work/layer_tour.cpp"
 cp "$here/imports.cpp" "$work/"
-cd "$work" # where the tour writes
+export TMPDIR=$work # where the tour writes
+cd "$work"
 for program in imports layer_tour; do
   "$compiler" "${options[@]}" -fmodule-file=tav=tav.pcm "$program.cpp" tav.pcm -o "$program" -L "$build" -ltav -lkor
   LD_LIBRARY_PATH=$build "./$program"
