@@ -118,9 +118,4 @@ inline std::vector<Form> accessAndOrder()
   return forms;
 }
 
-inline std::string formOf(const ::testing::TestParamInfo<Form>& row)
-{
-  return formName(row.param);
-}
-
 } // namespace test

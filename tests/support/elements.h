@@ -102,6 +102,11 @@ inline Bytes bytesOfText(std::string_view text)
   return {text.begin(), text.end()};
 }
 
+inline Element u16(uint16_t elm, uint16_t value, bool wide = true, uint32_t info = 0)
+{
+  return element(wide, TAV_TYPE_UINT16, elm, bytesOfValue(value), info);
+}
+
 inline Element u32(uint16_t elm, uint32_t value, bool wide = true, uint32_t info = 0)
 {
   return element(wide, TAV_TYPE_UINT32, elm, bytesOfValue(value), info);
@@ -132,6 +137,12 @@ inline Element group64(uint16_t elm, uint16_t type = TAV_TYPE_HEADER64, uint32_t
 inline Element group32(uint16_t elm, uint32_t size = 0)
 {
   return {header32(size, TAV_TYPE_HEADER32, elm), {}};
+}
+
+/// A group with a header of this width, and so its children.
+inline Element groupOf(bool wide, uint16_t elm)
+{
+  return wide ? group64(elm) : group32(elm);
 }
 
 } // namespace test

@@ -36,6 +36,21 @@ inline std::ostream& operator<<(std::ostream& out, const Printed& call)
              << call.text;
 }
 
+/// What XML begins with.
+inline const std::string kProlog = "<?xml version=\"1.0\" encoding=\"UTF-8\" ?>\n";
+
+/// Lines that begin with `before`, which becomes `now`.
+inline std::string moved(const std::string& lines, const std::string& before, const std::string& now)
+{
+  std::istringstream in(lines);
+  std::string all;
+  for (std::string line; std::getline(in, line);)
+  {
+    all += now + line.substr(before.size()) + "\n";
+  }
+  return all;
+}
+
 /// tavPrintSubtree to a stream.
 inline Printed printSubtree(uint64_t options, TAVHandle* handle, TAVHeaderData* start = nullptr)
 {

@@ -54,6 +54,8 @@ inline std::string formName(const Form& form)
   return name + (form.root32 ? "Root32" : "");
 }
 
+inline constexpr auto kFormName = [](const auto& instance) { return formName(instance.param); };
+
 inline void check(uint32_t rc, const char* what)
 {
   if (rc != TAV_RC_OK)

@@ -5,6 +5,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include "support/rows.h"
 #include "support/traceLog.h"
 #include "support/writing.h"
 #include "tav/probes.h"
@@ -19,15 +20,8 @@ using namespace test;
 constexpr uint16_t kCpu = 60110; // 0xEACE
 constexpr uint64_t kBefore = 0xABCDEF;
 
-std::string formOf(const ::testing::TestParamInfo<Form>& instance)
-{
-  return formName(instance.param);
-}
-
-class AddElement : public ::testing::TestWithParam<Form>
-{
-};
-INSTANTIATE_TEST_SUITE_P(Forms, AddElement, ::testing::ValuesIn(allForms()), formOf);
+using AddElement = OverForms;
+INSTANTIATE_TEST_SUITE_P(Forms, AddElement, ::testing::ValuesIn(allForms()), kFormName);
 
 const char* nodes64(const Form& form)
 {
@@ -139,18 +133,12 @@ TEST_P(AddElement, LeavesTheCallersHeaderInHostOrder)
   EXPECT_EQ(after.hdr64.elm, kCpu);
 }
 
-struct Layout
+struct Layout : Row
 {
-  const char* name;
   uint16_t type;
   const char* payload;
   const char* reversed;
 };
-
-void PrintTo(const Layout& row, std::ostream* out)
-{
-  *out << "type " << row.type;
-}
 
 class PayloadOf : public ::testing::TestWithParam<std::tuple<Layout, bool>>
 {
@@ -208,10 +196,7 @@ constexpr Layout kLayouts[] = {
 };
 
 INSTANTIATE_TEST_SUITE_P(Types, PayloadOf, ::testing::Combine(::testing::ValuesIn(kLayouts), ::testing::Bool()),
-                         [](const auto& instance) {
-                           return std::string(std::get<0>(instance.param).name) +
-                                  (std::get<1>(instance.param) ? "Under64" : "Under32");
-                         });
+                         kRowNameUnder);
 
 TEST(AddElementArray, OfAnyLengthIsReversedToItsLastUnit)
 {
@@ -352,9 +337,8 @@ TEST(AddElementMode, OfUpdatingWritesToo)
 }
 
 // Which header forms may stand where. The open group is made by hand: not every one can be opened.
-struct Place
+struct Place : Row
 {
-  const char* name;
   uint16_t parentHdr; // 0: no group is open
   uint16_t parentType;
   uint16_t hdrType;
@@ -362,11 +346,6 @@ struct Place
   uint32_t code;
   uint32_t point;
 };
-
-void PrintTo(const Place& row, std::ostream* out)
-{
-  *out << row.name;
-}
 
 constexpr Place kPlaces[] = {
     {"Root32OfType1", 0, 0, 1, 1, TAV_RC_OK, 0},
@@ -480,7 +459,7 @@ TEST(GroupOf32BitsThatAnnounces64, TakesNoNodeInAnyWay)
 }
 
 INSTANTIATE_TEST_SUITE_P(Rules, ChildAgainstParent, ::testing::ValuesIn(kPlaces),
-                         [](const auto& instance) { return std::string(instance.param.name); });
+                         kRowName);
 
 TEST(ChildAgainstParentTrace, BeginsWithTheLabelAndTheChild)
 {

@@ -5,6 +5,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include "support/rows.h"
 #include "support/traceLog.h"
 #include "support/writing.h"
 #include "tav/probes.h"
@@ -16,11 +17,8 @@ namespace
 using namespace tav;
 using namespace test;
 
-class AddStream : public ::testing::TestWithParam<Form>
-{
-};
-INSTANTIATE_TEST_SUITE_P(Forms, AddStream, ::testing::ValuesIn(allForms()),
-                         [](const auto& instance) { return formName(instance.param); });
+using AddStream = OverForms;
+INSTANTIATE_TEST_SUITE_P(Forms, AddStream, ::testing::ValuesIn(allForms()), kFormName);
 
 TEST_P(AddStream, CopiesTheBytesWithoutSwapOrPadding)
 {
@@ -68,20 +66,14 @@ TEST_P(AddStream, OpensNoGroup)
 }
 
 // Which header kind fits which open group.
-struct Kind
+struct Kind : Row
 {
-  const char* name;
   uint16_t parentHdr; // 0: no group is open
   uint16_t parentType;
   uint32_t kind;
   uint32_t code;
   uint32_t point;
 };
-
-void PrintTo(const Kind& row, std::ostream* out)
-{
-  *out << row.name;
-}
 
 constexpr Kind kKinds[] = {
     {"Kind1Under32", 1, 1, 1, TAV_RC_OK, 0},
@@ -131,7 +123,7 @@ TEST_P(StreamKind, IsTheOneOfTheOpenGroup)
 }
 
 INSTANTIATE_TEST_SUITE_P(Rows, StreamKind, ::testing::ValuesIn(kKinds),
-                         [](const auto& instance) { return std::string(instance.param.name); });
+                         kRowName);
 
 TEST(AddStreamChecks, RefuseANullHandleFirst)
 {

@@ -5,6 +5,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include "support/rows.h"
 #include "support/traceLog.h"
 #include "support/writing.h"
 #include "tav/layout.hpp"
@@ -67,7 +68,7 @@ protected:
   }
 };
 INSTANTIATE_TEST_SUITE_P(Forms, AddString, ::testing::ValuesIn(allForms()),
-                         [](const auto& instance) { return formName(instance.param); });
+                         kFormName);
 
 TEST_P(AddString, WritesAnAsciiStringAsItIs)
 {
@@ -174,18 +175,12 @@ TEST(AddStringText, MissingIsRefusedBeforeTheSizeIsChanged)
 }
 
 // Which type takes which code page.
-struct Page
+struct Page : Row
 {
-  const char* name;
   uint16_t type;
   uint16_t codePage;
   uint32_t code;
 };
-
-void PrintTo(const Page& row, std::ostream* out)
-{
-  *out << row.name;
-}
 
 constexpr Page kPages[] = {
     {"AsciiWith437", 50, 437, TAV_RC_OK},
@@ -225,10 +220,7 @@ TEST_P(CodePage, FitsItsTypeOrIsRefusedBeforeAnythingElse)
 }
 
 INSTANTIATE_TEST_SUITE_P(Rows, CodePage, ::testing::Combine(::testing::ValuesIn(kPages), ::testing::Bool()),
-                         [](const auto& instance) {
-                           return std::string(std::get<0>(instance.param).name) +
-                                  (std::get<1>(instance.param) ? "Under64" : "Under32");
-                         });
+                         kRowNameUnder);
 
 TEST(AddStringChecks, RefuseANullHandleFirst)
 {
@@ -438,7 +430,7 @@ TEST_P(StringTakenAgain, IsTheOneThatWouldHaveBeen)
 INSTANTIATE_TEST_SUITE_P(Forms, StringTakenAgain,
                          ::testing::Values(Form{}, Form{.swap = true}, Form{.align = true},
                                            Form{.swap = true, .align = true}),
-                         [](const auto& instance) { return formName(instance.param); });
+                         kFormName);
 
 TEST(AddStringSink, WithoutBlockOrRingIsRefused)
 {

@@ -9,6 +9,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include "support/rows.h"
 #include "support/traceLog.h"
 #include "support/writing.h"
 #include "tav/layout.hpp"
@@ -37,16 +38,10 @@ enum class Fault : uint8_t
   lost       ///< the cursor cannot be told
 };
 
-struct NamedFault
+struct NamedFault : Row
 {
-  const char* name;
   Fault fault;
 };
-
-void PrintTo(const NamedFault& row, std::ostream* out)
-{
-  *out << row.name;
-}
 
 constexpr NamedFault kFaults[] = {
     {"Refused", Fault::refused},
@@ -304,6 +299,6 @@ TEST_P(CloseOverAFaultyStorage, IsWholeOrIsRefusedAndCanBeTakenAgain)
 }
 
 INSTANTIATE_TEST_SUITE_P(Faults, CloseOverAFaultyStorage, ::testing::ValuesIn(kFaults),
-                         [](const auto& row) { return std::string(row.param.name); });
+                         kRowName);
 
 } // namespace

@@ -8,6 +8,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include "support/rows.h"
 #include "support/traceLog.h"
 #include "support/writing.h"
 #include "tav/probes.h"
@@ -21,11 +22,8 @@ using namespace test;
 
 constexpr uint16_t kGroup = 60100; // 0xEAC4
 
-class CloseHeader : public ::testing::TestWithParam<Form>
-{
-};
-INSTANTIATE_TEST_SUITE_P(Forms, CloseHeader, ::testing::ValuesIn(allForms()),
-                         [](const auto& instance) { return formName(instance.param); });
+using CloseHeader = OverForms;
+INSTANTIATE_TEST_SUITE_P(Forms, CloseHeader, ::testing::ValuesIn(allForms()), kFormName);
 
 /// The rows of one form.
 const char* pick(const Form& form, const char* little, const char* littleAligned, const char* big,

@@ -20,7 +20,6 @@ constexpr uint16_t kOther = 8;
 
 const auto kForms = testing::Values(Form{}, Form{.swap = true, .align = true}, Form{.buffered = true},
                                     Form{.buffered = true, .swap = true, .align = true});
-const auto kFormName = [](const auto& form) { return formName(form.param); };
 
 /// A stream that is written first and then searched.
 class FindElement : public testing::TestWithParam<Form>

@@ -234,7 +234,7 @@ TEST_P(EyeScan, TracesEntryArgumentsResultAndExit)
               ElementsAre(bytesOf(uint64_t{3}), bytesOf(uint64_t{5}), bytesOf(GetParam().swap)));
 }
 
-INSTANTIATE_TEST_SUITE_P(Forms, EyeScan, ::testing::ValuesIn(accessAndOrder()), formOf);
+INSTANTIATE_TEST_SUITE_P(Forms, EyeScan, ::testing::ValuesIn(accessAndOrder()), kFormName);
 
 /// A pair at every place of a page, and pages of several sizes: eye catcher and distance are cut everywhere.
 TEST(EyeScanOverPages, FindsAPairWhereverAPageCutsIt)

@@ -21,7 +21,6 @@ using Path = std::vector<TAVPathEntry>;
 
 const auto kForms = testing::Values(Form{}, Form{.swap = true, .align = true}, Form{.buffered = true},
                                     Form{.buffered = true, .swap = true, .align = true});
-const auto kFormName = [](const auto& form) { return formName(form.param); };
 
 /// The record for a path, which has to outlive it.
 TAVFindLogicalGroupParam paramOf(const Path& path)

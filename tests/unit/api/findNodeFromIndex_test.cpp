@@ -6,6 +6,7 @@
 #include <gtest/gtest.h>
 
 #include "support/byteRows.h"
+#include "support/rows.h"
 #include "support/streams.h"
 #include "support/traceLog.h"
 #include "tav/probes.h"
@@ -385,11 +386,10 @@ TEST_P(NodeFromIndex, PassesItsTrueOnToTheScan)
   EXPECT_EQ(trace.dump(probe::findEyeSizeCombo, 0).items.at(3), bytesOf(true));
 }
 
-INSTANTIATE_TEST_SUITE_P(Forms, NodeFromIndex, ::testing::ValuesIn(accessAndOrder()), formOf);
+INSTANTIATE_TEST_SUITE_P(Forms, NodeFromIndex, ::testing::ValuesIn(accessAndOrder()), kFormName);
 
-struct Fault
+struct Fault : Row
 {
-  const char* name;
   bool handle;
   bool out;
   uint64_t options;
@@ -429,6 +429,6 @@ TEST_P(NodeFromIndexFault, IsFoundInTheOrderOfTheArguments)
 }
 
 INSTANTIATE_TEST_SUITE_P(Rows, NodeFromIndexFault, ::testing::ValuesIn(kFaults),
-                         [](const auto& row) { return std::string(row.param.name); });
+                         kRowName);
 
 } // namespace

@@ -20,7 +20,6 @@ constexpr uint64_t kContainment = 1;
 
 const auto kForms = testing::Values(Form{}, Form{.swap = true}, Form{.buffered = true},
                                     Form{.buffered = true, .swap = true});
-const auto kFormName = [](const auto& form) { return formName(form.param); };
 
 class KeptContract : public testing::TestWithParam<Form>
 {

@@ -5,6 +5,7 @@
 
 #include <gtest/gtest.h>
 
+#include "support/rows.h"
 #include "support/traceLog.h"
 #include "support/writing.h"
 #include "tav/tav.h"
@@ -17,9 +18,8 @@ using namespace test;
 constexpr uint64_t kRegion = 160;
 constexpr uint64_t kPayload = 24;
 
-struct Overlap
+struct Overlap : Row
 {
-  const char* name;
   Form form;
   bool wide;
 };
@@ -59,11 +59,10 @@ INSTANTIATE_TEST_SUITE_P(Forms, OverlappingPayload,
                                            Overlap{"SwappedNarrow", {.swap = true}, false},
                                            Overlap{"SwappedAlignedWide", {.swap = true, .align = true}, true},
                                            Overlap{"AlignedWide", {.align = true}, true}),
-                         [](const auto& one) { return std::string(one.param.name); });
+                         kRowName);
 
-struct OwnNumber
+struct OwnNumber : Row
 {
-  const char* name;
   Form form;
   uint32_t info;
 };
@@ -129,6 +128,6 @@ INSTANTIATE_TEST_SUITE_P(
         OwnNumber{"AlignedBlock", {.align = true}, 0},
         OwnNumber{"Ring", {.buffered = true, .pageBytes = 4096, .ringBytes = 8192}, 0},
         OwnNumber{"RingWithAPair", {.buffered = true, .pageBytes = 4096, .ringBytes = 8192}, TAV_INFO_EYE_SIZE}),
-    [](const auto& one) { return std::string(one.param.name); });
+    kRowName);
 
 } // namespace

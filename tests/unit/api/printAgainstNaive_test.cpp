@@ -611,6 +611,6 @@ INSTANTIATE_TEST_SUITE_P(Over, RandomTrees,
                                            Form{.swap = true, .align = true}, Form{.buffered = true},
                                            Form{.buffered = true, .swap = true}, Form{.buffered = true, .align = true},
                                            Form{.buffered = true, .swap = true, .align = true}),
-                         [](const auto& form) { return formName(form.param); });
+                         kFormName);
 
 } // namespace

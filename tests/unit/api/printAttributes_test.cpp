@@ -20,28 +20,16 @@ using namespace tav;
 using namespace tav::inside;
 using namespace test;
 
-const std::string kProlog = "<?xml version=\"1.0\" encoding=\"UTF-8\" ?>\n";
-
-Element anyGroup(bool wide, uint16_t elm)
-{
-  return wide ? group64(elm) : group32(elm);
-}
-
-Element u16(uint16_t elm, uint16_t value, bool wide = true)
-{
-  return element(wide, TAV_TYPE_UINT16, elm, bytesOfValue(value));
-}
-
 /// A host with its name and a number, and within it a node with its number.
 Bytes sampleStream(const Form& form)
 {
   const bool wide = !form.root32;
   StreamWriter writer(form);
-  writer.add(anyGroup(wide, 20));
-  writer.add(anyGroup(wide, 60102));
+  writer.add(groupOf(wide, 20));
+  writer.add(groupOf(wide, 60102));
   writer.add(u32(60111, 7, wide));
   writer.add(ascii(60103, "box", wide));
-  writer.add(anyGroup(wide, 45000));
+  writer.add(groupOf(wide, 45000));
   writer.add(u16(307, 3, wide));
   writer.close();
   writer.close();
@@ -135,7 +123,7 @@ INSTANTIATE_TEST_SUITE_P(Over, AttributeForm,
                                            Form{.buffered = true, .root32 = true},
                                            Form{.swap = true, .align = true, .root32 = true},
                                            Form{.buffered = true, .swap = true, .align = true, .root32 = true}),
-                         [](const auto& form) { return formName(form.param); });
+                         kFormName);
 
 /// A root with one group of `children`, which closes behind them.
 Bytes streamOfGroup(Element group, const std::vector<Element>& children)
@@ -184,6 +172,28 @@ TEST(GroupWithKeys, HasThemWithoutQuotationMarksAndAsTheyAre)
                                          "</docRoot>\n"));
 }
 
+/// A host that is opened with its key, its header, and its first child being opened.
+std::string headerOfHost(const std::string& size, const std::string& type)
+{
+  return "   <host hostName=box>\n"
+         "      <tavHeader>\n"
+         "         <tavHeader64>\n"
+         "            <size>" +
+         size +
+         "</size>\n"
+         "            <info>5</info>\n"
+         "            <type>" +
+         type +
+         "</type>\n"
+         "            <elm>TAV_ELM_CMN_HOST</elm>\n"
+         "         </tavHeader64>\n"
+         "         <hdrType>TAV_TYPE_HEADER64</hdrType>\n"
+         "         <nodeOffset>16</nodeOffset>\n"
+         "      </tavHeader>\n"
+         "   </host>\n"
+         "      <hostName>\n";
+}
+
 TEST(GroupWithKeys, ShowsItsHeaderAndAClosingBetweenKeysAndChildren)
 {
   EXPECT_EQ(printGroup(0xC3, group64(60102, TAV_TYPE_HEADER64, 0x5), {ascii(60103, "box")}).text,
@@ -197,51 +207,27 @@ TEST(GroupWithKeys, ShowsItsHeaderAndAClosingBetweenKeysAndChildren)
                       "      </tavHeader64>\n"
                       "      <hdrType>TAV_TYPE_HEADER64</hdrType>\n"
                       "      <nodeOffset>0</nodeOffset>\n"
-                      "   </tavHeader>\n"
-                      "   <host hostName=box>\n"
-                      "      <tavHeader>\n"
-                      "         <tavHeader64>\n"
-                      "            <size>19</size>\n"
-                      "            <info>5</info>\n"
-                      "            <type>TAV_TYPE_HEADER64</type>\n"
-                      "            <elm>TAV_ELM_CMN_HOST</elm>\n"
-                      "         </tavHeader64>\n"
-                      "         <hdrType>TAV_TYPE_HEADER64</hdrType>\n"
-                      "         <nodeOffset>16</nodeOffset>\n"
-                      "      </tavHeader>\n"
-                      "   </host>\n"
-                      "      <hostName>\n"
-                      "         <tavHeader>\n"
-                      "            <tavHeader64>\n"
-                      "               <size>3</size>\n"
-                      "               <info>0</info>\n"
-                      "               <type>ASCII String</type>\n"
-                      "               <elm>TAV_ELM_CMN_HOST_NAME</elm>\n"
-                      "            </tavHeader64>\n"
-                      "            <hdrType>TAV_TYPE_HEADER64</hdrType>\n"
-                      "            <nodeOffset>32</nodeOffset>\n"
-                      "         </tavHeader>\n"
-                      "      </hostName>\n"
-                      "   </host>\n"
-                      "</docRoot>\n");
+                      "   </tavHeader>\n" +
+                headerOfHost("19", "TAV_TYPE_HEADER64") +
+                "         <tavHeader>\n"
+                "            <tavHeader64>\n"
+                "               <size>3</size>\n"
+                "               <info>0</info>\n"
+                "               <type>ASCII String</type>\n"
+                "               <elm>TAV_ELM_CMN_HOST_NAME</elm>\n"
+                "            </tavHeader64>\n"
+                "            <hdrType>TAV_TYPE_HEADER64</hdrType>\n"
+                "            <nodeOffset>32</nodeOffset>\n"
+                "         </tavHeader>\n"
+                "      </hostName>\n"
+                "   </host>\n"
+                "</docRoot>\n");
 }
 
 TEST(GroupWithKeys, OfA64BitHeaderOver32BitChildrenIsReadAgainWith64Bits)
 {
   const std::string text = printGroup(0xC3, group64(60102, TAV_TYPE_HEADER32, 0x5), {ascii(60103, "box", false)}).text;
-  EXPECT_THAT(text, ::testing::HasSubstr("   <host hostName=box>\n"
-                                         "      <tavHeader>\n"
-                                         "         <tavHeader64>\n"
-                                         "            <size>11</size>\n"
-                                         "            <info>5</info>\n"
-                                         "            <type>TAV_TYPE_HEADER32</type>\n"
-                                         "            <elm>TAV_ELM_CMN_HOST</elm>\n"
-                                         "         </tavHeader64>\n"
-                                         "         <hdrType>TAV_TYPE_HEADER64</hdrType>\n"
-                                         "         <nodeOffset>16</nodeOffset>\n"
-                                         "      </tavHeader>\n"
-                                         "   </host>\n"
-                                         "      <hostName>\n"));
+  EXPECT_THAT(text, ::testing::HasSubstr(headerOfHost("11", "TAV_TYPE_HEADER32")));
 }
 
 TEST(GroupWithKeys, ShowsItsDescriptorsWithItsHeader)

@@ -9,6 +9,7 @@
 #include "api/printer.h"
 #include "support/elements.h"
 #include "support/printing.h"
+#include "support/rows.h"
 #include "support/traceLog.h"
 #include "tav/probes.h"
 
@@ -251,7 +252,7 @@ TEST_P(NodeBody, WithBareIsTheValueWhateverElseIsAsked)
 }
 
 INSTANTIATE_TEST_SUITE_P(Of, NodeBody, ::testing::ValuesIn(kForms),
-                         [](const auto& row) { return std::string(row.param.name); });
+                         kRowName);
 
 /// Which parts are printed, and what comes out for the element of Subject.
 struct PartsRow
@@ -357,63 +358,45 @@ TEST(NodeInTheTextForm, KnowsNoAttributeForm)
             printed(TAV_RC_OK, "  0|TAV_ELM_CMN_HOST_NAME\n  0|{\n  0|   A\n  0|}\n"));
 }
 
-TEST(NodeAtADepth, HasDepthAndBlanksOnEveryLine)
+struct AtADepth
 {
-  Subject subject(Kind::element32);
-  EXPECT_EQ(printNode(0x6, subject.node, true, true, true, 2),
-            printed(TAV_RC_OK, "  2|      TAV_ELM_CMN_HOST_NAME\n"
-                               "  2|      {\n"
-                               "  2|         TAVHeader\n"
-                               "  2|         {\n"
-                               "  2|            TAVHeader32\n"
-                               "  2|            {\n"
-                               "  2|               size = 1\n"
-                               "  2|               type = 52 ( Sint8 )\n"
-                               "  2|               elm  = 60103 ( TAV_ELM_CMN_HOST_NAME )\n"
-                               "  2|            }\n"
-                               "  2|            hdrType    = 1 ( TAV_TYPE_HEADER32 )\n"
-                               "  2|            nodeOffset = 24\n"
-                               "  2|         }\n"
-                               "  2|         A\n"
-                               "  2|      }\n"));
+  const char* name;
+  uint64_t options;
+  bool isOpened; ///< and has its value; else only its end is printed
+  uint32_t depth;
+  std::string text;
+};
+
+void PrintTo(const AtADepth& row, std::ostream* out)
+{
+  *out << row.name;
 }
 
-TEST(NodeAtADepth, InXmlHasBlanksOnlyAndNoneBehindTheValue)
+class NodeAtADepth : public ::testing::TestWithParam<AtADepth>
 {
+};
+
+TEST_P(NodeAtADepth, HasItsBlanks)
+{
+  const AtADepth& row = GetParam();
+  const bool asAttributes = (row.options & 0x80) != 0;
   Subject subject(Kind::element32);
-  EXPECT_EQ(printNode(0x44, subject.node, true, true, true, 2), printed(TAV_RC_OK, "      <hostName>A</hostName>\n"));
+  EXPECT_EQ(printNode(row.options, subject.node, row.isOpened, row.isOpened, true, row.depth, asAttributes),
+            printed(TAV_RC_OK, row.text));
 }
 
-TEST(NodeAtADepth, InXmlWithHeaderHasBlanksOnEveryLine)
-{
-  Subject subject(Kind::element32);
-  EXPECT_EQ(printNode(0x46, subject.node, true, true, true, 1),
-            printed(TAV_RC_OK, "   <hostName>\n"
-                               "      <tavHeader>\n"
-                               "         <tavHeader32>\n"
-                               "            <size>1</size>\n"
-                               "            <type>Sint8</type>\n"
-                               "            <elm>TAV_ELM_CMN_HOST_NAME</elm>\n"
-                               "         </tavHeader32>\n"
-                               "         <hdrType>TAV_TYPE_HEADER32</hdrType>\n"
-                               "         <nodeOffset>24</nodeOffset>\n"
-                               "      </tavHeader>\n"
-                               "      <tavData>A</tavData>\n"
-                               "   </hostName>\n"));
-}
+const AtADepth kAtADepth[] = {
+    {"HasDepthAndBlanksOnEveryLine", 0x6, true, 2,
+     "  2|      TAV_ELM_CMN_HOST_NAME\n  2|      {\n" + moved(kForms[0].textHeader, "  0|", "  2|      ") +
+         "  2|         A\n  2|      }\n"},
+    {"InXmlHasBlanksOnlyAndNoneBehindTheValue", 0x44, true, 2, "      <hostName>A</hostName>\n"},
+    {"InXmlWithHeaderHasBlanksOnEveryLine", 0x46, true, 1,
+     "   <hostName>\n" + moved(kForms[0].xmlHeader, "", "   ") + "      <tavData>A</tavData>\n   </hostName>\n"},
+    {"InXmlIndentsAClosingOfItsOwn", 0x44, false, 2, "      </hostName>\n"},
+    {"AsAttributesIndentsItsOpening", 0xC5, true, 1, "   <hostName hostName=A>\n"},
+};
 
-TEST(NodeAtADepth, InXmlIndentsAClosingOfItsOwn)
-{
-  Subject subject(Kind::element32);
-  EXPECT_EQ(printNode(0x44, subject.node, false, false, true, 2), printed(TAV_RC_OK, "      </hostName>\n"));
-}
-
-TEST(NodeAtADepth, AsAttributesIndentsItsOpening)
-{
-  Subject subject(Kind::element32);
-  EXPECT_EQ(printNode(0xC5, subject.node, true, true, true, 1, true),
-            printed(TAV_RC_OK, "   <hostName hostName=A>\n"));
-}
+INSTANTIATE_TEST_SUITE_P(Rows, NodeAtADepth, ::testing::ValuesIn(kAtADepth), kRowName);
 
 TEST(NodeInXmlWithDescriptors, ClosesBehindTheDataWithoutBlanks)
 {

@@ -22,8 +22,6 @@ using namespace tav;
 using namespace tav::inside;
 using namespace test;
 
-const std::string kProlog = "<?xml version=\"1.0\" encoding=\"UTF-8\" ?>\n";
-
 /// A root with one number.
 Bytes tinyStream()
 {
@@ -297,7 +295,7 @@ TEST_P(DamagedSubtree, ThatWasNeverClosedStopsAtTheEndOfTheStream)
 }
 
 INSTANTIATE_TEST_SUITE_P(Over, DamagedSubtree, ::testing::Values(Form{}, Form{.buffered = true}),
-                         [](const auto& form) { return formName(form.param); });
+                         kFormName);
 
 TEST(SubtreeOverAFailingStorage, HandsUpTheCodeAndKeepsWhatWasPrinted)
 {

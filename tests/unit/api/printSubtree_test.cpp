@@ -7,6 +7,7 @@
 
 #include "support/elements.h"
 #include "support/printing.h"
+#include "support/rows.h"
 #include "support/streams.h"
 #include "support/traceLog.h"
 #include "tav/probes.h"
@@ -18,21 +19,14 @@ using namespace tav;
 using namespace tav::inside;
 using namespace test;
 
-const std::string kProlog = "<?xml version=\"1.0\" encoding=\"UTF-8\" ?>\n";
-
-Element anyGroup(const Form& form, uint16_t elm)
-{
-  return form.root32 ? group32(elm) : group64(elm);
-}
-
 /// A document with a number, a host with its name, and a number behind it.
 Bytes sampleStream(const Form& form)
 {
   const bool wide = !form.root32;
   StreamWriter writer(form);
-  writer.add(anyGroup(form, 20));
+  writer.add(groupOf(!form.root32, 20));
   writer.add(u32(60110, 7, wide));
-  writer.add(anyGroup(form, 60102));
+  writer.add(groupOf(!form.root32, 60102));
   writer.add(ascii(60103, "box", wide));
   writer.close();
   writer.add(u64(60111, 8, wide));
@@ -137,13 +131,13 @@ INSTANTIATE_TEST_SUITE_P(Over, Subtree,
                                            Form{.buffered = true, .root32 = true},
                                            Form{.swap = true, .align = true, .root32 = true},
                                            Form{.buffered = true, .swap = true, .align = true, .root32 = true}),
-                         [](const auto& form) { return formName(form.param); });
+                         kFormName);
 
 /// A root with one number, header by header.
 Bytes tinyStream(const Form& form = {})
 {
   StreamWriter writer(form);
-  writer.add(anyGroup(form, 20));
+  writer.add(groupOf(!form.root32, 20));
   writer.add(u32(60111, 7, !form.root32, 0x1F));
   writer.close();
   return writer.bytes();
@@ -428,18 +422,12 @@ TEST(SubtreeWithoutAHandle, FailsBehindItsOpening)
             printed(TAV_RC_BAD_PARAM, "  0|TAV_ELM_CMN_DOC_ROOT\n  0|{\n"));
 }
 
-struct ArgumentsRow
+struct ArgumentsRow : Row
 {
-  const char* name;
   bool handle, start, param, count;
   uint64_t options;
   uint32_t point;
 };
-
-void PrintTo(const ArgumentsRow& row, std::ostream* out)
-{
-  *out << row.name;
-}
 
 class SubtreeArguments : public ::testing::TestWithParam<ArgumentsRow>
 {
@@ -477,7 +465,7 @@ const ArgumentsRow kArguments[] = {
 };
 
 INSTANTIATE_TEST_SUITE_P(Misused, SubtreeArguments, ::testing::ValuesIn(kArguments),
-                         [](const auto& row) { return std::string(row.param.name); });
+                         kRowName);
 
 void expectNothingPrinted(TAVHandle* handle, uint32_t cause)
 {

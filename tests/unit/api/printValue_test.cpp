@@ -12,6 +12,7 @@
 #include "api/printer.h"
 #include "support/elements.h"
 #include "support/printing.h"
+#include "support/rows.h"
 #include "support/traceLog.h"
 #include "tav/probes.h"
 
@@ -53,19 +54,13 @@ private:
   bool swap_;
 };
 
-struct ValueRow
+struct ValueRow : Row
 {
-  const char* name;
   uint16_t type;
   Bytes littleEndian;
   Bytes bigEndian;
   std::string text;
 };
-
-void PrintTo(const ValueRow& row, std::ostream* out)
-{
-  *out << row.name;
-}
 
 const ValueRow kValues[] = {
     {"AsciiString", 50, {'h', 'e', 'l', 'l', 'o'}, {'h', 'e', 'l', 'l', 'o'}, "hello"},

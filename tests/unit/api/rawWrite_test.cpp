@@ -4,6 +4,7 @@
 #include <gtest/gtest.h>
 
 #include "api/rawWrite.h"
+#include "support/rows.h"
 #include "support/traceLog.h"
 #include "support/writing.h"
 #include "tav/probes.h"
@@ -16,11 +17,8 @@ using namespace tav;
 using namespace tav::inside;
 using namespace test;
 
-class RawWriteStep : public ::testing::TestWithParam<Form>
-{
-};
-INSTANTIATE_TEST_SUITE_P(Forms, RawWriteStep, ::testing::ValuesIn(allForms()),
-                         [](const auto& instance) { return formName(instance.param); });
+using RawWriteStep = OverForms;
+INSTANTIATE_TEST_SUITE_P(Forms, RawWriteStep, ::testing::ValuesIn(allForms()), kFormName);
 
 TEST_P(RawWriteStep, PutsTheBytesAtThePositionAndMovesPastThem)
 {
@@ -134,18 +132,12 @@ TEST(RawWriteDirect, NeedsTheBlockEvenForNoBytes)
 }
 
 // The last byte of the block is never used.
-struct ByteRun
+struct ByteRun : Row
 {
-  const char* name;
   uint64_t position;
   uint64_t length;
   bool fits;
 };
-
-void PrintTo(const ByteRun& row, std::ostream* out)
-{
-  *out << row.name;
-}
 
 constexpr ByteRun kRuns[] = {
     {"EndsBeforeTheLastByte", 0, 15, true},
@@ -185,7 +177,7 @@ TEST_P(DirectRun, StaysBeforeTheLastByteOfTheBlock)
 }
 
 INSTANTIATE_TEST_SUITE_P(Rows, DirectRun, ::testing::ValuesIn(kRuns),
-                         [](const auto& instance) { return std::string(instance.param.name); });
+                         kRowName);
 
 TEST(RawWriteDirect, CopiesBytesOfTheBlockItself)
 {

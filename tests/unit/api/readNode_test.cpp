@@ -1,4 +1,5 @@
 #include <cstdint>
+#include <optional>
 #include <utility>
 
 #include <gmock/gmock.h>
@@ -27,6 +28,13 @@ protected:
 
   [[nodiscard]] bool buffered() const { return GetParam().buffered; }
 
+  /// Reads the node at an offset of the rows, which stay where they are.
+  uint32_t read(uint64_t offset, bool wide)
+  {
+    reader_.emplace(rows.bytes, GetParam());
+    return tavReadNodeInt(0, reader_->handle(), offset, wide, &out);
+  }
+
   void expectNoData() const
   {
     EXPECT_EQ(out.header.nodeOffset, 0U);
@@ -34,13 +42,15 @@ protected:
     EXPECT_EQ(out.dataBufSize, 0U);
     EXPECT_EQ(out.dataBufOffset, 0U);
   }
+
+private:
+  std::optional<StreamReader> reader_;
 };
 
 TEST_P(ReadNode, FillsEveryFieldOfAWideGroupAndLeavesItsDataEmpty)
 {
   rows.h64(0x1122334455667788, 0x00400123, TAV_TYPE_HEADER64, kElm);
-  StreamReader reader(rows.bytes, GetParam());
-  ASSERT_EQ(tavReadNodeInt(0, reader.handle(), 0, true, &out), TAV_RC_OK);
+  ASSERT_EQ(read(0, true), TAV_RC_OK);
   EXPECT_EQ(out.header.hdrType, TAV_HDR_64);
   EXPECT_EQ(out.header.hdr64.size, 0x1122334455667788U);
   EXPECT_EQ(out.header.hdr64.info, 0x00400123U);
@@ -52,8 +62,7 @@ TEST_P(ReadNode, FillsEveryFieldOfAWideGroupAndLeavesItsDataEmpty)
 TEST_P(ReadNode, TakesAWideHeaderOfType1ForAGroup)
 {
   rows.h64(0xFFFFFF, 0, TAV_TYPE_HEADER32, kElm);
-  StreamReader reader(rows.bytes, GetParam());
-  ASSERT_EQ(tavReadNodeInt(0, reader.handle(), 0, true, &out), TAV_RC_OK);
+  ASSERT_EQ(read(0, true), TAV_RC_OK);
   EXPECT_EQ(out.pDataBuf, nullptr);
   EXPECT_EQ(out.dataBufSize, 0U);
 }
@@ -61,8 +70,7 @@ TEST_P(ReadNode, TakesAWideHeaderOfType1ForAGroup)
 TEST_P(ReadNode, FillsEveryFieldOfANarrowGroup)
 {
   rows.h32(0x11223344, TAV_TYPE_HEADER32, kElm);
-  StreamReader reader(rows.bytes, GetParam());
-  ASSERT_EQ(tavReadNodeInt(0, reader.handle(), 0, false, &out), TAV_RC_OK);
+  ASSERT_EQ(read(0, false), TAV_RC_OK);
   EXPECT_EQ(out.header.hdrType, TAV_HDR_32);
   EXPECT_EQ(out.header.hdr32.size, 0x11223344U);
   EXPECT_EQ(out.header.hdr32.type, TAV_TYPE_HEADER32);
@@ -73,8 +81,7 @@ TEST_P(ReadNode, FillsEveryFieldOfANarrowGroup)
 TEST_P(ReadNode, PointsToTheDataOfAWideElementWithoutSwappingIt)
 {
   rows.fill(24, 0xEE).h64(5, 0x7, TAV_TYPE_BINARY, kElm).data(hex("01 02 03 04 05")).fill(11, 0xEE);
-  StreamReader reader(rows.bytes, GetParam());
-  ASSERT_EQ(tavReadNodeInt(0, reader.handle(), 24, true, &out), TAV_RC_OK);
+  ASSERT_EQ(read(24, true), TAV_RC_OK);
   EXPECT_EQ(out.header.hdr64.size, 5U);
   EXPECT_EQ(out.header.hdr64.info, 7U);
   EXPECT_EQ(out.header.hdr64.type, TAV_TYPE_BINARY);
@@ -87,8 +94,7 @@ TEST_P(ReadNode, PointsToTheDataOfAWideElementWithoutSwappingIt)
 TEST_P(ReadNode, PointsToTheDataOfANarrowElement)
 {
   rows.fill(3, 0xEE).h32(2, TAV_TYPE_UINT16, kElm).data(hex("AA BB")).fill(7, 0xEE);
-  StreamReader reader(rows.bytes, GetParam());
-  ASSERT_EQ(tavReadNodeInt(0, reader.handle(), 3, false, &out), TAV_RC_OK);
+  ASSERT_EQ(read(3, false), TAV_RC_OK);
   EXPECT_EQ(out.header.hdr32.size, 2U);
   EXPECT_EQ(out.header.nodeOffset, 3U);
   EXPECT_EQ(payloadOf(out, 2), hex("AA BB"));
@@ -98,8 +104,7 @@ TEST_P(ReadNode, PointsToTheDataOfANarrowElement)
 TEST_P(ReadNode, GivesAnElementOfSize0APointerToNothing)
 {
   rows.h64(0, 0, TAV_TYPE_BINARY, kElm);
-  StreamReader reader(rows.bytes, GetParam());
-  ASSERT_EQ(tavReadNodeInt(0, reader.handle(), 0, true, &out), TAV_RC_OK);
+  ASSERT_EQ(read(0, true), TAV_RC_OK);
   EXPECT_NE(out.pDataBuf, nullptr);
   EXPECT_EQ(out.dataBufSize, 0U);
 }
@@ -107,8 +112,7 @@ TEST_P(ReadNode, GivesAnElementOfSize0APointerToNothing)
 TEST_P(ReadNode, TakesDataThatEndsWithTheStream)
 {
   rows.h64(3, 0, TAV_TYPE_BINARY, kElm).data(hex("01 02 03"));
-  StreamReader reader(rows.bytes, GetParam());
-  ASSERT_EQ(tavReadNodeInt(0, reader.handle(), 0, true, &out), TAV_RC_OK);
+  ASSERT_EQ(read(0, true), TAV_RC_OK);
   EXPECT_EQ(payloadOf(out, 3), hex("01 02 03"));
 }
 
@@ -200,7 +204,7 @@ TEST_P(ReadNode, TracesEntryArgumentsResultAndExit)
   EXPECT_EQ(trace.records().back().code, TAV_RC_OK);
 }
 
-INSTANTIATE_TEST_SUITE_P(Forms, ReadNode, ::testing::ValuesIn(accessAndOrder()), formOf);
+INSTANTIATE_TEST_SUITE_P(Forms, ReadNode, ::testing::ValuesIn(accessAndOrder()), kFormName);
 
 TEST(ReadNodeArguments, CheckTheHandleFirst)
 {

@@ -8,6 +8,7 @@
 #include <gtest/gtest.h>
 
 #include "support/byteRows.h"
+#include "support/rows.h"
 #include "support/streams.h"
 #include "support/traceLog.h"
 #include "tav/probes.h"
@@ -214,7 +215,7 @@ TEST_P(PreviousNode, TracesEntryArgumentsResultAndExit)
   EXPECT_EQ(trace.recordsOf(kId).back().code, TAV_RC_OK);
 }
 
-INSTANTIATE_TEST_SUITE_P(Forms, PreviousNode, ::testing::ValuesIn(accessAndOrder()), formOf);
+INSTANTIATE_TEST_SUITE_P(Forms, PreviousNode, ::testing::ValuesIn(accessAndOrder()), kFormName);
 
 TEST(PreviousNodeOverMemory, NeedsTheBlock)
 {
@@ -287,9 +288,8 @@ TEST(PreviousNodeThroughARing, PassesTheCodesOfBothFetchesOn)
   }
 }
 
-struct Fault
+struct Fault : Row
 {
-  const char* name;
   bool handle;
   bool reference;
   bool out;
@@ -327,6 +327,6 @@ TEST_P(PreviousNodeFault, IsFoundInTheOrderOfTheArguments)
 }
 
 INSTANTIATE_TEST_SUITE_P(Rows, PreviousNodeFault, ::testing::ValuesIn(kFaults),
-                         [](const auto& row) { return std::string(row.param.name); });
+                         kRowName);
 
 } // namespace

@@ -9,6 +9,7 @@
 
 #include "support/byteRows.h"
 #include "support/nextChild.h"
+#include "support/rows.h"
 #include "support/streams.h"
 #include "support/traceLog.h"
 #include "tav/probes.h"
@@ -422,11 +423,10 @@ TEST_P(NextChild, TracesEntryArgumentsResultAndExit)
   EXPECT_EQ(trace.recordsOf(kId).back().code, TAV_RC_OK);
 }
 
-INSTANTIATE_TEST_SUITE_P(Forms, NextChild, ::testing::ValuesIn(accessAndOrder()), formOf);
+INSTANTIATE_TEST_SUITE_P(Forms, NextChild, ::testing::ValuesIn(accessAndOrder()), kFormName);
 
-struct Fault
+struct Fault : Row
 {
-  const char* name;
   bool handle;
   bool out;
   uint64_t options;
@@ -465,7 +465,7 @@ TEST_P(NextChildFault, IsFoundInTheOrderOfTheArguments)
 }
 
 INSTANTIATE_TEST_SUITE_P(Rows, NextChildFault, ::testing::ValuesIn(kFaults),
-                         [](const auto& row) { return std::string(row.param.name); });
+                         kRowName);
 
 /// A storage that does not tell its size, and one that gives a wrong one with a failure.
 class SizelessStorage : public VectorStorage

@@ -145,6 +145,6 @@ TEST_P(AfterOpenGroup, TheSiblingMayBePutWhereTheReferenceIs)
   EXPECT_EQ(child.header.nodeOffset, 104U);
 }
 
-INSTANTIATE_TEST_SUITE_P(Forms, AfterOpenGroup, ::testing::ValuesIn(accessAndOrder()), formOf);
+INSTANTIATE_TEST_SUITE_P(Forms, AfterOpenGroup, ::testing::ValuesIn(accessAndOrder()), kFormName);
 
 } // namespace

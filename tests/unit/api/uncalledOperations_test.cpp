@@ -8,6 +8,7 @@
 #include <gtest/gtest.h>
 
 #include "support/byteRows.h"
+#include "support/rows.h"
 #include "support/streams.h"
 #include "support/traceLog.h"
 #include "tav/probes.h"
@@ -160,7 +161,7 @@ Form direct()
   return {};
 }
 
-INSTANTIATE_TEST_SUITE_P(Access, NextDataBuffer, ::testing::Values(direct(), pages(128, 1)), formOf);
+INSTANTIATE_TEST_SUITE_P(Access, NextDataBuffer, ::testing::Values(direct(), pages(128, 1)), kFormName);
 
 TEST(NextDataBufferOverMemory, NeedsTheBlock)
 {
@@ -227,9 +228,8 @@ TEST(NextDataBufferThroughARing, PassesTheCodeOfTheFetchOn)
   EXPECT_THAT(trace.failuresOf(kId), ElementsAre(Failure{kId, 50, kRefused}));
 }
 
-struct Fault
+struct Fault : Row
 {
-  const char* name;
   bool handle;
   bool node;
   uint64_t options;
@@ -265,7 +265,7 @@ TEST_P(NextDataBufferFault, IsFoundInTheOrderOfTheArguments)
 }
 
 INSTANTIATE_TEST_SUITE_P(Rows, NextDataBufferFault, ::testing::ValuesIn(kFaults),
-                         [](const auto& row) { return std::string(row.param.name); });
+                         kRowName);
 
 TEST(PlaceholderOperation, IsNeverSupported)
 {

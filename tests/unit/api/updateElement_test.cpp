@@ -6,6 +6,7 @@
 #include <gtest/gtest.h>
 
 #include "format/layout.h"
+#include "support/rows.h"
 #include "support/traceLog.h"
 #include "support/writing.h"
 #include "tav/probes.h"
@@ -20,11 +21,8 @@ using namespace test;
 
 constexpr uint16_t kCpu = 60110; // 0xEACE
 
-class UpdateElement : public ::testing::TestWithParam<Form>
-{
-};
-INSTANTIATE_TEST_SUITE_P(Forms, UpdateElement, ::testing::ValuesIn(allForms()),
-                         [](const auto& instance) { return formName(instance.param); });
+using UpdateElement = OverForms;
+INSTANTIATE_TEST_SUITE_P(Forms, UpdateElement, ::testing::ValuesIn(allForms()), kFormName);
 
 /// What lies before a node's payload and behind it must stay.
 void expectPayload(const Bytes& before, const Bytes& after, uint64_t start, const std::string& payload)
@@ -115,18 +113,12 @@ TEST_P(UpdateElement, IsReadBackInTheHostsOrder)
                                  : "01 02 03 04 05 06 07 08 11 12 13 14 15 16 17 18"));
 }
 
-struct Reversal
+struct Reversal : Row
 {
-  const char* name;
   uint16_t type;
   const char* payload;
   const char* reversed;
 };
-
-void PrintTo(const Reversal& row, std::ostream* out)
-{
-  *out << row.name;
-}
 
 constexpr Reversal kReversals[] = {
     {"AsciiString", 50, "61 62 63", "61 62 63"},
@@ -166,23 +158,17 @@ TEST_P(UpdatedPayload, IsReversedAsTheWriterReversesIt)
 }
 
 INSTANTIATE_TEST_SUITE_P(Types, UpdatedPayload, ::testing::ValuesIn(kReversals),
-                         [](const auto& instance) { return std::string(instance.param.name); });
+                         kRowName);
 
 // A node of 4 bytes, type 55, id kCpu is in the stream.
-struct Claim
+struct Claim : Row
 {
-  const char* name;
   uint32_t size;
   uint16_t type;
   uint16_t elm;
   uint32_t code;
   uint32_t point;
 };
-
-void PrintTo(const Claim& row, std::ostream* out)
-{
-  *out << row.name;
-}
 
 constexpr Claim kClaims[] = {
     {"Same", 4, 55, kCpu, TAV_RC_OK, 0},
@@ -221,10 +207,7 @@ TEST_P(UpdateClaim, MatchesTheStoredNodeOrIsRefused)
 }
 
 INSTANTIATE_TEST_SUITE_P(Rows, UpdateClaim, ::testing::Combine(::testing::ValuesIn(kClaims), ::testing::Bool()),
-                         [](const auto& instance) {
-                           return std::string(std::get<0>(instance.param).name) +
-                                  (std::get<1>(instance.param) ? "Under64" : "Under32");
-                         });
+                         kRowNameUnder);
 
 TEST(UpdateElementHeader, MayDifferInItsInfo)
 {
@@ -302,46 +285,32 @@ TEST(UpdateElementPayload, MissingIsRefused)
   EXPECT_THAT(trace.failures(), ElementsAre(Failure{probe::updateElement, 80, TAV_RC_BAD_PARAM}));
 }
 
-TEST(UpdateElementChecks, RefuseANullHandleFirst)
-{
-  TraceLog trace;
-  EXPECT_EQ(tavUpdateElement(1, nullptr, nullptr), TAV_RC_BAD_PARAM);
-  EXPECT_THAT(trace.failures(), ElementsAre(Failure{probe::updateElement, 10, TAV_RC_BAD_PARAM}));
-}
-
-TEST(UpdateElementChecks, RefuseANullDescriptorBeforeTheMode)
+// What is wrong in a row is wrong in the rows above it, too.
+TEST(UpdateElementChecks, AreMadeOneAfterAnotherBeforeReading)
 {
   StreamReader reader(Bytes(64));
-  TraceLog trace;
-  EXPECT_EQ(tavUpdateElement(1, reader.handle(), nullptr), TAV_RC_BAD_PARAM);
-  EXPECT_THAT(trace.failures(), ElementsAre(Failure{probe::updateElement, 20, TAV_RC_BAD_PARAM}));
-}
-
-TEST(UpdateElementChecks, RefuseAReadHandleBeforeTheOptions)
-{
-  StreamReader reader(Bytes(64));
-  TAVHeaderData data{header64(4, TAV_TYPE_HEADER64, kCpu), nullptr, 0, 0};
-  TraceLog trace;
-  EXPECT_EQ(tavUpdateElement(1, reader.handle(), &data), TAV_RC_WRONG_MODE);
-  EXPECT_THAT(trace.failures(), ElementsAre(Failure{probe::updateElement, 30, TAV_RC_WRONG_MODE}));
-}
-
-TEST(UpdateElementChecks, RefuseOptionsBeforeAGroup)
-{
   StreamWriter writer;
-  TAVHeaderData data{header64(4, TAV_TYPE_HEADER64, kCpu), nullptr, 0, 0};
-  TraceLog trace;
-  EXPECT_EQ(tavUpdateElement(1, writer.handle(), &data), TAV_RC_BAD_OPTIONS);
-  EXPECT_THAT(trace.failures(), ElementsAre(Failure{probe::updateElement, 40, TAV_RC_BAD_OPTIONS}));
-}
-
-TEST(UpdateElementChecks, RefuseAGroupBeforeReading)
-{
-  StreamWriter writer;
-  TAVHeaderData data{header64(4, TAV_TYPE_HEADER64, kCpu, 0, ~uint64_t{0}), nullptr, 0, 0};
-  TraceLog trace;
-  EXPECT_EQ(tavUpdateElement(0, writer.handle(), &data), TAV_RC_BAD_PARAM);
-  EXPECT_THAT(trace.failures(), ElementsAre(Failure{probe::updateElement, 50, TAV_RC_BAD_PARAM}));
+  TAVHeaderData group{header64(4, TAV_TYPE_HEADER64, kCpu, 0, ~uint64_t{0}), nullptr, 0, 0};
+  const struct
+  {
+    uint64_t options;
+    TAVHandle* handle;
+    TAVHeaderData* node;
+    uint32_t code;
+    uint32_t point;
+  } checks[] = {
+      {1, nullptr, nullptr, TAV_RC_BAD_PARAM, 10},
+      {1, reader.handle(), nullptr, TAV_RC_BAD_PARAM, 20},
+      {1, reader.handle(), &group, TAV_RC_WRONG_MODE, 30},
+      {1, writer.handle(), &group, TAV_RC_BAD_OPTIONS, 40},
+      {0, writer.handle(), &group, TAV_RC_BAD_PARAM, 50},
+  };
+  for (const auto& check : checks)
+  {
+    TraceLog trace;
+    EXPECT_EQ(tavUpdateElement(check.options, check.handle, check.node), check.code) << check.point;
+    EXPECT_THAT(trace.failures(), ElementsAre(Failure{probe::updateElement, check.point, check.code}));
+  }
 }
 
 TEST(UpdateElementReading, OutsideTheBlockHandsTheReadersCodeUp)

@@ -20,7 +20,6 @@ constexpr uint64_t kContainment = 1;
 
 const auto kForms = testing::Values(Form{}, Form{.swap = true, .align = true}, Form{.buffered = true},
                                     Form{.buffered = true, .swap = true, .align = true});
-const auto kFormName = [](const auto& form) { return formName(form.param); };
 
 /// A bare header. Its payload has an address all the same: a writer asks for one.
 Element emptyElement(uint16_t elm)

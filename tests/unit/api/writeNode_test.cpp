@@ -5,6 +5,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include "support/rows.h"
 #include "support/traceLog.h"
 #include "support/writing.h"
 #include "tav/probes.h"
@@ -16,11 +17,8 @@ namespace
 using namespace tav;
 using namespace test;
 
-class WriteNode : public ::testing::TestWithParam<Form>
-{
-};
-INSTANTIATE_TEST_SUITE_P(Forms, WriteNode, ::testing::ValuesIn(allForms()),
-                         [](const auto& instance) { return formName(instance.param); });
+using WriteNode = OverForms;
+INSTANTIATE_TEST_SUITE_P(Forms, WriteNode, ::testing::ValuesIn(allForms()), kFormName);
 
 TEST_P(WriteNode, WritesAtThePositionAndMovesNothingElse)
 {
@@ -123,20 +121,14 @@ TEST(WriteNodeHeader, GetsNoAlignmentBitWhenThePayloadIsRefused)
 }
 
 // Which payloads fit which header.
-struct Payload
+struct Payload : Row
 {
-  const char* name;
   uint16_t type;
   uint64_t size;
   bool given;
   uint64_t length;
   uint32_t code;
 };
-
-void PrintTo(const Payload& row, std::ostream* out)
-{
-  *out << row.name;
-}
 
 constexpr Payload kPayloads[] = {
     {"Whole", 101, 4, true, 4, TAV_RC_OK},
@@ -175,10 +167,7 @@ TEST_P(WriteNodePayload, IsWholeOrAbsent)
 }
 
 INSTANTIATE_TEST_SUITE_P(Rows, WriteNodePayload, ::testing::Combine(::testing::ValuesIn(kPayloads), ::testing::Bool()),
-                         [](const auto& instance) {
-                           return std::string(std::get<0>(instance.param).name) +
-                                  (std::get<1>(instance.param) ? "Under64" : "Under32");
-                         });
+                         kRowNameUnder);
 
 TEST(WriteNodeChecks, RefuseANullHandleFirst)
 {

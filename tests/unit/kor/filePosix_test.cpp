@@ -357,11 +357,26 @@ class InterruptedFifo : public testing::Test
 {
 protected:
   static constexpr std::size_t kLength = 400000; ///< several times what a pipe holds
+  static constexpr std::size_t kPiece = 50000;
 
   void SetUp() override
   {
     alarms() = 0; // before a child sees it
     ASSERT_EQ(::mkfifo(path_.c_str(), 0600), 0);
+  }
+
+  /// Opens the other side and moves all of the bytes piece by piece, so slowly that this one has to wait.
+  template<class Move>
+  uint32_t inPieces(uint64_t options, Move&& move) const
+  {
+    KORHFile file;
+    uint32_t code = openFile(file, path_, options);
+    for (std::size_t at = 0; at < kLength && code == TAV_RC_OK; at += kPiece)
+    {
+      usleep(5000);
+      code = move(file, at);
+    }
+    return code;
   }
 
   static std::string pattern()
@@ -380,21 +395,9 @@ TEST_F(InterruptedFifo, IsReadWhole)
 {
   Child writer([this] {
     while (alarms().load() < 5) usleep(1000); // until the open has waited, however busy the machine is
-    KORHFile file;
-    if (openFile(file, path_, KOR_FILE_WRITE) != TAV_RC_OK)
-    {
-      return UINT32_MAX;
-    }
     const std::string bytes = pattern();
-    for (std::size_t start = 0; start < bytes.size(); start += 50000)
-    {
-      usleep(5000);
-      if (writeFile(file, bytes.data() + start, 50000).code != TAV_RC_OK)
-      {
-        return UINT32_MAX;
-      }
-    }
-    return TAV_RC_OK;
+    return inPieces(KOR_FILE_WRITE,
+                    [&](KORHFile& file, std::size_t at) { return writeFile(file, bytes.data() + at, kPiece).code; });
   });
   const Interruptions interruptions;
   ASSERT_EQ(openFile(file_, path_, KOR_FILE_READ), TAV_RC_OK);
@@ -411,21 +414,10 @@ TEST_F(InterruptedFifo, IsReadWhole)
 TEST_F(InterruptedFifo, IsWrittenWhole)
 {
   Child reader([this] {
-    KORHFile file;
-    if (openFile(file, path_, KOR_FILE_READ) != TAV_RC_OK)
-    {
-      return UINT32_MAX;
-    }
     std::string bytes(kLength, '\0');
-    for (std::size_t start = 0; start < bytes.size(); start += 50000)
-    {
-      usleep(5000);
-      if (readFile(file, bytes.data() + start, 50000).code != TAV_RC_OK)
-      {
-        return UINT32_MAX;
-      }
-    }
-    return bytes == pattern() ? TAV_RC_OK : UINT32_MAX;
+    const uint32_t code = inPieces(
+        KOR_FILE_READ, [&](KORHFile& file, std::size_t at) { return readFile(file, bytes.data() + at, kPiece).code; });
+    return bytes == pattern() ? code : UINT32_MAX;
   });
   ASSERT_EQ(openFile(file_, path_, KOR_FILE_WRITE), TAV_RC_OK);
   const std::string bytes = pattern();

@@ -109,6 +109,18 @@ inline constexpr uint32_t kExclusive = 1;
 inline constexpr uint32_t kWait = 0;
 inline constexpr uint32_t kDoNotWait = 2;
 
+/// A lock that is held, and what becomes of another one that is asked for beside it.
+struct LockBeside
+{
+  uint32_t held;
+  uint32_t asked;
+  uint32_t code;
+};
+inline constexpr LockBeside kLocksBeside[] = {{kExclusive, kExclusive, KOR_RC_LOCKED},
+                                              {kExclusive, kShared, KOR_RC_LOCKED},
+                                              {kShared, kShared, TAV_RC_OK},
+                                              {kShared, kExclusive, KOR_RC_LOCKED}};
+
 /// Two open files of one path. What is locked belongs to the open file, in this process and in others.
 class TwoOpenFiles : public testing::Test
 {

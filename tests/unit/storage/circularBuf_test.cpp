@@ -5,6 +5,7 @@
 #include <string_view>
 
 #include "storage/ringFixture.h"
+#include "support/rows.h"
 
 namespace
 {
@@ -16,9 +17,8 @@ using testing::IsEmpty;
 
 constexpr uint64_t kMax = ~uint64_t{0};
 
-struct BadRing
+struct BadRing : Row
 {
-  const char* name;
   bool storage;
   uint32_t storageStatus;
   uint64_t ioUnit;
@@ -54,7 +54,7 @@ INSTANTIATE_TEST_SUITE_P(Rows, RefusedRing,
                                          BadRing{"PageThatRoundsToZeroByOne", true, 0, kMax - 6, 80, 20},
                                          BadRing{"PageThatRoundsToZeroAndSizeZero", true, 0, kMax - 6, 0, 20},
                                          BadRing{"SizeZero", true, 0, 8, 0, 30}),
-                         [](const auto& row) { return std::string(row.param.name); });
+                         kRowName);
 
 struct Shape
 {
@@ -329,9 +329,8 @@ TEST(CircularBufWrite, SmallIsRefusedWhereNoPageCanBeRead)
   EXPECT_THAT(trace.failuresOf(tav::probe::cbWrite), ElementsAre(Failure{tav::probe::cbWrite, 50, TAV_RC_BAD_PARAM}));
 }
 
-struct StraightFailure
+struct StraightFailure : Row
 {
-  const char* name;
   uint32_t point;
   uint32_t code;
   void (*arrange)(SmallRing&);
@@ -364,7 +363,7 @@ INSTANTIATE_TEST_SUITE_P(
         StraightFailure{"ShortRelease", 60, TAV_RC_NO_MEMORY, [](SmallRing& small) { small.storage.longestWrite = 7; }},
         StraightFailure{"Position", 60, KOR_RC_IO_ERROR,
                         [](SmallRing& small) { small.storage.positionCode = KOR_RC_IO_ERROR; }}),
-    [](const auto& row) { return std::string(row.param.name); });
+    kRowName);
 
 // --- marks ---
 
@@ -386,9 +385,8 @@ TEST(MarkPages, NeedsACachedByte)
               ElementsAre(Failure{tav::probe::cbMarkPages, 20, TAV_RC_BAD_PARAM}));
 }
 
-struct Marked
+struct Marked : Row
 {
-  const char* name;
   uint64_t index; ///< where 40 is cached
   uint64_t count;
   uint64_t offset;
@@ -421,7 +419,7 @@ INSTANTIATE_TEST_SUITE_P(Rows, MarkedPages,
                                          Marked{"BeginBeforeWithItsEndAtTheHead", 0, 24, 30, 10, {1, 0, 0}},
                                          Marked{"AcrossTheEndOfTheRing", 16, 24, 47, 4, {1, 0, 1}},
                                          Marked{"AllAcrossTheEnd", 16, 24, 40, 50, {1, 1, 1}}),
-                         [](const auto& row) { return std::string(row.param.name); });
+                         kRowName);
 
 TEST(MarkPages, RefusesARangeThatEndsBeforeTheCachedOne)
 {

@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include "storage/ringFixture.h"
+#include "support/rows.h"
 
 namespace
 {
@@ -76,9 +77,8 @@ TEST(GetChunk, TracesArgumentsAndResult)
   EXPECT_EQ(trace.recordsOf(tav::probe::cbGetChunk).back().kind, KOR_TRACE_EXIT);
 }
 
-struct ForwardRow
+struct ForwardRow : Row
 {
-  const char* name;
   uint64_t index; ///< where 40 is cached
   uint64_t count;
   uint64_t offset;
@@ -109,11 +109,10 @@ INSTANTIATE_TEST_SUITE_P(Rows, ForwardChunk,
                                          ForwardRow{"NoBytes", 0, 16, 41, 0, 1, 0},
                                          ForwardRow{"LastByteOfTheRing", 16, 24, 47, 9, 23, 1},
                                          ForwardRow{"OneByteCached", 5, 1, 40, 9, 5, 1}),
-                         [](const auto& row) { return std::string(row.param.name); });
+                         kRowName);
 
-struct BackwardRow
+struct BackwardRow : Row
 {
-  const char* name;
   uint64_t head;
   uint64_t headOffset;
   uint64_t count;
@@ -152,7 +151,7 @@ INSTANTIATE_TEST_SUITE_P(Rows, BackwardChunk,
                                          BackwardRow{"AtTheHeadOfAWrappedRange", 16, 100, 16, 100, 9, 1, 184},
                                          BackwardRow{"OneByteAtOffsetOne", 3, 1, 1, 1, 9, 1, 1},
                                          BackwardRow{"NoBytes", 0, 100, 16, 110, 0, 0, 210}),
-                         [](const auto& row) { return std::string(row.param.name); });
+                         kRowName);
 
 TEST(GetChunk, BackwardOfOneCachedByteElsewhereThanAtOneHasNoOffset)
 {

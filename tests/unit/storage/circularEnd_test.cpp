@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include "storage/ringFixture.h"
+#include "support/rows.h"
 
 namespace
 {
@@ -45,9 +46,8 @@ TEST(FillAtTheEnd, NeverReadsAcrossTheEndOfTheRing)
   EXPECT_THAT(small.storage.takeLog(), ElementsAre("read 16+8", "read 24+8", "read 32+8"));
 }
 
-struct EndCode
+struct EndCode : Row
 {
-  const char* name;
   uint32_t code;
 };
 
@@ -100,7 +100,7 @@ INSTANTIATE_TEST_SUITE_P(Codes, StoragesEnd,
                          testing::Values(EndCode{"EndOfStorage", TAV_RC_END_OF_STORAGE},
                                          EndCode{"EndOfData", TAV_RC_END_OF_DATA},
                                          EndCode{"SuccessWithoutBytes", TAV_RC_OK}),
-                         [](const auto& row) { return std::string(row.param.name); });
+                         kRowName);
 
 TEST(FillAtTheEnd, ZeroesWhatAWriteFindsMissingOfItsPage)
 {

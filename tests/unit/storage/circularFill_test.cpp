@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include "storage/ringFixture.h"
+#include "support/rows.h"
 #include "tav/probes.h"
 
 namespace
@@ -98,9 +99,8 @@ TEST(Fill, OfAnEmptyRingReadsNoMoreThanTheRing)
   EXPECT_EQ(small.bytes(), pattern(43, 24)) << "an element of exactly the ring's size fits";
 }
 
-struct EmptyBackward
+struct EmptyBackward : Row
 {
-  const char* name;
   uint64_t offset;
   uint64_t length;
   uint64_t headOffset;
@@ -125,7 +125,7 @@ INSTANTIATE_TEST_SUITE_P(
                     EmptyBackward{"TwoPages", 50, 9, 35, 9}, EmptyBackward{"TheWholeRing", 50, 24, 27, 24},
                     EmptyBackward{"MoreThanTheRing", 50, 99, 27, 24}, EmptyBackward{"NearTheFirstByte", 5, 9, 0, 6},
                     EmptyBackward{"ExactlyToTheFirstByte", 7, 8, 0, 8}),
-    [](const auto& row) { return std::string(row.param.name); });
+    kRowName);
 
 // --- sizes ---
 
@@ -306,9 +306,8 @@ TEST(Fill, ReadsThroughWhereTheStorageDoesNotOfferJumps)
   EXPECT_EQ(small.storage.seeks, 0U);
 }
 
-struct JumpBack
+struct JumpBack : Row
 {
-  const char* name;
   uint64_t offset;
   uint64_t headOffset;
 };
@@ -329,7 +328,7 @@ TEST_P(FillJumpsBack, SoThatTheOffsetIsTheLastByteWhereARingFitsBefore)
 INSTANTIATE_TEST_SUITE_P(Rows, FillJumpsBack,
                          testing::Values(JumpBack{"FarFromTheFront", 100, 77}, JumpBack{"ToTheSecondByte", 24, 1},
                                          JumpBack{"ToTheFirstByte", 23, 0}, JumpBack{"NearTheFront", 10, 0}),
-                         [](const auto& row) { return std::string(row.param.name); });
+                         kRowName);
 
 TEST(Fill, ReportsAFailureBehindThePlan)
 {

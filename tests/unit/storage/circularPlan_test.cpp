@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include "storage/ringFixture.h"
+#include "support/rows.h"
 
 namespace
 {
@@ -25,9 +26,8 @@ std::vector<std::string> readsOf(const std::vector<std::string>& log)
   return reads;
 }
 
-struct Cached
+struct Cached : Row
 {
-  const char* name;
   uint64_t index; ///< of the first cached byte, in a ring of 4 pages of 8 bytes
   uint64_t count; ///< from offset 16 on
   uint64_t offset;
@@ -62,7 +62,7 @@ INSTANTIATE_TEST_SUITE_P(
                     Cached{"NoneWhereTheEndsOfTheRangeNearlyMeet", 28, 26, 16, 10, {}},
                     Cached{"TwoBehindTheLastCachedByte", 0, 8, 23, 9, {"read 24+8", "read 32+8"}},
                     Cached{"TwoWhereTheNextPageIsNeeded", 0, 9, 23, 9, {"read 25+7", "read 32+8"}}),
-    [](const auto& row) { return std::string(row.param.name); });
+    kRowName);
 
 // --- a page before the cached range that lies across the ring's end ---
 

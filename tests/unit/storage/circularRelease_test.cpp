@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include "storage/ringFixture.h"
+#include "support/rows.h"
 
 namespace
 {
@@ -98,9 +99,8 @@ TEST(Reset, OfHeadAndTailInOnePageIsOnePiece)
   EXPECT_THAT(small.storage.takeLog(), ElementsAre("seek 40", "write 40+5"));
 }
 
-struct ReleaseFailure
+struct ReleaseFailure : Row
 {
-  const char* name;
   uint32_t point;
   uint32_t code;
   void (*arrange)(SmallRing&);
@@ -155,7 +155,7 @@ INSTANTIATE_TEST_SUITE_P(
                                    [](SmallRing& small) { small.storage.failAt(3, KOR_RC_NO_SPACE); }, 16},
                     ReleaseFailure{"ShortWrite", 20, TAV_RC_NO_MEMORY,
                                    [](SmallRing& small) { small.storage.longestWrite = 7; }, 24}),
-    [](const auto& row) { return std::string(row.param.name); });
+    kRowName);
 
 TEST(Release, AtTheTailWritesThePieceWhereItBelongs)
 {

@@ -6,6 +6,7 @@
 
 #include "storage/ringFixture.h"
 #include "support/failingNew.h"
+#include "support/rows.h"
 #include "support/streams.h"
 
 namespace
@@ -219,9 +220,8 @@ TEST_P(FailingStorage, LeavesIntactWhatHadReachedIt)
   }
 }
 
-struct Call
+struct Call : Row
 {
-  const char* name;
   uint32_t (*run)(TAVHandle*, TAVHeaderData&);
 };
 
@@ -313,7 +313,7 @@ INSTANTIATE_TEST_SUITE_P(Calls, FailingReads,
                          testing::Values(Call{"ReadNode", readAgain}, Call{"PreviousNode", stepBack},
                                          Call{"Scan", scanOn}, Call{"FromIndex", fromIndex}, Call{"Validate", validate},
                                          Call{"Print", print}),
-                         [](const auto& row) { return std::string(row.param.name); });
+                         kRowName);
 
 INSTANTIATE_TEST_SUITE_P(RingPages, FailingStorage, testing::Values(1U, 2U, 3U));
 

@@ -4,6 +4,7 @@
 
 #include "storage/fileFixture.h"
 #include "support/failingNew.h"
+#include "support/rows.h"
 
 namespace
 {
@@ -14,9 +15,8 @@ using testing::IsEmpty;
 
 // --- construction ---
 
-struct ModeRow
+struct ModeRow : Row
 {
-  const char* name;
   uint64_t options;
   uint64_t attributes;
 };
@@ -41,7 +41,7 @@ INSTANTIATE_TEST_SUITE_P(Rows, FileMode,
                          testing::Values(ModeRow{"Read", 0x1, 0x3E}, ModeRow{"Write", 0x2, 0x39},
                                          ModeRow{"ReadAndWrite", 0x3, 0x3F}, ModeRow{"Update", 0x4, 0x3F},
                                          ModeRow{"UpdateAndCreate", 0x104, 0x3F}),
-                         [](const auto& row) { return std::string(row.param.name); });
+                         kRowName);
 
 TEST_F(FileStorage, NeedsBothArguments)
 {
@@ -70,9 +70,8 @@ TEST_F(FileStorage, TellsWhenItsFileObjectCannotBeAllocated)
   EXPECT_THAT(trace.failures(), ElementsAre(at(tav::probe::ssFile, 20, TAV_RC_NO_MEMORY)));
 }
 
-struct OpenRow
+struct OpenRow : Row
 {
-  const char* name;
   const char* file;
   uint64_t options;
   uint32_t code;
@@ -102,7 +101,7 @@ INSTANTIATE_TEST_SUITE_P(Rows, RefusedFile,
                                          OpenRow{"ExistingFile", "stream.tav", kCreate | KOR_FILE_EXCLUSIVE,
                                                  KOR_RC_FILE_EXISTS},
                                          OpenRow{"NoMode", "stream.tav", 0, TAV_RC_BAD_PARAM}),
-                         [](const auto& row) { return std::string(row.param.name); });
+                         kRowName);
 
 TEST_F(FileStorage, TracesConstructionAndEnd)
 {
@@ -283,9 +282,8 @@ TEST_F(FileStorage, NeedsNoBufferForNoBytes)
   EXPECT_EQ(file->position, 4U);
 }
 
-struct UnservedRow
+struct UnservedRow : Row
 {
-  const char* name;
   uint64_t options;
   uint64_t wanted;
   bool zeroCopy;
@@ -320,7 +318,7 @@ INSTANTIATE_TEST_SUITE_P(
                     UnservedRow{"ZeroCopy", 0x1, 5, true, false, 230, TAV_RC_NOT_SUPPORTED},
                     UnservedRow{"ZeroCopyOfNothing", 0x1, 0, true, false, 220, TAV_RC_BAD_PARAM},
                     UnservedRow{"ZeroCopyBackward", 0x1, 5, true, true, 230, TAV_RC_NOT_SUPPORTED}),
-    [](const auto& row) { return std::string(row.param.name); });
+    kRowName);
 
 TEST_F(FileStorage, ReadsBackwardIntoTheEndOfTheBuffer)
 {
@@ -408,9 +406,8 @@ TEST_F(FileStorage, OffersNoMemory)
   EXPECT_EQ(trace.failures().front(), at(tav::probe::ssFileGetMemory, 10, TAV_RC_NOT_SUPPORTED));
 }
 
-struct ClosedRow
+struct ClosedRow : Row
 {
-  const char* name;
   uint32_t probe;
   uint32_t point;
   uint32_t (*call)(TAVSSFile&);
@@ -444,7 +441,7 @@ INSTANTIATE_TEST_SUITE_P(
                               [](TAVSSFile& file) { return file.write(spare, 1, &count); }},
                     ClosedRow{"Lock", tav::probe::ssFileLock, 10, [](TAVSSFile& file) { return file.lock(0); }},
                     ClosedRow{"Unlock", tav::probe::ssFileUnlock, 10, [](TAVSSFile& file) { return file.unlock(); }}),
-    [](const auto& row) { return std::string(row.param.name); });
+    kRowName);
 
 TEST_F(FileStorage, LeavesItsCursorWhereItWasWhenALookBackCannotSeek)
 {
