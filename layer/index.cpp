@@ -5,7 +5,7 @@
 #include <cstdlib>
 #include <vector>
 
-#include "tav/path/compiled.hpp"
+#include "layer/countedPath.h"
 
 namespace tav::detail
 {
@@ -14,7 +14,7 @@ class NodeIndex final : public IndexTable
 {
 public:
   explicit NodeIndex(const Node& start)
-      : start_(start)
+      : start_(start), isEnd_(layout::isEndElement(start.elm()))
   {
   }
 
@@ -33,11 +33,10 @@ public:
   }
   [[nodiscard]] bool knows(const paths::Compiled& path) const noexcept override
   {
-    return routeOf(path) != nullptr;
+    return (paths::countedOf(path).idCount != 0 && !isEnd_) || routeOf(path) != nullptr;
   }
   uint32_t find(const paths::Compiled& path, const Taker& taker) const override
   {
-    const Route& route = path.routes[path.main.front()];
     uint32_t rc = TAV_RC_OK;
     const auto visit = [&](uint32_t child, uint32_t parent) {
       Node node;
@@ -46,10 +45,11 @@ public:
     };
     uint32_t first = kNone;
     uint32_t parent = 0;
-    if (path.isStraight && findStraight(route, first, parent) && !visit(first, parent))
+    if (followIds(paths::countedOf(path), first, parent) && !visit(first, parent))
     {
       return rc;
     }
+    const Route& route = path.routes[path.main.front()];
     eachMatch(path, route, [&](uint32_t child, uint32_t group) { return child == first || visit(child, group); });
     return rc;
   }
@@ -243,36 +243,28 @@ private:
     return kNone;
   }
 
-  /// By the first child of each step, which leads to the first match where it leads anywhere.
-  bool findStraight(const Route& route, uint32_t& found, uint32_t& parent) const noexcept
+  /// Of a short path by the first child of each step, which leads to the first match where it leads anywhere.
+  bool followIds(const paths::Counted& path, uint32_t& found, uint32_t& parent) const noexcept
   {
-    uint32_t at = 0;
-    for (const Step& step : route.steps)
+    uint32_t at = path.idCount != 0 ? 0 : kNone;
+    for (uint32_t i = 0; i < path.idCount && at != kNone; ++i)
     {
       parent = at;
-      at = firstOf(entries_[parent], step.only);
-      if (at == kNone)
-      {
-        return false;
-      }
+      at = firstOf(entries_[parent], path.ids[i]);
     }
     found = at;
-    return true;
+    return at != kNone;
   }
 
   /// The route of a path that is looked up; null for one that takes a walk.
   [[nodiscard]] const Route* routeOf(const Compiled& compiled) const noexcept
   {
-    if (compiled.main.size() != 1 || compiled.leavesStart || layout::isEndElement(start_.elm()))
+    if (compiled.main.size() != 1 || compiled.leavesStart || isEnd_)
     {
       return nullptr;
     }
     const Route& route = compiled.routes[compiled.main.front()];
     const size_t count = route.steps.size();
-    if (compiled.isStraight && count <= kMostSteps) [[likely]]
-    {
-      return &route; // whose steps ask for one id each, and for none that ends a group
-    }
     bool isKnown = count != 0 && count <= kMostSteps && route.steps.back().axis == Axis::child;
     for (size_t i = 0; isKnown && i < count; ++i)
     {
@@ -467,6 +459,7 @@ private:
   }
 
   Node start_;
+  bool isEnd_; ///< the start only ends a group
   std::vector<Entry> entries_;
   std::vector<uint32_t> table_; ///< of entries, by parent and id
 };

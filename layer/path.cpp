@@ -1,30 +1,14 @@
 // Paths that were read, each for as long as anybody has it.
 #include "tav/path/path.hpp"
 
-#include <atomic>
 #include <memory>
 #include <string_view>
 
+#include "layer/countedPath.h"
 #include "layer/pathParser.h"
-#include "tav/path/compiled.hpp"
 
 namespace tav::detail::paths
 {
-
-namespace
-{
-
-struct Counted : Compiled
-{
-  mutable std::atomic<size_t> owners = 1;
-};
-
-const Counted& countedOf(const Compiled& path) noexcept
-{
-  return static_cast<const Counted&>(path);
-}
-
-} // namespace
 
 const Compiled* readPath(const char* text, size_t length, const dictionary::OwnName* own, size_t owns,
                          const FaultTaker& taker)
@@ -32,6 +16,7 @@ const Compiled* readPath(const char* text, size_t length, const dictionary::OwnN
   auto path = std::make_unique<Counted>();
   PathFault fault;
   Parser(std::string_view(text, length), dictionary::OwnNames(own, owns), *path, fault).parse();
+  path->keepIds();
   if (fault.kind != PathFault::Kind::none)
   {
     taker.take(taker.fault, static_cast<uint32_t>(fault.kind), fault.column,
