@@ -16,8 +16,8 @@ struct Counted : Compiled
 {
   mutable std::atomic<size_t> owners = 1;
 
-  /// The ids of a short path that is straight and does not leave its start, next to each other: a look-up in an index is
-  /// over before a step has come from memory.
+  /// The ids of a short path that is straight and does not leave its start, next to each other: a look-up in an index
+  /// is over before a step has come from memory.
   uint32_t idCount = 0;
   std::array<uint16_t, 12> ids{};
 
