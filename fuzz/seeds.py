@@ -48,6 +48,8 @@ def seeds_of(name, made, swapped, aligned):
     for asked in range(4):
         yield "table", bytes((flags | 8 * (asked & 1), asked)) + made
     for part in (10, 60):
+        yield "rows", bytes((flags, part)) + made
+        yield "rows", bytes((flags | 8, part)) + made
         yield "plan", bytes((flags, part)) + made
     yield "recover", bytes((flags,)) + made
     yield "recover", bytes((flags,)) + made[:len(made) * 2 // 3]
