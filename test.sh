@@ -328,7 +328,8 @@ count_python()
 # The extension for DuckDB, in the engine that duckdb/package.json names.
 check_sql()
 {
-  build release -DTAV_BUILD_DUCKDB=ON --target tav_duckdb tav_tool tav_generate
+  build release -DTAV_BUILD_DUCKDB=ON -DTAV_BUILD_PYTHON=ON -DPython3_EXECUTABLE=/usr/bin/python3 \
+    --target tav_duckdb tav_python tav_tool tav_generate
   npm --prefix duckdb ci --ignore-scripts --no-audit --no-fund --silent >"$work/npm.log" 2>&1 ||
     { cat "$work/npm.log"; return 1; }
   node --test --test-reporter=tap duckdb/tests/*.test.mjs >"$work/tests.log" ||
