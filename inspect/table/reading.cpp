@@ -3,6 +3,7 @@
 #include <utility>
 
 #include "inspect/table/cut.h"
+#include "inspect/text/bytes.h"
 
 namespace tav::inspect
 {
@@ -151,7 +152,7 @@ void TableReading::takeData(const Automaton::Move& move)
 RawCell TableReading::valueOf(const Node& node)
 {
   const uint64_t size = std::min(node.size(), node.limit - std::min(node.limit, node.payloadOffset()));
-  buffer_.resize(static_cast<size_t>(std::min(size, source_.size())));
+  buffer_.resize(lengthInMemory(source_, node.payloadOffset(), std::min(size, source_.size())));
   buffer_.resize(source_.read(node.payloadOffset(), buffer_));
   return {node.type(), buffer_.data(), buffer_.size(), walk_.form().swapped};
 }

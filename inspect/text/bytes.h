@@ -1,6 +1,7 @@
 /// @file bytes.h
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <span>
 #include <string_view>
@@ -15,6 +16,20 @@ namespace tav::inspect
 inline std::string_view asText(std::span<const uint8_t> bytes)
 {
   return {reinterpret_cast<const char*>(bytes.data()), bytes.size()};
+}
+
+/// Throws the Error of `lengthInMemory`.
+[[noreturn]] void failAtLength(const ByteSource& source, uint64_t offset, uint64_t count);
+
+/// The length of a buffer for bytes of a source. Throws Error where memory cannot have that many: where addresses have 32
+/// bits, a file can have payloads longer than that.
+inline size_t lengthInMemory(const ByteSource& source, uint64_t offset, uint64_t count)
+{
+  if (count > static_cast<uint64_t>(PTRDIFF_MAX))
+  {
+    failAtLength(source, offset, count);
+  }
+  return static_cast<size_t>(count);
 }
 
 /// Bytes of a source: where they lie when they are at hand, else in `room`; fewer only at the end. Valid until the

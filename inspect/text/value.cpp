@@ -119,7 +119,7 @@ Bytes storedBytes(ByteSource& source, const Node& node, uint64_t most, std::vect
 {
   const uint64_t size = std::min(node.size(), node.limit - std::min(node.limit, node.payloadOffset()));
   // Never more than the file has, whatever a header claims.
-  const auto count = static_cast<size_t>(std::min({most, size, source.size()}));
+  const size_t count = lengthInMemory(source, node.payloadOffset(), std::min({most, size, source.size()}));
   return bytesAt(source, node.payloadOffset(), count, room);
 }
 
