@@ -21,8 +21,8 @@ inline std::string_view asText(std::span<const uint8_t> bytes)
 /// Throws the Error of `lengthInMemory`.
 [[noreturn]] void failAtLength(const ByteSource& source, uint64_t offset, uint64_t count);
 
-/// The length of a buffer for bytes of a source. Throws Error where memory cannot have that many: where addresses have 32
-/// bits, a file can have payloads longer than that.
+/// The length of a buffer for bytes of a source. Throws Error where memory cannot have that many: where addresses have
+/// 32 bits, a file can have payloads longer than that.
 inline size_t lengthInMemory(const ByteSource& source, uint64_t offset, uint64_t count)
 {
   if (count > static_cast<uint64_t>(PTRDIFF_MAX))

@@ -143,4 +143,5 @@ TEST_P(LongValue, IsRefusedAsAWholeAndNotCutWithoutAWord)
   }
 }
 
-INSTANTIATE_TEST_SUITE_P(Types, LongValue, testing::Values(TAV_TYPE_BINARY, TAV_TYPE_ASCII_STRING, TAV_TYPE_UTF8_STRING));
+INSTANTIATE_TEST_SUITE_P(Types, LongValue,
+                         testing::Values(TAV_TYPE_BINARY, TAV_TYPE_ASCII_STRING, TAV_TYPE_UTF8_STRING));
