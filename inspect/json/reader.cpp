@@ -336,7 +336,7 @@ void DocumentReader::startArray()
   case Where::document:
     if (level.key != "nodes" || level.given)
     {
-      fail("an array cannot stand here");
+      fail(level.key == "nodes" ? "the nodes are given twice" : "an array cannot stand here");
     }
     beginNodes();
     level.given = true;

@@ -174,8 +174,9 @@ void appendValueText(std::string& out, ByteSource& source, const Form& form, con
   {
     return;
   }
+  most = std::max<uint64_t>(most, 16); // what all types but texts, bytes and arrays need
   std::vector<uint8_t> room;
-  const Bytes bytes = storedBytes(source, node, std::max<uint64_t>(most, 16), room);
+  const Bytes bytes = storedBytes(source, node, most, room);
   if (isNoValue(node))
   {
     detail::paths::appendDigits(out, bytes.data(), bytes.size());

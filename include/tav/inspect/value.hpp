@@ -23,7 +23,8 @@ TAV_INSPECT_API std::vector<uint8_t> payloadBytes(ByteSource& source, const Form
 
 /// The value as one line of text without line breaks: numbers in decimal, 128-bit ones too; strings in quotation marks
 /// with escapes; calendar dates; bytes in hexadecimal. A value of the wrong size is shown as its bytes. At most `most`
-/// bytes of the payload are read; " ..." shows that there are more. A group has no value: empty.
+/// bytes of the payload are read, or 16 where that is less; " ..." shows that there are more. A group has no value:
+/// empty.
 TAV_INSPECT_API std::string valueText(ByteSource& source, const Form& form, const Node& node, uint64_t most);
 
 /// Appends it.
