@@ -363,3 +363,45 @@ TEST(C, KnowsTheNames)
   EXPECT_THAT(tav_message(TAV_RC_NOT_FOUND), StrEq("nothing was found, or no group is open"));
   EXPECT_THAT(tav_message(1), StrEq("unknown code"));
 }
+
+TEST(CDictionary, NamesOwnElementsForItsReaderAlone)
+{
+  const test::TemporaryPath file;
+  const std::string text = R"({"40001": {"tag": "queueDepth", "kind": "gauge", "unit": "1", "text": "waiting jobs"}})";
+  test::writeFile(file.path, Bytes(text.begin(), text.end()));
+  const std::string path = tav::FilePath(file.path).text();
+  const Bytes bytes = test::valuesOf();
+  const CReader reader = openMemory(bytes);
+  const CReader other = openMemory(bytes);
+  uint16_t elm = 0;
+  EXPECT_EQ(tav_reader_id(reader.get(), "queueDepth", &elm), TAV_RC_NOT_FOUND);
+  EXPECT_EQ(tav_reader_tag(reader.get(), 40001), nullptr);
+  ASSERT_EQ(tav_reader_dictionary(reader.get(), path.c_str()), TAV_RC_OK) << tav_last_message(reader.get());
+  EXPECT_EQ(tav_reader_id(reader.get(), "queueDepth", &elm), TAV_RC_OK);
+  EXPECT_EQ(elm, 40001);
+  EXPECT_STREQ(tav_reader_tag(reader.get(), 40001), "queueDepth");
+  EXPECT_STREQ(tav_reader_tag(reader.get(), TAV_ELM_CMN_CPU_ONLINE), "cpuOnline");
+  EXPECT_EQ(found(reader, "/system/queueDepth").elm, 40001);
+  EXPECT_EQ(tav_reader_tag(other.get(), 40001), nullptr);
+  EXPECT_EQ(tav_tag(40001), nullptr);
+  tav_node node{};
+  EXPECT_NE(tav_find(other.get(), nullptr, "/system/queueDepth", &node), TAV_RC_OK);
+}
+
+TEST(CDictionary, RefusesNullsAndWhatIsNoDictionary)
+{
+  const Bytes bytes = test::valuesOf();
+  const CReader reader = openMemory(bytes);
+  uint16_t elm = 0;
+  EXPECT_EQ(tav_reader_dictionary(nullptr, "x"), TAV_RC_BAD_PARAM);
+  EXPECT_NE(tav_reader_dictionary(reader.get(), nullptr), TAV_RC_OK);
+  EXPECT_THAT(tav_last_message(reader.get()), HasSubstr("no path was given"));
+  EXPECT_EQ(tav_reader_tag(nullptr, TAV_ELM_CMN_CPU_ONLINE), nullptr);
+  EXPECT_EQ(tav_reader_id(nullptr, "cpuOnline", &elm), TAV_RC_BAD_PARAM);
+  EXPECT_EQ(tav_reader_id(reader.get(), nullptr, &elm), TAV_RC_BAD_PARAM);
+  EXPECT_EQ(tav_reader_id(reader.get(), "cpuOnline", nullptr), TAV_RC_BAD_PARAM);
+  const test::TemporaryPath file;
+  test::writeFile(file.path, Bytes{'['});
+  EXPECT_NE(tav_reader_dictionary(reader.get(), tav::FilePath(file.path).text().c_str()), TAV_RC_OK);
+  EXPECT_STREQ(tav_reader_tag(reader.get(), TAV_ELM_CMN_CPU_ONLINE), "cpuOnline"); // it keeps what it had
+}

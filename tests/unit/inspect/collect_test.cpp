@@ -1,4 +1,5 @@
 #include <string>
+#include <utility>
 #include <vector>
 
 #include <gmock/gmock.h>
@@ -109,4 +110,91 @@ TEST(Collect, RefusesAnEmptyNarrowRootBeforeAnother)
   Collector collector(made.file());
   collector.add(source, {.root64 = false});
   EXPECT_THROW(collector.add(source, {.root64 = false}), Error);
+}
+
+namespace
+{
+
+/// What a collector takes from where a path leads in a system of two hosts, one of them in another; nodes and bytes.
+std::pair<uint64_t, Bytes> foundBy(const std::string& path)
+{
+  tav::Writer writer;
+  {
+    tav::Group system = writer.group(TAV_ELM_CMN_SYSTEM);
+    system.add(TAV_ELM_CMN_CPU_ONLINE, uint32_t{1});
+    for (const uint32_t number : {2U, 3U})
+    {
+      tav::Group host = system.group(TAV_ELM_CMN_HOST);
+      host.add(TAV_ELM_CMN_CPU_ONLINE, number);
+      host.group(TAV_ELM_CMN_HOST).add(TAV_ELM_CMN_HOST_NAME, "ada");
+    }
+  }
+  writer.finish();
+  const auto view = writer.bytes();
+  ByteSource source("x", std::span(reinterpret_cast<const uint8_t*>(view.data()), view.size()));
+  test::Made made;
+  Collector collector(made.file());
+  uint64_t seen = 0;
+  collector.addFound(source, {}, Path(path), [&](const Walker&, const Event&) { ++seen; });
+  collector.finish();
+  EXPECT_GT(seen, 10U);
+  return {collector.nodes(), made.bytes()};
+}
+
+} // namespace
+
+TEST(CollectFound, TakesTheOutermostOfNestedGroups)
+{
+  const auto [nodes, bytes] = foundBy("**/host");
+  EXPECT_EQ(nodes, 8U); // two hosts, each with a number, a host and its name
+  ByteSource source("x", std::span<const uint8_t>(bytes));
+  Walker walker(source, {});
+  std::vector<std::string> roots;
+  for (Event event; walker.next(event);)
+  {
+    if (event.what == What::nodeBegin && event.depth == 0)
+    {
+      roots.push_back(walker.path(event));
+    }
+  }
+  EXPECT_THAT(roots, testing::ElementsAre("/host", "/host[2]"));
+}
+
+TEST(CollectFound, TakesOneOfSeveral)
+{
+  const auto [nodes, bytes] = foundBy("/system/host[2]");
+  EXPECT_EQ(nodes, 4U);
+  ByteSource source("x", std::span<const uint8_t>(bytes));
+  Walker walker(source, {});
+  for (Event event; walker.next(event);)
+  {
+    if (event.what == What::nodeBegin && event.node.elm() == TAV_ELM_CMN_CPU_ONLINE)
+    {
+      EXPECT_EQ(walker.path(event), "/host/cpuOnline");
+      EXPECT_EQ(valueText(source, {}, event.node, 16), "3");
+    }
+  }
+}
+
+TEST(CollectFound, RefusesWhatIsNoGroupAndWhatIsNotThere)
+{
+  try
+  {
+    foundBy("/system/host[2]/cpuOnline");
+    FAIL() << "a value cannot stand for itself";
+  }
+  catch (const Error& error)
+  {
+    EXPECT_EQ(error.problem().path, "/system/host[2]/cpuOnline");
+    EXPECT_THAT(error.problem().sentence, testing::StartsWith("is no group"));
+  }
+  try
+  {
+    foundBy("/system/host[3]");
+    FAIL() << "there are two";
+  }
+  catch (const Error& error)
+  {
+    EXPECT_EQ(error.trouble(), Trouble::notFound);
+  }
 }

@@ -98,7 +98,10 @@ protected:
     }
     return rows.fill(16 + there - rows.at(), 'a').bytes;
   }
-  std::string text(uint16_t type, uint64_t size, uint64_t most) { return firstValue(node(type, size, size), form, most); }
+  std::string text(uint16_t type, uint64_t size, uint64_t most)
+  {
+    return firstValue(node(type, size, size), form, most);
+  }
 
   tav::inspect::Form form{.swapped = GetParam()};
 };
@@ -151,7 +154,11 @@ TEST(Value, TextForATerminalHasNothingThatSteersIt)
   EXPECT_EQ(forTerminal("a \"b\" c\\d"), "a \"b\" c\\d");
   EXPECT_EQ(quoted("a \"b\" c\\d"), R"("a \"b\" c\\d")");
   EXPECT_EQ(forTerminal("\x1B[31m\n\x7F"), R"(\x1b[31m\n\x7f)");
-  EXPECT_EQ(forTerminal("\xC2\x9B" "31m"), R"(\xc2\x9b31m)");
+  EXPECT_EQ(forTerminal("\xC2\x9B"
+                        "31m"),
+            R"(\xc2\x9b31m)");
   EXPECT_EQ(forTerminal("a\xFFz"), R"(a\xffz)");
-  EXPECT_EQ(forTerminal("\xE2\x80\xAE" "abc"), R"(\xe2\x80\xaeabc)");
+  EXPECT_EQ(forTerminal("\xE2\x80\xAE"
+                        "abc"),
+            R"(\xe2\x80\xaeabc)");
 }
