@@ -11,7 +11,7 @@
 #include "tav/kor.h"
 #include "tools/host/child.h"
 
-extern char** environ;
+extern char** environ; // NOLINT(readability-redundant-declaration): not every system has it in a header
 
 namespace tav::host
 {
@@ -142,6 +142,7 @@ uint32_t Child::start(const std::string& program, const std::vector<std::string>
   std::vector<std::string> all{program};
   all.insert(all.end(), words.begin(), words.end());
   std::vector<char*> pointers;
+  pointers.reserve(all.size() + 1);
   for (std::string& word : all) pointers.push_back(word.data());
   pointers.push_back(nullptr);
   pid_t process = -1;
