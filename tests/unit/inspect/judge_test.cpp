@@ -3,13 +3,12 @@
 
 #include <gmock/gmock.h>
 
-#include "inspect/recover/judge.h"
-#include "inspect/streams.h"
-#include "support/byteRows.h"
+#include "inspect/judged.h"
 
 using namespace tav::inspect;
 using test::ByteRows;
 using test::Bytes;
+using test::Judged;
 
 namespace
 {
@@ -17,23 +16,6 @@ namespace
 constexpr uint32_t kEye = TAV_INFO_EYE_SIZE;
 constexpr uint16_t kUnknownType = 77;
 constexpr uint16_t kUnknownElement = 12345;
-
-/// Bytes, the place that they are judged from, and the judge.
-class Judged
-{
-public:
-  Judged(Bytes bytes, const tav::inspect::Form& form)
-      : bytes_(std::move(bytes)), source_("x", std::span<const uint8_t>(bytes_)), place(form, bytes_.size()),
-        judge(source_, form, place) {}
-
-private:
-  Bytes bytes_;
-  ByteSource source_;
-
-public:
-  Place place;
-  Judge judge;
-};
 
 /// Everything that a judge says of the node at an offset.
 auto answer(const Judge& judge, uint64_t offset, bool wide)
@@ -47,17 +29,9 @@ auto answer(const Judge& judge, uint64_t offset, bool wide)
 } // namespace
 
 /// What is judged in this machine's byte order and in the other one.
-class Judging : public testing::TestWithParam<bool>
+class Judging : public test::BothOrders
 {
 protected:
-  ByteRows rows{GetParam()};
-  tav::inspect::Form form{.swapped = GetParam()};
-
-  /// A value of four bytes, without a pair.
-  void number(uint16_t elm = TAV_ELM_CMN_CPU_ONLINE, uint32_t info = 0)
-  {
-    rows.h64(4, info, TAV_TYPE_UINT32, elm).number(9, 4);
-  }
   Candidate lookAtFirst() { return Judged(rows.bytes, form).judge.look(0, true); }
 };
 

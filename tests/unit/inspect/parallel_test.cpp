@@ -154,6 +154,16 @@ std::string tabled(const Bytes& bytes, const tav::inspect::Form& form, const Tab
   return text + told + (stopped ? problemLine(*stopped) : "");
 }
 
+/// Damaged in none, one or more places, by a seed.
+Bytes damagedOften(Bytes bytes, uint64_t seed)
+{
+  for (uint64_t i = 0; i < seed / 2; ++i)
+  {
+    bytes = test::damaged(bytes, seed * 7 + i);
+  }
+  return bytes;
+}
+
 void expectSameTables(const Bytes& bytes, const tav::inspect::Form& form, const std::vector<uint64_t>& parts)
 {
   for (size_t i = 0; i < tables().size(); ++i)
@@ -194,10 +204,7 @@ TEST(Parallel, MakesTablesOfRootsAsOneThreadDoes)
       const Bytes more = test::namedStream(seed * 31 + i);
       bytes.insert(bytes.end(), more.begin(), more.end());
     }
-    for (uint64_t i = 0; i < seed / 2; ++i)
-    {
-      bytes = test::damaged(bytes, seed * 7 + i);
-    }
+    bytes = damagedOften(bytes, seed);
     expectSameTables(bytes, {}, {100, 1000, bytes.size() / 3});
   }
 }
@@ -207,11 +214,7 @@ TEST(Parallel, MakesTablesOfLongGroupsAsOneThreadDoes)
   for (uint64_t seed = 0; seed < test::casesOf(8).count; ++seed)
   {
     SCOPED_TRACE(seed);
-    Bytes bytes = longGroup(300, seed % 2 == 1);
-    for (uint64_t i = 0; i < seed / 2; ++i)
-    {
-      bytes = test::damaged(bytes, seed * 7 + i);
-    }
+    const Bytes bytes = damagedOften(longGroup(300, seed % 2 == 1), seed);
     expectSameTables(bytes, {}, {500, 9000});
   }
 }
@@ -266,11 +269,7 @@ TEST(Parallel, ChecksLongGroupsAsOneThreadDoes)
   for (uint64_t seed = 0; seed < test::casesOf(12).count; ++seed)
   {
     SCOPED_TRACE(seed);
-    Bytes bytes = longGroup(700, seed % 2 == 1);
-    for (uint64_t i = 0; i < seed / 2; ++i)
-    {
-      bytes = test::damaged(bytes, seed * 7 + i);
-    }
+    const Bytes bytes = damagedOften(longGroup(700, seed % 2 == 1), seed);
     const std::string one = checked(bytes, {}, seed % 3 == 0, 1, 0);
     for (const uint64_t part : {500U, 9000U})
     {

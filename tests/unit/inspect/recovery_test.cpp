@@ -3,9 +3,9 @@
 
 #include <gmock/gmock.h>
 
+#include "inspect/judged.h"
 #include "inspect/recover/recovery.h"
 #include "inspect/streams.h"
-#include "support/byteRows.h"
 
 using namespace tav::inspect;
 using test::ByteRows;
@@ -61,13 +61,8 @@ struct Recovered
 } // namespace
 
 /// What is recovered in this machine's byte order and in the other one.
-class Recovering : public testing::TestWithParam<bool>
+class Recovering : public test::BothOrders
 {
-protected:
-  ByteRows rows{GetParam()};
-  tav::inspect::Form form{.swapped = GetParam()};
-
-  void number() { rows.h64(4, 0, TAV_TYPE_UINT32, TAV_ELM_CMN_CPU_ONLINE).number(9, 4); }
 };
 
 INSTANTIATE_TEST_SUITE_P(Swapped, Recovering, testing::Bool());

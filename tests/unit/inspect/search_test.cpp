@@ -1,11 +1,12 @@
+#include <algorithm>
 #include <random>
 #include <vector>
 
 #include <gmock/gmock.h>
 
+#include "inspect/judged.h"
 #include "inspect/recover/search.h"
 #include "inspect/streams.h"
-#include "support/byteRows.h"
 
 using namespace tav::inspect;
 using test::ByteRows;
@@ -15,40 +16,38 @@ namespace
 {
 
 /// A search over bytes, from the root level of a file.
-class Searched
+class Searched : public test::Judged
 {
 public:
-  Searched(Bytes bytes, const tav::inspect::Form& form, uint64_t budget = kNoOffset)
-      : bytes_(std::move(bytes)), source_("x", std::span<const uint8_t>(bytes_)), place(form, bytes_.size()),
-        judge(source_, form, place), search(source_, form, place, judge, budget) {}
+  Searched(Bytes all, const tav::inspect::Form& form, uint64_t budget = kNoOffset)
+      : Judged(std::move(all), form), search(source, form, place, judge, budget) {}
 
-private:
-  Bytes bytes_;
-  ByteSource source_;
-
-public:
-  Place place;
-  Judge judge;
   RecoverySearch search;
 };
 
 } // namespace
 
 /// What is searched in this machine's byte order and in the other one.
-class Searching : public testing::TestWithParam<bool>
+class Searching : public test::BothOrders
 {
 protected:
-  ByteRows rows{GetParam()};
-  tav::inspect::Form form{.swapped = GetParam()};
-
-  void number() { rows.h64(4, 0, TAV_TYPE_UINT32, TAV_ELM_CMN_CPU_ONLINE).number(9, 4); }
-
   /// A header that claims two numbers, which are all of its payload.
   void around(uint16_t type)
   {
     rows.h64(40, 0, type, TAV_ELM_CMN_HOST_NAME);
     number();
     number();
+  }
+
+  /// Whether the first node is believed on all of these footings when another one follows.
+  bool believes(const std::vector<Footing>& footings)
+  {
+    number();
+    Searched it(rows.bytes, form);
+    Candidate found = it.judge.look(0, true);
+    EXPECT_EQ(found.trust, Trust::followed);
+    return std::all_of(footings.begin(), footings.end(),
+                       [&](Footing footing) { return it.search.believe(found, footing); });
   }
 };
 
@@ -100,22 +99,13 @@ TEST_P(Searching, GivesUpWhenItsBudgetIsUsedUp)
 TEST_P(Searching, ATextThatNodesFillIsNotBelieved)
 {
   around(TAV_TYPE_ASCII_STRING);
-  number();
-  Searched it(rows.bytes, form);
-  Candidate found = it.judge.look(0, true);
-  ASSERT_EQ(found.trust, Trust::followed);
-  EXPECT_FALSE(it.search.believe(found, Footing::sound));
+  EXPECT_FALSE(believes({Footing::sound}));
 }
 
 TEST_P(Searching, BytesThatNodesFillAreBelieved)
 {
   around(TAV_TYPE_BINARY);
-  number();
-  Searched it(rows.bytes, form);
-  Candidate found = it.judge.look(0, true);
-  ASSERT_EQ(found.trust, Trust::followed);
-  EXPECT_TRUE(it.search.believe(found, Footing::sound));
-  EXPECT_TRUE(it.search.believe(found, Footing::searched));
+  EXPECT_TRUE(believes({Footing::sound, Footing::searched}));
 }
 
 TEST_P(Searching, AClaimThatCoversNodesIsBelievedWhereNothingInItIsSurer)
