@@ -105,7 +105,8 @@ class Record(ToolTest):
     def test_the_readme_says_what_happens(self):
         block = next(block for block in re.findall(r"```sh\n(.*?)```", README.read_text(), re.DOTALL) if "kill -9" in block)
         self.assertIn("\nsleep 2\n", block)  # a busy machine takes longer: the first one is waited for
-        block = block.replace("\nsleep 2\n", "\nfor _ in {1..2000}; do tav get day.tav /system/timestamp >/dev/null 2>&1 && break; sleep 0.1; done\n")
+        first = "for _ in {1..2000}; do tav get day.tav /system/timestamp >/dev/null 2>&1 && break; sleep 0.1; done"
+        block = block.replace("\nsleep 2\n", f"\n{first}\n")
         script = "set -e\ntav() { " + " ".join(f"'{word}'" for word in TAV) + ' "$@"; }\n' + block.replace(
             "tav snapshot --append --every 500ms -o day.tav &", " ".join(f"'{word}'" for word in TAV) +
             " snapshot --append --every 500ms -o day.tav &")
