@@ -16,33 +16,13 @@ namespace
 
 constexpr uint64_t kAbandon = 1;
 
-/// So many groups may be open for the headers of those that have left the ring to be written one at a time. Where more
-/// are, many of them share a page, and bringing it back once serves them all.
-constexpr uint32_t kMostAlone = 64;
-
-/// Writes into a file what belongs into a header that has left the ring, behind what the ring has of the group: a
-/// process that is killed then leaves no group whose size counts bytes that never came. To bring the header's page back
-/// costs far more: it is written once more itself. False where that is not possible; then the ring does it, whose codes
-/// and records tell what is wrong. Storages of others get pages as ever.
-bool writePastRing(TAVHandle& handle, uint64_t offset, const uint8_t* bytes, uint64_t length)
-{
-  TAVCircularBuf* const ring = handle.pCircularBuf;
-  if (isDirect(handle) || ring == nullptr || tracing() || handle.pHdrStack->count > kMostAlone)
-  {
-    return false;
-  }
-  return ring->pStorage->kind == TAV_STORAGE_FILE && !ring->isCached(offset) &&
-         ring->writeBefore(handle.streamBytes) == TAV_RC_OK && ring->write(offset, bytes, length, true) == TAV_RC_OK;
-}
-
 /// Writes the size of a group over the one in the stream.
 uint32_t patchSize(TAVHandle& handle, const TAVHeader& group)
 {
   uint64_t position = group.nodeOffset;
   std::array<uint8_t, sizeof(uint64_t)> bytes;
   const uint64_t length = core::encodeGroupSize(sizeOf(group), is64(group), handle.swapBytes != 0, bytes.data());
-  return writePastRing(handle, position, bytes.data(), length) ? TAV_RC_OK
-                                                               : rawWrite(handle, position, bytes.data(), length);
+  return rawWrite(handle, position, bytes.data(), length);
 }
 
 bool abandonGroup(TraceFrame& frame, TAVHandle& handle, const TAVHeader& group)

@@ -22,7 +22,6 @@ public:
   {
     attributes = TAV_ATTR_WRITABLE | TAV_ATTR_READ_FORWARD | TAV_ATTR_READ_BACKWARD | TAV_ATTR_SEEK;
     ioUnit = pageBytes;
-    kind = TAV_STORAGE_FILE;
   }
 
   uint32_t seek(uint64_t offset, uint64_t) override

@@ -1,6 +1,4 @@
 /// How pages leave the ring: the page-release step.
-#include <algorithm>
-
 #include "storage/cachedRun.h"
 #include "storage/circularPiece.h"
 #include "tav/probes.h"
@@ -103,16 +101,4 @@ void TAVCircularBuf::dropPiece(const Piece& piece, bool fromTail)
   {
     head = piece.index + piece.length == ringSize ? 0 : piece.index + piece.length;
   }
-}
-
-uint32_t TAVCircularBuf::writeBefore(uint64_t offset)
-{
-  if (isEmpty() || offset <= headOffset)
-  {
-    return TAV_RC_OK;
-  }
-  const uint64_t length = std::min(offset - headOffset, cachedCount());
-  const uint64_t first = std::min(length, ringSize - head);
-  const uint32_t rc = writeStraight(headOffset, pRing + head, first);
-  return rc == TAV_RC_OK && first < length ? writeStraight(headOffset + first, pRing, length - first) : rc;
 }

@@ -275,8 +275,6 @@ public:
   /// asked. Without `copy` the pointer leads into the ring and is valid until the next call.
   uint32_t getChunk(uint64_t offset, uint64_t length, TAVCBUserArea* area, bool backward, bool copy);
 
-  /// Writes what is cached before a stream offset, and keeps it cached and pending. Leaves no trace record.
-  uint32_t writeBefore(uint64_t offset);
   /// Writes all pending pages and empties the ring.
   uint32_t reset();
   /// Resets, then caches `pages` pages from `offset` plus `adjustment` bytes on.
