@@ -69,22 +69,40 @@ Form DocumentState::formAt(uint64_t offset) const
   return behind == forms.begin() ? recognition.form : std::prev(behind)->second;
 }
 
-std::string DocumentState::pathAt(uint64_t offset, PathStyle style) const
+namespace
 {
-  StreamWalk walk(*source, recognition.form, [](const PassedOver&) {});
-  Event event;
+
+/// Walks to the node at an offset, past the groups that end before it; false where no node begins there.
+bool walkTo(StreamWalk& walk, uint64_t offset, Event& event)
+{
   while (walk.next(event) && event.offset <= offset)
   {
     if (event.what == What::nodeBegin && event.offset == offset)
     {
-      return walk.walker().path(event, style);
+      return true;
     }
     if (event.what == What::nodeBegin && event.node.isGroup() && event.node.limit <= offset)
     {
       walk.skip();
     }
   }
-  return {};
+  return false;
+}
+
+} // namespace
+
+std::string DocumentState::pathAt(uint64_t offset, PathStyle style) const
+{
+  StreamWalk walk(*source, recognition.form, [](const PassedOver&) {});
+  Event event;
+  return walkTo(walk, offset, event) ? walk.walker().path(event, style) : std::string();
+}
+
+bool DocumentState::isEmptyAt(uint64_t offset) const
+{
+  StreamWalk walk(*source, recognition.form, [](const PassedOver&) {});
+  Event event;
+  return walkTo(walk, offset, event) && event.depth != 0 && !event.node.has(kOpen);
 }
 
 void DocumentState::learn(uint64_t offset, const Form& form)

@@ -12,9 +12,13 @@ namespace
 
 constexpr uint64_t kToldEvery = 4096; // nodes, of which a search tells how far it is
 
-WalkStart startAt(const TAVHeader& node)
+/// A group that says that it is empty can be one that was never closed, which only what is around it tells.
+WalkStart startAt(const DocumentState& state, const TAVHeader& node)
 {
-  return {.offset = node.nodeOffset, .wide = layout::is64(node)};
+  const bool saysEmpty = layout::isGroup(node) && layout::sizeOf(node) == 0;
+  return {.offset = node.nodeOffset,
+          .wide = layout::is64(node),
+          .inside = saysEmpty && state.isEmptyAt(node.nodeOffset)};
 }
 
 Form formOf(const SearchStart& start)
@@ -49,7 +53,7 @@ Search::Search(DocumentState& state, const SearchStart& start, bool isBelow, Pat
     : state_(state), matcher_(std::move(matcher)), onDamage_(onDamage),
       walk_(
           *state.source, isBelow ? formOf(start) : state.recognition.form,
-          [this](const PassedOver& passed) { passOver(passed); }, isBelow ? startAt(start.node) : WalkStart{}),
+          [this](const PassedOver& passed) { passOver(passed); }, isBelow ? startAt(state, start.node) : WalkStart{}),
       start_(start.node.nodeOffset), isBelow_(isBelow)
 {
 }

@@ -33,6 +33,9 @@ struct DocumentState
   /// The form of the stream that a node is in which a walk has handed out.
   Form formAt(uint64_t offset) const;
 
+  /// Whether the group at an offset, which says that it is empty, is a closed one: what is behind it is not in it then.
+  bool isEmptyAt(uint64_t offset) const;
+
   /// The path of the node at an offset: walks up to it. Empty where no node begins there.
   std::string pathAt(uint64_t offset, PathStyle style) const;
 

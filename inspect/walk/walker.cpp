@@ -30,7 +30,7 @@ uint64_t missingPadding(const Event& ended, const Form& form)
 
 Walker::Walker(ByteSource& source, const Form& form, WalkStart start)
     : source_(source), form_(form), prober_(std::make_unique<Prober>(source, form, start.budget)),
-      position_(std::min(start.offset, source.size()))
+      position_(std::min(start.offset, source.size())), inside_(start.inside)
 {
   Frame file;
   file.limit = source.size();
@@ -268,7 +268,7 @@ bool Walker::looksUnfinished(const Node& node, const Frame& parent)
   // others can only be open inside a group that was not closed either.
   const Node& around = parent.node;
   const bool unfinished =
-      frames_.size() == 1 || (around.has(kOpen) && (around.size() == 0 || !hasEyeSize(around.header)));
+      (frames_.size() == 1 && !inside_) || (around.has(kOpen) && (around.size() == 0 || !hasEyeSize(around.header)));
   if (node.size() != 0 || !(unfinished || (hasEyeSize(node.header) && parent.open)))
   {
     return false;

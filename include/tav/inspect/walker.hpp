@@ -79,6 +79,7 @@ struct WalkStart
 {
   uint64_t offset = 0;
   bool wide = true;            ///< header of the node there; only with an offset other than 0
+  bool inside = false;         ///< the node is in a group that was closed: then an empty one was, too
   uint64_t budget = kNoBudget; ///< bytes to look through in damaged regions and for zeros at the end
 };
 
@@ -213,6 +214,7 @@ private:
   bool done_ = false;
   bool canSkip_ = false;
   bool leans_ = false;
+  bool inside_ = false; ///< the walk began in a closed group
   size_t inherited_ = 0;
   std::array<Piece, 8> queue_{};
   Event shared_{}; ///< what the pieces in the queue have in common

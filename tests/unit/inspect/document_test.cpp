@@ -1,3 +1,4 @@
+#include <algorithm>
 #include <filesystem>
 #include <fstream>
 #include <stdexcept>
@@ -294,6 +295,38 @@ TEST_P(TestDocument, FindsFromANodeWhatTheReaderFinds)
     }
   }
   EXPECT_GT(found, 100U);
+}
+
+TEST_P(TestDocument, FindsNothingBelowAnEmptyGroupAndWhatIsBelowOneThatWasNeverClosed)
+{
+  tav::Writer writer;
+  {
+    tav::Group system = writer.group(TAV_ELM_CMN_SYSTEM);
+    {
+      const tav::Group host = system.group(TAV_ELM_CMN_HOST);
+    }
+    system.add(TAV_ELM_CMN_CPU_ONLINE, uint32_t{1});
+    system.add(TAV_ELM_CMN_CPU_ONLINE, uint32_t{2});
+  }
+  writer.finish();
+  const Bytes closed = test::bytesOf(writer.bytes());
+  Bytes open64 = hosts({{"ada", 8}}); // as a program left it that was killed
+  std::fill_n(open64.begin(), sizeof(uint64_t), uint8_t{0});
+  for (const OnDamage onDamage : {OnDamage::stop, OnDamage::skip})
+  {
+    const Document document = open(closed + closed);
+    for (const tav::Node& host : document.find("/system/host"))
+    {
+      EXPECT_TRUE(std::ranges::distance(document.find(host, "*", onDamage)) == 0);
+      EXPECT_TRUE(std::ranges::distance(document.find(host, ".//*", onDamage)) == 0);
+      EXPECT_EQ(std::ranges::distance(document.find(host, ".", onDamage)), 1);
+    }
+  }
+  const Document left = open(open64);
+  for (const tav::Node& root : left.roots())
+  {
+    EXPECT_EQ(std::ranges::distance(left.find(root, ".//*", OnDamage::skip)), 3);
+  }
 }
 
 TEST_P(TestDocument, StopsAtDamageAndSaysWhere)
