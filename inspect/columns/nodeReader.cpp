@@ -1,5 +1,7 @@
 #include <algorithm>
 #include <array>
+#include <cstdint>
+#include <functional>
 #include <span>
 #include <utility>
 
@@ -15,7 +17,8 @@ namespace
 {
 
 constexpr uint64_t kMostAtOnce = uint64_t{4} * 1024 * 1024; ///< bytes of a group that is read by the exact steps
-constexpr size_t kMostText = size_t{16} * 1024 * 1024;      ///< of paths that are handed out at once
+constexpr uint64_t kRowsUntold = 4096;
+constexpr size_t kMostText = size_t{16} * 1024 * 1024; ///< of paths that are handed out at once
 
 /// All of a file.
 Part wholeOf(const ByteSource& source, const Form& form)
@@ -134,6 +137,12 @@ public:
     return out.count() != before;
   }
 
+  void tellProgress(std::function<void(uint64_t)> progress)
+  {
+    progress_ = std::move(progress);
+    tellAt_ = progress_ ? rows_ : UINT64_MAX;
+  }
+
   const std::optional<Problem>& stopped() const { return stopped_; }
   PartEnd end() const { return walk_.end(); }
 
@@ -182,6 +191,11 @@ private:
     if (isGroup)
     {
       open_.push_back(static_cast<int64_t>(rows_));
+      if (rows_ >= tellAt_) [[unlikely]]
+      {
+        tellAt_ = rows_ + kRowsUntold;
+        progress_(facts.offset);
+      }
     }
     ++rows_;
   }
@@ -264,7 +278,8 @@ private:
     }
     if (source_.isMemory())
     {
-      return source_.view(from).data();
+      static constexpr uint8_t nothing = 0; // for what is empty, and ends the source
+      return size == 0 ? &nothing : source_.view(from).data();
     }
     uint8_t* to = small_.data();
     const bool isSmall = size <= small_.size() && isWord(node.type(), size);
@@ -346,13 +361,15 @@ private:
   Told told_{*this};
   ExactWalk<Told> exact_;
   std::optional<Problem> stopped_{};
+  std::function<void(uint64_t)> progress_{};
   PartWalk walk_;
   Event event_{};
-  std::vector<int64_t> open_{}; ///< the rows of the groups around, by level
-  uint64_t rows_ = 0;           ///< so far
-  uint64_t base_ = 0;           ///< of the group that the exact steps are in
-  uint64_t failed_ = kNoOffset; ///< where the exact steps gave up last
-  uint64_t notBefore_ = 0;      ///< they are not tried before
+  std::vector<int64_t> open_{};  ///< the rows of the groups around, by level
+  uint64_t rows_ = 0;            ///< so far
+  uint64_t tellAt_ = UINT64_MAX; ///< the place is told at the first group from this row on
+  uint64_t base_ = 0;            ///< of the group that the exact steps are in
+  uint64_t failed_ = kNoOffset;  ///< where the exact steps gave up last
+  uint64_t notBefore_ = 0;       ///< they are not tried before
   std::array<uint8_t, 16> small_{};
   size_t texts_ = 0;     ///< bytes of the paths that are handed out next
   bool tooLong_ = false; ///< the exact steps came to too many of them
@@ -370,6 +387,11 @@ NodeReader::NodeReader(ByteSource& source, const Part& part, const NodeReaderOpt
 }
 
 NodeReader::~NodeReader() = default;
+
+void NodeReader::tellProgress(std::function<void(uint64_t)> progress)
+{
+  state_->tellProgress(std::move(progress));
+}
 
 bool NodeReader::next(NodeColumns& out, size_t rows)
 {

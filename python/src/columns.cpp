@@ -37,9 +37,9 @@ Rows& rowsOf(PyObject* self)
 }
 
 template<class T>
-PyObject* bufferOf(PyObject* owner, Column<T>& column, const char* format)
+PyObject* bufferOf(PyObject* owner, inspect::NodeColumns::Column<T>& column, const char* format)
 {
-  return makeBuffer(owner, column.data(), rowsOf(owner).count(), sizeof(T), format).release();
+  return makeBuffer(owner, column.data(), rowsOf(owner).columns.count(), sizeof(T), format).release();
 }
 
 int getBuffer(PyObject* self, Py_buffer* view, int flags)
@@ -91,55 +91,53 @@ PyObject* column(PyObject* self, PyObject* argument)
     // clang-format off
     if (name == "parent")
     {
-      return bufferOf(self, rows.parent, "q");
+      return bufferOf(self, rows.columns.parent, "q");
     }
     if (name == "depth")
     {
-      return bufferOf(self, rows.depth, "I");
+      return bufferOf(self, rows.columns.depth, "I");
     }
     if (name == "offset")
     {
-      return bufferOf(self, rows.offset, "Q");
+      return bufferOf(self, rows.columns.offset, "Q");
     }
     if (name == "size")
     {
-      return bufferOf(self, rows.size, "Q");
+      return bufferOf(self, rows.columns.size, "Q");
     }
     if (name == "id")
     {
-      return bufferOf(self, rows.id, "H");
+      return bufferOf(self, rows.columns.id, "H");
     }
     if (name == "key")
     {
-      return bufferOf(self, rows.key, "H");
+      return bufferOf(self, rows.columns.key, "H");
     }
     if (name == "kind")
     {
-      return bufferOf(self, rows.kind, "B");
+      return bufferOf(self, rows.columns.kind, "B");
     }
     if (name == "number")
     {
-      return bufferOf(self, rows.number, rows.hasUpper ? "Q" : "q");
+      return bufferOf(self, rows.columns.number, rows.hasUpper ? "Q" : "q");
     }
     if (name == "time")
     {
-      return bufferOf(self, rows.time, "q");
+      return bufferOf(self, rows.columns.time, "q");
     }
     // clang-format on
     raise(PyExc_KeyError, "there is no such column");
   });
 }
 
-Ref numberAt(const Rows& rows, size_t row)
+Ref numberAt(const inspect::NodeColumns& rows, size_t row)
 {
   switch (rows.kind[row])
   {
-  case Kind::number:
-  {
-    const bool isSigned = tav::detail::isIntegerType(rows.type[row]) && (rows.type[row] - TAV_TYPE_UINT8) % 2 != 0;
-    return isSigned ? made(PyLong_FromLongLong(static_cast<int64_t>(rows.number[row]))) : numberOf(rows.number[row]);
-  }
-  case Kind::wide:
+  case inspect::ValueKind::number:
+    return isSignedNumber(rows.type[row]) ? made(PyLong_FromLongLong(static_cast<int64_t>(rows.number[row])))
+                                          : numberOf(rows.number[row]);
+  case inspect::ValueKind::wide:
     return made(valueOf(rows.rest(row)));
   default:
     return Ref(none());
@@ -147,7 +145,7 @@ Ref numberAt(const Rows& rows, size_t row)
 }
 
 /// A value in the column of bytes: words are in this machine's order.
-Ref bytesAt(const Rows& rows, size_t row)
+Ref bytesAt(const inspect::NodeColumns& rows, size_t row)
 {
   const tav::detail::RawValue raw = rows.rest(row);
   if (raw.type == TAV_TYPE_UINT64_ARRAY)
@@ -157,7 +155,7 @@ Ref bytesAt(const Rows& rows, size_t row)
   return made(PyBytes_FromStringAndSize(reinterpret_cast<const char*>(raw.bytes), static_cast<Py_ssize_t>(raw.size)));
 }
 
-void fillNames(const Rows& rows, Places& places, bool types)
+void fillNames(const inspect::NodeColumns& rows, Places& places, bool types)
 {
   for (size_t row = 0; row < rows.count(); ++row)
   {
@@ -171,7 +169,8 @@ PyObject* fillObjects(PyObject* self, PyObject* arguments)
     PyObject* name = nullptr;
     PyObject* array = nullptr;
     done(PyArg_ParseTuple(arguments, "UO", &name, &array) - 1);
-    const Rows& rows = rowsOf(self);
+    const Rows& all = rowsOf(self);
+    const inspect::NodeColumns& rows = all.columns;
     const std::string wanted = bytesOfText(name);
     Places places(array, rows.count());
     if (wanted == "tag" || wanted == "type")
@@ -180,14 +179,14 @@ PyObject* fillObjects(PyObject* self, PyObject* arguments)
     }
     else if (wanted == "text")
     {
-      for (const size_t row : rows.texts)
+      for (const size_t row : all.texts)
       {
         places.put(row, made(valueOf(rows.rest(row))).release());
       }
     }
     else if (wanted == "bytes")
     {
-      for (const size_t row : rows.bytes)
+      for (const size_t row : all.bytes)
       {
         places.put(row, bytesAt(rows, row).release());
       }
@@ -205,7 +204,7 @@ PyObject* fillObjects(PyObject* self, PyObject* arguments)
 
 PyObject* getCount(PyObject* self, void*)
 {
-  return PyLong_FromSize_t(rowsOf(self).count());
+  return PyLong_FromSize_t(rowsOf(self).columns.count());
 }
 
 /// The type of the numbers' column: of 64 bits where they all fit, else of objects.

@@ -2,7 +2,6 @@
 #pragma once
 
 #include <cstdint>
-#include <limits>
 
 #include "python/src/object.h"
 #include "tav/cpp/decode.hpp"
@@ -20,18 +19,6 @@ PyObject* valueOf(const tav::detail::RawValue& raw);
 
 /// Nanoseconds since 1970 of a timestamp, as an int of any width.
 Ref nanosecondsOf(const TAVTimeStamp& stamp);
-
-/// The same where 64 bits hold them.
-inline bool nanosecondsFit(const TAVTimeStamp& stamp, int64_t& nanoseconds) noexcept
-{
-  constexpr uint64_t most = std::numeric_limits<int64_t>::max();
-  constexpr uint64_t billion = 1'000'000'000;
-  constexpr uint64_t mostFraction = uint64_t{UINT16_MAX} * 1'001'000;
-  const uint64_t fraction = (uint64_t{stamp.fractionA} * 1000 + stamp.fractionB) * 1000;
-  const bool fits = stamp.seconds <= (most - mostFraction) / billion || stamp.seconds <= (most - fraction) / billion;
-  nanoseconds = fits ? static_cast<int64_t>(stamp.seconds * billion + fraction) : 0;
-  return fits;
-}
 
 /// A moment from a datetime that knows its zone.
 TAVTimeStamp stampOf(PyObject* moment);

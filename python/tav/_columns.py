@@ -6,7 +6,7 @@ from typing import TYPE_CHECKING, Any, Callable, Optional
 if TYPE_CHECKING:
     from ._tav import Reader
 
-# The kinds of rows, as rows.h numbers them.
+# The kinds of values, as tav::inspect::ValueKind numbers them.
 _NUMBER, _WIDE, _TEXT, _TIME, _BYTES = 1, 2, 3, 4, 5
 
 

@@ -88,3 +88,40 @@ def test_arrays_outlive_reader_and_module_objects():
     reader.close()
     del reader
     assert int(table["number"].sum()) == 5050 and table["text"][2] == "host0"
+
+
+def test_paths_below_each_of_several_roots_tell_which_root():
+    writer = tav.Writer()
+    with writer:
+        for i in range(3):
+            with writer.group("system") as system:
+                system.add("cpuOnline", i)
+    with tav.open(writer.bytes()) as reader:
+        assert list(reader.columns(path=True)["path"]) == [
+            "/system", "/system/cpuOnline", "/system[2]", "/system[2]/cpuOnline", "/system[3]", "/system[3]/cpuOnline"]
+
+
+def test_what_is_empty_at_the_end_of_a_file_is_empty_bytes():
+    writer = tav.Writer(byte_order="little", root=64, align=False)
+    with writer, writer.group("system") as system:
+        system.add(1001, 7)
+        system.add(1002, b"")
+    data = bytearray(writer.bytes())
+    for more in (0, 5):  # what a writer was about to add
+        data[0] += more
+        with tav.open(bytes(data), on_damage="skip") as reader:
+            rows = reader.columns()
+            assert len(reader.damage) == (more != 0)
+        assert list(rows["bytes_valid"]) == [False, False, True] and rows["bytes"][2] == b""
+
+
+def test_damage_is_told_in_the_order_of_the_stream():
+    data = bytearray(streams.snapshot(3, byte_order="little", root=64, align=False))
+    with tav.open(bytes(data)) as reader:
+        name = reader.find("//hostName")
+    data[name.offset:name.offset + 8] = b"\xff" * 8  # a size of 4 GB
+    data += b"\xff" * 9  # and no root follows
+    for path in (False, True):
+        with tav.open(bytes(data)) as reader, pytest.raises(tav.TavError) as raised:
+            reader.columns(path=path)
+        assert raised.value.offset == name.offset and raised.value.path == "/system/host"

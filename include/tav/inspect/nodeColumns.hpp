@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
@@ -184,6 +185,9 @@ public:
   TAV_INSPECT_API ~NodeReader();
   NodeReader(const NodeReader&) = delete;
   NodeReader& operator=(const NodeReader&) = delete;
+
+  /// Tells at groups, every some thousand rows, the offset that reading has come to. What `progress` throws ends it.
+  TAV_INSPECT_API void tellProgress(std::function<void(uint64_t)> progress);
 
   /// Adds so many rows, and as many as come together; fewer at the end, where it returns false when there are none.
   /// Throws Error when the source does.
