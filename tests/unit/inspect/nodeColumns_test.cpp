@@ -1,4 +1,5 @@
 // Rows of nodes against a walk that takes every node by itself.
+#include <algorithm>
 #include <map>
 #include <memory>
 #include <string>
@@ -162,4 +163,43 @@ TEST(NodeRows, HaveTheirValuesInTheColumnOfTheirKind)
   EXPECT_EQ(std::string(reinterpret_cast<const char*>(columns.rest(2).bytes), columns.rest(2).length()), "ada");
   EXPECT_EQ(columns.kind[3], ValueKind::wide);
   EXPECT_EQ(columns.parent[3], 0);
+}
+
+TEST(NodeRows, TellHowFarTheyAreAndEndWithWhatThatThrows)
+{
+  tav::Writer writer;
+  {
+    tav::Group system = writer.group(TAV_ELM_CMN_SYSTEM);
+    for (uint64_t i = 0; i < 10'000; ++i)
+    {
+      tav::Group below = system.group(TAV_ELM_CMN_HOST);
+      below.add(TAV_ELM_CMN_CPU_ONLINE, i);
+    }
+  }
+  writer.finish();
+  const auto* const first = reinterpret_cast<const uint8_t*>(writer.bytes().data());
+  ByteSource source("x", std::span(first, writer.bytes().size()));
+  std::vector<uint64_t> told;
+  NodeColumns columns;
+  NodeReader reader(source, tav::inspect::Form{});
+  reader.tellProgress([&](uint64_t offset) { told.push_back(offset); });
+  while (reader.next(columns))
+  {
+  }
+  EXPECT_EQ(columns.count(), 20'001U);
+  EXPECT_GE(told.size(), 4U); // all some thousand rows, though they come together at once
+  EXPECT_TRUE(std::is_sorted(told.begin(), told.end()));
+  EXPECT_LT(told.back(), writer.bytes().size());
+
+  struct Enough
+  {
+  };
+  NodeReader ended(source, tav::inspect::Form{});
+  ended.tellProgress([&](uint64_t offset) {
+    if (offset > told.back() / 2)
+    {
+      throw Enough{};
+    }
+  });
+  EXPECT_THROW(ended.next(columns), Enough);
 }
