@@ -7,6 +7,7 @@
 #include "api/rawWrite.h"
 #include "core/stack.h"
 #include "core/step.h"
+#include "tav/core/search.hpp"
 #include "tav/probes.h"
 #include "trace/traceFrame.h"
 

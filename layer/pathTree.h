@@ -10,8 +10,7 @@
 #include <system_error>
 #include <vector>
 
-#include "core/bytes.h"
-#include "core/step.h"
+#include "tav/core/search.hpp"
 #include "tav/cpp/ranges.hpp"
 #include "tav/path/compare.hpp"
 #include "tav/path/compiled.hpp"
@@ -182,7 +181,7 @@ struct NodeTree
     {
       return false;
     }
-    using Block = core::BlockBytes<core::HostForm>;
+    using Block = BlockInPlace;
     TAVHandle& handle = *start.state_->handle;
     const bool isPlain = core::hasNeverTraced() && Block::canRead(handle);
     TAVHeaderData nodes[2];
