@@ -29,20 +29,6 @@ void store(const std::filesystem::path& path, const Bytes& bytes)
   out.write(reinterpret_cast<const char*>(bytes.data()), static_cast<std::streamsize>(bytes.size()));
 }
 
-template<class Call>
-std::string messageOf(const Call& call)
-{
-  try
-  {
-    call();
-  }
-  catch (const std::system_error& error)
-  {
-    return error.what();
-  }
-  return {};
-}
-
 struct Written
 {
   tav::StreamOptions options;

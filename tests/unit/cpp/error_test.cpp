@@ -62,21 +62,6 @@ TEST(LayerErrors, CompareWithPortableConditions)
   EXPECT_NE(tav::makeError(TAV_RC_NOT_FOUND), std::errc::no_such_file_or_directory);
 }
 
-/// The message of the error that a call throws; empty without one.
-template<class Call>
-std::string messageOf(const Call& call)
-{
-  try
-  {
-    call();
-  }
-  catch (const std::system_error& error)
-  {
-    return error.what();
-  }
-  return {};
-}
-
 TEST(LayerErrors, NameTheFile)
 {
   const TemporaryPath missing;

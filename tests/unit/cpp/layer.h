@@ -39,6 +39,21 @@ uint32_t thrownBy(Call&& call)
   return TAV_RC_OK;
 }
 
+/// The message of the error that a call throws; empty without one.
+template<class Call>
+std::string messageOf(const Call& call)
+{
+  try
+  {
+    call();
+  }
+  catch (const std::system_error& error)
+  {
+    return error.what();
+  }
+  return {};
+}
+
 /// The code that a form with an error code gives. The error code held another error before.
 template<class Call>
 uint32_t givenBy(Call&& call)

@@ -10,18 +10,11 @@
 using namespace tav::inspect;
 using test::ByteRows;
 using test::Bytes;
+using test::bytesOfJson;
 using testing::ElementsAre;
 
 namespace
 {
-
-Bytes bytesOfJson(const std::string& text)
-{
-  MemoryText document("document", text);
-  test::Made made;
-  fromJson(document, made.file(), {});
-  return made.bytes();
-}
 
 /// {"system": ...} with these children.
 Bytes systemOf(const std::string& children)

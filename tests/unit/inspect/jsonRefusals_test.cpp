@@ -8,17 +8,10 @@
 
 using namespace tav::inspect;
 using test::Bytes;
+using test::bytesOfJson;
 
 namespace
 {
-
-Bytes bytesOfJson(const std::string& text)
-{
-  MemoryText document("document", text);
-  test::Made made;
-  fromJson(document, made.file(), {});
-  return made.bytes();
-}
 
 std::string refusal(const std::string& text)
 {

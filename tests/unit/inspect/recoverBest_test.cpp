@@ -190,15 +190,25 @@ TEST_P(RecoveringBest, ListsAsManyLossesAsAskedAndCountsAll)
   }
 }
 
+namespace
+{
+
+/// The one is taken before the other, and not the other way round.
+void expectMore(const Account& one, const Account& other)
+{
+  EXPECT_TRUE(one.keepsMoreThan(other));
+  EXPECT_FALSE(other.keepsMoreThan(one));
+}
+
+} // namespace
+
 TEST(RecoveryAccount, OfWaysThatDifferInThePaddingTheOneWithMoreNodesAndFewerGapsKeepsMore)
 {
   Account plain{.totals = {.kept = 10, .nodes = 9, .losses = 3}};
   Account padded{.form = {.aligned = true}, .totals = {.kept = 1000, .nodes = 8, .losses = 3}};
-  EXPECT_TRUE(plain.keepsMoreThan(padded)); // whatever the bytes are
-  EXPECT_FALSE(padded.keepsMoreThan(plain));
+  expectMore(plain, padded); // whatever the bytes are
   padded.totals.losses = 1;
-  EXPECT_FALSE(plain.keepsMoreThan(padded));
-  EXPECT_TRUE(padded.keepsMoreThan(plain));
+  expectMore(padded, plain);
   padded.totals.losses = 2;
   EXPECT_FALSE(plain.keepsMoreThan(padded));
   EXPECT_FALSE(padded.keepsMoreThan(plain));
@@ -210,14 +220,11 @@ TEST(RecoveryAccount, OfOthersTheOneWithMoreNodesAndBytesAndOfEqualsTheOneWithFe
   {
     Account one{.totals = {.kept = 100, .nodes = 6, .made = 2}};
     Account other{.form = form, .totals = {.kept = 50, .nodes = 11, .made = 1}};
-    EXPECT_TRUE(one.keepsMoreThan(other));
-    EXPECT_FALSE(other.keepsMoreThan(one));
+    expectMore(one, other);
     other.totals.nodes = 12;
-    EXPECT_TRUE(other.keepsMoreThan(one));
-    EXPECT_FALSE(one.keepsMoreThan(other));
+    expectMore(other, one);
     other.totals.nodes = 13;
-    EXPECT_TRUE(other.keepsMoreThan(one));
-    EXPECT_FALSE(one.keepsMoreThan(other));
+    expectMore(other, one);
   }
 }
 

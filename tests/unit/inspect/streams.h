@@ -49,6 +49,15 @@ private:
   tav::inspect::PatchFile file_{scratch_->file()};
 };
 
+/// The stream that a document is.
+inline Bytes bytesOfJson(const std::string& text)
+{
+  tav::inspect::MemoryText document("document", text);
+  Made made;
+  tav::inspect::fromJson(document, made.file(), {});
+  return made.bytes();
+}
+
 /// Damages a stream in one of several ways that the seed chooses.
 inline Bytes damaged(Bytes bytes, uint64_t seed)
 {
