@@ -30,7 +30,7 @@ namespace tav::detail
       break;
     }
   }
-  for (; at != text.size() && static_cast<uint8_t>(text[at]) - 0x20U < 0x60; ++at)
+  for (; at < text.size() && static_cast<uint8_t>(text[at]) - 0x20U < 0x60; ++at)
   {
   }
   return at;
