@@ -50,7 +50,15 @@ std::string pagePath(const Invocation& invocation)
     return invocation.text("--page");
   }
   const std::filesystem::path folder = host::programPath().parent_path();
-  return host::textOf((folder / "../share/tav/tav.html").lexically_normal());
+  const std::filesystem::path path = (folder / "../share/tav/tav.html").lexically_normal();
+  std::error_code error;
+  if (!std::filesystem::exists(path, error))
+  {
+    throw Failure("view: the page is not there, as '" + shown(host::textOf(path), stderr) + "'",
+                  "it comes with the package tav-tools and with a release, and web/build.sh makes it; --page names one "
+                  "elsewhere");
+  }
+  return host::textOf(path);
 }
 
 std::string contentOf(const std::string& path)
