@@ -67,8 +67,10 @@ std::map<std::string_view, std::vector<uint16_t>> idsByName()
 
 TEST(ElementNames, NameLeadsToAllThatBearItAndToNothingElse)
 {
-  for (const auto& [name, ids] : idsByName())
+  for (const auto& named : idsByName())
   {
+    const std::string_view name = named.first;
+    const std::vector<uint16_t>& ids = named.second;
     ASSERT_EQ(tav::detail::idsNamed(name), ids) << name;
     const std::optional<uint16_t> only = tav::detail::onlyTagged(name);
     const auto bears = [name](const Entry& entry) {
