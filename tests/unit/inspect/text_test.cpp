@@ -1,4 +1,5 @@
 #include <array>
+#include <initializer_list>
 #include <string>
 #include <vector>
 
@@ -111,7 +112,7 @@ INSTANTIATE_TEST_SUITE_P(Swapped, ValueOf, testing::Bool());
 TEST_P(ValueOf, OfAWrongSizeIsItsBytesWithASignWhereThereAreMore)
 {
   const std::string ten = "61616161616161616161";
-  for (const uint64_t most : {1, 9, 10, 16, 100})
+  for (const uint64_t most : std::initializer_list<uint64_t>{1, 9, 10, 16, 100})
   {
     EXPECT_EQ(text(TAV_TYPE_UINT32, 10, most), ten) << most;
   }
