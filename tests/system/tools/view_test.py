@@ -3,6 +3,7 @@ import contextlib
 import html
 import http.client
 import os
+import pathlib
 import re
 import signal
 import socket
@@ -282,6 +283,13 @@ class Misuse(ViewTest):
             self.assertEqual((result.status, result.out), (2, ""))
             self.assertIn("page.html", result.err)
         self.assertEqual(tav("view", self.path, "--no-open", "--page", self.folder / "missing").status, 2)
+
+    def test_where_the_page_comes_from_is_told_where_it_is_missing(self):
+        if (pathlib.Path(TAV[-1]).resolve().parent / "../share/tav/tav.html").exists():
+            self.skipTest("this build has the page")
+        result = tav("view", self.path, "--no-open")
+        self.assertEqual((result.status, result.out), (2, ""))
+        self.assertIn("web/build.sh", result.err)
 
 
 if __name__ == "__main__":
