@@ -62,11 +62,11 @@ public:
   Others(const TAVHandle& handle, const core::Level& level, uint32_t elm, bool overGroups)
       : elm_(elm), overGroups_(overGroups)
   {
-    using Block = core::BlockBytes<core::HostForm>;
-    if (level.fits && Block::canRead(handle))
+    // That the handle has a block to read is known here.
+    if (level.fits && core::LibraryWay::isHostWith(handle, TAV_OPT_DIRECT))
     {
       start_ = level.start;
-      level_ = core::BlockLevel(Block(handle), level.end);
+      level_ = core::BlockLevel(core::BlockBytes<core::HostForm>(handle), level.end);
     }
   }
 

@@ -198,8 +198,8 @@ private:
   /// Where on its shelf an id is looked for first. Ids in a row, as most groups have them, do not meet there.
   static uint32_t placeOn(const Shelf& shelf, uint16_t elm) noexcept
   {
-    const uint64_t mixed = elm * 0x9E3779B9U;
-    const uint64_t scaled = mixed * shelf.size;
+    const uint32_t mixed = elm * 0x9E3779B9U;
+    const uint64_t scaled = uint64_t{mixed} * shelf.size;
     return static_cast<uint32_t>(scaled >> 32U);
   }
 
