@@ -386,9 +386,9 @@ full()
   stage "clang-tidy" check_tidy
   stage "cppcheck" check_static_analysis
   stage "documents" check_documents
-  stage "demo" ./demo.sh
   stage "Kaitai" check_kaitai
   stage "g++" build_and_test release
+  stage "demo" ./demo.sh
   stage "Python" check_python
   stage "SQL" check_sql
   stage "browser" check_browser
