@@ -7,7 +7,7 @@ cd "$(dirname "${BASH_SOURCE[0]}")"
 cmake/install-packages.sh build
 work=$(mktemp -d)
 trap 'rm -rf "$work"' EXIT
-# What is built already is taken; else a build with less optimisation, which takes little more than half the time.
+# What is built already is taken; else a build with less optimisation, which is there sooner.
 folder=build/release options=()
 [[ -x $folder/tools/tav ]] || folder=build/demo options=("-DCMAKE_CXX_FLAGS_RELEASE=-O1 -DNDEBUG")
 if ! { cmake --preset release -B "$folder" -DTAV_BUILD_TESTS=OFF "${options[@]}" &&
