@@ -30,8 +30,13 @@ namespace tav::detail
       break;
     }
   }
-  for (; at < text.size() && static_cast<uint8_t>(text[at]) - 0x20U < 0x60; ++at)
+  for (const char c : text.substr(at))
   {
+    if (static_cast<uint8_t>(c) - 0x20U >= 0x60)
+    {
+      break;
+    }
+    ++at;
   }
   return at;
 }
