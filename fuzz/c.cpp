@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <cstring>
 #include <memory>
-#include <stdexcept>
 #include <string>
 #include <vector>
 
@@ -13,13 +12,7 @@
 namespace
 {
 
-void demand(bool holds, const char* what)
-{
-  if (!holds)
-  {
-    throw std::runtime_error(what);
-  }
-}
+using fuzz::demand;
 
 /// Failures are codes of the library.
 uint32_t accept(uint32_t rc)

@@ -8,6 +8,7 @@
 #include <iterator>
 #include <stdexcept>
 
+#include "fuzz/input.h"
 #include "tools/shell/options.h"
 #include "tools/shell/report.h"
 
@@ -57,14 +58,6 @@ std::vector<Option> with(std::vector<Option> options, std::initializer_list<Opti
 {
   options.insert(options.end(), more);
   return options;
-}
-
-void demand(bool holds, const std::string& what)
-{
-  if (!holds)
-  {
-    throw std::runtime_error(what);
-  }
 }
 
 Folder::Folder()

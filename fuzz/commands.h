@@ -50,7 +50,4 @@ private:
 /// finding.
 int runCommand(std::string_view name, const std::vector<Option>& options, const std::vector<std::string>& arguments);
 
-/// Ends the program, as a finding has to.
-void demand(bool holds, const std::string& what);
-
 } // namespace fuzz

@@ -1,6 +1,5 @@
 /// Dictionary files of any characters: each is told to be none, with line and column, or gives elements that are found
 /// by id and tag, that no other has, and that paths and JSON understand.
-#include <stdexcept>
 #include <string>
 #include <string_view>
 
@@ -11,15 +10,8 @@
 namespace
 {
 
+using fuzz::demand;
 using namespace tav::inspect;
-
-void demand(bool holds, const char* what)
-{
-  if (!holds)
-  {
-    throw std::runtime_error(what);
-  }
-}
 
 void look(const Dictionary& names)
 {

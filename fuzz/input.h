@@ -4,7 +4,9 @@
 #include <cstddef>
 #include <cstdint>
 #include <span>
+#include <stdexcept>
 #include <string>
+#include <string_view>
 
 #include "support/streams.h"
 
@@ -17,6 +19,15 @@ namespace fuzz
 
 /// Larger inputs reach nothing that smaller ones do not, only slower.
 inline constexpr size_t kLargest = 4096;
+
+/// Ends the target with a sentence unless what it says of the library holds.
+inline void demand(bool holds, std::string_view what)
+{
+  if (!holds) [[unlikely]]
+  {
+    throw std::runtime_error(std::string(what));
+  }
+}
 
 /// Takes bytes from the front; behind the end there are zeros.
 class Input

@@ -13,13 +13,7 @@
 namespace
 {
 
-void demand(bool holds, const char* what)
-{
-  if (!holds)
-  {
-    throw std::runtime_error(what);
-  }
-}
+using fuzz::demand;
 
 /// Failures are codes of the library.
 void accept(const std::error_code& ec)

@@ -2,7 +2,6 @@
 /// library and the layer to the same nodes, in the order of the stream, each once.
 #include <algorithm>
 #include <span>
-#include <stdexcept>
 #include <string>
 #include <vector>
 
@@ -14,13 +13,7 @@
 namespace
 {
 
-void demand(bool holds, const char* what)
-{
-  if (!holds)
-  {
-    throw std::runtime_error(what);
-  }
-}
+using fuzz::demand;
 
 /// The stream in one form, and its readers.
 class Subject

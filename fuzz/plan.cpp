@@ -1,7 +1,6 @@
 /// A plan of arbitrary bytes: the walks through its parts give what one walk gives, and several threads find what one
 /// does.
 #include <span>
-#include <stdexcept>
 #include <string>
 #include <vector>
 
@@ -12,15 +11,8 @@
 namespace
 {
 
+using fuzz::demand;
 using namespace tav::inspect;
-
-void demand(bool holds, const char* what)
-{
-  if (!holds)
-  {
-    throw std::runtime_error(what);
-  }
-}
 
 std::string inOneWalk(ByteSource& source, const Form& form)
 {

@@ -3,7 +3,6 @@
 #include <map>
 #include <optional>
 #include <span>
-#include <stdexcept>
 #include <string>
 #include <utility>
 #include <vector>
@@ -15,15 +14,8 @@
 namespace
 {
 
+using fuzz::demand;
 using namespace tav::inspect;
-
-void demand(bool holds, const char* what)
-{
-  if (!holds)
-  {
-    throw std::runtime_error(what);
-  }
-}
 
 struct Row
 {

@@ -1,7 +1,6 @@
 /// Tables of arbitrary bytes: by the exact steps and by the Walker they are the same, at damage, too; rows that a path
 /// finds are as many as there are rows; the columns can be handed out.
 #include <span>
-#include <stdexcept>
 #include <string>
 #include <vector>
 
@@ -11,15 +10,8 @@
 namespace
 {
 
+using fuzz::demand;
 using namespace tav::inspect;
-
-void demand(bool holds, const char* what)
-{
-  if (!holds)
-  {
-    throw std::runtime_error(what);
-  }
-}
 
 struct Asked
 {

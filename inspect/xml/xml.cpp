@@ -8,6 +8,7 @@
 
 #include "inspect/text/bytes.h"
 #include "inspect/text/date.h"
+#include "tav/cpp/valueText.hpp"
 #include "tav/inspect/attributes.hpp"
 #include "tav/inspect/jsonText.hpp"
 #include "tav/inspect/phrases.hpp"
@@ -38,16 +39,7 @@ void appendEscaped(std::string& out, std::string_view text, bool attribute)
     {
       return;
     }
-    switch (text[at++])
-    {
-    case '&': out += "&amp;"; break;
-    case '<': out += "&lt;"; break;
-    case '>': out += "&gt;"; break;
-    case '\r': out += "&#13;"; break;
-    case '"': out += "&quot;"; break;
-    case '\n': out += "&#10;"; break;
-    default: out += "&#9;"; break;
-    }
+    out += detail::xmlEscape(text[at++], attribute);
   }
 }
 

@@ -10,6 +10,7 @@
 #include <system_error>
 #include <utility>
 
+#include "tav/cpp/valueText.hpp"
 #include "tav/inspect.hpp"
 #include "tools/host/host.h"
 #include "tools/http/server.h"
@@ -69,23 +70,6 @@ std::string contentOf(const std::string& path)
   return content;
 }
 
-/// As a value of an attribute.
-std::string escaped(std::string_view text)
-{
-  std::string out;
-  for (const char c : text)
-  {
-    switch (c)
-    {
-    case '&': out += "&amp;"; break;
-    case '"': out += "&quot;"; break;
-    case '<': out += "&lt;"; break;
-    default: out += c;
-    }
-  }
-  return out;
-}
-
 /// The page with what it has to be told: the name of the file, and the one address that it may ask.
 class ViewPage
 {
@@ -93,7 +77,9 @@ public:
   ViewPage(const std::string& path, std::string_view name, std::string_view address)
       : text_(contentOf(path))
   {
-    const bool isOne = put("<meta name=\"tav-view\" content=\"", "", escaped(name)) &&
+    std::string shownName;
+    detail::appendXml(shownName, name, true);
+    const bool isOne = put("<meta name=\"tav-view\" content=\"", "", shownName) &&
                        put("connect-src ", "'none'", address);
     if (!isOne)
     {
