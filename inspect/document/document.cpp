@@ -69,13 +69,14 @@ Form DocumentState::formAt(uint64_t offset) const
   return behind == forms.begin() ? recognition.form : std::prev(behind)->second;
 }
 
-namespace
+PlaceWalk::PlaceWalk(ByteSource& source, const Form& form)
+    : walk(source, form, [](const PassedOver&) {}), hasEvent(walk.next(event))
 {
+}
 
-/// Walks to the node at an offset, past the groups that end before it; false where no node begins there.
-bool walkTo(StreamWalk& walk, uint64_t offset, Event& event)
+bool PlaceWalk::goTo(uint64_t offset)
 {
-  while (walk.next(event) && event.offset <= offset)
+  for (; hasEvent && event.offset <= offset; hasEvent = walk.next(event))
   {
     if (event.what == What::nodeBegin && event.offset == offset)
     {
@@ -89,20 +90,22 @@ bool walkTo(StreamWalk& walk, uint64_t offset, Event& event)
   return false;
 }
 
-} // namespace
-
 std::string DocumentState::pathAt(uint64_t offset, PathStyle style) const
 {
-  StreamWalk walk(*source, recognition.form, [](const PassedOver&) {});
-  Event event;
-  return walkTo(walk, offset, event) ? walk.walker().path(event, style) : std::string();
+  PlaceWalk place(*source, recognition.form);
+  return place.goTo(offset) ? place.walk.walker().path(place.event, style) : std::string();
 }
 
-bool DocumentState::isEmptyAt(uint64_t offset) const
+bool DocumentState::isEmptyAt(uint64_t offset)
 {
-  StreamWalk walk(*source, recognition.form, [](const PassedOver&) {});
-  Event event;
-  return walkTo(walk, offset, event) && event.depth != 0 && !event.node.has(kOpen);
+  if (!places || !places->goTo(offset))
+  {
+    places.emplace(*source, recognition.form); // the walk was past it, or stood at a former end
+    places->goTo(offset);
+  }
+  const Event& event = places->event;
+  return places->hasEvent && event.offset == offset && event.what == What::nodeBegin && event.depth != 0 &&
+         !event.node.has(kOpen);
 }
 
 void DocumentState::learn(uint64_t offset, const Form& form)

@@ -13,7 +13,7 @@ namespace
 constexpr uint64_t kToldEvery = 4096; // nodes, of which a search tells how far it is
 
 /// A group that says that it is empty can be one that was never closed, which only what is around it tells.
-WalkStart startAt(const DocumentState& state, const TAVHeader& node)
+WalkStart startAt(DocumentState& state, const TAVHeader& node)
 {
   const bool saysEmpty = layout::isGroup(node) && layout::sizeOf(node) == 0;
   return {.offset = node.nodeOffset,

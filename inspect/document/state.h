@@ -5,9 +5,11 @@
 #include <functional>
 #include <map>
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
+#include "inspect/document/streamWalk.h"
 #include "tav/inspect/damageWatch.hpp"
 #include "tav/inspect/document.hpp"
 
@@ -16,6 +18,20 @@ namespace tav::inspect
 
 /// How the exact reader is told of a form.
 StreamOptions streamOptions(const Form& form, uint64_t ringBytes);
+
+/// A walk that has come to a place.
+struct PlaceWalk
+{
+  PlaceWalk(ByteSource& source, const Form& form);
+
+  /// Goes on to the node at an offset, past the groups that end before it; false where no node begins there, or before
+  /// the place that it has come to.
+  bool goTo(uint64_t offset);
+
+  StreamWalk walk;
+  Event event{};
+  bool hasEvent = false;
+};
 
 struct DocumentState
 {
@@ -34,7 +50,8 @@ struct DocumentState
   Form formAt(uint64_t offset) const;
 
   /// Whether the group at an offset, which says that it is empty, is a closed one: what is behind it is not in it then.
-  bool isEmptyAt(uint64_t offset) const;
+  /// Who asks of one group after another in their order goes through the file once.
+  bool isEmptyAt(uint64_t offset);
 
   /// The path of the node at an offset: walks up to it. Empty where no node begins there.
   std::string pathAt(uint64_t offset, PathStyle style) const;
@@ -49,6 +66,7 @@ struct DocumentState
   std::vector<Damage> damage{};     ///< by offset, each place once
   std::map<uint64_t, Form> forms{}; ///< where streams begin that are in another form than the one before
   std::array<std::unique_ptr<tav::Reader>, 4> readers{};
+  std::optional<PlaceWalk> places{};    ///< where isEmptyAt looked last
   std::function<void(uint64_t)> told{}; ///< is told how far a search is
 };
 

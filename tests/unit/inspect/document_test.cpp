@@ -477,6 +477,30 @@ TEST(DocumentFile, SaysWhyItCannotBeOpened)
             KOR_RC_IS_FOLDER);
 }
 
+TEST(DocumentFile, LooksBelowEmptyGroupsInOneGoThroughTheFile)
+{
+  constexpr size_t groups = 4000;
+  const test::TemporaryPath file;
+  {
+    tav::Writer writer(file.path);
+    tav::Group system = writer.group(TAV_ELM_CMN_SYSTEM);
+    for (size_t i = 0; i < groups; ++i)
+    {
+      const tav::Group host = system.group(TAV_ELM_CMN_HOST);
+    }
+  }
+  const Document document(file.path, {.ringBytes = 16384});
+  size_t found = 0;
+  for (const tav::Node& host : document.find("/system/host"))
+  {
+    ++found;
+    EXPECT_EQ(std::ranges::distance(document.find(host, "*")), 0);
+  }
+  EXPECT_EQ(found, groups);
+  // From the start to each group it would be two thousand times the file.
+  EXPECT_LT(document.source().bytesRead(), 20 * document.source().size());
+}
+
 TEST(DocumentFile, TellsOfAnElementThatIsLargerThanTheRing)
 {
   const test::TemporaryPath file;
