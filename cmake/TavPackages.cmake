@@ -5,6 +5,10 @@
 if(NOT TAV_INSTALL OR NOT TAV_LIBRARY_TYPE STREQUAL "SHARED")
   return()
 endif()
+include(TavReleased)
+if(NOT TAV_RELEASED)
+  return()
+endif()
 find_program(GZIP gzip)
 if(NOT GZIP)
   return()
@@ -79,6 +83,7 @@ endif()
 
 # What Debian asks of every package: its licence and its history.
 set(history "${PROJECT_BINARY_DIR}/changelog.Debian")
+set(released "${TAV_RELEASED}")
 configure_file(packaging/changelog.in "${history}" @ONLY)
 add_custom_command(OUTPUT "${history}.gz"
   COMMAND ${GZIP} -9nkf "${history}"

@@ -16,8 +16,8 @@ version=$(cmake/version.sh)
 [[ -z $key || -r $key ]] || refuse "there is no key $key"
 [[ -z $key ]] || command -v minisign >/dev/null || refuse "nothing can be signed without minisign"
 [[ -z $(git status --porcelain) ]] || refuse "the tree has changes that are in no commit"
-cmake/check-version.sh >&2 || refuse "the version is not the same everywhere"
 grep -qE "^## \[$version\] - [0-9]{4}-[0-9]{2}-[0-9]{2}$" CHANGELOG.md || refuse "CHANGELOG.md has no dated section for $version"
+cmake/check-version.sh >&2 || refuse "the version is not the same everywhere"
 SOURCE_DATE_EPOCH=$(git log -1 --format=%ct)
 export SOURCE_DATE_EPOCH
 

@@ -1,5 +1,7 @@
 """A release is refused where it could not be made again, and what it is made of is told."""
 
+import datetime
+import email.utils
 import json
 import os
 import pathlib
@@ -10,6 +12,7 @@ import tempfile
 import unittest
 
 ROOT = pathlib.Path(__file__).resolve().parents[3]
+RECORDED = "tests/system/abi/released"
 NAMED = {"GIT_AUTHOR_NAME": "a", "GIT_AUTHOR_EMAIL": "a@b", "GIT_COMMITTER_NAME": "a", "GIT_COMMITTER_EMAIL": "a@b"}
 
 
@@ -25,8 +28,8 @@ class Refusals(unittest.TestCase):
         self.folder = tempfile.TemporaryDirectory()
         self.addCleanup(self.folder.cleanup)
         self.tree = pathlib.Path(self.folder.name) / "tree"
-        for name in ("packaging", "cmake"):
-            run(ROOT, "mkdir", "-p", self.tree)
+        for name in ("packaging", "cmake", RECORDED):
+            (self.tree / name).parent.mkdir(parents=True, exist_ok=True)
             self.assertEqual(run(ROOT, "cp", "-r", name, self.tree / name).returncode, 0)
         (self.tree / "CMakeLists.txt").write_text((ROOT / "CMakeLists.txt").read_text())
         self.version = run(self.tree, "cmake/version.sh").stdout.strip()
@@ -55,8 +58,20 @@ class Refusals(unittest.TestCase):
         self.refused("no dated section")
 
     def test_versions_that_differ(self):
-        place = self.tree / "packaging" / "vcpkg" / "vcpkg.json"
-        place.write_text(place.read_text().replace(self.version, "9.9.9"))
+        for name in ("packaging/vcpkg/vcpkg.json", f"{RECORDED}/VERSION"):
+            with self.subTest(place=name):
+                place = self.tree / name
+                text = place.read_text()
+                self.assertEqual(text.count(self.version), 1)
+                place.write_text(text.replace(self.version, "9.9.9"))
+                self.commit()
+                self.refused("the version is not the same everywhere")
+                place.write_text(text)
+                self.commit()
+
+    def test_a_release_that_is_not_the_last_one_of_the_changelog(self):
+        log = self.tree / "CHANGELOG.md"
+        log.write_text(f"# Changelog\n\n## [9.9.9] - 2026-02-03\n\n## [{self.version}] - 2026-01-02\n")
         self.commit()
         self.refused("the version is not the same everywhere")
 
@@ -81,6 +96,33 @@ class Refusals(unittest.TestCase):
         found = run(self.tree, "packaging/release.sh", self.tree)
         self.assertEqual(found.returncode, 1)
         self.assertIn("exists already", found.stderr)
+
+
+class ThisTree(unittest.TestCase):
+    def test_the_version_is_the_same_everywhere(self):
+        found = run(ROOT, "cmake/check-version.sh")
+        self.assertEqual((found.returncode, found.stdout), (0, ""))
+
+    def test_the_changelog_has_room_for_what_comes(self):
+        headings = [line for line in (ROOT / "CHANGELOG.md").read_text().splitlines() if line.startswith("## ")]
+        self.assertEqual(headings[0], "## [Unreleased]")
+
+    @unittest.skipUnless(shutil.which("cmake"), "needs cmake")
+    def test_the_packages_are_dated_by_the_changelog(self):
+        days = (datetime.date(2026, 11, 22), datetime.date(2028, 2, 29), datetime.date(2027, 3, 1), datetime.date(2031, 1, 9),
+                datetime.date(2029, 12, 31))
+        with tempfile.TemporaryDirectory() as name:
+            (pathlib.Path(name) / "cmake").mkdir()
+            script = shutil.copy(ROOT / "cmake" / "TavReleased.cmake", pathlib.Path(name) / "cmake")
+            ask = pathlib.Path(name) / "ask.cmake"
+            ask.write_text(f'include("{script}")\nmessage("${{TAV_RELEASED}}")\n')
+            for day in days:
+                log = pathlib.Path(name) / "CHANGELOG.md"
+                log.write_text(f"## [Unreleased]\n\n## [1.2.3] - {day}\n\n## [1.2.2] - 2001-02-03\n")
+                noon = datetime.datetime.combine(day, datetime.time(12), datetime.timezone.utc)
+                for epoch in ({}, {"SOURCE_DATE_EPOCH": "1000000000"}):
+                    found = subprocess.run(["cmake", "-P", ask], capture_output=True, text=True, env={**os.environ, **epoch})
+                    self.assertEqual(found.stderr.strip(), email.utils.format_datetime(noon))
 
 
 class Contents(unittest.TestCase):

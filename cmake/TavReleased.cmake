@@ -1,0 +1,27 @@
+# TAV_RELEASED: when the last release was made, as Debian writes it: noon of the day that CHANGELOG.md dates it. Empty where
+# there is no such file, as in a part of the sources that somebody builds.
+set(TAV_RELEASED "")
+set(log "${CMAKE_CURRENT_LIST_DIR}/../CHANGELOG.md")
+if(NOT EXISTS "${log}")
+  return()
+endif()
+set_property(DIRECTORY APPEND PROPERTY CMAKE_CONFIGURE_DEPENDS "${log}")
+file(STRINGS "${log}" headings REGEX "^## \\[[0-9.]+\\] - [0-9][0-9][0-9][0-9]-[0-9][0-9]-[0-9][0-9]$" LIMIT_COUNT 1)
+if(NOT headings MATCHES " - ([0-9]+)-0?([0-9]+)-0?([0-9]+)$")
+  return()
+endif()
+# The day as seconds since 1970: string(TIMESTAMP) writes no other day than today's and that of SOURCE_DATE_EPOCH. Years
+# begin with March here, so that a leap day is the last one.
+math(EXPR beforeMarch "(14 - ${CMAKE_MATCH_2}) / 12")
+math(EXPR years "${CMAKE_MATCH_1} - ${beforeMarch}")
+math(EXPR months "${CMAKE_MATCH_2} + 12 * ${beforeMarch} - 3")
+math(EXPR days "${CMAKE_MATCH_3} - 1 + (153 * ${months} + 2) / 5 + 365 * ${years} + ${years} / 4 - ${years} / 100 + ${years} / 400 - 719468")
+math(EXPR seconds "${days} * 86400 + 43200")
+set(epoch "$ENV{SOURCE_DATE_EPOCH}")
+set(ENV{SOURCE_DATE_EPOCH} "${seconds}")
+string(TIMESTAMP TAV_RELEASED "%a, %d %b %Y %H:%M:%S +0000" UTC)
+if(epoch STREQUAL "")
+  unset(ENV{SOURCE_DATE_EPOCH})
+else()
+  set(ENV{SOURCE_DATE_EPOCH} "${epoch}")
+endif()
