@@ -1,5 +1,6 @@
 #!/usr/bin/env bash
-# Builds what a release consists of: the Debian packages, the wheel, the page, the extension for SQL, and the site.
+# Builds what a release consists of: the Debian packages, the wheel and the sdist of the Python package, the page,
+# the extension for SQL, and the site.
 #   packaging/build.sh FOLDER [PART...]        FOLDER: where they go; parts: packages wheel page sql site; all unless named
 # The same tree gives the same bytes wherever and whenever it is built: SOURCE_DATE_EPOCH is the time in them, that of the
 # last change in CHANGELOG.md unless it is set.
@@ -21,6 +22,12 @@ work=$(mktemp -d)
 trap 'rm -rf "$work"' EXIT
 quietly() { "$@" >"$work/log" 2>&1 || { cat "$work/log" >&2; return 1; }; }
 
+# archive FOLDER PART NAME: what is in FOLDER/PART as the artefact NAME, without whose it was, its rights and its times.
+archive()
+{
+  tar -C "$1" --sort=name --mtime="@$SOURCE_DATE_EPOCH" --owner=0 --group=0 --numeric-owner --mode=u=rwX,go=rX -cf - "$2" | gzip -9n >"$out/$3"
+}
+
 # The packages bring the page for `tav view`.
 build_packages()
 {
@@ -37,6 +44,11 @@ build_wheel()
   cmake/install-packages.sh python
   quietly python/build-wheel.sh "$work/wheel"
   cp "$work"/wheel/*.whl "$out/"
+  # The sources of the Python package, in a name and an order of their own: as it was made it has the name of the whole
+  # source and the times of the build.
+  mkdir "$work/sdist"
+  tar -xzf "$work"/wheel/tav-*.tar.gz -C "$work/sdist"
+  archive "$work/sdist" "tav-$(cmake/version.sh)" "tav-python-$(cmake/version.sh).tar.gz"
 }
 
 build_page()
@@ -57,8 +69,7 @@ build_sql()
 build_site()
 {
   quietly docs/site/build.sh "$work/site"
-  tar -C "$work" --sort=name --mtime="@$SOURCE_DATE_EPOCH" --owner=0 --group=0 --numeric-owner -cf - site |
-    gzip -9n >"$out/tav-site-$(cmake/version.sh).tar.gz"
+  archive "$work" site "tav-site-$(cmake/version.sh).tar.gz"
 }
 
 for part in "${parts[@]}"; do
