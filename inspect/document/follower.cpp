@@ -5,8 +5,7 @@
 #include <utility>
 
 #include "inspect/document/state.h"
-#include "inspect/document/streamWalk.h"
-#include "tav/inspect/fileKind.hpp"
+#include "inspect/walk/openedFile.h"
 #include "tav/inspect/path.hpp"
 #include "tav/inspect/phrases.hpp"
 #include "tav/inspect/problem.hpp"
@@ -16,8 +15,6 @@ namespace tav::inspect
 
 namespace
 {
-
-constexpr uint64_t kRingBytes = uint64_t{1} << 20U;
 
 bool isBlank(const TAVHeader& header)
 {
@@ -31,26 +28,25 @@ bool isSameNode(const TAVHeader& a, const TAVHeader& b)
          layout::infoOf(a) == layout::infoOf(b);
 }
 
-uint64_t behindHeader(const TAVHeader& header)
-{
-  return layout::addSaturated(header.nodeOffset, layout::headerLength(header.hdrType));
-}
-
 /// Behind what has to be there of a node before it can be told: a group's header, a data element's payload.
 uint64_t neededEnd(const TAVHeader& header)
 {
-  return layout::addSaturated(behindHeader(header), layout::isGroup(header) ? 0 : layout::sizeOf(header));
+  return layout::addSaturated(Follower::behindHeader(header), layout::isGroup(header) ? 0 : layout::sizeOf(header));
 }
 
 } // namespace
 
+uint64_t Follower::behindHeader(const TAVHeader& header)
+{
+  return layout::addSaturated(header.nodeOffset, layout::headerLength(header.hdrType));
+}
+
 bool Follower::open()
 {
-  std::unique_ptr<ByteSource> file;
+  std::unique_ptr<FollowedFile> file;
   try
   {
-    file = ByteSource::open(path_, options_.ringBytes);
-    file->setDictionary(options_.dictionary);
+    file = openedFile<FollowedFile>(path_);
   }
   catch (const Error& error)
   {
@@ -65,7 +61,10 @@ bool Follower::open()
     throw;
   }
   endOpenRoot();
-  file_ = std::move(file);
+  now_.reset();
+  followed_ = file.get();
+  file_ = std::make_unique<ByteSource>(path_, std::move(file), options_.ringBytes);
+  file_->setDictionary(options_.dictionary);
   beginAnew();
   return true;
 }
@@ -95,9 +94,8 @@ uint64_t Follower::goOn(bool quiet)
   {
     tellChange(FileChange::appeared);
   }
-  const auto& storage = static_cast<TAVSSFile&>(file_->storage());
   readOn();
-  if (!storage.pFile->isAt(path_.c_str()))
+  if (!followed_->pFile->isAt(path_.c_str()))
   {
     goOver();
   }
@@ -118,10 +116,27 @@ void Follower::goOver()
 /// The file is let go of: nothing more is to come of a root that is open in it.
 void Follower::endOpenRoot()
 {
-  if (!levels_.empty())
+  try
   {
-    hand(told_.rootEnd, above_.front(), {});
+    if (!levels_.empty())
+    {
+      hand(told_.rootEnd, above_.front(), {});
+    }
   }
+  catch (const std::system_error& error)
+  {
+    if (!isCutOff(error))
+    {
+      throw;
+    }
+    tellChange(FileChange::shortened);
+  }
+}
+
+/// Whether all that an error says is that the file does not have any more what was told of it.
+bool Follower::isCutOff(const std::system_error& error) const
+{
+  return followed_->isShort() && codeOf(error.code()) == TAV_RC_END_OF_STORAGE;
 }
 
 void Follower::tellChange(FileChange change)
@@ -134,13 +149,58 @@ void Follower::tellChange(FileChange change)
 
 void Follower::readOn()
 {
+  bool isCut = true;
+  while (isCut)
+  {
+    try
+    {
+      readToEnd();
+      isCut = followed_->isShort();
+    }
+    catch (const std::system_error& error)
+    {
+      if (!isCutOff(error))
+      {
+        throw;
+      }
+    }
+    if (isCut)
+    {
+      tellChange(FileChange::shortened);
+      beginAnew();
+      isCut = !stop_.stop_requested();
+    }
+  }
   reader_.reset();
+}
+
+/// The file as it is now: what was told of it before need not be there.
+void Follower::look()
+{
+  reader_.reset();
+  const uint32_t code = followed_->look();
+  if (code != TAV_RC_OK)
+  {
+    failAt(path_, code);
+  }
   now_ = file_->window(0, kRingBytes);
+}
+
+void Follower::reach(uint64_t end)
+{
+  reached_ = end;
+  followed_->need(end);
+}
+
+void Follower::readToEnd()
+{
+  look();
   if (now_->size() < reached_ || (!isSame() && !goBack()))
   {
     tellChange(FileChange::shortened);
     beginAnew();
   }
+  reach(reached_);
   if (!form_ && !findForm())
   {
     return;
@@ -148,47 +208,6 @@ void Follower::readOn()
   while (!stop_.stop_requested() && form_ && (levels_.empty() ? nextRoot() : nextChild()))
   {
   }
-  reader_.reset();
-}
-
-/// A file that takes another one's place is in the same form more often than not, and at first it is short.
-bool Follower::findForm()
-{
-  if (now_->size() == 0)
-  {
-    return false;
-  }
-  if (former_)
-  {
-    const Recognition again =
-        recognise(*now_, {.swapped = former_->swapped, .root64 = former_->root64, .aligned = former_->aligned});
-    if (again.isStream && !again.damagedStart)
-    {
-      form_ = again.form;
-      return true;
-    }
-  }
-  const Recognition found = recognise(*now_, choiceNow());
-  if (found.isStream && !found.ambiguous() && !otherKindOf(*now_, found))
-  {
-    form_ = found.form;
-  }
-  return form_.has_value();
-}
-
-/// Of a few nodes, the last one cut, more than one padding can make sense: there the root's header says.
-FormChoice Follower::choiceNow()
-{
-  constexpr uint64_t fewBytes = 4096;
-  FormChoice choice = options_.form;
-  const Form first = recognise(*now_, choice).form;
-  TAVHeader root{};
-  root.hdrType = TAV_HDR_64;
-  if (!choice.aligned && first.root64 && now_->size() < fewBytes && readHeader(root, first.swapped, root))
-  {
-    choice.aligned = (layout::infoOf(root) & TAV_INFO_ALIGNED8) != 0;
-  }
-  return choice;
 }
 
 /// A root that was taken back leaves the one before it in its place. False when that is gone, too.
@@ -200,7 +219,7 @@ bool Follower::goBack()
   if (isThere && !levels_.empty())
   {
     --roots_[layout::elmOf(levels_.front().group)];
-    reached_ = behindHeader(root_);
+    reach(behindHeader(root_));
     levels_.clear();
     above_.clear();
   }
@@ -241,54 +260,6 @@ tav::Reader& Follower::reader()
   return *reader_;
 }
 
-bool Follower::nextRoot()
-{
-  WalkStart start;
-  Form form = *form_;
-  if (root_.hdrType != 0)
-  {
-    start = {.offset = root_.nodeOffset, .wide = layout::is64(root_)};
-    form.root64 = layout::is64(root_);
-  }
-  std::vector<PassedOver> passed; // what is at the end may be a part of what is being written
-  StreamWalk walk(
-      *now_, form, [&passed](const PassedOver& place) { passed.push_back(place); }, start);
-  Event event;
-  for (bool isPast = root_.hdrType == 0; walk.next(event);)
-  {
-    if (event.what != What::nodeBegin || event.depth != 0)
-    {
-      continue;
-    }
-    if (isPast)
-    {
-      tellBetween(passed);
-      const bool isOther = !(walk.form() == *form_);
-      formBefore_ = std::exchange(form_, walk.form());
-      reader_ = isOther ? nullptr : std::move(reader_);
-      rootBefore_ = std::exchange(root_, event.node.header);
-      arrive(root_, {});
-      return true;
-    }
-    isPast = true;
-    walk.skip();
-  }
-  return false;
-}
-
-/// Tells what was passed over between the last root and the next; what is in the root was told when it was read.
-void Follower::tellBetween(const std::vector<PassedOver>& passed)
-{
-  const uint64_t end = root_.hdrType == 0 ? 0 : layout::addSaturated(behindHeader(root_), layout::sizeOf(root_));
-  for (const PassedOver& place : passed)
-  {
-    if (told_.damage && !quiet_ && place.offset >= end)
-    {
-      told_.damage(place);
-    }
-  }
-}
-
 bool Follower::nextChild()
 {
   Level& top = levels_.back();
@@ -297,7 +268,7 @@ bool Follower::nextChild()
   const bool isFirst = reference.hdrType == 0;
   const uint32_t rc =
       tavGetNextChild(0, reader().handle(), &top.group, isFirst ? nullptr : &reference, &next);
-  const bool isThere = next.header.hdrType != 0 && neededEnd(next.header) <= now_->size();
+  const bool isThere = next.header.hdrType != 0 && neededEnd(next.header) <= followed_->end();
   if (rc == TAV_RC_OK && isThere && !isBlank(next.header))
   {
     return takeChild(next.header);
@@ -342,7 +313,7 @@ bool Follower::waits(uint32_t rc, bool isLarge)
   }
   const TAVHeader& group = levels_.back().group;
   const uint64_t end = layout::addSaturated(behindHeader(group), layout::sizeOf(group));
-  if (layout::isSizeUnknown(group) || end > now_->size())
+  if (layout::isSizeUnknown(group) || end > followed_->end())
   {
     return true;
   }
@@ -384,8 +355,7 @@ bool Follower::refresh()
     const uint16_t elm = layout::elmOf(top.group);
     if (levels_.size() == 1)
     {
-      now_ = file_->window(0, kRingBytes); // in which the root is not any more
-      reader_.reset();
+      look(); // in which the root is not any more
       if (!goBack())
       {
         beginAnew();
@@ -425,7 +395,7 @@ void Follower::leave()
 void Follower::arrive(const TAVHeader& header, const TAVHeader& before)
 {
   ++count_;
-  reached_ = std::max(reached_, behindHeader(header));
+  reach(std::max(reached_, neededEnd(header)));
   Node node = nodeOf(header);
   node.ordinal = ++(levels_.empty() ? roots_ : levels_.back().counts)[node.elm()];
   hand(told_.node, node, above_);
@@ -456,7 +426,8 @@ Node Follower::nodeOf(const TAVHeader& header) const
   return node;
 }
 
-/// Bytes near the end may have been written since `now_` has read their page: there they are read anew.
+/// Bytes near the end may have been written since `now_` has read their page: there they are read anew. What a closed
+/// group has stays while it is told.
 void Follower::hand(const std::function<void(const Arrival&)>& to, const Node& node, std::span<const Node> above)
 {
   constexpr uint64_t changing = uint64_t{1} << 20U;
@@ -467,7 +438,9 @@ void Follower::hand(const std::function<void(const Arrival&)>& to, const Node& n
   }
   const bool isNearEnd = layout::addSaturated(node.limit, changing) > now_->size();
   const auto fresh = isNearEnd ? file_->window(0, ringBytes) : nullptr;
+  followed_->need(std::max(reached_, node.has(kOpen) ? 0 : std::min(node.limit, followed_->end())));
   to({node, above, fresh != nullptr ? *fresh : *now_, *form_});
+  reach(reached_);
 }
 
 void Follower::handRead(const TAVHeader& node)

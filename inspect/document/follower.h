@@ -8,9 +8,11 @@
 #include <optional>
 #include <span>
 #include <string>
+#include <system_error>
 #include <utility>
 #include <vector>
 
+#include "inspect/document/followedFile.h"
 #include "tav/inspect/document.hpp"
 #include "tav/inspect/follow.hpp"
 
@@ -34,7 +36,11 @@ public:
   /// they are passed over. Throws Error, and what the callback throws.
   uint64_t goOn(bool quiet = false);
 
+  static uint64_t behindHeader(const TAVHeader& header);
+
 private:
+  static constexpr uint64_t kRingBytes = uint64_t{1} << 20U;
+
   using Counts = std::map<uint16_t, uint64_t>; ///< of siblings, by their ids
 
   /// A group around the place.
@@ -46,11 +52,25 @@ private:
     Counts counts{};    ///< of its children
   };
 
+  /// A root behind the present one.
+  struct FoundRoot
+  {
+    TAVHeader header{};
+    Form form{};
+    bool isBehindGap = false;         ///< there is something else before it
+    std::vector<PassedOver> passed{}; ///< on the way
+  };
+
   bool open();
   void beginAnew();
   void readOn();
+  void readToEnd();
+  void look();
+  void reach(uint64_t end);
+  bool isCutOff(const std::system_error& error) const;
   bool findForm();
   bool isSame();
+  std::optional<FoundRoot> findRoot();
   bool nextRoot();
   bool nextChild();
   bool takeChild(const TAVHeader& child);
@@ -79,6 +99,7 @@ private:
   bool quiet_ = false;
   bool isMissing_ = false;                ///< and that was told
   std::unique_ptr<ByteSource> file_{};    ///< whose storage sees the file as it is at any time
+  FollowedFile* followed_ = nullptr;      ///< that storage
   std::unique_ptr<ByteSource> now_{};     ///< the file as it was when reading began this time
   std::unique_ptr<tav::Reader> reader_{}; ///< of this time, too: what it has cached may change
   std::optional<Form> former_{};          ///< the last form that was read
@@ -89,7 +110,7 @@ private:
   Counts roots_{};                        ///< how many there were
   std::vector<Level> levels_{};           ///< from the present root on; empty between roots
   std::vector<Node> above_{};             ///< the groups of the levels
-  uint64_t reached_ = 0;                  ///< behind the header of the last node
+  uint64_t reached_ = 0;                  ///< behind what was told of the last node: its header, or its payload
   uint64_t count_ = 0;
 };
 

@@ -1,8 +1,8 @@
 #include "tav/inspect/source.hpp"
 
 #include <algorithm>
-#include <filesystem>
 
+#include "inspect/walk/openedFile.h"
 #include "tav/inspect/phrases.hpp"
 #include "tav/inspect/problem.hpp"
 
@@ -98,22 +98,7 @@ ByteSource::~ByteSource() = default;
 
 std::unique_ptr<ByteSource> ByteSource::open(const std::string& path, uint64_t ringBytes, uint64_t from)
 {
-  std::error_code error;
-  if (std::filesystem::is_directory(std::filesystem::path(std::u8string(path.begin(), path.end())), error))
-  {
-    failAt(path, KOR_RC_IS_FOLDER);
-  }
-  KORFileOpenParam param;
-  param.pPath = path.c_str();
-  param.options = KOR_FILE_READ;
-  uint32_t code = TAV_RC_OK;
-  auto file = std::make_unique<TAVSSFile>(&param, &code);
-  file->ioUnit = 4 * kPage; // of a ring over it: a node somewhere in a large file is read by one page
-  if (code != TAV_RC_OK)
-  {
-    failAt(path, code);
-  }
-  return std::make_unique<ByteSource>(path, std::move(file), ringBytes, from);
+  return std::make_unique<ByteSource>(path, openedFile(path), ringBytes, from);
 }
 
 std::unique_ptr<ByteSource> ByteSource::window(uint64_t from, uint64_t ringBytes)

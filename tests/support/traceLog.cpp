@@ -2,6 +2,7 @@
 
 #include <ostream>
 #include <stdexcept>
+#include <utility>
 
 namespace test
 {
@@ -44,19 +45,20 @@ void traceAllTo(KORTraceSink sink)
   }
 }
 
-TraceLog::TraceLog()
+TraceTap::TraceTap(std::function<void(const KORTraceRecord&)> told)
+    : told_(std::move(told))
 {
   if (witness != nullptr)
   {
     korTraceStop();
   }
-  if (korTraceStart(&TraceLog::sink, this) != TAV_RC_OK)
+  if (korTraceStart(&TraceTap::sink, this) != TAV_RC_OK)
   {
     throw std::logic_error("a trace is running already");
   }
 }
 
-TraceLog::~TraceLog()
+TraceTap::~TraceTap()
 {
   korTraceStop();
   if (witness != nullptr)
@@ -65,21 +67,25 @@ TraceLog::~TraceLog()
   }
 }
 
-void TraceLog::sink(void* context, const KORTraceRecord* record)
+void TraceTap::sink(void* context, const KORTraceRecord* record)
 {
   if (witness != nullptr)
   {
     witness(nullptr, record);
   }
-  auto& log = *static_cast<TraceLog*>(context);
-  Record copy{record->kind, record->threadId, record->probe, record->point, record->code, {}};
-  for (uint32_t i = 0; i < record->itemCount; ++i)
+  static_cast<TraceTap*>(context)->told_(*record);
+}
+
+void TraceLog::take(const KORTraceRecord& record)
+{
+  Record copy{record.kind, record.threadId, record.probe, record.point, record.code, {}};
+  for (uint32_t i = 0; i < record.itemCount; ++i)
   {
-    const KORTraceItem& item = record->pItems[i];
+    const KORTraceItem& item = record.pItems[i];
     copy.items.emplace_back(item.length != 0 ? static_cast<const char*>(item.pData) : "", item.length);
   }
-  const std::lock_guard lock(log.mutex_);
-  log.records_.push_back(std::move(copy));
+  const std::lock_guard lock(mutex_);
+  records_.push_back(std::move(copy));
 }
 
 std::vector<Record> TraceLog::records() const

@@ -2,6 +2,7 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <iosfwd>
 #include <mutex>
 #include <string>
@@ -55,14 +56,24 @@ std::ostream& operator<<(std::ostream& out, const Step& step);
 /// called with null. A test that starts a trace by itself has to stop this one before.
 void traceAllTo(KORTraceSink sink);
 
+/// Calls a function with every record of the program, when it is left, for as long as the object lives.
+class TraceTap
+{
+public:
+  explicit TraceTap(std::function<void(const KORTraceRecord&)> told);
+  ~TraceTap();
+  TraceTap(const TraceTap&) = delete;
+  TraceTap& operator=(const TraceTap&) = delete;
+
+private:
+  static void sink(void* context, const KORTraceRecord* record);
+
+  std::function<void(const KORTraceRecord&)> told_;
+};
+
 class TraceLog
 {
 public:
-  TraceLog();
-  ~TraceLog();
-  TraceLog(const TraceLog&) = delete;
-  TraceLog& operator=(const TraceLog&) = delete;
-
   [[nodiscard]] std::vector<Record> records() const;
   /// All failures, in order.
   [[nodiscard]] std::vector<Failure> failures() const;
@@ -78,9 +89,11 @@ public:
   void clear();
 
 private:
-  static void sink(void* context, const KORTraceRecord* record);
-  mutable std::mutex mutex_;
-  std::vector<Record> records_;
+  void take(const KORTraceRecord& record);
+
+  mutable std::mutex mutex_{};
+  std::vector<Record> records_{};
+  TraceTap tap_{[this](const KORTraceRecord& record) { take(record); }};
 };
 
 /// The bytes of a value as an item shows them.

@@ -117,8 +117,9 @@ public:
   /// left out, and damaged places are passed over.
   ///
   /// The path is followed, not the file: when another file takes its place, the rest of the old one comes first, then
-  /// all of the new one; a file that is missing is waited for; one that was made shorter, or emptied and begun with
-  /// another root, is read from its start again. What a writer took back may have been told. Looks when the system
+  /// all of the new one; a file that is missing is waited for; one that was made shorter than what was told of it, or
+  /// emptied and begun with another root, is read from its start again. The file may be cut behind what was told at any
+  /// time, also while it is read. What a writer took back may have been told. Looks when the system
   /// says of a change, and ten times a second.
   /// @throws Error TAV_RC_NOT_SUPPORTED for a document that was not opened by a path, or not from its first byte on;
   ///         TAV_RC_DATA_TOO_LARGE for a data element that is larger than the ring; and what `onNode` throws

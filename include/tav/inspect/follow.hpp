@@ -59,7 +59,7 @@ enum class FileChange : uint8_t
   missing,  ///< no file is there; what was open is read on until another one comes
   appeared, ///< one has come where none was
   replaced, ///< another one has taken its place and is read from its start
-  shortened ///< it was made shorter, or begun again, and is read from its start
+  shortened ///< what was told of it was cut off, or it was begun again; it is read from its start
 };
 
 /// A node that has come. All of it is valid during the call.

@@ -1,7 +1,6 @@
 #include <atomic>
 #include <chrono>
 #include <filesystem>
-#include <fstream>
 #include <numeric>
 #include <stop_token>
 #include <string>
@@ -12,12 +11,18 @@
 
 #include "cpp/layer.h"
 #include "inspect/document/follower.h"
+#include "inspect/growing.h"
 #include "inspect/streams.h"
 #include "tav/inspect/document.hpp"
 
 using namespace tav::inspect;
 using namespace std::chrono_literals;
 using test::Bytes;
+using test::number;
+using test::numbers;
+using test::openHeader;
+using test::part;
+using test::sizeBytes;
 using testing::ElementsAre;
 using testing::IsEmpty;
 
@@ -28,20 +33,9 @@ namespace
 class Follow : public testing::Test
 {
 protected:
-  void append(const Bytes& bytes, const std::filesystem::path& path)
-  {
-    std::ofstream(path, std::ios::binary | std::ios::app)
-        .write(reinterpret_cast<const char*>(bytes.data()), static_cast<std::streamsize>(bytes.size()));
-  }
+  void append(const Bytes& bytes, const std::filesystem::path& path) { test::append(path, bytes); }
   void append(const Bytes& bytes) { append(bytes, file_.path); }
-
-  /// Writes over bytes that are there.
-  void patch(uint64_t offset, const Bytes& bytes)
-  {
-    std::fstream file(file_.path, std::ios::binary | std::ios::in | std::ios::out);
-    file.seekp(static_cast<std::streamoff>(offset));
-    file.write(reinterpret_cast<const char*>(bytes.data()), static_cast<std::streamsize>(bytes.size()));
-  }
+  void patch(uint64_t offset, const Bytes& bytes) { test::patch(file_.path, offset, bytes); }
 
   /// What is new: elements, with the value of those that are Uint32.
   std::vector<std::string> news()
@@ -49,11 +43,6 @@ protected:
     told_.clear();
     follower_.goOn();
     return told_;
-  }
-
-  static Bytes part(const Bytes& bytes, size_t from, size_t to)
-  {
-    return {bytes.begin() + static_cast<ptrdiff_t>(from), bytes.begin() + static_cast<ptrdiff_t>(to)};
   }
 
   const test::TemporaryPath file_;
@@ -70,43 +59,6 @@ protected:
   };
   Follower follower_{tav::FilePath(file_.path).text(), DocumentOptions{}, onNode_, stop_.get_token()};
 };
-
-Bytes numbers(std::initializer_list<uint32_t> all, bool swap = false, uint16_t root = TAV_ELM_CMN_SYSTEM)
-{
-  tav::Writer writer({.byteOrder = swap ? tav::ByteOrder::swapped : tav::ByteOrder::native});
-  {
-    tav::Group system = writer.group(root);
-    for (const uint32_t number : all)
-    {
-      system.add(TAV_ELM_CMN_CPU_ONLINE, number);
-    }
-  }
-  writer.finish();
-  return test::bytesOf(writer.bytes());
-}
-
-/// The header of a group as a writer leaves it while the group is open.
-Bytes openHeader(uint16_t elm)
-{
-  test::ByteRows rows;
-  rows.h64(TAV_SIZE_UNKNOWN, 0, TAV_TYPE_HEADER64, elm);
-  return rows.bytes;
-}
-
-Bytes number(uint32_t value)
-{
-  test::ByteRows rows;
-  rows.h64(4, 0, TAV_TYPE_UINT32, TAV_ELM_CMN_CPU_ONLINE);
-  rows.number(value, 4);
-  return rows.bytes;
-}
-
-Bytes sizeBytes(uint64_t size)
-{
-  test::ByteRows rows;
-  rows.number(size, 8);
-  return rows.bytes;
-}
 
 } // namespace
 

@@ -1,0 +1,42 @@
+/// @file followedFile.h
+/// A file while it is followed.
+#pragma once
+
+#include <cstdint>
+
+#include "tav/tav.h"
+
+namespace tav::inspect
+{
+
+/// A file as it was at the last look, though its writer goes on: as long as it was then. Bytes that were cut off since
+/// read as zeros, which is what a writer that appends cuts off; those that have to be there come short. So a look does
+/// not depend on when the file is cut while it lasts.
+class FollowedFile final : public TAVSSFile
+{
+public:
+  using TAVSSFile::TAVSSFile;
+
+  /// Takes the size that the file has now. Nothing has to be there until `need` says so.
+  uint32_t look();
+
+  /// Bytes before `end` have to be there.
+  void need(uint64_t end) { needed_ = end; }
+  uint64_t needed() const { return needed_; }
+
+  /// Up to where the file was there at this look, as far as was seen.
+  uint64_t end() const { return end_; }
+  /// Whether bytes were asked for at this look that had to be there and were not.
+  bool isShort() const { return isShort_; }
+
+  uint32_t getTotalSize(uint64_t* size) override;
+  uint32_t read(uint64_t wanted, void** data, uint64_t room, uint64_t* done, bool zeroCopy, bool backward) override;
+
+private:
+  uint64_t size_ = 0; ///< at the last look
+  uint64_t end_ = 0;
+  uint64_t needed_ = 0;
+  bool isShort_ = false;
+};
+
+} // namespace tav::inspect
