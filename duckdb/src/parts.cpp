@@ -10,6 +10,13 @@
 namespace tav::sql
 {
 
+uint64_t sizeOf(const std::string& file)
+{
+  std::error_code ec;
+  const uint64_t size = std::filesystem::file_size(file, ec);
+  return ec ? 0 : size;
+}
+
 inspect::Part PartedFile::part(size_t number)
 {
   const std::lock_guard lock(mutex_);
@@ -52,20 +59,13 @@ void PartedFile::fail()
   changed_.notify_all();
 }
 
-uint64_t Tasks::sizeOf(const std::string& file) const
-{
-  std::error_code ec;
-  const uint64_t size = std::filesystem::file_size(file, ec);
-  return ec ? 0 : size;
-}
-
 uint64_t Tasks::count() const
 {
   uint64_t count = 0;
   for (const std::string& file : given_.files)
   {
     const uint64_t size = !plan_ ? 0 : sizeOf(file);
-    count += size < kLarge ? 1 : size / kPart + 1;
+    count += size < kLargeFile ? 1 : size / kPart + 1;
   }
   return count;
 }
@@ -80,7 +80,7 @@ std::optional<Task> Tasks::next()
       return {};
     }
     const std::string& file = given_.files[file_++];
-    if (!plan_ || sizeOf(file) < kLarge)
+    if (!plan_ || sizeOf(file) < kLargeFile)
     {
       return Task{.file = file};
     }

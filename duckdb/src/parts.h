@@ -17,6 +17,11 @@
 namespace tav::sql
 {
 
+constexpr uint64_t kLargeFile = uint64_t{16} << 20U; ///< bytes from which on several threads read one file
+
+/// How many bytes a file has; 0 where nobody knows.
+uint64_t sizeOf(const std::string& file);
+
 /// A large file in parts. A part is read before it is known whether the one before ends where it begins; its rows count
 /// when all before it do.
 class PartedFile
@@ -78,10 +83,7 @@ public:
   uint64_t count() const;
 
 private:
-  static constexpr uint64_t kLarge = uint64_t{16} << 20U; ///< bytes from which on a file is cut
   static constexpr uint64_t kPart = uint64_t{4} << 20U;
-
-  uint64_t sizeOf(const std::string& file) const;
 
   const Given& given_;
   Plan plan_;

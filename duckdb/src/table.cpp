@@ -8,6 +8,7 @@
 
 #include "duckdb/src/given.h"
 #include "duckdb/src/parts.h"
+#include "duckdb/src/types.h"
 #include "duckdb/src/vectors.h"
 #include "tav/inspect/table.hpp"
 
@@ -110,47 +111,45 @@ private:
   inspect::TableReader reader_;
 };
 
-duckdb_type typeOf(const inspect::TableTypes& types, size_t column)
+/// How many threads the engine has now; 1 where it does not say.
+int64_t threadsOf(duckdb_connection connection)
 {
-  switch (types.type(column))
+  int64_t threads = 1;
+  duckdb_result result{};
+  if (duckdb_query(connection, "SELECT current_setting('threads')::BIGINT", &result) == DuckDBSuccess)
   {
-  case CellKind::unsigned64: return DUCKDB_TYPE_UBIGINT;
-  case CellKind::signed64: return DUCKDB_TYPE_BIGINT;
-  case CellKind::signed128: return DUCKDB_TYPE_HUGEINT;
-  case CellKind::unsigned128: return types.exceedsSigned(column) ? DUCKDB_TYPE_UHUGEINT : DUCKDB_TYPE_HUGEINT;
-  case CellKind::time: return DUCKDB_TYPE_TIMESTAMP_NS;
-  case CellKind::bytes: return DUCKDB_TYPE_BLOB;
-  default: return DUCKDB_TYPE_VARCHAR;
+    duckdb_data_chunk chunk = duckdb_fetch_chunk(result);
+    if (chunk != nullptr && duckdb_data_chunk_get_size(chunk) == 1)
+    {
+      threads = *static_cast<const int64_t*>(duckdb_vector_get_data(duckdb_data_chunk_get_vector(chunk, 0)));
+    }
+    duckdb_destroy_data_chunk(&chunk);
   }
+  duckdb_destroy_result(&result);
+  return threads;
 }
 
-/// A column's type follows from all of its values, so they are all looked at before the engine is told. Returns how
-/// many rows there are.
-uint64_t findTypes(TableCall& call)
+/// By how many threads the types of the columns are found: as many as asked for, or as the engine had when it loaded
+/// the extension.
+unsigned threadsFor(duckdb_bind_info info)
 {
-  inspect::TableTypes types(call.query);
-  uint64_t count = 0;
-  for (const std::string& file : call.given.files)
+  const Value given = named(info, "threads");
+  const int64_t threads =
+      given ? duckdb_get_int64(given.get()) : *static_cast<const int64_t*>(duckdb_bind_get_extra_info(info));
+  if (threads < 1)
   {
-    FileRows rows(call.given, call.query, file);
-    for (Table some(call.query); rows.next(some, inspect::TableReader::kBatch); some = Table(call.query))
-    {
-      types.see(some);
-      count += some.rows();
-    }
+    throw inspect::Error("threads is 1 or more");
   }
-  for (size_t i = 0; i < call.query.columns().size(); ++i)
-  {
-    call.types.push_back(typeOf(types, i));
-  }
-  return count;
+  constexpr int64_t most = 256;
+  return static_cast<unsigned>(std::min(threads, most));
 }
 
 void bindTable(duckdb_bind_info info)
 {
   guarded(info, duckdb_bind_set_error, [&] {
     auto call = std::make_unique<TableCall>(info);
-    const uint64_t rows = findTypes(*call);
+    TableShape shape = shapeOf(call->given, call->query, threadsFor(info));
+    call->types = std::move(shape.types);
     for (size_t i = 0; i < call->types.size(); ++i)
     {
       duckdb_bind_add_result_column(info, call->query.columns()[i].name.c_str(), Type(call->types[i]).get());
@@ -161,7 +160,7 @@ void bindTable(duckdb_bind_info info)
     {
       duckdb_bind_add_result_column(info, "filename", Type(DUCKDB_TYPE_VARCHAR).get());
     }
-    duckdb_bind_set_cardinality(info, rows, true);
+    duckdb_bind_set_cardinality(info, shape.rows, true);
     duckdb_bind_set_bind_data(info, call.release(), destroy<TableCall>);
   });
 }
@@ -413,9 +412,11 @@ void scanTable(duckdb_function_info info, duckdb_data_chunk output)
 
 void registerTable(duckdb_connection connection)
 {
+  auto threads = std::make_unique<int64_t>(threadsOf(connection));
   const Type any(DUCKDB_TYPE_ANY);
   const Type text(DUCKDB_TYPE_VARCHAR);
   const Type truth(DUCKDB_TYPE_BOOLEAN);
+  const Type number(DUCKDB_TYPE_BIGINT);
   duckdb_table_function function = duckdb_create_table_function();
   duckdb_table_function_set_name(function, "read_tav_table");
   addParameters(function);
@@ -423,6 +424,8 @@ void registerTable(duckdb_connection connection)
   duckdb_table_function_add_named_parameter(function, "columns", any.get());
   duckdb_table_function_add_named_parameter(function, "join", text.get());
   duckdb_table_function_add_named_parameter(function, "filename", truth.get());
+  duckdb_table_function_add_named_parameter(function, "threads", number.get());
+  duckdb_table_function_set_extra_info(function, threads.release(), destroy<int64_t>);
   duckdb_table_function_set_bind(function, bindTable);
   duckdb_table_function_set_init(function, initTable);
   duckdb_table_function_set_local_init(function, initTableThread);

@@ -137,6 +137,7 @@ std::string parametersOf(const Invocation& invocation)
   }
   parameters += invocation.has("--join") ? ", join := " + quotedForSql(invocation.text("--join")) : "";
   parameters += invocation.text("--on-damage", "stop") == "skip" ? ", on_damage := 'skip'" : "";
+  parameters += ", threads := " + std::to_string(jobsOf(invocation));
   return parameters + (invocation.has("--file") ? ", filename := true" : "");
 }
 

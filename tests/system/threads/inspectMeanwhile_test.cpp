@@ -40,6 +40,26 @@ std::unique_ptr<ByteSource> sourceOf(std::vector<std::byte>& bytes)
   return std::make_unique<ByteSource>("x", std::make_unique<TAVSSMemory>(bytes.data(), bytes.size()), 64 * 1024);
 }
 
+/// The types of columns, and how many rows there are.
+std::string typesOf(ByteSource& source, unsigned threads)
+{
+  const TableQuery query("//host", {{"name", "hostName"}, {"cpus", "cpuOnline"}, {"any", "*"}, {"none", "osName"}});
+  TableTypes types(query);
+  uint64_t rows = 0;
+  const auto see = [&](const Table& some) {
+    types.see(some);
+    rows += some.rows();
+  };
+  readTable(source, {}, query, {.onDamage = OnDamage::skip, .threads = threads, .partBytes = 5000, .batchRows = 100},
+            see);
+  std::string text = std::to_string(rows);
+  for (size_t i = 0; i < query.columns().size(); ++i)
+  {
+    text += " " + std::to_string(static_cast<int>(types.type(i)));
+  }
+  return text;
+}
+
 std::string found(std::vector<std::byte>& bytes, unsigned threads)
 {
   const auto source = sourceOf(bytes);
@@ -57,7 +77,7 @@ std::string found(std::vector<std::byte>& bytes, unsigned threads)
   const auto scratch = makeScratch();
   PatchFile out(scratch->file());
   text += std::to_string(recover(*source, {}, out, {.threads = threads}).kept);
-  return text + " " + std::to_string(totals.nodes);
+  return text + " " + typesOf(*source, threads) + " " + std::to_string(totals.nodes);
 }
 
 } // namespace
@@ -66,6 +86,7 @@ TEST(InspectMeanwhile, FindsWhatOneThreadFinds)
 {
   std::vector<std::byte> bytes = stream();
   const std::string one = found(bytes, 1);
+  EXPECT_EQ(typesOf(*sourceOf(bytes), 1).substr(0, 2), "29") << "nearly all rows";
   for (const unsigned threads : {2U, 3U, 8U})
   {
     EXPECT_EQ(found(bytes, threads), one);
