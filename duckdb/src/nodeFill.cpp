@@ -17,8 +17,6 @@ namespace
 using inspect::NodeColumns;
 using inspect::ValueKind;
 
-constexpr size_t kNumbers = size_t{1} << 16U; ///< of ids, and of types
-
 struct Rows
 {
   const NodeRows& rows;
@@ -161,38 +159,35 @@ void NodeNames::begin()
   ++chunk_;
 }
 
-bool NodeNames::repeat(std::vector<Last>& known, Vector& to, idx_t row, uint16_t number) const
+template<class NameOf>
+void NodeNames::putName(std::vector<Last>& known, Vector& to, idx_t row, uint16_t number, const NameOf& nameOf) const
 {
   known.resize(kNumbers);
   Last& last = known[number];
-  if (last.chunk != chunk_)
+  if (last.chunk == chunk_) [[likely]]
   {
-    last = {chunk_, row};
-    return false;
+    to.repeat(row, last.row);
+    return;
   }
-  to.repeat(row, last.row);
-  return true;
+  const auto name = nameOf(number);
+  if (name.empty())
+  {
+    to.putNull(row);
+    return;
+  }
+  to.putText(row, name);
+  last = {chunk_, row};
 }
 
 void NodeNames::putTag(Vector& to, idx_t row, uint16_t id)
 {
-  const std::string_view tag = dictionary_.tagOf(id);
-  if (tag.empty())
-  {
-    to.putNull(row);
-  }
-  else if (!repeat(tags_, to, row, id))
-  {
-    to.putText(row, tag);
-  }
+  putName(tags_, to, row, id, [this](uint16_t number) { return dictionary_.tagOf(number); });
 }
 
 void NodeNames::putType(Vector& to, idx_t row, uint16_t type)
 {
-  if (!repeat(types_, to, row, type))
-  {
-    to.putText(row, inspect::jsonTypeName(type).value_or(std::to_string(type)));
-  }
+  putName(types_, to, row, type,
+          [](uint16_t number) { return inspect::jsonTypeName(number).value_or(std::to_string(number)); });
 }
 
 void fillColumn(Vector& to, size_t column, const NodeRows& nodes, size_t from, size_t count, NodeNames& names)

@@ -85,7 +85,11 @@ private:
     uint32_t chunk = 0;
     idx_t row = 0;
   };
-  bool repeat(std::vector<Last>& known, Vector& to, idx_t row, uint16_t number) const;
+  static constexpr size_t kNumbers = size_t{1} << 16U; ///< of ids, and of types
+
+  /// `nameOf`: the name of a number, empty for none.
+  template<class NameOf>
+  void putName(std::vector<Last>& known, Vector& to, idx_t row, uint16_t number, const NameOf& nameOf) const;
 
   inspect::Dictionary dictionary_;
   uint32_t chunk_ = 0;

@@ -6,6 +6,7 @@
 #include <utility>
 
 #include "inspect/columns/addRow.h"
+#include "inspect/path/names.h"
 #include "inspect/walk/exactWalk.h"
 #include "inspect/walk/mostCounts.h"
 #include "tav/inspect/path.hpp"
@@ -35,24 +36,49 @@ uint16_t keyOf(uint32_t info)
   return static_cast<uint16_t>(info & TAV_INFO_KEY_MASK);
 }
 
+/// What steps of paths begin with: names are looked up once, as long as no other takes the place.
+class StepNames
+{
+public:
+  explicit StepNames(const Dictionary& dictionary)
+      : dictionary_(dictionary) {}
+
+  /// A slash and the name.
+  const std::string& of(uint16_t elm)
+  {
+    Known& known = known_[elm % known_.size()];
+    if (known.elm != elm || known.step.empty())
+    {
+      known.elm = elm;
+      known.step = '/';
+      appendElementText(known.step, elm, dictionary_);
+    }
+    return known.step;
+  }
+
+private:
+  struct Known
+  {
+    uint16_t elm = 0;
+    std::string step{};
+  };
+
+  Dictionary dictionary_;
+  std::array<Known, 128> known_{};
+};
+
 /// The paths of nodes, one after another: of each the last step is new.
 class Paths
 {
 public:
   explicit Paths(const Dictionary& dictionary)
-      : dictionary_(dictionary) {}
+      : names_(dictionary) {}
 
   /// The path of a node at a depth, whose place among its siblings is known.
   const std::string& of(const Node& node, size_t depth)
   {
     lengths_.resize(std::min(lengths_.size(), depth + 1));
-    path_.resize(lengths_.back());
-    appendStep(path_, node, dictionary_);
-    if (node.isGroup())
-    {
-      lengths_.push_back(path_.size());
-    }
-    return path_;
+    return add(node.elm(), node.ordinal, node.offset(), node.isGroup());
   }
 
   /// What follows is below the last node, and the places are counted here, as a Walker counts them.
@@ -63,15 +89,12 @@ public:
   }
   const std::string& counted(const core::Node& node, uint64_t offset)
   {
-    Node seen;
-    core::toHeader(node, seen.header);
-    seen.header.nodeOffset = offset;
-    seen.ordinal = count(node.elm());
-    if (seen.isGroup())
+    const uint64_t ordinal = count(node.elm());
+    if (node.group())
     {
       starts_.push_back(counts_.size());
     }
-    return of(seen, lengths_.size() - 1);
+    return add(node.elm(), ordinal, offset, node.group());
   }
   /// So many groups are around the group whose children come next.
   void backTo(size_t depth) { lengths_.resize(std::min(lengths_.size(), depth + 2)); }
@@ -89,6 +112,22 @@ private:
     uint64_t count;
   };
 
+  /// A child of the group whose path is the last of `lengths_`.
+  const std::string& add(uint16_t elm, uint64_t ordinal, uint64_t offset, bool isGroup)
+  {
+    path_.resize(lengths_.back());
+    path_ += names_.of(elm);
+    if (ordinal != 1)
+    {
+      appendPlace(path_, ordinal, offset);
+    }
+    if (isGroup)
+    {
+      lengths_.push_back(path_.size());
+    }
+    return path_;
+  }
+
   uint64_t count(uint16_t elm)
   {
     for (size_t i = starts_.back(); i < counts_.size(); ++i)
@@ -103,7 +142,7 @@ private:
     return isFull ? 0 : 1;
   }
 
-  Dictionary dictionary_;
+  StepNames names_;
   std::string path_{};
   std::vector<size_t> lengths_{0}; ///< of the paths of the groups around, by level
   std::vector<Count> counts_{};

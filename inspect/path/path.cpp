@@ -130,16 +130,21 @@ void appendStep(std::string& path, const Node& node, const Dictionary& dictionar
 {
   path += '/';
   appendElementText(path, node.elm(), dictionary);
-  if (node.ordinal == 0)
+  appendPlace(path, node.ordinal, node.offset());
+}
+
+void appendPlace(std::string& path, uint64_t ordinal, uint64_t offset)
+{
+  if (ordinal == 0)
   {
     path += "[@";
-    appendHexOffset(path, node.offset());
+    appendHexOffset(path, offset);
     path += ']';
   }
-  else if (node.ordinal > 1)
+  else if (ordinal > 1)
   {
     path += '[';
-    appendNumber(path, node.ordinal);
+    appendNumber(path, ordinal);
     path += ']';
   }
 }
