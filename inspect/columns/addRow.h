@@ -96,10 +96,6 @@ inline ValueKind NodeColumns::classify(const tav::detail::RawValue& raw, size_t 
 
 inline void NodeColumns::addRow(const NodeFacts& node, int64_t parentRow)
 {
-  if (count_ == room_) [[unlikely]]
-  {
-    grow();
-  }
   const size_t row = count_++;
   parent[row] = parentRow;
   offset[row] = node.offset;

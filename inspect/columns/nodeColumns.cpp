@@ -14,13 +14,17 @@ NodeColumns::~NodeColumns() = default;
 
 void NodeColumns::add(const NodeFacts& node, int64_t parentRow)
 {
+  if (isFull())
+  {
+    makeRoom(room_ * 2);
+  }
   addRow(node, parentRow);
 }
 
-void NodeColumns::grow()
+void NodeColumns::makeRoom(size_t rows)
 {
   constexpr size_t atFirst = 2048;
-  const size_t room = room_ == 0 ? atFirst : room_ * 2;
+  const size_t room = std::max(rows, atFirst);
   size_t width = 0;
   eachColumn([&](auto& column) { width += sizeof(column[0]); });
   // NOLINTNEXTLINE(modernize-make-unique): which would fill it with zeros

@@ -19,6 +19,7 @@ namespace
 
 constexpr uint64_t kMostAtOnce = uint64_t{4} * 1024 * 1024; ///< bytes of a group that is read by the exact steps
 constexpr uint64_t kRowsUntold = 4096;
+constexpr size_t kMostGrowth = 16;                     ///< of the rows' room at once
 constexpr size_t kMostText = size_t{16} * 1024 * 1024; ///< of paths that are handed out at once
 
 /// All of a file.
@@ -155,8 +156,8 @@ class NodeReader::State
 {
 public:
   State(ByteSource& source, const Part& part, const NodeReaderOptions& options)
-      : source_(source), options_(options), paths_(source.dictionary()), exact_(told_),
-        walk_(source, part, [this](const PassedOver& passed) { passOver(passed); })
+      : source_(source), options_(options), paths_(source.dictionary()), exact_(told_), begin_(part.offset),
+        end_(part.end()), walk_(source, part, [this](const PassedOver& passed) { passOver(passed); })
   {
     for (size_t level = 0; level < part.around.size(); ++level)
     {
@@ -168,6 +169,7 @@ public:
   {
     columns_ = &out;
     const size_t before = out.count();
+    wanted_ = before == 0 ? rows : SIZE_MAX; // who adds to what is there wants them all in the end
     texts_ = 0;
     while (!done_ && out.count() - before < rows && texts_ < kMostText)
     {
@@ -226,6 +228,10 @@ private:
 
   [[gnu::always_inline]] void add(const NodeFacts& facts, bool isGroup)
   {
+    if (columns_->isFull()) [[unlikely]]
+    {
+      makeRoom(facts.offset);
+    }
     columns_->addRow(facts, open_.empty() ? NodeColumns::kNoParent : open_.back());
     if (isGroup)
     {
@@ -237,6 +243,19 @@ private:
       }
     }
     ++rows_;
+  }
+
+  /// For as many rows as are likely to come, as close together as those so far. Rows that are moved go into memory
+  /// that nobody has touched yet, which costs more than to read them. What comes may be different: room grows in steps.
+  void makeRoom(uint64_t offset)
+  {
+    const size_t rows = columns_->count();
+    const auto passed = static_cast<double>(offset - std::min(offset, begin_));
+    const auto left = static_cast<double>(end_ - std::min(offset, end_));
+    const double coming = passed > 0 ? 1.1 * static_cast<double>(rows_) * left / passed : 0;
+    const auto most = static_cast<double>(std::min(wanted_, rows * kMostGrowth));
+    const double likely = std::min(static_cast<double>(rows) + coming, most);
+    columns_->makeRoom(std::max(rows * 2, static_cast<size_t>(likely)));
   }
 
   void passOver(const PassedOver& passed)
@@ -399,6 +418,9 @@ private:
   Paths paths_;
   Told told_{*this};
   ExactWalk<Told> exact_;
+  uint64_t begin_; ///< of the part
+  uint64_t end_;
+  size_t wanted_ = SIZE_MAX; ///< rows in the columns, as far as is known
   std::optional<Problem> stopped_{};
   std::function<void(uint64_t)> progress_{};
   PartWalk walk_;

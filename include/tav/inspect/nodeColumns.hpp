@@ -145,9 +145,11 @@ private:
     bool swapped;
   };
 
-  void grow();
+  void makeRoom(size_t rows);
   template<class Use>
   void eachColumn(const Use& use);
+  bool isFull() const { return count_ == room_; }
+  /// There is room for it.
   void addRow(const NodeFacts& node, int64_t parentRow);
   ValueKind classify(const tav::detail::RawValue& raw, size_t row);
   template<class Number>

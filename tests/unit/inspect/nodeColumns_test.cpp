@@ -103,6 +103,22 @@ void expectEqual(const Bytes& bytes, const tav::inspect::Form& form)
   ASSERT_EQ(byReader(bytes, form, false, 3).rows, expected.rows);
 }
 
+/// A group of many rows, whose first third is of one size and whose rest is of another.
+Bytes unevenStream(size_t first, size_t rest)
+{
+  tav::Writer writer;
+  {
+    tav::Group system = writer.group(TAV_ELM_CMN_SYSTEM);
+    for (size_t i = 0; i < 90'000; ++i)
+    {
+      system.add(TAV_ELM_CMN_HOST_NAME, std::string(i < 30'000 ? first : rest, 'a'));
+    }
+  }
+  writer.finish();
+  const auto* const begin = reinterpret_cast<const uint8_t*>(writer.bytes().data());
+  return {begin, begin + writer.bytes().size()};
+}
+
 } // namespace
 
 TEST(NodeRows, AreTheNodesOfAWalkOverRandomTrees)
@@ -137,6 +153,34 @@ TEST(NodeRows, AreThoseBeforeTheDamageWhenReadingStops)
     ASSERT_EQ(reader.stopped().has_value(), !expected.damage.empty());
     ASSERT_LE(columns.count(), expected.rows.size());
     ASSERT_TRUE(reader.stopped() || columns.count() == expected.rows.size());
+  }
+}
+
+TEST(NodeRows, AreAllThereWhereTheyAreOfOtherSizesThanThoseBefore)
+{
+  const std::vector<std::pair<size_t, size_t>> sizes = {{1, 60}, {60, 1}};
+  for (const auto& [first, rest] : sizes)
+  {
+    const Bytes bytes = unevenStream(first, rest);
+    ByteSource source("x", std::span<const uint8_t>(bytes));
+    const RowsSeen expected = byWalker(bytes, tav::inspect::Form{});
+    for (const size_t rows : {size_t{1000}, NodeReader::kBatch})
+    {
+      NodeReader reader(source, tav::inspect::Form{}, {.paths = true});
+      NodeColumns columns;
+      while (reader.next(columns, rows))
+      {
+      }
+      ASSERT_EQ(columns.count(), expected.rows.size());
+      for (size_t i = 0; i < columns.count(); ++i)
+      {
+        ASSERT_EQ(line(columns.parent[i], columns.offset[i], columns.size[i], columns.depth[i], columns.id[i],
+                       columns.type[i], std::string(columns.paths[i])),
+                  expected.rows[i]);
+      }
+      EXPECT_EQ(columns.rest(30'000).size, first);
+      EXPECT_EQ(columns.rest(30'001).size, rest);
+    }
   }
 }
 
