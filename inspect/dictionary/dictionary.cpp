@@ -45,11 +45,11 @@ private:
 std::string wholeText(TextSource& source)
 {
   std::string text;
-  std::vector<char> piece(size_t{64} * 1024);
-  for (std::streamsize count = 0;
-       (count = source.sgetn(piece.data(), static_cast<std::streamsize>(piece.size()))) > 0;)
+  while (source.peek() != TextSource::kEnd)
   {
-    text.append(piece.data(), static_cast<size_t>(count));
+    const std::string_view piece = source.atHand();
+    text += piece;
+    source.skip(piece.size());
     if (text.size() > kMostText)
     {
       throw Error(Problem{.file = source.name(), .sentence = "no dictionary has more than " + byteText(kMostText)});

@@ -58,9 +58,9 @@ void JsonParser::fail(const std::string& expected)
 {
   const int found = peek();
   std::string text = "the text ends";
-  if (found != Traits::eof())
+  if (found != TextSource::kEnd)
   {
-    const char character = Traits::to_char_type(found);
+    const char character = static_cast<char>(found);
     text = quoted(std::string_view(&character, 1)) + " stands";
   }
   throw JsonSyntaxError(text + " where " + expected + " is expected");
@@ -130,7 +130,7 @@ bool JsonParser::endContainers()
     const int c = peekBehindBlanks();
     if (c == ',')
     {
-      text_.sbumpc();
+      text_.take();
       if (object)
       {
         readKey();
@@ -148,14 +148,14 @@ bool JsonParser::endContainers()
 
 void JsonParser::startContainer(bool object)
 {
-  text_.sbumpc();
+  text_.take();
   objects_.push_back(object);
   object ? handler_.startObject() : handler_.startArray();
 }
 
 void JsonParser::endContainer()
 {
-  text_.sbumpc();
+  text_.take();
   const bool object = objects_.back();
   objects_.pop_back();
   object ? handler_.endObject() : handler_.endArray();
@@ -173,14 +173,14 @@ void JsonParser::readKey()
   {
     fail("a colon");
   }
-  text_.sbumpc();
+  text_.take();
 }
 
 /// Appends the characters that belong to a token to it, and goes past them.
 template<class Belongs>
 void JsonParser::take(Belongs belongs)
 {
-  for (bool more = true; more && peek() != Traits::eof();)
+  for (bool more = true; more && peek() != TextSource::kEnd;)
   {
     const std::string_view bytes = text_.atHand();
     const auto end = std::find_if_not(bytes.begin(), bytes.end(), belongs);
@@ -192,20 +192,20 @@ void JsonParser::take(Belongs belongs)
 
 void JsonParser::readString()
 {
-  text_.sbumpc();
+  text_.take();
   token_.clear();
   const auto plain = [](char c) { return kPlain[static_cast<uint8_t>(c)]; };
   for (take(plain); peek() != '"'; take(plain))
   {
     if (peek() != '\\') // a control character, or the end
     {
-      fail(peek() == Traits::eof() ? "the end of a string"
+      fail(peek() == TextSource::kEnd ? "the end of a string"
                                    : "a character of a string; control characters are written as \\u00..");
     }
-    text_.sbumpc();
+    text_.take();
     readEscape();
   }
-  text_.sbumpc();
+  text_.take();
   if (!isUtf8(token_))
   {
     throw JsonSyntaxError("a string is no UTF-8");
@@ -218,9 +218,9 @@ void JsonParser::readEscape()
   static constexpr std::string_view characters = "\"\\/\b\f\n\r\t";
   const int c = peek();
   constexpr size_t none = std::string_view::npos;
-  if (const size_t at = c == Traits::eof() ? none : letters.find(Traits::to_char_type(c)); at != none)
+  if (const size_t at = c == TextSource::kEnd ? none : letters.find(static_cast<char>(c)); at != none)
   {
-    text_.sbumpc();
+    text_.take();
     token_ += characters[at];
     return;
   }
@@ -228,15 +228,15 @@ void JsonParser::readEscape()
   {
     fail("an escape");
   }
-  text_.sbumpc();
+  text_.take();
   uint32_t point = readHex4();
   if (point >= 0xD800 && point < 0xDC00)
   {
-    if (peek() != '\\' || text_.snextc() != 'u')
+    if (peek() != '\\' || peekBehind() != 'u')
     {
       fail("the second half of a surrogate pair");
     }
-    text_.sbumpc();
+    text_.take();
     const uint32_t low = readHex4();
     if (low < 0xDC00 || low >= 0xE000)
     {
@@ -264,7 +264,7 @@ uint32_t JsonParser::readHex4()
     }
     const int digit = isDigit(c) ? c - '0' : c - (small ? 'a' : 'A') + 10;
     value = value << 4 | static_cast<uint32_t>(digit);
-    text_.sbumpc();
+    text_.take();
   }
   return value;
 }
@@ -281,7 +281,7 @@ void JsonParser::readDigits()
 void JsonParser::readNumber()
 {
   token_.clear();
-  const auto takeOne = [&] { token_ += Traits::to_char_type(text_.sbumpc()); };
+  const auto takeOne = [&] { token_ += static_cast<char>(text_.take()); };
   if (const int c = peek(); c != '-' && !isDigit(c))
   {
     fail("a value");
@@ -331,7 +331,7 @@ void JsonParser::readWord(const char* word)
     {
       fail(std::string("the word ") + word);
     }
-    text_.sbumpc();
+    text_.take();
   }
 }
 

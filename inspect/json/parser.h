@@ -47,7 +47,6 @@ public:
   void parseValue();
 
 private:
-  using Traits = TextSource::traits_type;
 
   bool startValue();
   bool endContainers();
@@ -62,7 +61,12 @@ private:
   void readNumber();
   void readDigits();
   void readWord(const char* word);
-  int peek() { return text_.sgetc(); }
+  int peek() { return text_.peek(); }
+  int peekBehind()
+  {
+    text_.take();
+    return peek();
+  }
   int peekBehindBlanks();
   [[noreturn]] void fail(const std::string& expected);
 

@@ -15,33 +15,29 @@ constexpr size_t kBuffer = size_t{64} * 1024;
 TextSource::TextSource(std::string name)
     : name_(std::move(name)), buffer_(kBuffer)
 {
-  setg(buffer_.data(), buffer_.data(), buffer_.data());
 }
 
 TextSource::~TextSource() = default;
 
-TextSource::int_type TextSource::underflow()
+bool TextSource::fetchMore()
 {
-  if (gptr() < egptr())
-  {
-    return traits_type::to_int_type(*gptr());
-  }
-  base_ += static_cast<uint64_t>(egptr() - eback());
-  lines_ += static_cast<uint64_t>(std::count(eback(), egptr(), '\n'));
-  const size_t count = fetch(buffer_);
-  setg(buffer_.data(), buffer_.data(), buffer_.data() + count);
-  return count == 0 ? traits_type::eof() : traits_type::to_int_type(*gptr());
+  base_ += end_;
+  lines_ += static_cast<uint64_t>(std::count(buffer_.data(), buffer_.data() + end_, '\n'));
+  at_ = 0;
+  end_ = 0; // nothing is at hand where fetching fails
+  end_ = fetch(buffer_);
+  return end_ != 0;
 }
 
 uint64_t TextSource::line() const
 {
-  return 1 + lines_ + static_cast<uint64_t>(std::count(eback(), gptr(), '\n'));
+  return 1 + lines_ + static_cast<uint64_t>(std::count(buffer_.data(), buffer_.data() + at_, '\n'));
 }
 
 bool TextSource::skipBlanks()
 {
   const auto isBlank = [](char c) { return c == ' ' || c == '\t' || c == '\r' || c == '\n'; };
-  while (sgetc() != traits_type::eof())
+  while (peek() != kEnd)
   {
     const std::string_view bytes = atHand();
     const std::string_view::iterator end = std::find_if_not(bytes.begin(), bytes.end(), isBlank);

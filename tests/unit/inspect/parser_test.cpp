@@ -73,14 +73,7 @@ bool isAccepted(const std::string& text)
   {
     return false;
   }
-  for (int c = buffer.sgetc(); c != std::char_traits<char>::eof(); c = buffer.snextc())
-  {
-    if (c != ' ' && c != '\t' && c != '\r' && c != '\n')
-    {
-      return false;
-    }
-  }
-  return true;
+  return !buffer.skipBlanks();
 }
 
 } // namespace
