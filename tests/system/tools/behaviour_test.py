@@ -1,6 +1,7 @@
 """Exit statuses, standard error, pipes, devices, output files and interrupts."""
 import os
 import random
+import re
 import shutil
 import signal
 import struct
@@ -143,13 +144,25 @@ class Behaviour(ToolTest):
         self.assertNotIn("\033", result.out)
         self.assertIn("\033[", tav("tree", path, "--color", "always").out)
 
-    def test_completions_and_the_manual_page_name_every_option(self):
-        texts = [tav("help", "--man").out.replace("\\-", "-")] + \
-                [tav("completion", shell).out for shell in ("bash", "zsh", "fish")]
-        for text in texts:
-            for word in ("snapshot", "elements", "depth", "trace-probe", "byte-order", "swapped"):
-                self.assertIn(word, text)
-        self.assertEqual(subprocess.run(["bash", "-n"], input=texts[1].encode(), timeout=PATIENCE).returncode, 0)
+    def test_completions_and_the_manual_page_name_every_command_and_option(self):
+        texts = {shell: tav("completion", shell).out for shell in ("bash", "zsh", "fish")}
+        texts["man"] = re.sub(r"\\f[A-Z]", "", tav("help", "--man").out).replace("\\-", "-")
+        commands = re.findall(r"^  ([a-z]+) ", tav("help").out, re.MULTILINE)
+        self.assertTrue({"view", "recover", "table"} <= set(commands), commands)
+        options = 0
+        for command in commands:
+            words = {command}
+            for short, name in re.findall(r"^  (?:(-[A-Za-z]), |    )--([a-z0-9-]+)", tav(command, "--help").out, re.MULTILINE):
+                options += 1
+                words |= {name, short} - {""}
+            for kind, text in texts.items():
+                for word in words:
+                    # fish has its own way to write a short option.
+                    written = f"-s {word[1:]}" if kind == "fish" and word.startswith("-") else word
+                    with self.subTest(text=kind, command=command, word=word):
+                        self.assertRegex(text, rf"(?<![\w-])(?:--)?{re.escape(written)}(?![\w-])")
+        self.assertGreater(options, 100)
+        self.assertEqual(subprocess.run(["bash", "-n"], input=texts["bash"].encode(), timeout=PATIENCE).returncode, 0)
         self.assertEqual(tav("completion", "csh").status, 2)
 
     def test_usage_shows_the_option_that_must_be_given(self):
