@@ -10,7 +10,9 @@ import sys
 import tempfile
 
 COUNT = 400
-LOOKS = [["info"], ["tree", "--paths"], ["print"], ["print", "--xml"], ["json"], ["hex"], ["check"]]
+TABLE = ["table", "--each", "//*", "--file", "--col", "value=.", "--col", "below=.//*", "--join", " "]
+LOOKS = [["info"], ["tree", "--paths"], ["print"], ["print", "--xml"], ["json"], ["hex"], ["check"], ["xml"], ["schema"],
+         TABLE, [*TABLE, "--format", "jsonl"], ["recover", "--json", "-o", "recovered.tav", "--force"]]
 LOOKED_AT = range(1, 9)
 
 
