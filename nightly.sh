@@ -14,7 +14,7 @@
 #     platforms    every room with libc++, on s390x, aarch64 and Windows
 #     bench        every benchmark once, to see that it works
 #     reproduce    all artefacts built twice
-#     bare         the packages on a machine that has nothing; needs root
+#     bare         the packages, the wheel, the page and the extension on a machine that has nothing; needs root
 #   NIGHTLY_RECORD=FILE    another record
 # What each part printed is in build/nightly/PART.log.
 set -euo pipefail
@@ -131,7 +131,8 @@ part_reproduce()
 
 part_bare()
 {
-  packaging/build.sh "$PWD/$logs/packages" packages
+  rm -rf "$logs/packages" # those of another version
+  packaging/build.sh "$PWD/$logs/packages" packages wheel page sql
   packaging/bare-machine.sh "$logs/packages"
 }
 

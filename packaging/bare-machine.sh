@@ -1,12 +1,14 @@
 #!/usr/bin/env bash
-# The packages on a Debian that has nothing: a root made by debootstrap, `apt install` of what packaging/build.sh made,
-# and the first page of each face's documents in it. With --source also the README's two commands, which begin without a
-# compiler. Takes minutes and half a gigabyte; needs root. Debian's packages come from where this machine has its own from.
-#   packaging/bare-machine.sh PACKAGES_FOLDER [--source]
+# What packaging/build.sh made, on a Debian that has nothing: a root made by debootstrap, `apt install` of the packages, and
+# the first page of each face's documents in it: the program, Python, C, C++, and where they are in the folder the wheel,
+# the extension for SQL and the page. With --source also the README's two commands, which begin without a compiler.
+# Takes minutes and one gigabyte, two with the page; needs root. Debian's packages come from where this machine has its own
+# from; the engine for SQL and what drives the browser come from npm's registry, and are copied into the root.
+#   packaging/bare-machine.sh FOLDER [--source]
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")/.."
 
-(($# >= 1)) || { echo "usage: $0 PACKAGES_FOLDER [--source]" >&2; exit 2; }
+(($# >= 1)) || { echo "usage: $0 FOLDER [--source]" >&2; exit 2; }
 packages=$(cd "$1" && pwd)
 ((EUID == 0)) || { echo "$0: run as root" >&2; exit 1; }
 command -v debootstrap >/dev/null || { apt-get update -qq && apt-get install -y -qq --no-install-recommends debootstrap; } >/dev/null
@@ -88,11 +90,44 @@ quietly inside sh -c 'apt-get purge -y $(dpkg-query -W -f "\${Package}\n" | grep
 left=$(find "$root/usr" "$root/etc" -name '*tav*' -not -path '*/apt/*' | grep -vE '/(share/perl|octave)' || true)
 [[ -z $left ]] || { echo "left behind: $left"; exit 1; }
 
+# What follows has the libraries inside and needs none of the packages.
+
+if compgen -G "$packages/tav-*.whl" >/dev/null; then
+  echo "== the wheel"
+  quietly inside apt-get install -y --no-install-recommends python3 python3-venv
+  cp "$packages"/tav-*.whl "$root/packages/"
+  quietly inside sh -c 'python3 -m venv /tmp/env && /tmp/env/bin/pip install --no-index /packages/tav-*.whl'
+  inside /tmp/env/bin/python3 -c 'import tav; print(tav.open("/tmp/day.tav").find("/system/host/hostName").value)'
+fi
+
+# first_page FACE FOLDER ARTEFACT: with the packages that FOLDER/package-lock.json names, as this machine fetches them.
+first_page()
+{
+  local place=$root/face-$1
+  mkdir "$place"
+  cp packaging/first-page.mjs "$2/package.json" "$2/package-lock.json" "$packages/$3" "$place/"
+  quietly npm --prefix "$place" ci --ignore-scripts --no-audit --no-fund --silent
+  inside node "/face-$1/first-page.mjs" "$1" "/face-$1/$3" /tmp/day.tav
+}
+
+if [[ -e $packages/tav.duckdb_extension ]]; then
+  echo "== SQL"
+  quietly inside apt-get install -y --no-install-recommends nodejs
+  first_page sql duckdb tav.duckdb_extension
+fi
+
+if [[ -e $packages/tav.html ]]; then
+  echo "== the page"
+  quietly inside apt-get install -y --no-install-recommends nodejs chromium
+  first_page page web tav.html
+fi
+
 if [[ ${2:-} == --source ]]; then
   echo "== the two commands of the README"
   mkdir "$root/source"
   git archive HEAD | tar -x -C "$root/source"
-  quietly inside apt-get purge -y g++ g++-12 gcc gcc-12 cpp
+  quietly inside apt-get purge -y g++ g++-12 gcc gcc-12 cpp cmake make
+  if inside sh -c 'command -v c++ g++ cc gcc cmake'; then echo "the root has a compiler"; exit 1; fi
   inside sh -c 'cd /source && ./demo.sh && ./test.sh'
 fi
 echo "the packages install, run and go on a bare machine"
