@@ -39,62 +39,59 @@ void NodeColumns::eachColumn(const Use& use)
 }
 
 template<class Number>
-ValueKind NodeColumns::takeNumber(const tav::detail::RawValue& raw, size_t row)
+[[gnu::always_inline]] inline NodeColumns::Word NodeColumns::numberIn(const tav::detail::RawValue& raw)
 {
   Number value{};
   if (tav::detail::decode(raw, value) != TAV_RC_OK)
   {
-    return ValueKind::bytes;
+    return {ValueKind::bytes};
   }
   if constexpr (std::is_signed_v<Number>)
   {
-    number[row] = static_cast<uint64_t>(static_cast<int64_t>(value));
+    return {ValueKind::number, static_cast<uint64_t>(static_cast<int64_t>(value))};
   }
   else
   {
-    number[row] = value;
+    return {ValueKind::number, value};
   }
-  return ValueKind::number;
 }
 
-inline ValueKind NodeColumns::takeTime(const tav::detail::RawValue& raw, size_t row)
+inline NodeColumns::Word NodeColumns::timeIn(const tav::detail::RawValue& raw)
 {
   TAVTimeStamp stamp{};
   if (tav::detail::decode(raw, stamp) != TAV_RC_OK)
   {
-    return ValueKind::bytes;
+    return {ValueKind::bytes};
   }
   const std::optional<int64_t> nanoseconds = nanosecondsOf(stamp);
-  time[row] = nanoseconds.value_or(kNoTime);
-  return nanoseconds ? ValueKind::time : ValueKind::none;
+  return nanoseconds ? Word{ValueKind::time, 0, *nanoseconds} : Word{};
 }
 
 /// What does not have the size of its type is bytes.
-inline ValueKind NodeColumns::classify(const tav::detail::RawValue& raw, size_t row)
+[[gnu::always_inline]] inline NodeColumns::Word NodeColumns::wordIn(const tav::detail::RawValue& raw)
 {
   switch (raw.type)
   {
-  case TAV_TYPE_UINT8: return takeNumber<uint8_t>(raw, row);
-  case TAV_TYPE_SINT8: return takeNumber<int8_t>(raw, row);
-  case TAV_TYPE_UINT16: return takeNumber<uint16_t>(raw, row);
-  case TAV_TYPE_SINT16: return takeNumber<int16_t>(raw, row);
-  case TAV_TYPE_UINT32: return takeNumber<uint32_t>(raw, row);
-  case TAV_TYPE_SINT32: return takeNumber<int32_t>(raw, row);
-  case TAV_TYPE_UINT64: return takeNumber<uint64_t>(raw, row);
-  case TAV_TYPE_SINT64: return takeNumber<int64_t>(raw, row);
+  case TAV_TYPE_UINT8: return numberIn<uint8_t>(raw);
+  case TAV_TYPE_SINT8: return numberIn<int8_t>(raw);
+  case TAV_TYPE_UINT16: return numberIn<uint16_t>(raw);
+  case TAV_TYPE_SINT16: return numberIn<int16_t>(raw);
+  case TAV_TYPE_UINT32: return numberIn<uint32_t>(raw);
+  case TAV_TYPE_SINT32: return numberIn<int32_t>(raw);
+  case TAV_TYPE_UINT64: return numberIn<uint64_t>(raw);
+  case TAV_TYPE_SINT64: return numberIn<int64_t>(raw);
   case TAV_TYPE_UINT128:
-  case TAV_TYPE_SINT128: return raw.size == 2 * sizeof(uint64_t) ? ValueKind::wide : ValueKind::bytes;
-  case TAV_TYPE_BYTE:
-    number[row] = raw.size == 1 ? *raw.bytes : 0;
-    return raw.size == 1 ? ValueKind::number : ValueKind::bytes;
-  case TAV_TYPE_UTC_TIMESTAMP: return takeTime(raw, row);
-  case TAV_TYPE_ASCII_STRING: return ValueKind::text;
-  case TAV_TYPE_UTF8_STRING: return raw.size >= sizeof(uint16_t) ? ValueKind::text : ValueKind::bytes;
-  default: return ValueKind::bytes;
+  case TAV_TYPE_SINT128: return {raw.size == 2 * sizeof(uint64_t) ? ValueKind::wide : ValueKind::bytes};
+  case TAV_TYPE_BYTE: return raw.size == 1 ? Word{ValueKind::number, *raw.bytes} : Word{ValueKind::bytes};
+  case TAV_TYPE_UTC_TIMESTAMP: return timeIn(raw);
+  case TAV_TYPE_ASCII_STRING: return {ValueKind::text};
+  case TAV_TYPE_UTF8_STRING: return {raw.size >= sizeof(uint16_t) ? ValueKind::text : ValueKind::bytes};
+  default: return {ValueKind::bytes};
   }
 }
 
-inline void NodeColumns::addRow(const NodeFacts& node, int64_t parentRow)
+/// Of a group, and of a data element whose value is not wanted, without one.
+[[gnu::always_inline]] inline void NodeColumns::addRow(const NodeFacts& node, int64_t parentRow)
 {
   const size_t row = count_++;
   parent[row] = parentRow;
@@ -104,16 +101,11 @@ inline void NodeColumns::addRow(const NodeFacts& node, int64_t parentRow)
   id[row] = node.elm;
   type[row] = node.type;
   key[row] = node.key;
-  number[row] = 0;
-  time[row] = kNoTime;
-  kind[row] = ValueKind::none;
-  if (node.payload == nullptr)
-  {
-    return;
-  }
-  const ValueKind found = classify({node.type, node.payload, node.size, node.swapped}, row);
-  kind[row] = found;
-  if (found == ValueKind::text || found == ValueKind::bytes || found == ValueKind::wide)
+  const Word word = node.payload == nullptr ? Word{} : wordIn({node.type, node.payload, node.size, node.swapped});
+  number[row] = word.number;
+  time[row] = word.time;
+  kind[row] = word.kind;
+  if (isRest(word.kind))
   {
     place_[row] = static_cast<uint32_t>(rests_.size());
     rests_.push_back({node.payload, node.swapped});

@@ -48,7 +48,7 @@ void NodeColumns::cut(size_t rows)
 {
   for (size_t row = rows; row < count_; ++row)
   {
-    if (kind[row] == ValueKind::text || kind[row] == ValueKind::bytes || kind[row] == ValueKind::wide)
+    if (isRest(kind[row]))
     {
       rests_.resize(place_[row]); // of the first of them: they lie in the order of the rows
       break;

@@ -218,7 +218,7 @@ private:
         state.options_.paths ? static_cast<void>(state.addPath(node)) : void();
       }
     }
-    NodeFacts factsOf(const core::Node& node, const uint8_t* payload, bool swap) const
+    [[gnu::always_inline]] NodeFacts factsOf(const core::Node& node, const uint8_t* payload, bool swap) const
     {
       return {state.base_ + node.offset(), node.size(), state.open_.size(), node.elm(), node.type(), keyOf(node.info()),
               swap, payload};

@@ -163,14 +163,25 @@ void fillNames(const inspect::NodeColumns& rows, Places& places, bool types)
   }
 }
 
+void fillRests(const inspect::NodeColumns& rows, Places& places, inspect::ValueKind kind)
+{
+  for (size_t row = 0; row < rows.count(); ++row)
+  {
+    if (rows.kind[row] == kind)
+    {
+      const bool isText = kind == inspect::ValueKind::text;
+      places.put(row, (isText ? made(valueOf(rows.rest(row))) : bytesAt(rows, row)).release());
+    }
+  }
+}
+
 PyObject* fillObjects(PyObject* self, PyObject* arguments)
 {
   return guarded([&] {
     PyObject* name = nullptr;
     PyObject* array = nullptr;
     done(PyArg_ParseTuple(arguments, "UO", &name, &array) - 1);
-    const Rows& all = rowsOf(self);
-    const inspect::NodeColumns& rows = all.columns;
+    const inspect::NodeColumns& rows = rowsOf(self).columns;
     const std::string wanted = bytesOfText(name);
     Places places(array, rows.count());
     if (wanted == "tag" || wanted == "type")
@@ -179,17 +190,11 @@ PyObject* fillObjects(PyObject* self, PyObject* arguments)
     }
     else if (wanted == "text")
     {
-      for (const size_t row : all.texts)
-      {
-        places.put(row, made(valueOf(rows.rest(row))).release());
-      }
+      fillRests(rows, places, inspect::ValueKind::text);
     }
     else if (wanted == "bytes")
     {
-      for (const size_t row : all.bytes)
-      {
-        places.put(row, bytesAt(rows, row).release());
-      }
+      fillRests(rows, places, inspect::ValueKind::bytes);
     }
     else
     {

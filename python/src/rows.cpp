@@ -5,34 +5,28 @@
 namespace tav::python
 {
 
-/// Looks through the rows from one on.
-void Rows::sort(size_t from)
+/// Looks through the numbers from one on. Most columns have none whose first bit is set, which is seen without looking
+/// at their kinds and types.
+void Rows::seeNumbers(size_t from)
 {
   using inspect::ValueKind;
-  for (size_t row = from; row < columns.count(); ++row)
+  const uint64_t* const numbers = columns.number.data();
+  const ValueKind* const kinds = columns.kind.data();
+  const size_t count = columns.count();
+  uint64_t all = 0;
+  bool wide = false;
+  for (size_t row = from; row < count; ++row)
   {
-    switch (columns.kind[row])
-    {
-    case ValueKind::number:
-    {
-      const bool isUpper = (columns.number[row] >> 63U) != 0;
-      const bool isSigned = isUpper && isSignedNumber(columns.type[row]);
-      hasNegative |= isSigned;
-      hasUpper |= isUpper && !isSigned;
-      break;
-    }
-    case ValueKind::text:
-      texts.push_back(row);
-      break;
-    case ValueKind::bytes:
-      bytes.push_back(row);
-      break;
-    case ValueKind::wide:
-      hasWide = true;
-      break;
-    default:
-      break;
-    }
+    all |= numbers[row];
+    wide |= kinds[row] == ValueKind::wide;
+  }
+  hasWide |= wide;
+  for (size_t row = from; row < count && (all >> 63U) != 0; ++row)
+  {
+    const bool isUpper = kinds[row] == ValueKind::number && (numbers[row] >> 63U) != 0;
+    const bool isSigned = isUpper && isSignedNumber(columns.type[row]);
+    hasNegative |= isSigned;
+    hasUpper |= isUpper && !isSigned;
   }
 }
 
@@ -48,7 +42,7 @@ void Rows::fill(inspect::ByteSource& source, bool withPaths, Pass& pass)
   reader.tellProgress([&pass](uint64_t offset) { pass.at(offset); });
   for (size_t from = 0; reader.next(columns); from = columns.count())
   {
-    sort(from);
+    seeNumbers(from);
     pass.at(columns.offset[columns.count() - 1]);
   }
   if (reader.stopped())

@@ -4,7 +4,6 @@
 #include <cstddef>
 #include <memory>
 #include <utility>
-#include <vector>
 
 #include "python/src/reader.h"
 #include "tav/inspect/nodeColumns.hpp"
@@ -12,8 +11,8 @@
 namespace tav::python
 {
 
-/// Rows of nodes, and which of them have values that Python makes objects of. What does not fit a word is left in the
-/// stream, which stays as long as the rows.
+/// Rows of nodes, and of what sort their numbers are. What does not fit a word is left in the stream, which stays as
+/// long as the rows.
 class Rows
 {
 public:
@@ -24,14 +23,12 @@ public:
   void fill(inspect::ByteSource& source, bool withPaths, Pass& pass);
 
   inspect::NodeColumns columns{};
-  std::vector<size_t> texts{};
-  std::vector<size_t> bytes{};
   bool hasNegative = false;
   bool hasUpper = false; ///< numbers that only unsigned 64 bits hold
   bool hasWide = false;
 
 private:
-  void sort(size_t from);
+  void seeNumbers(size_t from);
 
   std::shared_ptr<Opened> opened_;
 };

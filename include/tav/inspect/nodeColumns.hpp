@@ -144,6 +144,13 @@ private:
     const uint8_t* payload;
     bool swapped;
   };
+  /// What the value's columns have of a row.
+  struct Word
+  {
+    ValueKind kind = ValueKind::none;
+    uint64_t number = 0;
+    int64_t time = kNoTime;
+  };
 
   void makeRoom(size_t rows);
   template<class Use>
@@ -151,10 +158,14 @@ private:
   bool isFull() const { return count_ == room_; }
   /// There is room for it.
   void addRow(const NodeFacts& node, int64_t parentRow);
-  ValueKind classify(const tav::detail::RawValue& raw, size_t row);
+  static bool isRest(ValueKind of)
+  {
+    return of == ValueKind::text || of == ValueKind::bytes || of == ValueKind::wide;
+  }
+  static Word wordIn(const tav::detail::RawValue& raw);
   template<class Number>
-  ValueKind takeNumber(const tav::detail::RawValue& raw, size_t row);
-  ValueKind takeTime(const tav::detail::RawValue& raw, size_t row);
+  static Word numberIn(const tav::detail::RawValue& raw);
+  static Word timeIn(const tav::detail::RawValue& raw);
 
   size_t count_ = 0;
   size_t room_ = 0;
