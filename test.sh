@@ -288,7 +288,7 @@ check_browser()
 {
   local status=0
   web/build.sh >"$work/build.log" 2>&1 || { tail -n 40 "$work/build.log"; return 1; }
-  build release --target tav_tool
+  build release --target tav_tool tav_generate
   (cd web && TAV_TOOL=$PWD/../build/release/tools/tav npm test --silent) >"$work/tests.log" 2>&1 || status=$?
   count_browser
   if ((status != 0)); then
@@ -431,7 +431,7 @@ case ${1:-} in
         stage "SQL" check_sql
         ;;
       browser)
-        stage "packages" cmake/install-packages.sh browser
+        stage "packages" cmake/install-packages.sh build test browser
         stage "browser" check_browser
         ;;
       *)
