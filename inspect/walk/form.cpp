@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <limits>
+#include <numeric>
 
 #include "inspect/walk/prober.h"
 #include "inspect/walk/reasons.h"
@@ -52,46 +53,6 @@ void sortTrials(std::vector<Trial>& trials)
   });
 }
 
-/// Tries ways, and counts against them that they find no root at the start where there is a good one.
-void tryForms(ByteSource& source, const std::vector<Form>& forms, uint64_t search, RootBelief best,
-              std::vector<Trial>& trials)
-{
-  for (const Form& form : forms)
-  {
-    trials.push_back(tryForm(source, form, search));
-    trials.back().root = judgeRoot(source, form);
-    trials.back().cost += best >= RootBelief::usual && trials.back().root < RootBelief::usual ? kNoRoot : 0;
-  }
-  sortTrials(trials);
-}
-
-/// Ways in which the first bytes are a root's header come first. The others are tried where none of these goes without
-/// damage.
-std::vector<Trial> tryAll(ByteSource& source, const FormChoice& choice)
-{
-  std::vector<Form> fitting;
-  std::vector<Form> others;
-  RootBelief best = RootBelief::none;
-  for (const Form& form : candidates(choice))
-  {
-    const RootBelief belief = judgeRoot(source, form);
-    (belief != RootBelief::none ? fitting : others).push_back(form);
-    best = std::max(best, belief);
-  }
-  std::vector<Trial> trials;
-  tryForms(source, fitting, kMaxSearch, best, trials);
-  if (trials.empty() || trials.front().nodes == 0)
-  {
-    trials.clear();
-    tryForms(source, candidates(choice), kMaxSearchDamaged, best, trials);
-  }
-  else if (trials.front().cost >= kDamage)
-  {
-    tryForms(source, others, kMaxSearch, best, trials);
-  }
-  return trials;
-}
-
 /// By how much more speaks against another way than against the best one, over the bytes that both have looked at.
 double margin(const Trial& best, const Trial& other)
 {
@@ -110,6 +71,98 @@ bool isStartSound(ByteSource& source, const Trial& best)
   return best.isExact() ||
          (best.first.offset() == 0 && best.root == RootBelief::usual && (best.form.root64 || best.first.size() != 0) &&
           (best.first.has(kOverrun) || prober.judge(0, best.form.root64, source.size()) == Belief::followed));
+}
+
+/// How much of the trials is made.
+enum class Effort : uint8_t
+{
+  needed, ///< what can change what is told of the file
+  whole
+};
+
+/// The indices of ways in the order in which they are tried: first the padding that the root's header announces.
+std::vector<size_t> likelyFirst(ByteSource& source, const std::vector<Form>& forms)
+{
+  std::vector<size_t> order(forms.size());
+  std::iota(order.begin(), order.end(), size_t{0});
+  std::stable_partition(order.begin(), order.end(), [&](size_t at) {
+    TAVHeader root{};
+    const Prober prober(source, forms[at], 0);
+    return readRoot(prober, 0, forms[at].root64, source.size(), root) &&
+           forms[at].aligned == ((infoOf(root) & TAV_INFO_ALIGNED8) != 0);
+  });
+  return order;
+}
+
+/// Whether other ways may be given up for one: nothing is damaged on it, and its start is sound. Of the others, it then
+/// counts only whether they find the same, and how far they are behind.
+bool canRefute(ByteSource& source, const Trial& trial)
+{
+  return trial.nodes != 0 && trial.damages == 0 && isStartSound(source, trial);
+}
+
+/// Tries ways, and counts against them that they find no root at the start where there is a good one. With
+/// Effort::needed, a way is given up once one that was tried before is certain to be better by far.
+void tryForms(ByteSource& source, const std::vector<Form>& forms, uint64_t search, RootBelief best, Effort effort,
+              std::vector<Trial>& trials)
+{
+  std::vector<Trial> tried(forms.size());
+  const Trial* better = effort == Effort::needed && !trials.empty() && canRefute(source, trials.front())
+                            ? &trials.front()
+                            : nullptr;
+  for (const size_t at : likelyFirst(source, forms))
+  {
+    Trial& trial = tried[at];
+    const RootBelief root = judgeRoot(source, forms[at]);
+    const bool behind = better != nullptr && surenessOf(root) <= better->sureness();
+    trial = tryForm(source, forms[at], {.search = search, .better = behind ? better : nullptr, .far = kNear});
+    trial.root = root;
+    trial.cost += best >= RootBelief::usual && root < RootBelief::usual ? kNoRoot : 0;
+    if (effort == Effort::needed && better == nullptr && canRefute(source, trial))
+    {
+      better = &trial;
+    }
+  }
+  trials.insert(trials.end(), tried.begin(), tried.end());
+  sortTrials(trials);
+}
+
+/// Ways in which the first bytes are a root's header come first. The others are tried where none of these goes without
+/// damage; beside a root that ends where the file does, they count for nothing.
+std::vector<Trial> tryAll(ByteSource& source, const FormChoice& choice, Effort effort)
+{
+  std::vector<Form> fitting;
+  std::vector<Form> others;
+  RootBelief best = RootBelief::none;
+  for (const Form& form : candidates(choice))
+  {
+    const RootBelief belief = judgeRoot(source, form);
+    (belief != RootBelief::none ? fitting : others).push_back(form);
+    best = std::max(best, belief);
+  }
+  std::vector<Trial> trials;
+  tryForms(source, fitting, kMaxSearch, best, effort, trials);
+  if (trials.empty() || trials.front().nodes == 0)
+  {
+    trials.clear();
+    tryForms(source, candidates(choice), kMaxSearchDamaged, best, effort, trials);
+  }
+  else if (trials.front().cost >= kDamage && (effort == Effort::whole || !trials.front().isExact()))
+  {
+    tryForms(source, others, kMaxSearch, best, effort, trials);
+  }
+  return trials;
+}
+
+/// As tryAll(), with no more effort than changes nothing: a way that was given up has to be behind the one that turns
+/// out to be the best.
+std::vector<Trial> tryNeeded(ByteSource& source, const FormChoice& choice)
+{
+  std::vector<Trial> trials = tryAll(source, choice, Effort::needed);
+  const bool isSound = std::all_of(trials.begin(), trials.end(), [&](const Trial& trial) {
+    return !trial.givenUpFor || *trial.givenUpFor == trials.front().form;
+  });
+  return isSound ? trials : tryAll(source, choice, Effort::whole);
 }
 
 /// Whether eye catchers tell that the other byte order is the right one.
@@ -191,10 +244,12 @@ std::optional<Form> otherStreamAt(ByteSource& source, const Form& form, uint64_t
   return std::nullopt;
 }
 
-Recognition recognise(ByteSource& source, const FormChoice& choice)
+namespace
+{
+
+Recognition judgeTrials(ByteSource& source, const FormChoice& choice, const std::vector<Trial>& trials)
 {
   Recognition result;
-  const std::vector<Trial> trials = tryAll(source, choice);
   if (trials.empty() || trials.front().nodes == 0)
   {
     result.possible = notRefuted(source, trials);
@@ -232,6 +287,18 @@ Recognition recognise(ByteSource& source, const FormChoice& choice)
   }
   result.because = explainForm(trials, result, source.dictionary());
   return result;
+}
+
+} // namespace
+
+Recognition recognise(ByteSource& source, const FormChoice& choice)
+{
+  return judgeTrials(source, choice, tryNeeded(source, choice));
+}
+
+Recognition recogniseByAll(ByteSource& source, const FormChoice& choice)
+{
+  return judgeTrials(source, choice, tryAll(source, choice, Effort::whole));
 }
 
 } // namespace tav::inspect

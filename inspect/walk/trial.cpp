@@ -155,23 +155,41 @@ void countUnread(ByteSource& source, uint64_t offset, uint64_t searched, Trial& 
   }
 }
 
+/// Whether a way has lost against a better one whatever comes: even when nothing else speaks against it up to the end
+/// of the file. One that has passed over damage does not find the same as one without.
+bool isBehindForGood(const Trial& trial, const TrialLimits& limits, uint64_t size)
+{
+  if (limits.better == nullptr || trial.damages == 0)
+  {
+    return false;
+  }
+  const double least = static_cast<double>(trial.cost) / static_cast<double>(std::max(size, trial.extent));
+  return (least - limits.better->rate()) * static_cast<double>(limits.better->extent) > limits.far + 1;
+}
+
 } // namespace
 
-Trial tryForm(ByteSource& source, const Form& form, uint64_t search)
+Trial tryForm(ByteSource& source, const Form& form, const TrialLimits& limits)
 {
   Trial trial;
   trial.form = form;
   const uint64_t readBefore = source.bytesRead();
-  Walker walker(source, form, {.budget = search});
+  Walker walker(source, form, {.budget = limits.search});
   Event event;
   while (trial.nodes < kMaxNodes && walker.next(event))
   {
     if (event.what == What::unread)
     {
-      countUnread(source, event.offset, search, trial);
+      countUnread(source, event.offset, limits.search, trial);
       break;
     }
     countEvent(source, event, trial);
+    if (isBehindForGood(trial, limits, source.size()))
+    {
+      trial.givenUpFor = limits.better->form;
+      trial.signature = ~limits.better->signature;
+      break;
+    }
     if (source.bytesRead() - readBefore > kMaxRead && trial.nodes > 16)
     {
       break;

@@ -3,8 +3,10 @@
 #pragma once
 
 #include <cstdint>
+#include <optional>
 
 #include "inspect/walk/prober.h"
+#include "tav/inspect/form.hpp"
 #include "tav/inspect/node.hpp"
 #include "tav/inspect/source.hpp"
 
@@ -22,6 +24,12 @@ enum class RootBelief : uint8_t
   usual, ///< and are as writers make it
   exact  ///< and say about how long the file is, which chance hardly does
 };
+
+/// What the root alone says of a way.
+constexpr RootBelief surenessOf(RootBelief root)
+{
+  return root >= RootBelief::usual ? root : RootBelief::none;
+}
 
 /// What one way of reading the bytes finds in them.
 struct Trial
@@ -49,15 +57,27 @@ struct Trial
   uint64_t otherAt = 0;      ///< where a stream in another form seems to begin; 0: nowhere
   Form otherForm{};
   Node first{};
+  std::optional<Form> givenUpFor{}; ///< the way that is better by far, for which this one was not tried to its end
 
   double rate() const { return static_cast<double>(cost) / static_cast<double>(extent); }
   bool isExact() const { return root == RootBelief::exact; }
   /// What the root alone says of the way: a header is hardly usual by chance, and damage far behind says nothing of it.
-  RootBelief sureness() const { return root >= RootBelief::usual ? root : RootBelief::none; }
+  RootBelief sureness() const { return surenessOf(root); }
 };
 
-/// Reads the beginning in a form. `search`: bytes that may be looked through for nodes.
-Trial tryForm(ByteSource& source, const Form& form, uint64_t search);
+/// How far a way is tried.
+struct TrialLimits
+{
+  uint64_t search = 0;           ///< bytes that may be looked through for nodes
+  const Trial* better = nullptr; ///< a way without damage for which this one is given up, as soon as it is certain
+  double far = 0;                ///< that it is worse by more than this, over the bytes that both have looked at
+};
+
+/// Reads the beginning in a form.
+Trial tryForm(ByteSource& source, const Form& form, const TrialLimits& limits);
+
+/// As recognise(), with all ways tried to their ends, which it leaves out where that changes nothing.
+Recognition recogniseByAll(ByteSource& source, const FormChoice& choice);
 
 /// What the first bytes say of a form.
 RootBelief judgeRoot(ByteSource& source, const Form& form);
