@@ -46,6 +46,9 @@ public:
     return bytes_.data() + index;
   }
 
+  /// From an offset that at() was asked for on, how many can be tested with what is filled in.
+  uint64_t ready(uint64_t index) const { return filled_ - kMargin - index + 1; }
+
   std::span<const uint8_t> whole()
   {
     fill(bytes_.size());
@@ -77,10 +80,80 @@ uint16_t load16(const uint8_t* bytes, bool swap)
   return swap ? kor::byteswap16(value) : value;
 }
 
-bool isKnownType(uint16_t type)
+/// A table of the answers for all 16-bit numbers: they are asked for at every byte of a damaged region.
+using Answers = std::array<bool, 65536>;
+
+const Answers& knownTypes()
 {
-  return isGroupType(type) || typeInfo(type).known;
+  static const auto known = []() {
+    Answers table{};
+    for (size_t type = 0; type < table.size(); ++type)
+    {
+      const auto number = static_cast<uint16_t>(type);
+      table[type] = isGroupType(number) || typeInfo(number).known;
+    }
+    return table;
+  }();
+  return known;
 }
+
+const Answers& namedElements()
+{
+  static const auto named = []() {
+    Answers table{};
+    for (const dictionary::Entry& entry : dictionary::entries())
+    {
+      table[entry.id] = entry.constant != "INVALID_ELEMENT";
+    }
+    return table;
+  }();
+  return named;
+}
+
+/// Tells where neither a header with a name nor an eye catcher can be, which is nearly everywhere.
+class Passing
+{
+public:
+  Passing(bool swap, bool wide, bool eitherWidth)
+      : swap_(swap), first_(wide ? 12 : 4), second_(eitherWidth ? 16 - first_ : first_)
+  {
+  }
+
+  /// How many of `count` offsets from `bytes` on can be passed over.
+  uint64_t over(const uint8_t* bytes, uint64_t count) const
+  {
+    return swap_ ? overAs<true>(bytes, count) : overAs<false>(bytes, count);
+  }
+
+private:
+  template <bool swap>
+  uint64_t overAs(const uint8_t* bytes, uint64_t count) const
+  {
+    const auto isHeader = [&](const uint8_t* tail) {
+      return types_[load16(tail, swap)] && named_[load16(tail + 2, swap)];
+    };
+    const uint8_t* const end = bytes + count;
+    const uint8_t* at = bytes;
+    while (at != end && !isHeader(at + first_) && !isHeader(at + second_) && !isEye(at))
+    {
+      ++at;
+    }
+    return static_cast<uint64_t>(at - bytes);
+  }
+
+  static bool isEye(const uint8_t* bytes)
+  {
+    uint64_t word = 0;
+    std::memcpy(&word, bytes, sizeof word);
+    return word == TAV_EYE_CATCHER || word == kor::byteswap64(TAV_EYE_CATCHER);
+  }
+
+  const Answers& types_ = knownTypes();
+  const Answers& named_ = namedElements();
+  bool swap_;
+  size_t first_; ///< from the header on to its type
+  size_t second_;
+};
 
 } // namespace
 
@@ -91,16 +164,7 @@ Prober::Prober(ByteSource& source, const Form& form, uint64_t budget)
 
 bool Prober::isNamed(uint16_t elm)
 {
-  // Asked for every byte of a damaged region, so the answers are kept.
-  static const auto named = [] {
-    std::array<bool, 65536> table{};
-    for (const dictionary::Entry& entry : dictionary::entries())
-    {
-      table[entry.id] = entry.constant != "INVALID_ELEMENT";
-    }
-    return table;
-  }();
-  return named[elm];
+  return namedElements()[elm];
 }
 
 bool Prober::header(uint64_t offset, bool wide, uint64_t limit, TAVHeader& out) const
@@ -261,7 +325,7 @@ bool Prober::pairEnds(uint64_t offset, uint64_t limit, const TAVHeader& group) c
 bool Prober::isNamedHeader(const uint8_t* bytes, bool wide) const
 {
   const uint8_t* const tail = bytes + (wide ? 12 : 4);
-  return isKnownType(load16(tail, form_.swapped)) && isNamed(load16(tail + 2, form_.swapped));
+  return knownTypes()[load16(tail, form_.swapped)] && isNamed(load16(tail + 2, form_.swapped));
 }
 
 bool Prober::restartAt(const uint8_t* bytes, uint64_t offset, bool wide, uint64_t limit)
@@ -327,6 +391,7 @@ bool Prober::restartByPair(const uint8_t* bytes, uint64_t offset, uint64_t from,
 Restart Prober::findRestart(uint64_t from, bool wide, bool eitherWidth, uint64_t limit)
 {
   Window window(source_);
+  const Passing passing(form_.swapped, wide, eitherWidth);
   Restart restart{limit};
   if (spent_ > budget_)
   {
@@ -339,7 +404,16 @@ Restart Prober::findRestart(uint64_t from, bool wide, bool eitherWidth, uint64_t
     const uint64_t tests = std::min<uint64_t>(kWindow, limit - at);
     for (uint64_t i = 0; i < tests; ++i)
     {
-      const uint8_t* const bytes = window.at(i);
+      const uint8_t* bytes = window.at(i);
+      const uint64_t ready = std::min(window.ready(i), tests - i);
+      const uint64_t passed = passing.over(bytes, ready);
+      if (passed == ready)
+      {
+        i += passed - 1;
+        continue;
+      }
+      i += passed;
+      bytes += passed;
       const uint64_t offset = at + i;
       if (offset > from && (restartAt(bytes, offset, wide, limit) ||
                             (eitherWidth && restartAt(bytes, offset, !wide, limit))))
@@ -352,7 +426,7 @@ Restart Prober::findRestart(uint64_t from, bool wide, bool eitherWidth, uint64_t
       }
     }
     spent_ += tests;
-    at = std::min(limit, source_.pastHole(at + tests, window.whole(), kMargin));
+    at = limit - at == tests ? limit : std::min(limit, source_.pastHole(at + tests, window.whole(), kMargin));
     if (spent_ > budget_)
     {
       restart.gaveUp = at < limit;
