@@ -126,7 +126,7 @@ public:
   }
 
 private:
-  template <bool swap>
+  template<bool swap>
   uint64_t overAs(const uint8_t* bytes, uint64_t count) const
   {
     const auto isHeader = [&](const uint8_t* tail) {
