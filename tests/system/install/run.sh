@@ -45,13 +45,31 @@ if [[ -x $prefix/bin/tav ]]; then
 fi
 
 echo "== CMake package"
-cmake -S "$here/outside" -B "$work/outside" -DCMAKE_PREFIX_PATH="$prefix" -DCMAKE_CXX_COMPILER="$compiler" \
+version=$(sed -n 's/^CMAKE_PROJECT_VERSION:STATIC=//p' "$build/CMakeCache.txt")
+IFS=. read -r major minor patch <<<"$version"
+cmake -S "$here/outside" -B "$work/outside" -DCMAKE_PREFIX_PATH="$prefix" -DTAV_WANTED="$major.$minor" -DCMAKE_CXX_COMPILER="$compiler" \
   -DCMAKE_FIND_USE_PACKAGE_REGISTRY=OFF >"$work/configure.log"
 grep -q "tav_DIR:PATH=$prefix/" "$work/outside/CMakeCache.txt"
 cmake --build "$work/outside"
 "$work/outside/outside"
 "$work/outside/outside_inspect"
 "$work/outside/outside_kor"
+
+echo "== versions that the CMake package takes for its own"
+file=$(find "$prefix" -name tavConfigVersion.cmake)
+# fits VERSION: whether a project that asks for it is content.
+fits()
+{
+  local parts
+  IFS=. read -ra parts <<<"$1"
+  printf 'set(PACKAGE_FIND_VERSION %s)\nset(PACKAGE_FIND_VERSION_MAJOR %s)\nset(PACKAGE_FIND_VERSION_MINOR %s)\ninclude("%s")\nmessage("fits: ${PACKAGE_VERSION_COMPATIBLE}")\n' \
+    "$1" "${parts[0]}" "${parts[1]}" "$file" >"$work/fits.cmake"
+  cmake -P "$work/fits.cmake" 2>&1 | grep -qx 'fits: TRUE'
+}
+fits "$version" && fits "$major.$minor.0" || { echo "the package $version is not taken for itself"; exit 1; }
+for other in "$major.$((minor - 1)).0" "$major.$((minor + 1)).0" "$major.$minor.$((patch + 1))" "$((major + 1)).$minor.0"; do
+  if fits "$other"; then echo "the package $version is taken for $other"; exit 1; fi
+done
 
 echo "== pkg-config"
 PKG_CONFIG_PATH=$(dirname "$(find "$prefix" -name tav.pc)")
@@ -63,7 +81,7 @@ else
   LD_LIBRARY_PATH=$(pkg-config --variable=libdir tav)
   export LD_LIBRARY_PATH
 fi
-pkg-config --print-errors --exact-version="$(sed -n 's/^CMAKE_PROJECT_VERSION:STATIC=//p' "$build/CMakeCache.txt")" tav
+pkg-config --print-errors --exact-version="$version" tav
 for part in tav:main tav-inspect:inspect kor:kor; do
   read -ra flags <<<"$(pkg-config "${mode[@]}" --cflags --libs "${part%%:*}")"
   program=$work/${part##*:}
