@@ -196,8 +196,7 @@ run_properties()
   GTEST_FILTER='-*RingEqualsDirect*' run_rooms "$@" property
 }
 
-rooms=(kor trace format storage dictionary core api golden cpp host)
-roomsHere=("${rooms[@]}" inspect) # on this platform
+rooms=(kor trace format storage dictionary core api golden cpp host inspect)
 
 # labels_of ROOM...: the expression by which ctest knows the tests of these rooms.
 labels_of()
@@ -210,8 +209,8 @@ labels_of()
 build_and_test()
 {
   build "$1"
-  run_rooms "$1" tests "" "${roomsHere[@]}"
-  run_tests "$1" --label-exclude "$(labels_of "${roomsHere[@]}")"
+  run_rooms "$1" tests "" "${rooms[@]}"
+  run_tests "$1" --label-exclude "$(labels_of "${rooms[@]}")"
 }
 
 # check_platform PRESET FOLDER ENDING EMULATOR ROOM...: rooms and properties on another platform, the exported symbols,
@@ -244,7 +243,7 @@ check_sanitizers()
   build asan-clang
   local -x ASAN_OPTIONS=detect_leaks=1:detect_stack_use_after_return=1:strict_string_checks=1:allocator_may_return_null=1
   local -x UBSAN_OPTIONS=print_stacktrace=1
-  run_rooms asan-clang tests "" "${roomsHere[@]}"
+  run_rooms asan-clang tests "" "${rooms[@]}"
   run_properties asan-clang tests ""
   # A writer and three readers for some seconds; tests/system/threads/meanwhile.sh does it for a minute.
   local -x TAV_MEANWHILE_MS=5000

@@ -24,10 +24,10 @@
 #include "tav/elements.h"
 #include "tav/types.h"
 
-#if defined(TAV_STATIC)
-#define TAV_C_API
-#elif defined(TAV_INSPECT_BUILDING)
+#if defined(TAV_INSPECT_BUILDING)
 #define TAV_C_API KOR_DECL_EXPORT
+#elif defined(TAV_STATIC)
+#define TAV_C_API
 #else
 #define TAV_C_API KOR_DECL_IMPORT
 #endif
