@@ -1,4 +1,5 @@
 #include <algorithm>
+#include <climits>
 #include <cstdarg>
 #include <cstddef>
 #include <cstdint>
@@ -21,8 +22,9 @@ uint32_t korSnprintf(char* pBuffer, uint64_t bufferSize, const char* pFormat, ..
     return TAV_RC_BAD_PARAM;
   }
 
-  // No buffer is larger than this; the size of one that is said to be may not even be a number here.
-  const auto room = static_cast<std::size_t>(std::min<uint64_t>(bufferSize, PTRDIFF_MAX));
+  // The length that comes back is an int, so that no text is longer; more room than that is none of its business, and
+  // the size of a buffer that is said to be larger may not even be a number here.
+  const auto room = static_cast<std::size_t>(std::min<uint64_t>(bufferSize, INT_MAX));
   va_list arguments;
   va_start(arguments, pFormat);
   const int wanted = std::vsnprintf(pBuffer, room, pFormat, arguments);
@@ -36,5 +38,5 @@ uint32_t korSnprintf(char* pBuffer, uint64_t bufferSize, const char* pFormat, ..
     }
     return TAV_RC_BAD_PARAM;
   }
-  return static_cast<uint64_t>(wanted) < bufferSize ? TAV_RC_OK : TAV_RC_NO_MEMORY;
+  return static_cast<std::size_t>(wanted) < room ? TAV_RC_OK : TAV_RC_NO_MEMORY;
 }

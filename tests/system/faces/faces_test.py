@@ -13,7 +13,7 @@ import unittest
 import xml.etree.ElementTree
 
 sys.path.insert(0, str(pathlib.Path(__file__).resolve().parent.parent / "tools"))
-from support import PATIENCE, tav, until  # noqa: E402  (behind the path that leads to it)
+from support import PATIENCE, running, tav, until  # noqa: E402  (behind the path that leads to it)
 
 FACE = os.environ["TAV_LAYER_FACE"]
 SEEDS = range(1, 9)
@@ -114,7 +114,7 @@ class Faces(unittest.TestCase):
         layer("tree", self.file, 1)
         for kill in range(30):
             before = state()
-            with subprocess.Popen([FACE, "overwrite", str(self.file)], stderr=subprocess.PIPE) as writer:
+            with running([FACE, "overwrite", str(self.file)], stderr=subprocess.PIPE) as writer:
                 if kill % 2 == 1:
                     self.assertTrue(until(lambda: state() != before or writer.poll() is not None))
                 time.sleep(0.003 * kill)  # at another moment each time, whatever it is doing then

@@ -11,7 +11,7 @@ import unittest
 
 sys.path.insert(0, str(pathlib.Path(__file__).resolve().parent.parent / "tools"))
 from planted import EYE_SIZE, Encoder, Form, Node  # noqa: E402  (behind the path that leads to it)
-from support import tav  # noqa: E402
+from support import running, tav  # noqa: E402
 
 WRITER = os.environ["TAV_KILL_WRITER"]
 KILLS = int(os.environ.get("TAV_KILLS", "150"))  # hundreds and more on demand
@@ -54,7 +54,7 @@ class KilledWriter(unittest.TestCase):
         """Runs the writer, killed after a delay; whether it was still at work."""
         self.file.unlink(missing_ok=True)
         command = [WRITER, str(self.file), str(page), str(pages), str(GROUPS), str(seed)]
-        with subprocess.Popen(command, stderr=subprocess.PIPE) as writer:
+        with running(command, stderr=subprocess.PIPE) as writer:
             while not self.file.exists() and writer.poll() is None:
                 pass
             start = time.monotonic()

@@ -10,7 +10,7 @@ import time
 import unittest
 
 sys.path.insert(0, str(pathlib.Path(__file__).resolve().parent.parent / "tools"))
-from support import tav  # noqa: E402  (behind the path that leads to it)
+from support import running, tav  # noqa: E402  (behind the path that leads to it)
 
 RECORDER = os.environ["TAV_KILL_RECORDER"]
 KILLS = int(os.environ.get("TAV_KILLS", "40"))  # hundreds and more on demand
@@ -28,7 +28,7 @@ class KilledRecorder(unittest.TestCase):
     def record(self, file, first, rng):
         """Runs a recorder until it is killed; the number that it was promised last, or the first one."""
         command = [RECORDER, str(file), str(first), str(rng.randrange(1 << 30)), str(rng.choice((2, 3, 10)) << 20)]
-        with subprocess.Popen(command, stdout=subprocess.PIPE, stderr=subprocess.PIPE) as recorder:
+        with running(command, stdout=subprocess.PIPE, stderr=subprocess.PIPE) as recorder:
             promised = recorder.stdout.readline() if rng.random() < 0.8 else b""
             time.sleep(rng.random() ** 3 * 0.2)
             recorder.kill()

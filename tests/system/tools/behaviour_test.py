@@ -6,9 +6,10 @@ import shutil
 import signal
 import struct
 import subprocess
+import sys
 import unittest
 
-from support import PATIENCE, TAV, ToolTest, generate, tav, until
+from support import PATIENCE, TAV, ToolTest, generate, running, tav, until
 
 
 class Behaviour(ToolTest):
@@ -48,6 +49,12 @@ class Behaviour(ToolTest):
             for command in ("info", "tree", "print"):
                 self.assertEqual(tav(command, path).status, 3, (command, content[:20]))
 
+    def test_a_check_that_fails_ends_what_runs_beside_it(self):
+        with self.assertRaises(AssertionError):
+            with running([sys.executable, "-c", "import time; time.sleep(1e6)"]) as process:
+                self.fail()
+        self.assertIsNotNone(process.returncode)
+
     def test_standard_input_works_as_a_file_does(self):
         path = self.snapshot("--eye-size")
         for arguments in (("tree", "{}"), ("get", "{}", "/system/host/os/osName"), ("hex", "{}"), ("print", "{}", "--xml")):
@@ -60,7 +67,7 @@ class Behaviour(ToolTest):
         path = self.snapshot()
         pipe = self.folder / "pipe"
         os.mkfifo(pipe)
-        with subprocess.Popen(["cp", str(path), str(pipe)]) as writer:
+        with running(["cp", str(path), str(pipe)]) as writer:
             result = tav("tree", pipe)
             writer.wait()
         self.assertEqual((result.status, result.raw), (0, tav("tree", path).raw))
@@ -78,7 +85,7 @@ class Behaviour(ToolTest):
         path.write_bytes(struct.pack("<QIHH", len(children), 0, 2, 60100) + children)
         for command in ("tree", "hex", "print"):
             with self.subTest(command=command):
-                with subprocess.Popen([*TAV, command, str(path)], stdout=subprocess.PIPE, stderr=subprocess.PIPE) as run:
+                with running([*TAV, command, str(path)], stdout=subprocess.PIPE, stderr=subprocess.PIPE) as run:
                     run.stdout.read(10)
                     run.stdout.close()
                     errors = run.stderr.read()
@@ -117,8 +124,8 @@ class Behaviour(ToolTest):
         folder = self.folder / "temporary"
         folder.mkdir()
         for number in (signal.SIGINT, signal.SIGTERM):
-            with subprocess.Popen([*TAV, "tree", "-"], stdin=subprocess.PIPE, stdout=subprocess.DEVNULL,
-                                  env={**os.environ, "TMPDIR": str(folder)}) as run:
+            with running([*TAV, "tree", "-"], stdin=subprocess.PIPE, stdout=subprocess.DEVNULL,
+                         env={**os.environ, "TMPDIR": str(folder)}) as run:
                 self.assertEqual(len(until(lambda: list(folder.iterdir()))), 1)
                 run.send_signal(number)
                 self.assertEqual(run.wait(timeout=PATIENCE), -number)

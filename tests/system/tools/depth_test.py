@@ -4,7 +4,7 @@ import struct
 import subprocess
 import unittest
 
-from support import PATIENCE, TAV, ToolTest, tav
+from support import PATIENCE, TAV, ToolTest, running, tav
 
 OPEN64 = struct.pack("<QIHH", 2**64 - 1, 0, 2, 60100)
 OPEN32 = struct.pack("<IHH", 2**32 - 1, 1, 60100)
@@ -21,7 +21,7 @@ def nest(levels):
 class Depth(ToolTest):
     def size(self, *arguments):
         """Bytes on standard output; read piece by piece, for it can be too much."""
-        with subprocess.Popen([*TAV, *map(str, arguments)], stdout=subprocess.PIPE, stderr=subprocess.DEVNULL) as run:
+        with running([*TAV, *map(str, arguments)], stdout=subprocess.PIPE, stderr=subprocess.DEVNULL) as run:
             size = sum(map(len, iter(lambda: run.stdout.read(MIB), b"")))
             self.assertIn(run.wait(timeout=PATIENCE), (0, 1))
         return size

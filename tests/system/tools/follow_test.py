@@ -7,7 +7,7 @@ import subprocess
 import threading
 import unittest
 
-from support import PATIENCE, TAV, WINDOWS, ToolTest, tav, until
+from support import PATIENCE, TAV, WINDOWS, ToolTest, running, tav, until
 
 OPEN = 2**64 - 1
 CPU_ONLINE, HOST, HOST_NAME, SYSTEM = 60111, 60102, 60103, 60100
@@ -87,7 +87,7 @@ class Follow(ToolTest):
     def test_values_come_while_another_process_writes(self):
         self.append(group(SYSTEM, number(0)))
         self.path.unlink()
-        with subprocess.Popen([*TAV, "snapshot", "--append", "--every", "20ms", "-o", str(self.path)]) as writer:
+        with running([*TAV, "snapshot", "--append", "--every", "20ms", "-o", str(self.path)]) as writer:
             timestamp = "get", self.path, "/system/timestamp"
             self.assertTrue(until(lambda: self.path.exists() and self.path.stat().st_size and tav(*timestamp).out))
             following = self.follow("get", "/system/timestamp")
@@ -179,8 +179,8 @@ class Follow(ToolTest):
         self.assert_quiet_end(following)
 
     def test_files_that_a_recorder_changes_are_followed_through_a_link(self):
-        with subprocess.Popen([*TAV, "snapshot", "--append", "--every", "50ms", "--rotate", "1", "-o",
-                               str(self.folder / "r-%n.tav")]) as writer:
+        with running([*TAV, "snapshot", "--append", "--every", "50ms", "--rotate", "1", "-o",
+                      str(self.folder / "r-%n.tav")]) as writer:
             following = None
             for count in range(1, 7):
                 recorded = self.folder / f"r-{count + 1}.tav"
@@ -274,7 +274,7 @@ class Follow(ToolTest):
 
     def test_nobody_who_reads_ends_it_quietly(self):
         self.append(group(SYSTEM, number(1)))
-        with subprocess.Popen([*TAV, "get", str(self.path), "//cpuOnline", "--follow"], stdout=subprocess.PIPE) as process:
+        with running([*TAV, "get", str(self.path), "//cpuOnline", "--follow"], stdout=subprocess.PIPE) as process:
             self.assertEqual(process.stdout.readline(), b"1\n")
             process.stdout.close()
             self.append(group(SYSTEM, number(2)))

@@ -7,7 +7,7 @@ import stat
 import subprocess
 import unittest
 
-from support import EMULATOR, PATIENCE, TAV, WINDOWS, ToolTest, tav, until
+from support import EMULATOR, PATIENCE, TAV, WINDOWS, ToolTest, running, tav, until
 
 try:
     import pty
@@ -222,7 +222,7 @@ class OtherThanFiles(PlaceTest):
         link.symlink_to(self.out)
         for name in (self.out, link):
             for force in ((), ("--force",)):
-                with subprocess.Popen(["cat", str(self.out)], stdout=subprocess.PIPE) as reader:
+                with running(["cat", str(self.out)], stdout=subprocess.PIPE) as reader:
                     self.written(WRITERS[0], *force, to=name)
                     self.assertEqual(reader.communicate(timeout=PATIENCE)[0], tav("json", self.path).raw)
                 self.assertTrue(stat.S_ISFIFO(self.out.lstat().st_mode) and link.is_symlink())

@@ -4,7 +4,7 @@ import re
 import subprocess
 import unittest
 
-from support import PATIENCE, TAV, WINDOWS, ToolTest, tav, until
+from support import PATIENCE, TAV, WINDOWS, ToolTest, running, tav, until
 
 README = next(folder / "README.md" for folder in pathlib.Path(__file__).resolve().parents if (folder / "README.md").exists())
 TIME = re.compile(r"\d{4}-\d\d-\d\dT\d\d:\d\d:\d\d\.\d{6}\+00:00")
@@ -22,6 +22,7 @@ class Record(ToolTest):
             with self.subTest(form=form):
                 path = self.folder / "x.tav"
                 path.unlink(missing_ok=True)
+                before = []
                 for count in range(1, 4):
                     result = tav("snapshot", "--append", *form, "-o", path)
                     self.assertEqual((result.status, result.err), (0, ""))
@@ -30,7 +31,8 @@ class Record(ToolTest):
                     result = tav("get", "--all", path, "/system/timestamp", *reading)
                     found = result.out.split()
                     self.assertEqual(len(found), count, result.err)
-                    self.assertEqual(found, sorted(found))
+                    self.assertEqual(found[:-1], before)  # the time of day may have been set back
+                    before = found
                     self.assertTrue(all(TIME.fullmatch(time) for time in found), found)
                 self.assertEqual(tav("check", path, *reading).status, 0)
 
@@ -41,7 +43,7 @@ class Record(ToolTest):
 
     def test_a_series_that_is_killed_is_gone_on_with(self):
         path = self.folder / "x.tav"
-        with subprocess.Popen([*TAV, "snapshot", "--append", "--every", "5ms", "-o", str(path)]) as series:
+        with running([*TAV, "snapshot", "--append", "--every", "5ms", "-o", str(path)]) as series:
             self.assertTrue(until(lambda: path.exists() and path.stat().st_size and len(times(path)) > 2))
             second = tav("snapshot", "--append", "-o", path)
             self.assertEqual(second.status, 2)
@@ -115,7 +117,6 @@ class Record(ToolTest):
         self.assertEqual(done.returncode, 0, done.stderr)
         found = TIME.findall(done.stdout)
         self.assertGreater(len(found), 3, done.stdout)
-        self.assertEqual(found, sorted(found))
         self.assertIn("no defects", done.stdout + done.stderr)
         self.assertTrue((self.folder / "day-1.tav").exists())
 

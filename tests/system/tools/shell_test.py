@@ -6,7 +6,7 @@ import subprocess
 import sys
 import unittest
 
-from support import EMULATOR, LONGEST_MESSAGE, WINDOWS, ToolTest, bytes_of_hex, tav, until
+from support import EMULATOR, LONGEST_MESSAGE, WINDOWS, ToolTest, bytes_of_hex, running, tav, until
 from terminal_test import TerminalTest
 
 STEERING = "\x1b]0;owned\x07\r\u202e\x9b"
@@ -18,7 +18,7 @@ class Inputs(ToolTest):
     def test_files_that_the_system_makes_are_read_although_their_size_is_wrong(self):
         words = [sys.executable, "-c", "import sys; sys.stdin.read()", "x" * 100000]
         content = b"".join(word.encode() + b"\0" for word in words)
-        with subprocess.Popen(words, stdin=subprocess.PIPE) as run:
+        with running(words, stdin=subprocess.PIPE) as run:
             path = pathlib.Path(f"/proc/{run.pid}/cmdline")
             self.assertTrue(until(lambda: path.read_bytes() == content))  # at first it is a copy of this process
             self.assertEqual(path.stat().st_size, 0)

@@ -1,4 +1,5 @@
 """What the tests of the program share: running it, making streams, a folder for files."""
+import contextlib
 import json
 import os
 import pathlib
@@ -44,6 +45,18 @@ def tav_in_little_memory(*arguments):
     if SANITIZED or EMULATOR:  # an emulator takes all addresses that it can get
         return tav(*arguments)
     return tav(*arguments, preexec_fn=lambda: resource.setrlimit(resource.RLIMIT_AS, (400 << 20, 400 << 20)))
+
+
+@contextlib.contextmanager
+def running(words, **streams):
+    """A process beside the block, which waits for its end. A check that fails in the block ends the process, too: one
+    that does not end by itself would keep the test from telling."""
+    with subprocess.Popen([str(word) for word in words], **streams) as process:
+        try:
+            yield process
+        except BaseException:
+            process.kill()
+            raise
 
 
 def until(condition):
