@@ -21,12 +21,16 @@ static_assert(sizeof(TAVHeaderData) == 56);
 
 static_assert(offsetof(TAVHandle, curOffset) == 16 && offsetof(TAVHandle, pDirectData) == 24);
 static_assert(offsetof(TAVHandle, directDataSize) == 32 && offsetof(TAVHandle, streamBytes) == 40);
-static_assert(offsetof(TAVHandle, pCircularBuf) == 48 && offsetof(TAVHandle, pSideStorage) == 56);
-static_assert(offsetof(TAVHandle, pHdrStack) == 64 && offsetof(TAVHandle, options) == 72);
-static_assert(offsetof(TAVHandle, alignMode) == 80 && offsetof(TAVHandle, swapBytes) == 81);
 
-static_assert(offsetof(TAVHdrStack, pEntries) == 0 && offsetof(TAVHdrStack, capacity) == 8);
-static_assert(offsetof(TAVHdrStack, count) == 12);
+// Programs that count on these offsets without a compiler are 64-bit ones; in 32 bits pointers are narrower.
+constexpr bool kWide = sizeof(void*) == 8;
+static_assert(offsetof(TAVHandle, pCircularBuf) == 48 && offsetof(TAVHandle, pSideStorage) == 48 + sizeof(void*));
+static_assert(offsetof(TAVHandle, pHdrStack) == 48 + 2 * sizeof(void*));
+static_assert(!kWide || (offsetof(TAVHandle, options) == 72 && offsetof(TAVHandle, alignMode) == 80));
+static_assert(offsetof(TAVHandle, swapBytes) == offsetof(TAVHandle, alignMode) + 1);
+
+static_assert(offsetof(TAVHdrStack, pEntries) == 0 && offsetof(TAVHdrStack, capacity) == sizeof(void*));
+static_assert(offsetof(TAVHdrStack, count) == sizeof(void*) + 4);
 
 static_assert(offsetof(KORTraceCB, enable) == 12);
 

@@ -126,7 +126,7 @@ TEST_P(MemoryMode, TheSourceOfARequestMayBeUnknown)
 TEST_P(MemoryMode, WhatStandsInThePointerOnEntryIsNotFollowed)
 {
   std::array<uint64_t, 8> local{};
-  const std::array<uintptr_t, 4> garbage = {1, UINTPTR_MAX, 0xDEADBEEFDEADBEEFu,
+  const std::array<uintptr_t, 4> garbage = {1, UINTPTR_MAX, static_cast<uintptr_t>(0xDEADBEEFDEADBEEFu),
                                             reinterpret_cast<uintptr_t>(&local[4])};
   for (const uintptr_t value : garbage)
   {
