@@ -12,6 +12,8 @@
 #     mutation     changes of the library that tests have to notice, one a minute of each group
 #     coverage     lines and branches that tests reach
 #     platforms    every room with libc++, on s390x, aarch64 and Windows
+#     firefox      the page's tests in Firefox
+#     page         files that are opened, gone through and closed in one page, for the time
 #     bench        every benchmark once, to see that it works
 #     reproduce    all artefacts built twice
 #     bare         the packages, the wheel, the page and the extension on a machine that has nothing; needs root
@@ -20,7 +22,7 @@
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")"
 
-all=(fuzz hostile crash kill properties meanwhile damages mutation coverage platforms bench reproduce bare)
+all=(fuzz hostile crash kill properties meanwhile damages mutation coverage platforms firefox page bench reproduce bare)
 usage() { sed -n '2,/^set /{/^set /d; s/^# \{0,1\}//; p}' "$0" >&2; exit 2; }
 [[ ${1:-} =~ ^[1-9][0-9]*$ ]] || usage
 minutes=$1
@@ -115,6 +117,18 @@ part_platforms()
 {
   ./test.sh --platforms | tee "$logs/platforms.list"
   tail -n 1 "$logs/platforms.list"
+}
+
+part_firefox()
+{
+  ./test.sh --face firefox | tee "$logs/firefox.list"
+  tail -n 1 "$logs/firefox.list"
+}
+
+part_page()
+{
+  web/build.sh
+  (cd web && node test/hour.mjs "$minutes")
 }
 
 part_bench()

@@ -3,8 +3,9 @@
 #   ./test.sh          with g++, optimised
 #   TAV_STAGES=REGEX   only the stages whose titles match
 #   ./test.sh --full   what CI runs: the checks of the sources, both compilers, the sanitizers, fuzzing, packages,
-#                      most of s390x and Windows
-#   ./test.sh --face NAME   one face: python (the package), sql (the extension for DuckDB), browser (the page, in Chromium)
+#                      most of s390x, Windows and WebAssembly
+#   ./test.sh --face NAME   one face: python (the package), sql (the extension for DuckDB), browser (the page, in Chromium),
+#                           firefox (the page, in Firefox)
 #   ./test.sh --platforms   all that is tested of libc++, s390x and aarch64 under qemu, Windows under wine
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")"
@@ -370,6 +371,21 @@ check_windows()
   check_platform windows bin .exe "$PWD/cmake/run-windows.sh" "$@"
 }
 
+# WebAssembly, under node: what the list beside the program says.
+check_wasm()
+{
+  local status=0 count
+  tests/system/platform/wasm.py --build >"$work/tests.log" 2>&1 || status=$?
+  count=$(sed -n 's/^\([0-9]*\) passed, [0-9]* faults$/\1/p' "$work/tests.log")
+  passed=$((passed + ${count:-0}))
+  tail -n 1 "$work/tests.log"
+  if ((status != 0)); then
+    failed=$((failed + 1))
+    tail -n 80 "$work/tests.log"
+    return 1
+  fi
+}
+
 platforms()
 {
   stage "libc++" check_libcxx "${rooms[@]}"
@@ -397,6 +413,7 @@ full()
   # What touches bytes, files or the system; CI has no time for more.
   stage "s390x, big-endian" check_s390x kor trace format storage core api golden host
   without_properties=1 stage "Windows" check_windows kor trace format storage core api golden host
+  stage "WebAssembly" check_wasm
   stage "address and undefined behaviour" check_sanitizers
   stage "fuzzing" fuzz/run.sh fixed
   stage "threads" check_thread
@@ -413,7 +430,7 @@ case ${1:-} in
     stage "g++" build_and_test release
     ;;
   --full)
-    stage "packages" cmake/install-packages.sh build test full platforms python sql browser site
+    stage "packages" cmake/install-packages.sh build test full platforms python sql browser wasm site
     # The same sources are compiled again and again, at every place where the project is checked out.
     export CMAKE_CXX_COMPILER_LAUNCHER=ccache CCACHE_BASEDIR=$PWD CCACHE_NOHASHDIR=1
     export CCACHE_SLOPPINESS=pch_defines,time_macros,include_file_mtime,include_file_ctime
@@ -433,8 +450,12 @@ case ${1:-} in
         stage "packages" cmake/install-packages.sh build test browser
         stage "browser" check_browser
         ;;
+      firefox)
+        stage "packages" cmake/install-packages.sh build test browser firefox
+        TAV_BROWSER=/usr/bin/firefox-esr stage "Firefox" check_browser
+        ;;
       *)
-        echo "usage: $0 --face python|sql|browser" >&2
+        echo "usage: $0 --face python|sql|browser|firefox" >&2
         exit 2
         ;;
     esac
@@ -444,7 +465,7 @@ case ${1:-} in
     platforms
     ;;
   *)
-    echo "usage: $0 [--full | --face python|sql|browser | --platforms]" >&2
+    echo "usage: $0 [--full | --face python|sql|browser|firefox | --platforms]" >&2
     exit 2
     ;;
 esac

@@ -1,25 +1,38 @@
 // A browser with the page, and what the tests do in it.
-import { mkdtempSync, readdirSync, readFileSync, rmSync, writeFileSync } from "node:fs";
+import { mkdirSync, mkdtempSync, readdirSync, readFileSync, rmSync, watch, writeFileSync } from "node:fs";
 import { tmpdir } from "node:os";
-import { join } from "node:path";
+import { basename, join } from "node:path";
 import { fileURLToPath, pathToFileURL } from "node:url";
 import puppeteer from "puppeteer-core";
 
 const PAGE = join(fileURLToPath(new URL(".", import.meta.url)), "../dist/tav.html");
 const BROWSER = process.env.TAV_BROWSER ?? "/usr/bin/chromium";
 
+/** Firefox is driven by WebDriver BiDi, which has no tracing, no look into workers and no colours to choose. */
+export const isFirefox = basename(BROWSER).startsWith("firefox");
+export const onlyInChromium = { skip: isFirefox && "WebDriver BiDi has nothing for it" };
+
 export const folder = mkdtempSync(join(tmpdir(), "tav-page-"));
+const downloads = join(folder, "downloads"); // of Firefox, which is told a folder at its start
 
 const PATIENCE = 600_000; // ends what hangs
 
 let browser;
 
 export async function start() {
+  mkdirSync(downloads, { recursive: true });
   browser = await puppeteer.launch({
+    browser: isFirefox ? "firefox" : "chrome",
     executablePath: BROWSER,
     timeout: PATIENCE,
     protocolTimeout: PATIENCE,
-    args: process.getuid() === 0 ? ["--no-sandbox"] : [],
+    args: process.getuid() === 0 && !isFirefox ? ["--no-sandbox"] : [],
+    extraPrefsFirefox: {
+      "browser.download.folderList": 2,
+      "browser.download.dir": downloads,
+      "browser.download.useDownloadDir": true,
+      "browser.helperApps.neverAsk.saveToDisk": "application/octet-stream,text/csv",
+    },
   });
 }
 
@@ -111,9 +124,25 @@ export async function longestTask(page, work) {
   return Math.max(...tasks.map(({ tdur }) => tdur ?? 0)) / 1000;
 }
 
-/** The file that a click saves. */
-export async function saved(page, selector) {
-  const target = mkdtempSync(join(folder, "saved-"));
+/** Waits until Firefox has saved a file: until then it is empty, or has a part beside it. */
+function savedByFirefox() {
+  const isWhole = () => {
+    const names = readdirSync(downloads);
+    return names.length === 1 && !names[0].endsWith(".part") && readFileSync(join(downloads, names[0])).length > 0;
+  };
+  return new Promise((resolve, reject) => {
+    const patience = setTimeout(() => reject(new Error("nothing was saved")), PATIENCE);
+    const look = watch(downloads, () => {
+      if (isWhole()) {
+        clearTimeout(patience);
+        look.close();
+        resolve("completed");
+      }
+    });
+  });
+}
+
+async function savedByChromium(target) {
   const session = await browser.target().createCDPSession();
   await session.send("Browser.setDownloadBehavior", { behavior: "allow", downloadPath: target, eventsEnabled: true });
   const ended = new Promise((resolve, reject) => {
@@ -125,12 +154,22 @@ export async function saved(page, selector) {
       }
     });
   });
+  return { ended: ended.finally(() => session.detach()) };
+}
+
+/** The file that a click saves. */
+export async function saved(page, selector) {
+  rmSync(downloads, { recursive: true });
+  mkdirSync(downloads);
+  const { ended } = isFirefox ? { ended: savedByFirefox() } : await savedByChromium(downloads);
   await page.$eval(selector, (element) => element.click());
   const state = await ended; // until then it has another name, or not all of its bytes
-  await session.detach();
-  const [name] = readdirSync(target);
+  const target = mkdtempSync(join(folder, "saved-"));
+  const [name] = readdirSync(downloads);
   if (state !== "completed" || name === undefined) {
     throw new Error(`saving: ${state}`);
   }
-  return { name, path: join(target, name), bytes: readFileSync(join(target, name)) };
+  const bytes = readFileSync(join(downloads, name));
+  writeFileSync(join(target, name), bytes);
+  return { name, path: join(target, name), bytes };
 }

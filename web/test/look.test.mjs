@@ -3,7 +3,7 @@ import assert from "node:assert/strict";
 import { after, before, test } from "node:test";
 import { readFileSync, truncateSync, utimesSync, writeFileSync } from "node:fs";
 import { createServer } from "node:http";
-import { click, end, find, made, node, open, rows, settled, start, textOf, visit } from "./browser.mjs";
+import { click, end, find, isFirefox, made, node, onlyInChromium, open, rows, settled, start, textOf, visit } from "./browser.mjs";
 import { HOST_NAME, SYSTEM, golden, goldenNames, group, hosts, many, text } from "./streams.mjs";
 
 before(start);
@@ -154,8 +154,11 @@ test("a file of 5 GB opens by few of its bytes, in little memory", async () => {
   await open(page, path);
   const took = performance.now() - begun;
   assert.equal((await rows(page))[0].name, "system");
-  const taken = await page.workers().at(-1).evaluate(() => globalThis.taken);
-  assert.ok(taken > 0 && taken <= 64 * 1024 ** 2, `${taken} bytes were read`);
+  let taken = 0;
+  if (!isFirefox) { // where no test can look into a worker
+    taken = await page.workers().at(-1).evaluate(() => globalThis.taken);
+    assert.ok(taken > 0 && taken <= 64 * 1024 ** 2, `${taken} bytes were read`);
+  }
   const memory = await page.evaluate(() => globalThis.tavPage.engine.memory());
   assert.ok(memory <= 64 * 1024 ** 2, `${memory} bytes`);
   console.log(`5 GB: opened in ${took.toFixed(0)} ms by ${taken} bytes, module memory ${memory} bytes`);
@@ -177,11 +180,18 @@ test("a file that was changed since it was opened is said to be", async () => {
 test("the page asks for nothing but itself", async () => {
   const page = await visit();
   await open(page, made("quiet.tav", hosts("ada")));
-  const outside = page.requests.filter((address) => !/^(blob:|data:)/.test(address));
-  assert.equal(outside.length, 1, outside.join());
-  const refused = await page.evaluate(() => fetch("http://127.0.0.1:9/").then(() => "connected", (error) => String(error)));
-  assert.match(refused, /TypeError/);
-  assert.match(page.errors.join(), /Content Security Policy/);
+  const outside = page.requests.filter((address) => !/^(blob:|data:)/.test(address) && address !== page.url());
+  assert.deepEqual(outside, []);
+  assert.ok(isFirefox || page.requests.includes(page.url()), "requests are seen"); // Firefox tells of none from a disk
+  const refused = await page.evaluate(async () => {
+    const told = new Promise((resolve) => addEventListener("securitypolicyviolation",
+      ({ effectiveDirective, blockedURI }) => resolve({ effectiveDirective, blockedURI })));
+    const error = await fetch("http://127.0.0.1:9/").then(() => "connected", String);
+    return { error, ...await told };
+  });
+  assert.match(refused.error, /TypeError/);
+  assert.equal(refused.effectiveDirective, "connect-src");
+  assert.equal(refused.blockedURI, "http://127.0.0.1:9/");
   await page.close();
 });
 
@@ -200,10 +210,15 @@ test("a link to a path of a served page leads there", async () => {
   server.close();
 });
 
-test("on a telephone nothing is cut off, and colours follow the system", async () => {
+test("on a telephone nothing is cut off", async () => {
   const page = await visit({ width: 375, height: 667 });
   await open(page, made("phone.tav", hosts("ada")));
   assert.ok(await page.evaluate(() => document.documentElement.scrollWidth <= innerWidth));
+  await page.close();
+});
+
+test("colours follow the system", onlyInChromium, async () => {
+  const page = await visit();
   const colour = () => page.evaluate(() => getComputedStyle(document.body).backgroundColor);
   await page.emulateMediaFeatures([{ name: "prefers-color-scheme", value: "light" }]);
   const light = await colour();
