@@ -37,6 +37,7 @@ export class Bytes {
 
   /** Scrolls to where it stands; again when there is more or less room. */
   show() {
+    this.element.setAttribute("aria-activedescendant", `byte-${this.#cursor}`); // what screen readers say
     this.view.show(Math.floor(this.#cursor / WIDE));
   }
 
@@ -69,7 +70,7 @@ export class Bytes {
       const { from: start, payload, end } = this.#marked;
       const part = offset < start || offset >= end ? "" : offset < payload ? " header" : " payload";
       element.append(h("span", {
-        class: `byte${part}`, role: "gridcell", "data-offset": offset,
+        class: `byte${part}`, role: "gridcell", id: `byte-${offset}`, "data-offset": offset,
         "aria-selected": offset === this.#cursor, onclick: () => this.#choose(offset),
       }, value === undefined ? "··" : value.toString(16).padStart(2, "0")));
       text += value >= 0x20 && value < 0x7f ? String.fromCharCode(value) : "·";
@@ -80,7 +81,7 @@ export class Bytes {
 
   #choose(offset) {
     this.#cursor = offset;
-    this.view.show(Math.floor(offset / WIDE));
+    this.show();
     this.onByte(offset);
   }
 
@@ -92,7 +93,7 @@ export class Bytes {
     if (event.key in steps) {
       const last = Math.max(0, (this.#file?.size ?? 0) - 1);
       this.#cursor = Math.max(0, Math.min(last, this.#cursor + steps[event.key]));
-      this.view.show(Math.floor(this.#cursor / WIDE));
+      this.show();
     } else if (event.key === "Enter") {
       this.#choose(this.#cursor);
     } else {

@@ -58,11 +58,16 @@ const lists = new Map(); // id -> {view, places}
 /** A list whose items lead to places. Those in view are elements. */
 class Places {
   #items = [];
+  #current; // the item that has the keys, once a key has led to one
 
   constructor(id) {
+    this.id = id;
     if (!lists.has(id)) {
       const list = {};
-      list.view = new Rows(byId(id), { height: 24, count: () => list.places.count, make: (i) => list.places.make(i) });
+      list.view = new Rows(byId(id), {
+        height: 24, count: () => list.places.count, make: (i) => list.places.make(i), drawn: () => list.places.focus(),
+      });
+      byId(id).addEventListener("keydown", (event) => list.places.key(event));
       lists.set(id, list);
     }
     this.list = lists.get(id);
@@ -72,6 +77,34 @@ class Places {
 
   get count() {
     return this.#items.length;
+  }
+
+  /** Where the keys are: an item keeps them when it is made anew. */
+  #index() {
+    const { activeElement } = document;
+    const item = activeElement?.closest?.("[role=listitem]");
+    return item && byId(this.id).contains(item) ? Number(item.getAttribute("aria-posinset")) - 1 : this.#current;
+  }
+
+  focus() {
+    if (this.#current !== undefined) {
+      byId(this.id).querySelector(`[aria-posinset="${this.#current + 1}"] button`)?.focus({ preventScroll: true });
+    }
+  }
+
+  key(event) {
+    const last = this.count - 1;
+    const { inView } = this.list.view;
+    const index = this.#index();
+    const next = {
+      ArrowDown: (index ?? -1) + 1, ArrowUp: (index ?? 1) - 1, PageDown: (index ?? 0) + inView, PageUp: (index ?? 0) - inView,
+      Home: 0, End: last,
+    }[event.key];
+    if (next !== undefined && last >= 0) {
+      event.preventDefault();
+      this.#current = Math.max(0, Math.min(last, next));
+      this.list.view.show(this.#current);
+    }
   }
 
   add(offset, ...texts) {

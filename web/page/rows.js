@@ -2,18 +2,20 @@
 const MOST_PIXELS = 8_000_000; // browsers lay out no more than some ten million
 
 /**
- * A list in `element`, which scrolls. `count()` says how many rows there are, `make(index)` makes the element of one.
+ * A list in `element`, which scrolls. `count()` says how many rows there are, `make(index)` makes the element of one,
+ * `drawn()` is called when those in view are there anew.
  * Where all rows are higher than a browser lays out, scrolling goes by shares of the whole.
  */
 export class Rows {
   #spacer = document.createElement("div");
   #view = document.createElement("div");
 
-  constructor(element, { height, count, make }) {
+  constructor(element, { height, count, make, drawn }) {
     this.element = element;
     this.height = height;
     this.count = count;
     this.make = make;
+    this.drawn = drawn;
     this.#spacer.className = "spacer";
     this.#view.className = "view";
     this.#spacer.setAttribute("role", "presentation");
@@ -85,5 +87,6 @@ export class Rows {
     const top = isShort ? first * this.height : Math.min(this.element.scrollTop, this.#pixels() - made.length * this.height);
     this.#view.style.transform = `translateY(${Math.max(0, top)}px)`;
     this.#view.replaceChildren(...made);
+    this.drawn?.();
   }
 }

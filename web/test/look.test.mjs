@@ -122,6 +122,40 @@ test("everything in the tree is reached by keys, and said to screen readers", as
   await page.close();
 });
 
+test("places in a list are reached by keys, those out of view, too", async () => {
+  const page = await visit();
+  await open(page, made("places.tav", many(3000)));
+  await find(page, "text", "cpuOnline");
+  await page.focus("#found");
+  await page.keyboard.press("End");
+  await page.waitForFunction(() => document.activeElement.closest("[role=listitem]")?.getAttribute("aria-posinset") === "3000");
+  await page.keyboard.press("ArrowUp");
+  await page.waitForFunction(() => document.activeElement.closest("[role=listitem]")?.getAttribute("aria-posinset") === "2999");
+  await page.keyboard.press("Enter");
+  await page.waitForFunction(() => document.querySelector("#node dd").textContent === "/system/cpuOnline[2999]");
+  await page.keyboard.press("Home");
+  await page.waitForFunction(() => document.activeElement.closest("[role=listitem]")?.getAttribute("aria-posinset") === "1");
+  await page.close();
+});
+
+test("keys go through the bytes, and screen readers are told which", async () => {
+  const page = await visit();
+  await open(page, made("bytes.tav", hosts("ada")));
+  await page.focus("#bytes");
+  await page.waitForFunction(() => document.querySelector("#bytes .byte")?.textContent !== "··");
+  for (const [key, offset] of [["ArrowDown", "16"], ["ArrowRight", "17"], ["ArrowLeft", "16"]]) {
+    await page.keyboard.press(key);
+    const active = await page.$eval("#bytes", (grid) => {
+      const cell = document.getElementById(grid.getAttribute("aria-activedescendant"));
+      return { offset: cell.dataset.offset, role: cell.getAttribute("role"), selected: cell.getAttribute("aria-selected") };
+    });
+    assert.deepEqual(active, { offset, role: "gridcell", selected: "true" });
+  }
+  await page.keyboard.press("Enter");
+  await page.waitForFunction(() => document.querySelector("#node dd").textContent === "/system/host");
+  await page.close();
+});
+
 test("a million siblings scroll", async () => {
   const page = await visit();
   await open(page, made("million.tav", many(1_000_000)));
