@@ -73,14 +73,15 @@ TEST(SideStorage, GivesItsStatus)
   EXPECT_EQ(storage.getStatus(), 0x90000031U);
 }
 
-/// Where a virtual operation is in the table, for platforms whose member pointers tell.
+/// Where a virtual operation is in the table: its member pointer begins with the slot's offset, which some platforms
+/// mark by adding 1.
 template<class Operation>
 uint64_t slotOf(Operation operation)
 {
-  std::array<uint64_t, 2> words{};
+  std::array<uintptr_t, 2> words{};
   static_assert(sizeof operation == sizeof words);
   std::memcpy(words.data(), &operation, sizeof words);
-  return (words[0] - 1) / 8;
+  return words[0] / sizeof(uintptr_t);
 }
 
 TEST(SideStorage, ItsOperationsStandInTheirSlots)
