@@ -141,6 +141,25 @@ TEST(DiffPairs, DamagedBytesAreComparedAsBytes)
   EXPECT_THAT(lines[0], testing::HasSubstr(" ... -> 5b5b"));
 }
 
+TEST(DiffPairs, OtherTypesAndInfoOfANodeAreDifferences)
+{
+  const auto sentences = [](const std::string& before, const std::string& after) {
+    const Bytes a = bytesOfJson(R"([{"element": "system", "children": [{"id": 1, )" + before + "}]}]");
+    const Bytes b = bytesOfJson(R"([{"element": "system", "children": [{"id": 1, )" + after + "}]}]");
+    ByteSource first("a", std::span<const uint8_t>(a));
+    ByteSource second("b", std::span<const uint8_t>(b));
+    std::vector<std::string> list;
+    diff({first, {}, {}}, {second, {}, {}}, {}, [&](const Difference& one) { list.push_back(one.sentence); });
+    return list;
+  };
+  EXPECT_THAT(sentences(R"("type": "Uint32", "value": 7)", R"("type": "Sint32", "value": 7)"),
+              ElementsAre("Uint32  7 -> Sint32  7"));
+  EXPECT_THAT(sentences(R"("type": "Uint32", "info": 256, "value": 7)", R"("type": "Uint32", "info": 0, "value": 8)"),
+              ElementsAre("info  0x100 -> 0x0", "Uint32  7 -> 8"));
+  EXPECT_THAT(sentences(R"("type": "Uint32", "info": 256, "value": 7)", R"("type": "Uint32", "info": 256, "value": 7)"),
+              ElementsAre());
+}
+
 TEST(DiffPairs, ALongTextIsShownWithItsFirstBytes)
 {
   const Bytes a = systemOf(R"("hostName": ")" + std::string(100, 'a') + '"');

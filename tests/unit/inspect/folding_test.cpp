@@ -4,6 +4,7 @@
 #include <gmock/gmock.h>
 
 #include "inspect/streams.h"
+#include "support/byteRows.h"
 
 using namespace tav::inspect;
 using test::Bytes;
@@ -81,4 +82,38 @@ TEST(Folds, LeavesNothingOutThatItDoesNotTellOf)
       EXPECT_TRUE(line.find('@') != std::string::npos || std::find(whole.begin(), whole.end(), line) != whole.end());
     }
   }
+}
+
+TEST(Folds, HideNoDamageAndBeginAnewBehindIt)
+{
+  test::ByteRows rows;
+  const auto add = [&](size_t count) {
+    for (size_t i = 0; i < count; ++i)
+    {
+      rows.h64(4, 0, TAV_TYPE_UINT32, TAV_ELM_CMN_CPU_ONLINE).number(8, 4);
+    }
+  };
+  rows.h64(4 * 20 + 100 + 3 * 20, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+  add(4);
+  rows.fill(100, 0xFF);
+  add(3);
+  ByteSource source("x", std::span<const uint8_t>(rows.bytes));
+  Walker walker(source, {});
+  std::vector<std::string> lines;
+  Folding folding([&](const Folded& run) { lines.push_back(std::to_string(run.count) + " hidden"); }, 1);
+  for (Event event; walker.next(event);)
+  {
+    const bool shown = folding.shows(event);
+    if (event.what == What::damaged)
+    {
+      EXPECT_TRUE(shown);
+      lines.emplace_back("damaged");
+    }
+    else if (shown && event.what == What::nodeBegin)
+    {
+      lines.push_back(elementText(event.node.elm()));
+    }
+  }
+  folding.finish();
+  EXPECT_THAT(lines, testing::ElementsAre("system", "cpuOnline", "3 hidden", "damaged", "cpuOnline", "2 hidden"));
 }
