@@ -11,6 +11,7 @@
 #include "cpp/layer.h"
 #include "inspect/document/follower.h"
 #include "inspect/streams.h"
+#include "support/byteRows.h"
 
 using namespace tav::inspect;
 using test::Bytes;

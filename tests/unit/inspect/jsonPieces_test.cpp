@@ -1,6 +1,7 @@
 /// Values and damaged bytes that documents hold in pieces, and the ways in which a document may write them.
 #include <algorithm>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include <gmock/gmock.h>
@@ -161,6 +162,32 @@ TEST_P(JsonPieces, OfDatesMayLackDigits)
     EXPECT_THROW(bytesOf(R"({"id": 1, "type": "UTC Timestamp", "value": ")" + std::string(date) + R"("})"), Error)
         << date;
   }
+}
+
+TEST_P(JsonPieces, WithoutATypeGetOneByTheirKind)
+{
+  const std::vector<std::pair<const char*, const char*>> cases{
+      {R"("value": [1, 2])", R"("type": "Uint64 array", "value": [1, 2])"},
+      {R"("value": {"seconds": 1709202600, "fractionA": 123, "fractionB": 456, "offsetMinutes": 60})",
+       R"("type": "UTC Timestamp", "value": "2024-02-29T11:30:00.123456+01:00")"},
+      {R"("bytes": "00ff")", R"("type": "Binary", "bytes": "00ff")"},
+      {R"("value": -2147483649)", R"("type": "Sint64", "value": -2147483649)"},
+      {R"("value": -2147483648)", R"("type": "Sint32", "value": -2147483648)"},
+  };
+  for (const auto& [without, with] : cases)
+  {
+    EXPECT_EQ(bytesOf(R"({"id": 1, )" + std::string(without) + "}"), bytesOf(R"({"id": 1, )" + std::string(with) + "}"))
+        << without;
+  }
+}
+
+TEST_P(JsonPieces, AreToldOfByTheirOffsets)
+{
+  const Bytes bytes = bytesOf(R"({"id": 1, "type": "Uint32", "value": 7}, {"id": 2, "type": "Uint32", "value": 7})");
+  std::vector<uint64_t> offsets;
+  jsonOf(bytes, form, {.progress = [&](uint64_t offset) { offsets.push_back(offset); }});
+  EXPECT_TRUE(std::is_sorted(offsets.begin(), offsets.end()));
+  EXPECT_THAT(offsets, testing::IsSupersetOf({0U, 16U, 36U}));
 }
 
 TEST(Json, CutsNoCharacterOfATextInTwo)

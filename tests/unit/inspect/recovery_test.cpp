@@ -137,6 +137,22 @@ TEST_P(Recovering, NodesThatHaveLostAllGroupsGetOne)
   EXPECT_EQ(back.totals.lost, 23U);
 }
 
+TEST_P(Recovering, ARootThatLosesAllStaysOpenForWhatFollows)
+{
+  rows.h64(23, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM).fill(23, 0x5A);
+  rows.h64(20, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_HOST);
+  number();
+  // A root of size 0 would read as one that was never closed, so that it gets what comes behind it.
+  ByteRows expected(GetParam());
+  expected.h64(36, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM).h64(20, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_HOST);
+  expected.h64(4, 0, TAV_TYPE_UINT32, TAV_ELM_CMN_CPU_ONLINE).number(9, 4);
+  const Recovered back(rows.bytes, form);
+  EXPECT_EQ(back.stream, expected.bytes);
+  EXPECT_EQ(back.totals.lost, 23U);
+  EXPECT_EQ(back.totals.nodes, 3U);
+  EXPECT_EQ(back.totals.closed, 1U);
+}
+
 TEST_P(Recovering, ADamagedPairIsMadeAnew)
 {
   rows.h64(72, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);

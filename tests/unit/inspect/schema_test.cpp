@@ -1,3 +1,4 @@
+#include <algorithm>
 #include <map>
 #include <string>
 #include <vector>
@@ -74,6 +75,56 @@ TEST_P(SchemaOfAForm, CountsThePathsOfSeveralStreams)
   }
   EXPECT_EQ(found, expected);
   EXPECT_EQ(schema.paths(), expected.size());
+}
+
+TEST(Schema, ShowsEveryEventToWhoeverWantsToSeeIt)
+{
+  const Bytes bytes = test::namedStream(7);
+  ByteSource source("x", std::span<const uint8_t>(bytes));
+  Walker walker(source, {});
+  uint64_t events = 0;
+  for (Event event; walker.next(event);)
+  {
+    ++events;
+  }
+  uint64_t seen = 0;
+  Schema schema;
+  schema.add(source, {}, [&](const Walker&, const Event&) { ++seen; });
+  EXPECT_EQ(seen, events);
+}
+
+TEST(Schema, ShortensPathsOfManySteps)
+{
+  tav::Writer writer;
+  {
+    std::vector<tav::Group> groups;
+    groups.push_back(writer.group(TAV_ELM_CMN_SYSTEM));
+    for (int i = 0; i < 40; ++i)
+    {
+      groups.push_back(groups.back().group(TAV_ELM_CMN_HOST));
+    }
+    groups.back().add(TAV_ELM_CMN_CPU_ONLINE, uint32_t{1});
+    while (!groups.empty())
+    {
+      groups.pop_back(); // the innermost is closed first
+    }
+  }
+  writer.finish();
+  const auto view = writer.bytes();
+  const auto* const first = reinterpret_cast<const uint8_t*>(view.data());
+  Schema schema;
+  add(schema, {first, first + view.size()}, {});
+  const std::string whole = entriesOf(schema).back().path;
+  EXPECT_EQ(std::count(whole.begin(), whole.end(), '/'), 42);
+  const std::string brief = entriesOf(schema, PathStyle::brief).back().path;
+  EXPECT_THAT(brief, testing::StartsWith("/system/host/"));
+  EXPECT_THAT(brief, testing::HasSubstr("/\xE2\x80\xA6/"));
+  EXPECT_THAT(brief, testing::EndsWith("/host/cpuOnline"));
+  EXPECT_LT(std::count(brief.begin(), brief.end(), '/'), 42);
+  std::string last;
+  const auto keep = [&](const SchemaEntry& entry) { last = entry.path; };
+  schema.each(PathStyle::whole, keep, 10);
+  EXPECT_EQ(last, "/**/cpuOnline");
 }
 
 TEST(SchemaOfValues, MixesNumbersOfAllWidths)
