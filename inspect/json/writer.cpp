@@ -1,6 +1,7 @@
 #include "tav/inspect/jsonWriter.hpp"
 
 #include <algorithm>
+#include <array>
 #include <utility>
 
 #include "inspect/text/bytes.h"
@@ -20,6 +21,13 @@ namespace
 constexpr size_t kMaxIndent = 32;               ///< levels, so that deep nests do not become mostly blanks
 constexpr uint64_t kMaxSteps = 64;              ///< deeper nodes are named by their offset, so that a line stays a line
 constexpr size_t kMostText = size_t{16} * 1024; ///< that is kept before it is handed over
+
+/// Makes the path of a node out of that of another one in the same group.
+void replaceLastStep(std::string& path, const Node& node, const Dictionary& dictionary)
+{
+  path.resize(path.rfind('/')); // no element's name has one
+  appendStep(path, node, dictionary);
+}
 
 } // namespace
 
@@ -85,16 +93,23 @@ void JsonWriter::end()
   flush();
 }
 
+/// In one piece: this is called some ten times a node. Names are short.
 void JsonWriter::key(std::string_view name)
 {
+  constexpr size_t around = 6; // , "": and blanks
+  std::array<char, 64> piece{};
   const bool compact = style_ == JsonStyle::compact;
+  name = name.substr(0, piece.size() - around);
+  char* at = piece.data();
+  const auto put = [&](std::string_view text) { at = std::copy_n(text.data(), text.size(), at); };
   if (!std::exchange(firstKey_, false))
   {
-    text_ += compact ? "," : ", ";
+    compact ? put(",") : put(", ");
   }
-  text_ += '"';
-  text_ += name;
-  text_ += compact ? "\":" : "\": ";
+  put("\"");
+  put(name);
+  compact ? put("\":") : put("\": ");
+  text_.append(piece.data(), at);
 }
 
 void JsonWriter::putNumber(std::string_view name, uint64_t value)
@@ -201,17 +216,26 @@ void JsonWriter::take(const Walker& walker, const Event& event)
   switch (event.what)
   {
   case What::nodeBegin:
+  {
+    const bool behindSibling = hasData_; // with its path
     finishData();
-    if (event.node.isGroup())
+    if (behindSibling && style_ == JsonStyle::lines && event.depth <= kMaxSteps)
+    {
+      replaceLastStep(path_, event.node, source_.dictionary());
+    }
+    else
     {
       setPath(walker, event);
+    }
+    if (event.node.isGroup())
+    {
       beginGroup(event.node);
       return;
     }
-    setPath(walker, event);
     data_ = {.node = event.node};
     hasData_ = true;
     return;
+  }
   case What::payload: return; // read when the node is written
   case What::extra: data_.extra = {event.offset, event.length}; return;
   case What::padding: data_.padding = {event.offset, event.length}; return;
