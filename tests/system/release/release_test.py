@@ -5,11 +5,13 @@ import email.utils
 import json
 import os
 import pathlib
+import re
 import shutil
 import subprocess
 import sys
 import tempfile
 import unittest
+import zipfile
 
 ROOT = pathlib.Path(__file__).resolve().parents[3]
 RECORDED = "tests/system/abi/released"
@@ -160,6 +162,27 @@ class Contents(unittest.TestCase):
         for part in parts:
             self.assertEqual(len({"version", "package"} & set(part)), 1, part)
             self.assertTrue(part["name"] and part["licence"], part)
+
+    def test_every_artefact_that_holds_parts_of_others_has_them_told(self):
+        patterns = json.loads((ROOT / "packaging" / "bundled.json").read_text())
+        for name in ("tav-1.2.3-cp311-cp311-linux_x86_64.whl", "tav-tools_1.2.3-1_amd64.deb", "tav.html",
+                     "tav-site-1.2.3.tar.gz", "tav.duckdb_extension"):
+            with self.subTest(name=name):
+                self.assertTrue([pattern for pattern in patterns if re.fullmatch(pattern, name)])
+
+    @unittest.skipUnless(shutil.which("dpkg-query") and run("/", "dpkg-query", "-W", "libstdc++-12-dev").returncode == 0,
+                         "the library that is in the wheel is not of a package here")
+    def test_a_wheel_is_told_with_what_it_asks_for_and_what_is_in_it(self):
+        with tempfile.TemporaryDirectory() as name:
+            wheel = pathlib.Path(name) / "tav-1.2.3-cp311-cp311-linux_x86_64.whl"
+            with zipfile.ZipFile(wheel, "w") as archive:
+                archive.writestr("tav-1.2.3.dist-info/METADATA", "Name: tav\nRequires-Dist: numpy (>=1.20)\n")
+            found = subprocess.run([ROOT / "packaging" / "sbom.py", "1.2.3", name], capture_output=True, text=True)
+            self.assertEqual(found.returncode, 0, found.stderr)
+            told = json.loads(wheel.with_name(wheel.name + ".spdx.json").read_text())
+        self.assertEqual({(relation["relationshipType"], relation["relatedSpdxElement"]) for relation in told["relationships"]},
+                         {("DESCRIBES", "SPDXRef-artefact"), ("DEPENDS_ON", "SPDXRef-needs-numpy"),
+                          ("CONTAINS", "SPDXRef-in-libstdc---and-libgcc")})
 
     def test_nothing_to_tell_of_is_a_failure(self):
         with tempfile.TemporaryDirectory() as name:
