@@ -18,6 +18,7 @@
 #include "tav/inspect/documentOptions.hpp"
 #include "tav/inspect/edit.hpp"
 #include "tav/inspect/fileKind.hpp"
+#include "tav/inspect/find.hpp"
 #include "tav/inspect/folding.hpp"
 #include "tav/inspect/follow.hpp"
 #include "tav/inspect/form.hpp"

@@ -96,7 +96,7 @@ void DictionaryReader::refuse() const
 {
   fail(tokenStart(), depth_ == 0   ? "a dictionary is an object: {\"40001\": {\"tag\": \"queueDepth\"}}"
                      : depth_ == 1 ? "an element is an object: {\"tag\": \"queueDepth\"}"
-                                   : quoted(key_) + " is a text");
+                                   : inspect::quoted(key_) + " is a text");
 }
 
 void DictionaryReader::startObject()
@@ -122,11 +122,11 @@ void DictionaryReader::key(std::string_view name)
     static constexpr std::array<std::string_view, 4> known = {"tag", "kind", "unit", "text"};
     if (std::find(known.begin(), known.end(), name) == known.end())
     {
-      fail(at, "the key " + quoted(name) + " is not known; there are tag, kind, unit and text");
+      fail(at, "the key " + inspect::quoted(name) + " is not known; there are tag, kind, unit and text");
     }
     if (std::find(seen_.begin(), seen_.end(), name) != seen_.end())
     {
-      fail(at, "the key " + quoted(name) + " is given twice");
+      fail(at, "the key " + inspect::quoted(name) + " is given twice");
     }
     seen_.emplace_back(name);
     key_ = name;
@@ -142,7 +142,7 @@ void DictionaryReader::startElement(std::string_view id)
   const auto [stop, error] = std::from_chars(id.data(), end, element_.id);
   if (error != std::errc() || stop != end || std::to_string(element_.id) != id)
   {
-    fail(elementAt_, quoted(id) + " is no id; they are numbers from 0 to 65535");
+    fail(elementAt_, inspect::quoted(id) + " is no id; they are numbers from 0 to 65535");
   }
   element_.place = nextPlace(elementAt_);
   if (dictionary::detail::placeOf(element_.id) < dictionary::entries().size())
@@ -150,7 +150,7 @@ void DictionaryReader::startElement(std::string_view id)
     const dictionary::Entry& entry = dictionary::entries()[dictionary::detail::placeOf(element_.id)];
     fail(elementAt_, "the id " + std::string(id) +
                          (detail::paths::isElement(entry)
-                              ? " is that of " + quoted(detail::paths::withoutBlanks(entry.tag)) + " in"
+                              ? " is that of " + inspect::quoted(detail::paths::withoutBlanks(entry.tag)) + " in"
                               : " lies among those of") +
                          " the built-in dictionary");
   }
@@ -192,7 +192,7 @@ void DictionaryReader::setKind(std::string_view name)
       return;
     }
   }
-  fail(tokenStart(), quoted(name) + " is no kind; there are gauge, counter and text");
+  fail(tokenStart(), inspect::quoted(name) + " is no kind; there are gauge, counter and text");
 }
 
 void DictionaryReader::endObject()
@@ -214,21 +214,22 @@ void DictionaryReader::endElement()
   }
   if (!isTag(tag))
   {
-    fail(tagAt_, quoted(tag) + " is no tag; a letter or _ and then letters, digits, _, - and . are, at most " +
+    fail(tagAt_, inspect::quoted(tag) + " is no tag; a letter or _ and then letters, digits, _, - and . are, at most " +
                      std::to_string(kLongestTag));
   }
   if (std::find(kTaken.begin(), kTaken.end(), tag) != kTaken.end())
   {
-    fail(tagAt_, quoted(tag) + " has another meaning in XML");
+    fail(tagAt_, inspect::quoted(tag) + " has another meaning in XML");
   }
   if (const std::vector<uint16_t> ids = idsOf(tag); !ids.empty())
   {
     fail(tagAt_,
-         "the tag " + quoted(tag) + " is that of " + std::to_string(ids.front()) + " in the built-in dictionary");
+         "the tag " + inspect::quoted(tag) + " is that of " + std::to_string(ids.front()) +
+             " in the built-in dictionary");
   }
   if (const auto [before, isNew] = tags_.emplace(tag, element_.place); !isNew)
   {
-    fail(tagAt_, "the tag " + quoted(tag) + " is given twice, first at " + before->second);
+    fail(tagAt_, "the tag " + inspect::quoted(tag) + " is given twice, first at " + before->second);
   }
   elements_.push_back(std::move(element_));
 }

@@ -5,6 +5,7 @@
 #include <atomic>
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <utility>
 #include <vector>
@@ -19,6 +20,11 @@ namespace tav::inspect
 /// The parts for `threads`; none where one thread does it as well. `partBytes`: how long a part is; 0: by the size of
 /// the file, of which a small one is not cut.
 std::vector<Part> partsFor(ByteSource& source, const Form& form, unsigned threads, uint64_t partBytes);
+
+/// The parts, each of which begins where the outermost group around it does that is to stay whole; none where that
+/// leaves one.
+std::vector<Part> withWhole(const ByteSource& source, std::vector<Part> parts,
+                            const std::function<bool(const PartGroup&)>& isWhole);
 
 /// Whether a walk stands where a part begins.
 bool standsAt(const Walker& walk, const Part& part);
@@ -39,6 +45,10 @@ bool standsAt(const Walker& walk, const Part& part);
 ///   std::unique_ptr<Walk> goOnFrom(source, state)      the others by the caller's
 ///   void take(Walk&)                                   what was found in it comes next
 ///   void reached(uint64_t offset)
+/// and, where it asks for more,
+///   bool mayFollow(source, const Walker::State& sure)  told before it takes a part that begins at a sure place, with
+///                                                      bytes of the caller's thread; false: walk through it once more
+///   bool isDone()                                      nothing more is asked for
 template<class Job>
 class PartChain
 {
@@ -56,10 +66,10 @@ public:
     PartRun run(source_, parts_.size(), threads, [this](const std::atomic<bool>& stop, ByteSource& source, size_t i) {
       tries_[i] = tryPart(stop, source, i);
     });
-    for (size_t i = 0; i < parts_.size();)
+    for (size_t i = 0; i < parts_.size() && !isDone();)
     {
       const Try one = run.await(i) ? std::exchange(tries_[i], Try{}) : Try{};
-      const bool joined = one.walk != nullptr && join(sure, one);
+      const bool joined = one.walk != nullptr && mayFollow(run.source(), sure) && join(sure, one);
       i = joined && one.seam ? i + 1 : goOn(run.source(), sure, i);
       job_.reached(i < parts_.size() ? parts_[i].offset : source_.size());
       run.passTo(i);
@@ -73,6 +83,30 @@ private:
     Walker::State end{};
     bool seam = false; ///< the next part begins there
   };
+
+  bool isDone() const
+  {
+    if constexpr (requires(const Job& job) { job.isDone(); })
+    {
+      return job_.isDone();
+    }
+    else
+    {
+      return false;
+    }
+  }
+
+  bool mayFollow(ByteSource& source, const Walker::State& sure)
+  {
+    if constexpr (requires(Job & job) { job.mayFollow(source, sure); })
+    {
+      return job_.mayFollow(source, sure);
+    }
+    else
+    {
+      return true;
+    }
+  }
 
   Try tryPart(const std::atomic<bool>& stop, ByteSource& source, size_t i)
   {

@@ -77,6 +77,7 @@ Twins::Twins(ByteSource& source, unsigned count)
                        ? std::make_unique<ByteSource>(source.name(), source.view(0))
                        : std::make_unique<ByteSource>(
                              source.name(), std::make_unique<SharedStorage>(source.storage(), turns_), ring));
+    all_.back()->setDictionary(source.dictionary());
   }
 }
 

@@ -42,6 +42,44 @@ std::vector<Part> partsFor(ByteSource& source, const Form& form, unsigned thread
   return parts.size() < 2 ? std::vector<Part>{} : parts;
 }
 
+namespace
+{
+
+Part atWholeGroup(Part part, const std::function<bool(const PartGroup&)>& isWhole)
+{
+  const auto group = std::find_if(part.around.begin(), part.around.end(), isWhole);
+  if (group != part.around.end())
+  {
+    part.offset = group->offset;
+    part.wide = group == part.around.begin() ? group->wide : part.wide;
+    part.afterDamage = false;
+    part.firstChild.reset();
+    part.around.erase(group, part.around.end());
+  }
+  return part;
+}
+
+} // namespace
+
+std::vector<Part> withWhole(const ByteSource& source, std::vector<Part> parts,
+                            const std::function<bool(const PartGroup&)>& isWhole)
+{
+  std::vector<Part> whole;
+  for (Part& planned : parts)
+  {
+    Part part = atWholeGroup(std::move(planned), isWhole);
+    if (whole.empty() || part.offset > whole.back().offset)
+    {
+      whole.push_back(std::move(part));
+    }
+  }
+  for (size_t i = 0; i < whole.size(); ++i)
+  {
+    whole[i].size = (i + 1 < whole.size() ? whole[i + 1].offset : source.size()) - whole[i].offset;
+  }
+  return whole.size() < 2 ? std::vector<Part>{} : whole;
+}
+
 bool standsAt(const Walker& walk, const Part& part)
 {
   return walk.place() == part.offset && walk.depth() == part.around.size() &&

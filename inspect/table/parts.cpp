@@ -24,25 +24,6 @@ bool isCutInside(const CompiledQuery& query)
          });
 }
 
-/// The part that begins where the outermost group around this one does that is read at once, or, if roots are to stay
-/// whole, where the root does.
-Part atWholeGroup(Part part, bool inside, uint64_t mostAtOnce)
-{
-  const auto isWhole = [=](const PartGroup& group) {
-    return !inside || ((group.flags & (kOpen | kOverrun)) == 0 && group.end - group.offset <= mostAtOnce);
-  };
-  const auto group = std::find_if(part.around.begin(), part.around.end(), isWhole);
-  if (group != part.around.end())
-  {
-    part.offset = group->offset;
-    part.wide = group == part.around.begin() ? group->wide : part.wide;
-    part.afterDamage = false;
-    part.firstChild.reset();
-    part.around.erase(group, part.around.end());
-  }
-  return part;
-}
-
 /// Puts together what threads have read. The rows of a part begin with those of groups around its place: what was found
 /// for them goes into the rows of the part in which they began.
 class TableJob
@@ -204,20 +185,9 @@ std::vector<Part> tableParts(ByteSource& source, const Form& form, const TableQu
   {
     return {};
   }
-  std::vector<Part> parts;
-  for (Part& planned : partsFor(source, form, options.threads, options.partBytes))
-  {
-    Part part = atWholeGroup(std::move(planned), inside, mostAtOnce(options));
-    if (parts.empty() || part.offset > parts.back().offset)
-    {
-      parts.push_back(std::move(part));
-    }
-  }
-  for (size_t i = 0; i < parts.size(); ++i)
-  {
-    parts[i].size = (i + 1 < parts.size() ? parts[i + 1].offset : source.size()) - parts[i].offset;
-  }
-  return parts.size() < 2 ? std::vector<Part>{} : parts;
+  return withWhole(source, partsFor(source, form, options.threads, options.partBytes), [&](const PartGroup& group) {
+    return !inside || ((group.flags & (kOpen | kOverrun)) == 0 && group.end - group.offset <= mostAtOnce(options));
+  });
 }
 
 std::optional<Problem> readTableParts(ByteSource& source, const Form& form, const TableQuery& query,

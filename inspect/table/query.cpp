@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <utility>
 
+#include "inspect/path/reach.h"
+
 namespace tav::inspect
 {
 
@@ -40,23 +42,6 @@ SoughtColumn soughtColumn(uint32_t column, const paths::Compiled& path)
   }
   sought.bound = isBound ? ups : 0;
   return sought;
-}
-
-/// Whether what a path finds in a root does not depend on the roots before and behind.
-bool staysInRoot(const paths::Compiled& path)
-{
-  const auto counts = [&](uint32_t index) {
-    const Route& route = path.routes[index];
-    return route.hasParents || (!route.steps.empty() && !route.steps.front().predicates.empty());
-  };
-  const auto levels = [&](uint32_t index) {
-    const Route& route = path.routes[index];
-    const bool any = !route.steps.empty() && route.steps.front().axis != Axis::child;
-    return any && std::any_of(route.steps.begin(), route.steps.end(),
-                              [](const Step& step) { return !step.predicates.empty(); });
-  };
-  return std::none_of(path.main.begin(), path.main.end(), counts) &&
-         std::none_of(path.main.begin(), path.main.end(), levels);
 }
 
 } // namespace

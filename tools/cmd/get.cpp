@@ -5,6 +5,7 @@
 
 #include <nlohmann/json.hpp>
 
+#include "tav/inspect/find.hpp"
 #include "tav/inspect/jsonText.hpp"
 #include "tav/inspect/locate.hpp"
 #include "tav/inspect/path.hpp"
@@ -35,12 +36,13 @@ struct Wanted
       : problem{.path = text, .sentence = "no match"}
   {
     PathFault fault;
-    const Path path(text, dictionary.names(), fault);
+    Path read(text, dictionary.names(), fault);
     switch (fault.kind)
     {
     case PathFault::Kind::none:
-      matcher.emplace(path);
-      looksAhead = PathMatcher::looksAhead(path);
+      matcher.emplace(read);
+      looksAhead = PathMatcher::looksAhead(read);
+      path.emplace(std::move(read));
       break;
     case PathFault::Kind::malformed: throw pathError(text, fault);
     default: // the other paths are followed all the same
@@ -55,12 +57,13 @@ struct Wanted
   {
     if (matcher)
     {
-      matcher.emplace(Path(problem.path));
+      matcher.emplace(*path);
     }
   }
 
-  std::optional<PathMatcher> matcher{}; ///< nothing for a name that no element has
-  Problem problem;                      ///< when it has led nowhere
+  std::optional<Path> path{}; ///< nothing for a name that no element has
+  std::optional<PathMatcher> matcher{};
+  Problem problem; ///< when it has led nowhere
   uint64_t found = 0;
   bool looksAhead = false;
 };
@@ -91,7 +94,7 @@ public:
   {
     Stream stream = openStream(invocation);
     DamageNotices notices(stream);
-    walk(stream, notices);
+    search(invocation, stream, notices);
     out_.commit();
     tellStatistics(invocation, stream.bytes());
     const Status status = notices.tell();
@@ -194,19 +197,32 @@ private:
     }
   }
 
-  void walk(Stream& stream, DamageNotices& notices)
+  void search(const Invocation& invocation, Stream& stream, DamageNotices& notices)
   {
-    Walker walker(stream.bytes(), stream.form());
-    Progress progress("get", stream.bytes());
-    Event event;
-    while (!isDone() && walker.next(event))
+    std::vector<Path> paths;
+    std::vector<Wanted*> sought;
+    for (const auto& wanted : wanted_)
     {
-      progress.at(event.offset);
-      notices.see(walker, event);
-      if (event.what == What::nodeBegin)
+      if (wanted->path)
       {
-        visit(walker, event, foundIn(walker, event));
+        paths.push_back(*wanted->path);
+        sought.push_back(wanted.get());
       }
+    }
+    const unsigned jobs = jobsOf(invocation);
+    Progress progress("get", stream.bytes());
+    inspect::PathWork work;
+    work.found = [&](const inspect::PathMatch& match) {
+      ++sought[match.path]->found;
+      put({match.source, match.form, match.node, match.text});
+    };
+    work.passed = [&](inspect::PassedOver passed) { notices.add(std::move(passed)); };
+    work.progress = [&](uint64_t offset) { jobs > 1 ? progress.reach(offset) : progress.at(offset); };
+    work.all = all_;
+    work.threads = jobs;
+    if (!paths.empty())
+    {
+      inspect::findPaths(stream.bytes(), stream.form(), paths, work);
     }
   }
 
@@ -226,7 +242,6 @@ private:
       }
       if (wanted->matcher->matches(walker, event))
       {
-        ++wanted->found;
         put(found);
       }
       reaches = reaches || (wanted->isOpen(all_) && wanted->matcher->reachesBelow());
@@ -380,15 +395,14 @@ const Registration registration{{
         "  a | b  **  a[-1]  *_time  #60103  /   either; any levels; the last; pattern; id; the roots\n"
         "Every path that a command prints whole is understood. On a terminal control characters of texts are\n"
         "written as \\x1b, as 'tav tree' does. Exit status 1: a path leads nowhere, also by a name that no\n"
-        "element has, or damage was passed over, which is told on standard error; the other values are printed.\n"
-        "2: a path is malformed.",
+        "element has, or damage was passed over, which is told on standard error. 2: a path is malformed.",
     .options = {{.names = "-a,--all", .help = "every node that a path leads to, not only the first"},
                 {.names = "--raw", .help = "the payload's bytes as they stand in the file, without line ends"},
                 {.names = "--json", .help = "one JSON object a match: path, offset, size, type, value"},
                 {.names = "--paths", .help = "each value behind its path and a tab"},
+                jobsOption(),
                 followOption()},
-    .examples = {{"tav get x.tav /system/host/hostName", "one value"},
-                 {"tav get x.tav --all --paths //hostName", "every host name in the file, with its path"},
+    .examples = {{"tav get x.tav --all --paths //hostName", "every host name in the file, with its path"},
                  {"tav get x.tav --all '//host[cpu/cpuOnline > 4]/hostName'", "those with many processors"},
                  {"tav get x.tav --raw '/system/host[2]/#60123' > bytes", "the bytes of a value"}},
     .run = run,

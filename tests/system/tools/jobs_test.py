@@ -7,16 +7,23 @@ COMMANDS = (("check",), ("check", "--json"), ("check", "--notes"), ("schema",), 
             ("table", "--each", "//*", "--col", "x=.", "--col", "*"), ("table", "--each", "/*", "--col", "*/*", "--join", "+"),
             ("table", "--each", "//host", "--col", "hostName", "--col", ".//cpuOnline", "--on-damage", "skip"),
             ("table", "--each", "/*/*", "--col", "#307", "--file", "--format", "jsonl"))
+PATHS = (("--all", "--paths", "//cpuOnline", "//hostName"), ("--all", "--json", "//host[cpuOnline]/*"),
+         ("//memTotal", "//nothing", "/*/*[last()]"), ("--all", "--raw", "/*/*"))
 
 
 class Jobs(ToolTest):
     def assertSame(self, path):
         for command in COMMANDS:
-            with self.subTest(command=command):
-                one = tav(*command, path)
-                for jobs in ("2", "3", "0"):
-                    many = tav(*command, path, "-j", jobs)
-                    self.assertEqual((many.status, many.out, many.err), (one.status, one.out, one.err))
+            self.assertSaysTheSame(command, command[0], *command[1:], path)
+        for words in PATHS:
+            self.assertSaysTheSame(words, "get", path, *words)
+
+    def assertSaysTheSame(self, what, *words):
+        with self.subTest(command=what):
+            one = tav(*words)
+            for jobs in ("2", "3", "0"):
+                many = tav(*words, "-j", jobs)
+                self.assertEqual((many.status, many.out, many.err), (one.status, one.out, one.err))
 
     def test_a_file_says_the_same_for_any_number_of_processors(self):
         path = self.folder / "x.tav"

@@ -160,6 +160,73 @@ std::string tabled(const Bytes& bytes, const tav::inspect::Form& form, const Tab
   return text + told + (stopped ? problemLine(*stopped) : "");
 }
 
+/// All that paths lead to, with path and value, and what was passed over.
+std::string found(const Bytes& bytes, const tav::inspect::Form& form, const std::vector<std::string>& texts, bool all,
+                  unsigned threads, uint64_t part)
+{
+  ByteSource source("x", std::span<const uint8_t>(bytes));
+  std::vector<tav::Path> paths;
+  for (const std::string& text : texts)
+  {
+    paths.push_back(pathOf(text));
+  }
+  std::string text;
+  const std::vector<uint64_t> counts = findPaths(
+      source, form, paths,
+      {.found =
+           [&](const PathMatch& match) {
+             text += std::to_string(match.path) + " " + match.text(PathStyle::whole) + " " +
+                     std::to_string(match.node.offset()) + "+" + std::to_string(match.node.limit) + " " +
+                     std::to_string(match.node.depth) + " " + std::to_string(match.node.ordinal) + " " +
+                     plainText(match.source, match.form, match.node, 40).value_or("-") + "\n";
+           },
+       .passed = [&](const PassedOver& passed) { text += passed.path + " " + passed.sentence + "\n"; },
+       .all = all,
+       .threads = threads,
+       .partBytes = part});
+  for (const uint64_t count : counts)
+  {
+    text += std::to_string(count) + " ";
+  }
+  return text;
+}
+
+/// Names and levels alone, conditions, places of all kinds, parents; one and several.
+const std::vector<std::vector<std::string>>& sought()
+{
+  static const std::vector<std::vector<std::string>> all = {
+      {"//*"},
+      {"/"},
+      {"//hostName"},
+      {"/system/host"},
+      {"/system/host/host/cpuOnline", "//memTotal"},
+      {"//host[cpuOnline]/hostName"},
+      {"/system/host[hostName='a' or memTotal > 5]"},
+      {"/*/*[last()]", "/*/host"},
+      {"/system[2]//*", "//host[2]"},
+      {"//cpuOnline/..", "//memTotal[../hostName]"},
+      {"/*[@size > 100]", "/system/#60101"},
+      {"/hostName/* | //*//cpuOnline[1]", "//host/*"},
+  };
+  return all;
+}
+
+void expectSameFound(const Bytes& bytes, const tav::inspect::Form& form, const std::vector<uint64_t>& parts)
+{
+  for (size_t i = 0; i < sought().size(); ++i)
+  {
+    for (const bool all : {true, false})
+    {
+      SCOPED_TRACE("paths " + std::to_string(i) + (all ? " all" : " first"));
+      const std::string one = found(bytes, form, sought()[i], all, 1, 0);
+      for (const uint64_t part : parts)
+      {
+        ASSERT_EQ(found(bytes, form, sought()[i], all, static_cast<unsigned>(1 + part % 8), part), one) << part;
+      }
+    }
+  }
+}
+
 /// Damaged in none, one or more places, by a seed.
 Bytes damagedOften(Bytes bytes, uint64_t seed)
 {
@@ -225,6 +292,97 @@ TEST(Parallel, MakesTablesOfLongGroupsAsOneThreadDoes)
   }
 }
 
+TEST(Parallel, FindsInRandomTreesWhatOneThreadFinds)
+{
+  for (uint64_t seed = 0; seed < test::casesOf(40).count; ++seed)
+  {
+    SCOPED_TRACE(seed);
+    const Bytes bytes = mixture(seed);
+    const tav::inspect::Form form{.swapped = seed % 2 == 1, .aligned = seed % 3 == 1};
+    expectSameFound(bytes, form, {31, 300, 1 + seed % 200, bytes.size() / 64 + 1, bytes.size() / 2 + 1});
+  }
+}
+
+TEST(Parallel, FindsInRootsAndLongGroupsWhatOneThreadFinds)
+{
+  for (uint64_t seed = 0; seed < test::casesOf(8).count; ++seed)
+  {
+    SCOPED_TRACE(seed);
+    Bytes bytes;
+    for (uint64_t i = 0; i < 30; ++i)
+    {
+      const Bytes more = test::namedStream(seed * 31 + i);
+      bytes.insert(bytes.end(), more.begin(), more.end());
+    }
+    expectSameFound(damagedOften(bytes, seed), {}, {100, 1001, bytes.size() / 3});
+    expectSameFound(damagedOften(longGroup(300, seed % 2 == 1), seed), {}, {500, 9001, 9002});
+  }
+}
+
+TEST(Parallel, FindsPlacesAmongMoreSiblingsThanAreCounted)
+{
+  tav::Writer writer;
+  {
+    tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM);
+    for (unsigned i = 0; i < 4000; ++i)
+    {
+      root.add(static_cast<uint16_t>(100 + (i < 1000 ? i % 100 : i * 7 % 300)), uint32_t{i});
+      root.add(TAV_ELM_CMN_CPU_ONLINE, uint32_t{i});
+    }
+  }
+  writer.finish();
+  const auto* const first = reinterpret_cast<const uint8_t*>(writer.bytes().data());
+  const Bytes bytes(first, first + writer.bytes().size());
+  const std::string one = found(bytes, {}, {"//*"}, true, 1, 0);
+  EXPECT_EQ(found(bytes, {}, {"//*"}, true, 3, 1000), one);
+  EXPECT_EQ(found(bytes, {}, {"//*"}, true, 3, 30'000), one);
+}
+
+TEST(Parallel, NamesOwnElementsByTheSourcesDictionary)
+{
+  tav::Writer writer;
+  {
+    tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM);
+    for (uint32_t i = 0; i < 300; ++i)
+    {
+      root.group(40001).add(40002, i);
+    }
+  }
+  writer.finish();
+  const auto* const first = reinterpret_cast<const uint8_t*>(writer.bytes().data());
+  ByteSource source("x", std::span<const uint8_t>(first, writer.bytes().size()));
+  MemoryText names("n.json", R"({"40001": {"tag": "queue"}, "40002": {"tag": "queueDepth"}})");
+  source.setDictionary(Dictionary::read(names));
+  const std::vector<tav::Path> paths{pathOf("//queueDepth", source.dictionary())};
+  std::vector<std::string> last;
+  for (const unsigned threads : {1U, 3U})
+  {
+    const PathWork work{.found = [&](const PathMatch& match) { last.push_back(match.text(PathStyle::whole)); },
+                        .threads = threads,
+                        .partBytes = 1000};
+    last.clear();
+    EXPECT_THAT(findPaths(source, {}, paths, work), testing::ElementsAre(300U));
+    EXPECT_EQ(last.front(), "/system/queue/queueDepth");
+    EXPECT_EQ(last.back(), "/system/queue[300]/queueDepth");
+  }
+  // Once more by the file's own walk: what goes on behind a place that is forged names elements, too.
+  std::vector<std::string> told;
+  Bytes bytes(first, first + writer.bytes().size());
+  std::fill_n(bytes.begin() + 5000, 20, uint8_t{0xEE});
+  for (const unsigned threads : {1U, 3U})
+  {
+    ByteSource broken("x", std::span<const uint8_t>(bytes));
+    broken.setDictionary(source.dictionary());
+    std::string text;
+    check(
+        broken, {},
+        {.sink = [&](const Finding& finding) { text += finding.path + "\n"; }, .threads = threads, .partBytes = 1000});
+    told.push_back(text);
+  }
+  EXPECT_THAT(told.front(), testing::HasSubstr("queue"));
+  EXPECT_EQ(told.back(), told.front());
+}
+
 TEST(Parallel, MakesNoRowsOfWhatIsForgedInAPayload)
 {
   // A payload, longer than several parts, that holds what its siblings look like, eye catchers and rows included.
@@ -247,6 +405,7 @@ TEST(Parallel, MakesNoRowsOfWhatIsForgedInAPayload)
   const auto* const first = reinterpret_cast<const uint8_t*>(writer.bytes().data());
   const Bytes bytes(first, first + writer.bytes().size());
   expectSameTables(bytes, {}, {2000, 9000});
+  expectSameFound(bytes, {}, {2000, 9001});
   const std::string hosts = tabled(bytes, {}, asked("//host", {"cpuOnline"}), OnDamage::stop, 3, 2000);
   EXPECT_EQ(std::count(hosts.begin(), hosts.end(), '\n'), 400);
 }
