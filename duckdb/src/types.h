@@ -17,8 +17,8 @@ struct TableShape
   uint64_t rows = 0;
 };
 
-/// A column's type follows from all of its values in all files, so so many threads read them all, with the result of
-/// one. Throws Error for the first file, in their order, that cannot be read.
+/// A column's type follows from all of its values in all files, so all are read, by `threads` with the result of one.
+/// Throws Error for the first file, in their order, that cannot be read.
 TableShape shapeOf(const Given& given, const inspect::TableQuery& query, unsigned threads);
 
 } // namespace tav::sql
