@@ -59,11 +59,22 @@ void put(PyObject* dict, PyObject* key, Ref value)
   done(PyDict_SetItem(dict, key, list.get()));
 }
 
+/// Whether a group of size 0 is empty, and was not one that was never closed.
+bool isEmpty(Opened& opened, const tav::Node& group)
+{
+  inspect::NodeRange children = opened.document.find(group, "*", inspect::OnDamage::skip);
+  return children.begin() == inspect::NodeRange::end();
+}
+
 Ref loadBelow(Opened& opened, const WalkRoot& root)
 {
   constexpr uint32_t kLooks = 1U << 16U; // nodes between two looks for an interrupt
   const auto source = opened.input.source();
   Ref result = made(PyDict_New());
+  if (root.node.size() == 0 && isEmpty(opened, root.node))
+  {
+    return result;
+  }
   std::vector<PyObject*> open{result.get()}; // each in the one before it, by depth
   uint32_t count = 0;
   walkBelow(opened, *source, opened.readerOf(root.form.swapped, root.form.aligned), root, false, [&](const Step& step) {
@@ -103,7 +114,7 @@ Ref loadOne(Opened& opened, const WalkRoot& root)
 
 PyObject* loadNode(NodeObject& node)
 {
-  Opened& opened = use(*node.reader);
+  Opened& opened = node.isGroup && node.size == 0 ? useDocument(*node.reader) : use(*node.reader);
   const inspect::Form form{.swapped = node.swapped, .root64 = node.isWide, .aligned = node.aligned};
   return loadOne(opened, {layerNode(opened, node), form}).release();
 }

@@ -96,7 +96,8 @@ void walkBelow(Opened& opened, inspect::ByteSource& source, const tav::Reader& r
   {
     return;
   }
-  if (withPaths || opened.onDamage == inspect::OnDamage::skip || root.node.isOpen())
+  if (withPaths || opened.onDamage == inspect::OnDamage::skip || root.node.isOpen() ||
+      root.node.size() == 0)
   {
     walkCarefully(opened, source, root, withPaths, visit);
   }

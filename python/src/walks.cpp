@@ -248,7 +248,8 @@ Object& allocate(PyTypeObject* type)
 PyObject* walkChildren(NodeObject& node)
 {
   Opened& opened = use(*node.reader);
-  const bool isOpen = node.size == (node.isWide ? TAV_SIZE_UNKNOWN : layout::kSizeUnknown32);
+  // One of size 0 is empty, or was never closed: the document knows.
+  const bool isOpen = node.size == 0 || node.size == (node.isWide ? TAV_SIZE_UNKNOWN : layout::kSizeUnknown32);
   if (node.isGroup && (isOpen || opened.onDamage == inspect::OnDamage::skip))
   {
     return walkFound(*node.reader, &node, "*", &node, nullptr);

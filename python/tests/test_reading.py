@@ -206,6 +206,34 @@ def test_an_open_group_has_no_size(tmp_path):
     writer.finish()
 
 
+@pytest.mark.parametrize("how", ["stop", "skip"])
+def test_a_root_of_size_0_that_was_never_closed_has_the_children_that_follow(form, how):
+    data = bytearray(streams.snapshot(3, **form))
+    size = 8 if form["root"] == 64 else 4
+    data[:size] = bytes(size)  # the root's
+    with tav.open(bytes(data), on_damage=how, **form) as reader:
+        root = next(iter(reader))
+        assert [child.tag for child in root] == ["host"] * 3 and len(root) == 3
+        assert root.load() == reader.load()["system"] and len(root.load()["host"]) == 3
+        nodes = streams.all_nodes(reader)
+        assert [n.offset for n in nodes] == list(reader.columns()["offset"])
+        assert nodes[1].parent == root and nodes == [root, *reader.findall("//system//*")]
+
+
+@pytest.mark.parametrize("how", ["stop", "skip"])
+def test_an_empty_group_that_was_closed_has_nothing_of_what_follows(form, how):
+    writer = tav.Writer(**form)
+    with writer, writer.group("system") as system:
+        with system.group("cpu"):
+            pass
+        system.add("hostName", "ada")
+    with tav.open(writer.bytes(), on_damage=how, **form) as reader:
+        empty = reader.find("/system/cpu")
+        assert (empty.size, list(empty), empty.load()) == (0, [], {})
+        assert reader.load() == {"system": {"cpu": {}, "hostName": "ada"}}
+        assert [n.tag for n in streams.all_nodes(reader)] == list(reader.columns()["tag"])
+
+
 def test_names_that_mean_nothing_are_told():
     with tav.open(streams.snapshot()) as reader:
         with pytest.raises(tav.TavError, match="did you mean hostName") as caught:
