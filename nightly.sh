@@ -15,6 +15,7 @@
 #     firefox      the page's tests in Firefox
 #     page         files that are opened, gone through and closed in one page, for the time
 #     bench        every benchmark once, to see that it works
+#     python       the package under a debug Python, which counts references
 #     reproduce    all artefacts built twice
 #     bare         the packages, the wheel, the page and the extension on a machine that has nothing; needs root
 #   NIGHTLY_RECORD=FILE    another record
@@ -22,7 +23,7 @@
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")"
 
-all=(fuzz hostile crash kill properties meanwhile damages mutation coverage platforms firefox page bench reproduce bare)
+all=(fuzz hostile crash kill properties meanwhile damages mutation coverage platforms firefox page bench python reproduce bare)
 usage() { sed -n '2,/^set /{/^set /d; s/^# \{0,1\}//; p}' "$0" >&2; exit 2; }
 [[ ${1:-} =~ ^[1-9][0-9]*$ ]] || usage
 minutes=$1
@@ -135,6 +136,12 @@ part_bench()
 {
   ./bench.sh --quick
   echo "all ran"
+}
+
+part_python()
+{
+  python/check-references.sh | tee "$logs/python.list"
+  echo "no reference left by $(grep -c 'references left' "$logs/python.list") kinds of operations"
 }
 
 part_reproduce()

@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # Installs the Debian packages of the named groups that are missing. This is the one list of them.
 #   cmake/install-packages.sh GROUP...        groups: build, test, full, platforms, bench, coverage, package, kaitai,
-#                                            python, sql, browser, firefox, wasm, site, reproduce
+#                                            python, python-debug, sql, browser, firefox, wasm, site, reproduce
 set -euo pipefail
 
 declare -A groups=(
@@ -16,6 +16,7 @@ declare -A groups=(
   [site]="python3-rich doxygen python3-sphinx python3-myst-parser furo"
   [browser]="g++ cmake ninja-build emscripten nodejs npm chromium"
   [firefox]="firefox-esr"
+  [python-debug]="python3-dbg"
   [reproduce]="faketime"
   [coverage]="gcovr qemu-user-static"
   [platforms]="clang libc++-dev libc++abi-dev googletest ccache qemu-user-static g++-s390x-linux-gnu g++-aarch64-linux-gnu g++-mingw-w64-x86-64-posix wine64 wine"
