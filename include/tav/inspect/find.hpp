@@ -45,9 +45,9 @@ struct PathWork
 /// threads. Groups below which there can be none are skipped by their sizes. Returns how many each path led to.
 ///
 /// Threads share a file inside of its roots where no path looks ahead (PathMatcher::looksAhead), else root by root
-/// where what a path leads to in one root does not depend on the others, as that of `/system[2]` does. Else, for the first
-/// nodes of several paths, in a file of less than 4 MiB, and where nodes are so many that handing them over is most of
-/// the work, one thread does it all.
+/// where what a path leads to in one root does not depend on the others, as that of `/system[2]` does. Else, for the
+/// first nodes of several paths, in a file of less than 4 MiB, and where nodes are so many that handing them over is
+/// most of the work, one thread does it all.
 ///
 /// @throws Error where the file cannot be read, and what the callbacks throw
 TAV_INSPECT_API std::vector<uint64_t> findPaths(ByteSource& source, const Form& form, std::span<const Path> paths,
