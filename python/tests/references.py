@@ -50,7 +50,8 @@ def reading() -> None:
             for node in streams.all_nodes(reader):
                 node.value, node.payload, node.tag, node.type, node.path, node.parent, node.time_ns, node.zone, node.key
                 node.size, node.info, node.offset, node.reader, hash(node), repr(node), node == node, node.load()
-            reader.load(), reader.damage, reader.form, reader.name, reader.memory, reader.closed, repr(reader), len(reader)
+            reader.load(), reader.damage, reader.form, reader.name, reader.memory, reader.closed
+            repr(reader), len(reader)
 
 
 def searching() -> None:
