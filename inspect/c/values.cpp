@@ -3,8 +3,8 @@
 #include <chrono>
 
 #include "inspect/c/node.h"
+#include "inspect/dictionary/builtIn.h"
 #include "tav/cpp/decode.hpp"
-#include "tav/dictionary.hpp"
 #include "tav/inspect/path.hpp"
 
 using namespace tav;
@@ -203,7 +203,7 @@ uint32_t tav_read(tav_reader* reader, const tav_node* node, uint64_t from, void*
 
 const char* tav_tag(uint16_t elm)
 {
-  const std::string_view tag = dictionary::tagOf(elm);
+  const std::string_view tag = builtInTag(elm);
   return tag.empty() ? nullptr : tag.data();
 }
 

@@ -7,6 +7,7 @@
 #include <system_error>
 #include <vector>
 
+#include "inspect/dictionary/builtIn.h"
 #include "inspect/dictionary/reader.h"
 #include "tav/inspect/phrases.hpp"
 #include "tav/inspect/problem.hpp"
@@ -185,7 +186,7 @@ const OwnElement* Dictionary::find(std::string_view tag) const noexcept
 
 std::string_view Dictionary::tagOf(uint16_t id) const noexcept
 {
-  const std::string_view builtIn = dictionary::tagOf(id);
+  const std::string_view builtIn = builtInTag(id);
   const OwnElement* const own = builtIn.empty() ? find(id) : nullptr;
   return own == nullptr ? builtIn : std::string_view(own->tag);
 }

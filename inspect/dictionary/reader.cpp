@@ -5,6 +5,7 @@
 #include <charconv>
 #include <utility>
 
+#include "inspect/dictionary/builtIn.h"
 #include "tav/inspect/path.hpp"
 #include "tav/inspect/problem.hpp"
 #include "tav/inspect/value.hpp"
@@ -145,12 +146,11 @@ void DictionaryReader::startElement(std::string_view id)
     fail(elementAt_, inspect::quoted(id) + " is no id; they are numbers from 0 to 65535");
   }
   element_.place = nextPlace(elementAt_);
-  if (dictionary::detail::placeOf(element_.id) < dictionary::entries().size())
+  if (const std::string_view tag = builtInTag(element_.id); !tag.empty())
   {
-    const dictionary::Entry& entry = dictionary::entries()[dictionary::detail::placeOf(element_.id)];
     fail(elementAt_, "the id " + std::string(id) +
-                         (detail::paths::isElement(entry)
-                              ? " is that of " + inspect::quoted(detail::paths::withoutBlanks(entry.tag)) + " in"
+                         (isBuiltIn(element_.id)
+                              ? " is that of " + inspect::quoted(detail::paths::withoutBlanks(tag)) + " in"
                               : " lies among those of") +
                          " the built-in dictionary");
   }

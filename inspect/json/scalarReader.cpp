@@ -4,6 +4,7 @@
 #include <cstring>
 #include <utility>
 
+#include "inspect/dictionary/builtIn.h"
 #include "inspect/json/reader.h"
 #include "tav/inspect/jsonText.hpp"
 #include "tav/inspect/problem.hpp"
@@ -213,7 +214,7 @@ void DocumentReader::elementProperty(Properties& properties, std::string_view na
                      std::to_string(*elm));
   }
   properties.elm = elm ? elm : properties.elm;
-  if (!properties.unknown.empty() && properties.elm && !dictionary::tagOf(*properties.elm).empty())
+  if (!properties.unknown.empty() && properties.elm && !builtInTag(*properties.elm).empty())
   {
     throw BuildError(properties.unknown);
   }

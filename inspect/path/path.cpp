@@ -5,8 +5,8 @@
 #include <charconv>
 #include <unordered_map>
 
+#include "inspect/dictionary/builtIn.h"
 #include "inspect/path/names.h"
-#include "tav/dictionary.hpp"
 #include "tav/inspect/phrases.hpp"
 #include "tav/inspect/problem.hpp"
 #include "tav/inspect/similar.hpp"
@@ -37,17 +37,18 @@ const Names& names()
 {
   static const Names table = [] {
     Names made;
-    for (const dictionary::Entry& entry : dictionary::entries())
-    {
-      for (const std::string_view name : paths::namesOf(entry))
+    forEachBuiltIn([&made](const BuiltIn& entry) {
+      const std::string_view all[] = {entry.tag, entry.name, entry.constant(), paths::withoutBlanks(entry.tag),
+                                      paths::withoutBlanks(entry.name)};
+      for (const std::string_view name : all)
       {
         auto& ids = made[name];
-        if (paths::isElement(entry) && std::find(ids.begin(), ids.end(), entry.id) == ids.end())
+        if (entry.isElement() && std::find(ids.begin(), ids.end(), entry.id) == ids.end())
         {
           ids.push_back(entry.id);
         }
       }
-    }
+    });
     return made;
   }();
   return table;
@@ -59,16 +60,15 @@ class ClearTags
 public:
   ClearTags()
   {
-    for (const dictionary::Entry& entry : dictionary::entries())
-    {
-      const std::string_view tag = dictionary::tagOf(entry.id);
+    forEachBuiltIn([this](const BuiltIn& entry) {
+      const std::string_view tag = builtInTag(entry.id);
       const auto found = names().find(tag);
       if (isCleanName(tag) && found != names().end() && found->second == std::vector<uint16_t>{entry.id})
       {
         places_[entry.id] = static_cast<uint16_t>(tags_.size());
         tags_.push_back(tag);
       }
-    }
+    });
   }
 
   /// Empty where there is none.
@@ -218,10 +218,7 @@ std::string similarNames(std::string_view name, const Dictionary& dictionary)
       close.emplace_back(distance, tag);
     }
   };
-  for (const dictionary::Entry& entry : dictionary::entries())
-  {
-    consider(entry.tag);
-  }
+  forEachBuiltIn([&](const BuiltIn& entry) { consider(entry.tag); });
   for (const OwnElement& element : dictionary.elements())
   {
     consider(element.tag);

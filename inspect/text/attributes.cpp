@@ -6,10 +6,10 @@
 #include <string_view>
 #include <vector>
 
+#include "inspect/dictionary/builtIn.h"
 #include "inspect/path/names.h"
 #include "inspect/text/bytes.h"
 #include "inspect/text/date.h"
-#include "tav/dictionary.hpp"
 #include "tav/inspect/jsonText.hpp"
 #include "tav/inspect/path.hpp"
 #include "tav/inspect/phrases.hpp"
@@ -204,7 +204,7 @@ bool appendAttributeText(std::string& out, ByteSource& source, const Form& form,
   case Attribute::name:
     if (xmlTagOf(node.elm(), source.dictionary()).empty())
     {
-      out += dictionary::nameOf(node.elm());
+      out += builtInName(node.elm());
     }
     break;
   case Attribute::type:

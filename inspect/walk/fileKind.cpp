@@ -5,7 +5,7 @@
 #include <string>
 #include <vector>
 
-#include "tav/dictionary.hpp"
+#include "inspect/dictionary/builtIn.h"
 #include "tav/inspect/form.hpp"
 #include "tav/inspect/jsonText.hpp"
 #include "tav/inspect/value.hpp"
@@ -98,7 +98,7 @@ std::optional<FileKind> otherKindOf(ByteSource& source, const Recognition& found
   Walker walker(source, found.form);
   Event event;
   const bool isRoot = found.isStream && walker.next(event) && event.what == What::nodeBegin && event.node.isGroup() &&
-                      !event.node.has(kOverrun) && !dictionary::nameOf(event.node.elm()).empty();
+                      !event.node.has(kOverrun) && !builtInName(event.node.elm()).empty();
   return isRoot ? std::nullopt : fileKindOf(source);
 }
 

@@ -4,8 +4,8 @@
 #include <array>
 #include <cstring>
 
+#include "inspect/dictionary/builtIn.h"
 #include "inspect/walk/sizeSuits.h"
-#include "tav/dictionary.hpp"
 
 namespace tav::inspect
 {
@@ -101,9 +101,9 @@ const Answers& namedElements()
 {
   static const auto named = []() {
     Answers table{};
-    for (const dictionary::Entry& entry : dictionary::entries())
+    for (size_t id = 0; id < table.size(); ++id)
     {
-      table[entry.id] = entry.constant != "INVALID_ELEMENT";
+      table[id] = isBuiltIn(static_cast<uint16_t>(id));
     }
     return table;
   }();
