@@ -1,6 +1,6 @@
 /// @file builtIn.h
-/// The names of the built-in dictionary, asked of libtav, which has them once. The table of tav/dictionary.hpp, which is
-/// for programs, would be a second copy of them all in this library.
+/// The names of the built-in dictionary, asked of libtav, which has them once. The table of tav/dictionary.hpp, which
+/// is for programs, would be a second copy of them all in this library.
 #pragma once
 
 #include <cstddef>

@@ -200,7 +200,7 @@ void JsonParser::readString()
     if (peek() != '\\') // a control character, or the end
     {
       fail(peek() == TextSource::kEnd ? "the end of a string"
-                                   : "a character of a string; control characters are written as \\u00..");
+                                      : "a character of a string; control characters are written as \\u00..");
     }
     text_.take();
     readEscape();

@@ -47,7 +47,6 @@ public:
   void parseValue();
 
 private:
-
   bool startValue();
   bool endContainers();
   void startContainer(bool object);
