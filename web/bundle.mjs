@@ -7,8 +7,9 @@ import { fileURLToPath } from "node:url";
 import { gzipSync } from "node:zlib";
 import { buildSync, transformSync } from "esbuild";
 
-const MOST_PAGE = 300 * 1024;
-const MOST_MODULE = 150 * 1024;
+// Bytes of the page and of the packed module that nobody goes beyond without knowing: 3 % more than they have today.
+const MOST_PAGE = 339_000;
+const MOST_MODULE = 226_200;
 
 const here = dirname(fileURLToPath(import.meta.url));
 const [modulePath, out] = process.argv.slice(2);
@@ -49,3 +50,7 @@ const kilobytes = (bytes) => `${Math.ceil(bytes / 1024)} KB`;
 console.log(`${out}: ${kilobytes(Buffer.byteLength(page))}, its module ${kilobytes(packed.length)}`);
 const rest = Buffer.byteLength(page) - parts.MODULE.length;
 console.log(`the page without its module: ${kilobytes(rest)}`);
+if (Buffer.byteLength(page) > MOST_PAGE || packed.length > MOST_MODULE) {
+  console.error(`too large: the page may have ${MOST_PAGE} bytes, and its packed module ${MOST_MODULE}`);
+  process.exit(1);
+}
