@@ -8,7 +8,8 @@ import puppeteer from "puppeteer-core";
 const PAGE = join(fileURLToPath(new URL(".", import.meta.url)), "../dist/tav.html");
 const BROWSER = process.env.TAV_BROWSER ?? "/usr/bin/chromium";
 
-/** Firefox is driven by WebDriver BiDi, which has no tracing, no look into workers and no colours to choose. */
+/** Firefox is driven by WebDriver BiDi, which has no tracing, no look into workers, no colours to
+ * choose and no closing that tells the page. */
 export const isFirefox = basename(BROWSER).startsWith("firefox");
 export const onlyInChromium = { skip: isFirefox && "WebDriver BiDi has nothing for it" };
 

@@ -6,7 +6,7 @@ import { createInterface } from "node:readline";
 import { truncateSync, writeFileSync } from "node:fs";
 import { after, before, test } from "node:test";
 import { fileURLToPath } from "node:url";
-import { click, end, find, made, node, rows, settled, start, tab, textOf, visit } from "./browser.mjs";
+import { click, end, find, made, node, onlyInChromium, rows, settled, start, tab, textOf, visit } from "./browser.mjs";
 import { HOST_NAME, SYSTEM, group, hosts, many, text } from "./streams.mjs";
 
 const TOOL = process.env.TAV_TOOL ?? fileURLToPath(new URL("../../build/release/tools/tav", import.meta.url));
@@ -31,7 +31,7 @@ async function view(path, hash = "") {
   return { page, address, ended, tool };
 }
 
-test("tav view shows its file, reads it in ranges, and ends with the page", async () => {
+test("tav view shows its file, reads it in ranges, and ends with the page", onlyInChromium, async () => {
   const { page, address, ended } = await view(made("a <b> & c.tav", hosts("ada", "grace")), "#path=/system/host%5B2%5D/hostName");
   assert.deepEqual((await rows(page)).map(({ name }) => name), ["system", "host", "host[2]", "hostName", "cpuOnline"]);
   assert.equal((await node(page)).value, "grace");
@@ -46,7 +46,7 @@ test("tav view shows its file, reads it in ranges, and ends with the page", asyn
   assert.equal((await ended)[0], 0);
 });
 
-test("a served page is loaded again, and checks, recovers and compares as one from the disk", async () => {
+test("a served page is loaded again, and checks, recovers and compares as one from the disk", onlyInChromium, async () => {
   const { page, ended, tool } = await view(made("served.tav", many(20_000)));
   await page.reload();
   await page.waitForFunction(() => document.body.classList.contains("opened"), { timeout: 60_000 });
@@ -65,7 +65,7 @@ test("a served page is loaded again, and checks, recovers and compares as one fr
   assert.equal((await ended)[0], 0);
 });
 
-test("a served file that has changed is said to be, until the page is loaded again", async () => {
+test("a served file that has changed is said to be, until the page is loaded again", onlyInChromium, async () => {
   const path = made("served-changes.tav", many(100_000));
   const { page, ended } = await view(path);
   writeFileSync(path, group(SYSTEM, text(HOST_NAME, "another")));
@@ -80,7 +80,7 @@ test("a served file that has changed is said to be, until the page is loaded aga
   assert.equal((await ended)[0], 0);
 });
 
-test("a served file of 5 GB opens with a few ranges of it", async () => {
+test("a served file of 5 GB opens with a few ranges of it", onlyInChromium, async () => {
   const path = made("served-large.tav", hosts("ada"));
   truncateSync(path, 5 * 1024 ** 3);
   const { page, ended } = await view(path);
