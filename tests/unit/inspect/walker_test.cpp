@@ -1,9 +1,11 @@
 #include <string>
+#include <utility>
 #include <vector>
 
 #include <gmock/gmock.h>
 
 #include "inspect/streams.h"
+#include "support/byteRows.h"
 
 using namespace tav::inspect;
 using test::Bytes;
@@ -85,6 +87,62 @@ TEST(Walker, AccountsForEveryByteOfADamagedStream)
     }
   }
   EXPECT_GT(damages, 500U);
+}
+
+TEST(Walker, GoesOnBehindThePairOfANodeThatHasLostItsHeader)
+{
+  for (const bool swap : {false, true})
+  {
+    const auto number = [](test::ByteRows& rows) {
+      rows.h64(4, 0, TAV_TYPE_UINT32, TAV_ELM_CMN_CPU_ONLINE).number(9, 4);
+    };
+    test::ByteRows rows(swap);
+    rows.h64(20 + 36 + 20 + 20, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+    number(rows);
+    const uint64_t lost = rows.at();
+    rows.fill(16 + 4, 0xFF).pair(20);
+    const uint64_t behind = rows.at();
+    number(rows);
+    number(rows);
+    ByteSource source("x", std::span<const uint8_t>(rows.bytes));
+    Walker walker(source, {.swapped = swap});
+    std::vector<uint64_t> nodes;
+    std::vector<std::pair<uint64_t, uint64_t>> damaged;
+    for (Event event; walker.next(event);)
+    {
+      if (event.what == What::nodeBegin)
+      {
+        nodes.push_back(event.offset);
+      }
+      else if (event.what == What::damaged)
+      {
+        damaged.emplace_back(event.offset, event.length);
+      }
+    }
+    EXPECT_THAT(nodes, testing::ElementsAre(0, 16, behind, behind + 20));
+    EXPECT_THAT(damaged, testing::ElementsAre(std::pair(lost, behind - lost)));
+  }
+}
+
+TEST(Walker, GoesOnAtANodeOfExactlyItsTypesSizeAlsoWhereDamageFollows)
+{
+  for (const bool swap : {false, true})
+  {
+    test::ByteRows rows(swap);
+    rows.h64(30 + 20 + 30, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM).fill(30, 0xFF);
+    rows.h64(4, 0, TAV_TYPE_UINT32, TAV_ELM_CMN_CPU_ONLINE).number(9, 4).fill(30, 0xFF);
+    ByteSource source("x", std::span<const uint8_t>(rows.bytes));
+    Walker walker(source, {.swapped = swap});
+    std::vector<uint64_t> nodes;
+    for (Event event; walker.next(event);)
+    {
+      if (event.what == What::nodeBegin)
+      {
+        nodes.push_back(event.offset);
+      }
+    }
+    EXPECT_THAT(nodes, testing::ElementsAre(0, 16 + 30));
+  }
 }
 
 TEST(Walker, SkipsTheChildrenOfAGroupWhoseEndIsKnown)
