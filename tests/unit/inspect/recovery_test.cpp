@@ -153,6 +153,28 @@ TEST_P(Recovering, ARootThatLosesAllStaysOpenForWhatFollows)
   EXPECT_EQ(back.totals.closed, 1U);
 }
 
+TEST_P(Recovering, GroupsThatTheEndOfAnotherClosesAreCountedWhereTheyWereOpen)
+{
+  for (const uint64_t size : {uint64_t{20}, uint64_t{TAV_SIZE_UNKNOWN}})
+  {
+    ByteRows stream(GetParam());
+    stream.h64(16 + 20 + 32, TAV_INFO_EYE_SIZE, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+    stream.h64(size, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_HOST);
+    stream.h64(4, 0, TAV_TYPE_UINT32, TAV_ELM_CMN_CPU_ONLINE).number(9, 4);
+    stream.end64(16 + 16 + 20 + 16);
+    const Recovered back(stream.bytes, form);
+    EXPECT_EQ(back.totals.closed != 0, size != 20);
+    EXPECT_EQ(back.totals.nodes, 3U);
+    EXPECT_EQ(back.totals.lost, 0U);
+    ByteRows expected(GetParam());
+    expected.h64(16 + 20 + 32, TAV_INFO_EYE_SIZE, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+    expected.h64(20, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_HOST);
+    expected.h64(4, 0, TAV_TYPE_UINT32, TAV_ELM_CMN_CPU_ONLINE).number(9, 4);
+    expected.end64(16 + 16 + 20 + 16);
+    EXPECT_EQ(back.stream, expected.bytes);
+  }
+}
+
 TEST_P(Recovering, ADamagedPairIsMadeAnew)
 {
   rows.h64(72, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
