@@ -2,7 +2,7 @@
 
 #include <algorithm>
 #include <limits>
-#include <numeric>
+#include <list>
 
 #include "inspect/walk/prober.h"
 #include "inspect/walk/reasons.h"
@@ -80,18 +80,16 @@ enum class Effort : uint8_t
   whole
 };
 
-/// The indices of ways in the order in which they are tried: first the padding that the root's header announces.
-std::vector<size_t> likelyFirst(ByteSource& source, const std::vector<Form>& forms)
+/// The ways in the order in which they are tried: first those with the padding that the root's header announces.
+std::vector<Form> likelyFirst(ByteSource& source, std::vector<Form> forms)
 {
-  std::vector<size_t> order(forms.size());
-  std::iota(order.begin(), order.end(), size_t{0});
-  std::stable_partition(order.begin(), order.end(), [&](size_t at) {
+  std::stable_partition(forms.begin(), forms.end(), [&](const Form& form) {
     TAVHeader root{};
-    const Prober prober(source, forms[at], 0);
-    return readRoot(prober, 0, forms[at].root64, source.size(), root) &&
-           forms[at].aligned == ((infoOf(root) & TAV_INFO_ALIGNED8) != 0);
+    const Prober prober(source, form, 0);
+    return readRoot(prober, 0, form.root64, source.size(), root) &&
+           form.aligned == ((infoOf(root) & TAV_INFO_ALIGNED8) != 0);
   });
-  return order;
+  return forms;
 }
 
 /// Whether other ways may be given up for one: nothing is damaged on it, and its start is sound. Of the others, it then
@@ -106,16 +104,18 @@ bool canRefute(ByteSource& source, const Trial& trial)
 void tryForms(ByteSource& source, const std::vector<Form>& forms, uint64_t search, RootBelief best, Effort effort,
               std::vector<Trial>& trials)
 {
-  std::vector<Trial> tried(forms.size());
-  const Trial* better = effort == Effort::needed && !trials.empty() && canRefute(source, trials.front())
-                            ? &trials.front()
-                            : nullptr;
-  for (const size_t at : likelyFirst(source, forms))
+  std::list<Trial> tried; // whose members stay where they are
+  const Trial* better = nullptr;
+  if (!trials.empty() && effort == Effort::needed && canRefute(source, trials.front()))
   {
-    Trial& trial = tried[at];
-    const RootBelief root = judgeRoot(source, forms[at]);
+    better = &trials.front();
+  }
+  for (const Form& form : likelyFirst(source, forms))
+  {
+    const RootBelief root = judgeRoot(source, form);
     const bool behind = better != nullptr && surenessOf(root) <= better->sureness();
-    trial = tryForm(source, forms[at], {.search = search, .better = behind ? better : nullptr, .far = kNear});
+    tried.push_back(tryForm(source, form, {.search = search, .better = behind ? better : nullptr, .far = kNear}));
+    Trial& trial = tried.back();
     trial.root = root;
     trial.cost += best >= RootBelief::usual && root < RootBelief::usual ? kNoRoot : 0;
     if (effort == Effort::needed && better == nullptr && canRefute(source, trial))
@@ -123,7 +123,11 @@ void tryForms(ByteSource& source, const std::vector<Form>& forms, uint64_t searc
       better = &trial;
     }
   }
-  trials.insert(trials.end(), tried.begin(), tried.end());
+  for (const Form& form : forms)
+  {
+    const auto found = std::find_if(tried.begin(), tried.end(), [&](const Trial& one) { return one.form == form; });
+    trials.push_back(*found);
+  }
   sortTrials(trials);
 }
 
