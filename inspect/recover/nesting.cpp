@@ -49,7 +49,7 @@ bool Nesting::wouldReadAsOpen() const
 /// Lets the innermost group take what comes behind it, up to the end of the file.
 void Nesting::keepOpen()
 {
-  ledger_.totals().closed += place_.top().open ? 0 : 1;
+  countClosed();
   place_.openTop();
 }
 
@@ -57,7 +57,10 @@ void Nesting::keepOpen()
 void Nesting::settleClaim()
 {
   OpenGroup& top = place_.top();
-  ledger_.totals().closed += top.claim != 0 && ledger_.keptTo() > top.claim && !top.hidden ? 1 : 0;
+  if (top.claim != 0 && ledger_.keptTo() > top.claim)
+  {
+    countClosed();
+  }
   top.claim = 0;
 }
 
@@ -98,7 +101,10 @@ void Nesting::closeTo(size_t at, uint64_t end)
       return;
     }
     const bool right = top.claim != 0 ? top.claim == end : !top.open && top.limit == end;
-    ledger_.totals().closed += !top.hidden && !right ? 1 : 0;
+    if (!right)
+    {
+      countClosed();
+    }
     top.claim = 0;
     close();
   }
@@ -118,7 +124,8 @@ void Nesting::closeOpen()
 /// Puts a group of its own around what has lost its own.
 void Nesting::makeParent(bool wide)
 {
-  const OpenGroup group{.start = place_.position(), .limit = place_.top().limit, .wide = wide, .open = true};
+  const uint64_t limit = place_.top().limit;
+  const OpenGroup group{.start = place_.position(), .limit = limit, .wide = wide, .open = true, .counted = true};
   open(group, madeHeader(rebuilder_.wideChildren(), wide, false));
   ++ledger_.totals().made;
 }

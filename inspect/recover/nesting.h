@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstdint>
+#include <utility>
 
 #include "inspect/recover/ledger.h"
 #include "inspect/recover/place.h"
@@ -42,8 +43,12 @@ public:
   /// Sees to it that the innermost group takes nodes with this header.
   void fit(bool wide, bool isRoot);
 
-  /// Counts a group that was open or whose size was wrong; one that is hidden is not written.
-  void countClosed() { ledger_.totals().closed += place_.top().hidden ? 0 : 1; }
+  /// Counts the innermost group, which was open or whose size was wrong, once; one that is hidden is not written.
+  void countClosed()
+  {
+    OpenGroup& top = place_.top();
+    ledger_.totals().closed += top.hidden || std::exchange(top.counted, true) ? 0 : 1;
+  }
 
 private:
   bool wouldReadAsOpen() const;

@@ -17,12 +17,13 @@ struct OpenGroup
 {
   uint64_t start = 0;
   uint64_t limit = 0;
-  bool wide = false;   ///< children have 64-bit headers
-  bool sure = false;   ///< the limit is confirmed
-  bool fixed = false;  ///< a root: what has other headers than its children does not end it
-  bool open = false;   ///< ends where the group around it ends
-  bool hidden = false; ///< too deep: its children go to the group around it
-  uint64_t claim = 0;  ///< where its size says that it ends, when only what is there speaks against it; else 0
+  bool wide = false;    ///< children have 64-bit headers
+  bool sure = false;    ///< the limit is confirmed
+  bool fixed = false;   ///< a root: what has other headers than its children does not end it
+  bool open = false;    ///< ends where the group around it ends
+  bool hidden = false;  ///< too deep: its children go to the group around it
+  bool counted = false; ///< among those that were open or whose size was wrong
+  uint64_t claim = 0;   ///< where its size says that it ends, when only what is there speaks against it; else 0
 };
 
 /// A position, the groups that are open around it, and the groups ahead whose headers are lost. The outermost group

@@ -161,7 +161,7 @@ Recovery::Entered Recovery::enterEnding()
                      Prober::isNamed(elmOf(header)) && hasChildren64(header) == ending.wide && hasEyeSize(header);
   place_.stretch(ending.end); // what was open before and ends inside of it has a wrong size
   nesting_.fit(true, true);
-  nesting_.open({.start = position(), .limit = ending.end, .wide = ending.wide, .sure = true},
+  nesting_.open({.start = position(), .limit = ending.end, .wide = ending.wide, .sure = true, .counted = !whole},
                 whole ? header : madeHeader(true, ending.wide, true));
   ledger_.setDamaged(!whole);
   if (!whole)
@@ -251,7 +251,10 @@ void Recovery::takeGroup(const Candidate& found)
     return;
   }
   nesting_.open(group, header);
-  ledger_.totals().closed += repaired && !place_.top().hidden ? 1 : 0;
+  if (repaired)
+  {
+    nesting_.countClosed();
+  }
   keepHeader(header);
 }
 
