@@ -104,14 +104,7 @@ CheckTotals check(ByteSource& source, const Form& form, const CheckOptions& opti
     PartChain<CheckJob>(source, parts, job).run(options.threads);
     return job.totals();
   }
-  Part whole;
-  whole.form = form;
-  whole.wide = form.root64;
-  const auto walk = job.goOnFrom(source, stateOf(source, whole));
-  while (walk->step())
-  {
-  }
-  job.take(*walk);
+  job.take(*walkThrough(source, form, job));
   return job.totals();
 }
 

@@ -7,6 +7,7 @@
 
 #include "inspect/columns/addRow.h"
 #include "inspect/path/names.h"
+#include "inspect/plan/partState.h"
 #include "inspect/walk/exactWalk.h"
 #include "inspect/walk/mostCounts.h"
 #include "tav/inspect/path.hpp"
@@ -21,16 +22,6 @@ constexpr uint64_t kMostAtOnce = uint64_t{4} * 1024 * 1024; ///< bytes of a grou
 constexpr uint64_t kRowsUntold = 4096;
 constexpr size_t kMostGrowth = 16;                     ///< of the rows' room at once
 constexpr size_t kMostText = size_t{16} * 1024 * 1024; ///< of paths that are handed out at once
-
-/// All of a file.
-Part wholeOf(const ByteSource& source, const Form& form)
-{
-  Part part;
-  part.size = source.size();
-  part.form = form;
-  part.wide = form.root64;
-  return part;
-}
 
 uint16_t keyOf(uint32_t info)
 {

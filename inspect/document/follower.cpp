@@ -62,8 +62,8 @@ bool Follower::open()
   }
   endOpenRoot();
   now_.reset();
-  followed_ = file.get();
   file_ = std::make_unique<ByteSource>(path_, std::move(file), options_.ringBytes);
+  followed_ = &static_cast<FollowedFile&>(file_->storage());
   file_->setDictionary(options_.dictionary);
   beginAnew();
   return true;

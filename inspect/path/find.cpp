@@ -304,13 +304,7 @@ std::vector<uint64_t> findPaths(ByteSource& source, const Form& form, std::span<
     PartChain<FindJob>(source, parts, job).run(work.threads);
     return job.found();
   }
-  Part whole;
-  whole.form = form;
-  whole.wide = form.root64;
-  const auto walk = job.goOnFrom(source, stateOf(source, whole));
-  while (walk->step())
-  {
-  }
+  walkThrough(source, form, job);
   return job.found();
 }
 

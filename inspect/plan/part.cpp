@@ -49,6 +49,15 @@ constexpr uint64_t kGroupDamaged = uint64_t{1} << 33U;
 
 } // namespace
 
+Part wholeOf(const ByteSource& source, const Form& form)
+{
+  Part part;
+  part.size = source.size();
+  part.form = form;
+  part.wide = form.root64;
+  return part;
+}
+
 Walker::State stateOf(ByteSource& source, const Part& part)
 {
   const uint64_t size = source.size();

@@ -180,4 +180,15 @@ private:
   std::vector<Try> tries_;
 };
 
+/// Walks through all of a file by the caller's thread alone.
+template<class Job>
+auto walkThrough(ByteSource& source, const Form& form, Job& job)
+{
+  auto walk = job.goOnFrom(source, stateOf(source, wholeOf(source, form)));
+  while (walk->step())
+  {
+  }
+  return walk;
+}
+
 } // namespace tav::inspect

@@ -14,6 +14,9 @@ namespace tav::inspect
 /// Where the walk through a part begins. Throws Error for a part that cannot be one of the file.
 Walker::State stateOf(ByteSource& source, const Part& part);
 
+/// All of a file as a part.
+Part wholeOf(const ByteSource& source, const Form& form);
+
 /// The groups around a place as a walk has given them out, from the root inwards.
 std::vector<Event> groupsAround(const Walker::State& state);
 

@@ -38,11 +38,8 @@ uint32_t kindOf(const TAVHeader& header)
 Planner::Planner(ByteSource& source, const Form& form, bool everyForm, size_t maxDepth)
     : source_(source), everyForm_(everyForm), maxDepth_(std::min(maxDepth, kMostLevels))
 {
-  Part whole;
-  whole.form = form;
-  whole.wide = form.root64;
   walk_.emplace(
-      source_, form, [](const PassedOver&) {}, stateOf(source_, whole), 0, everyForm_, kMostSearched);
+      source_, form, [](const PassedOver&) {}, stateOf(source_, wholeOf(source_, form)), 0, everyForm_, kMostSearched);
 }
 
 std::vector<Part> Planner::run(uint64_t target)

@@ -127,13 +127,7 @@ void Schema::add(ByteSource& source, const Form& form, const SchemaWork& work)
     PartChain<Job>(source, parts, job).run(work.threads);
     return;
   }
-  Part whole;
-  whole.form = form;
-  whole.wide = form.root64;
-  const auto walk = job.goOnFrom(source, stateOf(source, whole));
-  while (walk->step())
-  {
-  }
+  walkThrough(source, form, job);
 }
 
 /// Stands in the groups around a place.

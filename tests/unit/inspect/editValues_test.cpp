@@ -45,19 +45,6 @@ std::string valueAt(const Bytes& bytes, const Form& form, const char* path)
   return search.next(event) ? plainText(source, form, event.node, 4096).value_or("(too long)") : "(not there)";
 }
 
-uint64_t defects(const Bytes& bytes, const Form& form)
-{
-  ByteSource source("x", std::span<const uint8_t>(bytes));
-  uint64_t count = 0;
-  Checker checker(
-      source, form, [](RuleId) { return true; },
-      [&](const Finding& finding) { count += ruleOf(finding.rule).note ? 0 : 1; });
-  while (checker.step())
-  {
-  }
-  return count;
-}
-
 class EditValues : public testing::TestWithParam<Layout>
 {
 protected:
@@ -73,7 +60,7 @@ protected:
       test::Made made;
       editor.writeNew(made.file());
       const Bytes after = made.bytes();
-      EXPECT_EQ(defects(after, form), defects(bytes, form));
+      EXPECT_EQ(test::defects(after, form), test::defects(bytes, form));
       EXPECT_EQ(valueAt(after, form, "/system/#2"), "7") << "what is behind it stays";
       return valueAt(after, form, "/system/#1");
     }

@@ -39,19 +39,6 @@ std::string differences(const Bytes& a, const Bytes& b, const tav::inspect::Form
   return text;
 }
 
-uint64_t defects(const Bytes& bytes, const tav::inspect::Form& form)
-{
-  ByteSource source("x", std::span<const uint8_t>(bytes));
-  uint64_t count = 0;
-  Checker checker(
-      source, form, [](RuleId) { return true; },
-      [&](const Finding& finding) { count += ruleOf(finding.rule).note ? 0 : 1; });
-  while (checker.step())
-  {
-  }
-  return count;
-}
-
 std::vector<Assignment> assign(const std::string& path, const std::string& value)
 {
   return {{pathOf(path), value}};
@@ -113,7 +100,7 @@ TEST_P(EditInAForm, ALongerValueKeepsTheStreamSound)
     EXPECT_THROW(editor.requireSameSizes(), Error);
     test::Made made;
     editor.writeNew(made.file());
-    EXPECT_EQ(defects(made.bytes(), form), 0U);
+    EXPECT_EQ(test::defects(made.bytes(), form), 0U);
     EXPECT_THAT(differences(bytes, made.bytes(), form),
                 testing::StartsWith("/system/host/hostName  ASCII String  \"ada\""));
     const Bytes longer = made.bytes();

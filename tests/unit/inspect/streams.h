@@ -22,6 +22,20 @@ inline tav::inspect::Form readForm(const Form& form)
   return {.swapped = form.swap, .root64 = !form.root32, .aligned = form.align};
 }
 
+/// How many findings a check has of a stream, without notes.
+inline uint64_t defects(const Bytes& bytes, const tav::inspect::Form& form)
+{
+  tav::inspect::ByteSource source("x", std::span<const uint8_t>(bytes));
+  uint64_t count = 0;
+  tav::inspect::Checker checker(
+      source, form, [](tav::inspect::RuleId) { return true; },
+      [&](const tav::inspect::Finding& finding) { count += ruleOf(finding.rule).note ? 0 : 1; });
+  while (checker.step())
+  {
+  }
+  return count;
+}
+
 /// A sink that keeps what it is given.
 class Kept final : public tav::inspect::Sink
 {
