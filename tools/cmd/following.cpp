@@ -30,7 +30,7 @@ const char* sentenceOf(FileChange change)
 void refuseUnsuited(const Invocation& invocation)
 {
   const std::string name = invocation.command().name;
-  for (const char* const option : {"--from", "--stats", "--jobs"})
+  for (const char* const option : {"--from", "--stats"})
   {
     if (invocation.has(option))
     {

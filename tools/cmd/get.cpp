@@ -104,6 +104,10 @@ public:
   /// Prints what comes: each node at once, or, where a path looks ahead, those of a root when it has ended.
   Status follow(const Invocation& invocation)
   {
+    if (invocation.has("--jobs"))
+    {
+      throw Failure("get: --follow and --jobs exclude each other");
+    }
     all_ = true;
     inspect::FollowTold told;
     const auto isOpen = [this](const auto& wanted) { return wanted->isOpen(all_); };

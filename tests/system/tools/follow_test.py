@@ -46,12 +46,20 @@ class Following:
     def read(stream, to):
         for line in stream:
             to.put(line.rstrip("\n"))
+        to.put(None)
+
+    def next(self, lines):
+        """The next line; an error where the process has ended without one."""
+        line = lines.get(timeout=PATIENCE)
+        if line is None:
+            raise AssertionError(f"ended with status {self.process.wait()}: {list(self.notes.queue)}")
+        return line
 
     def take(self, count=1):
-        return [self.lines.get(timeout=PATIENCE) for _ in range(count)]
+        return [self.next(self.lines) for _ in range(count)]
 
     def note(self):
-        return self.notes.get(timeout=PATIENCE)
+        return self.next(self.notes)
 
     def end(self, number=signal.SIGINT):
         """Interrupts it; the status, and the lines that nobody has taken."""
@@ -61,7 +69,7 @@ class Following:
             thread.join()
         for stream in (self.process.stdout, self.process.stderr):
             stream.close()
-        return status, list(self.lines.queue), list(self.notes.queue)
+        return status, *([line for line in lines.queue if line is not None] for lines in (self.lines, self.notes))
 
 
 @unittest.skipIf(WINDOWS, "signals of other processes")
@@ -255,6 +263,7 @@ class Follow(ToolTest):
         self.append(group(SYSTEM, number(1)))
         for words, told in ((["get", "-", "//cpuOnline"], "--follow needs a FILE"),
                             (["get", self.path, "//cpuOnline", "--from", "16"], "--from exclude each other"),
+                            (["get", self.path, "//cpuOnline", "-j", "2"], "--jobs exclude each other"),
                             (["tree", self.path, "--at", "0"], "--at exclude each other"),
                             (["tree", self.path, "--fold"], "--fold exclude each other"),
                             (["get", self.path, "//cpuOnline["], "column")):

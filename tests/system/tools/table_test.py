@@ -427,13 +427,15 @@ class Parquet(Table):
         path.write_bytes(STREAM)
         names = self.folder / "names.json"
         names.write_text('{"40001": {"tag": "own"}}')
-        result = self.table(path, *HOSTS, "--format", "parquet", "--dictionary", names, env=env)
-        self.assertEqual(result.out, "PAR1abcdPAR1")
-        asked = (self.folder / "asked").read_text().splitlines()
-        self.assertEqual(asked[0], r"LOAD E'a''\\b\x0a';")
-        self.assertEqual(asked[1:], [
-            f"SET threads = 1; COPY (SELECT c0 AS \"n\" FROM read_tav_table([E'{path}'], each := E'/system/host', "
-            "columns := {'c0': E'#60111'}, dictionary := '/dev/fd/4')) TO '/dev/fd/3' (FORMAT parquet, USE_TMP_FILE false);"])
+        for jobs, threads in (((), 1), (("-j", "3"), 3)):
+            result = self.table(path, *HOSTS, "--format", "parquet", "--dictionary", names, *jobs, env=env)
+            self.assertEqual(result.out, "PAR1abcdPAR1")
+            asked = (self.folder / "asked").read_text().splitlines()
+            self.assertEqual(asked[0], r"LOAD E'a''\\b\x0a';")
+            self.assertEqual(asked[1:], [
+                f"SET threads = 1; COPY (SELECT c0 AS \"n\" FROM read_tav_table([E'{path}'], each := E'/system/host', "
+                f"columns := {{'c0': E'#60111'}}, threads := {threads}, dictionary := '/dev/fd/4')) TO '/dev/fd/3' "
+                "(FORMAT parquet, USE_TMP_FILE false);"])
         if os.path.exists("/proc/self/status"):
             ignored = int((self.folder / "signals").read_text().split()[1], 16)
             self.assertEqual(ignored & (1 << 12 | 1 << 24), 0)  # SIGPIPE, SIGXFSZ
