@@ -11,7 +11,7 @@
 #     damages      damaged streams that are recovered, 100 a minute
 #     mutation     changes of the library that tests have to notice, one a minute of each group
 #     coverage     lines and branches that tests reach
-#     platforms    every room with libc++, on s390x, aarch64 and Windows
+#     platforms    every room with libc++, on s390x, aarch64 and Windows; WebAssembly
 #     firefox      the page's tests in Firefox
 #     page         files that are opened, gone through and closed in one page, for the time
 #     bench        every benchmark once, to see that it works

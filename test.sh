@@ -3,10 +3,11 @@
 #   ./test.sh          with g++, optimised
 #   TAV_STAGES=REGEX   only the stages whose titles match
 #   ./test.sh --full   what CI runs: the checks of the sources, both compilers, the sanitizers, fuzzing, packages,
-#                      most of s390x, Windows and WebAssembly
+#                      most of s390x and Windows
 #   ./test.sh --face NAME   one face: python (the package), sql (the extension for DuckDB), browser (the page, in Chromium),
 #                           firefox (the page, in Firefox)
-#   ./test.sh --platforms   all that is tested of libc++, s390x and aarch64 under qemu, Windows under wine
+#   ./test.sh --platforms   all that is tested of libc++, s390x and aarch64 under qemu, Windows under wine,
+#                           WebAssembly under node
 set -euo pipefail
 cd "$(dirname "${BASH_SOURCE[0]}")"
 
@@ -392,6 +393,7 @@ platforms()
   stage "s390x, big-endian" check_s390x "${rooms[@]}"
   stage "aarch64" check_aarch64 "${rooms[@]}"
   stage "Windows" check_windows "${rooms[@]}"
+  stage "WebAssembly" check_wasm
 }
 
 full()
@@ -413,7 +415,6 @@ full()
   # What touches bytes, files or the system; CI has no time for more.
   stage "s390x, big-endian" check_s390x kor trace format storage core api golden host
   without_properties=1 stage "Windows" check_windows kor trace format storage core api golden host
-  stage "WebAssembly" check_wasm
   stage "address and undefined behaviour" check_sanitizers
   stage "fuzzing" fuzz/run.sh fixed
   stage "threads" check_thread
@@ -430,7 +431,7 @@ case ${1:-} in
     stage "g++" build_and_test release
     ;;
   --full)
-    stage "packages" cmake/install-packages.sh build test full platforms python sql browser wasm site
+    stage "packages" cmake/install-packages.sh build test full platforms python sql browser site
     # The same sources are compiled again and again, at every place where the project is checked out.
     export CMAKE_CXX_COMPILER_LAUNCHER=ccache CCACHE_BASEDIR=$PWD CCACHE_NOHASHDIR=1
     export CCACHE_SLOPPINESS=pch_defines,time_macros,include_file_mtime,include_file_ctime
@@ -461,7 +462,7 @@ case ${1:-} in
     esac
     ;;
   --platforms)
-    stage "packages" cmake/install-packages.sh build test platforms
+    stage "packages" cmake/install-packages.sh build test platforms wasm
     platforms
     ;;
   *)
