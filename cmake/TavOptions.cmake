@@ -21,6 +21,13 @@ else()
   set(TAV_LIBRARY_TYPE SHARED)
 endif()
 
+# Static libraries may end up in shared ones, but of a module of WebAssembly nothing moves.
+if(EMSCRIPTEN)
+  set(TAV_POSITION_INDEPENDENT OFF)
+else()
+  set(TAV_POSITION_INDEPENDENT ON)
+endif()
+
 if(PROJECT_IS_TOP_LEVEL)
   set(CMAKE_EXPORT_COMPILE_COMMANDS ON)
   set(CMAKE_CXX_STANDARD 20)

@@ -26,6 +26,6 @@ function(tav_add_room room)
     CXX_EXTENSIONS OFF
     CXX_VISIBILITY_PRESET hidden
     VISIBILITY_INLINES_HIDDEN ON
-    POSITION_INDEPENDENT_CODE ON)
+    POSITION_INDEPENDENT_CODE ${TAV_POSITION_INDEPENDENT})
   tav_harden(${room}_objects)
 endfunction()

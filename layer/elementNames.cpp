@@ -19,16 +19,6 @@ namespace tav::detail
 namespace
 {
 
-constexpr std::string_view kPlaceholder = "INVALID_ELEMENT";
-
-/// The constant of an element is its enum name without the blanks that a few of these have around them, and without the
-/// remark that one has behind it.
-std::string_view constantOf(std::string_view enumName) noexcept
-{
-  const std::string_view words = paths::withoutBlanks(enumName);
-  return words.substr(0, words.find(' '));
-}
-
 /// Whether a text may be an enum name or a constant: all of these begin so, and no tag does.
 bool isEnumLike(std::string_view name) noexcept
 {
@@ -44,7 +34,7 @@ void forEachElement(Visit visit)
   {
     for (const TAVElementEntry& entry : std::span(range->pEntries, static_cast<size_t>(range->count)))
     {
-      if (const std::string_view name = inside::enumNameOf(entry); name != kPlaceholder)
+      if (const std::string_view name = inside::enumNameOf(entry); paths::isElementName(name))
       {
         visit(static_cast<uint16_t>(entry.id), name, std::string_view(inside::tagNameOf(entry)));
       }
@@ -88,7 +78,7 @@ std::vector<uint16_t> idsNamed(std::string_view name, dictionary::OwnNames own)
   if (isEnumLike(name))
   {
     forEachElement([&](uint16_t id, std::string_view enumName, std::string_view /*tag*/) {
-      if (enumName == name || paths::withoutBlanks(enumName) == name || constantOf(enumName) == name)
+      if (enumName == name || paths::withoutBlanks(enumName) == name || paths::constantOf(enumName) == name)
       {
         ids.push_back(id);
       }

@@ -32,19 +32,13 @@ struct BuiltIn
   std::string_view name;
   std::string_view tag;
 
-  bool isElement() const noexcept { return name != "INVALID_ELEMENT"; } ///< and no placeholder
-  /// The name without the blanks and the remark that a few have around it, or behind.
-  std::string_view constant() const noexcept
-  {
-    const std::string_view words = detail::paths::withoutBlanks(name);
-    return words.substr(0, words.find(' '));
-  }
+  bool isElement() const noexcept { return detail::paths::isElementName(name); } ///< and no placeholder
 };
 
 inline bool isBuiltIn(uint16_t id) noexcept
 {
-  const BuiltIn entry{id, builtInName(id), {}};
-  return !entry.name.empty() && entry.isElement();
+  const std::string_view name = builtInName(id);
+  return !name.empty() && detail::paths::isElementName(name);
 }
 
 /// The place of the one entry that no lookup by its id finds, as one before it has the same id. The compiler finds it

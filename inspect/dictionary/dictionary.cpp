@@ -9,6 +9,7 @@
 
 #include "inspect/dictionary/builtIn.h"
 #include "inspect/dictionary/reader.h"
+#include "inspect/walk/order.h"
 #include "tav/inspect/phrases.hpp"
 #include "tav/inspect/problem.hpp"
 #include "tav/inspect/source.hpp"
@@ -78,13 +79,13 @@ struct Dictionary::State
   explicit State(std::vector<OwnElement> given)
       : elements(std::move(given))
   {
-    std::sort(elements.begin(), elements.end(), [](const auto& a, const auto& b) { return a.id < b.id; });
+    putInOrder(elements, [](const auto& a, const auto& b) { return a.id < b.id; });
     for (const OwnElement& element : elements)
     {
       names.push_back({element.id, element.tag});
       byTag.push_back(&element);
     }
-    std::sort(byTag.begin(), byTag.end(), [](const auto* a, const auto* b) { return a->tag < b->tag; });
+    putInOrder(byTag, [](const auto* a, const auto* b) { return a->tag < b->tag; });
   }
   State(const State&) = delete;
   State& operator=(const State&) = delete;

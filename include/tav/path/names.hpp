@@ -10,21 +10,29 @@
 #include <string_view>
 #include <vector>
 
-#include "tav/dictionary.hpp"
 #include "tav/path/decimal.hpp"
 
 namespace tav::detail::paths
 {
 
-/// The names of an entry: as they stand, and without the blanks that a few have around them.
-inline std::array<std::string_view, 5> namesOf(const dictionary::Entry& entry) noexcept
+/// The constant of an element by its enum name: without the blanks that a few of these have around them, and without
+/// the remark that one has behind it.
+inline std::string_view constantOf(std::string_view enumName) noexcept
 {
-  return {entry.tag, entry.name, entry.constant, withoutBlanks(entry.tag), withoutBlanks(entry.name)};
+  const std::string_view words = withoutBlanks(enumName);
+  return words.substr(0, words.find(' '));
 }
 
-inline bool isElement(const dictionary::Entry& entry) noexcept
+/// All that an entry of the dictionary is called.
+inline std::array<std::string_view, 5> namesOf(std::string_view tag, std::string_view enumName) noexcept
 {
-  return entry.constant != "INVALID_ELEMENT";
+  return {tag, enumName, constantOf(enumName), withoutBlanks(tag), withoutBlanks(enumName)};
+}
+
+/// Whether an enum name is an element's, and no placeholder's.
+constexpr bool isElementName(std::string_view enumName) noexcept
+{
+  return enumName != "INVALID_ELEMENT";
 }
 
 /// Whether a text is what a pattern describes: a star stands for any characters.

@@ -32,11 +32,11 @@ TEST(ElementNames, EveryNameOfAnEntryLeadsToItsId)
 {
   for (const Entry& entry : tav::dictionary::entries())
   {
-    if (!tav::detail::paths::isElement(entry))
+    if (!tav::detail::paths::isElementName(entry.name))
     {
       continue;
     }
-    for (const std::string_view name : tav::detail::paths::namesOf(entry))
+    for (const std::string_view name : tav::detail::paths::namesOf(entry.tag, entry.name))
     {
       const std::vector<uint16_t> ids = tav::detail::idsNamed(name);
       ASSERT_TRUE(std::binary_search(ids.begin(), ids.end(), entry.id)) << name;
@@ -50,9 +50,9 @@ std::map<std::string_view, std::vector<uint16_t>> idsByName()
   std::map<std::string_view, std::vector<uint16_t>> ids;
   for (const Entry& entry : tav::dictionary::entries())
   {
-    if (tav::detail::paths::isElement(entry))
+    if (tav::detail::paths::isElementName(entry.name))
     {
-      for (const std::string_view name : tav::detail::paths::namesOf(entry))
+      for (const std::string_view name : tav::detail::paths::namesOf(entry.tag, entry.name))
       {
         ids[name].push_back(entry.id);
       }

@@ -16,8 +16,8 @@ TEST(BuiltIn, AreTheEntriesThatProgramsHave)
     EXPECT_EQ(entry.id, expected.id);
     EXPECT_EQ(entry.name, expected.name);
     EXPECT_EQ(entry.tag, expected.tag);
-    EXPECT_EQ(entry.constant(), expected.constant);
-    EXPECT_EQ(entry.isElement(), detail::paths::isElement(expected));
+    EXPECT_EQ(detail::paths::constantOf(entry.name), expected.constant);
+    EXPECT_EQ(entry.isElement(), detail::paths::isElementName(expected.name));
   });
   EXPECT_EQ(place, dictionary::entries().size());
 }
