@@ -5,9 +5,9 @@
 
 #include "api/findElement.h"
 #include "api/rawWrite.h"
+#include "core/plainNodes.h"
 #include "core/stack.h"
 #include "core/step.h"
-#include "tav/core/search.hpp"
 #include "tav/probes.h"
 #include "trace/traceFrame.h"
 
@@ -55,42 +55,6 @@ uint32_t searchLevel(TAVHandle& handle, const Wanted& wanted, TAVHeader* previou
   }
 }
 
-/// The nodes of a level that a search has no need to look at closely: most of it, in a plain stream.
-class Others
-{
-public:
-  Others(const TAVHandle& handle, const core::Level& level, uint32_t elm, bool overGroups)
-      : elm_(elm), overGroups_(overGroups)
-  {
-    // That the handle has a block to read is known here.
-    if (level.fits && core::LibraryWay::isHostWith(handle, TAV_OPT_DIRECT))
-    {
-      start_ = level.start;
-      level_ = core::BlockLevel(core::BlockBytes<core::HostForm>(handle), level.end);
-    }
-  }
-
-  /// To the last of them behind a node, or from the level's start; false when there is none.
-  [[gnu::always_inline]] bool pass(bool first, core::Node& node) const
-  {
-    const uint64_t start = first ? start_ : node.is64 ? core::behind(node)
-                                                      : ~uint64_t{0};
-    uint8_t* spot = level_.at(start);
-    const uint8_t* const last = core::passOthers(level_, spot, elm_, overGroups_);
-    if (last != nullptr)
-    {
-      node = {static_cast<uint64_t>(last - level_.base), decodeFields(last, true, false), true};
-    }
-    return last != nullptr;
-  }
-
-private:
-  core::BlockLevel level_;
-  uint64_t start_ = 0;
-  uint32_t elm_;
-  bool overGroups_;
-};
-
 /// Looks through one level of the direct block as searchLevel does. Without a stack the level is the first.
 template<bool Wide>
 uint32_t searchBlock(TAVHandle& handle, const core::Level& children, const Wanted& wanted, const TAVHeader* previous,
@@ -103,12 +67,15 @@ uint32_t searchBlock(TAVHandle& handle, const core::Level& children, const Wante
   const bool shallow = depth > wanted.maxDepth;
   bool first = previous == nullptr;
   core::Node node = first ? core::Node{} : core::nodeOf(*previous);
-  const Others others(handle, level, elm, shallow);
+  const core::PlainNodes plain(handle, level);
+  const auto passOthers = [elm, shallow](const core::BlockLevel& places, uint8_t*& spot) {
+    return core::passOthers(places, spot, elm, shallow);
+  };
   for (;; first = false)
   {
     if constexpr (Wide)
     {
-      first = !others.pass(first, node) && first;
+      first = !plain.behind(first, node, passOthers) && first;
     }
     core::Place place = bytes.nowhere();
     const uint32_t rc = core::step<Wide>(bytes, level, first, node, place);

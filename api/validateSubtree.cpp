@@ -6,6 +6,7 @@
 #include "api/ownedHandle.h"
 #include "api/rawWrite.h"
 #include "api/walkGuard.h"
+#include "core/plainNodes.h"
 #include "core/stack.h"
 #include "core/step.h"
 #include "tav/probes.h"
@@ -103,8 +104,18 @@ uint32_t walkLevel(Walk& walk, const core::Node& parent, const core::Level& chil
   core::Node child = node;
   uint32_t rc = TAV_RC_OK;
   bool first = walk.descended;
+  const core::PlainNodes plain(walk.handle, level);
+  const auto passData = [&guard](const core::BlockLevel& places, uint8_t*& spot) {
+    const auto isAny = [](const auto& /*found*/) { return true; };
+    const auto visit = [&guard](const auto& found) { return guard.visit(found.offset()); };
+    return core::passNodes(places, spot, TAV_TYPE_HEADER64 + 1, isAny, visit);
+  };
   for (;; first = false)
   {
+    if (Wide && !containment)
+    {
+      first = !plain.behind(first, child, passData) && first;
+    }
     core::Place place = bytes.nowhere();
     rc = core::step<Wide>(bytes, level, first, child, place);
     if (rc != TAV_RC_OK) [[unlikely]]

@@ -9,25 +9,34 @@
 namespace tav::core
 {
 
-/// Passes over the nodes of a level in a block, from `spot` on, while each is whole, neither the element that is looked
-/// for nor one that ends a group, and its sibling is right behind it; groups only with `overGroups`. Returns the last
-/// of them, or null; `spot` becomes the place of what has to be looked at.
-[[gnu::always_inline]] inline const uint8_t* passOthers(const BlockLevel& level, uint8_t*& spot, uint32_t elm,
-                                                        bool overGroups)
+/// Passes over the nodes of a level in a block, from `spot` on, while each `isOther(node)`, is whole, of `leastType` at
+/// least, ends no group, has its sibling right behind it, and may be passed by `visit(node)`, which sees no node that
+/// the rest speaks against. Returns the last of them, or null; `spot` becomes the place of what has to be looked at.
+template<class IsOther, class Visit>
+[[gnu::always_inline]] inline const uint8_t* passNodes(const BlockLevel& level, uint8_t*& spot, uint32_t leastType,
+                                                       const IsOther& isOther, const Visit& visit)
 {
-  const uint32_t leastType = overGroups ? TAV_TYPE_HEADER32 : TAV_TYPE_HEADER64 + 1;
   const uint8_t* last = nullptr;
   for (Place place{}; level.find(spot, place); spot += kHeaderSize64 + load<uint64_t>(last))
   {
     const NodeFound<true> found{{spot, false}, place.offset};
-    if (found.elm() == elm || found.type() < leastType || !isBare(found) || !BlockLevel::holds(found.size(), place))
-        [[unlikely]]
+    if (!isOther(found) || found.type() < leastType || !isBare(found) || !BlockLevel::holds(found.size(), place) ||
+        !visit(found)) [[unlikely]]
     {
       break;
     }
     last = spot;
   }
   return last;
+}
+
+/// Passes over nodes that are not the element that is looked for; over groups only with `overGroups`.
+[[gnu::always_inline]] inline const uint8_t* passOthers(const BlockLevel& level, uint8_t*& spot, uint32_t elm,
+                                                        bool overGroups)
+{
+  const uint32_t leastType = overGroups ? TAV_TYPE_HEADER32 : TAV_TYPE_HEADER64 + 1;
+  const auto isOther = [elm](const NodeFound<true>& found) { return found.elm() != elm; };
+  return passNodes(level, spot, leastType, isOther, [](const NodeFound<true>& /*found*/) { return true; });
 }
 
 /// The first child of a group that is the element looked for, in a block in host order; false says nothing.

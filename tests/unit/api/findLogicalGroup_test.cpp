@@ -1,4 +1,3 @@
-#include <cstdlib>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
@@ -14,7 +13,6 @@ namespace
 using namespace test;
 using namespace tav;
 using testing::ElementsAre;
-using testing::ExitedWithCode;
 using testing::IsEmpty;
 
 using Path = std::vector<TAVPathEntry>;
@@ -442,80 +440,6 @@ TEST(FindLogicalGroupDepth, APathOf4000EntriesIsFollowedAndALongerOneRefused)
   EXPECT_EQ(tavFindLogicalGroup(0, reader.handle(), &parent, &param, &untouched.data), TAV_RC_NO_MEMORY);
   EXPECT_TRUE(untouched.isUntouched());
   EXPECT_EQ(allocations::live(), before);
-}
-
-/// Watches a search go round and leaves the process after so many rounds, without asking how long they take.
-struct Rounds
-{
-  static constexpr int kGoesRound = 42;
-  static constexpr int kWrongLevel = 43;
-  static constexpr int kMemoryGrows = 44;
-  static constexpr uint32_t kMany = 20000;
-  static constexpr uint32_t kSettled = 10000; // the stack has long refused to grow
-
-  uint32_t count = 0;
-  int64_t settled = 0;
-
-  static void sink(void* context, const KORTraceRecord* record)
-  {
-    auto& rounds = *static_cast<Rounds*>(context);
-    if (record->probe != probe::findLogicalGroup || record->kind != KOR_TRACE_VAR || record->point != 100)
-    {
-      return;
-    }
-    if (*static_cast<const uint32_t*>(record->pItems[0].pData) != 0)
-    {
-      std::_Exit(kWrongLevel);
-    }
-    ++rounds.count;
-    if (rounds.count == kSettled)
-    {
-      rounds.settled = allocations::live();
-    }
-    if (rounds.count == kMany)
-    {
-      std::_Exit(allocations::live() == rounds.settled ? kGoesRound : kMemoryGrows);
-    }
-  }
-};
-
-class MissedPath : public FindLogicalGroup
-{
-protected:
-  /// Does not return when the search is as it should be.
-  void searchForever(const Path& path)
-  {
-    Rounds rounds;
-    korTraceStart(&Rounds::sink, &rounds);
-    static_cast<void>(find(path));
-    korTraceStop();
-  }
-};
-INSTANTIATE_TEST_SUITE_P(Forms, MissedPath, testing::Values(Form{}, Form{.buffered = true}), kFormName);
-
-TEST_P(MissedPath, WithoutAMatchForItsFirstEntryTheSearchGoesRound)
-{
-  open(11);
-  writer.close();
-  writer.add(u32(12, 1));
-  read();
-  EXPECT_EXIT(searchForever({{0, 10}, {0, 20}}), ExitedWithCode(Rounds::kGoesRound), "");
-}
-
-TEST_P(MissedPath, ADataElementIsNoMatchForItsFirstEntry)
-{
-  writer.add(u32(10, 1));
-  writer.add(u32(11, 2));
-  read();
-  EXPECT_EXIT(searchForever({{0, 10}}), ExitedWithCode(Rounds::kGoesRound), "");
-}
-
-TEST_P(MissedPath, NorDoesAnEmptyParentOrABrokenWalkReturn)
-{
-  read();
-  EXPECT_EXIT(searchForever({{0, 10}}), ExitedWithCode(Rounds::kGoesRound), "");
-  parent.hdr64.size = 100; // nothing can be read there
-  EXPECT_EXIT(searchForever({{0, 10}}), ExitedWithCode(Rounds::kGoesRound), "");
 }
 
 } // namespace
