@@ -5,6 +5,7 @@
 #include <utility>
 
 #include "inspect/plan/partChain.h"
+#include "inspect/walk/progressSteps.h"
 #include "tav/inspect/checker.hpp"
 
 namespace tav::inspect
@@ -33,9 +34,9 @@ public:
     bool step()
     {
       const bool goesOn = checker.step();
-      if (goesOn && progress != nullptr && *progress)
+      if (goesOn)
       {
-        (*progress)(checker.position());
+        progress.at(checker.position());
       }
       return goesOn;
     }
@@ -45,7 +46,7 @@ public:
     bool leansOnDamage() const { return walker().leansOnDamage(); }
 
     Checker checker;
-    const std::function<void(uint64_t)>* progress;
+    ProgressSteps progress;
   };
 
   CheckJob(const Form& form, const CheckOptions& options, const Wanted& wanted)
@@ -53,12 +54,12 @@ public:
 
   std::unique_ptr<Walk> tryFrom(ByteSource& source, const Walker::State& state) const
   {
-    return begin(source, state, {}, false, nullptr);
+    return begin(source, state, {}, false, untold_);
   }
   std::unique_ptr<Walk> goOnFrom(ByteSource& source, const Walker::State& state) const
   {
     const auto sink = options_.sink ? options_.sink : [](const Finding&) {};
-    return begin(source, state, sink, rootEnded_, &options_.progress);
+    return begin(source, state, sink, rootEnded_, options_.progress);
   }
   void take(const Walk& walk)
   {
@@ -77,17 +78,18 @@ public:
 
 private:
   std::unique_ptr<Walk> begin(ByteSource& source, const Walker::State& state, Checker::Sink sink, bool rootEnded,
-                              const std::function<void(uint64_t)>* progress) const
+                              const std::function<void(uint64_t)>& progress) const
   {
     const auto wanted = [this](RuleId rule) { return wanted_[static_cast<size_t>(rule)]; };
     // NOLINTNEXTLINE(modernize-make-unique): clang 14 makes no aggregate of arguments in parentheses
-    return std::unique_ptr<Walk>(
-        new Walk{Checker(source, form_, wanted, std::move(sink), options_.style, state, rootEnded), progress});
+    return std::unique_ptr<Walk>(new Walk{
+        Checker(source, form_, wanted, std::move(sink), options_.style, state, rootEnded), ProgressSteps(progress)});
   }
 
   Form form_;
   const CheckOptions& options_;
   const Wanted& wanted_;
+  const std::function<void(uint64_t)> untold_{};
   CheckTotals totals_{};
   bool rootEnded_ = false;
 };

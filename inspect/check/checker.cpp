@@ -66,6 +66,12 @@ void Checker::found(RuleId rule, uint64_t offset, uint64_t length, std::string s
   }
 }
 
+template<class Say>
+[[gnu::noinline, gnu::cold]] void Checker::foundThat(RuleId rule, uint64_t length, const Say& say)
+{
+  found(rule, event_.offset, length, say());
+}
+
 std::string Checker::path() const
 {
   // So deep, a whole path is longer than anyone reads; the offset gives the place.
@@ -74,7 +80,7 @@ std::string Checker::path() const
 
 bool Checker::step()
 {
-  if (!walker_.next(event_))
+  if (!walker_.goOn(event_))
   {
     return false;
   }
@@ -83,20 +89,15 @@ bool Checker::step()
   case What::nodeBegin: beginNode(); break;
   case What::payload: checkText(); break;
   case What::extra:
-    found(RuleId::stringExtra, event_.offset, event_.length, "two bytes stand behind this string that no size counts");
+    foundThat(RuleId::stringExtra, event_.length,
+              [] { return "two bytes stand behind this string that no size counts"; });
     break;
   case What::padding: checkPadding(); break;
-  case What::pair:
-  {
-    const uint16_t type = event_.node.type();
-    const bool byString = type == TAV_TYPE_ASCII_STRING || event_.node.has(kExtra);
-    checkPair(event_.offset, dataDistance(event_.node.size()), byString);
-    break;
-  }
+  case What::pair: checkDataPair(); break;
   case What::nodeEnd: event_.node.isGroup() ? endGroup() : endNode(); break;
   case What::damaged:
     ++damages_;
-    placeIsTaken(event_.offset);
+    placeIsTaken();
     checkDamage();
     groups_.back().damagedTail = true;
     break;
@@ -106,20 +107,20 @@ bool Checker::step()
   return true;
 }
 
-void Checker::placeIsTaken(uint64_t offset)
+void Checker::placeIsTaken()
 {
   Group& group = groups_.back();
   if (group.ended && group.afterEnd == 0)
   {
-    group.afterEnd = offset;
-    found(RuleId::afterEnd, offset, 0, "stands behind the end element of the group around it");
+    group.afterEnd = event_.offset;
+    foundThat(RuleId::afterEnd, 0, [] { return "stands behind the end element of the group around it"; });
   }
 }
 
 void Checker::beginNode()
 {
   isEndElement(event_.node.elm()) ? ++endElements_ : ++nodes_;
-  placeIsTaken(event_.offset);
+  placeIsTaken();
   groups_.back().damagedTail = false;
   paddingCut_ = 0;
   checkHeader();
@@ -136,40 +137,41 @@ void Checker::beginNode()
 void Checker::checkHeader()
 {
   const Node& node = event_.node;
-  const uint64_t offset = node.offset();
   const uint64_t length = node.headerLength();
   if (node.has(kBadGroupType))
   {
-    found(RuleId::groupType, offset, length, "a group with a 32-bit header announces children with 64-bit headers");
+    foundThat(RuleId::groupType, length,
+              [] { return "a group with a 32-bit header announces children with 64-bit headers"; });
   }
   if (node.depth == 0 && !node.isGroup())
   {
-    found(RuleId::rootNoGroup, offset, length, "a data element outside any group");
+    foundThat(RuleId::rootNoGroup, length, [] { return "a data element outside any group"; });
   }
   if (!Prober::isNamed(node.elm()))
   {
-    found(RuleId::elementUnknown, offset, length,
-          "element " + std::to_string(node.elm()) + " is not in the dictionary");
+    foundThat(RuleId::elementUnknown, length,
+              [&] { return "element " + std::to_string(node.elm()) + " is not in the dictionary"; });
   }
   if (!node.isGroup() && !isDataType(node.header))
   {
-    found(RuleId::typeUnknown, offset, length, "type " + std::to_string(node.type()) + " is unknown");
+    foundThat(RuleId::typeUnknown, length, [&] { return "type " + std::to_string(node.type()) + " is unknown"; });
   }
   else if (!node.isGroup() && !sizeSuits(node.type(), node.size()))
   {
-    found(RuleId::sizeType, offset, length, sizeSentence(node.header));
+    foundThat(RuleId::sizeType, length, [&] { return sizeSentence(node.header); });
   }
   if (node.is64() && ((node.info() & TAV_INFO_ALIGNED8) != 0) != form_.aligned)
   {
-    found(RuleId::alignFlag, offset, length,
-          form_.aligned ? "does not announce padding, in a stream that is padded"
-                        : "announces padding, in a stream that is not padded");
+    foundThat(RuleId::alignFlag, length, [&] {
+      return form_.aligned ? "does not announce padding, in a stream that is padded"
+                           : "announces padding, in a stream that is not padded";
+    });
   }
   if (node.isGroup() && node.depth >= kMostNested && !deepTold_)
   {
     deepTold_ = true;
-    found(RuleId::tooDeep, offset, length,
-          "lies in " + counted(node.depth, "group") + "; the library can follow 3,999");
+    foundThat(RuleId::tooDeep, length,
+              [&] { return "lies in " + counted(node.depth, "group") + "; the library can follow 3,999"; });
   }
 }
 
@@ -211,6 +213,13 @@ void Checker::checkEndElement()
     const uint64_t before = node.offset() - groups_.back().node.payloadOffset();
     checkPair(node.payloadOffset(), groupDistance(before, node.is64()), false);
   }
+}
+
+void Checker::checkDataPair()
+{
+  const Node& node = event_.node;
+  const bool byString = node.type() == TAV_TYPE_ASCII_STRING || node.has(kExtra);
+  checkPair(event_.offset, dataDistance(node.size()), byString);
 }
 
 void Checker::checkPair(uint64_t offset, uint64_t expected, bool eitherOrder)
@@ -307,23 +316,33 @@ void Checker::checkDataEnd()
   const Node& node = event_.node;
   if (const uint64_t missing = missingPadding(event_, form_); missing != 0)
   {
-    paddingCut_ = event_.offset == source_.size() ? missing : 0;
-    found(RuleId::paddingMissing, node.payloadOffset() + node.size() + (node.has(kExtra) ? 2 : 0), 0,
-          counted(missing, "byte") + " of padding " + (missing == 1 ? "is" : "are") + " not there");
+    tellPadding(missing);
   }
   if (node.has(kNoPair))
   {
-    found(RuleId::pairMissing, event_.offset, 0, "announces an eye/size pair, but none is there");
+    foundThat(RuleId::pairMissing, 0, [] { return "announces an eye/size pair, but none is there"; });
   }
+}
+
+void Checker::tellPadding(uint64_t missing)
+{
+  const Node& node = event_.node;
+  paddingCut_ = event_.offset == source_.size() ? missing : 0;
+  found(RuleId::paddingMissing, node.payloadOffset() + node.size() + (node.has(kExtra) ? 2 : 0), 0,
+        counted(missing, "byte") + " of padding " + (missing == 1 ? "is" : "are") + " not there");
 }
 
 void Checker::checkClaim(uint64_t offset, bool boundary)
 {
   Group& group = groups_.back();
-  if (group.lastClaim == 0 || (boundary && offset < group.lastClaim))
+  if (group.lastClaim != 0 && !(boundary && offset < group.lastClaim))
   {
-    return;
+    tellClaim(group, offset);
   }
+}
+
+void Checker::tellClaim(Group& group, uint64_t offset)
+{
   const bool exact = offset == group.lastClaim;
   const RuleId rule = exact ? RuleId::afterEnd : RuleId::groupSize;
   findings_ += wanted_(rule) ? 1 : 0;

@@ -23,8 +23,9 @@ constexpr size_t kMostHits = size_t{64} * 1024; ///< that a part is remembered w
 struct Hit
 {
   size_t path;
-  size_t known;             ///< groups around the node that are around the part, too: their places are not known yet
-  std::vector<Node> line{}; ///< the steps behind those, the node last
+  size_t known; ///< groups around the node that are around the part, too: their places are not known yet
+  size_t first; ///< in the steps behind those of all hits: its own
+  size_t count; ///< of these, the node last
 };
 
 using Matchers = std::vector<PathMatcher>;
@@ -108,6 +109,7 @@ public:
     bool leansOnDamage() const { return looks_ || walker_.leansOnDamage(); }
 
     const std::vector<Hit>& hits() const { return hits_; }
+    std::span<const Node> stepsOf(const Hit& hit) const { return std::span(steps_).subspan(hit.first, hit.count); }
     Matchers takeMatchers() { return std::move(matchers_); }
 
   private:
@@ -161,7 +163,8 @@ public:
       {
         if (matchers_[i].matches(walker_, event_))
         {
-          hits_.push_back({i, known_, {line_.begin() + static_cast<ptrdiff_t>(known_), line_.end()}});
+          hits_.push_back({i, known_, steps_.size(), line_.size() - known_});
+          steps_.insert(steps_.end(), line_.begin() + static_cast<ptrdiff_t>(known_), line_.end());
         }
         reaches = reaches || matchers_[i].reachesBelow();
       }
@@ -181,6 +184,7 @@ public:
     std::bitset<65536> children_{}; ///< the ids in the groups around the part
     size_t kinds_ = 0;              ///< how many those are
     std::vector<Hit> hits_{};
+    std::vector<Node> steps_{}; ///< that lead to them
   };
 
   FindJob(const Form& form, std::span<const Path> paths, const PathWork& work, bool looks)
@@ -211,7 +215,7 @@ public:
     {
       if (isOpen(hit.path))
       {
-        tellHit(hit);
+        tellHit(hit, walk.stepsOf(hit));
       }
     }
   }
@@ -233,22 +237,28 @@ public:
   const std::vector<uint64_t>& found() const { return found_; }
 
 private:
-  void tellHit(const Hit& hit)
+  void tellHit(const Hit& hit, std::span<const Node> steps)
   {
-    std::vector<Node> line;
-    for (size_t i = 0; i < hit.known; ++i)
+    if (!work_.found)
     {
-      line.push_back(before_.frames[i + 1].node);
+      ++found_[hit.path];
+      return;
     }
-    line.insert(line.end(), hit.line.begin(), hit.line.end());
-    Node& counted = line[hit.known];
-    counted.ordinal += countBefore(before_, hit.known, counted.elm());
+    Node node = steps.back();
+    node.ordinal += steps.size() == 1 ? countBefore(before_, hit.known, node.elm()) : 0;
+    tell({hit.path, node, *source_, form_, [&](PathStyle style) { return pathOfHit(hit, steps, style); }});
+  }
+
+  /// The first step behind the groups around the part was counted from the part's beginning.
+  std::string pathOfHit(const Hit& hit, std::span<const Node> steps, PathStyle style) const
+  {
     const Dictionary& dictionary = source_->dictionary();
-    tell({hit.path, line.back(), *source_, form_, [&line, &dictionary](PathStyle style) {
-            return textOfSteps(line.size(), style, [&](std::string& text, uint64_t i) {
-              appendStep(text, line[static_cast<size_t>(i)], dictionary);
-            });
-          }});
+    return textOfSteps(hit.known + steps.size(), style, [&](std::string& text, uint64_t i) {
+      const auto level = static_cast<size_t>(i);
+      Node step = level < hit.known ? before_.frames[level + 1].node : steps[level - hit.known];
+      step.ordinal += i == hit.known ? countBefore(before_, hit.known, step.elm()) : 0;
+      appendStep(text, step, dictionary);
+    });
   }
 
   void tell(const PathMatch& match)

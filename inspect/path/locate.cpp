@@ -55,9 +55,22 @@ void goToOffset(ByteSource& source, Walker& walker, Event& event, uint64_t offse
   }
 }
 
-bool goToMatch(Walker& walker, PathMatcher& matcher, Event& event, const Seen& seen)
+namespace
 {
-  while (walker.next(event))
+
+const Walker& walkerOf(const Walker& walker)
+{
+  return walker;
+}
+const Walker& walkerOf(const StreamWalk& walk)
+{
+  return walk.walker();
+}
+
+template<class Walk>
+bool goOnToMatch(Walk& walk, PathMatcher& matcher, Event& event, const Seen& seen)
+{
+  while (walk.next(event))
   {
     if (seen)
     {
@@ -67,16 +80,28 @@ bool goToMatch(Walker& walker, PathMatcher& matcher, Event& event, const Seen& s
     {
       continue;
     }
-    if (matcher.matches(walker, event))
+    if (matcher.matches(walkerOf(walk), event))
     {
       return true;
     }
     if (event.node.isGroup() && !matcher.reachesBelow())
     {
-      walker.skip();
+      walk.skip();
     }
   }
   return false;
+}
+
+} // namespace
+
+bool goToMatch(Walker& walker, PathMatcher& matcher, Event& event, const Seen& seen)
+{
+  return goOnToMatch(walker, matcher, event, seen);
+}
+
+bool goToMatch(StreamWalk& walk, PathMatcher& matcher, Event& event, const Seen& seen)
+{
+  return goOnToMatch(walk, matcher, event, seen);
 }
 
 } // namespace tav::inspect

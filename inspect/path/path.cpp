@@ -3,10 +3,12 @@
 #include <algorithm>
 #include <array>
 #include <charconv>
+#include <functional>
 #include <unordered_map>
 
 #include "inspect/dictionary/builtIn.h"
 #include "inspect/path/names.h"
+#include "inspect/walk/order.h"
 #include "tav/inspect/phrases.hpp"
 #include "tav/inspect/problem.hpp"
 #include "tav/inspect/similar.hpp"
@@ -38,9 +40,7 @@ const Names& names()
   static const Names table = [] {
     Names made;
     forEachBuiltIn([&made](const BuiltIn& entry) {
-      const std::string_view all[] = {entry.tag, entry.name, entry.constant(), paths::withoutBlanks(entry.tag),
-                                      paths::withoutBlanks(entry.name)};
-      for (const std::string_view name : all)
+      for (const std::string_view name : paths::namesOf(entry.tag, entry.name))
       {
         auto& ids = made[name];
         if (entry.isElement() && std::find(ids.begin(), ids.end(), entry.id) == ids.end())
@@ -223,7 +223,7 @@ std::string similarNames(std::string_view name, const Dictionary& dictionary)
   {
     consider(element.tag);
   }
-  std::sort(close.begin(), close.end());
+  putInOrder(close, std::less<>());
   close.erase(std::unique(close.begin(), close.end()), close.end());
   std::string text;
   for (size_t i = 0; i < std::min<size_t>(3, close.size()); ++i)

@@ -1,8 +1,10 @@
 #include "inspect/table/automaton.h"
 
 #include <algorithm>
+#include <functional>
 #include <utility>
 
+#include "inspect/walk/order.h"
 #include "tav/layout.hpp"
 
 namespace tav::inspect
@@ -134,7 +136,7 @@ uint32_t Automaton::makeMove(uint32_t state, uint16_t elm, int isRow)
     return a.up != b.up ? a.up < b.up : a.column < b.column;
   };
   const auto isSame = [](const Target& a, const Target& b) { return a.up == b.up && a.column == b.column; };
-  std::sort(met.targets.begin(), met.targets.end(), isLess);
+  putInOrder(met.targets, isLess);
   met.targets.erase(std::unique(met.targets.begin(), met.targets.end(), isSame), met.targets.end());
   Move move{.elm = elm, .isRow = met.isRow, .targetCount = static_cast<uint32_t>(met.targets.size())};
   if (!met.targets.empty())
@@ -154,7 +156,7 @@ uint32_t Automaton::makeMove(uint32_t state, uint16_t elm, int isRow)
 
 uint32_t Automaton::stateOf(Key key)
 {
-  std::sort(key.threads.begin(), key.threads.end());
+  putInOrder(key.threads, std::less<>());
   key.threads.erase(std::unique(key.threads.begin(), key.threads.end()), key.threads.end());
   const auto [found, isNew] = numbers_.try_emplace(std::move(key), static_cast<uint32_t>(states_.size()));
   if (isNew)

@@ -8,11 +8,11 @@
 #include <span>
 #include <vector>
 
-#include "inspect/document/streamWalk.h"
 #include "inspect/path/walkedTree.h"
 #include "inspect/plan/partState.h"
 #include "inspect/table/filling.h"
 #include "inspect/walk/exactWalk.h"
+#include "tav/inspect/streamWalk.hpp"
 #include "tav/inspect/table.hpp"
 
 namespace tav::inspect

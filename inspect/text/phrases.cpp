@@ -1,8 +1,5 @@
 #include "tav/inspect/phrases.hpp"
 
-#include <cstdio>
-#include <iterator>
-
 #include "tav/codes.h"
 
 namespace tav::inspect
@@ -48,15 +45,24 @@ std::string byteText(uint64_t bytes)
   {
     return counted(bytes, "byte");
   }
-  double value = static_cast<double>(bytes) / 1024;
+  unsigned shift = 10;
   size_t unit = 0;
-  while (value >= 1024 && unit + 1 < std::size(units))
+  while (bytes >> shift >= 1024)
   {
-    value /= 1024;
+    shift += 10;
     ++unit;
   }
-  char text[32];
-  std::snprintf(text, sizeof text, "%.1f %s", value, units[unit]);
+  // Tenths, and what is left of the tenth below: a half goes to the even one, as printf has it.
+  const uint64_t part = (bytes & ((uint64_t{1} << shift) - 1)) * 10;
+  const uint64_t half = uint64_t{1} << (shift - 1);
+  const uint64_t left = part & ((uint64_t{1} << shift) - 1);
+  uint64_t tenths = (bytes >> shift) * 10 + (part >> shift);
+  tenths += left > half || (left == half && tenths % 2 != 0) ? 1 : 0;
+  std::string text = std::to_string(tenths / 10);
+  text += '.';
+  text += static_cast<char>('0' + tenths % 10);
+  text += ' ';
+  text += units[unit];
   return text;
 }
 

@@ -4,6 +4,7 @@
 #include <limits>
 #include <list>
 
+#include "inspect/walk/order.h"
 #include "inspect/walk/prober.h"
 #include "inspect/walk/reasons.h"
 #include "inspect/walk/trial.h"
@@ -46,7 +47,7 @@ std::vector<Form> candidates(const FormChoice& choice)
 /// The likelier way first. The first of equals stays first: without padding before with padding.
 void sortTrials(std::vector<Trial>& trials)
 {
-  std::stable_sort(trials.begin(), trials.end(), [](const Trial& a, const Trial& b) {
+  putFewInOrder(trials, [](const Trial& a, const Trial& b) {
     return (a.nodes != 0) != (b.nodes != 0) ? a.nodes != 0
            : a.sureness() != b.sureness()   ? a.sureness() > b.sureness()
                                             : a.rate() < b.rate();
@@ -81,15 +82,23 @@ enum class Effort : uint8_t
 };
 
 /// The ways in the order in which they are tried: first those with the padding that the root's header announces.
-std::vector<Form> likelyFirst(ByteSource& source, std::vector<Form> forms)
+std::vector<Form> likelyFirst(ByteSource& source, const std::vector<Form>& forms)
 {
-  std::stable_partition(forms.begin(), forms.end(), [&](const Form& form) {
+  std::vector<Form> ordered;
+  std::vector<Form> others;
+  for (const Form& form : forms)
+  {
     TAVHeader root{};
     const Prober prober(source, form, 0);
-    return readRoot(prober, 0, form.root64, source.size(), root) &&
-           form.aligned == ((infoOf(root) & TAV_INFO_ALIGNED8) != 0);
-  });
-  return forms;
+    const bool likely = readRoot(prober, 0, form.root64, source.size(), root) &&
+                        form.aligned == ((infoOf(root) & TAV_INFO_ALIGNED8) != 0);
+    (likely ? ordered : others).push_back(form);
+  }
+  for (const Form& form : others)
+  {
+    ordered.push_back(form);
+  }
+  return ordered;
 }
 
 /// Whether other ways may be given up for one: nothing is damaged on it, and its start is sound. Of the others, it then
@@ -303,6 +312,19 @@ Recognition recognise(ByteSource& source, const FormChoice& choice)
 Recognition recogniseByAll(ByteSource& source, const FormChoice& choice)
 {
   return judgeTrials(source, choice, tryAll(source, choice, Effort::whole));
+}
+
+std::optional<Form> streamFormAt(ByteSource& source, const Form& form, uint64_t offset)
+{
+  constexpr uint64_t ringBytes = uint64_t{1} << 20U;
+  const std::optional<Form> seen = otherStreamAt(source, form, offset);
+  if (!seen)
+  {
+    return std::nullopt;
+  }
+  const auto behind = source.window(offset, ringBytes);
+  const Recognition found = recognise(*behind, {.swapped = seen->swapped, .root64 = seen->root64});
+  return found.isStream && !found.damagedStart && !found.ambiguous() ? found.form : *seen;
 }
 
 } // namespace tav::inspect

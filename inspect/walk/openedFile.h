@@ -2,10 +2,8 @@
 /// Opening a file for a source of bytes.
 #pragma once
 
-#include <filesystem>
 #include <memory>
 #include <string>
-#include <system_error>
 
 #include "tav/inspect/problem.hpp"
 #include "tav/inspect/source.hpp"
@@ -18,11 +16,6 @@ namespace tav::inspect
 template<class File = TAVSSFile>
 std::unique_ptr<File> openedFile(const std::string& path)
 {
-  std::error_code error;
-  if (std::filesystem::is_directory(std::filesystem::path(std::u8string(path.begin(), path.end())), error))
-  {
-    failAt(path, KOR_RC_IS_FOLDER);
-  }
   KORFileOpenParam param;
   param.pPath = path.c_str();
   param.options = KOR_FILE_READ;

@@ -252,7 +252,7 @@ bool Prober::isFollowed(const TAVHeader& node, uint64_t limit) const
     return limit == source_.size(); // the last padding of a file was not written
   }
   return isFollowedAt(end, wide, limit) ||
-         (typeOf(node) == TAV_TYPE_UTF8_STRING && end < limit && isFollowedAt(end + 2, wide, limit));
+         (typeOf(node) == TAV_TYPE_UTF8_STRING && isFollowedAt(end + 2, wide, limit));
 }
 
 bool Prober::isChain(uint64_t offset, bool wide, uint64_t limit, bool toTheEnd) const

@@ -45,6 +45,18 @@ private:
   uint64_t from_;
 };
 
+/// The file under a storage, for its holes. Null where there is none or, without type information, where nobody can
+/// tell: then zeros are read as any other bytes.
+KORHFile* fileUnder([[maybe_unused]] const TAVSideStorage& storage)
+{
+#if defined(__cpp_rtti)
+  const auto* const file = dynamic_cast<const TAVSSFile*>(&storage);
+  return file != nullptr ? file->pFile : nullptr;
+#else
+  return nullptr;
+#endif
+}
+
 } // namespace
 
 ByteSource::ByteSource(std::string name, std::unique_ptr<TAVSideStorage> storage, uint64_t ringBytes, uint64_t from,
@@ -61,10 +73,7 @@ ByteSource::ByteSource(std::string name, std::unique_ptr<TAVSideStorage> storage
   {
     failAt(name_, code);
   }
-  if (const auto* const file = dynamic_cast<const TAVSSFile*>(storage_.get()); file != nullptr)
-  {
-    file_ = file->pFile;
-  }
+  file_ = fileUnder(*storage_);
   if (from_ != 0)
   {
     startAt();

@@ -81,9 +81,6 @@ uint64_t Walker::spent() const
 void Walker::queue(What what, uint64_t offset, uint64_t length)
 {
   queue_[queueCount_++] = {what, offset, length};
-  shared_.end = End::closed;
-  shared_.depth = frames_.size() - 1 + above_;
-  shared_.code = TAV_RC_OK;
 }
 
 bool Walker::next(Event& event)
@@ -115,6 +112,21 @@ bool Walker::next(Event& event)
   return true;
 }
 
+bool Walker::goOn(Event& event)
+{
+  if (queueHead_ == queueCount_)
+  {
+    return next(event);
+  }
+  const Piece& piece = queue_[queueHead_++];
+  event.what = piece.what;
+  event.offset = piece.offset;
+  event.length = piece.length;
+  event.reason.clear();
+  canSkip_ = false; // a group's header is the first piece that a step finds
+  return true;
+}
+
 bool Walker::skip()
 {
   const Frame& top = frames_.back();
@@ -130,6 +142,8 @@ bool Walker::skip()
   if (position_ < top.limit)
   {
     queue(What::skipped, position_, top.limit - position_);
+    shared_.end = End::closed;
+    shared_.code = TAV_RC_OK;
     shared_.node = top.node;
     shared_.depth = top.node.depth;
     position_ = top.limit;
@@ -155,6 +169,9 @@ bool Walker::endIsSure()
 
 void Walker::step()
 {
+  shared_.end = End::closed;
+  shared_.depth = frames_.size() - 1 + above_;
+  shared_.code = TAV_RC_OK;
   if (endPending_)
   {
     endPending_ = false;
@@ -318,10 +335,6 @@ void Walker::beginGroup(Node& node)
 bool Walker::extraBehind(const Node& node, uint64_t base, uint64_t limit)
 {
   const Frame& top = frames_.back();
-  if (node.type() != TAV_TYPE_UTF8_STRING || limit - base < 2)
-  {
-    return false;
-  }
   uint64_t distance = 0;
   bool without = false;
   bool with = false;
@@ -366,7 +379,7 @@ void Walker::takeData(Node& node)
   const uint64_t end = start + node.size();
   const uint64_t padded = std::min(limit, addSaturated(start, prober_->paddedSize(node.header)));
   node.limit = end;
-  if (extraBehind(node, padded, limit))
+  if (node.type() == TAV_TYPE_UTF8_STRING && limit - padded >= 2 && extraBehind(node, padded, limit))
   {
     node.flags |= kExtra;
   }

@@ -72,6 +72,8 @@ private:
 
   void enter(const Node& node);
   void found(RuleId rule, uint64_t offset, uint64_t length, std::string sentence, bool otherStream = false);
+  template<class Say>
+  void foundThat(RuleId rule, uint64_t length, const Say& say);
   void beginNode();
   void beginGroup();
   void endNode();
@@ -82,14 +84,17 @@ private:
   void checkOverrun(const Group& group);
   void checkEndElement();
   void checkDataEnd();
+  void tellPadding(uint64_t missing);
+  void checkDataPair();
   void checkPair(uint64_t offset, uint64_t expected, bool eitherOrder);
   void checkText();
   void checkClaim(uint64_t offset, bool boundary);
+  void tellClaim(Group& group, uint64_t offset);
   void checkPadding();
   void checkDamage();
   bool checkCutHeader();
   void checkZeros();
-  void placeIsTaken(uint64_t offset);
+  void placeIsTaken();
 
   ByteSource& source_;
   Form form_;

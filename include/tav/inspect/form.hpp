@@ -51,6 +51,9 @@ TAV_INSPECT_API Recognition recognise(ByteSource& source, const FormChoice& choi
 /// cannot be told.
 TAV_INSPECT_API std::optional<Form> otherStreamAt(ByteSource& source, const Form& form, uint64_t offset);
 
+/// The same, but its own bytes tell about the padding: for who goes on there. Reads up to 1 MiB of it.
+TAV_INSPECT_API std::optional<Form> streamFormAt(ByteSource& source, const Form& form, uint64_t offset);
+
 /// What to say of it.
 TAV_INSPECT_API std::string otherStreamText(const Form& form);
 

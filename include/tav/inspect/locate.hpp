@@ -9,6 +9,7 @@
 
 #include "tav/inspect/api.hpp"
 #include "tav/inspect/path.hpp"
+#include "tav/inspect/streamWalk.hpp"
 #include "tav/inspect/walker.hpp"
 
 namespace tav::inspect
@@ -31,5 +32,6 @@ TAV_INSPECT_API void goToOffset(ByteSource& source, Walker& walker, Event& event
 /// Walks on to the next node that the path leads to; false when there is none any more. The matcher must have been
 /// given every node of the walk so far.
 TAV_INSPECT_API bool goToMatch(Walker& walker, PathMatcher& matcher, Event& event, const Seen& seen = {});
+TAV_INSPECT_API bool goToMatch(StreamWalk& walk, PathMatcher& matcher, Event& event, const Seen& seen = {});
 
 } // namespace tav::inspect

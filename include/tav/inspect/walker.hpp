@@ -110,6 +110,8 @@ public:
 
   /// The next event; false at the end of the file.
   TAV_INSPECT_API bool next(Event& event);
+  /// The same for who hands in what the last call has filled, unchanged: of a node, only what is another is written.
+  TAV_INSPECT_API bool goOn(Event& event);
 
   /// Directly after the nodeBegin of a group: hands out its children as one `skipped` piece. False, and no effect, for
   /// a group whose end is not known without walking it: it was never closed, or what is at its end, or behind it,

@@ -102,6 +102,30 @@ TEST_P(Searching, ATextThatNodesFillIsNotBelieved)
   EXPECT_FALSE(believes({Footing::sound}));
 }
 
+TEST_P(Searching, ATextThatNodesFillIsNotBelievedForAPairThatIsDamaged)
+{
+  for (const uint64_t filled : {uint64_t{40}, uint64_t{41}})
+  {
+    rows = ByteRows(GetParam());
+    rows.h64(filled, TAV_INFO_EYE_SIZE, TAV_TYPE_ASCII_STRING, TAV_ELM_CMN_HOST_NAME);
+    number();
+    number();
+    rows.fill(filled - 40, 'a').pair(16);
+    Searched it(rows.bytes, form);
+    Candidate found = it.judge.look(0, true);
+    ASSERT_EQ(found.trust, Trust::followed);
+    EXPECT_EQ(it.search.believe(found, Footing::sound), filled != 40) << "they end before its end";
+  }
+}
+
+TEST_P(Searching, FindsANodeOfNoMoreThanItsHeaderAtTheEndOfTheFile)
+{
+  rows.fill(12, 0x5A).h32(0, TAV_TYPE_ASCII_STRING, TAV_ELM_CMN_HOST_NAME);
+  EXPECT_EQ(Searched(rows.bytes, form).search.firstSure(0, rows.at(), false), 12U);
+  rows.bytes.pop_back();
+  EXPECT_EQ(Searched(rows.bytes, form).search.firstSure(0, rows.at(), false), rows.at());
+}
+
 TEST_P(Searching, BytesThatNodesFillAreBelieved)
 {
   around(TAV_TYPE_BINARY);

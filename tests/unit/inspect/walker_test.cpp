@@ -6,6 +6,7 @@
 
 #include "inspect/streams.h"
 #include "support/byteRows.h"
+#include "support/writtenDown.h"
 
 using namespace tav::inspect;
 using test::Bytes;
@@ -21,9 +22,13 @@ std::vector<Event> walked(const Bytes& bytes, const tav::inspect::Form& form)
   std::vector<Event> events;
   std::vector<uint64_t> open;
   uint64_t position = 0;
+  Walker other(source, form);
   Event event;
+  Event same;
   while (walker.next(event))
   {
+    EXPECT_TRUE(other.goOn(same));
+    EXPECT_EQ(test::writtenDown(same), test::writtenDown(event));
     EXPECT_EQ(event.offset, position);
     position += event.what == What::nodeEnd ? 0 : event.length;
     if (event.what == What::nodeBegin)
@@ -38,6 +43,7 @@ std::vector<Event> walked(const Bytes& bytes, const tav::inspect::Form& form)
     }
     events.push_back(event);
   }
+  EXPECT_FALSE(other.goOn(same));
   EXPECT_EQ(position, bytes.size());
   EXPECT_TRUE(open.empty());
   return events;
@@ -250,6 +256,31 @@ TEST(Recognise, TellsWhereAStreamInAnotherFormBegins)
     told += reason.other ? 1 : 0;
   }
   EXPECT_EQ(told, 1U);
+}
+
+TEST(Walker, GoesOnAsBeforeBehindChildrenThatWereSkipped)
+{
+  for (uint64_t seed = 0; seed < 100; ++seed)
+  {
+    SCOPED_TRACE(seed);
+    const test::Tree tree = test::randomTree(seed);
+    const Bytes bytes = test::bytesOfTree(tree);
+    ByteSource source("x", std::span<const uint8_t>(bytes));
+    Walker one(source, test::readForm(tree.form));
+    Walker other(source, test::readForm(tree.form));
+    Event event;
+    Event same;
+    while (one.next(event))
+    {
+      ASSERT_TRUE(other.goOn(same));
+      ASSERT_EQ(test::writtenDown(same), test::writtenDown(event));
+      if (event.what == What::nodeBegin && event.depth % 2 == 1)
+      {
+        ASSERT_EQ(one.skip(), other.skip());
+      }
+    }
+    EXPECT_FALSE(other.goOn(same));
+  }
 }
 
 TEST(DamageWatch, TellsOfAStreamInAnotherForm)
