@@ -26,9 +26,9 @@ private:
   void watchFile();
 
   std::string path_;
-  std::string name_{};       ///< the last part of the path
-  intptr_t descriptor_ = -1; ///< of the system's watch; -1: there is none
-  int32_t folder_ = -1;      ///< the watch on the folder
+  std::string name_{};                        ///< the last part of the path
+  [[maybe_unused]] intptr_t descriptor_ = -1; ///< of the system's watch; -1: there is none
+  [[maybe_unused]] int32_t folder_ = -1;      ///< the watch on the folder
 };
 
 } // namespace tav::kor

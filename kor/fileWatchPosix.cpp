@@ -3,7 +3,7 @@
 #include <chrono>
 #include <thread>
 
-#if __has_include(<sys/inotify.h>)
+#if __has_include(<sys/inotify.h>) && !defined(__EMSCRIPTEN__) // whose library has the header alone
 #include <array>
 #include <cstring>
 #include <poll.h>

@@ -1,6 +1,9 @@
 #include "tav/inspect/follow.hpp"
 
 #include <chrono>
+#include <functional>
+#include <memory>
+#include <utility>
 
 #include "inspect/document/follower.h"
 #include "inspect/document/state.h"
@@ -23,47 +26,91 @@ Error notFollowed(const std::string& name)
                        .code = TAV_RC_NOT_SUPPORTED});
 }
 
-FollowEnd goOnFollowing(Follower& follower, const std::string& path, const FollowOptions& how,
-                        const std::function<void()>& caughtUp)
-{
-  using Clock = std::chrono::steady_clock;
-  constexpr std::chrono::milliseconds longestWait(100); // how long a stop, or what no watch says of, can take
-  kor::FileWatch watch(path);
-  const auto look = [&](bool quiet) {
-    const uint64_t count = follower.goOn(quiet);
-    if (caughtUp)
-    {
-      caughtUp();
-    }
-    return count;
-  };
-  look(!how.existing);
-  auto last = Clock::now();
-  while (!how.stop.stop_requested())
-  {
-    watch.wait(static_cast<uint32_t>(longestWait.count()));
-    const uint64_t count = look(false);
-    const auto now = Clock::now();
-    last = count != 0 ? now : last;
-    if (how.timeout.count() != 0 && now - last >= how.timeout)
-    {
-      return FollowEnd::timedOut;
-    }
-  }
-  return FollowEnd::stopped;
-}
+constexpr uint64_t kAll = ~uint64_t{0};
 
 } // namespace
 
-FollowEnd follow(const std::string& path, const FollowTold& told, const DocumentOptions& options,
-                 const FollowOptions& how)
+/// A follower, and what says when it is to look.
+class Following::Work
+{
+public:
+  template<class Told>
+  Work(const std::string& path, const Told& told, const DocumentOptions& options, const FollowOptions& how,
+       std::function<void()> caughtUp)
+      : follower_(path, options, told, how.stop), watch_(path), caughtUp_(std::move(caughtUp)), isQuiet_(!how.existing)
+  {
+  }
+
+  uint64_t look(uint64_t most)
+  {
+    const uint64_t count = follower_.goOn(isQuiet_, most);
+    if (count < most)
+    {
+      isQuiet_ = false;
+      if (caughtUp_)
+      {
+        caughtUp_();
+      }
+    }
+    return count;
+  }
+  void wait(std::chrono::milliseconds longest) { watch_.wait(static_cast<uint32_t>(longest.count())); }
+
+  FollowEnd run(const FollowOptions& how)
+  {
+    using Clock = std::chrono::steady_clock;
+    constexpr std::chrono::milliseconds longestWait(100); // how long a stop, or what no watch says of, can take
+    look(kAll);
+    auto last = Clock::now();
+    while (!how.stop.stop_requested())
+    {
+      wait(longestWait);
+      const uint64_t count = look(kAll);
+      const auto now = Clock::now();
+      last = count != 0 ? now : last;
+      if (how.timeout.count() != 0 && now - last >= how.timeout)
+      {
+        return FollowEnd::timedOut;
+      }
+    }
+    return FollowEnd::stopped;
+  }
+
+private:
+  Follower follower_;
+  kor::FileWatch watch_;
+  std::function<void()> caughtUp_;
+  bool isQuiet_; ///< what is there already is passed over
+};
+
+Following::Following(const std::string& path, const FollowTold& told, const DocumentOptions& options,
+                     const FollowOptions& how)
 {
   if (options.from != 0)
   {
     throw notFollowed(path);
   }
-  Follower follower(path, options, told, how.stop);
-  return goOnFollowing(follower, path, how, told.caughtUp);
+  work_ = std::make_unique<Work>(path, told, options, how, told.caughtUp);
+}
+
+Following::~Following() = default;
+
+Following::Following(Following&&) noexcept = default;
+
+uint64_t Following::look(uint64_t most)
+{
+  return work_->look(most);
+}
+
+void Following::wait(std::chrono::milliseconds longest)
+{
+  work_->wait(longest);
+}
+
+FollowEnd follow(const std::string& path, const FollowTold& told, const DocumentOptions& options,
+                 const FollowOptions& how)
+{
+  return Following(path, told, options, how).work_->run(how);
 }
 
 FollowEnd Document::follow(const std::function<void(const tav::Node&)>& onNode, const FollowOptions& options) const
@@ -72,8 +119,7 @@ FollowEnd Document::follow(const std::function<void(const tav::Node&)>& onNode, 
   {
     throw notFollowed(state_->source->name());
   }
-  Follower follower(state_->path, state_->options, onNode, options.stop);
-  return goOnFollowing(follower, state_->path, options, {});
+  return Following::Work(state_->path, onNode, state_->options, options, {}).run(options);
 }
 
 std::string pathText(const Arrival& arrival, PathStyle style)

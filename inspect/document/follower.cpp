@@ -82,10 +82,11 @@ void Follower::beginAnew()
   reached_ = 0;
 }
 
-uint64_t Follower::goOn(bool quiet)
+uint64_t Follower::goOn(bool quiet, uint64_t most)
 {
   quiet_ = quiet;
   count_ = 0;
+  most_ = most;
   if (file_ == nullptr && !open())
   {
     return 0;
@@ -95,7 +96,7 @@ uint64_t Follower::goOn(bool quiet)
     tellChange(FileChange::appeared);
   }
   readOn();
-  if (!followed_->pFile->isAt(path_.c_str()))
+  if (count_ < most_ && !followed_->pFile->isAt(path_.c_str()))
   {
     goOver();
   }
@@ -106,7 +107,7 @@ uint64_t Follower::goOn(bool quiet)
 void Follower::goOver()
 {
   readOn(); // what came before
-  if (open())
+  if (count_ < most_ && open())
   {
     tellChange(std::exchange(isMissing_, false) ? FileChange::appeared : FileChange::replaced);
     readOn();
@@ -168,7 +169,7 @@ void Follower::readOn()
     {
       tellChange(FileChange::shortened);
       beginAnew();
-      isCut = !stop_.stop_requested();
+      isCut = goesOn();
     }
   }
   reader_.reset();
@@ -184,6 +185,28 @@ void Follower::look()
     failAt(path_, code);
   }
   now_ = file_->window(0, kRingBytes);
+}
+
+/// Forgets what was read at this look: the file has changed meanwhile.
+void Follower::readAgain()
+{
+  reader_.reset();
+  now_ = file_->window(0, kRingBytes);
+}
+
+/// Whether a header is not yet what was read of the file before.
+bool Follower::isNew(const TAVHeader& header) const
+{
+  std::array<uint8_t, layout::kHeaderSize64> bytes{};
+  const auto length = static_cast<size_t>(layout::headerLength(header.hdrType));
+  TAVHeader known = header;
+  if (now_->read(header.nodeOffset, std::span(bytes).first(length)) == length)
+  {
+    layout::decodeHeader(bytes.data(), layout::is64(header), form_->swapped, known);
+    known.nodeOffset = header.nodeOffset;
+    return !isSameNode(known, header) || layout::sizeOf(known) != layout::sizeOf(header);
+  }
+  return true;
 }
 
 void Follower::reach(uint64_t end)
@@ -205,7 +228,7 @@ void Follower::readToEnd()
   {
     return;
   }
-  while (!stop_.stop_requested() && form_ && (levels_.empty() ? nextRoot() : nextChild()))
+  while (goesOn() && form_ && (levels_.empty() ? nextRoot() : nextChild()))
   {
   }
 }
@@ -284,6 +307,7 @@ bool Follower::nextChild()
 /// A node was read where the next child of the innermost group would be. It is one unless the group was closed before.
 bool Follower::takeChild(const TAVHeader& child)
 {
+  isReadAgain_ = false;
   if (layout::isSizeUnknown(levels_.back().group) && refresh())
   {
     return true;
@@ -316,6 +340,12 @@ bool Follower::waits(uint32_t rc, bool isLarge)
   if (layout::isSizeUnknown(group) || end > followed_->end())
   {
     return true;
+  }
+  if (!std::exchange(isReadAgain_, true))
+  {
+    // What is in it may have been read before it was written, and that it is closed after.
+    readAgain();
+    return false;
   }
   tellCut(levels_.back(), end, rc);
   leave();
@@ -369,12 +399,17 @@ bool Follower::refresh()
     return true;
   }
   const bool isOther = layout::sizeOf(header) != layout::sizeOf(top.group);
+  if (isOther)
+  {
+    readAgain();
+  }
   top.group = header;
   return isOther;
 }
 
 void Follower::leave()
 {
+  isReadAgain_ = false;
   const TAVHeader group = levels_.back().group;
   levels_.pop_back();
   const Node node = above_.back();
@@ -435,6 +470,10 @@ void Follower::hand(const std::function<void(const Arrival&)>& to, const Node& n
   if (!to || quiet_)
   {
     return;
+  }
+  if (isNew(node.header))
+  {
+    now_ = file_->window(0, kRingBytes);
   }
   const bool isNearEnd = layout::addSaturated(node.limit, changing) > now_->size();
   const auto fresh = isNearEnd ? file_->window(0, ringBytes) : nullptr;

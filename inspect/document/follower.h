@@ -32,9 +32,9 @@ public:
   Follower(std::string path, const DocumentOptions& options, const FollowTold& told, StopToken stop)
       : path_(std::move(path)), options_(options), told_(told), stop_(std::move(stop)) {}
 
-  /// Reads all that is there now, also of a file that took the place. Returns how many nodes were new. With `quiet`
-  /// they are passed over. Throws Error, and what the callback throws.
-  uint64_t goOn(bool quiet = false);
+  /// Reads all that is there now, also of a file that took the place, but no more than `most` nodes. Returns how many
+  /// were new. With `quiet` they are passed over. Throws Error, and what the callback throws.
+  uint64_t goOn(bool quiet = false, uint64_t most = ~uint64_t{0});
 
   static uint64_t behindHeader(const TAVHeader& header);
 
@@ -61,6 +61,7 @@ private:
     std::vector<PassedOver> passed{}; ///< on the way
   };
 
+  bool goesOn() const { return !stop_.stop_requested() && count_ < most_; }
   bool open();
   void beginAnew();
   void readOn();
@@ -71,6 +72,9 @@ private:
   bool findForm();
   bool isSame();
   std::optional<FoundRoot> findRoot();
+  std::optional<FoundRoot> searchRoot(const Form& form, const WalkStart& start, bool isBehind);
+  void readAgain();
+  bool isNew(const TAVHeader& header) const;
   bool nextRoot();
   bool nextChild();
   bool takeChild(const TAVHeader& child);
@@ -111,7 +115,9 @@ private:
   std::vector<Level> levels_{};           ///< from the present root on; empty between roots
   std::vector<Node> above_{};             ///< the groups of the levels
   uint64_t reached_ = 0;                  ///< behind what was told of the last node: its header, or its payload
+  bool isReadAgain_ = false;              ///< the place, since nothing was there at first
   uint64_t count_ = 0;
+  uint64_t most_ = 0; ///< of them at this look
 };
 
 } // namespace tav::inspect

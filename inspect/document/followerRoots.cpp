@@ -3,8 +3,9 @@
 #include <utility>
 
 #include "inspect/document/follower.h"
-#include "inspect/document/streamWalk.h"
 #include "tav/inspect/fileKind.hpp"
+#include "tav/inspect/form.hpp"
+#include "tav/inspect/streamWalk.hpp"
 
 namespace tav::inspect
 {
@@ -52,23 +53,41 @@ FormChoice Follower::choiceNow()
 /// The root behind the present one, as the file is now.
 std::optional<Follower::FoundRoot> Follower::findRoot()
 {
-  WalkStart start;
-  Form form = *form_;
-  if (root_.hdrType != 0)
+  if (root_.hdrType == 0)
   {
-    start = {.offset = root_.nodeOffset, .wide = layout::is64(root_)};
-    form.root64 = layout::is64(root_);
+    return searchRoot(*form_, {}, true);
   }
+  Form form = *form_;
+  form.root64 = layout::is64(root_);
+  if (layout::sizeOf(root_) != 0)
+  {
+    return searchRoot(form, {.offset = root_.nodeOffset, .wide = form.root64}, false);
+  }
+  // An empty root looks to a walk as if what follows were in it.
+  const uint64_t behind = behindHeader(root_);
+  const auto other = otherStreamAt(*now_, form, behind);
+  std::optional<FoundRoot> found = searchRoot(form, {.offset = behind, .wide = form.root64}, true);
+  const bool isThere = found && found->header.nodeOffset == behind;
+  return other && !isThere ? searchRoot(*other, {.offset = behind, .wide = other->root64}, true) : std::move(found);
+}
+
+/// By a walk in a form from a place on, which is behind the present root, or at it.
+std::optional<Follower::FoundRoot> Follower::searchRoot(const Form& form, const WalkStart& start, bool isBehind)
+{
   FoundRoot found;
   StreamWalk walk(
       *now_, form, [&found](const PassedOver& place) { found.passed.push_back(place); }, start);
   Event event;
-  for (bool isPast = root_.hdrType == 0; walk.next(event);)
+  for (bool isPast = isBehind; walk.next(event);)
   {
     found.isBehindGap = found.isBehindGap || event.what == What::zeros || event.what == What::damaged;
     if (event.what != What::nodeBegin || event.depth != 0)
     {
       continue;
+    }
+    if (isPast && event.node.offset() < reached_)
+    {
+      return std::nullopt; // in the present one, of which less was there when its bytes were read than was told since
     }
     if (isPast)
     {
@@ -90,7 +109,7 @@ bool Follower::nextRoot()
   {
     // What is before it may have been read before it was written, and this one, from the middle of a stream, after:
     // a writer writes forward, so that a second look sees the whole of what was written then.
-    now_ = file_->window(0, kRingBytes);
+    readAgain();
     const std::optional<FoundRoot> again = findRoot();
     found = again && again->header.nodeOffset == found->header.nodeOffset ? again : std::nullopt;
   }

@@ -1,6 +1,5 @@
 #include "tools/cmd/following.h"
 
-#include <stop_token>
 #include <utility>
 
 #include "tools/host/host.h"
@@ -109,7 +108,7 @@ private:
   std::string path_;
   FollowTold told_;
   Output& out_;
-  std::stop_source stop_{};
+  StopSource stop_{};
   Status status_ = kFine;
   bool hasNodes_ = false;
   bool isMissing_ = false;

@@ -50,8 +50,6 @@ struct Wanted
     }
   }
 
-  bool isOpen(bool all) const { return matcher && (all || found == 0); }
-
   /// What is followed begins again.
   void beginAnew()
   {
@@ -108,11 +106,9 @@ public:
     {
       throw Failure("get: --follow and --jobs exclude each other");
     }
-    all_ = true;
     inspect::FollowTold told;
-    const auto isOpen = [this](const auto& wanted) { return wanted->isOpen(all_); };
-    const bool hasUnknown = !std::all_of(wanted_.begin(), wanted_.end(), isOpen) && tellUnknown(invocation);
-    if (isDone())
+    const bool hasUnknown = tellUnknown(invocation);
+    if (std::none_of(wanted_.begin(), wanted_.end(), [](const auto& wanted) { return wanted->path.has_value(); }))
     {
       return kFindings;
     }
@@ -230,17 +226,12 @@ private:
     }
   }
 
-  bool isDone() const
-  {
-    return std::none_of(wanted_.begin(), wanted_.end(), [this](const auto& wanted) { return wanted->isOpen(all_); });
-  }
-
   void visit(Walker& walker, const Event& event, const FoundNode& found)
   {
     bool reaches = false;
     for (const auto& wanted : wanted_)
     {
-      if (!wanted->isOpen(all_))
+      if (!wanted->matcher)
       {
         continue;
       }
@@ -248,7 +239,7 @@ private:
       {
         put(found);
       }
-      reaches = reaches || (wanted->isOpen(all_) && wanted->matcher->reachesBelow());
+      reaches = reaches || wanted->matcher->reachesBelow();
     }
     if (event.node.isGroup() && !reaches)
     {

@@ -5,6 +5,7 @@
 #include <chrono>
 #include <cstdint>
 #include <functional>
+#include <memory>
 #include <span>
 #include <string>
 #if __has_include(<stop_token>)
@@ -23,6 +24,7 @@ namespace tav::inspect
 
 #if defined(__cpp_lib_jthread)
 using StopToken = std::stop_token;
+using StopSource = std::stop_source;
 #else
 /// Where the standard library has no std::stop_token: the part of it that is asked for, over a flag of the caller's.
 class StopToken
@@ -35,6 +37,22 @@ public:
 
 private:
   const std::atomic<bool>* asked_ = nullptr;
+};
+
+/// The part of std::stop_source that goes with it. Must outlive its tokens.
+class StopSource
+{
+public:
+  StopSource() = default;
+  StopSource(const StopSource&) = delete;
+  StopSource& operator=(const StopSource&) = delete;
+
+  StopToken get_token() const { return StopToken(asked_); }
+  bool request_stop() noexcept { return !asked_.exchange(true); }
+  bool stop_requested() const noexcept { return asked_.load(std::memory_order_relaxed); }
+
+private:
+  std::atomic<bool> asked_{false};
 };
 #endif
 
@@ -79,6 +97,31 @@ struct FollowTold
   std::function<void(const PassedOver&)> damage{};
   std::function<void(FileChange)> change{};
   std::function<void()> caughtUp{}; ///< all that is there was told; also at every look that finds nothing new
+};
+
+/// Following step by step, for programs that have a loop of their own. Used by one thread.
+class Following
+{
+public:
+  /// As `follow` below; of `how` the timeout is the loop's own.
+  TAV_INSPECT_API Following(const std::string& path, const FollowTold& told, const DocumentOptions& options = {},
+                            const FollowOptions& how = {});
+  TAV_INSPECT_API ~Following();
+  TAV_INSPECT_API Following(Following&&) noexcept;
+
+  /// Tells of what is there and was not told yet, of `most` nodes at the most. Returns how many nodes came, with those
+  /// that are passed over because they were there before: fewer than `most` where that was all.
+  /// @throws Error as `follow`, and what the callbacks throw
+  TAV_INSPECT_API uint64_t look(uint64_t most = ~uint64_t{0});
+  /// Returns when the file may have changed, at the latest after so long.
+  TAV_INSPECT_API void wait(std::chrono::milliseconds longest);
+
+private:
+  friend class Document;
+  friend FollowEnd follow(const std::string& path, const FollowTold& told, const DocumentOptions& options,
+                          const FollowOptions& how);
+  class Work;
+  std::unique_ptr<Work> work_;
 };
 
 /// As Document::follow, with all that is known of each node. The file need not be there yet, nor have a stream in it.

@@ -262,3 +262,34 @@ TEST_P(FollowCut, WhatWasToldIsCutAndComesBack)
         });
   }
 }
+
+TEST_P(FollowCut, AWriterGoesOnOverTheZerosAndClosesTheRoot)
+{
+  const Bytes open = test::openHeader(TAV_ELM_CMN_SYSTEM) + test::number(1) + test::number(2);
+  const Bytes more = test::number(3) + test::number(4);
+  for (const bool isFirst : {true, false})
+  {
+    SCOPED_TRACE(isFirst);
+    const Bytes before = isFirst ? Bytes() : test::numbers({9});
+    const auto close = [&] { test::patch(file_.path, before.size(), test::sizeBytes(80)); };
+    const Texts root{kGroup, "1", "2", "3", "4", kGroup, "5"};
+    Texts expected = isFirst ? Texts() : Texts{kGroup, "9"};
+    expected.insert(expected.end(), root.begin(), root.end());
+    atEachStep(
+        before + open + Bytes(GetParam().zeros, 0),
+        [&] {
+          test::patch(file_.path, before.size() + open.size(), more);
+          close();
+          test::patch(file_.path, before.size() + open.size() + more.size(), test::numbers({5}));
+        },
+        [] {}, [&] { EXPECT_EQ(told_, expected); });
+    atEachStep(
+        before + open + Bytes(GetParam().zeros, 0),
+        [&] { test::patch(file_.path, before.size() + open.size(), more); },
+        [&] {
+          close();
+          test::patch(file_.path, before.size() + open.size() + more.size(), test::numbers({5}));
+        },
+        [&] { EXPECT_EQ(told_, expected); });
+  }
+}

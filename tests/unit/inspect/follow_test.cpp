@@ -3,7 +3,6 @@
 #include <filesystem>
 #include <list>
 #include <numeric>
-#include <stop_token>
 #include <string>
 #include <thread>
 #include <vector>
@@ -49,7 +48,7 @@ protected:
   const test::TemporaryPath file_;
   const test::TemporaryPath other_;
   std::vector<std::string> told_;
-  std::stop_source stop_;
+  tav::inspect::StopSource stop_;
   const std::function<void(const tav::Node&)> onNode_ = [this](const tav::Node& node) {
     std::string text(node.tag());
     if (node.type() == TAV_TYPE_UINT32)
@@ -62,6 +61,58 @@ protected:
 };
 
 } // namespace
+
+TEST_F(Follow, TellsTheSameWhenAskedForAFewNodesAtATime)
+{
+  const auto inSteps = [&](uint64_t most) {
+    told_.clear();
+    append(numbers({1, 2, 3}));
+    append(numbers({4}));
+    FollowTold told;
+    told.node = [&](const Arrival& arrival) { told_.push_back(pathText(arrival)); };
+    told.rootEnd = [&](const Arrival& arrival) { told_.push_back("end of " + pathText(arrival)); };
+    told.caughtUp = [&] { told_.emplace_back("all"); };
+    Following following(tav::FilePath(file_.path).text(), told);
+    uint64_t looks = 0;
+    while (following.look(most) == most)
+    {
+      EXPECT_LT(++looks, 100U);
+    }
+    std::filesystem::resize_file(file_.path, 0); // and another stream in its place
+    EXPECT_EQ(following.look(most), 0U);
+    append(numbers({7, 8}));
+    while (following.look(most) == most)
+    {
+      EXPECT_LT(++looks, 100U);
+    }
+    std::erase(told_, "all");
+    std::filesystem::remove(file_.path);
+    return told_;
+  };
+  const std::vector<std::string> atOnce = inSteps(100);
+  EXPECT_EQ(atOnce.size(), 12U);
+  for (const uint64_t most : {1U, 2U, 3U, 5U})
+  {
+    EXPECT_EQ(inSteps(most), atOnce) << most;
+  }
+}
+
+TEST_F(Follow, TellsOfRootsBehindAnEmptyOne)
+{
+  append(numbers({}));
+  EXPECT_THAT(news(), ElementsAre("system"));
+  append(numbers({1}));
+  EXPECT_THAT(news(), ElementsAre("system", "cpuOnline 1"));
+  append(numbers({}));
+  append(numbers({}));
+  append(Bytes(40, 0));
+  append(numbers({2}));
+  EXPECT_THAT(news(), ElementsAre("system", "system", "system", "cpuOnline 2"));
+  append(numbers({}));
+  append(numbers({3, 4, 5, 6, 7}, true, TAV_ELM_CMN_HOST));
+  EXPECT_THAT(news(),
+              ElementsAre("system", "host", "cpuOnline 3", "cpuOnline 4", "cpuOnline 5", "cpuOnline 6", "cpuOnline 7"));
+}
 
 TEST_F(Follow, TellsOfRootsAsTheyCome)
 {
@@ -218,7 +269,7 @@ TEST_F(Follow, TellsWhatAWriterWritesWhileItWrites)
     }
   });
   std::vector<uint32_t> seen;
-  std::stop_source stop;
+  tav::inspect::StopSource stop;
   const FollowEnd end = document.follow(
       [&](const tav::Node& node) {
         if (node.type() == TAV_TYPE_UINT32)
@@ -247,7 +298,7 @@ TEST_F(Follow, EndsWhenNothingComes)
   const Document document(file_.path);
   EXPECT_EQ(document.follow(onNode_, {.timeout = 50ms}), FollowEnd::timedOut);
   EXPECT_THAT(told_, testing::SizeIs(4));
-  std::stop_source stopped;
+  tav::inspect::StopSource stopped;
   stopped.request_stop();
   EXPECT_EQ(document.follow(onNode_, {.stop = stopped.get_token()}), FollowEnd::stopped);
 }

@@ -9,6 +9,7 @@
 
 #include "cpp/layer.h"
 #include "support/byteRows.h"
+#include "tav/inspect/follow.hpp"
 #include "tav/tav.hpp"
 
 namespace test
