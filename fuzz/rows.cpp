@@ -8,8 +8,8 @@
 #include <vector>
 
 #include "fuzz/input.h"
-#include "inspect/document/streamWalk.h"
 #include "tav/inspect.hpp"
+#include "tav/inspect/streamWalk.hpp"
 
 namespace
 {

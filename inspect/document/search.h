@@ -7,9 +7,9 @@
 #include <vector>
 
 #include "inspect/document/state.h"
-#include "inspect/document/streamWalk.h"
 #include "tav/inspect/path.hpp"
 #include "tav/inspect/problem.hpp"
+#include "tav/inspect/streamWalk.hpp"
 
 namespace tav::inspect
 {

@@ -9,9 +9,9 @@
 #include <string>
 #include <vector>
 
-#include "inspect/document/streamWalk.h"
 #include "tav/inspect/damageWatch.hpp"
 #include "tav/inspect/document.hpp"
+#include "tav/inspect/streamWalk.hpp"
 
 namespace tav::inspect
 {

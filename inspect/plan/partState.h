@@ -4,8 +4,8 @@
 #include <cstdint>
 #include <vector>
 
-#include "inspect/document/streamWalk.h"
 #include "tav/inspect/plan.hpp"
+#include "tav/inspect/streamWalk.hpp"
 #include "tav/inspect/walker.hpp"
 
 namespace tav::inspect

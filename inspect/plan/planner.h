@@ -7,8 +7,8 @@
 #include <unordered_set>
 #include <vector>
 
-#include "inspect/document/streamWalk.h"
 #include "tav/inspect/plan.hpp"
+#include "tav/inspect/streamWalk.hpp"
 
 namespace tav::inspect
 {

@@ -262,7 +262,7 @@ TEST_P(TestDocument, FindsFromANodeInItsStreamsForm)
   {
     for (const tav::Node& host : document.find(root, "host[2]"))
     {
-      EXPECT_EQ(std::ranges::distance(document.find(host, "*")), 2);
+      EXPECT_EQ(test::countOf(document.find(host, "*")), 2U);
       EXPECT_THAT(texts(document.find(host, "/system/host[1]/hostName")), ElementsAre("ada", "hedy"));
       names.push_back(texts(document.find(host, "hostName")).at(0));
     }
@@ -310,22 +310,22 @@ TEST_P(TestDocument, FindsNothingBelowAnEmptyGroupAndWhatIsBelowOneThatWasNeverC
   }
   writer.finish();
   const Bytes closed = test::bytesOf(writer.bytes());
-  Bytes open64 = hosts({{"ada", 8}}); // as a program left it that was killed
-  std::fill_n(open64.begin(), sizeof(uint64_t), uint8_t{0});
+  Bytes leftOpen = hosts({{"ada", 8}}); // as a program left it that was killed
+  std::fill_n(leftOpen.begin(), sizeof(uint64_t), uint8_t{0});
   for (const OnDamage onDamage : {OnDamage::stop, OnDamage::skip})
   {
     const Document document = open(closed + closed);
     for (const tav::Node& host : document.find("/system/host"))
     {
-      EXPECT_TRUE(std::ranges::distance(document.find(host, "*", onDamage)) == 0);
-      EXPECT_TRUE(std::ranges::distance(document.find(host, ".//*", onDamage)) == 0);
-      EXPECT_EQ(std::ranges::distance(document.find(host, ".", onDamage)), 1);
+      EXPECT_TRUE(test::countOf(document.find(host, "*", onDamage)) == 0);
+      EXPECT_TRUE(test::countOf(document.find(host, ".//*", onDamage)) == 0);
+      EXPECT_EQ(test::countOf(document.find(host, ".", onDamage)), 1U);
     }
   }
-  const Document left = open(open64);
+  const Document left = open(leftOpen);
   for (const tav::Node& root : left.roots())
   {
-    EXPECT_EQ(std::ranges::distance(left.find(root, ".//*", OnDamage::skip)), 3);
+    EXPECT_EQ(test::countOf(left.find(root, ".//*", OnDamage::skip)), 3U);
   }
 }
 
@@ -494,7 +494,7 @@ TEST(DocumentFile, LooksBelowEmptyGroupsInOneGoThroughTheFile)
   for (const tav::Node& host : document.find("/system/host"))
   {
     ++found;
-    EXPECT_EQ(std::ranges::distance(document.find(host, "*")), 0);
+    EXPECT_EQ(test::countOf(document.find(host, "*")), 0U);
   }
   EXPECT_EQ(found, groups);
   // From the start to each group it would be two thousand times the file.
