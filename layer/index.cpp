@@ -2,10 +2,11 @@
 #include "tav/cpp/index.hpp"
 
 #include <algorithm>
-#include <cstdlib>
 #include <vector>
 
 #include "layer/countedPath.h"
+#include "layer/indexEntries.h"
+#include "layer/indexParts.h"
 
 namespace tav::detail
 {
@@ -18,12 +19,11 @@ public:
   {
   }
 
-  uint32_t make()
+  uint32_t make(const IndexWork& work)
   {
-    std::vector<Seen> seen;
-    const uint32_t rc = walk(seen);
-    arrange(seen);
-    fillTable();
+    IndexParts parts(start_, work);
+    const uint32_t rc = parts.walk();
+    entries_ = parts.arrange();
     return rc;
   }
 
@@ -38,28 +38,47 @@ public:
   uint32_t find(const paths::Compiled& path, const Taker& taker) const override
   {
     uint32_t rc = TAV_RC_OK;
-    const auto visit = [&](uint32_t child, uint32_t parent) {
+    const Route& route = path.routes[path.main.front()];
+    eachMatch(path, route, [&](uint32_t child, uint32_t parent) {
       Node node;
       rc = read(child, parent, node);
       return rc == TAV_RC_OK && taker.take(taker.to, node);
-    };
-    uint32_t first = kNone;
-    uint32_t parent = 0;
-    if (followIds(paths::countedOf(path), first, parent) && !visit(first, parent))
-    {
-      return rc;
-    }
-    const Route& route = path.routes[path.main.front()];
-    eachMatch(path, route, [&](uint32_t child, uint32_t group) { return child == first || visit(child, group); });
+    });
     return rc;
+  }
+  bool findFirst(const paths::Compiled& path, std::optional<Node>& found, uint32_t& rc) const
+  {
+    uint32_t child = kNone;
+    uint32_t parent = 0;
+    if (!isEnd_ && followIds(paths::countedOf(path), child, parent)) [[likely]]
+    {
+      rc = read(child, parent, found.emplace());
+    }
+    else if (!knows(path))
+    {
+      return false;
+    }
+    else
+    {
+      const auto take = [](void* to, const Node& node) {
+        *static_cast<std::optional<Node>*>(to) = node;
+        return false;
+      };
+      rc = find(path, {&found, take});
+    }
+    if (rc != TAV_RC_OK)
+    {
+      found.reset();
+    }
+    return true;
   }
   [[nodiscard]] size_t size() const noexcept override
   {
-    return entries_.empty() ? 0 : entries_.size() - 1;
+    return entries_.size() - 1;
   }
   [[nodiscard]] size_t memory() const noexcept override
   {
-    return entries_.capacity() * sizeof(Entry) + table_.capacity() * sizeof(uint32_t);
+    return entries_.memory();
   }
 
 private:
@@ -68,26 +87,7 @@ private:
   using Expression = paths::Expression;
   using Axis = paths::Axis;
   using Compiled = paths::Compiled;
-
-  /// Children stand next to each other, those of one id in stream order. The first entry is the start.
-  struct Entry
-  {
-    uint64_t offset;
-    uint32_t firstChild;
-    uint32_t childCount;
-    uint16_t elm;
-    bool isWide;
-  };
-  static_assert(sizeof(Entry) == 24);
-
-  /// A node as the walk comes by.
-  struct Seen
-  {
-    uint64_t offset;
-    uint32_t parent;
-    uint16_t elm;
-    bool isWide;
-  };
+  using Entry = IndexEntry;
 
   /// A node that a step has led to.
   struct Spot
@@ -97,153 +97,13 @@ private:
     uint32_t parent;
   };
 
-  static constexpr uint32_t kNone = ~uint32_t{0};
+  static constexpr uint32_t kNone = IndexEntries::kNone;
   static constexpr size_t kMostSteps = 64; ///< of a path that is looked up: one recursion a step
 
-  uint32_t walk(std::vector<Seen>& seen)
-  {
-    std::error_code ec;
-    std::vector<uint32_t> open(1, 0); // the node around each level
-    seen.push_back({start_.offset(), kNone, start_.elm(), layout::is64(start_.header())});
-    // What is below an element that only ends a group is below no node that a path leads through.
-    DescendantRange nodes = start_.descendants(ec, EndElements::show);
-    for (const Node& node : nodes)
-    {
-      if (layout::isEndElement(node.elm()))
-      {
-        nodes.skip();
-        continue;
-      }
-      if (seen.size() >= kNone)
-      {
-        return TAV_RC_NO_MEMORY;
-      }
-      const size_t depth = nodes.depth();
-      open.resize(depth);
-      const auto at = static_cast<uint32_t>(seen.size());
-      seen.push_back({node.offset(), open[depth - 1], node.elm(), layout::is64(node.header())});
-      open.push_back(at);
-    }
-    return codeOf(ec);
-  }
-
-  /// Puts children next to each other, in the order of their parents.
-  void arrange(const std::vector<Seen>& seen)
-  {
-    std::vector<uint32_t> next(seen.size() + 1, 0); // children of each node, then where the next of them goes
-    for (size_t i = 1; i < seen.size(); ++i)
-    {
-      ++next[seen[i].parent];
-    }
-    std::vector<uint32_t> counts(next.begin(), next.end() - 1);
-    uint32_t place = 1;
-    for (uint32_t& each : next)
-    {
-      const uint32_t count = each;
-      each = place;
-      place += count;
-    }
-    const std::vector<uint32_t> first(next.begin(), next.end() - 1);
-    entries_.resize(seen.size());
-    for (size_t i = 0; i < seen.size(); ++i)
-    {
-      const size_t at = i == 0 ? 0 : next[seen[i].parent]++;
-      entries_[at] = {seen[i].offset, first[i], counts[i], seen[i].elm, seen[i].isWide};
-    }
-    for (size_t i = 0; i < seen.size(); ++i)
-    {
-      sort<Entry, compareEntries>(entries_.data() + first[i], counts[i]);
-    }
-  }
-
-  static int compareEntries(const void* one, const void* other) noexcept
-  {
-    const auto& a = *static_cast<const Entry*>(one);
-    const auto& b = *static_cast<const Entry*>(other);
-    return a.elm != b.elm ? (a.elm < b.elm ? -1 : 1) : compareOffsets(a.offset, b.offset);
-  }
   static int compareSpots(const void* one, const void* other) noexcept
   {
     return compareOffsets(static_cast<const Spot*>(one)->offset, static_cast<const Spot*>(other)->offset);
   }
-  static int compareOffsets(uint64_t one, uint64_t other) noexcept
-  {
-    return one < other ? -1 : one > other ? 1
-                                          : 0;
-  }
-  /// As std::sort, whose header is larger than all of this; most lists are in order.
-  template<class T, int (*Compare)(const void*, const void*)>
-  static void sort(T* items, size_t count) noexcept
-  {
-    size_t ordered = 1;
-    while (ordered < count && Compare(items + ordered - 1, items + ordered) <= 0) ++ordered;
-    if (ordered < count)
-    {
-      std::qsort(items, count, sizeof(T), Compare);
-    }
-  }
-
-  /// The places of the table in which a group's children are found: next to each other, and three for two children.
-  struct Shelf
-  {
-    size_t first;
-    uint32_t size;
-  };
-  static Shelf shelfOf(const Entry& group) noexcept
-  {
-    const auto before = [](uint64_t children) { return static_cast<size_t>(children + children / 2); };
-    const size_t first = before(group.firstChild);
-    return {first, static_cast<uint32_t>(before(uint64_t{group.firstChild} + group.childCount) - first)};
-  }
-  /// Where on its shelf an id is looked for first. Ids in a row, as most groups have them, do not meet there.
-  static uint32_t placeOn(const Shelf& shelf, uint16_t elm) noexcept
-  {
-    const uint32_t mixed = elm * 0x9E3779B9U;
-    const uint64_t scaled = uint64_t{mixed} * shelf.size;
-    return static_cast<uint32_t>(scaled >> 32U);
-  }
-
-  /// The first child of each id below each node.
-  void fillTable()
-  {
-    table_.assign(entries_.size() + entries_.size() / 2, kNone);
-    for (const Entry& group : entries_)
-    {
-      const Shelf shelf = shelfOf(group);
-      const uint32_t end = group.firstChild + group.childCount;
-      for (uint32_t child = group.firstChild; child != end; ++child)
-      {
-        if (child != group.firstChild && entries_[child].elm == entries_[child - 1].elm)
-        {
-          continue;
-        }
-        uint32_t at = placeOn(shelf, entries_[child].elm);
-        while (table_[shelf.first + at] != kNone)
-        {
-          at = at + 1 < shelf.size ? at + 1 : 0;
-        }
-        table_[shelf.first + at] = child;
-      }
-    }
-  }
-
-  /// The first child with an id; kNone where there is none.
-  [[nodiscard]] uint32_t firstOf(const Entry& group, uint16_t elm) const noexcept
-  {
-    const Shelf shelf = shelfOf(group);
-    uint32_t at = shelf.size != 0 ? placeOn(shelf, elm) : 0;
-    for (uint32_t left = shelf.size; left != 0; --left)
-    {
-      const uint32_t child = table_[shelf.first + at];
-      if (child == kNone || entries_[child].elm == elm)
-      {
-        return child;
-      }
-      at = at + 1 < shelf.size ? at + 1 : 0;
-    }
-    return kNone;
-  }
-
   /// Of a short path by the first child of each step, which leads to the first match where it leads anywhere.
   bool followIds(const paths::Counted& path, uint32_t& found, uint32_t& parent) const noexcept
   {
@@ -251,7 +111,7 @@ private:
     for (uint32_t i = 0; i < path.idCount && at != kNone; ++i)
     {
       parent = at;
-      at = firstOf(entries_[parent], path.ids[i]);
+      at = entries_.firstOf(parent, path.ids[i]);
     }
     found = at;
     return at != kNone;
@@ -319,7 +179,7 @@ private:
     {
       found = step.axis == Axis::child ? childrenOf(path, step, found) : withAllBelow(std::move(found));
     }
-    sort<Spot, compareSpots>(found.data(), found.size());
+    sortItems<Spot, compareSpots>(found.data(), found.size());
     for (const Spot& spot : found)
     {
       if (!visit(spot.entry, spot.parent))
@@ -374,7 +234,7 @@ private:
       return eachOfSeveral(step, place, parent, take);
     }
     const uint32_t end = entries_[parent].firstChild + entries_[parent].childCount;
-    const uint32_t first = firstOf(entries_[parent], step.only);
+    const uint32_t first = entries_.firstOf(parent, step.only);
     if (first == kNone)
     {
       return true;
@@ -407,7 +267,7 @@ private:
         children.push_back({entries_[child].offset, child, parent});
       }
     }
-    sort<Spot, compareSpots>(children.data(), children.size());
+    sortItems<Spot, compareSpots>(children.data(), children.size());
     if (place != 0)
     {
       return place > children.size() || take(children[static_cast<size_t>(place - 1)].entry);
@@ -430,18 +290,46 @@ private:
   uint32_t read(uint32_t child, uint32_t parent, Node& node) const noexcept
   {
     ReaderState& state = *start_.state_;
-    TAVHeaderData around;
-    around.header = start_.header();
-    uint32_t rc = parent != 0 ? read(entries_[parent], around) : TAV_RC_OK;
-    if (rc == TAV_RC_OK)
-    {
-      rc = read(entries_[child], node.data_);
-    }
     node.state_ = &state;
-    node.fetch_ = state.fetches;
     node.isFast_ = state.isFast;
-    node.parent_ = around.header;
+    node.parent_ = start_.header();
+    uint32_t rc = TAV_RC_OK;
+    if (!readInPlace(entries_[child], parent, node)) [[unlikely]]
+    {
+      TAVHeaderData around;
+      rc = parent != 0 ? read(entries_[parent], around) : TAV_RC_OK;
+      node.parent_ = parent != 0 ? around.header : node.parent_;
+      rc = rc == TAV_RC_OK ? read(entries_[child], node.data_) : rc;
+    }
+    node.fetch_ = state.fetches;
     return rc;
+  }
+
+  /// Both of them in one go, as most are.
+  bool readInPlace(const Entry& entry, uint32_t parent, Node& node) const noexcept
+  {
+    const Entry& group = entries_[parent];
+    ReaderState& state = *start_.state_;
+    if (state.inPlace != InPlace::block || !entry.isWide || !group.isWide || !core::hasNeverTraced()) [[unlikely]]
+    {
+      return false;
+    }
+    const BlockInPlace block(*state.handle);
+    core::Place around = block.nowhere();
+    core::Place place = block.nowhere();
+    if (!core::findNode<true>(block, group.offset, around) || !core::findNode<true>(block, entry.offset, place) ||
+        core::NodeFound<true>{{around.header, false}, group.offset}.elm() != group.elm ||
+        core::NodeFound<true>{{place.header, false}, entry.offset}.elm() != entry.elm) [[unlikely]]
+    {
+      return false;
+    }
+    if (parent != 0)
+    {
+      TAVHeaderData data;
+      core::describe<true, BlockInPlace::Way>(around.header, false, group.offset, nullptr, 0, data);
+      node.parent_ = data.header;
+    }
+    return core::handOut<true>(block, *state.handle, place, node.data_) == TAV_RC_OK;
   }
 
   uint32_t read(const Entry& entry, TAVHeaderData& data) const noexcept
@@ -461,15 +349,30 @@ private:
 
   Node start_;
   bool isEnd_; ///< the start only ends a group
-  std::vector<Entry> entries_;
-  std::vector<uint32_t> table_; ///< of entries, by parent and id
+  IndexEntries entries_;
 };
+
+IndexTable* makeIndex(const Node& start, const IndexWork& work, uint32_t& rc)
+{
+  Owner<NodeIndex> index(new NodeIndex(start));
+  rc = index->make(work);
+  return index.release();
+}
 
 IndexTable* makeIndex(const Node& start, uint32_t& rc)
 {
-  Owner<NodeIndex> index(new NodeIndex(start));
-  rc = index->make();
-  return index.release();
+  return makeIndex(start, {}, rc);
+}
+
+/// All tables are made here.
+bool findFirst(const IndexTable& table, const paths::Compiled& path, std::optional<Node>& found, uint32_t& rc)
+{
+  return static_cast<const NodeIndex&>(table).findFirst(path, found, rc);
+}
+
+IndexBytes indexBytesOf(const Node& start) noexcept
+{
+  return IndexParts::bytesOf(start);
 }
 
 } // namespace tav::detail

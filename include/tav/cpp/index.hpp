@@ -5,6 +5,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <optional>
+#include <span>
 #include <string_view>
 #include <system_error>
 #include <utility>
@@ -45,8 +46,39 @@ protected:
   IndexTable(const IndexTable&) = default;
 };
 
+/// Where a part of the walk through a node may begin: at a node in the groups from the start inwards, by their offsets.
+/// One that the walk does not come by is found out.
+struct IndexSeam
+{
+  std::span<const uint64_t> around;
+  uint64_t offset;
+};
+
+/// How the walk is shared among threads, which the library has none of.
+struct IndexWork
+{
+  std::span<const IndexSeam> seams{}; ///< by their offsets
+  void* to = nullptr;
+  /// Calls `piece(of, i)` for each `i` below `count`, in any order, by as many threads as there are; null: in their
+  /// order, by the caller's. Returns when all have returned.
+  void (*run)(void* to, size_t count, void (*piece)(void* of, size_t i), void* of) = nullptr;
+};
+
+/// The bytes that a node's reader reads, where several readers can read them at a time: in memory, or of a mapped file.
+struct IndexBytes
+{
+  std::span<const std::byte> bytes{}; ///< empty where they cannot
+  StreamOptions options{};            ///< that another reader needs, but for the root's header
+};
+TAV_API IndexBytes indexBytesOf(const Node& start) noexcept;
+
+/// The first match alone; false for a path that takes a walk.
+TAV_API bool findFirst(const IndexTable& table, const paths::Compiled& path, std::optional<Node>& found, uint32_t& rc);
+
 /// Makes an index by a walk; after a failure it has what comes before the damage.
 TAV_API IndexTable* makeIndex(const Node& start, uint32_t& rc);
+/// The same by a walk in parts, for a node whose bytes several readers can read.
+TAV_API IndexTable* makeIndex(const Node& start, const IndexWork& work, uint32_t& rc);
 
 } // namespace detail
 
@@ -82,6 +114,21 @@ public:
     table_.reset(detail::makeIndex(start, rc));
     detail::report(rc, ec);
   }
+  /// The same as of one walk, from a walk in parts: see tav::inspect::indexOf, which has threads for them.
+  Index(const Node& start, const detail::IndexWork& work)
+      : start_(start)
+  {
+    uint32_t rc = TAV_RC_OK;
+    table_.reset(detail::makeIndex(start, work, rc));
+    detail::demand(rc, "indexing", [&start] { return detail::placeText(start); });
+  }
+  Index(const Node& start, const detail::IndexWork& work, std::error_code& ec)
+      : start_(start)
+  {
+    uint32_t rc = TAV_RC_OK;
+    table_.reset(detail::makeIndex(start, work, rc));
+    detail::report(rc, ec);
+  }
   Index(const Index& other)
       : start_(other.start_), table_(other.table_->copy())
   {
@@ -107,22 +154,24 @@ public:
   }
   [[nodiscard]] std::optional<Node> find(const Path& path) const
   {
-    if (!table_->knows(path.compiled()))
-    {
-      return start_.path(path);
-    }
     std::optional<Node> found;
-    detail::demand(findFirst(path, found), "looking up a path");
+    uint32_t rc = TAV_RC_OK;
+    if (!detail::findFirst(*table_, path.compiled(), found, rc)) [[unlikely]]
+    {
+      found = start_.path(path);
+    }
+    detail::demand(rc, "looking up a path");
     return found;
   }
   [[nodiscard]] std::optional<Node> find(const Path& path, std::error_code& ec) const
   {
-    if (!table_->knows(path.compiled()))
+    std::optional<Node> found;
+    uint32_t rc = TAV_RC_OK;
+    if (!detail::findFirst(*table_, path.compiled(), found, rc)) [[unlikely]]
     {
       return start_.path(path, ec);
     }
-    std::optional<Node> found;
-    detail::report(findFirst(path, found), ec);
+    detail::report(rc, ec);
     return found;
   }
 
@@ -169,15 +218,6 @@ public:
   }
 
 private:
-  uint32_t findFirst(const Path& path, std::optional<Node>& found) const
-  {
-    const auto take = [](void* to, const Node& node) {
-      *static_cast<std::optional<Node>*>(to) = node;
-      return false;
-    };
-    return table_->find(path.compiled(), {&found, take});
-  }
-
   uint32_t findEvery(const Path& path, std::vector<Node>& found) const
   {
     const auto take = [](void* to, const Node& node) {

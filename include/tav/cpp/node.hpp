@@ -28,6 +28,8 @@ class RootRange;
 namespace detail
 {
 class Printer;
+class IndexParts;
+class IndexWalk;
 class NodeIndex;
 struct NodeTree;
 template<class Walk>
@@ -315,6 +317,8 @@ private:
   friend class detail::WalkIterator;
   friend class detail::Printer;
   friend class detail::NodeIndex;
+  friend class detail::IndexParts;
+  friend class detail::IndexWalk;
   friend struct detail::NodeTree;
 
   /// A node of no known group.

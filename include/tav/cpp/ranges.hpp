@@ -287,10 +287,21 @@ public:
 
 private:
   friend class Node;
+  friend class detail::IndexWalk;
   friend class detail::WalkIterator<DescendantRange>;
 
   DescendantRange(const Node& start, EndElements endElements, std::error_code* ec)
       : current_(start), ec_(ec), endElements_(endElements)
+  {
+  }
+  struct At
+  {
+    const Node& node;
+  };
+  /// A walk that has come to a node, which knows its group; `outer`: those around it, from the start inwards.
+  DescendantRange(At at, detail::Stack<TAVHeader>&& outer, EndElements endElements, std::error_code* ec)
+      : current_(at.node), outer_(std::move(outer)), end_(Node::endOf(current_.parent_)), depth_(outer_.size() + 1),
+        ec_(ec), endElements_(endElements), begun_(true)
   {
   }
 

@@ -2,8 +2,10 @@
 #include <algorithm>
 #include <cstddef>
 #include <memory>
+#include <optional>
 #include <span>
 #include <string>
+#include <system_error>
 #include <vector>
 
 #include <gtest/gtest.h>
@@ -60,6 +62,16 @@ std::string typesOf(ByteSource& source, unsigned threads)
   return text;
 }
 
+/// What an index has: of all nodes, and of those before the damage.
+std::string indexed(const std::vector<std::byte>& bytes, unsigned threads)
+{
+  const tav::Reader reader(bytes);
+  std::error_code ec;
+  const tav::Index index = indexOf(reader.root(), {.threads = threads, .partBytes = 5000}, ec);
+  const std::optional<tav::Node> last = index.find("host[700]/hostName");
+  return std::to_string(index.size()) + " " + std::to_string(last ? last->offset() : 0) + " " + ec.message();
+}
+
 std::string found(std::vector<std::byte>& bytes, unsigned threads)
 {
   const auto source = sourceOf(bytes);
@@ -77,7 +89,7 @@ std::string found(std::vector<std::byte>& bytes, unsigned threads)
   const auto scratch = makeScratch();
   PatchFile out(scratch->file());
   text += std::to_string(recover(*source, {}, out, {.threads = threads}).kept);
-  return text + " " + typesOf(*source, threads) + " " + std::to_string(totals.nodes);
+  return text + " " + typesOf(*source, threads) + " " + std::to_string(totals.nodes) + " " + indexed(bytes, threads);
 }
 
 } // namespace

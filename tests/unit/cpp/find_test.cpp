@@ -99,7 +99,7 @@ TEST_P(LayerFind, LeadsFromANodeToThoseOfTheRow)
     EXPECT_EQ(numbersOf(host.find(row.path)), row.nodes);
     const auto first = host.path(row.path);
     EXPECT_EQ(first ? numbersOf(first->find(".")) : "", firstOf(row.nodes));
-    EXPECT_EQ(host.all(row.path).size(), static_cast<size_t>(std::ranges::distance(host.find(row.path))));
+    EXPECT_EQ(host.all(row.path).size(), countOf(host.find(row.path)));
   }
 }
 

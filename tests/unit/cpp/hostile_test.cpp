@@ -80,7 +80,10 @@ void visitEveryWay(const Bytes& stream)
   const tav::Reader direct(std::span<const std::byte>(exact.get(), stream.size()));
   const uint64_t visits = visitAll(direct, stream.size());
   const StreamFile file(stream);
-  EXPECT_EQ(visitAll(tav::Reader(file.path(), {.access = tav::Access::mapped}), stream.size()), visits);
+  if (mapsFiles())
+  {
+    EXPECT_EQ(visitAll(tav::Reader(file.path(), {.access = tav::Access::mapped}), stream.size()), visits);
+  }
   VectorStorage storage(0x1000, stream, VectorStorage::kReadOnly);
   const tav::Reader buffered(storage, {.ringBytes = 0x1000});
   visitAll(buffered, stream.size());

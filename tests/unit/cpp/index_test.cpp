@@ -1,6 +1,10 @@
+#include <algorithm>
 #include <map>
+#include <random>
 #include <span>
 #include <string>
+#include <system_error>
+#include <utility>
 #include <vector>
 
 #include "cpp/layer.h"
@@ -242,6 +246,46 @@ TEST(LayerIndex, TakesThirtyTwoBytesANodeAtTheMost)
   EXPECT_EQ(index.findAll("2/990").size(), 666U);
 }
 
+TEST(LayerIndex, FindsChildrenWhateverOrderTheirIdsAreIn)
+{
+  const std::vector<uint16_t> orders[] = {{7},
+                                          {5, 6, 7, 8},
+                                          {8, 7, 6, 5},
+                                          {5, 6, 8, 9},
+                                          {5, 6, 7, 7},
+                                          {5, 5, 6, 7},
+                                          {5, 7, 7, 8},
+                                          {1, 2, 64999},
+                                          {64998, 64999},
+                                          {65533, 65534, 65535}};
+  tav::Writer writer;
+  {
+    tav::Group root = writer.group(1);
+    for (const std::vector<uint16_t>& ids : orders)
+    {
+      tav::Group group = root.group(2);
+      for (const uint16_t id : ids)
+      {
+        group.add(id, id);
+      }
+    }
+    root.group(2).close(); // without a child
+  }
+  writer.finish();
+  const tav::Reader reader(std::as_const(writer).bytes());
+  const tav::Index index(reader.root());
+  for (size_t i = 1; i <= std::size(orders) + 1; ++i)
+  {
+    for (const int id : {0, 1, 4, 5, 6, 7, 8, 9, 64997, 64998, 64999, 65002, 65532, 65533, 65534, 65535})
+    {
+      const std::string path = "#2[" + std::to_string(i) + "]/#" + std::to_string(id);
+      expectSame(index, reader.root(), path);
+      expectSame(index, reader.root(), path + "[1]");
+      expectSame(index, reader.root(), path + "[2]");
+    }
+  }
+}
+
 /// Calls `see(path)` for the ids and places that lead to each node, without the elements that end groups.
 template<class See>
 void eachPath(const TreeNode& node, const std::string& path, const See& see)
@@ -320,6 +364,73 @@ TEST(LayerIndex, HoldsWhatComesBeforeDamage)
     EXPECT_EQ(index.size(), count) << seed;
     std::error_code ignored;
     static_cast<void>(index.findAll("*/*", ignored));
+  }
+}
+
+/// Places where a walk might stand, few of which it comes by.
+struct AnySeams
+{
+  AnySeams(const Bytes& bytes, const std::vector<uint64_t>& nodes, uint64_t seed)
+  {
+    std::mt19937_64 random(seed);
+    const auto place = [&]() {
+      const uint64_t any = random();
+      return any % 3 != 0 ? nodes[random() % nodes.size()] : random() % (bytes.size() + 9);
+    };
+    for (uint64_t i = 1 + random() % 6; i != 0; --i)
+    {
+      std::vector<uint64_t> groups(1, random() % 4 != 0 ? nodes.front() : place());
+      for (uint64_t levels = random() % 4; levels != 0; --levels)
+      {
+        groups.push_back(place());
+      }
+      around.push_back(std::move(groups));
+      offsets.push_back(place());
+    }
+    std::sort(offsets.begin(), offsets.end());
+    for (size_t i = 0; i < offsets.size(); ++i)
+    {
+      seams.push_back({around[i], offsets[i]});
+    }
+  }
+
+  std::vector<std::vector<uint64_t>> around{};
+  std::vector<uint64_t> offsets{};
+  std::vector<tav::detail::IndexSeam> seams{};
+};
+
+TEST(LayerIndex, IsTheSameWhereverPartsOfItsWalkAreToldToBegin)
+{
+  for (uint64_t seed = 1; seed <= 400; ++seed)
+  {
+    const Tree tree = randomTree(seed, {.width = 8});
+    Bytes bytes = bytesOfTree(tree);
+    if (seed % 4 == 0)
+    {
+      Damage(bytes, seed).flipBits();
+    }
+    const tav::Reader reader(spanOf(bytes), {tree.form.swap ? tav::ByteOrder::swapped : tav::ByteOrder::native,
+                                             tree.form.align,
+                                             tree.form.root32 ? tav::Width::bits32 : tav::Width::bits64});
+    std::error_code ec;
+    const tav::Node root = reader.root(ec);
+    if (ec)
+    {
+      continue;
+    }
+    const tav::Index whole(root, ec);
+    std::error_code ignored;
+    std::vector<uint64_t> nodes = offsetsOf(whole.findAll(".//*", ignored));
+    nodes.insert(nodes.begin(), root.offset());
+    const AnySeams any(bytes, nodes, seed);
+    std::error_code cut;
+    const tav::Index parts(root, tav::detail::IndexWork{any.seams}, cut);
+    EXPECT_EQ(cut, ec) << seed;
+    EXPECT_EQ(parts.size(), whole.size()) << seed;
+    for (const char* const path : {".//*", "*/*", "*[2]//*[1]"})
+    {
+      EXPECT_EQ(offsetsOf(parts.findAll(path, ignored)), offsetsOf(whole.findAll(path, ignored))) << seed << path;
+    }
   }
 }
 

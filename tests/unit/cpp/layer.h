@@ -39,6 +39,18 @@ uint32_t thrownBy(Call&& call)
   return TAV_RC_OK;
 }
 
+/// How many a range gives, where the standard library has no ranges, too.
+template<class Range>
+size_t countOf(Range&& range)
+{
+  size_t count = 0;
+  for ([[maybe_unused]] const auto& one : range)
+  {
+    ++count;
+  }
+  return count;
+}
+
 /// The message of the error that a call throws; empty without one.
 template<class Call>
 std::string messageOf(const Call& call)

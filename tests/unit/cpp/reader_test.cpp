@@ -304,9 +304,11 @@ INSTANTIATE_TEST_SUITE_P(
 
 TEST(LayerRanges, AreInputRangesAndViews)
 {
+#if defined(__cpp_lib_ranges) || _LIBCPP_VERSION >= 14000 // which says it has none while some are missing
   static_assert(std::ranges::input_range<tav::ChildRange> && std::ranges::view<tav::ChildRange>);
   static_assert(std::ranges::input_range<tav::DescendantRange> && std::ranges::view<tav::DescendantRange>);
   static_assert(std::ranges::contiguous_range<tav::PayloadView>);
+#endif
   const Bytes stream = sample();
   const tav::Reader reader(spanOf(stream));
   uint64_t groups = 0;

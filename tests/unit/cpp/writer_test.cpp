@@ -1,4 +1,5 @@
 #include <array>
+#include <cstdint>
 #include <fstream>
 #include <iterator>
 #include <vector>
@@ -121,10 +122,11 @@ TEST(LayerWriterBuffer, GrowsWithAnElementLargerThanItself)
 
 TEST(LayerWriterBuffer, ReportsThatItCannotGrowAndGoesOn)
 {
+  constexpr size_t kBeyondMemory = sizeof(size_t) == 8 ? SIZE_MAX / 16 : SIZE_MAX / 2;
   tav::Writer writer;
   tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM);
   const std::string large(1U << 20U, 'x');
-  const std::span<const std::byte> beyond(std::as_bytes(std::span(large)).data(), size_t{1} << 60U); // never read
+  const std::span<const std::byte> beyond(std::as_bytes(std::span(large)).data(), kBeyondMemory); // never read
   EXPECT_EQ(thrownBy([&] { root.add(TAV_ELM_CMN_HOST_NAME, beyond); }), TAV_RC_NO_MEMORY);
   EXPECT_EQ(writer.size(), 16U);
   root.add(TAV_ELM_CMN_HOST_NAME, large);

@@ -8,9 +8,9 @@
 
 #include <gmock/gmock.h>
 
-#include "inspect/document/streamWalk.h"
 #include "inspect/streams.h"
 #include "tav/inspect/nodeColumns.hpp"
+#include "tav/inspect/streamWalk.hpp"
 
 using namespace tav::inspect;
 using test::Bytes;

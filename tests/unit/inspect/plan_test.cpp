@@ -5,9 +5,9 @@
 
 #include <gmock/gmock.h>
 
-#include "inspect/document/streamWalk.h"
 #include "inspect/streams.h"
 #include "support/writtenDown.h"
+#include "tav/inspect/streamWalk.hpp"
 
 using namespace tav::inspect;
 using test::Bytes;
