@@ -7,6 +7,7 @@
 #include <utility>
 
 #include "inspect/plan/partRun.h"
+#include "inspect/walk/order.h"
 
 namespace tav::inspect
 {
@@ -161,7 +162,7 @@ std::vector<Ending> findEndings(ByteSource& source, const Form& form, uint64_t f
   {
     found = findInStretches(source, form, from, threads, stretches);
   }
-  std::sort(found.begin(), found.end(), [](const Ending& a, const Ending& b) {
+  putInOrder(found, [](const Ending& a, const Ending& b) {
     return a.start != b.start ? a.start < b.start : a.end > b.end;
   });
   return found;

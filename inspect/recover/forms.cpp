@@ -4,6 +4,7 @@
 #include <utility>
 
 #include "inspect/recover/rebuild.h"
+#include "inspect/walk/progressSteps.h"
 
 namespace tav::inspect
 {
@@ -132,12 +133,8 @@ Outcome FormRecovery::run(const Recognition& found, PatchFile& file)
 
 Outcome recoverBest(ByteSource& source, const Recognition& found, PatchFile& out, const RecoverBestOptions& options)
 {
-  const auto reading = [&](uint64_t offset) {
-    if (options.progress)
-    {
-      options.progress(offset);
-    }
-  };
+  ProgressSteps progress(options.progress);
+  const auto reading = [&](uint64_t offset) { progress.at(offset); };
   return FormRecovery(source, options.search, options.listed, options.makeFile, reading, options.threads)
       .run(found, out);
 }

@@ -80,8 +80,13 @@ bool Judge::isBoundary(uint64_t offset) const
 bool Judge::goesOn(uint64_t offset, bool wide) const
 {
   const uint64_t limit = place_.sureLimit();
-  return beliefAt(offset, wide, limit) >= Belief::named ||
-         (!wide && place_.canHold(true) && prober_.judge(offset, true, limit) == Belief::followed);
+  return beliefAt(offset, wide, limit) >= Belief::named || isOfOtherWidth(offset, wide, limit);
+}
+
+/// Whether a node has the wider header here, where the group may hold such.
+bool Judge::isOfOtherWidth(uint64_t offset, bool wide, uint64_t limit) const
+{
+  return !wide && place_.canHold(true) && prober_.judge(offset, true, limit) == Belief::followed;
 }
 
 Belief Judge::beliefAt(uint64_t offset, bool wide, uint64_t limit) const
@@ -224,7 +229,9 @@ Belief Judge::beliefBehind(uint64_t end, bool wide, uint64_t limit) const
   {
     return Belief::followed;
   }
-  return goesOn(end, wide) ? std::max(Belief::named, beliefAt(end, wide, limit)) : Belief::none;
+  const Belief belief = beliefAt(end, wide, limit);
+  return belief >= Belief::named ? belief : isOfOtherWidth(end, wide, limit) ? Belief::named
+                                                                             : Belief::none;
 }
 
 void Judge::lookAtData(Candidate& found, uint64_t limit) const
@@ -259,7 +266,8 @@ void Judge::lookBehind(Candidate& found, uint64_t base, uint64_t limit) const
   const uint64_t pair = wide && hasEyeSize(header) ? kEyeSizeLength : 0;
   const uint64_t most = typeOf(header) == TAV_TYPE_UTF8_STRING ? 2 : 0;
   Belief best = Belief::typed;
-  for (const uint64_t with : {pair, uint64_t{0}})
+  const std::array pairs{pair, uint64_t{0}};
+  for (const uint64_t with : std::span(pairs).first(pair != 0 ? 2 : 1))
   {
     for (uint64_t extra = 0; extra <= most; extra += 2)
     {
@@ -287,7 +295,7 @@ bool Judge::isRun(uint64_t offset, bool wide) const
   {
     Ending ending;
     if (weight != 0 && (isBoundary(offset) || readEnding(source_, form_, offset, wide, limit, ending) ||
-                        (!wide && place_.canHold(true) && prober_.judge(offset, true, limit) == Belief::followed)))
+                        isOfOtherWidth(offset, wide, limit)))
     {
       return true;
     }

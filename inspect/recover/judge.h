@@ -110,6 +110,7 @@ private:
   bool lookForPair(Candidate& found, uint64_t base, uint64_t limit) const;
   bool isCutAt(uint64_t offset, bool wide) const;
   bool isBetter(uint64_t with, uint64_t without, bool wide, uint64_t limit) const;
+  bool isOfOtherWidth(uint64_t offset, bool wide, uint64_t limit) const;
   bool isPlausible(uint64_t offset, bool wide, uint64_t limit) const;
   Belief beliefBehind(uint64_t end, bool wide, uint64_t limit) const;
   static bool isOdd(const TAVHeader& group);

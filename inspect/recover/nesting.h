@@ -3,7 +3,6 @@
 #pragma once
 
 #include <cstdint>
-#include <utility>
 
 #include "inspect/recover/ledger.h"
 #include "inspect/recover/place.h"
@@ -43,12 +42,8 @@ public:
   /// Sees to it that the innermost group takes nodes with this header.
   void fit(bool wide, bool isRoot);
 
-  /// Counts the innermost group, which was open or whose size was wrong, once; one that is hidden is not written.
-  void countClosed()
-  {
-    OpenGroup& top = place_.top();
-    ledger_.totals().closed += top.hidden || std::exchange(top.counted, true) ? 0 : 1;
-  }
+  /// Counts the innermost group, which was open or whose size was wrong.
+  void countClosed() { ledger_.totals().closed += place_.top().count(); }
 
 private:
   bool wouldReadAsOpen() const;

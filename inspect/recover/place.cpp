@@ -50,7 +50,7 @@ uint64_t Place::contradict(uint64_t end)
     OpenGroup& group = levels_[i].group;
     if (group.limit < end)
     {
-      count += group.open || group.hidden || std::exchange(group.counted, true) ? 0 : 1;
+      count += group.open ? 0 : group.count();
       group.limit = levels_[i - 1].group.limit;
       group.open = true;
     }

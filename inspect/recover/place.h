@@ -4,6 +4,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <utility>
 #include <vector>
 
 #include "inspect/recover/endings.h"
@@ -24,6 +25,9 @@ struct OpenGroup
   bool hidden = false;  ///< too deep: its children go to the group around it
   bool counted = false; ///< among those that were open or whose size was wrong
   uint64_t claim = 0;   ///< where its size says that it ends, when only what is there speaks against it; else 0
+
+  /// 1 the first time for a group that was open or whose size was wrong; one that is hidden is not written.
+  uint64_t count() { return hidden || std::exchange(counted, true) ? 0 : 1; }
 };
 
 /// A position, the groups that are open around it, and the groups ahead whose headers are lost. The outermost group

@@ -2,18 +2,15 @@
 
 #include "inspect/recover/rebuild.h"
 #include "inspect/recover/recovery.h"
+#include "inspect/walk/progressSteps.h"
 
 namespace tav::inspect
 {
 
 RecoveryTotals recover(ByteSource& source, const Form& form, PatchFile& out, const RecoverOptions& options)
 {
-  const auto at = [&](uint64_t offset) {
-    if (options.progress)
-    {
-      options.progress(offset);
-    }
-  };
+  ProgressSteps progress(options.progress);
+  const auto at = [&](uint64_t offset) { progress.at(offset); };
   Rebuilder rebuilder(source, form, out, at);
   const auto loss = [&](const Loss& lost) {
     if (options.lost)

@@ -99,6 +99,40 @@ TEST_P(Judging, WhereTheNextNodeStandsTellsOfTwoBytesBehindAText)
   }
 }
 
+TEST_P(Judging, OneByteBehindATextIsNotAPartOfIt)
+{
+  for (const uint64_t between : {uint64_t{1}, uint64_t{3}})
+  {
+    rows = ByteRows(GetParam());
+    rows.h64(5, 0, TAV_TYPE_UTF8_STRING, TAV_ELM_CMN_HOST_NAME).number(65001, 2).fill(3, 'a').fill(between, 0x11);
+    number();
+    number();
+    const Candidate found = lookAtFirst();
+    EXPECT_EQ(found.trust, Trust::alone) << between;
+    EXPECT_EQ(found.end, 21U) << between;
+  }
+}
+
+TEST_P(Judging, WhatIsLeftOfAGroupIsNotTakenWhereOneIsSearchedFor)
+{
+  const auto isTaken = [this] {
+    const Judged it(rows.bytes, form);
+    const Candidate found = it.judge.look(0, true);
+    EXPECT_NE(found.trust, Trust::none);
+    return it.judge.isWorthTaking(found, 0, rows.at());
+  };
+  rows.h64(20, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+  number();
+  EXPECT_TRUE(isTaken());
+  rows = ByteRows(GetParam());
+  rows.fill(52, 0x5A).end64(52).bytes.erase(rows.bytes.begin(), rows.bytes.begin() + 52);
+  EXPECT_FALSE(isTaken()) << "an end element of a group before the file";
+  rows = ByteRows(GetParam());
+  rows.h64(400, 0x20, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM); // flags that no group has, and more than there is
+  number();
+  EXPECT_FALSE(isTaken());
+}
+
 TEST_P(Judging, NothingSpeaksForHeadersThatNoNodeHas)
 {
   rows.h64(4, 0, kUnknownType, TAV_ELM_CMN_CPU_ONLINE).fill(4);
@@ -160,6 +194,20 @@ TEST_P(Judging, AGroupWhoseHeaderIsLostEndsWhatStandsBeforeIt)
   EXPECT_TRUE(it.judge.isBoundary(30));
   it.place.passLostGroup();
   EXPECT_FALSE(it.judge.isBoundary(30));
+}
+
+TEST_P(Judging, ARootThatWentElsewhereIsSureByTheSizeOfTheFile)
+{
+  for (const uint64_t missing : {uint64_t{15}, uint64_t{16}, uint64_t{17}})
+  {
+    rows = ByteRows(GetParam());
+    rows.fill(50, 0x5A).h64(50 + 16 + 60 - missing, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+    number();
+    number();
+    number();
+    const Judged it(rows.bytes, form);
+    EXPECT_EQ(it.judge.isSure(rows.bytes.data() + 50, 50, true), missing == 16) << missing;
+  }
 }
 
 TEST_P(Judging, NodesLeadOnlyToWhereOneOfThemEnds)

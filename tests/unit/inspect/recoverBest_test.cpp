@@ -225,6 +225,25 @@ TEST(RecoveryAccount, OfOthersTheOneWithMoreNodesAndBytesAndOfEqualsTheOneWithFe
     expectMore(other, one);
     other.totals.nodes = 13;
     expectMore(other, one);
+    other.totals = one.totals;
+    EXPECT_FALSE(one.keepsMoreThan(other));
+    EXPECT_FALSE(other.keepsMoreThan(one));
+  }
+}
+
+TEST(RecoveryAccount, IsLikeAnotherThatKeepsAsMuchInAsManyNodesWithAsManyGaps)
+{
+  const Account one{.totals = {.kept = 100, .nodes = 6, .losses = 3}, .written = 90};
+  const Account same{.form = {.swapped = true}, .totals = one.totals, .written = 90};
+  EXPECT_TRUE(one.isLike(same));
+  Account other = one;
+  ++other.written;
+  EXPECT_FALSE(one.isLike(other));
+  for (uint64_t RecoveryTotals::*const part : {&RecoveryTotals::kept, &RecoveryTotals::nodes, &RecoveryTotals::losses})
+  {
+    other = one;
+    ++(other.totals.*part);
+    EXPECT_FALSE(one.isLike(other));
   }
 }
 

@@ -99,6 +99,7 @@ TEST_P(Recovering, AGroupThatHasLostItsHeaderComesBackByItsEndElement)
   rows.end64(16 + 20 + 68 + 20 + 16);
   const Recovered back(rows.bytes, form);
   EXPECT_EQ(back.totals.made, 1U);
+  EXPECT_EQ(back.totals.closed, 0U);
   EXPECT_EQ(back.totals.ends, 2U);
   EXPECT_EQ(back.totals.nodes, 4U);
   ASSERT_EQ(back.losses.size(), 1U);
@@ -132,6 +133,7 @@ TEST_P(Recovering, NodesThatHaveLostAllGroupsGetOne)
   number();
   const Recovered back(rows.bytes, form);
   EXPECT_EQ(back.totals.made, 1U);
+  EXPECT_EQ(back.totals.closed, 0U);
   EXPECT_EQ(back.totals.nodes, 2U);
   EXPECT_EQ(back.stream.size(), 16U + 40U);
   EXPECT_EQ(back.totals.lost, 23U);
@@ -172,6 +174,27 @@ TEST_P(Recovering, GroupsThatTheEndOfAnotherClosesAreCountedOnceWhereTheyWereOpe
     expected.h64(4, 0, TAV_TYPE_UINT32, TAV_ELM_CMN_CPU_ONLINE).number(9, 4);
     expected.end64(16 + 16 + 20 + 16);
     EXPECT_EQ(back.stream, expected.bytes);
+  }
+}
+
+TEST_P(Recovering, AGroupThatIsConfirmedStretchesTheOneAroundIt)
+{
+  const auto stream = [this](uint64_t size) {
+    rows = ByteRows(GetParam());
+    rows.h64(size, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+    rows.h64(72, TAV_INFO_EYE_SIZE, TAV_TYPE_HEADER64, TAV_ELM_CMN_HOST);
+    number();
+    number();
+    return rows.end64(72).bytes;
+  };
+  const Bytes whole = stream(88);
+  for (const uint64_t size : {uint64_t{36}, uint64_t{30}}) // behind the first number, and in it
+  {
+    const Recovered back(stream(size), form);
+    EXPECT_EQ(back.stream, whole) << size;
+    EXPECT_TRUE(back.losses.empty()) << size;
+    EXPECT_EQ(back.totals.nodes, 4U);
+    EXPECT_EQ(back.totals.closed, 1U) << "one of the two sizes was wrong";
   }
 }
 
@@ -241,6 +264,45 @@ TEST_P(Recovering, SaysWhichNodesBesideLostBytesMayBeNone)
   EXPECT_EQ(back.doubts[0].offset, 36U);
   EXPECT_EQ(back.doubts[0].length, 20U);
   EXPECT_EQ(back.totals.doubts, 1U);
+}
+
+TEST_P(Recovering, DoubtsNoNodeBehindOneThatCameBack)
+{
+  rows.h64(19 + 20 + 36, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM).fill(19, 0x5A);
+  number();
+  rows.h64(4, TAV_INFO_EYE_SIZE, TAV_TYPE_UINT32, 12345).number(9, 4).pair(20); // an element that nobody knows
+  const Recovered back(rows.bytes, form);
+  EXPECT_EQ(back.totals.nodes, 3U);
+  EXPECT_EQ(back.totals.lost, 19U);
+  EXPECT_TRUE(back.doubts.empty());
+}
+
+TEST_P(Recovering, OfAnEndElementWithADamagedPairThePairAloneIsLost)
+{
+  rows.h64(52, TAV_INFO_EYE_SIZE, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+  number();
+  const uint64_t end = rows.at();
+  rows.end64(52);
+  Bytes damaged = rows.bytes;
+  damaged[end + 16] ^= 0x40; // in the eye catcher
+  const Recovered back(damaged, form);
+  EXPECT_EQ(back.stream, rows.bytes);
+  ASSERT_EQ(back.losses.size(), 1U);
+  EXPECT_EQ(back.losses[0].offset, end + 16);
+  EXPECT_EQ(back.losses[0].length, 16U);
+  EXPECT_EQ(back.totals.kept, end + 16);
+  EXPECT_EQ(back.totals.pairs, 1U);
+}
+
+TEST_P(Recovering, TheTwoBytesBehindATextComeBackWithIt)
+{
+  rows.h64(16 + 5 + 2 + 40, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+  rows.h64(5, 0, TAV_TYPE_UTF8_STRING, TAV_ELM_CMN_HOST_NAME).number(65001, 2).fill(3, 'a').fill(2, 0x11);
+  number();
+  number();
+  const Recovered back(rows.bytes, form);
+  EXPECT_EQ(back.stream, rows.bytes);
+  EXPECT_EQ(back.totals.kept, rows.at());
 }
 
 TEST(Recovery, TellsOfLossesInTheirOrder)
