@@ -155,11 +155,20 @@ Ref bytesAt(const inspect::NodeColumns& rows, size_t row)
   return made(PyBytes_FromStringAndSize(reinterpret_cast<const char*>(raw.bytes), static_cast<Py_ssize_t>(raw.size)));
 }
 
-void fillNames(const inspect::NodeColumns& rows, Places& places, bool types)
+void fillTypes(const inspect::NodeColumns& rows, Places& places)
 {
   for (size_t row = 0; row < rows.count(); ++row)
   {
-    places.put(row, Py_NewRef(types ? typeNameOf(rows.type[row]) : tagOf(rows.id[row])));
+    places.put(row, Py_NewRef(typeNameOf(rows.type[row])));
+  }
+}
+
+void fillTags(const inspect::NodeColumns& rows, Places& places, const inspect::Dictionary& dictionary)
+{
+  const bool hasOwn = !dictionary.isEmpty();
+  for (size_t row = 0; row < rows.count(); ++row)
+  {
+    places.put(row, hasOwn ? tagIn(dictionary, rows.id[row]).release() : Py_NewRef(tagOf(rows.id[row])));
   }
 }
 
@@ -184,9 +193,13 @@ PyObject* fillObjects(PyObject* self, PyObject* arguments)
     const inspect::NodeColumns& rows = rowsOf(self).columns;
     const std::string wanted = bytesOfText(name);
     Places places(array, rows.count());
-    if (wanted == "tag" || wanted == "type")
+    if (wanted == "tag")
     {
-      fillNames(rows, places, wanted == "type");
+      fillTags(rows, places, rowsOf(self).dictionary());
+    }
+    else if (wanted == "type")
+    {
+      fillTypes(rows, places);
     }
     else if (wanted == "text")
     {

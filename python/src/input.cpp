@@ -78,7 +78,9 @@ std::span<const uint8_t> Input::bytes() const
 
 std::unique_ptr<inspect::ByteSource> Input::source() const
 {
-  return std::make_unique<inspect::ByteSource>(name, bytes());
+  auto made = std::make_unique<inspect::ByteSource>(name, bytes());
+  made->setDictionary(dictionary);
+  return made;
 }
 
 bool isPath(PyObject* what)
@@ -97,13 +99,13 @@ std::string pathOfFile(PyObject* path)
   return {PyBytes_AS_STRING(encoded), static_cast<size_t>(PyBytes_GET_SIZE(encoded))};
 }
 
-Input openInput(PyObject* what)
+Input openInput(PyObject* what, PyObject* dictionary)
 {
   if (!isPath(what))
   {
-    return {viewOf(what), "memory"};
+    return {viewOf(what), "memory", dictionaryOf(dictionary)};
   }
-  Input input{{}, pathOfFile(what)};
+  Input input{{}, pathOfFile(what), dictionaryOf(dictionary)};
   const OpenFile file(openFile(input.name, what));
   input.memory = viewOf(map(file.object.get()).get());
   return input;
@@ -140,6 +142,15 @@ inspect::FormChoice choiceOf(PyObject* byteOrder, PyObject* root, PyObject* alig
     choice.aligned = done(PyObject_IsTrue(align)) != 0;
   }
   return choice;
+}
+
+Told::Told(PyObject* tuple)
+{
+  PyObject* byteOrder = nullptr;
+  PyObject* root = nullptr;
+  PyObject* align = nullptr;
+  done(PyArg_ParseTuple(tuple, "OOOO", &byteOrder, &root, &align, &dictionary) - 1);
+  choice = choiceOf(byteOrder, root, align);
 }
 
 Ref formTuple(const inspect::Form& form)

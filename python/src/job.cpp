@@ -38,11 +38,14 @@ inspect::DamageWatch::Sink sinkOf(const Job& job, bool skips)
 } // namespace
 
 Job::Job(PyObject* what, PyObject* form)
-    : input(openInput(what)), source(input.source())
+    : Job(what, Told(form))
 {
-  const Ref parts = made(PySequence_Fast(form, "a form is a tuple"));
-  PyObject** const items = PySequence_Fast_ITEMS(parts.get());
-  const inspect::FormChoice choice = choiceOf(items[0], items[1], items[2]);
+}
+
+Job::Job(PyObject* what, const Told& told)
+    : input(openInput(what, told.dictionary)), source(input.source())
+{
+  const inspect::FormChoice& choice = told.choice;
   recognition = inspect::recognise(*source, choice);
   const bool isGiven = choice.swapped || choice.root64 || choice.aligned;
   const auto kind = isGiven ? std::nullopt : inspect::otherKindOf(*source, recognition);

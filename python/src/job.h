@@ -16,7 +16,7 @@ namespace tav::python
 /// A stream that is worked on.
 struct Job
 {
-  /// `form` is a tuple (byte_order, root, align). What is no stream raises TavError.
+  /// `form` as of Told. What is no stream raises TavError.
   Job(PyObject* what, PyObject* form);
 
   Input input;
@@ -24,6 +24,10 @@ struct Job
   inspect::Recognition recognition;
 
   const inspect::Form& form() const { return recognition.form; }
+  const inspect::Dictionary& dictionary() const { return input.dictionary; }
+
+private:
+  Job(PyObject* what, const Told& told);
 };
 
 /// Follows a walk: tells how far it is, and ends it at damage unless that is skipped.

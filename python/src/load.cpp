@@ -93,7 +93,8 @@ Ref loadBelow(Opened& opened, const WalkRoot& root)
     {
       value = step.payload != nullptr ? made(valueOf(step.raw(root.form.swapped))) : Ref(none());
     }
-    put(open[static_cast<size_t>(step.depth) - 1], stepNameOf(step.elm()), std::move(value));
+    put(open[static_cast<size_t>(step.depth) - 1], stepNameIn(opened.input.dictionary, step.elm()).get(),
+        std::move(value));
   });
   return result;
 }
@@ -127,7 +128,8 @@ PyObject* loadRoots(ReaderObject& reader)
   for (const WalkRoot& root : roots)
   {
     const Ref dict = made(PyDict_New());
-    done(PyDict_SetItem(dict.get(), stepNameOf(root.node.elm()), loadOne(opened, root).get()));
+    done(PyDict_SetItem(dict.get(), stepNameIn(opened.input.dictionary, root.node.elm()).get(),
+                        loadOne(opened, root).get()));
     done(PyList_Append(list.get(), dict.get()));
   }
   return roots.size() == 1 ? Py_NewRef(PyList_GET_ITEM(list.get(), 0)) : list.release();

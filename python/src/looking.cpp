@@ -90,13 +90,13 @@ Ref schemaTuple(const inspect::SchemaEntry& entry)
                             entry.more ? Py_True : Py_False));
 }
 
-std::vector<inspect::Path> pathsOf(PyObject* texts)
+std::vector<inspect::Path> pathsOf(PyObject* texts, const inspect::Dictionary& dictionary)
 {
   const Ref items = made(PySequence_Fast(texts, "paths are a list of texts"));
   std::vector<inspect::Path> paths;
   for (Py_ssize_t i = 0; i < PySequence_Fast_GET_SIZE(items.get()); ++i)
   {
-    paths.push_back(inspect::pathOf(bytesOfText(PySequence_Fast_GET_ITEM(items.get(), i))));
+    paths.push_back(inspect::pathOf(bytesOfText(PySequence_Fast_GET_ITEM(items.get(), i)), dictionary));
   }
   return paths;
 }
@@ -185,14 +185,14 @@ PyObject* diff(PyObject*, PyObject* arguments)
     }
     Job a(whatA, form);
     Job b(whatB, form);
-    const auto whole = [](PyObject* path) {
-      return path == Py_None ? std::nullopt : std::optional(inspect::pathOf(bytesOfText(path)));
+    const auto whole = [&a](PyObject* path) {
+      return path == Py_None ? std::nullopt : std::optional(inspect::pathOf(bytesOfText(path), a.dictionary()));
     };
     const inspect::DiffInput inputA{*a.source, a.form(), whole(pathA)};
     const inspect::DiffInput inputB{*b.source, b.form(), whole(pathB)};
     options.tolerance.percent = percent != 0;
     options.contents = contents != 0;
-    options.ignored = pathsOf(ignored);
+    options.ignored = pathsOf(ignored, a.dictionary());
     std::vector<inspect::Difference> differences;
     {
       Pass pass(progressOf(progress), a.source->size() + b.source->size());

@@ -40,7 +40,7 @@ Ref reportTuple(const inspect::Outcome& outcome)
                             pieceList(account.losses).release(), pieceList(account.doubts).release()));
 }
 
-std::vector<inspect::Assignment> assignmentsOf(PyObject* pairs)
+std::vector<inspect::Assignment> assignmentsOf(PyObject* pairs, const inspect::Dictionary& dictionary)
 {
   const Ref items = made(PySequence_Fast(pairs, "pairs of path and value are expected"));
   std::vector<inspect::Assignment> assignments;
@@ -49,7 +49,7 @@ std::vector<inspect::Assignment> assignmentsOf(PyObject* pairs)
     PyObject* path = nullptr;
     PyObject* value = nullptr;
     done(PyArg_ParseTuple(PySequence_Fast_GET_ITEM(items.get(), i), "UO", &path, &value) - 1);
-    assignments.push_back({inspect::pathOf(bytesOfText(path)), editText(value)});
+    assignments.push_back({inspect::pathOf(bytesOfText(path), dictionary), editText(value)});
   }
   return assignments;
 }
@@ -64,15 +64,17 @@ PyObject* fromJson(PyObject*, PyObject* arguments)
     PyObject* output = nullptr;
     done(PyArg_ParseTuple(arguments, "UOO", &text, &form, &output) - 1);
     const std::string document = bytesOfText(text);
-    const Ref parts = made(PySequence_Fast(form, "a form is a tuple"));
-    PyObject** const items = PySequence_Fast_ITEMS(parts.get());
-    const inspect::FormChoice choice = choiceOf(items[0], items[1], items[2]);
+    const Told told(form);
+    const inspect::Dictionary dictionary = dictionaryOf(told.dictionary);
     Product product(output);
     {
       const Pass pass(nullptr, 0);
       inspect::MemoryText source("JSON", document);
       inspect::fromJson(source, product.file(),
-                        {.swapped = choice.swapped, .root64 = choice.root64, .aligned = choice.aligned});
+                        {.swapped = told.choice.swapped,
+                         .root64 = told.choice.root64,
+                         .aligned = told.choice.aligned,
+                         .dictionary = dictionary});
       product.finish();
     }
     return product.result().release();
@@ -125,13 +127,13 @@ PyObject* setValues(PyObject*, PyObject* arguments)
     PyObject* progress = nullptr;
     done(PyArg_ParseTuple(arguments, "OOOOOppO", &what, &form, &pairs, &type, &output, &inPlace, &skips, &progress) -
          1);
-    const std::vector<inspect::Assignment> assignments = assignmentsOf(pairs);
     inspect::EditOptions options;
     if (type != Py_None)
     {
       options.type = typeOf(type);
     }
     Job job(what, form);
+    const std::vector<inspect::Assignment> assignments = assignmentsOf(pairs, job.dictionary());
     std::optional<Product> product;
     if (inPlace == 0)
     {
@@ -171,8 +173,8 @@ PyObject* extract(PyObject*, PyObject* arguments)
     int skips = 0;
     PyObject* progress = nullptr;
     done(PyArg_ParseTuple(arguments, "OOUOpO", &what, &form, &path, &output, &skips, &progress) - 1);
-    const inspect::Path wanted = inspect::pathOf(bytesOfText(path));
     Job job(what, form);
+    const inspect::Path wanted = inspect::pathOf(bytesOfText(path), job.dictionary());
     Product product(output);
     uint64_t roots = 0;
     uint64_t nodes = 0;

@@ -34,12 +34,14 @@ PyObject* makeModule()
   Ref module = made(PyModule_Create(&definition));
   prepareValues();
   addErrors(module.get());
+  addDictionary(module.get());
   addReader(module.get());
   addNode(module.get());
   addWalks(module.get());
   addColumns(module.get());
   addTable(module.get());
   addWriter(module.get());
+  addFollowing(module.get());
   done(PyModule_AddStringConstant(module.get(), "__version__", TAV_VERSION));
   return module.release();
 }

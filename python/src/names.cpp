@@ -42,15 +42,14 @@ std::optional<uint16_t> shortOf(PyObject* number)
   return fits ? std::optional(static_cast<uint16_t>(value)) : std::nullopt;
 }
 
-uint16_t lookUpName(PyObject* name)
+uint16_t lookUpName(const std::string& text, const inspect::Dictionary& dictionary)
 {
-  const std::string text = bytesOfText(name);
   const std::vector<uint16_t> ids = inspect::idsOf(text);
   if (!ids.empty())
   {
     return ids.front();
   }
-  const std::string similar = inspect::similarNames(text);
+  const std::string similar = inspect::similarNames(text, dictionary);
   const std::string hint = similar.empty() ? "" : "; did you mean " + similar + "?";
   fail(TAV_RC_BAD_PARAM, "no element is called '" + text + "'" + hint);
 }
@@ -72,7 +71,7 @@ PyObject* Names::add(uint16_t number)
   return object;
 }
 
-uint16_t idOf(PyObject* name)
+uint16_t idOf(PyObject* name, const inspect::Dictionary& dictionary)
 {
   if (!PyUnicode_Check(name))
   {
@@ -96,7 +95,12 @@ uint16_t idOf(PyObject* name)
   {
     throw Raised{};
   }
-  const uint16_t id = lookUpName(name);
+  const std::string text = bytesOfText(name);
+  if (const inspect::OwnElement* const own = dictionary.isEmpty() ? nullptr : dictionary.find(text))
+  {
+    return own->id;
+  }
+  const uint16_t id = lookUpName(text, dictionary);
   constexpr Py_ssize_t mostNames = 20'000; // spellings of names that are remembered
   if (PyDict_Size(idsByName) < mostNames)
   {

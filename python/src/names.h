@@ -5,6 +5,7 @@
 #include <cstdint>
 
 #include "python/src/object.h"
+#include "tav/inspect/dictionary.hpp"
 
 namespace tav::python
 {
@@ -52,7 +53,7 @@ inline PyObject* typeNameOf(uint16_t type)
 }
 
 /// The id that a tag, a constant, "#60103" or a number means.
-uint16_t idOf(PyObject* name);
+uint16_t idOf(PyObject* name, const inspect::Dictionary& dictionary);
 
 /// The type that a name or a number means.
 uint16_t typeOf(PyObject* name);

@@ -69,7 +69,11 @@ void deleteNode(PyObject* self)
 
 PyObject* getTag(PyObject* self, void*)
 {
-  return guarded([&] { return Py_NewRef(tagOf(nodeOf(self).elm)); });
+  return guarded([&] {
+    const NodeObject& node = nodeOf(self);
+    const Opened* const opened = node.reader->opened.get(); // a closed one has the built-in names
+    return opened != nullptr ? tagIn(opened->input.dictionary, node.elm).release() : Py_NewRef(tagOf(node.elm));
+  });
 }
 
 PyObject* getType(PyObject* self, void*)

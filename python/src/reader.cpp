@@ -37,11 +37,13 @@ PyObject* makeReader(PyTypeObject* type, PyObject* arguments, PyObject* named)
     PyObject* root = nullptr;
     PyObject* align = nullptr;
     PyObject* onDamage = nullptr;
-    static const char* const names[] = {"source", "byte_order", "root", "align", "on_damage", nullptr};
-    done(PyArg_ParseTupleAndKeywords(arguments, named, "O|$OOOU:Reader", keywords(names), &source, &byteOrder, &root,
-                                     &align, &onDamage) -
+    PyObject* dictionary = nullptr;
+    static const char* const names[] = {"source", "byte_order", "root", "align", "on_damage", "dictionary", nullptr};
+    done(PyArg_ParseTupleAndKeywords(arguments, named, "O|$OOOUO:Reader", keywords(names), &source, &byteOrder, &root,
+                                     &align, &onDamage, &dictionary) -
          1);
-    auto opened = std::make_shared<Opened>(openInput(source), choiceOf(byteOrder, root, align), onDamageOf(onDamage));
+    auto opened =
+        std::make_shared<Opened>(openInput(source, dictionary), choiceOf(byteOrder, root, align), onDamageOf(onDamage));
     Ref self = made(type->tp_alloc(type, 0));
     new (&readerOf(self.get()).opened) std::shared_ptr<Opened>(std::move(opened));
     return self.release();
@@ -228,7 +230,16 @@ PyObject* representHtml(PyObject* self, PyObject*)
   return guarded([&] { return callPython("tav._html", "reader_html", self); });
 }
 
+PyObject* getDictionary(PyObject* self, void*)
+{
+  return guarded([&] {
+    const inspect::Dictionary& dictionary = use(readerOf(self)).input.dictionary;
+    return dictionary.isEmpty() ? none() : dictionaryObject(dictionary).release();
+  });
+}
+
 PyGetSetDef attributes[] = {
+    {"dictionary", getDictionary, nullptr, "Names of own elements: Dictionary, or None", nullptr},
     {"closed", isClosed, nullptr, "Whether it is closed: bool", nullptr},
     {"damage", getDamage, nullptr,
      "What walks have passed over so far: list of Damage(offset, size, rule), each place once, by offset", nullptr},
@@ -280,14 +291,16 @@ PyType_Slot slots[] = {
     {Py_nb_bool, asSlot(isThere)},
     {Py_tp_doc,
      const_cast<char*>(
-         "Reader(source, *, byte_order=None, root=None, align=None, on_damage='stop')\n--\n\n"
+         "Reader(source, *, byte_order=None, root=None, align=None, on_damage='stop',\n"
+         "       dictionary=None)\n--\n\n"
          "A file or bytes with one stream or several, whose form nobody has to tell. Iterating gives the roots.\n\n"
          "source: a path (str, os.PathLike), or an object with a buffer, which stays as it is while the reader is\n"
          "open\n"
          "byte_order: 'little' or 'big'; root: 32 or 64, bits of the first header; align: whether payloads are padded\n"
          "to 8 bytes: what is given is not found out\n"
          "on_damage: 'stop' raises TavError at damage; 'skip' goes on behind it, and `damage` tells what was passed\n"
-         "over\n\n"
+         "over\n"
+         "dictionary: names of own elements: a Dictionary, or the path of its file\n\n"
          "A file is mapped: opening costs nothing by its size, and it must not become shorter meanwhile.\n"
          "A reader belongs to one thread at a time: a search while another one runs raises TavError. Different\n"
          "readers of one file are independent.")},
@@ -297,9 +310,17 @@ PyType_Spec spec = {"tav.Reader", sizeof(ReaderObject), 0, Py_TPFLAGS_DEFAULT | 
 
 } // namespace
 
+inspect::DocumentOptions documentOptions(const inspect::FormChoice& form, const inspect::Dictionary& dictionary)
+{
+  inspect::DocumentOptions options;
+  options.form = form;
+  options.dictionary = dictionary;
+  return options;
+}
+
 Opened::Opened(Input given, const inspect::FormChoice& choice, OnDamage atDamage)
     : input(std::move(given)), bytes(input.bytes()), onDamage(atDamage),
-      document(input.source(), inspect::DocumentOptions{.form = choice})
+      document(input.source(), documentOptions(choice, input.dictionary))
 {
   document.tellProgress([this](uint64_t offset) {
     if (pass != nullptr)

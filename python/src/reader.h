@@ -36,6 +36,8 @@ private:
   std::array<std::unique_ptr<tav::Reader>, 4> readers_{};
 };
 
+inspect::DocumentOptions documentOptions(const inspect::FormChoice& form, const inspect::Dictionary& dictionary);
+
 /// What the layer's reader is told of a form.
 StreamOptions layerOptions(bool swapped, bool aligned);
 
@@ -155,5 +157,6 @@ void addWalks(PyObject* module);
 void addColumns(PyObject* module);
 void addWriter(PyObject* module);
 void addTable(PyObject* module);
+void addFollowing(PyObject* module);
 
 } // namespace tav::python

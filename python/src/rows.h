@@ -22,6 +22,8 @@ public:
   /// Reads all streams. Called without the interpreter.
   void fill(inspect::ByteSource& source, bool withPaths, Pass& pass);
 
+  const inspect::Dictionary& dictionary() const { return opened_->input.dictionary; }
+
   inspect::NodeColumns columns{};
   bool hasNegative = false;
   bool hasUpper = false; ///< numbers that only unsigned 64 bits hold

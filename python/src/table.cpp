@@ -42,7 +42,7 @@ const inspect::Table& tableOf(PyObject* self)
   return *objectOf(self).table;
 }
 
-inspect::TableQuery queryOf(PyObject* each, PyObject* columns, PyObject* joiner)
+inspect::TableQuery queryOf(PyObject* each, PyObject* columns, PyObject* joiner, const inspect::Dictionary& names)
 {
   const Ref items = made(PySequence_Fast(columns, "columns are pairs of name and path"));
   std::vector<inspect::TableColumn> wanted;
@@ -58,7 +58,7 @@ inspect::TableQuery queryOf(PyObject* each, PyObject* columns, PyObject* joiner)
   {
     between = bytesOfText(joiner);
   }
-  return {bytesOfText(each), std::move(wanted), std::move(between)};
+  return {bytesOfText(each), std::move(wanted), std::move(between), names};
 }
 
 /// Reads rows until there are so many, or no more, with looks for interrupts in between.
@@ -421,9 +421,10 @@ PyObject* readTable(PyObject*, PyObject* arguments)
     PyObject* joiner = nullptr;
     PyObject* progress = nullptr;
     unsigned long long most = 0;
-    done(PyArg_ParseTuple(arguments, "OUOOOK", &readers, &each, &columns, &joiner, &progress, &most) - 1);
+    PyObject* dictionary = nullptr;
+    done(PyArg_ParseTuple(arguments, "OUOOOKO", &readers, &each, &columns, &joiner, &progress, &most, &dictionary) - 1);
     PyObject* const told = progressOf(progress);
-    const inspect::TableQuery query = queryOf(each, columns, joiner);
+    const inspect::TableQuery query = queryOf(each, columns, joiner, dictionaryOf(dictionary));
     auto table = std::make_unique<inspect::Table>(query);
     const Ref walk = made(PyObject_GetIter(readers));
     while (table->rows() < most)
@@ -456,7 +457,8 @@ PyObject* readPart(PyObject*, PyObject* arguments)
     PyObject* progress = nullptr;
     done(PyArg_ParseTuple(arguments, "OOUOOO", &object, &numbers, &each, &columns, &joiner, &progress) - 1);
     PyObject* const told = progressOf(progress);
-    const inspect::TableQuery query = queryOf(each, columns, joiner);
+    const inspect::TableQuery query =
+        queryOf(each, columns, joiner, use(readerObjectOf(object)).input.dictionary);
     const inspect::Part part = partOfNumbers(numbers);
     auto table = std::make_unique<inspect::Table>(query);
     inspect::PartEnd end;
@@ -492,7 +494,7 @@ PyObject* plan(PyObject*, PyObject* arguments)
     const inspect::PlanOptions options{
         .targetBytes = size,
         .form = {.swapped = found.swapped, .root64 = found.root64, .aligned = found.aligned}};
-    const auto query = each == Py_None ? std::nullopt : std::optional(queryOf(each, columns, joiner));
+    const auto query = each == Py_None ? std::nullopt : std::optional(queryOf(each, columns, joiner, job.dictionary()));
     std::vector<inspect::Part> parts;
     {
       const Pass pass(nullptr, 0);

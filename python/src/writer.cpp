@@ -22,6 +22,7 @@ struct WriterObject
   PyObject_HEAD
       std::unique_ptr<tav::Writer>
           writer; ///< null: discarded
+  inspect::Dictionary dictionary;
   bool isFile;
   bool isFinished;
   bool busy; ///< a thread waits for the system without the interpreter
@@ -129,13 +130,15 @@ PyObject* makeWriter(PyTypeObject* type, PyObject* arguments, PyObject* named)
     PyObject* root = nullptr;
     PyObject* align = nullptr;
     PyObject* openRoot = nullptr;
+    PyObject* dictionary = nullptr;
     int append = 0;
     int overwrite = 0;
     static const char* const names[] = {"path", "append", "overwrite", "byte_order", "root",
-                                        "align", "open_root", nullptr};
-    done(PyArg_ParseTupleAndKeywords(arguments, named, "|O$ppOOOU:Writer", keywords(names), &path, &append, &overwrite,
-                                     &byteOrder, &root, &align, &openRoot) -
+                                        "align", "open_root", "dictionary", nullptr};
+    done(PyArg_ParseTupleAndKeywords(arguments, named, "|O$ppOOOUO:Writer", keywords(names), &path, &append, &overwrite,
+                                     &byteOrder, &root, &align, &openRoot, &dictionary) -
          1);
+    inspect::Dictionary own = dictionaryOf(dictionary);
     if (append != 0 && overwrite != 0)
     {
       raise(PyExc_ValueError, "a file is either gone on with or overwritten");
@@ -146,6 +149,7 @@ PyObject* makeWriter(PyTypeObject* type, PyObject* arguments, PyObject* named)
     Ref self = made(type->tp_alloc(type, 0));
     WriterObject& object = writerOf(self.get());
     new (&object.writer) std::unique_ptr<tav::Writer>(std::move(writer));
+    new (&object.dictionary) inspect::Dictionary(std::move(own));
     object.isFile = path != nullptr && path != Py_None;
     return self.release();
   });
@@ -155,13 +159,14 @@ void deleteWriter(PyObject* self)
 {
   PyTypeObject* const type = Py_TYPE(self);
   std::destroy_at(&writerOf(self).writer);
+  std::destroy_at(&writerOf(self).dictionary);
   type->tp_free(self);
   Py_DECREF(type);
 }
 
 struct GroupArguments
 {
-  GroupArguments(PyObject* arguments, PyObject* named)
+  GroupArguments(PyObject* arguments, PyObject* named, const inspect::Dictionary& dictionary)
   {
     PyObject* name = nullptr;
     int children = 64;
@@ -176,7 +181,7 @@ struct GroupArguments
     {
       raise(PyExc_ValueError, "children is 32 or 64, the bits of their headers");
     }
-    elm = idOf(name);
+    elm = idOf(name, dictionary);
     options.children = children == 32 ? Width::bits32 : Width::bits64;
     options.eyeSize = eyeSize != 0;
     options.info = info;
@@ -206,7 +211,7 @@ PyObject* openRootGroup(PyObject* self, PyObject* arguments, PyObject* named)
   return guarded([&] {
     WriterObject& writer = writerOf(self);
     tav::Writer& open = use(writer);
-    const GroupArguments given(arguments, named);
+    const GroupArguments given(arguments, named, writer.dictionary);
     return makeGroup(writer, nullptr, open.group(given.elm, given.options));
   });
 }
@@ -299,7 +304,7 @@ PyObject* openGroup(PyObject* self, PyObject* arguments, PyObject* named)
   return guarded([&] {
     GroupObject& outer = groupOf(self);
     tav::Group& group = use(outer);
-    const GroupArguments given(arguments, named);
+    const GroupArguments given(arguments, named, outer.writer->dictionary);
     return makeGroup(*outer.writer, &outer, group.group(given.elm, given.options));
   });
 }
@@ -360,7 +365,7 @@ PyObject* add(PyObject* self, PyObject* const* values, Py_ssize_t count, PyObjec
       raise(PyExc_TypeError, "add() takes a name and a value");
     }
     const AddArguments given = addArguments(values + count, names);
-    const uint16_t elm = idOf(values[0]);
+    const uint16_t elm = idOf(values[0], groupOf(self).writer->dictionary);
     const Encoded encoded = encode(values[1], given.type);
     group.addRaw(encoded.type, elm, std::as_bytes(std::span(encoded.bytes)), given.options);
     return none();
@@ -433,12 +438,13 @@ PyType_Slot writerSlots[] = {
     {Py_tp_doc,
      const_cast<char*>(
          "Writer(path=None, *, append=False, overwrite=False, byte_order=None, root=None, align=None,\n"
-         "       open_root='close')\n--\n\n"
+         "       open_root='close', dictionary=None)\n--\n\n"
          "Writes a stream into a file, or into memory where there is no path: see bytes().\n\n"
          "append: goes on behind the last stream of a file, in its form; overwrite: replaces a file, which stays\n"
          "as it is until finish(). Else a file that is there is refused.\n"
          "byte_order: 'little' or 'big', this machine's by default; root: 32 or 64; align: pad payloads to 8 bytes\n"
-         "open_root: with append, a root that was never closed is closed, or refused\n\n"
+         "open_root: with append, a root that was never closed is closed, or refused\n"
+         "dictionary: names of own elements: a Dictionary, or the path of its file\n\n"
          "As a context manager it finishes at the end, and is discarded where an exception comes through.")},
     {0, nullptr}};
 

@@ -36,7 +36,7 @@ def check_word(on_damage: str) -> None:
 
 def plan(source: Any, blocksize: Union[int, str] = "64MB", *, each: Optional[str] = None,
          columns: Optional[Mapping[str, str]] = None, join: Optional[str] = None, byte_order: Optional[str] = None,
-         root: Optional[int] = None, align: Optional[bool] = None) -> list[Part]:
+         root: Optional[int] = None, align: Optional[bool] = None, dictionary: Any = None) -> list[Part]:
     """Cuts a file into parts of about `blocksize` bytes without reading it.
 
     each, columns, join: parts that a table of these can be read by, with Reader.table(part=). Without them a part can
@@ -45,5 +45,6 @@ def plan(source: Any, blocksize: Union[int, str] = "64MB", *, each: Optional[str
     In long runs of small nodes a part begins where bytes look like a node of the same group, which can be a mistake,
     also one that somebody made. tav.dask finds it out and reads such a part again from the right place.
     """
-    found = _tav.plan(source, (byte_order, root, align), bytes_of(blocksize), each, list((columns or {}).items()), join)
+    found = _tav.plan(source, (byte_order, root, align, dictionary), bytes_of(blocksize), each,
+                      list((columns or {}).items()), join)
     return [Part(numbers[0], numbers[0] + numbers[1], numbers) for numbers in found]

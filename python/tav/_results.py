@@ -4,7 +4,7 @@ from __future__ import annotations
 import dataclasses
 import datetime
 import enum
-from typing import NamedTuple, Optional, Union
+from typing import Any, NamedTuple, Optional, Union
 
 
 class Form(NamedTuple):
@@ -32,6 +32,23 @@ class Damage(NamedTuple):
     """an id of docs/check-rules.md"""
 
 
+class Arrival(NamedTuple):
+    """A node that has come into a file, as it was then."""
+
+    path: str
+    id: int
+    tag: Optional[str]
+    type: Union[str, int]
+    value: Any
+    """as Node.value; None for a group"""
+    offset: int
+    size: Optional[int]
+    """of the payload; None for a group that is open"""
+    depth: int
+    """0: a root"""
+    is_group: bool
+
+
 class Finding(NamedTuple):
     """One defect."""
 
@@ -44,6 +61,18 @@ class Finding(NamedTuple):
     """of the bytes concerned; 0: no run of bytes is meant"""
     is_note: bool
     """remarkable, but no defect"""
+
+
+class OwnElement(NamedTuple):
+    """An element of a dictionary."""
+
+    id: int
+    tag: str
+    kind: Optional[str]
+    """'gauge', 'counter' or 'text'"""
+    unit: Optional[str]
+    text: Optional[str]
+    """what it means"""
 
 
 class Change(enum.Enum):

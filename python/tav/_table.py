@@ -21,7 +21,7 @@ def table(reader: _tav.Reader, each: str, columns: Mapping[str, str], *, join: O
     """See Reader.table."""
     if part is not None:
         return _tav.read_part(reader, part.numbers, each, list(columns.items()), join, progress)[0]
-    return _tav.read_table([reader], each, list(columns.items()), join, progress, _ALL)
+    return _tav.read_table([reader], each, list(columns.items()), join, progress, _ALL, reader.dictionary)
 
 
 def _kind_as(name: str, kind: str, wanted: str, values: Any, valid: Any) -> str:
@@ -110,18 +110,27 @@ def paths_of(paths: Union[str, os.PathLike[str], Iterable[Any]]) -> list[Any]:
     return found
 
 
+def names_of(dictionary: Union[_tav.Dictionary, str, os.PathLike[str], None]) -> Optional[_tav.Dictionary]:
+    """A dictionary that is read once."""
+    return dictionary if dictionary is None or isinstance(dictionary, _tav.Dictionary) else _tav.Dictionary(dictionary)
+
+
 def read_table(paths: Union[str, os.PathLike[str], Iterable[Any]], each: str, columns: Mapping[str, str], *,
                join: Optional[str] = None, on_damage: str = "stop", byte_order: Optional[str] = None,
                root: Optional[int] = None, align: Optional[bool] = None,
+               dictionary: Union[_tav.Dictionary, str, os.PathLike[str], None] = None,
                progress: _Progress = None) -> pandas.DataFrame:
     """A row for each node that the path `each` leads to, of any number of files one after the other.
 
     paths: a path, a pattern as of glob, or several of them; columns: {name: path from the row's node}
     join: the text between the values where a path leads to several; without it the first is taken
     """
+    names = names_of(dictionary)
+
     def readers() -> Iterator[_tav.Reader]:
         for path in paths_of(paths):
-            with _tav.Reader(path, byte_order=byte_order, root=root, align=align, on_damage=on_damage) as reader:
+            with _tav.Reader(path, byte_order=byte_order, root=root, align=align, on_damage=on_damage,
+                             dictionary=names) as reader:
                 yield reader
 
-    return to_pandas(_tav.read_table(readers(), each, list(columns.items()), join, progress, _ALL))
+    return to_pandas(_tav.read_table(readers(), each, list(columns.items()), join, progress, _ALL, names))

@@ -7,7 +7,7 @@ import os
 from types import TracebackType
 from typing import TYPE_CHECKING, Any, Callable, Iterable, Iterator, Literal, Mapping, Optional, Sequence, Union, final
 
-from ._results import Damage, Form
+from ._results import Damage, Form, OwnElement
 
 if TYPE_CHECKING:
     import pandas  # type: ignore[import]
@@ -16,7 +16,8 @@ __version__: str
 
 _Progress = Optional[Callable[[int, int], object]]
 _Value = Union[int, str, bytes, datetime.datetime, "array.array[int]", None]
-_FormTuple = tuple[Optional[str], Optional[int], Optional[bool]]
+_Names = Union["Dictionary", str, "os.PathLike[str]", None]
+_FormTuple = tuple[Optional[str], Optional[int], Optional[bool], _Names]
 _Order = Literal["little", "big"]
 
 class TavError(Exception):
@@ -69,6 +70,19 @@ class Node:
     def __hash__(self) -> int: ...
 
 @final
+class Dictionary:
+    def __new__(cls, *paths: Union[str, os.PathLike[str]]) -> Dictionary: ...
+    @property
+    def elements(self) -> list[OwnElement]: ...
+    def __len__(self) -> int: ...
+
+@final
+class _Following:
+    def __new__(cls, path: Any, form: _FormTuple, existing: bool, roots: bool, /) -> _Following: ...
+    def look(self, most: int, /) -> tuple[int, list[tuple[str, Any]], Optional[BaseException]]: ...
+    def wait(self, milliseconds: int, /) -> None: ...
+
+@final
 class _Rows:
     count: int
     number_type: str
@@ -90,7 +104,9 @@ class Table:
 @final
 class Reader:
     def __new__(cls, source: Any, *, byte_order: Optional[str] = None, root: Optional[int] = None,
-                align: Optional[bool] = None, on_damage: str = "stop") -> Reader: ...
+                align: Optional[bool] = None, on_damage: str = "stop", dictionary: _Names = None) -> Reader: ...
+    @property
+    def dictionary(self) -> Optional[Dictionary]: ...
     @property
     def closed(self) -> bool: ...
     @property
@@ -135,7 +151,7 @@ class Group:
 class Writer:
     def __new__(cls, path: Union[str, "os.PathLike[str]", None] = None, *, append: bool = False,
                 overwrite: bool = False, byte_order: Optional[str] = None, root: Optional[int] = None,
-                align: Optional[bool] = None, open_root: str = "close") -> Writer: ...
+                align: Optional[bool] = None, open_root: str = "close", dictionary: _Names = None) -> Writer: ...
     @property
     def size(self) -> int: ...
     def group(self, name: Union[str, int], *, children: int = 64, eye_size: bool = False, key: int = 0,
@@ -150,7 +166,7 @@ class Writer:
                  traceback: Optional[TracebackType]) -> None: ...
 
 def read_table(readers: Iterable[Reader], each: str, columns: list[tuple[str, str]], join: Optional[str],
-               progress: _Progress, most: int, /) -> Table: ...
+               progress: _Progress, most: int, dictionary: _Names, /) -> Table: ...
 def read_part(reader: Reader, part: Sequence[int], each: str, columns: list[tuple[str, str]], join: Optional[str],
               progress: _Progress, /) -> tuple[Table, tuple[tuple[int, ...], bool, int]]: ...
 def plan(source: Any, form: _FormTuple, size: int, each: Optional[str], columns: list[tuple[str, str]],

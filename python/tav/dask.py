@@ -9,7 +9,7 @@ from typing import TYPE_CHECKING, Any, Iterable, Mapping, Optional, Union
 
 from . import _tav
 from ._parts import bytes_of, check_word
-from ._table import paths_of, to_pandas
+from ._table import names_of, paths_of, to_pandas
 
 if TYPE_CHECKING:
     import pandas  # type: ignore[import]
@@ -24,22 +24,25 @@ class _Query:
     """What is read of each file."""
 
     def __init__(self, each: str, columns: Mapping[str, str], join: Optional[str], on_damage: str,
-                 form: tuple[Optional[str], Optional[int], Optional[bool]]) -> None:
+                 form: tuple[Optional[str], Optional[int], Optional[bool]],
+                 dictionary: Optional[_tav.Dictionary] = None) -> None:
         self.each = each
         self.columns = list(columns.items())
         self.join = join
         self.on_damage = on_damage
         self.form = form
+        self.dictionary = dictionary
         self.types: dict[str, str] = {}
 
     def open(self, path: str) -> _tav.Reader:
         order, root, align = self.form
-        return _tav.Reader(path, byte_order=order, root=root, align=align, on_damage=self.on_damage)
+        return _tav.Reader(path, byte_order=order, root=root, align=align, on_damage=self.on_damage,
+                           dictionary=self.dictionary)
 
     def plan(self, path: str, blocksize: int) -> list[tuple[int, ...]]:
         if os.path.getsize(path) <= blocksize:
             return []
-        return _tav.plan(path, self.form, blocksize, self.each, self.columns, self.join)
+        return _tav.plan(path, (*self.form, self.dictionary), blocksize, self.each, self.columns, self.join)
 
     def frame(self, table: _tav.Table, path: str) -> pandas.DataFrame:
         try:
@@ -48,12 +51,14 @@ class _Query:
             raise ValueError(f"{path}: {error}") from None
 
     def __dask_tokenize__(self) -> tuple[Any, ...]:
-        return (self.each, self.columns, self.join, self.on_damage, self.form, self.types)
+        names = self.dictionary.elements if self.dictionary is not None else None
+        return (self.each, self.columns, self.join, self.on_damage, self.form, names, self.types)
 
 
 def _read_file(query: _Query, path: str) -> pandas.DataFrame:
     with query.open(path) as reader:
-        return query.frame(_tav.read_table([reader], query.each, query.columns, query.join, None, _ALL), path)
+        found = _tav.read_table([reader], query.each, query.columns, query.join, None, _ALL, query.dictionary)
+        return query.frame(found, path)
 
 
 def _read_part(query: _Query, path: str, part: tuple[int, ...]) -> tuple[Any, Optional[_End]]:
@@ -115,10 +120,11 @@ def _graph_of(query: _Query, name: str, files: list[tuple[str, list[tuple[int, .
 def read_table(paths: Union[str, "os.PathLike[str]", Iterable[Union[str, "os.PathLike[str]"]]], each: str,
                columns: Mapping[str, str], *, blocksize: Union[int, str, None] = "64MB", join: Optional[str] = None,
                on_damage: str = "stop", types: Optional[Mapping[str, str]] = None, byte_order: Optional[str] = None,
-               root: Optional[int] = None, align: Optional[bool] = None) -> Any:
+               root: Optional[int] = None, align: Optional[bool] = None,
+               dictionary: Union[_tav.Dictionary, str, "os.PathLike[str]", None] = None) -> Any:
     """As tav.read_table, but a dask.dataframe.DataFrame: a partition for each file, and for each part of a large one.
 
-    paths: names that mean the same files here and where the workers run
+    paths, and that of a dictionary: names that mean the same files here and where the workers run
     blocksize: about how long parts are, in bytes or as '64MB'; None: files are not cut
     types: {column: type} as Table.columns names them, for columns whose type the first 10,000 rows, which are read
     here, do not tell; a value that does not fit is a ValueError that says so
@@ -135,12 +141,12 @@ def read_table(paths: Union[str, "os.PathLike[str]", Iterable[Union[str, "os.Pat
     graphs: Any = dask.highlevelgraph.HighLevelGraph
     check_word(on_damage)
     files = [os.path.abspath(os.fsdecode(path)) for path in paths_of(paths)]
-    query = _Query(each, columns, join, on_damage, (byte_order, root, align))
+    query = _Query(each, columns, join, on_damage, (byte_order, root, align), names_of(dictionary))
     given = dict(types or {})
     unknown = set(given) - set(columns)
     if unknown:
         raise ValueError(f"types names no column: {', '.join(sorted(unknown))}")
-    sample = _tav.read_table(map(query.open, files), each, query.columns, join, None, _SAMPLE)
+    sample = _tav.read_table(map(query.open, files), each, query.columns, join, None, _SAMPLE, query.dictionary)
     query.types = {**sample.columns, **given}
     size = 0 if blocksize is None else bytes_of(blocksize)
     planned = [(path, query.plan(path, size) if size else []) for path in files]
@@ -148,5 +154,5 @@ def read_table(paths: Union[str, "os.PathLike[str]", Iterable[Union[str, "os.Pat
     name = f"tav-{base.tokenize(query, planned, seen)}"
     graph = _graph_of(query, name, planned)
     partitions = sum(max(len(parts), 1) for _, parts in planned)
-    meta = to_pandas(_tav.read_table([], each, query.columns, join, None, 0), query.types)
+    meta = to_pandas(_tav.read_table([], each, query.columns, join, None, 0, query.dictionary), query.types)
     return core.new_dd_object(graphs.from_collections(name, graph), name, meta, [None] * (partitions + 1))

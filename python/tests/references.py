@@ -27,6 +27,8 @@ LARGE = streams.snapshot(20_000)  # long enough for progress to be told
 FOLDER = tempfile.TemporaryDirectory()
 FILE = pathlib.Path(FOLDER.name, "a.tav")
 FILE.write_bytes(DATA)
+NAMES = pathlib.Path(FOLDER.name, "own.json")
+NAMES.write_text('{"40001": {"tag": "queue"}}')
 
 
 def damaged() -> bytes:
@@ -52,6 +54,31 @@ def reading() -> None:
                 node.size, node.info, node.offset, node.reader, hash(node), repr(node), node == node, node.load()
             reader.load(), reader.damage, reader.form, reader.name, reader.memory, reader.closed
             repr(reader), len(reader)
+
+
+def following() -> None:
+    for roots in (False, True):
+        with tav.follow(FILE, roots=roots, timeout=0, on_change=print) as nodes:
+            for node in nodes:
+                node.path, node.value, node.offset
+            repr(nodes), nodes.damage
+    refused(lambda: next(tav.follow(FOLDER.name)))
+    refused(lambda: tav.follow(FILE, byte_order="up"))
+
+
+def naming() -> None:
+    own = tav.Dictionary(NAMES)
+    own.elements, len(own), own == tav.Dictionary(), hash(FILE)
+    for names in (own, NAMES):
+        with tav.Writer(dictionary=names) as writer, writer.group("queue") as group:
+            group.add("cpuOnline", 1)
+        with tav.open(writer.bytes(), dictionary=names) as reader:
+            for node in streams.all_nodes(reader):
+                node.tag, node.path
+            reader.load(), reader.dictionary
+        tav.to_json(writer.bytes(), dictionary=names), tav.schema(writer.bytes(), dictionary=names)
+    refused(lambda: tav.Dictionary(FILE))
+    refused(lambda: tav.open(DATA, dictionary=5))
 
 
 def searching() -> None:
@@ -146,7 +173,7 @@ def functions() -> None:
     refused(lambda: tav.open(5))
 
 
-OPERATIONS = (reading, searching, skipping, columns, tables, writing, functions)
+OPERATIONS = (reading, following, naming, searching, skipping, columns, tables, writing, functions)
 
 
 def growth(work: Callable[[], None]) -> int:

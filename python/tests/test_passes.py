@@ -89,6 +89,7 @@ def test_other_threads_run_during_a_pass(large, name):
 def test_control_c_ends_a_pass():
     program = """
 import os, signal, threading, time, sys, tav, streams
+signal.signal(signal.SIGINT, signal.default_int_handler)  # which whoever runs the tests may have told to ignore it
 data = streams.snapshot(40_000)
 reader = tav.open(data)
 begun = threading.Event()
