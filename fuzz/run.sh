@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # Fuzzes for a time or a number of times: builds the preset `fuzz`, runs each target from its corpus and all findings
 # of the past, and fails on a new finding. What is new in a corpus and what was found stays in build/fuzz-work.
-#   fuzz/run.sh SECONDS [TARGET...]      targets: read write layer c path dictionary table rows plan tool recover
+#   fuzz/run.sh SECONDS [TARGET...]      targets: read write layer append c path dictionary table rows plan tool recover
 #                                        build; all unless some are named
 #   fuzz/run.sh fixed [TARGET...]        the same inputs in every run, as many as take about half a minute: a fast machine
 #                                        finds nothing that a slow one has passed
@@ -20,9 +20,9 @@ if (($# == 0)) || [[ ! $1 =~ ^([0-9]+|fixed)$ ]]; then
 fi
 seconds=$1
 shift
-declare -A executions=([read]=35000 [write]=10000 [layer]=70000 [c]=2500 [path]=1500 [dictionary]=30000 [table]=10000 [rows]=5000 [plan]=2000 [tool]=10000 [recover]=45000 [build]=8500)
+declare -A executions=([read]=35000 [write]=10000 [layer]=70000 [append]=8000 [c]=2500 [path]=1500 [dictionary]=30000 [table]=10000 [rows]=5000 [plan]=2000 [tool]=10000 [recover]=45000 [build]=8500)
 targets=("$@")
-((${#targets[@]} > 0)) || targets=(read write layer c path dictionary table rows plan tool recover build)
+((${#targets[@]} > 0)) || targets=(read write layer append c path dictionary table rows plan tool recover build)
 
 build=${FUZZ_BUILD:-build/fuzz}
 work=${FUZZ_WORK:-build/fuzz-work}

@@ -44,6 +44,10 @@ def seeds_of(name, made, swapped, aligned):
     for choice in (0, form):
         for path in (b"\x0a*/*[2]/cpu", b"\x02**", b"\x09/system/*"):
             yield "c", bytes((choice,)) + path + made
+    for more in (3, 4, 5):
+        for shown in (made, made[:len(made) * 2 // 3], made + bytes(24)):
+            yield "append", bytes((flags, more)) + shown
+            yield "append", bytes((flags | 8, more)) + shown
     yield "path", bytes((flags & 1,)) + b"//host[cpu/cpuOnline > 4]/*[last()]/.. | /system/*[2]"
     for asked in range(4):
         yield "table", bytes((flags | 8 * (asked & 1), asked)) + made
