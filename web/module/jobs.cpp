@@ -1,9 +1,11 @@
 // Work that goes through a whole file: it hands out what it finds as it goes. To stop it, the page ends the worker.
 #include <algorithm>
 #include <cctype>
+#include <optional>
 #include <string>
 
 #include "web/module/host.h"
+#include "web/module/pageFile.h"
 #include "web/module/session.h"
 
 using namespace tav;
@@ -18,35 +20,6 @@ namespace
 {
 
 constexpr uint64_t kMostSearched = uint64_t{1} << 20U; ///< bytes of a value that texts are looked for in
-
-/// A file in the worker's memory, which keeps it for the page under its name.
-class PageFile final : public inspect::Scratch
-{
-public:
-  explicit PageFile(const std::string& name)
-  {
-    KORFileOpenParam param;
-    param.pPath = name.c_str();
-    param.options = KOR_FILE_UPDATE | KOR_FILE_CREATE;
-    const uint32_t code = file_.open(&param);
-    if (code != TAV_RC_OK)
-    {
-      inspect::failAt(name, code);
-    }
-  }
-
-  KORHFile& file() override { return file_; }
-
-private:
-  KORHFile file_{};
-};
-
-inspect::ScratchMaker scratchMaker()
-{
-  return []() {
-    return std::make_unique<PageFile>("");
-  };
-}
 
 /// Progress is told every so many nodes.
 class Pace
@@ -157,6 +130,78 @@ void emitDifference(const inspect::Difference& difference)
   emit(json);
 }
 
+struct StreamStart
+{
+  uint64_t offset;
+  Form form;
+};
+
+/// Checks a file stream by stream, each in its own form.
+class CheckOfStreams
+{
+public:
+  CheckOfStreams(inspect::ByteSource& source, bool notes, uint64_t most)
+      : source_(source), notes_(notes), most_(most)
+  {
+  }
+
+  /// Checks from a place on, and returns where a stream in another form begins.
+  std::optional<StreamStart> run(const StreamStart& start)
+  {
+    other_.reset();
+    inspect::Checker checker(
+        source_, start.form, [this](inspect::RuleId rule) { return notes_ || !ruleOf(rule).note; },
+        [&](const inspect::Finding& finding) { take(start, finding); }, inspect::PathStyle::brief,
+        Walker(source_, start.form, {.offset = start.offset, .wide = start.form.root64}).state(), false);
+    while (!other_ && checker.step())
+    {
+      pace_.at(checker.position());
+    }
+    nodes_ += checker.nodes();
+    ends_ += checker.endElements();
+    return other_;
+  }
+
+  void put(Json& out) const
+  {
+    out.field("nodes", nodes_).field("ends", ends_).field("findings", findings_).field("listed", listed_);
+  }
+
+private:
+  void take(const StreamStart& start, const inspect::Finding& finding)
+  {
+    const std::optional<Form> form =
+        finding.otherStream && finding.offset > start.offset ? streamFormAt(source_, start.form, finding.offset)
+                                                             : std::nullopt;
+    if (form)
+    {
+      other_ = StreamStart{finding.offset, *form};
+      return;
+    }
+    ++findings_;
+    if (listed_ == most_)
+    {
+      return;
+    }
+    ++listed_;
+    const inspect::Rule& rule = ruleOf(finding.rule);
+    Json json;
+    json.begin('{').field("rule", rule.id).flag("note", rule.note).field("offset", finding.offset);
+    json.field("length", finding.length).field("path", finding.path).field("sentence", finding.sentence);
+    emit(json.field("why", rule.why).end('}'));
+  }
+
+  inspect::ByteSource& source_;
+  bool notes_;
+  uint64_t most_;
+  Pace pace_{};
+  std::optional<StreamStart> other_{};
+  uint64_t nodes_ = 0;
+  uint64_t ends_ = 0;
+  uint64_t findings_ = 0;
+  uint64_t listed_ = 0;
+};
+
 /// "name=path" in lines.
 std::vector<inspect::TableColumn> columnsOf(std::string_view text)
 {
@@ -207,13 +252,13 @@ void tavFindPath(uint32_t most)
   answer([&](Session& session, Json& out) {
     const inspect::Path path = inspect::pathOf(session.texts[0], session.dictionary);
     inspect::PathMatcher matcher(path);
-    Walker walker(session.bytes(), session.form());
+    inspect::StreamWalk walk(session.bytes(), session.form());
     Event event;
     Pace pace;
     uint64_t found = 0;
-    while (found < most && goToMatch(walker, matcher, event, [&](const Event& seen) { pace.at(seen.offset); }))
+    while (found < most && goToMatch(walk, matcher, event, [&](const Event& seen) { pace.at(seen.offset); }))
     {
-      emitNode(walker, event);
+      emitNode(walk.walker(), event);
       ++found;
     }
     out.field("found", found).flag("more", found == most);
@@ -226,12 +271,12 @@ void tavFindText(uint32_t most)
 {
   answer([&](Session& session, Json& out) {
     inspect::ByteSource& source = session.bytes();
-    Walker walker(source, session.form());
+    inspect::StreamWalk walk(source, session.form());
     Event event;
     Pace pace;
     uint64_t found = 0;
     std::string text;
-    while (found < most && walker.next(event))
+    while (found < most && walk.next(event))
     {
       pace.at(event.offset);
       if (event.what != What::nodeBegin || isEndPiece(event))
@@ -243,11 +288,11 @@ void tavFindText(uint32_t most)
       text += '\n';
       if (!event.node.isGroup())
       {
-        static_cast<void>(appendPlainText(text, source, walker.form(), event.node, kMostSearched));
+        static_cast<void>(appendPlainText(text, source, walk.form(), event.node, kMostSearched));
       }
       if (contains(text, session.texts[0]))
       {
-        emitNode(walker, event);
+        emitNode(walk.walker(), event);
         ++found;
       }
     }
@@ -272,35 +317,18 @@ void tavFindBytes(uint32_t most)
   });
 }
 
-/// Emits what is wrong, up to a number of findings; `notes`: what is remarkable but no defect, too.
+/// Emits what is wrong, up to a number of findings; `notes`: what is remarkable but no defect, too. Each stream is
+/// checked in its own form.
 TAV_WEB_EXPORT(tavCheck)
 void tavCheck(uint32_t notes, uint32_t most)
 {
   answer([&](Session& session, Json& out) {
-    uint64_t emitted = 0;
-    const auto found = [&](const inspect::Finding& finding) {
-      if (emitted == most)
-      {
-        return;
-      }
-      ++emitted;
-      const inspect::Rule& rule = ruleOf(finding.rule);
-      Json json;
-      json.begin('{').field("rule", rule.id).flag("note", rule.note).field("offset", finding.offset);
-      json.field("length", finding.length).field("path", finding.path).field("sentence", finding.sentence);
-      emit(json.field("why", rule.why).end('}'));
-    };
-    const auto wanted = [&](inspect::RuleId rule) {
-      return notes != 0 || !ruleOf(rule).note;
-    };
-    inspect::Checker checker(session.bytes(), session.form(), wanted, found, inspect::PathStyle::brief);
-    Pace pace;
-    while (checker.step())
+    CheckOfStreams check(session.bytes(), notes != 0, most);
+    for (std::optional<StreamStart> next = StreamStart{0, session.form()}; next;)
     {
-      pace.at(checker.position());
+      next = check.run(*next);
     }
-    out.field("nodes", checker.nodes()).field("ends", checker.endElements());
-    out.field("findings", checker.findings()).field("listed", emitted);
+    check.put(out);
   });
 }
 
@@ -312,7 +340,6 @@ void tavRecover()
     PageFile file(session.texts[0]);
     inspect::PatchFile patches(file.file());
     inspect::RecoverBestOptions options;
-    options.makeFile = scratchMaker();
     options.progress = tellProgress;
     const inspect::Outcome outcome = recoverBest(session.bytes(), session.recognition, patches, options);
     patches.flush();
@@ -340,7 +367,6 @@ void tavDiff(uint32_t most)
       throw inspect::Error(inspect::Problem{.file = session.texts[0], .sentence = "this is no stream"});
     }
     inspect::DiffOptions options;
-    options.makeFile = scratchMaker();
     options.mostValue = 1024;
     Pace pace;
     options.seen = [&](inspect::ByteSource&, const Walker&, const Event& event) {

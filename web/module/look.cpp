@@ -50,16 +50,16 @@ public:
 };
 
 /// The JSON form of a node, and of all below it.
-std::string jsonOf(inspect::ByteSource& source, Walker& walker, Event event)
+std::string jsonOf(inspect::ByteSource& source, inspect::StreamWalk& walk, Event event)
 {
   Text out;
-  inspect::JsonWriter writer(source, walker.form(), out, inspect::JsonStyle::lines, false);
+  inspect::JsonWriter writer(source, walk.form(), out, inspect::JsonStyle::lines, false);
   writer.begin();
   const uint64_t offset = event.node.offset();
-  writer.add(walker, event);
-  while (walker.next(event) && out.text.size() < kMostValue)
+  writer.add(walk.walker(), event);
+  while (walk.next(event) && out.text.size() < kMostValue)
   {
-    writer.add(walker, event);
+    writer.add(walk.walker(), event);
     if (event.what == What::nodeEnd && event.node.offset() == offset)
     {
       break;
@@ -138,8 +138,8 @@ void tavRows(uint32_t number, uint64_t from, uint32_t most)
   answer([&](Session& session, Json& out) {
     Level& level = session.level(number);
     out.key("rows").begin('[');
-    level.read(from, most, [&](const Walker& walker, const Event& event, const Form&) {
-      putRow(out, walker, event);
+    level.read(from, most, [&](const inspect::StreamWalk& walk, const Event& event) {
+      putRow(out, walk.walker(), event);
     });
     out.end(']');
   });
@@ -179,7 +179,7 @@ void tavReveal(uint64_t offset)
       }
       out.number(*row);
       bool into = false;
-      level->read(*row, 1, [&](const Walker&, const Event& event, const Form&) {
+      level->read(*row, 1, [&](const inspect::StreamWalk&, const Event& event) {
         into = event.what == What::nodeBegin && event.node.isGroup() &&
                offset >= event.offset + event.length && offset < event.node.limit;
       });
@@ -196,7 +196,9 @@ TAV_WEB_EXPORT(tavNode)
 void tavNode(uint32_t number, uint64_t row)
 {
   answer([&](Session& session, Json& out) {
-    session.level(number).read(row, 1, [&](const Walker& walker, const Event& event, const Form& form) {
+    session.level(number).read(row, 1, [&](const inspect::StreamWalk& walk, const Event& event) {
+      const Walker& walker = walk.walker();
+      const Form& form = walk.form();
       out.key("row");
       putRow(out, walker, event);
       if (event.what != What::nodeBegin)
@@ -221,10 +223,10 @@ TAV_WEB_EXPORT(tavJson)
 void tavJson(uint32_t number, uint64_t row)
 {
   answer([&](Session& session, Json& out) {
-    session.level(number).read(row, 1, [&](Walker& walker, const Event& event, const Form&) {
+    session.level(number).read(row, 1, [&](inspect::StreamWalk& walk, const Event& event) {
       if (event.what == What::nodeBegin)
       {
-        out.field("json", jsonOf(session.bytes(), walker, event));
+        out.field("json", jsonOf(session.bytes(), walk, event));
       }
     });
   });

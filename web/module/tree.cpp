@@ -11,19 +11,6 @@ using inspect::Form;
 using inspect::Walker;
 using inspect::What;
 
-namespace
-{
-
-/// The form of a stream of which byte order and root are known: its own bytes tell about the padding.
-Form ownForm(inspect::ByteSource& source, const Form& seen, uint64_t offset)
-{
-  const auto behind = source.window(offset, uint64_t{1} << 20U);
-  const inspect::Recognition found = recognise(*behind, {.swapped = seen.swapped, .root64 = seen.root64});
-  return found.isStream && !found.damagedStart && !found.ambiguous() ? found.form : seen;
-}
-
-} // namespace
-
 Level::Level(inspect::ByteSource& source, const Form& form)
     : source_(source)
 {
@@ -40,8 +27,7 @@ Level::Level(const Walker& walker, const Event& group)
 }
 
 Level::Cursor::Cursor(Level& level, const Mark& mark)
-    : level_(level), walker_(std::make_unique<Walker>(Walker::from(level.source_, mark.form, mark.state, kBudget))),
-      streamOffset_(mark.streamOffset)
+    : level_(level), walk_(level.source_, mark.form, {}, mark.state, mark.streamOffset, level.depth_ == 0, kBudget)
 {
 }
 
@@ -55,23 +41,6 @@ bool Level::Cursor::isRow(const Event& event) const
          event.what == What::unread;
 }
 
-bool Level::Cursor::goOnInOtherForm(const Event& event)
-{
-  if (level_.depth_ != 0 || event.what != What::damaged || event.offset <= streamOffset_)
-  {
-    return false;
-  }
-  const auto other = otherStreamAt(level_.source_, walker_->form(), event.offset);
-  if (other)
-  {
-    const Form form = ownForm(level_.source_, *other, event.offset);
-    walker_ = std::make_unique<Walker>(
-        level_.source_, form, inspect::WalkStart{.offset = event.offset, .wide = form.root64, .budget = kBudget});
-    streamOffset_ = event.offset;
-  }
-  return other.has_value();
-}
-
 /// Goes past what is below the row's node.
 bool Level::Cursor::finishRow()
 {
@@ -81,10 +50,10 @@ bool Level::Cursor::finishRow()
   }
   if (last_.node.isGroup())
   {
-    walker_->skip();
+    walk_.skip();
   }
   const uint64_t offset = last_.node.offset();
-  while (walker_->next(last_))
+  while (walk_.next(last_))
   {
     if (last_.what == What::nodeEnd && last_.node.offset() == offset)
     {
@@ -99,12 +68,12 @@ bool Level::Cursor::next(Event& event)
   done_ = done_ || !finishRow();
   while (!done_)
   {
-    if (!walker_->next(last_) ||
+    if (!walk_.next(last_) ||
         (last_.what == What::nodeEnd && level_.depth_ > 0 && last_.depth + 1 == level_.depth_))
     {
       done_ = true;
     }
-    else if (!goOnInOtherForm(last_) && isRow(last_))
+    else if (isRow(last_))
     {
       inRow_ = true;
       event = last_;
@@ -117,11 +86,12 @@ bool Level::Cursor::next(Event& event)
 std::optional<Level::Mark> Level::Cursor::mark()
 {
   done_ = done_ || !finishRow();
-  if (done_ || !walker_->isBetween() || walker_->depth() != level_.depth_)
+  const Walker& walker = walk_.walker();
+  if (done_ || !walker.isBetween() || walker.depth() != level_.depth_)
   {
     return std::nullopt;
   }
-  return Mark{0, walker_->place(), streamOffset_, walker_->form(), walker_->state()};
+  return Mark{0, walker.place(), walk_.streamOffset(), walk_.form(), walker.state()};
 }
 
 bool Level::count(uint64_t most)
@@ -185,10 +155,10 @@ std::optional<uint64_t> Level::rowOf(uint64_t offset)
 std::unique_ptr<Level> Level::below(uint64_t row)
 {
   std::unique_ptr<Level> made;
-  read(row, 1, [&](const Walker& walker, const Event& event, const Form&) {
+  read(row, 1, [&](const inspect::StreamWalk& walk, const Event& event) {
     if (event.what == What::nodeBegin && event.node.isGroup())
     {
-      made = std::make_unique<Level>(walker, event);
+      made = std::make_unique<Level>(walk.walker(), event);
     }
   });
   return made;

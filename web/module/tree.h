@@ -30,7 +30,7 @@ public:
   /// How far counting has come in the file.
   uint64_t place() const { return place_; }
 
-  /// Calls `take(walker, event, form)` for `most` rows from one on, as far as they are counted.
+  /// Calls `take(walk, event)` for `most` rows from one on, as far as they are counted.
   template<class Take>
   void read(uint64_t from, uint64_t most, const Take& take);
 
@@ -61,17 +61,14 @@ private:
     bool next(inspect::Event& event);
     /// Whether what follows is a place to go on from.
     std::optional<Mark> mark();
-    inspect::Walker& walker() { return *walker_; }
-    const inspect::Form& form() const { return walker_->form(); }
+    inspect::StreamWalk& walk() { return walk_; }
 
   private:
     bool finishRow();
-    bool goOnInOtherForm(const inspect::Event& event);
     bool isRow(const inspect::Event& event) const;
 
     Level& level_;
-    std::unique_ptr<inspect::Walker> walker_;
-    uint64_t streamOffset_;
+    inspect::StreamWalk walk_;
     inspect::Event last_{};
     bool inRow_ = false;
     bool done_ = false;
@@ -109,7 +106,7 @@ void Level::read(uint64_t from, uint64_t most, const Take& take)
   {
     if (row >= from)
     {
-      take(cursor.walker(), event, cursor.form());
+      take(cursor.walk(), event);
     }
   }
 }

@@ -22,6 +22,11 @@ async function recover(page) {
     Object.fromEntries(names.map((name) => [name.textContent, name.nextElementSibling.textContent])));
 }
 
+async function rootForm(page, offset) {
+  await find(page, "offset", String(offset));
+  return node(page);
+}
+
 /** The second of two hosts' names claims more than there is. */
 function damaged() {
   const bytes = hosts("ada", "grace", "hedy");
@@ -35,6 +40,23 @@ test("checking a sound file finds nothing", async () => {
   await open(page, made("sound.tav", hosts("ada")));
   assert.deepEqual(await check(page), []);
   assert.match(await textOf(page, "#status"), /^4 nodes, 0 findings/);
+  await page.close();
+});
+
+test("streams in several forms are searched and checked each in its own", async () => {
+  const page = await visit();
+  const first = golden("nested32");
+  const { bytes, at } = damaged();
+  await open(page, made("forms.tav", Buffer.concat([first, golden("nested64Big"), bytes])));
+  const behind = first.length + golden("nested64Big").length;
+  const found = await check(page);
+  assert.equal(found.length, 1, found.join("\n"));
+  assert.match(found[0], new RegExp(`0x${(behind + at).toString(16)}`));
+  await find(page, "path", "//hostName[. = 'hedy']");
+  assert.equal((await node(page)).value, "hedy");
+  assert.equal((await node(page)).form, (await rootForm(page, behind)).form);
+  await find(page, "text", "hedy");
+  assert.equal((await node(page)).value, "hedy");
   await page.close();
 });
 
@@ -203,6 +225,27 @@ test("the page answers while a file is checked, says how far it is, and stops", 
   assert.equal(await textOf(page, "#status"), "stopped");
   await find(page, "offset", "16");
   assert.equal((await node(page)).value, "0");
+  await page.close();
+});
+
+test("the page answers while a damaged file is recovered and compared", onlyInChromium, async () => {
+  const page = await visit();
+  const bytes = many(1_000_000);
+  for (let at = 5000; at < bytes.length; at += 500_000) {
+    bytes.fill(0xff, at, at + 100);
+  }
+  await open(page, made("torn.tav", bytes));
+  let account = {};
+  const recovering = await longestTask(page, async () => { account = await recover(page); });
+  const [, all, kept, lost] = /^(\d+) = (\d+) kept \+ (\d+) lost/.exec(account.bytes).map(Number);
+  assert.equal(all, bytes.length);
+  assert.ok(kept > 0 && lost > 0, account.bytes);
+  await tab(page, "Diff");
+  await (await page.$("#other")).uploadFile(made("whole.tav", many(1_000_000)));
+  const comparing = await longestTask(page, () => click(page, "#diffRun"));
+  assert.ok((await items(page, "differences")).length > 0);
+  console.log(`${account.bytes}; longest task: recovering ${recovering} ms, comparing ${comparing} ms`);
+  assert.ok(recovering < 50 && comparing < 50, `${recovering} ms, ${comparing} ms`);
   await page.close();
 });
 
