@@ -3,7 +3,7 @@
 #   ./test.sh          with g++, optimised
 #   TAV_STAGES=REGEX   only the stages whose titles match
 #   ./test.sh --full   what CI runs: the checks of the sources, both compilers, the sanitizers, fuzzing, packages,
-#                      most of s390x and Windows
+#                      most of s390x, Windows and WebAssembly
 #   ./test.sh --face NAME   one face: python (the package), sql (the extension for DuckDB), browser (the page, in Chromium),
 #                           firefox (the page, in Firefox)
 #   ./test.sh --platforms   all that is tested of libc++, s390x and aarch64 under qemu, Windows under wine,
@@ -265,6 +265,18 @@ check_static()
   run_tests static --tests-regex '^(install|examples)\.'
 }
 
+# The benchmarks, with warnings as errors, and the least of them once; the others run in the nightly run.
+check_benchmarks()
+{
+  cmake --preset bench >"$work/configure.log" || { cat "$work/configure.log"; return 1; }
+  cmake --build --preset bench --parallel "$(nproc)" >"$work/build.log" || { grep -v '^\[[0-9]*/' "$work/build.log"; return 1; }
+  build/bench/bench/tav_walk_memory >"$work/walks.log" || return 1
+  [[ $(wc -l <"$work/walks.log") == 4 ]] || return 1 # each way has seen every node
+  build/bench/bench/tav_parts 5 >"$work/parts.log" || return 1 # less is not cut into parts
+  grep -q '^W10/find_hosts: one thread' "$work/parts.log" || return 1
+  ! grep -E 'something else|are missing|other nodes' "$work/parts.log"
+}
+
 # What one compiler run cannot see: two types or functions of one name that differ between objects. At link time g++ 12
 # also sees overflows where there are none (its bug 105651), so the preset leaves that warning out; any other is an error.
 check_link_time()
@@ -372,11 +384,11 @@ check_windows()
   check_platform windows bin .exe "$PWD/cmake/run-windows.sh" "$@"
 }
 
-# WebAssembly, under node: what the list beside the program says.
+# WebAssembly, under node: what the list beside the program says; with --short without what takes long to be built.
 check_wasm()
 {
   local status=0 count
-  tests/system/platform/wasm.py --build >"$work/tests.log" 2>&1 || status=$?
+  tests/system/platform/wasm.py --build "$@" >"$work/tests.log" 2>&1 || status=$?
   count=$(sed -n 's/^\([0-9]*\) passed, [0-9]* faults$/\1/p' "$work/tests.log")
   passed=$((passed + ${count:-0}))
   tail -n 1 "$work/tests.log"
@@ -405,6 +417,7 @@ full()
   stage "documents" check_documents
   stage "Kaitai" check_kaitai
   stage "g++" build_and_test release
+  stage "benchmarks" check_benchmarks
   stage "demo" ./demo.sh
   stage "Python" check_python
   stage "SQL" check_sql
@@ -415,6 +428,7 @@ full()
   # What touches bytes, files or the system; CI has no time for more.
   stage "s390x, big-endian" check_s390x kor trace format storage core api golden host
   without_properties=1 stage "Windows" check_windows kor trace format storage core api golden host
+  stage "WebAssembly" check_wasm --short
   stage "address and undefined behaviour" check_sanitizers
   stage "fuzzing" fuzz/run.sh fixed
   stage "threads" check_thread
@@ -431,7 +445,7 @@ case ${1:-} in
     stage "g++" build_and_test release
     ;;
   --full)
-    stage "packages" cmake/install-packages.sh build test full platforms python sql browser site
+    stage "packages" cmake/install-packages.sh build test full bench platforms wasm python sql browser site
     # The same sources are compiled again and again, at every place where the project is checked out.
     export CMAKE_CXX_COMPILER_LAUNCHER=ccache CCACHE_BASEDIR=$PWD CCACHE_NOHASHDIR=1
     export CCACHE_SLOPPINESS=pch_defines,time_macros,include_file_mtime,include_file_ctime

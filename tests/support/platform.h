@@ -24,6 +24,9 @@ bool emptyStream(FILE* stream);
 int redirectOutput(FILE* stream);
 void restoreOutput(int before);
 
+/// Whether files are mapped.
+bool mapsFiles();
+
 /// The most memory that this process has had.
 uint64_t peakKibibytes();
 

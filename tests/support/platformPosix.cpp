@@ -6,6 +6,19 @@
 #include <sys/resource.h>
 #include <unistd.h>
 
+#if defined(__EMSCRIPTEN__)
+#include <emscripten.h>
+
+// There dup2 opens a file's path once more, and a temporary file has none any more.
+EM_JS(int, copyDescriptor, (int from), {
+  const to = FS.nextfd();
+  FS.streams[to] = FS.streams[from];
+  return to;
+})
+EM_JS(void, putDescriptor, (int from, int to), { FS.streams[to] = FS.streams[from]; })
+EM_JS(void, forgetDescriptor, (int which), { FS.streams[which] = null; })
+#endif
+
 namespace test
 {
 
@@ -35,6 +48,32 @@ bool emptyStream(FILE* /*stream*/)
   return false;
 }
 
+#if defined(__EMSCRIPTEN__)
+bool mapsFiles()
+{
+  return false;
+}
+
+int redirectOutput(FILE* stream)
+{
+  std::fflush(stdout);
+  const int before = copyDescriptor(fileno(stdout));
+  putDescriptor(fileno(stream), fileno(stdout));
+  return before;
+}
+
+void restoreOutput(int before)
+{
+  std::fflush(stdout);
+  putDescriptor(before, fileno(stdout));
+  forgetDescriptor(before);
+}
+#else
+bool mapsFiles()
+{
+  return true;
+}
+
 int redirectOutput(FILE* stream)
 {
   std::fflush(stdout);
@@ -49,6 +88,7 @@ void restoreOutput(int before)
   dup2(before, fileno(stdout));
   close(before);
 }
+#endif
 
 uint64_t peakKibibytes()
 {

@@ -67,6 +67,11 @@ void restoreOutput(int before)
   _close(before);
 }
 
+bool mapsFiles()
+{
+  return true;
+}
+
 uint64_t peakKibibytes()
 {
   PROCESS_MEMORY_COUNTERS counters{};

@@ -1,17 +1,21 @@
 #!/usr/bin/env python3
 """The library's tests and the corpora of the fuzzers in WebAssembly, under node.
 
-    wasm.py [--build] [ROOM|FUZZER...]    --build: makes the programs first, by the preset wasm-tests
+    wasm.py [--build] [--short] [ROOM|FUZZER...]    --build: makes the programs first, by the preset wasm-tests
+                                                    --short: without what the list calls long
 
-What runs, what does not and why is in wasm.list beside this. The last line counts all that ran. It fails where a test
-fails, where fewer pass than the list says, and where an excluded test is not there any more.
+What runs, what does not and why is in wasm.list beside this. As many programs run at a time as there are processors. The
+last line counts all that ran. It fails where a test fails, where fewer pass than the list says, and where an excluded
+test is not there any more.
 """
+import concurrent.futures
 import fnmatch
 import os
 import pathlib
 import re
 import subprocess
 import sys
+import tempfile
 
 HERE = pathlib.Path(__file__).resolve().parent
 ROOT = HERE.parents[2]
@@ -21,25 +25,33 @@ NODE = ["node", "--no-experimental-fetch"]
 PATIENCE = 1500  # ends what hangs
 
 
+def processors():
+    return len(os.sched_getaffinity(0))
+
+
 def read_list():
-    """Floors by (kind, name), and excluded tests by room."""
-    floors, excluded = {}, {}
+    """Floors by (kind, name), those of them that are long, and excluded tests by room."""
+    floors, long, excluded = {}, set(), {}
     for line in (HERE / "wasm.list").read_text().splitlines():
         words = line.split("#")[0].split()
         if not words:
             continue
-        if words[0] in ("room", "fuzz") and len(words) == 3:
+        if words[0] in ("room", "fuzz") and len(words) >= 3 and words[3:] in ([], ["long"]):
             floors[words[0], words[1]] = int(words[2])
+            if words[3:]:
+                long.add((words[0], words[1]))
         elif words[0] == "test" and len(words) == 3 and "#" in line:
             excluded.setdefault(words[1], []).append(words[2])
         elif not (words[0] == "file" and len(words) == 2 and "#" in line):
             raise SystemExit(f"wasm.list: {line!r} is no line of the list, or has no reason")
-    return floors, excluded
+    return floors, long, excluded
 
 
 def run(program, arguments, cwd):
-    done = subprocess.run([*NODE, str(program), *arguments], cwd=cwd, capture_output=True, text=True, errors="replace",
-                          timeout=PATIENCE)
+    """Status, output and errors of a program, whose temporary files are its own: all have the same process number."""
+    with tempfile.TemporaryDirectory(prefix="tav-wasm-") as folder:
+        done = subprocess.run([*NODE, str(program), *arguments], cwd=cwd, capture_output=True, text=True,
+                              errors="replace", timeout=PATIENCE, env={**os.environ, "TMPDIR": folder}, check=False)
     return done.returncode, done.stdout, done.stderr
 
 
@@ -79,8 +91,12 @@ def run_fuzzer(name):
     return int(count[1]) if count else 0, wrong
 
 
+def run_chosen(kind, name, excluded):
+    return run_room(name, excluded.get(name, [])) if kind == "room" else run_fuzzer(name)
+
+
 def build(chosen):
-    jobs = str(len(os.sched_getaffinity(0)))
+    jobs = str(processors())
     targets = [f"{name}_tests" if kind == "room" else f"fuzz_{name}" for kind, name in chosen]
     for command in (["cmake", "--preset", "wasm-tests"],
                     ["cmake", "--build", "--preset", "wasm-tests", "--parallel", jobs, "--target", *targets]):
@@ -90,17 +106,19 @@ def build(chosen):
 
 
 def main(arguments):
-    floors, excluded = read_list()
-    wanted = [word for word in arguments if word != "--build"]
-    chosen = [key for key in floors if not wanted or key[1] in wanted]
-    unknown = set(wanted) - {name for _, name in chosen}
+    floors, long, excluded = read_list()
+    wanted = [word for word in arguments if not word.startswith("--")]
+    left_out = long if "--short" in arguments else set()
+    chosen = [key for key in floors if (key[1] in wanted or not wanted) and key not in left_out]
+    unknown = set(wanted) - {name for _, name in floors}
     if unknown:
         raise SystemExit(f"wasm.list knows nothing of {', '.join(sorted(unknown))}")
     if "--build" in arguments:
         build(chosen)
     total, wrong = 0, []
-    for kind, name in chosen:
-        count, faults = run_room(name, excluded.get(name, [])) if kind == "room" else run_fuzzer(name)
+    with concurrent.futures.ThreadPoolExecutor(processors()) as pool:
+        results = list(pool.map(lambda key: run_chosen(*key, excluded), chosen))
+    for (kind, name), (count, faults) in zip(chosen, results):
         print(f"{kind} {name}: {count} {'tests' if kind == 'room' else 'inputs'}, at least {floors[kind, name]}", flush=True)
         total += count
         wrong += faults
