@@ -114,7 +114,7 @@ inline uint64_t sumPayload(uint16_t type, uint64_t size, const char* p)
     return v;
   }
   case kTimestamp: return snapshot::sumTimestamp(p);
-  default: return snapshot::sumString(p, size);
+  default: return snapshot::sumString(p, static_cast<size_t>(size));
   }
 }
 inline uint64_t sumPayload(const Header& h, const char* p)

@@ -8,6 +8,7 @@
 #include <cstdlib>
 #include <ctime>
 #include <functional>
+#include <optional>
 #include <span>
 #include <string>
 #include <vector>
@@ -80,7 +81,9 @@ constexpr Cost kNone{1e9, 1e9, 0};
 
 /// One thread and two take turns, so that what disturbs the machine disturbs both; each is told by its best run. Where
 /// no two processors are free, two threads cannot be faster: the work in all shows what splitting costs.
-void compare(const std::string& what, const std::function<void(unsigned)>& work)
+void compare(
+    const std::string& what, const std::function<void(unsigned)>& work,
+    const std::function<void()>& cleanUp = {})
 {
   constexpr int rounds = 9;
   Cost one = kNone;
@@ -88,7 +91,15 @@ void compare(const std::string& what, const std::function<void(unsigned)>& work)
   for (int i = 0; i < rounds; ++i)
   {
     takeRound(one, costOf([&] { work(1); }), rounds);
+    if (cleanUp)
+    {
+      cleanUp();
+    }
     takeRound(two, costOf([&] { work(2); }), rounds);
+    if (cleanUp)
+    {
+      cleanUp();
+    }
   }
   std::printf("W10/%s: one thread %.1f ms, two %.1f ms: %.2f times as fast; work in all %.3f times as much, the "
               "caller's thread did %.2f of what one does\n",
@@ -124,6 +135,26 @@ void measure(uint64_t mebibytes, bool flat)
     Schema schema;
     schema.add(source, {}, {.threads = threads});
   });
+  const std::vector<tav::Path> paths{pathOf("//memTotal"), pathOf(flat ? "/system/hostName" : "//hostName")};
+  const std::vector<uint64_t> counts = findPaths(source, {}, paths, {});
+  compare("find_" + name, [&](unsigned threads) {
+    if (findPaths(source, {}, paths, {.threads = threads}) != counts)
+    {
+      std::printf("W10/find_%s: threads find something else\n", name.c_str());
+    }
+  });
+  const tav::Reader reader(bytes);
+  const tav::Node root = reader.root();
+  const size_t nodes = tav::Index(root).size();
+  std::optional<tav::Index> index;
+  const auto makeIndex = [&](unsigned threads) {
+    index.emplace(indexOf(root, {.threads = threads}));
+    if (index->size() != nodes)
+    {
+      std::printf("W10/index_%s: threads see other nodes\n", name.c_str());
+    }
+  };
+  compare("index_" + name, makeIndex, [&] { index.reset(); }); // making it is what threads share
 }
 
 } // namespace
