@@ -6,6 +6,7 @@ set -euo pipefail
 here=$(cd "$(dirname "${BASH_SOURCE[0]}")" && pwd)
 build=$(cd "$1" && pwd)
 compiler=${2:-c++}
+export CMAKE_GENERATOR=Ninja # as all else here is built: make need not be there
 
 work=$(mktemp -d)
 trap 'rm -rf "$work"' EXIT
