@@ -23,11 +23,17 @@ EACH = "/system/host"
 PATIENCE = 600  # ends what hangs
 
 
+# A worker asks the address of one that was killed until its own time for that is over, and does nothing with what it
+# waits for meanwhile.
+WORKERS = {"distributed.comm.timeouts.connect": "5s"}
+
+
 @pytest.fixture(scope="module")
 def cluster():
-    patient = dask.config.set({"distributed.comm.timeouts.connect": PATIENCE})  # a busy machine starts processes slowly
+    patient = dask.config.set({"distributed.comm.timeouts.connect": PATIENCE,  # a busy machine starts processes slowly
+                               "distributed.deploy.lost-worker-timeout": PATIENCE})
     with patient, distributed.LocalCluster(n_workers=2, threads_per_worker=1, processes=True, host="127.0.0.1",
-                                           dashboard_address=None) as made:
+                                           dashboard_address=None, config=WORKERS) as made:
         with distributed.Client(made, timeout=PATIENCE) as client:
             yield client
 
