@@ -144,7 +144,7 @@ async function find() {
   let first = true;
   const { answer, engine } = await work(finds[how], {
     texts: [what], numbers: [MOST], onPiece: (row) => {
-      places.add(row.offset, row.path ?? hex(row.offset), row.value ?? counted(row.length ?? 0, "byte"));
+      places.add(row.offset, row.path ?? hex(row.offset), row.value ?? row.type ?? counted(row.length, "byte"));
       if (first) {
         first = false;
         run(() => goTo(row.offset));

@@ -74,6 +74,11 @@ test("finding by text, by bytes and by offset leads to the place", async () => {
   assert.equal((await node(page)).value, "hedy");
   await find(page, "offset", "0x10");
   assert.equal((await node(page)).path, "/system/host");
+  await find(page, "path", "/system/host");
+  const places = () => page.$$eval("#found .place", (all) => all.map((place) => [...place.children].map((part) => part.textContent)));
+  assert.deepEqual((await places())[0], ["/system/host", "group"]);
+  await find(page, "bytes", "68 65 64 79");
+  assert.equal((await places())[0][1], "4 bytes");
   await find(page, "path", "//hostNam");
   assert.match(await textOf(page, "#status"), /hostName/, "the nearest name is told");
   await find(page, "offset", "99999");
