@@ -116,6 +116,21 @@ void DocumentState::learn(uint64_t offset, const Form& form)
   }
 }
 
+void DocumentState::learnEnd(const Node& group)
+{
+  const bool isCut = group.isGroup() && (group.has(kOverrun) || group.has(kOpen)) && group.limit < source->size();
+  if (isCut && ends.size() < kMostDamages)
+  {
+    ends.emplace(group.offset(), group.limit);
+  }
+}
+
+uint64_t DocumentState::endAt(uint64_t offset) const
+{
+  const auto known = ends.find(offset);
+  return known == ends.end() ? kNoOffset : known->second;
+}
+
 void DocumentState::add(const PassedOver& passed)
 {
   const Damage place{passed.offset, passed.length, passed.rule};
@@ -222,6 +237,11 @@ Form Document::formOf(const tav::Node& node) const noexcept
   Form form = state_->formAt(node.offset());
   form.root64 = node.width() == Width::bits64;
   return form;
+}
+
+uint64_t Document::boundOf(const tav::Node& group) const noexcept
+{
+  return std::min(state_->endAt(group.offset()), state_->source->size());
 }
 
 std::string Document::pathOf(const tav::Node& node, PathStyle style) const

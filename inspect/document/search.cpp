@@ -28,6 +28,20 @@ Form formOf(const SearchStart& start)
   return form;
 }
 
+/// A walk that begins at a node and ends where the group around it does at the latest, as far as that is known.
+StreamWalk walkFrom(DocumentState& state, const SearchStart& start, DamageWatch::Sink told)
+{
+  const WalkStart begin = startAt(state, start.node);
+  const uint64_t end = state.endAt(start.node.nodeOffset);
+  if (end == kNoOffset)
+  {
+    return {*state.source, formOf(start), std::move(told), begin};
+  }
+  Walker::State there = Walker(*state.source, formOf(start), begin).state();
+  there.frames.front().limit = end;
+  return {*state.source, formOf(start), std::move(told), there, begin.offset, false};
+}
+
 } // namespace
 
 Search::Search(DocumentState& state, std::string_view path, OnDamage onDamage)
@@ -51,9 +65,9 @@ Search::Search(DocumentState& state, const SearchStart& start, const Path& path,
 
 Search::Search(DocumentState& state, const SearchStart& start, bool isBelow, PathMatcher matcher, OnDamage onDamage)
     : state_(state), matcher_(std::move(matcher)), onDamage_(onDamage),
-      walk_(
-          *state.source, isBelow ? formOf(start) : state.recognition.form,
-          [this](const PassedOver& passed) { passOver(passed); }, isBelow ? startAt(state, start.node) : WalkStart{}),
+      walk_(isBelow ? walkFrom(state, start, [this](const PassedOver& passed) { passOver(passed); })
+                    : StreamWalk(*state.source, state.recognition.form,
+                                 [this](const PassedOver& passed) { passOver(passed); })),
       start_(start.node.nodeOffset), isBelow_(isBelow)
 {
 }
@@ -101,6 +115,7 @@ bool Search::next()
     {
       state_.learn(event_.offset, form());
     }
+    state_.learnEnd(event_.node);
     const auto depth = static_cast<size_t>(event_.depth);
     around_.resize(depth);
     around_.push_back(event_.node.header);

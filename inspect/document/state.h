@@ -53,6 +53,12 @@ struct DocumentState
   /// Who asks of one group after another in their order goes through the file once.
   bool isEmptyAt(uint64_t offset);
 
+  /// Remembers where a group ends that ends past the one around it or was never closed, which it does not tell itself.
+  void learnEnd(const Node& group);
+
+  /// Where such a group ends; kNoOffset for any other.
+  uint64_t endAt(uint64_t offset) const;
+
   /// The path of the node at an offset: walks up to it. Empty where no node begins there.
   std::string pathAt(uint64_t offset, PathStyle style) const;
 
@@ -65,6 +71,7 @@ struct DocumentState
   std::string path{};               ///< of a file that was opened by it, from its first byte on
   std::vector<Damage> damage{};     ///< by offset, each place once
   std::map<uint64_t, Form> forms{}; ///< where streams begin that are in another form than the one before
+  std::map<uint64_t, uint64_t> ends{}; ///< of groups that end where the one around them does, by their offsets
   std::array<std::unique_ptr<tav::Reader>, 4> readers{};
   std::optional<PlaceWalk> places{};    ///< where isEmptyAt looked last
   std::function<void(uint64_t)> told{}; ///< is told how far a search is

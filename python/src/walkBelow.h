@@ -26,14 +26,28 @@ inline const uint8_t* payloadIn(std::span<const uint8_t> bytes, const TAVHeader&
   return from <= bytes.size() && size <= bytes.size() - from ? bytes.data() + from : nullptr;
 }
 
+/// A walk that begins at a node, and goes no further than the groups around it do.
+inline inspect::Walker walkerAt(const Opened& opened, inspect::ByteSource& source, const WalkRoot& root)
+{
+  const inspect::WalkStart start{.offset = root.node.offset(), .wide = root.node.width() == Width::bits64};
+  const uint64_t bound = opened.document.boundOf(root.node);
+  inspect::Walker walker(source, root.form, start);
+  if (bound >= source.size())
+  {
+    return walker;
+  }
+  inspect::Walker::State state = walker.state();
+  state.frames.front().limit = bound;
+  return inspect::Walker::from(source, root.form, state);
+}
+
 /// Through damage, with paths where they are asked for.
 template<class Visit>
 void walkCarefully(Opened& opened, inspect::ByteSource& source, const WalkRoot& root, bool withPaths, Visit&& visit)
 {
-  const inspect::WalkStart start{.offset = root.node.offset(), .wide = root.node.width() == Width::bits64};
   inspect::DamageWatch watch(source, root.form,
                              [&](const inspect::PassedOver& passed) { passOver(opened, root, passed); });
-  inspect::Walker walker(source, root.form, start);
+  inspect::Walker walker = walkerAt(opened, source, root);
   std::string path;
   inspect::Event event;
   while (walker.next(event) && !(event.what == inspect::What::nodeEnd && event.depth == 0))
@@ -97,7 +111,7 @@ void walkBelow(Opened& opened, inspect::ByteSource& source, const tav::Reader& r
     return;
   }
   if (withPaths || opened.onDamage == inspect::OnDamage::skip || root.node.isOpen() ||
-      root.node.size() == 0)
+      root.node.size() == 0 || opened.document.boundOf(root.node) < source.size())
   {
     walkCarefully(opened, source, root, withPaths, visit);
   }

@@ -1,4 +1,6 @@
 #include <algorithm>
+#include <cstddef>
+#include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <stdexcept>
@@ -326,6 +328,47 @@ TEST_P(TestDocument, FindsNothingBelowAnEmptyGroupAndWhatIsBelowOneThatWasNeverC
   for (const tav::Node& root : left.roots())
   {
     EXPECT_EQ(test::countOf(left.find(root, ".//*", OnDamage::skip)), 3U);
+  }
+}
+
+/// Where nodes begin, by asking each for what is in it.
+void offsetsBelow(const Document& document, const tav::Node& node, std::vector<uint64_t>& offsets)
+{
+  offsets.push_back(node.offset());
+  for (const tav::Node& child : document.find(node, "*", OnDamage::skip))
+  {
+    offsetsBelow(document, child, offsets);
+  }
+}
+
+TEST_P(TestDocument, FindsInAGroupThatSaysItEndsPastTheOneAroundItWhatAWalkFinds)
+{
+  const Bytes before = hosts({{"ada", 8}, {"grace", 4}});
+  const Bytes sound = before + hosts({{"hedy", 2}});
+  const Document whole = open(sound);
+  const auto last = static_cast<ptrdiff_t>((*whole.find("/system/host[2]").begin()).offset());
+  uint64_t size = 0;
+  std::memcpy(&size, sound.data() + last, sizeof size);
+  for (uint64_t more = 1; more < 120; ++more)
+  {
+    Bytes bytes = sound;
+    const uint64_t claimed = size + more;
+    std::memcpy(bytes.data() + last, &claimed, sizeof claimed);
+    const Document document = open(bytes);
+    std::vector<uint64_t> expected;
+    for (const tav::Node& node : document.find("//*", OnDamage::skip))
+    {
+      expected.push_back(node.offset());
+    }
+    std::vector<uint64_t> found;
+    for (const tav::Node& root : document.roots(OnDamage::skip))
+    {
+      offsetsBelow(document, root, found);
+    }
+    ASSERT_EQ(found, expected) << more << " bytes more";
+    ASSERT_EQ(found.size(), 11U) << more << " bytes more";
+    const tav::Node host = *document.find("/system/host[2]", OnDamage::skip).begin();
+    EXPECT_EQ(document.boundOf(host), before.size());
   }
 }
 
