@@ -68,9 +68,9 @@ struct DocumentState
   std::unique_ptr<ByteSource> source{};
   Recognition recognition{};
   DocumentOptions options{};
-  std::string path{};               ///< of a file that was opened by it, from its first byte on
-  std::vector<Damage> damage{};     ///< by offset, each place once
-  std::map<uint64_t, Form> forms{}; ///< where streams begin that are in another form than the one before
+  std::string path{};                  ///< of a file that was opened by it, from its first byte on
+  std::vector<Damage> damage{};        ///< by offset, each place once
+  std::map<uint64_t, Form> forms{};    ///< where streams begin that are in another form than the one before
   std::map<uint64_t, uint64_t> ends{}; ///< of groups that end where the one around them does, by their offsets
   std::array<std::unique_ptr<tav::Reader>, 4> readers{};
   std::optional<PlaceWalk> places{};    ///< where isEmptyAt looked last
