@@ -132,8 +132,8 @@ public:
 
   /// The form of the stream that a node of this document is in.
   TAV_INSPECT_API Form formOf(const tav::Node& node) const noexcept;
-  /// What nothing in a group goes past: where the group around it ends, of one that says it ends behind that or that was
-  /// never closed, and was handed out by a range of this document; else the end of the bytes.
+  /// What nothing in a group goes past: of one that says it ends behind the group around it or that was never closed,
+  /// and that a range of this document handed out, the end of that group; else the end of the bytes.
   TAV_INSPECT_API uint64_t boundOf(const tav::Node& group) const noexcept;
   /// A path that leads back to a node of this document: a walk from the first byte on that steps over the groups beside
   /// the way. Empty where no node begins there.
