@@ -4,8 +4,6 @@
 /// made. Where a change means to recover differently, TAV_WRITE_ACCOUNTS=golden/recovery.txt writes them anew, and the
 /// difference is to be read.
 #include <algorithm>
-#include <cstdlib>
-#include <fstream>
 #include <sstream>
 #include <string>
 #include <vector>
@@ -13,6 +11,7 @@
 #include <gtest/gtest.h>
 
 #include "inspect/recoverySamples.h"
+#include "inspect/writtenAccounts.h"
 
 using namespace tav::inspect;
 using test::Bytes;
@@ -179,22 +178,5 @@ TEST(RecoveryAccounts, AreAsWrittenDownForDamageAnywhere)
       tell(found, sample, damage);
     }
   }
-  if (const char* const path = std::getenv("TAV_WRITE_ACCOUNTS"))
-  {
-    std::ofstream(path, std::ios::binary) << found.str();
-  }
-  std::ifstream file("golden/recovery.txt", std::ios::binary);
-  ASSERT_TRUE(file) << "run in the tests folder";
-  std::istringstream now(found.str());
-  std::string part;
-  std::string before;
-  std::string written;
-  for (std::string line; std::getline(now, line); before = line)
-  {
-    part = before.empty() ? line : part;
-    ASSERT_TRUE(std::getline(file, written)) << part << "\n"
-                                             << line;
-    ASSERT_EQ(line, written) << part;
-  }
-  EXPECT_FALSE(std::getline(file, written)) << written;
+  test::expectWritten(found.str(), "golden/recovery.txt", "TAV_WRITE_ACCOUNTS");
 }
