@@ -25,7 +25,7 @@ bool readHeader(ByteSource& source, const Form& form, uint64_t offset, bool wide
 {
   std::array<uint8_t, kHeaderSize64> bytes{};
   const size_t length = wide ? kHeaderSize64 : kHeaderSize32;
-  if (offset > source.size() || source.read(offset, std::span(bytes).first(length)) != length)
+  if (source.read(offset, std::span(bytes).first(length)) != length)
   {
     return false;
   }
@@ -119,9 +119,9 @@ bool readEnding(ByteSource& source, const Form& form, uint64_t offset, bool wide
   TAVHeader header{};
   EyeSizeBytes bytes{};
   const uint64_t eye = offset + (wide ? kHeaderSize64 : kHeaderSize32);
-  if (offset > limit || limit - offset < endElementLength(wide) || !readHeader(source, form, offset, wide, header) ||
-      elmOf(header) != TAV_ELM_CMN_END_HDR_EYE_SIZE || typeOf(header) != TAV_TYPE_BINARY ||
-      sizeOf(header) != kEyeSizeLength || source.read(eye, bytes) != bytes.size())
+  if (limit < endElementLength(wide) || offset > limit - endElementLength(wide) ||
+      !readHeader(source, form, offset, wide, header) || elmOf(header) != TAV_ELM_CMN_END_HDR_EYE_SIZE ||
+      typeOf(header) != TAV_TYPE_BINARY || sizeOf(header) != kEyeSizeLength || source.read(eye, bytes) != bytes.size())
   {
     return false;
   }

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <array>
+#include <optional>
 #include <span>
 
 #include "inspect/recover/endings.h"
@@ -184,16 +185,16 @@ bool Judge::lookForPair(Candidate& found, uint64_t base, uint64_t limit) const
   const bool utf8 = typeOf(found.header()) == TAV_TYPE_UTF8_STRING;
   for (uint64_t extra = 0; extra <= (utf8 ? 2U : 0U); extra += 2)
   {
-    uint64_t distance = 0;
     const uint64_t at = base + extra;
-    if (!prober_.pairAt(at, limit, distance))
+    const std::optional<uint64_t> distance = prober_.pairAt(at, limit);
+    if (!distance)
     {
       continue;
     }
     EyeSizeBytes bytes{};
     source_.read(at, bytes);
     const bool other = decodeEyeSize(bytes, form_.swapped).eye != TAV_EYE_CATCHER;
-    const bool right = distance == dataDistance(sizeOf(found.header()));
+    const bool right = *distance == dataDistance(sizeOf(found.header()));
     found.data.extra = extra != 0;
     found.data.otherOrder = other && (extra != 0 || typeOf(found.header()) == TAV_TYPE_ASCII_STRING);
     found.end = at + kEyeSizeLength;
@@ -273,7 +274,7 @@ void Judge::lookBehind(Candidate& found, uint64_t base, uint64_t limit) const
     {
       const uint64_t end = addSaturated(base, extra + with);
       const Belief belief = end > limit ? Belief::none : beliefBehind(end, wide, limit);
-      if (belief > best || (extra != 0 && found.pairBytes == with && belief == best && best != Belief::typed &&
+      if (belief > best || (extra != 0 && found.pairBytes == with && belief == best &&
                             isBetter(end, found.end, wide, limit)))
       {
         best = belief;
@@ -364,8 +365,7 @@ bool Judge::endOfStranger(const TAVHeader& header, uint64_t limit, uint64_t& end
     return false;
   }
   end = addSaturated(header.nodeOffset + headerLength(header.hdrType), prober_.paddedSize(header));
-  uint64_t distance = 0;
-  if (hasEyeSize(header) && (!prober_.pairAt(end, limit, distance) || distance != dataDistance(sizeOf(header))))
+  if (hasEyeSize(header) && prober_.pairAt(end, limit) != dataDistance(sizeOf(header)))
   {
     return false;
   }

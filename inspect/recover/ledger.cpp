@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cstring>
+#include <optional>
 #include <utility>
 #include <vector>
 
@@ -98,14 +99,14 @@ std::string reasonOfEnd(ByteSource& source, const Form& form, uint64_t offset, b
 {
   const Prober prober(source, form, kNoOffset);
   TAVHeader header{};
-  uint64_t distance = 0;
   const uint64_t eye = offset + (wide ? kHeaderSize64 : kHeaderSize32);
-  if (!prober.header(offset, wide, source.size(), header) || !isEndElement(elmOf(header)) ||
-      sizeOf(header) != kEyeSizeLength || !prober.pairAt(eye, source.size(), distance))
+  const std::optional<uint64_t> distance = prober.pairAt(eye, source.size());
+  if (!distance || !prober.header(offset, wide, source.size(), header) || !isEndElement(elmOf(header)) ||
+      sizeOf(header) != kEyeSizeLength)
   {
     return {};
   }
-  const uint64_t back = addSaturated(distance, wide ? 0 : 8); // that of a group of 32-bit children is 8 short
+  const uint64_t back = addSaturated(*distance, wide ? 0 : 8); // that of a group of 32-bit children is 8 short
   return back <= eye ? std::string()
                      : "an end element whose group began " + counted(back - eye, "byte") +
                            " before the file: what is left of the group has lost its header";

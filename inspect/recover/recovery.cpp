@@ -370,7 +370,7 @@ void Recovery::loseGap(uint64_t to)
   {
     to = std::max(from, prober_.zerosStart(from));
   }
-  ledger_.lose(std::max(to, from + (to == from ? 1 : 0)), reasonAt(source_, form_, from));
+  ledger_.lose(std::max(to, from + 1), reasonAt(source_, form_, from));
 }
 
 } // namespace tav::inspect

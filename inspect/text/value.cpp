@@ -267,12 +267,7 @@ std::string forTerminal(std::string_view text)
 
 std::optional<uint64_t> pairDistanceAt(ByteSource& source, const Form& form, uint64_t offset)
 {
-  uint64_t distance = 0;
-  if (!Prober(source, form, 0).pairAt(offset, source.size(), distance))
-  {
-    return std::nullopt;
-  }
-  return distance;
+  return Prober(source, form, 0).pairAt(offset, source.size());
 }
 
 std::string hexText(std::span<const uint8_t> bytes)

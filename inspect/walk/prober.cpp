@@ -170,7 +170,7 @@ bool Prober::isNamed(uint16_t elm)
 bool Prober::header(uint64_t offset, bool wide, uint64_t limit, TAVHeader& out) const
 {
   const uint64_t length = wide ? kHeaderSize64 : kHeaderSize32;
-  if (offset > limit || limit - offset < length)
+  if (limit < length || offset > limit - length)
   {
     return false;
   }
@@ -237,15 +237,14 @@ bool Prober::isFollowed(const TAVHeader& node, uint64_t limit) const
     const uint64_t end = isSizeUnknown(node) ? limit : start + sizeOf(node);
     return end == start ? isFollowedAt(start, wide, limit) : isFollowedAt(start, hasChildren64(node), end);
   }
-  uint64_t end = addSaturated(start, paddedSize(node));
-  uint64_t distance = 0;
+  const uint64_t end = addSaturated(start, paddedSize(node));
   if (hasEyeSize(node))
   {
-    return pairAt(end, limit, distance) || (typeOf(node) == TAV_TYPE_UTF8_STRING && pairAt(end + 2, limit, distance));
+    return pairAt(end, limit) || (typeOf(node) == TAV_TYPE_UTF8_STRING && pairAt(end + 2, limit));
   }
   if (elmOf(node) == TAV_ELM_CMN_END_HDR_EYE_SIZE)
   {
-    return pairAt(start, limit, distance);
+    return pairAt(start, limit).has_value();
   }
   if (end > limit)
   {
@@ -272,14 +271,13 @@ bool Prober::isChain(uint64_t offset, bool wide, uint64_t limit, bool toTheEnd) 
       return i > 2 || (!toTheEnd && judge(offset, wide, limit) == Belief::followed);
     }
     offset = start + (isGroup(node) ? sizeOf(node) : std::min(paddedSize(node), limit - start));
-    uint64_t distance = 0;
-    if (typeOf(node) == TAV_TYPE_UTF8_STRING && limit - offset >= 2 && !pairAt(offset, limit, distance) &&
-        (offset + 2 == limit || pairAt(offset + 2, limit, distance) ||
+    if (typeOf(node) == TAV_TYPE_UTF8_STRING && limit - offset >= 2 && !pairAt(offset, limit) &&
+        (offset + 2 == limit || pairAt(offset + 2, limit) ||
          judge(offset + 2, wide, limit) > judge(offset, wide, limit)))
     {
       offset += 2;
     }
-    offset += !isGroup(node) && pairAt(offset, limit, distance) ? kEyeSizeLength : 0;
+    offset += !isGroup(node) && pairAt(offset, limit) ? kEyeSizeLength : 0;
   }
   return !toTheEnd || offset == limit;
 }
@@ -295,31 +293,30 @@ Belief Prober::judge(uint64_t offset, bool wide, uint64_t limit) const
   return belief == Belief::named && isFollowed(node, limit) ? Belief::followed : belief;
 }
 
-bool Prober::pairAt(uint64_t offset, uint64_t limit, uint64_t& distance) const
+std::optional<uint64_t> Prober::pairAt(uint64_t offset, uint64_t limit) const
 {
   EyeSizeBytes bytes{};
-  if (offset > limit || limit - offset < bytes.size() || source_.read(offset, bytes) != bytes.size())
+  if (limit < bytes.size() || offset > limit - bytes.size() || source_.read(offset, bytes) != bytes.size())
   {
-    return false;
+    return std::nullopt;
   }
   for (const bool swap : {form_.swapped, !form_.swapped})
   {
     const EyeSize pair = decodeEyeSize(bytes, swap);
     if (pair.eye == TAV_EYE_CATCHER)
     {
-      distance = pair.distance;
-      return true;
+      return pair.distance;
     }
   }
-  return false;
+  return std::nullopt;
 }
 
 bool Prober::pairEnds(uint64_t offset, uint64_t limit, const TAVHeader& group) const
 {
-  uint64_t distance = 0;
+  const std::optional<uint64_t> distance = pairAt(offset, limit);
   // The distance of a 64-bit group of type 1 is 8 short, as the writer makes it.
   const uint64_t missing = is64(group) && !hasChildren64(group) ? 8 : 0;
-  return pairAt(offset, limit, distance) && offset - group.nodeOffset == addSaturated(distance, missing);
+  return distance && offset - group.nodeOffset == addSaturated(*distance, missing);
 }
 
 bool Prober::isNamedHeader(const uint8_t* bytes, bool wide) const
@@ -340,12 +337,13 @@ bool Prober::restartAt(const uint8_t* bytes, uint64_t offset, bool wide, uint64_
          (belief == Belief::named && typeInfo(load16(bytes + (wide ? 12 : 4), form_.swapped)).valueSize != 0);
 }
 
-bool Prober::pairLeadsTo(uint64_t eye, uint64_t distance, uint64_t from, uint64_t limit, uint64_t& start)
+std::optional<uint64_t> Prober::nodeOfPair(uint64_t eye, uint64_t distance, uint64_t from, uint64_t limit) const
 {
   // What the distance leaves out: nothing, the 8 of a group of type 1, padding and the extra bytes of a string.
   for (uint64_t missing = 0; missing <= 9; ++missing)
   {
     TAVHeader node{};
+    uint64_t start{};
     if (!nodeBefore(eye, addSaturated(distance, missing), start) || start < from || !header(start, true, limit, node))
     {
       continue;
@@ -357,25 +355,28 @@ bool Prober::pairLeadsTo(uint64_t eye, uint64_t distance, uint64_t from, uint64_
                       (eye == behind + paddedSize(node) || eye == behind + paddedSize(node) + 2);
     if (group || data)
     {
-      return true;
+      return start;
     }
   }
-  return false;
+  return std::nullopt;
 }
 
 bool Prober::restartByPair(const uint8_t* bytes, uint64_t offset, uint64_t from, uint64_t limit, Restart& restart)
 {
   uint64_t word = 0;
   std::memcpy(&word, bytes, sizeof word);
-  uint64_t distance = 0;
-  if ((word != TAV_EYE_CATCHER && word != kor::byteswap64(TAV_EYE_CATCHER)) || !pairAt(offset, limit, distance))
+  if (word != TAV_EYE_CATCHER && word != kor::byteswap64(TAV_EYE_CATCHER))
   {
     return false;
   }
-  uint64_t start = 0;
-  if (pairLeadsTo(offset, distance, from, limit, start))
+  const std::optional<uint64_t> distance = pairAt(offset, limit);
+  if (!distance)
   {
-    restart = {start, true};
+    return false;
+  }
+  if (const std::optional<uint64_t> start = nodeOfPair(offset, *distance, from, limit))
+  {
+    restart = {*start, true};
     return true;
   }
   // The node that it ends began before the damage, or its header is damaged; the next node begins behind it.

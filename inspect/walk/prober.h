@@ -4,6 +4,7 @@
 #pragma once
 
 #include <cstdint>
+#include <optional>
 
 #include "tav/inspect/node.hpp"
 #include "tav/inspect/source.hpp"
@@ -47,8 +48,8 @@ public:
   /// Whether the bytes of a header have a known type and an element of the dictionary.
   bool isNamedHeader(const uint8_t* bytes, bool wide) const;
 
-  /// Whether an eye catcher of either byte order is at `offset`; then also its distance, in that order.
-  bool pairAt(uint64_t offset, uint64_t limit, uint64_t& distance) const;
+  /// The distance of the eye/size pair at `offset`, in the byte order of its eye catcher; nothing when there is none.
+  std::optional<uint64_t> pairAt(uint64_t offset, uint64_t limit) const;
 
   /// Whether the eye/size pair at `offset` ends the group at `group`.
   bool pairEnds(uint64_t offset, uint64_t limit, const TAVHeader& group) const;
@@ -88,7 +89,7 @@ private:
   bool isFollowedAt(uint64_t offset, bool wide, uint64_t limit) const;
   bool restartAt(const uint8_t* bytes, uint64_t offset, bool wide, uint64_t limit);
   bool restartByPair(const uint8_t* bytes, uint64_t offset, uint64_t from, uint64_t limit, Restart& restart);
-  bool pairLeadsTo(uint64_t eye, uint64_t distance, uint64_t from, uint64_t limit, uint64_t& start);
+  std::optional<uint64_t> nodeOfPair(uint64_t eye, uint64_t distance, uint64_t from, uint64_t limit) const;
 
   ByteSource& source_;
   Form form_;

@@ -335,13 +335,12 @@ void Walker::beginGroup(Node& node)
 bool Walker::extraBehind(const Node& node, uint64_t base, uint64_t limit)
 {
   const Frame& top = frames_.back();
-  uint64_t distance = 0;
   bool without = false;
   bool with = false;
   if (hasEyeSize(node.header))
   {
-    without = prober_->pairAt(base, limit, distance);
-    with = prober_->pairAt(base + 2, limit, distance);
+    without = prober_->pairAt(base, limit).has_value();
+    with = prober_->pairAt(base + 2, limit).has_value();
   }
   if (without == with)
   {
@@ -411,9 +410,8 @@ void Walker::takeData(Node& node)
 
 void Walker::takePair(Node& node, uint64_t limit)
 {
-  uint64_t distance = 0;
   const uint64_t behind = position_ + kEyeSizeLength;
-  if (prober_->pairAt(position_, limit, distance))
+  if (prober_->pairAt(position_, limit))
   {
     queue(What::pair, position_, kEyeSizeLength);
     position_ = behind;

@@ -280,6 +280,80 @@ TEST_P(Judging, OnlyBytesAndArraysMayHoldNodes)
   }
 }
 
+namespace
+{
+
+/// A text of a code page, and bytes behind it in which a node may begin at once or behind two bytes: the second one's
+/// type is the first one's element, its flags are the first one's type, and its element is in the first one's payload.
+/// Little-endian.
+class TextBeforeEither
+{
+public:
+  /// Of the node that begins at once.
+  TextBeforeEither(uint64_t size, uint16_t type, uint16_t otherType)
+  {
+    rows.h64(5, 0, TAV_TYPE_UTF8_STRING, TAV_ELM_CMN_HOST_NAME).fill(5, 'a');
+    rows.h64(size, 0, type, otherType).number(TAV_ELM_CMN_HOST_NAME, 2);
+  }
+
+  /// Whether the two bytes are taken for a part of the text, by who expects them or not.
+  bool isExtra(bool expected) const
+  {
+    const Judged it(rows.bytes, {.swapped = test::kBigEndianHost, .extra = expected});
+    const Candidate found = it.judge.look(0, true);
+    EXPECT_EQ(found.trust, Trust::followed);
+    EXPECT_EQ(found.end, found.data.extra ? 23U : 21U);
+    return found.data.extra;
+  }
+
+  void number() { rows.h64(4, 0, TAV_TYPE_UINT32, TAV_ELM_CMN_CPU_ONLINE).number(9, 4); }
+
+  ByteRows rows{test::kBigEndianHost};
+};
+
+} // namespace
+
+TEST(Judge, OfTwoPlacesBehindATextTakesTheOneThatOtherTextsSpeakFor)
+{
+  TextBeforeEither text(22, TAV_TYPE_ASCII_STRING, TAV_TYPE_ASCII_STRING);
+  text.number(); // to which both lead
+  EXPECT_TRUE(text.isExtra(true));
+  EXPECT_FALSE(text.isExtra(false));
+}
+
+TEST(Judge, OfTwoPlacesBehindATextTakesTheOneThatNodesFollowFromFartherOn)
+{
+  TextBeforeEither atOnce(52, TAV_TYPE_ASCII_STRING, TAV_TYPE_ASCII_STRING);
+  atOnce.number();
+  atOnce.rows.fill(30, 0x5A);
+  atOnce.number();
+  EXPECT_FALSE(atOnce.isExtra(true));
+  EXPECT_FALSE(atOnce.isExtra(false));
+  TextBeforeEither behind(22 + 16, TAV_TYPE_ASCII_STRING, TAV_TYPE_ASCII_STRING);
+  behind.number();
+  behind.rows.h64(50, 0, TAV_TYPE_BINARY, TAV_ELM_CMN_HOST_NAME); // at whose payload the first node ends
+  behind.number();
+  behind.rows.fill(30, 0x5A);
+  EXPECT_TRUE(behind.isExtra(true));
+  EXPECT_TRUE(behind.isExtra(false));
+}
+
+TEST(Judge, OfTwoPlacesBehindATextTakesTheOneWhereASizeCanBeNoOther)
+{
+  TextBeforeEither atOnce(16, TAV_TYPE_UTC_TIMESTAMP, TAV_TYPE_ASCII_STRING);
+  atOnce.rows.pair(0).bytes.resize(atOnce.rows.at() - 2); // the other one's, for so its flags are
+  atOnce.rows.h64(22, 0, TAV_TYPE_ASCII_STRING, TAV_TYPE_ASCII_STRING).number(TAV_ELM_CMN_HOST_NAME, 2);
+  atOnce.number();
+  EXPECT_FALSE(atOnce.isExtra(true));
+  EXPECT_FALSE(atOnce.isExtra(false));
+  // Of four bytes, padded to eight, which the other one's size of 4 * 2^16 gives.
+  TextBeforeEither behind(4 << 16, TAV_TYPE_ASCII_STRING, TAV_TYPE_UINT32);
+  behind.rows.number(9, 8);
+  behind.rows.h64((4 << 16) - 26, 0, TAV_TYPE_BINARY, TAV_ELM_CMN_HOST_NAME).fill((4 << 16) - 26, 0x5A);
+  EXPECT_TRUE(behind.isExtra(true));
+  EXPECT_TRUE(behind.isExtra(false));
+}
+
 TEST(Judge, KeepsNothingOfWhatItWasAsked)
 {
   size_t nodes = 0;

@@ -93,3 +93,13 @@ TEST_F(RecoveryPlace, OpensAndCountsOnceTheGroupsThatANodeContradicts)
   EXPECT_EQ(place.contradict(101), 1U) << "the others are counted";
   EXPECT_EQ(place.top().limit, 1000U);
 }
+
+TEST_F(RecoveryPlace, ExpectsNoGroupThatBeganBeforeIt)
+{
+  place.moveTo(30);
+  place.expect({{.start = 10, .end = 90, .wide = true}, {.start = 30, .end = 80, .wide = true}});
+  ASSERT_NE(place.lostGroup(), nullptr);
+  EXPECT_EQ(place.lostGroup()->start, 30U);
+  place.moveTo(31);
+  EXPECT_EQ(place.lostGroup(), nullptr);
+}

@@ -3,6 +3,7 @@
 /// of which something else is thought. TAV_WRITE_JUDGEMENTS=golden/judgements.txt writes them anew, and the difference
 /// is to be read.
 #include <map>
+#include <optional>
 #include <sstream>
 #include <string>
 
@@ -39,8 +40,8 @@ std::string ofProber(const Prober& prober, uint64_t at, bool wide, uint64_t limi
       belief > 1 && prober.header(at, wide, limit, header) && prober.isFollowed(header, limit) ? " before another" : "";
   text += prober.isChain(at, wide, limit) ? " chain" : "";
   text += prober.isChain(at, wide, limit, true) ? " to the end" : "";
-  uint64_t distance = 0;
-  text += wide && prober.pairAt(at, limit, distance) ? " pair of " + std::to_string(distance) : "";
+  const std::optional<uint64_t> distance = prober.pairAt(at, limit);
+  text += wide && distance ? " pair of " + std::to_string(*distance) : "";
   return text;
 }
 
@@ -62,7 +63,10 @@ std::string ofJudge(const Judged& it, uint64_t at, bool wide)
     say(found.data.otherOrder, "other order");
     say(judge.isConfirmed(found), "confirmed");
     say(judge.isWorthTaking(found, 0, size), "taken");
-    say(judge.isWorthTaking(found, at, size), "from here");
+    for (const uint64_t back : {uint64_t{0}, uint64_t{7}, uint64_t{8}})
+    {
+      say(at >= back && judge.isWorthTaking(found, at - back, size), "-" + std::to_string(back));
+    }
     say(Judge::isStrange(found), "strange");
     say(judge.isDamagedEnd(found, size), "bad end");
     say(judge.isRun(at, wide), "run");

@@ -155,6 +155,8 @@ inline std::vector<Sample> recoverySamples()
       {"groups with pairs",
        SampleRows()
            .open(kEye)
+           .open(kEye)
+           .close()
            .number(kEye)
            .open(kEye)
            .bytes(6, kEye)

@@ -122,7 +122,7 @@ TEST_P(Recovering, AnyNumberOfEndElementsMayLeadToOnePlace)
     rows.end64(rows.at() + 16 - lost);
   }
   const Recovered back(rows.bytes, form);
-  EXPECT_GT(back.totals.made, 3000U); // as deep as readers follow
+  EXPECT_EQ(back.totals.made, kMostNested - 1) << "as deep as readers follow, with the group around them";
   EXPECT_EQ(back.totals.kept + back.totals.lost, rows.at());
 }
 
@@ -275,6 +275,50 @@ TEST_P(Recovering, DoubtsNoNodeBehindOneThatCameBack)
   EXPECT_EQ(back.totals.nodes, 3U);
   EXPECT_EQ(back.totals.lost, 19U);
   EXPECT_TRUE(back.doubts.empty());
+}
+
+TEST_P(Recovering, DoubtsNoNodeBehindAnEndElement)
+{
+  rows.h64(19 + 16 + 16 + 36, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+  const uint64_t group = rows.at();
+  rows.h64(19 + 32, TAV_INFO_EYE_SIZE, TAV_TYPE_HEADER64, TAV_ELM_CMN_HOST).fill(19, 0x5A);
+  rows.end64(rows.at() + 16 - group);
+  rows.h64(4, TAV_INFO_EYE_SIZE, TAV_TYPE_UINT32, 12345).number(9, 4).pair(20); // an element that nobody knows
+  const Recovered back(rows.bytes, form);
+  EXPECT_EQ(back.totals.lost, 19U);
+  EXPECT_EQ(back.totals.nodes, 3U);
+  EXPECT_TRUE(back.doubts.empty());
+}
+
+TEST_P(Recovering, NodesOfGroupsThatAreTooDeepComeBackInTheDeepestThatIsNot)
+{
+  constexpr uint64_t kGroups = kMostNested + 3;
+  for (uint64_t i = 0; i < kGroups; ++i)
+  {
+    rows.h64((kGroups - 1 - i) * 48 + 36 + 32, TAV_INFO_EYE_SIZE, TAV_TYPE_HEADER64, TAV_ELM_CMN_HOST);
+  }
+  rows.h64(4, TAV_INFO_EYE_SIZE, TAV_TYPE_UINT32, 12345).number(9, 4).pair(20); // an element that nobody knows
+  for (uint64_t i = kGroups; i-- > 0;)
+  {
+    rows.end64(rows.at() + 16 - 16 * i);
+  }
+  const Recovered back(rows.bytes, form);
+  EXPECT_EQ(back.totals.nodes, kMostNested + 1);
+  EXPECT_EQ(back.totals.ends, kMostNested);
+  EXPECT_EQ(back.totals.closed + back.totals.made + back.totals.pairs, 0U);
+  EXPECT_EQ(back.stream.size(), 48 * kMostNested + 36);
+  ASSERT_EQ(back.losses.size(), 6U);
+  EXPECT_EQ(back.totals.lost, 3U * 48);
+  for (uint64_t i = 0; i < 3; ++i)
+  {
+    EXPECT_EQ(back.losses[i].offset, 16 * (kMostNested + i));
+    EXPECT_EQ(back.losses[i].length, 16U);
+    EXPECT_EQ(back.losses[i].reason,
+              "of a group nested more than 4000 deep; nodes in it go to the group around it");
+    EXPECT_EQ(back.losses[3 + i].offset, 16 * kGroups + 36 + 32 * i);
+    EXPECT_EQ(back.losses[3 + i].length, 32U);
+  }
+  EXPECT_EQ(back.doubts.size(), 1U) << "lost bytes follow the node whose element nobody knows";
 }
 
 TEST_P(Recovering, OfAnEndElementWithADamagedPairThePairAloneIsLost)

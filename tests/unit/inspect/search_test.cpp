@@ -96,6 +96,42 @@ TEST_P(Searching, GivesUpWhenItsBudgetIsUsedUp)
   EXPECT_TRUE(it.search.gaveUp());
 }
 
+TEST_P(Searching, GivesUpBehindAWholeStepThatItsBudgetDoesNotCover)
+{
+  constexpr uint64_t kAtOnce = uint64_t{16} * 1024;
+  rows.fill(kAtOnce + 100, 0x5A);
+  const uint64_t node = rows.at();
+  number();
+  number();
+  for (const uint64_t budget : {kAtOnce - 1, kAtOnce})
+  {
+    Searched it(rows.bytes, form, budget);
+    Candidate found;
+    EXPECT_EQ(it.search.findNext(0, rows.at(), found), budget == kAtOnce);
+    EXPECT_EQ(it.search.gaveUp(), budget != kAtOnce);
+    EXPECT_EQ(found.header().nodeOffset, budget == kAtOnce ? node : 0);
+  }
+}
+
+TEST_P(Searching, MissesNothingAtTheBordersOfWhatItReadsAtOnce)
+{
+  for (const uint64_t step : {uint64_t{4} * 1024, uint64_t{16} * 1024})
+  {
+    for (const uint64_t before : {step - 16, step - 1, step, step + 1, 2 * step - 1, 2 * step})
+    {
+      rows = ByteRows(GetParam());
+      rows.fill(before, 0x5A);
+      number();
+      number();
+      Searched it(rows.bytes, form);
+      Candidate found;
+      ASSERT_TRUE(it.search.findNext(0, rows.at(), found));
+      EXPECT_EQ(found.header().nodeOffset, before);
+      EXPECT_EQ(it.search.firstSure(0, rows.at(), true), before);
+    }
+  }
+}
+
 TEST_P(Searching, ATextThatNodesFillIsNotBelieved)
 {
   around(TAV_TYPE_ASCII_STRING);
