@@ -229,7 +229,8 @@ TEST_P(CheckSentences, OfTextsTellEachKindOfOddByteOnceAndWhere)
   rows.data({'a', 0, 0, 0xC3, 'b', 0xFF, 'c', 0xE2});
   rows.h64(8, 0, TAV_TYPE_ASCII_STRING, kNumber).data({0x80, 0, 'a', 'b', 0x81, 0, 'c', 'd'});
   EXPECT_THAT(told(rows), ElementsAre("0x25 utf8-invalid: the string holds bytes that are no UTF-8",
-                                      "0x23 string-nul: the string holds a NUL", "0x3b string-nul: the string holds a NUL",
+                                      "0x23 string-nul: the string holds a NUL",
+                                      "0x3b string-nul: the string holds a NUL",
                                       "0x3a string-high: the ASCII string holds a character beyond 127"));
 }
 

@@ -111,7 +111,8 @@ TEST(DiffEdges, TheSameValuesInTheOtherFormAreNoDifference)
   const std::string values = R"({"id": 1, "type": "Uint16", "value": 513}, {"id": 2, "type": "Sint64", "value": -7},
       {"id": 3, "type": "Uint128", "value": 18446744073709551617},
       {"id": 4, "type": "UTC Timestamp", "value": "2024-02-29T10:30:00.123456+01:00"},
-      {"id": 5, "type": "UTF8 String", "value": "gr\u00fc\u00df"}, {"id": 6, "type": "Uint64 array", "value": [1, 2, 3]},
+      {"id": 5, "type": "UTF8 String", "value": "gr\u00fc\u00df"},
+      {"id": 6, "type": "Uint64 array", "value": [1, 2, 3]},
       {"id": 7, "type": "Binary", "bytes": "010203"}, {"id": 8, "type": "Byte", "value": 7},
       {"id": 9, "type": "ASCII String", "value": ""}, {"id": 10, "type": 999, "bytes": "0102"})";
   const auto inForm = [&](bool swap, bool wide, bool aligned) {
