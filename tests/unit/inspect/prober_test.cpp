@@ -297,11 +297,11 @@ TEST_P(ProbingPairs, OfALostNodeAreFollowedByTheNext)
     EXPECT_EQ(found.byPair, found.offset == end);
     return found.offset == end;
   };
-  const auto wide = [this](uint16_t type, uint16_t elm) {
+  const auto wide = [](uint16_t type, uint16_t elm) {
     test::ByteRows node(GetParam());
     return node.h64(4, 0, type, elm).fill(4, 0x5A).fill(20, 0x5A);
   };
-  const auto narrow = [this](uint16_t elm) {
+  const auto narrow = [](uint16_t elm) {
     test::ByteRows node(GetParam());
     return node.h32(4, TAV_TYPE_UINT32, elm).fill(4, 0x5A).fill(20, 0x5A);
   };
