@@ -153,7 +153,7 @@ std::vector<Ending> findEndings(ByteSource& source, const Form& form, uint64_t f
     return found;
   }
   const uint64_t size = source.size();
-  const auto stretches = static_cast<size_t>((size - std::min(from, size) + kStretch - 1) / kStretch);
+  const auto stretches = static_cast<size_t>(unitsFor(size - std::min(from, size), kStretch));
   if (threads < 2 || stretches < 2)
   {
     found = EyeSearch(source, form, from, from, size).run();

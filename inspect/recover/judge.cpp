@@ -265,12 +265,12 @@ void Judge::lookBehind(Candidate& found, uint64_t base, uint64_t limit) const
   const TAVHeader& header = found.header();
   const bool wide = is64(header);
   const uint64_t pair = wide && hasEyeSize(header) ? kEyeSizeLength : 0;
-  const uint64_t most = typeOf(header) == TAV_TYPE_UTF8_STRING ? 2 : 0;
+  const bool utf8 = typeOf(header) == TAV_TYPE_UTF8_STRING;
   Belief best = Belief::typed;
   const std::array pairs{pair, uint64_t{0}};
   for (const uint64_t with : std::span(pairs).first(pair != 0 ? 2 : 1))
   {
-    for (uint64_t extra = 0; extra <= most; extra += 2)
+    for (uint64_t extra = 0; extra <= (utf8 ? 2U : 0U); extra += 2)
     {
       const uint64_t end = addSaturated(base, extra + with);
       const Belief belief = end > limit ? Belief::none : beliefBehind(end, wide, limit);

@@ -75,9 +75,16 @@ private:
 
 uint16_t load16(const uint8_t* bytes, bool swap)
 {
-  uint16_t value = 0;
+  uint16_t value{};
   std::memcpy(&value, bytes, sizeof value);
   return swap ? kor::byteswap16(value) : value;
+}
+
+bool isEye(const uint8_t* bytes)
+{
+  uint64_t word{};
+  std::memcpy(&word, bytes, sizeof word);
+  return word == TAV_EYE_CATCHER || word == kor::byteswap64(TAV_EYE_CATCHER);
 }
 
 /// A table of the answers for all 16-bit numbers: they are asked for at every byte of a damaged region.
@@ -139,13 +146,6 @@ private:
       ++at;
     }
     return static_cast<uint64_t>(at - bytes);
-  }
-
-  static bool isEye(const uint8_t* bytes)
-  {
-    uint64_t word = 0;
-    std::memcpy(&word, bytes, sizeof word);
-    return word == TAV_EYE_CATCHER || word == kor::byteswap64(TAV_EYE_CATCHER);
   }
 
   const Answers& types_ = knownTypes();
@@ -363,9 +363,7 @@ std::optional<uint64_t> Prober::nodeOfPair(uint64_t eye, uint64_t distance, uint
 
 bool Prober::restartByPair(const uint8_t* bytes, uint64_t offset, uint64_t from, uint64_t limit, Restart& restart)
 {
-  uint64_t word = 0;
-  std::memcpy(&word, bytes, sizeof word);
-  if (word != TAV_EYE_CATCHER && word != kor::byteswap64(TAV_EYE_CATCHER))
+  if (!isEye(bytes))
   {
     return false;
   }

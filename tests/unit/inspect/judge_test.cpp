@@ -63,6 +63,31 @@ TEST_P(Judging, APairThatLeadsBackIsWorthMost)
   EXPECT_FALSE(found.data.otherOrder);
 }
 
+TEST_P(Judging, APairInTheOtherByteOrderIsKeptSoOfTextsThatAreWrittenSo)
+{
+  const auto look = [this](uint16_t type, uint64_t extra, bool other) {
+    rows = ByteRows(GetParam());
+    rows.h64(4, kEye, type, TAV_ELM_CMN_HOST_NAME).fill(4, 'a').fill(extra, 0x11);
+    rows.data(ByteRows(GetParam() != other).pair(20).bytes);
+    return lookAtFirst();
+  };
+  for (const bool other : {false, true})
+  {
+    for (const uint16_t type : {TAV_TYPE_ASCII_STRING, TAV_TYPE_UTF8_STRING, TAV_TYPE_UINT32, TAV_TYPE_BINARY})
+    {
+      const Candidate found = look(type, 0, other);
+      EXPECT_EQ(found.trust, Trust::paired) << type;
+      EXPECT_EQ(found.data.otherOrder, other && type == TAV_TYPE_ASCII_STRING) << type;
+      EXPECT_EQ(found.end, 36U);
+    }
+    const Candidate found = look(TAV_TYPE_UTF8_STRING, 2, other);
+    EXPECT_EQ(found.trust, Trust::paired);
+    EXPECT_EQ(found.data.otherOrder, other);
+    EXPECT_TRUE(found.data.extra);
+    EXPECT_EQ(found.end, 38U);
+  }
+}
+
 TEST_P(Judging, APairWithAnotherDistanceIsADamagedOne)
 {
   number(TAV_ELM_CMN_CPU_ONLINE, kEye);

@@ -271,6 +271,11 @@ TEST_P(ProbingPairs, LeadBackToAGroupByItsSizeAndToADataElementByItsOwn)
       EXPECT_EQ(found.byPair, wrong == 0);
     }
   }
+  // What the distance leaves out is nine bytes at the most.
+  rows = test::ByteRows(GetParam());
+  rows.fill(30, 0x5A).h64(1, TAV_INFO_EYE_SIZE | TAV_INFO_ALIGNED8, TAV_TYPE_BINARY, kUnknownElement);
+  rows.fill(1 + 7 + 2, 0x5A).pair(17).fill(40, 0x5A);
+  EXPECT_EQ(search().offset, 30U);
   for (const uint64_t padding : {uint64_t{0}, uint64_t{3}, uint64_t{4}})
   {
     for (const uint64_t extra : {uint64_t{0}, uint64_t{1}, uint64_t{2}, uint64_t{3}})

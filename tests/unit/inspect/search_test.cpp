@@ -132,6 +132,19 @@ TEST_P(Searching, MissesNothingAtTheBordersOfWhatItReadsAtOnce)
   }
 }
 
+TEST_P(Searching, RemembersNothingForNodesWithOtherHeaders)
+{
+  rows.fill(33, 0x5A);
+  number();
+  rows.fill(50, 0x5A);
+  Searched it(rows.bytes, form);
+  for (int i = 0; i < 2; ++i)
+  {
+    EXPECT_EQ(it.search.firstSure(0, rows.at(), true), 33U);
+    EXPECT_EQ(it.search.firstSure(0, rows.at(), false), rows.at()) << "one alone is too little with other headers";
+  }
+}
+
 TEST_P(Searching, ATextThatNodesFillIsNotBelieved)
 {
   around(TAV_TYPE_ASCII_STRING);
