@@ -68,7 +68,7 @@ bool Ledger::isMostlyEyes(const TAVHeader& data)
   uint64_t covered = 0;
   for (size_t i = 0; i + kEyeLength <= bytes.size();)
   {
-    uint64_t word{};
+    uint64_t word = 0;
     std::memcpy(&word, bytes.data() + i, sizeof word);
     const bool eye = word == TAV_EYE_CATCHER || word == kor::byteswap64(TAV_EYE_CATCHER);
     covered += eye ? kEyeLength : 0;

@@ -75,14 +75,14 @@ private:
 
 uint16_t load16(const uint8_t* bytes, bool swap)
 {
-  uint16_t value{};
+  uint16_t value = 0;
   std::memcpy(&value, bytes, sizeof value);
   return swap ? kor::byteswap16(value) : value;
 }
 
 bool isEye(const uint8_t* bytes)
 {
-  uint64_t word{};
+  uint64_t word = 0;
   std::memcpy(&word, bytes, sizeof word);
   return word == TAV_EYE_CATCHER || word == kor::byteswap64(TAV_EYE_CATCHER);
 }
@@ -343,7 +343,7 @@ std::optional<uint64_t> Prober::nodeOfPair(uint64_t eye, uint64_t distance, uint
   for (uint64_t missing = 0; missing <= 9; ++missing)
   {
     TAVHeader node{};
-    uint64_t start{};
+    uint64_t start = 0;
     if (!nodeBefore(eye, addSaturated(distance, missing), start) || start < from || !header(start, true, limit, node))
     {
       continue;
