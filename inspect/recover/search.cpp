@@ -102,7 +102,7 @@ bool RecoverySearch::isContradicted(const Candidate& found)
   const uint64_t sure = firstSure(start, found.end, is64(header));
   return sure < start + sizeOf(header) &&
          (judge_.leadsTo(sure, is64(header), found.end) ||
-          (found.pairBytes != 0 && judge_.leadsTo(sure, is64(header), found.end - found.pairBytes)));
+          judge_.leadsTo(sure, is64(header), found.end - found.pairBytes));
 }
 
 bool RecoverySearch::believe(Candidate& found, Footing footing)
@@ -123,9 +123,9 @@ bool RecoverySearch::believe(Candidate& found, Footing footing)
   const uint64_t end = found.isGroup() ? start : found.end;
   const uint64_t from = footing != Footing::searched && named && !found.isGroup() ? start : header.nodeOffset + 1;
   const uint64_t sure = firstSure(from, end, is64(header));
-  if (sure < end && !found.isGroup() && sure >= start + sizeOf(header))
+  if (!found.isGroup() && sure >= start + sizeOf(header))
   {
-    found.end = sure; // its padding is not there
+    found.end = sure; // perhaps its padding is not there
     return true;
   }
   return sure >= end || (!found.isGroup() && Judge::mayHoldNodes(found) && judge_.leadsTo(sure, is64(header), end));

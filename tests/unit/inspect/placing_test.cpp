@@ -73,6 +73,9 @@ TEST_F(RecoveryPlace, StretchesTheGroupsThatEndBefore)
   EXPECT_EQ(place.group(3).limit, 80U);
   EXPECT_EQ(place.group(2).limit, 80U);
   EXPECT_EQ(place.group(1).limit, 100U);
+  place.stretch(120);
+  EXPECT_EQ(place.group(1).limit, 120U);
+  EXPECT_EQ(place.group(0).limit, 1000U);
 }
 
 TEST_F(RecoveryPlace, OpensAndCountsOnceTheGroupsThatANodeContradicts)

@@ -111,6 +111,29 @@ TEST_P(Recovering, AGroupThatHasLostItsHeaderComesBackByItsEndElement)
   EXPECT_EQ(back.stream, expected);
 }
 
+TEST_P(Recovering, NothingGoesBeyondTheEndOfAGroupThatHasLostItsHeader)
+{
+  rows.h64(16 + 20 + 24 + 32 + 40 + 32, TAV_INFO_EYE_SIZE, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+  const uint64_t lost = rows.at();
+  rows.fill(16, 0x5A);
+  number();
+  const uint64_t data = rows.at();
+  rows.h64(8 + 32 + 20, 0, TAV_TYPE_BINARY, TAV_ELM_CMN_HOST_NAME).fill(8, 0x77); // to behind the next number
+  rows.end64(rows.at() + 16 - lost);
+  number();
+  number();
+  rows.end64(rows.at() + 16);
+  const Recovered back(rows.bytes, form);
+  EXPECT_EQ(back.totals.nodes, 4U);
+  EXPECT_EQ(back.totals.made, 1U);
+  EXPECT_EQ(back.totals.ends, 2U);
+  ASSERT_EQ(back.losses.size(), 2U);
+  EXPECT_EQ(back.losses[0].offset, lost);
+  EXPECT_EQ(back.losses[0].length, 16U);
+  EXPECT_EQ(back.losses[1].offset, data);
+  EXPECT_EQ(back.losses[1].length, 24U);
+}
+
 TEST_P(Recovering, AnyNumberOfEndElementsMayLeadToOnePlace)
 {
   constexpr uint64_t kEnds = 100'000;

@@ -132,6 +132,20 @@ TEST_P(Searching, MissesNothingAtTheBordersOfWhatItReadsAtOnce)
   }
 }
 
+TEST_P(Searching, OnSoundFootingOneNodeInsideOfANumberSpeaksNotAgainstIt)
+{
+  rows.h64(4, 0, TAV_TYPE_UINT32, TAV_ELM_CMN_CPU_ONLINE);
+  number(); // which begins in the payload of the one before
+  rows.fill(50, 0x5A);
+  Searched it(rows.bytes, form);
+  for (const Footing footing : {Footing::sound, Footing::damaged, Footing::searched})
+  {
+    Candidate found = it.judge.look(0, true);
+    EXPECT_EQ(found.trust, Trust::alone);
+    EXPECT_EQ(it.search.believe(found, footing), footing == Footing::sound);
+  }
+}
+
 TEST_P(Searching, RemembersNothingForNodesWithOtherHeaders)
 {
   rows.fill(33, 0x5A);
