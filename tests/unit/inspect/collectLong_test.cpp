@@ -101,9 +101,9 @@ TEST(CollectLong, InfoBitsHaveNoRoomInNarrowHeaders)
 
 TEST(CollectLong, OwnWidthsAreKeptOfEachRoot)
 {
-  const std::string root = rootWith(R"({"id": 1, "value": 7})");
-  const Bytes wide = test::bytesOfJson(root);
-  const Bytes narrow = test::bytesOfJson(R"({"form": {"root": 32}, "nodes": )" + root + "}");
+  const Bytes wide = test::bytesOfJson(rootWith(R"({"id": 1, "value": 7})"));
+  const Bytes narrow =
+      test::bytesOfJson(R"({"form": {"root": 32}, "nodes": )" + rootWith(R"({"id": 1, "value": 7})") + "}");
   Bytes both = wide;
   both.insert(both.end(), narrow.begin(), narrow.end());
   EXPECT_EQ(collected(both, {}, nullptr, true).bytes, both);

@@ -36,8 +36,8 @@ TEST(JsonText, WritesEveryCharacterSoThatAnotherParserReadsIt)
   for (int c = 0; c < 0x80; ++c)
   {
     all += static_cast<char>(c);
-    const std::string last = all.substr(all.size() - 1);
-    EXPECT_EQ(nlohmann::json::parse(jsonString(last)).get<std::string>(), last);
+    const std::string one = all.substr(all.size() - 1);
+    EXPECT_EQ(nlohmann::json::parse(jsonString(one)).get<std::string>(), one);
   }
   all += "\xC3\xBC\xE2\x82\xAC\xF0\x9F\x99\x82";
   EXPECT_EQ(nlohmann::json::parse(jsonString(all)).get<std::string>(), all);
@@ -165,9 +165,9 @@ TEST(JsonText, OfALongNumberIsTakenToItsLastDigitAndNoFurther)
   EXPECT_EQ(numberAgain("-170141183460469231731687303715884105728", true), "-170141183460469231731687303715884105728");
   EXPECT_EQ(numberAgain("340282366920938463463374607431768211455", false), "340282366920938463463374607431768211455");
   EXPECT_EQ(numberAgain("-0", true), "0");
-  for (const char* const number : {"", "-", "1x", "x1", "/", ":", "-170141183460469231731687303715884105729",
-                                   "170141183460469231731687303715884105728",
-                                   "340282366920938463463374607431768211456"})
+  for (const char* const number :
+       {"", "-", "1x", "x1", "/", ":", "-170141183460469231731687303715884105729",
+        "170141183460469231731687303715884105728", "340282366920938463463374607431768211456"})
   {
     EXPECT_EQ(numberAgain(number, true), "(none)") << number;
   }
