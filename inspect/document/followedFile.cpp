@@ -20,10 +20,52 @@ uint32_t FollowedFile::getTotalSize(uint64_t* size)
   return TAV_RC_OK;
 }
 
+/// Reads a place again when the write that was under way there has ended.
+uint32_t FollowedFile::readAgain(uint64_t from, uint64_t wanted, void** data, uint64_t room, uint64_t* done)
+{
+  const auto* const bytes = static_cast<const uint8_t*>(*data);
+  before_.assign(bytes, bytes + *done);
+  uint64_t unused = 0;
+  static_cast<void>(pFile->findData(from, &unused)); // Linux has it wait for whoever writes to the file
+  position = from;
+  needSeek = 1;
+  return TAVSSFile::read(wanted, data, room, done, false, false);
+}
+
+/// What was read before and after the end of a write is no part of one. A writer that does not let go of a place is
+/// given a few chances: what it changes there counts as not written yet, unless it has to be there.
+uint32_t FollowedFile::readSettled(uint64_t wanted, void** data, uint64_t room, uint64_t* done)
+{
+  constexpr int chances = 8;
+  constexpr int chancesOfNeeded = 1000;
+  const uint64_t from = position;
+  uint32_t code = TAVSSFile::read(wanted, data, room, done, false, false);
+  for (int i = 0; i < chancesOfNeeded && (code == TAV_RC_OK || code == TAV_RC_END_OF_STORAGE) && *done != 0; ++i)
+  {
+    code = readAgain(from, wanted, data, room, done);
+    const auto* const bytes = static_cast<const uint8_t*>(*data);
+    const auto same = static_cast<uint64_t>(
+        std::mismatch(before_.begin(), before_.end(), bytes, bytes + *done).first - before_.begin());
+    if (same == before_.size() && same == *done)
+    {
+      break;
+    }
+    if (i >= chances && from + same >= needed_)
+    {
+      *done = same;
+      position = from + same;
+      needSeek = 1;
+      return TAV_RC_END_OF_STORAGE;
+    }
+  }
+  return code;
+}
+
 uint32_t FollowedFile::read(uint64_t wanted, void** data, uint64_t room, uint64_t* done, bool zeroCopy, bool backward)
 {
   const uint64_t from = position;
-  const uint32_t code = TAVSSFile::read(wanted, data, room, done, zeroCopy, backward);
+  const uint32_t code = backward || zeroCopy ? TAVSSFile::read(wanted, data, room, done, zeroCopy, backward)
+                                             : readSettled(wanted, data, room, done);
   const uint64_t asked = std::min(wanted, room);
   const uint64_t due = from < size_ ? std::min(asked, size_ - from) : 0;
   if (backward || (code != TAV_RC_OK && code != TAV_RC_END_OF_STORAGE) || *done >= due)

@@ -292,6 +292,46 @@ TEST_F(Follow, TellsWhatAWriterWritesWhileItWrites)
   EXPECT_EQ(seen, expected);
 }
 
+/// A ring's file is longer than what is written yet, and its writes do not hold back who reads meanwhile.
+TEST_F(Follow, TellsNoNodeOfWhichAPartIsWritten)
+{
+  constexpr uint64_t count = 20000;
+  constexpr uint64_t each = 2; // nodes between two writes
+  std::vector<uint64_t> told;
+  Follower follower(
+      tav::FilePath(file_.path).text(), {},
+      [&](const tav::Node& node) {
+        if (!node.isGroup())
+        {
+          told.push_back(node.type() == TAV_TYPE_UINT64 ? ~node.as<uint64_t>() : UINT64_MAX);
+        }
+      },
+      tav::inspect::StopToken());
+  std::thread writer([&] {
+    tav::Writer stream(file_.path);
+    tav::Group system = stream.group(TAV_ELM_CMN_SYSTEM);
+    for (uint64_t i = 0; i < count; ++i)
+    {
+      system.add(TAV_ELM_CMN_MEM_FREE, ~i);
+      if (i % each == each - 1)
+      {
+        stream.flush();
+      }
+    }
+    system.close();
+    stream.finish();
+  });
+  const auto deadline = std::chrono::steady_clock::now() + 10min; // ends what hangs
+  while (told.size() < count && std::chrono::steady_clock::now() < deadline)
+  {
+    follower.goOn();
+  }
+  writer.join();
+  std::vector<uint64_t> expected(count);
+  std::iota(expected.begin(), expected.end(), uint64_t{0});
+  EXPECT_EQ(told, expected);
+}
+
 TEST_F(Follow, EndsWhenNothingComes)
 {
   append(numbers({1, 2, 3}));
