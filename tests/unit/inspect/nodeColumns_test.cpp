@@ -8,6 +8,7 @@
 
 #include <gmock/gmock.h>
 
+#include "cpp/layer.h"
 #include "inspect/streams.h"
 #include "tav/inspect/nodeColumns.hpp"
 #include "tav/inspect/streamWalk.hpp"
@@ -134,6 +135,26 @@ TEST(NodeRows, AreTheNodesOfAWalkOverRandomTrees)
     expectEqual(test::damaged(bytes, seed), form);
     expectEqual(test::damaged(test::damaged(bytes, seed + 100), seed), form);
   }
+}
+
+TEST(NodeRows, AreNamedByTheirOffsetsAmongMoreIdsThanAreCounted)
+{
+  tav::Writer writer;
+  {
+    tav::Group system = writer.group(TAV_ELM_CMN_SYSTEM);
+    for (uint16_t i = 0; i < 900; ++i)
+    {
+      system.add(tav::ElementId{static_cast<uint16_t>(36000 + i % 300)}, i);
+    }
+    system.group(tav::ElementId{36299}).add(TAV_ELM_CMN_CPU_ONLINE, 1);
+  }
+  writer.finish();
+  const Bytes bytes = test::bytesOf(writer.bytes());
+  const RowsSeen rows = byWalker(bytes, {});
+  EXPECT_EQ(std::count_if(rows.rows.begin(), rows.rows.end(),
+                          [](const std::string& row) { return row.find("[@0x") != std::string::npos; }),
+            (300 - 256) * 3 + 2);
+  expectEqual(bytes, {});
 }
 
 TEST(NodeRows, AreThoseBeforeTheDamageWhenReadingStops)
