@@ -294,6 +294,8 @@ const std::vector<TableQuery>& queries()
       queryOf("/*/*", {"cpuOnline", "../memTotal"}),
       queryOf("//host[cpuOnline]", {"memTotal", ".//hostName"}),
       queryOf("/*", {"*", "*/*", "*/*/*"}, ","),
+      queryOf("/*/*//.", {".", ".//."}, "+"),
+      queryOf("/system", {"host//.", ".//host/.", "cpuOnline"}, "+"),
   };
   return all;
 }
@@ -337,14 +339,23 @@ TEST(TableOfRandomTrees, IsTheSameByTheExactStepsAndByTheWalkerWhateverTheDamage
 TEST(TableOfRandomTrees, HasWhatIsAnyNumberOfLevelsBelowARow)
 {
   // A condition that always holds makes the reader look each column up by itself.
-  const std::vector<std::string> columns = {".//cpuOnline", "host//hostName", ".//host/*", ".//host//memTotal", ".//*",
-                                            "*//*", ".//*//*", ".//system//*"};
+  struct Column
+  {
+    std::string path;
+    std::string sought;
+  };
+  std::vector<Column> columns = {{"host//.", "host[@type] | host//*[@type]"}, {".//.", ". | .//*[@type]"}};
+  for (const std::string path : {".//cpuOnline", "host//hostName", ".//host/*", ".//host//memTotal", ".//*", "*//*",
+                                 ".//*//*", ".//system//*"})
+  {
+    columns.push_back({path, path + "[@type]"});
+  }
   const auto rows = [&](ByteSource& source, const tav::inspect::Form& form, const char* each, bool sought,
                         const std::optional<std::string>& joiner) {
-    std::vector<std::string> paths = columns;
-    for (std::string& path : paths)
+    std::vector<std::string> paths;
+    for (const Column& column : columns)
     {
-      path += sought ? "[@type]" : "";
+      paths.push_back(sought ? column.sought : column.path);
     }
     return rowsOf(readTable(source, form, queryOf(each, paths, joiner), {.onDamage = OnDamage::skip}));
   };
