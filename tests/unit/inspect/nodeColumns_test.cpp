@@ -134,6 +134,10 @@ TEST(NodeRows, AreTheNodesOfAWalkOverRandomTrees)
     expectEqual(bytes, form);
     expectEqual(test::damaged(bytes, seed), form);
     expectEqual(test::damaged(test::damaged(bytes, seed + 100), seed), form);
+    // Whose names come again among siblings and below them.
+    const Bytes named = test::namedStream(seed);
+    expectEqual(named, {});
+    expectEqual(test::damaged(named, seed), {});
   }
 }
 
