@@ -52,9 +52,7 @@ bool decimalOf(const RawValue& raw) noexcept
 std::optional<std::string> dateAttribute(const TAVTimeStamp& stamp, paths::Attribute attribute)
 {
   using paths::Attribute;
-  constexpr int aDay = 24 * 60;
-  const bool isWhole = stamp.fractionA < 1000 && stamp.fractionB < 1000 && stamp.further == 0 &&
-                       stamp.offsetMinutes > -aDay && stamp.offsetMinutes < aDay && !timeText(stamp).ends_with('s');
+  const bool isWhole = isWholeTime(stamp, timeText(stamp));
   switch (attribute)
   {
   case Attribute::seconds: return when(!isWhole, std::to_string(stamp.seconds));

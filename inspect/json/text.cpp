@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <charconv>
 #include <chrono>
-#include <cstring>
 #include <vector>
 
 #include "tav/inspect/value.hpp"
@@ -255,8 +254,7 @@ std::optional<TAVTimeStamp> parseDate(std::string_view text)
 
 bool isWholeDate(const TAVTimeStamp& stamp, std::string_view text)
 {
-  const auto back = parseDate(text);
-  return back && std::memcmp(&*back, &stamp, sizeof stamp) == 0;
+  return tav::detail::isWholeTime(stamp, text);
 }
 
 std::optional<std::array<uint8_t, 16>> parseInt128(std::string_view text, bool isSigned)

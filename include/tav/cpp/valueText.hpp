@@ -182,6 +182,14 @@ inline void appendTime(std::string& to, const TAVTimeStamp& stamp)
   to.append(text.data(), at);
 }
 
+/// Whether the text of a moment says all of it, so that it can be made of the text again.
+inline bool isWholeTime(const TAVTimeStamp& stamp, std::string_view text) noexcept
+{
+  constexpr int hundredHours = 100 * 60; // whose text has three digits
+  return stamp.fractionA < 1000 && stamp.fractionB < 1000 && stamp.further == 0 &&
+         stamp.offsetMinutes > -hundredHours && stamp.offsetMinutes < hundredHours && !text.ends_with('s');
+}
+
 inline std::string timeText(const TAVTimeStamp& stamp)
 {
   std::string text;

@@ -134,6 +134,29 @@ TEST(JsonText, OfADateIsRefusedBeyondTheClockAndTheCalendar)
   }
 }
 
+TEST(JsonText, OfADateIsWholeWhereTheStampCanBeReadOfItAgain)
+{
+  constexpr uint64_t endOf9999 = 253402300800;
+  for (const uint64_t seconds : {uint64_t{0}, uint64_t{1}, uint64_t{1714557630}, endOf9999 - 1, endOf9999, UINT64_MAX})
+  {
+    for (const int offset : {0, 1, -1, 59, 60, 1439, 1440, -1440, 5999, -5999, 6000, -6000, 32767, -32768})
+    {
+      for (const unsigned fraction : {0U, 1U, 999U, 1000U, 65535U})
+      {
+        for (const unsigned further : {0U, 1U})
+        {
+          const TAVTimeStamp stamp{seconds, static_cast<uint16_t>(fraction), static_cast<uint16_t>(fraction / 2),
+                                   static_cast<uint16_t>(further), static_cast<int16_t>(offset)};
+          const std::string text = dateText(stamp);
+          const auto again = parseDate(text);
+          const bool isSame = again && std::memcmp(&*again, &stamp, sizeof stamp) == 0;
+          EXPECT_EQ(isWholeDate(stamp, text), isSame) << text;
+        }
+      }
+    }
+  }
+}
+
 TEST(JsonText, OfADateIsNotWholeWhereTheStampHoldsMore)
 {
   const TAVTimeStamp stamp = *parseDate("2024-02-29T10:30:00.123456+01:00");
