@@ -9,6 +9,7 @@
 
 #include <gmock/gmock.h>
 
+#include "cpp/layer.h"
 #include "inspect/streams.h"
 #include "tav/inspect/nodeColumns.hpp"
 #include "tav/inspect/plan.hpp"
@@ -260,6 +261,39 @@ TEST(NodeRows, HaveTheValuesThatTheBytesAre)
         ASSERT_EQ(found, expected);
       }
     }
+  }
+}
+
+TEST(NodeRows, HaveTimesAsFarAsNanosecondsReach)
+{
+  constexpr uint64_t lastSecond = 9223372036; // of which 854,775,807 ns can be told
+  const std::vector<std::pair<TAVTimeStamp, bool>> stamps = {{{lastSecond, 854, 775, 0, 0}, true},
+                                                             {{lastSecond, 854, 776, 0, 0}, false},
+                                                             {{lastSecond - 1, 999, 999, 0, 0}, true},
+                                                             {{lastSecond + 1, 0, 0, 0, 0}, false},
+                                                             {{0, 0, 0, 0, 0}, true}};
+  tav::Writer writer;
+  {
+    tav::Group system = writer.group(TAV_ELM_CMN_SYSTEM);
+    for (const auto& [stamp, fits] : stamps)
+    {
+      system.add(TAV_ELM_CMN_HOST_NAME, stamp);
+    }
+  }
+  writer.finish();
+  const Bytes bytes = test::bytesOf(writer.bytes());
+  ByteSource source("x", std::span<const uint8_t>(bytes));
+  NodeReader reader(source, Form{});
+  NodeColumns columns;
+  ASSERT_TRUE(reader.next(columns));
+  ASSERT_EQ(columns.count(), stamps.size() + 1);
+  for (size_t i = 0; i < stamps.size(); ++i)
+  {
+    const auto& [stamp, fits] = stamps[i];
+    const uint64_t time =
+        stamp.seconds * 1'000'000'000 + stamp.fractionA * uint64_t{1'000'000} + stamp.fractionB * uint64_t{1000};
+    EXPECT_EQ(columns.kind[i + 1], fits ? ValueKind::time : ValueKind::none) << i;
+    EXPECT_EQ(columns.time[i + 1], fits ? static_cast<int64_t>(time) : NodeColumns::kNoTime) << i;
   }
 }
 

@@ -112,6 +112,9 @@ const std::vector<Question> kQuestions = {
     {"/system/cpu", {"cpuOnline"}, {}},
     {"/", {"osName", "host/cpu/cpuOnline | host/cpuOnline"}, {{"\"os\u00e4\"", "8"}}},
     {"/system/host/*", {"."}, {{"\"ada\""}, {"8"}, {"-"}, {"\"grace\""}, {"\"\""}}},
+    {"/system/host", {"hostName | * | hostName"}, {{"\"ada|8\""}, {"\"grace|\""}, {"-"}}, "|"},
+    {"/system", {"../osName", "../../system/osName", "../*[1]", "osName"}, {{"-", "-", "-", "\"os\u00e4\""}}},
+    {"/system/host/cpu", {"../../../osName", "../../../../system/osName | cpuOnline"}, {{"-", "-2"}}},
 };
 
 } // namespace
@@ -179,6 +182,17 @@ TEST(TableOfValues, WidensAColumnToWhatHoldsAllOfThem)
   EXPECT_EQ(columnOf(std::vector<std::byte>(3)).type(0), CellKind::bytes);
   EXPECT_EQ(columnOf(std::vector<std::byte>(3), "x").type(0), CellKind::text);
   EXPECT_EQ(columnOf().type(0), CellKind::text);
+}
+
+TEST(TableOfValues, KeepsTextsApartThatLieBehindEachOther)
+{
+  const Table table = columnOf("abcdefgh", "ijklmnop", "abcdefgh", "abcdefgh", "ijklmno");
+  std::vector<std::string> texts;
+  for (uint64_t row = 0; row < table.rows(); ++row)
+  {
+    texts.emplace_back(table.cell(0, row).text);
+  }
+  EXPECT_THAT(texts, ElementsAre("abcdefgh", "ijklmnop", "abcdefgh", "abcdefgh", "ijklmno"));
 }
 
 TEST(TableOfValues, KeepsEachOfThem)
