@@ -160,6 +160,11 @@ bool isDeviceNative(const char*)
   return false;
 }
 
+uint32_t listFolderNative(const char*, KORFileNameVisit, void*)
+{
+  return TAV_RC_NOT_SUPPORTED;
+}
+
 uint32_t renameNative(const char*, const char*)
 {
   return TAV_RC_NOT_SUPPORTED;

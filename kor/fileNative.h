@@ -66,6 +66,8 @@ bool isDeviceNative(const char* pPath);
 
 /// Whether a file keeps its name from being given to another one for as long as it is open.
 extern const bool kOpenFileHoldsName;
+/// Calls `visit` with the name of each entry of a folder but "." and "..". What it throws is passed on.
+uint32_t listFolderNative(const char* pPath, KORFileNameVisit visit, void* context);
 /// Renames a file, over one that is there.
 uint32_t renameNative(const char* pFrom, const char* pTo);
 } // namespace tav::kor

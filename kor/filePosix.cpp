@@ -1,9 +1,11 @@
 #include <cerrno>
 #include <cstdio>
 #include <cstring>
+#include <dirent.h>
 #include <fcntl.h>
 #include <memory>
 #include <new>
+#include <string_view>
 #include <sys/file.h>
 #include <sys/mman.h>
 #include <sys/stat.h>
@@ -338,6 +340,31 @@ bool isDeviceNative(const char* pPath)
 {
   struct stat there = {};
   return ::stat(pPath, &there) == 0 && !S_ISREG(there.st_mode) && !S_ISDIR(there.st_mode);
+}
+
+// Not by std::filesystem, of which one implementation ends the program when there is no memory for a name.
+uint32_t listFolderNative(const char* pPath, KORFileNameVisit visit, void* context)
+{
+  struct Close
+  {
+    void operator()(DIR* folder) const { ::closedir(folder); }
+  };
+  const std::unique_ptr<DIR, Close> folder(::opendir(pPath));
+  if (folder == nullptr)
+  {
+    return codeOfSystemError(errno);
+  }
+  errno = 0; // which an end does not change
+  while (const dirent* const entry = ::readdir(folder.get()))
+  {
+    const std::string_view name(entry->d_name);
+    if (name != "." && name != "..")
+    {
+      visit(entry->d_name, context);
+    }
+    errno = 0;
+  }
+  return errno == 0 ? TAV_RC_OK : codeOfSystemError(errno);
 }
 
 const bool kOpenFileHoldsName = false;

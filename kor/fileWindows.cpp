@@ -1,4 +1,5 @@
 #include <climits>
+#include <memory>
 #include <string>
 
 #include "kor/port.h"
@@ -322,6 +323,39 @@ bool isDeviceNative(const char* pPath)
   const DWORD type = GetFileType(there);
   CloseHandle(there);
   return type != FILE_TYPE_DISK;
+}
+
+uint32_t listFolderNative(const char* pPath, KORFileNameVisit visit, void* context)
+{
+  struct Close
+  {
+    using pointer = HANDLE;
+    void operator()(HANDLE search) const { FindClose(search); }
+  };
+  std::wstring pattern;
+  const DWORD unread = widen(pPath, pattern);
+  if (unread != ERROR_SUCCESS)
+  {
+    return codeOfSystemError(unread);
+  }
+  pattern += L"\\*";
+  WIN32_FIND_DATAW found{};
+  const HANDLE first = FindFirstFileW(pattern.c_str(), &found);
+  if (first == INVALID_HANDLE_VALUE)
+  {
+    return codeOfSystemError(GetLastError());
+  }
+  const std::unique_ptr<HANDLE, Close> search(first);
+  do
+  {
+    const std::string name = narrow(found.cFileName);
+    if (name != "." && name != "..")
+    {
+      visit(name.c_str(), context);
+    }
+  } while (FindNextFileW(search.get(), &found));
+  const DWORD end = GetLastError();
+  return end == ERROR_NO_MORE_FILES ? TAV_RC_OK : codeOfSystemError(end);
 }
 
 const bool kOpenFileHoldsName = true;

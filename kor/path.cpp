@@ -129,13 +129,5 @@ uint32_t korListFolder(const char* pPath, KORFileNameVisit visit, void* context)
   {
     return TAV_RC_BAD_PARAM;
   }
-  return guarded([&] {
-    std::error_code error;
-    fs::directory_iterator entry(pathOf(pPath), error);
-    for (; !error && entry != fs::directory_iterator(); entry.increment(error))
-    {
-      visit(textOf(entry->path().filename()).c_str(), context);
-    }
-    return error ? codeOfSystemError(error.value()) : TAV_RC_OK;
-  });
+  return guarded([&] { return listFolderNative(pPath, visit, context); });
 }

@@ -48,7 +48,7 @@ bool Parser::checkPlace(Expression& number, size_t start)
   }
   if (number.constant == 0 || number.constant == kNoConstant)
   {
-    return fail(start, quoted(number.text) + " is no place; the first is [1]");
+    return fail(start, {quoted(number.text), " is no place; the first is [1]"});
   }
   if (number.constant < 0)
   {
@@ -63,8 +63,11 @@ bool Parser::checkPlace(Expression& number, size_t start)
 
 bool Parser::enter(size_t start)
 {
-  return ++nested_ <= kMostNested ||
-         fail(start, "more than " + std::to_string(kMostNested) + " brackets inside of each other");
+  if (++nested_ > kMostNested)
+  {
+    return fail(start, {"more than ", std::to_string(kMostNested), " brackets inside of each other"});
+  }
+  return true;
 }
 
 bool Parser::leave(size_t start, std::string_view end)
@@ -75,8 +78,7 @@ bool Parser::leave(size_t start, std::string_view end)
     return true;
   }
   passBlanks();
-  return at_ < text_.size() ? failHere()
-                            : fail(start, "a " + std::string(1, text_[start]) + " without a " + std::string(end));
+  return at_ < text_.size() ? failHere() : fail(start, {"a ", text_.substr(start, 1), " without a ", end});
 }
 
 uint32_t Parser::add(Expression expression)
@@ -240,7 +242,7 @@ bool Parser::parseOperand(uint32_t& out)
   const char c = peek();
   if (path_.expressions.size() >= kMostSteps)
   {
-    return fail(at_, "a path has at most " + std::to_string(kMostSteps) + " conditions");
+    return fail(at_, {"a path has at most ", std::to_string(kMostSteps), " conditions"});
   }
   if (c == '\'' || c == '"')
   {
@@ -307,7 +309,7 @@ bool Parser::parseNumber(uint32_t& out)
   Expression number{.kind = Kind::number, .text = std::string(text_.substr(start, at_ - start))};
   if (!decimalOf(number.text))
   {
-    return fail(start, quoted(number.text) + " is no number");
+    return fail(start, {quoted(number.text), " is no number"});
   }
   const char* const end = number.text.data() + number.text.size();
   const auto [stop, error] = std::from_chars(number.text.data(), end, number.constant);
@@ -361,8 +363,8 @@ bool Parser::parseFunction(size_t start, std::string_view name, uint32_t& out)
   }
   if (name != "contains" && name != "starts-with")
   {
-    return fail(start, "no function is called " + quoted(name) +
-                           "; there are position, last, not, contains and starts-with");
+    return fail(start, {"no function is called ", quoted(name),
+                        "; there are position, last, not, contains and starts-with"});
   }
   Expression call{.kind = name == "contains" ? Kind::contains : Kind::startsWith, .parts = {0, 0}};
   if (!enter(open) || !parseArgument(call.parts[0]) || !(take(",") || failHere()) || !parseArgument(call.parts[1]) ||

@@ -135,7 +135,7 @@ bool Parser::parseStep(Route& route, bool& stars, bool inBrackets)
   passBlanks();
   if (steps_ >= kMostSteps)
   {
-    return fail(at_, "a path has at most " + std::to_string(kMostSteps) + " steps");
+    return fail(at_, {"a path has at most ", std::to_string(kMostSteps), " steps"});
   }
   const bool afterStars = std::exchange(stars, false);
   if (peek() == '.')
@@ -171,14 +171,14 @@ bool Parser::parseDots(Route& route)
   {
     if (++parents_ > kMostParents)
     {
-      return fail(start, "more than " + std::to_string(kMostParents) + " '..' behind names");
+      return fail(start, {"more than ", std::to_string(kMostParents), " '..' behind names"});
     }
     const Axis before = route.steps.empty() ? Axis::child : route.steps.back().axis;
     route.hasParents = true;
     hardParents_ += before != Axis::child ? 1 : 0;
     if (hardParents_ > kMostHardParents)
     {
-      return fail(start, "more than " + std::to_string(kMostHardParents) + " '..' that follow no name");
+      return fail(start, {"more than ", std::to_string(kMostHardParents), " '..' that follow no name"});
     }
     addStep(route).axis = Axis::parent;
   }
@@ -206,8 +206,11 @@ bool Parser::parseAttribute(Route& route)
   {
     return failHere();
   }
-  return route.attribute != Attribute::none ||
-         fail(start, "no attribute is called " + quoted(name) + "; " + attributeList());
+  if (route.attribute == Attribute::none)
+  {
+    return fail(start, {"no attribute is called ", quoted(name), "; ", attributeList()});
+  }
+  return true;
 }
 
 void Parser::setIds(Step& step, const std::vector<uint16_t>& ids)
@@ -222,8 +225,12 @@ void Parser::setIds(Step& step, const std::vector<uint16_t>& ids)
 void Parser::tellUnknown(size_t start, std::string_view name)
 {
   const std::string nearest(nearestTag(name, own_));
-  tell(PathFault::Kind::unknownName, start,
-       "no element is called " + quoted(name) + (nearest.empty() ? "" : "; did you mean " + nearest + "?"));
+  std::string sentence = "no element is called " + quoted(name);
+  if (!nearest.empty())
+  {
+    sentence.append("; did you mean ").append(nearest).append("?");
+  }
+  tell(PathFault::Kind::unknownName, start, std::move(sentence));
   fault_.nearest = nearest;
 }
 
@@ -239,7 +246,11 @@ bool Parser::parseId(Step& step)
   const std::string_view whole = text_.substr(start, at_ - start);
   const auto [end, error] = std::from_chars(digits.data(), digits.data() + digits.size(), step.only);
   const bool isId = error == std::errc() && end == whole.data() + whole.size();
-  return isId || fail(start, quoted(whole) + " is no id; they go from 0 to 65535");
+  if (!isId)
+  {
+    return fail(start, {quoted(whole), " is no id; they go from 0 to 65535"});
+  }
+  return true;
 }
 
 bool Parser::parseTest(Step& step)
@@ -263,11 +274,11 @@ bool Parser::parseTest(Step& step)
   passBlanks();
   if (peek() == '(')
   {
-    return fail(start, "no function " + quoted(name) + " leads to nodes");
+    return fail(start, {"no function ", quoted(name), " leads to nodes"});
   }
   if (name.find_first_not_of('*') == std::string_view::npos)
   {
-    return fail(start, quoted(name) + " is no pattern; * is any element, ** any number of levels");
+    return fail(start, {quoted(name), " is no pattern; * is any element, ** any number of levels"});
   }
   const std::vector<uint16_t> ids =
       name.find('*') == std::string_view::npos ? idsNamed(name, own_) : idsLike(name, own_);

@@ -4,6 +4,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <initializer_list>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -82,11 +83,18 @@ protected:
 
   // Faults: the first is told; that it is no path at all goes before a name that no element has.
 
-  [[gnu::noinline, gnu::cold]] bool fail(size_t at, std::string sentence)
+  /// A sentence in pieces.
+  [[gnu::noinline, gnu::cold]] bool fail(size_t at, std::initializer_list<std::string_view> pieces)
   {
+    std::string sentence;
+    for (const std::string_view piece : pieces)
+    {
+      sentence += piece;
+    }
     tell(PathFault::Kind::malformed, at, std::move(sentence));
     return false;
   }
+  [[gnu::noinline, gnu::cold]] bool fail(size_t at, std::string_view sentence) { return fail(at, {sentence}); }
   [[gnu::noinline, gnu::cold]] void tell(PathFault::Kind kind, size_t at, std::string sentence)
   {
     size_t column = 1;
@@ -109,12 +117,15 @@ protected:
     {
       ++end;
     }
-    return fail(at_, "'" + std::string(text_.substr(at_, end - at_)) + "' does not belong here");
+    return fail(at_, {"'", text_.substr(at_, end - at_), "' does not belong here"});
   }
   static std::string quoted(std::string_view text)
   {
     constexpr size_t most = 80;
-    return "'" + std::string(text.substr(0, most)) + (text.size() > most ? "..." : "") + "'";
+    std::string quoted = "'";
+    quoted += text.substr(0, most);
+    quoted += text.size() > most ? "...'" : "'";
+    return quoted;
   }
 
   std::string_view text_;

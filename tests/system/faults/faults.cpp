@@ -59,6 +59,7 @@ const Scenario kScenarios[] = {
     {"ResetHandle", resetHandle},
     {"ReadFile", faults::readFile},
     {"ReadMemory", readMemory},
+    {"FollowPaths", faults::followPaths},
 };
 
 /// What a step answers to a fault where that is not the code of the call that failed. Each of them is met: a row that

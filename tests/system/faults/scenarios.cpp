@@ -2,6 +2,7 @@
 
 #include <array>
 #include <cstring>
+#include <filesystem>
 #include <fstream>
 #include <iterator>
 #include <memory>
@@ -388,6 +389,26 @@ std::string readMemory(Steps& steps, const std::string& path)
   TAVSSMemory memory(block.data(), block.size());
   OpenedHandle handle(steps, memory, TAV_OPT_READ);
   return Findings(steps, handle.get()).everything();
+}
+
+std::string followPaths(Steps& steps, const std::string& path)
+{
+  const std::string folder = path + ".folder of a name that is longer than a small string is";
+  const std::string file = folder + "/and a file in it whose name is no shorter than its folder's";
+  std::filesystem::create_directory(folder);
+  std::ofstream(file) << "x";
+  std::array<char, 4096> target{};
+  uint64_t nameAt = 0;
+  steps.call("follow", [&] { return korFollowLinks(file.c_str(), target.data(), target.size(), &nameAt); });
+  std::string names;
+  names.reserve(4096);
+  const auto take = [](const char* name, void* all) { static_cast<std::string*>(all)->append(name).append("\n"); };
+  steps.call("list", [&] {
+    names.clear();
+    return korListFolder(folder.c_str(), take, &names);
+  });
+  steps.call("remove", [&] { return korRemoveFile(file.c_str()); });
+  return std::string(target.data() + nameAt) + '\n' + names + (std::filesystem::exists(file) ? "still there" : "gone");
 }
 
 } // namespace faults

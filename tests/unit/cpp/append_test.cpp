@@ -482,6 +482,36 @@ TEST_P(LayerAppend, RefusesASizeThatIsWrongInTheMiddleInsteadOfDroppingWhatIsBeh
   EXPECT_EQ(contentOf(file_.path), bytes);
 }
 
+TEST(LayerAppendTo, AFileWhoseLastRootCannotBeGoneOnWithIsRefusedAndStaysAsItIs)
+{
+  constexpr uint64_t huge = uint64_t{1} << 30U;
+  constexpr size_t tooMuch = (size_t{16} << 20U) + 1;
+  ByteRows open;
+  open.h64(TAV_SIZE_UNKNOWN, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_SYSTEM);
+  ByteRows larger(open); // than the group that it is in
+  larger.h64(40, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_HOST).h64(60, 0, TAV_TYPE_BINARY, TAV_ELM_CMN_HOST_NAME).fill(7, 9);
+  ByteRows cut(open); // of which more is there than a killed writer leaves
+  cut.h64(huge, 0, TAV_TYPE_BINARY, TAV_ELM_CMN_HOST_NAME).fill(tooMuch, 9);
+  ByteRows deep(open);
+  for (int i = 0; i < 4001; ++i)
+  {
+    deep.h64(TAV_SIZE_UNKNOWN, 0, TAV_TYPE_HEADER64, TAV_ELM_CMN_HOST);
+  }
+  deep.h64(4, 0, TAV_TYPE_UINT32, TAV_ELM_CMN_CPU_ONLINE).number(7, 4);
+  const std::vector<std::pair<Bytes, const char*>> files = {{larger.bytes, "no node of its group"},
+                                                            {cut.bytes, "too large to be dropped"},
+                                                            {deep.bytes, "more open groups than can be"}};
+  for (const auto& [bytes, sentence] : files)
+  {
+    const TemporaryPath file;
+    store(file.path, bytes);
+    const auto append = [&] { tav::Writer writer(file.path, kAppend); };
+    EXPECT_EQ(thrownBy(append), TAV_RC_OUTSIDE_PARENT) << sentence;
+    EXPECT_THAT(messageOf(append), testing::HasSubstr(sentence));
+    EXPECT_TRUE(contentOf(file.path) == bytes) << sentence;
+  }
+}
+
 TEST(LayerAppendTo, AFileThatIsNoStreamIsRefusedAndStaysAsItIs)
 {
   const TemporaryPath file;

@@ -298,3 +298,39 @@ TEST_F(LayerPath, EveryTagIsFoundByItsText)
     EXPECT_EQ(reached(root, entry.tag), reachedCompiled(root, std::string(entry.tag))) << entry.tag;
   }
 }
+
+TEST(LayerPathOf, ANodeThatNoWalkComesToBeginsAtIt)
+{
+  // A group with a name and a number, written within the bytes of an element.
+  tav::Writer inner;
+  {
+    tav::Group host = inner.group(TAV_ELM_CMN_HOST);
+    host.add(TAV_ELM_CMN_HOST_NAME, "a");
+    host.add(TAV_ELM_CMN_CPU_ONLINE, uint32_t{7});
+  }
+  inner.finish();
+  tav::Writer writer;
+  uint64_t place = 0;
+  {
+    tav::Group system = writer.group(TAV_ELM_CMN_SYSTEM);
+    system.add(TAV_ELM_CMN_OS_NAME, "b");
+    place = system.addRaw(TAV_TYPE_BINARY, TAV_ELM_CMN_HOST_NAME, inner.bytes()).offset() + 16;
+  }
+  writer.finish();
+  const tav::Reader reader(writer.bytes());
+  const tav::Node host = reader.at(place);
+  const auto text = [&](const char* path) {
+    const auto found = host.path(path);
+    return !found                             ? "nothing"
+           : found->isGroup()                 ? std::to_string(found->elm())
+           : found->type() == TAV_TYPE_UINT32 ? std::to_string(found->as<uint32_t>())
+                                              : found->as<std::string>();
+  };
+  EXPECT_EQ(host.elm(), TAV_ELM_CMN_HOST);
+  EXPECT_EQ(text("hostName"), "a");
+  EXPECT_EQ(text("cpuOnline[../hostName='a']"), "7");
+  EXPECT_EQ(text(".."), "nothing");
+  EXPECT_EQ(text("../osName"), "nothing");
+  EXPECT_EQ(text("/system"), std::to_string(TAV_ELM_CMN_SYSTEM));
+  EXPECT_EQ(text("/system/osName"), "b");
+}

@@ -1,5 +1,6 @@
 #include "dictionary/dictionary.h"
 
+#include <span>
 #include <string>
 #include <string_view>
 #include <tuple>
@@ -188,6 +189,21 @@ TEST(SparseRange, FindsAllEntriesOfTheTableBySearchToo)
       ASSERT_EQ(findInRange(sparse, wanted), findInRange(elementDirectory()[i], wanted)) << id;
     }
   }
+}
+
+TEST(PlacesOfATag, AreThoseOfTheTagWithoutTheBlanksAroundIt)
+{
+  const auto places = [](std::string_view tag) {
+    const std::span<const uint16_t> found = placesTagged(tag);
+    return std::vector<uint16_t>(found.begin(), found.end());
+  };
+  for (const char* const tag : {"host", "eff_stmt_text", "no such tag"})
+  {
+    const std::string text(tag);
+    EXPECT_EQ(places("  " + text + " "), places(text)) << tag;
+  }
+  EXPECT_EQ(places("   "), places(""));
+  EXPECT_FALSE(places("eff_stmt_text").empty());
 }
 
 } // namespace

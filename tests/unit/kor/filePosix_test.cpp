@@ -2,6 +2,7 @@
 #include "kor/testFiles.h"
 #include "tav/kor.h"
 
+#include <array>
 #include <atomic>
 #include <csignal>
 #include <cstring>
@@ -200,6 +201,41 @@ TEST(FilePosix, AFailingCloseIsReportedAndTheFileIsClosed)
   EXPECT_EQ(file.close(), KOR_RC_NOT_OPEN);
   EXPECT_EQ(file.getSize(&size), KOR_RC_NOT_OPEN);
   EXPECT_EQ(openFile(file, folder / "a", KOR_FILE_READ), TAV_RC_OK);
+}
+
+TEST(FilePosix, ThatWasClosedBehindItsBackFailsWithItsCode)
+{
+  const TestFolder folder;
+  touch(folder / "b");
+  KORHFile other;
+  ASSERT_EQ(openFile(other, folder / "b", KOR_FILE_WRITE), TAV_RC_OK);
+  KORHFile file;
+  ASSERT_EQ(openFile(file, folder / "a", KOR_FILE_WRITE | KOR_FILE_CREATE | KOR_FILE_READ), TAV_RC_OK);
+  const int descriptor = descriptorOf(folder / "a");
+  ASSERT_GE(descriptor, 0);
+  ::close(descriptor);
+  uint64_t found = 0;
+  EXPECT_EQ(other.copyRights(file), KOR_RC_NOT_OPEN);
+  EXPECT_EQ(file.findData(7, &found), TAV_RC_OK); // the system does not tell
+  EXPECT_EQ(found, 7U);
+  EXPECT_FALSE(file.isAt((folder / "a").c_str()));
+  KORFileMapping mapping;
+  EXPECT_EQ(mapping.map(file), KOR_RC_NOT_OPEN);
+  EXPECT_EQ(file.close(), KOR_RC_NOT_OPEN);
+}
+
+TEST(FilePosix, IsNotFoundFromAFolderThatIsGone)
+{
+  const TestFolder folder;
+  const uint32_t code = inChild([&] {
+    std::filesystem::create_directory(folder / "gone");
+    std::filesystem::current_path(folder / "gone");
+    std::filesystem::remove(folder / "gone");
+    std::array<char, 4096> target{};
+    uint64_t nameAt = 0;
+    return korFollowLinks("a", target.data(), target.size(), &nameAt);
+  });
+  EXPECT_EQ(code, KOR_RC_NO_SUCH_FILE);
 }
 
 TEST(FilePosix, MoreOpenFilesThanAllowedAreRefused)

@@ -125,6 +125,9 @@ TEST(FilePath, NeedsItsArguments)
   EXPECT_EQ(korFollowLinks("x", nullptr, text.size(), &nameAt), TAV_RC_BAD_PARAM);
   EXPECT_EQ(korFollowLinks("x", text.data(), text.size(), nullptr), TAV_RC_BAD_PARAM);
   EXPECT_EQ(korRemoveFile(nullptr), TAV_RC_BAD_PARAM);
+  const auto visit = [](const char*, void*) {};
+  EXPECT_EQ(korListFolder(nullptr, visit, nullptr), TAV_RC_BAD_PARAM);
+  EXPECT_EQ(korListFolder(".", nullptr, nullptr), TAV_RC_BAD_PARAM);
 }
 
 TEST(FilePath, IsRemovedWithItsFile)
