@@ -208,6 +208,7 @@ std::vector<Row> rowsInParts(ByteSource& source, const Form& form, uint64_t targ
     NodeReader reader(source, parts[i], {.onDamage = OnDamage::skip});
     found[i] = rowsOf(reader, 3);
     ends[i] = found[i].end;
+    EXPECT_EQ(found[i].open.size(), ends[i].behind.around.size());
   };
   for (size_t i = 0; i < parts.size(); ++i)
   {
