@@ -14,4 +14,5 @@ trap 'rm -rf "$work" python/*.egg-info' EXIT
 rm -rf python/*.egg-info # a list of files in it would be taken for this one
 /usr/bin/python3 -m build --no-isolation --sdist -o "$out" python
 tar -xzf "$out"/tav-*.tar.gz -C "$work" --strip-components 1
+chmod -R u=rwX,go=rX "$work" # the wheel keeps rights, which are those of a checkout
 (cd "$work" && /usr/bin/python3 -m build --no-isolation --wheel -o "$out" .)
