@@ -54,7 +54,7 @@ fi
 (cd "$second" && umask 077 &&
   "${plainly[@]}" CCACHE_BASEDIR="$second" TZ=Asia/Kolkata LC_ALL=POSIX HOME="$elsewhere" "${later[@]}" packaging/build.sh "$kept/second" "$@")
 
-status=0
+different=()
 count=0
 for file in "$kept"/first/*; do
   name=$(basename "$file")
@@ -62,7 +62,7 @@ for file in "$kept"/first/*; do
   if cmp -s "$file" "$kept/second/$name"; then
     echo "same bytes: $name"
   else
-    status=1
+    different+=("$name")
     echo "DIFFERENT: $name"
     if [[ -e $kept/second/$name ]] && command -v diffoscope >/dev/null; then
       diffoscope --max-report-size 20000 "$file" "$kept/second/$name" || true
@@ -70,7 +70,7 @@ for file in "$kept"/first/*; do
   fi
 done
 for file in "$kept"/second/*; do
-  [[ -e $kept/first/$(basename "$file") ]] || { echo "only in the second: $(basename "$file")"; status=1; }
+  [[ -e $kept/first/$(basename "$file") ]] || { echo "only in the second: $(basename "$file")"; different+=("$(basename "$file")"); }
 done
 ((count > 0)) || { echo "nothing was built"; exit 1; }
-exit "$status"
+((${#different[@]} == 0)) || { echo "${#different[@]} of $count differ: ${different[*]}"; exit 1; }
