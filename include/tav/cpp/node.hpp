@@ -388,13 +388,14 @@ private:
     return tavGetNextChild(0, state_->handle, &parent_, reference, &data_);
   }
 
-  /// Brings a ring to the sibling of a node; that of an open group is searched through all that is between.
+  /// Brings a ring to the sibling of a node, if its group goes on there; that of an open group is searched through all
+  /// that is between.
   uint32_t goBehind(const TAVHeader& header) const noexcept
   {
     const core::Node node = core::nodeOf(header);
     uint64_t length = 0;
     if (!core::isOpen(node) && core::lengthOf(state_->handle->alignMode == 1, node, length) &&
-        layout::addChecked(length, node.offset()))
+        layout::addChecked(length, node.offset()) && length < core::levelBelow(core::nodeOf(parent_)).end)
     {
       return state_->goTo(length);
     }

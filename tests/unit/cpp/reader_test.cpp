@@ -372,3 +372,25 @@ TEST(LayerNode, NodeOfNoStreamAnswersErrors)
   EXPECT_EQ(givenBy([&](std::error_code& ec) { static_cast<void>(node.copy(ec)); }), TAV_RC_BAD_PARAM);
   EXPECT_FALSE(node.path("host"));
 }
+
+TEST(LayerReader, LeavesItsRingWhereItIsWhenAGroupHasNoMoreNodes)
+{
+  tav::Writer writer;
+  {
+    tav::Group system = writer.group(TAV_ELM_CMN_SYSTEM);
+    system.group(TAV_ELM_CMN_HOST).add(TAV_ELM_CMN_HOST_NAME, std::string(500, 'a'));
+  }
+  writer.finish();
+  constexpr uint64_t page = 8;
+  VectorStorage storage(page, bytesOf(writer.bytes()), VectorStorage::kReadOnly);
+  tav::Reader reader(storage, {.ringBytes = page});
+  const tav::Node root = reader.root();
+  auto children = root.children();
+  auto host = children.begin();
+  ASSERT_EQ(host->elm(), TAV_ELM_CMN_HOST);
+  const TAVHandle* const handle = reader.handle(); // steps are calls from here on
+  const uint64_t before = handle->pCircularBuf->headOffset;
+  EXPECT_EQ(++host, children.end());
+  EXPECT_EQ(handle->pCircularBuf->headOffset, before);
+  EXPECT_EQ(handle->pCircularBuf->empty, 0);
+}
