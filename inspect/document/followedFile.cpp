@@ -1,6 +1,7 @@
 #include "inspect/document/followedFile.h"
 
 #include <algorithm>
+#include <cstddef>
 
 namespace tav::inspect
 {
@@ -21,15 +22,17 @@ uint32_t FollowedFile::getTotalSize(uint64_t* size)
 }
 
 /// Reads a place again when the write that was under way there has ended.
-uint32_t FollowedFile::readAgain(uint64_t from, uint64_t wanted, void** data, uint64_t room, uint64_t* done)
+uint32_t FollowedFile::readAgain(uint64_t from, uint64_t length, uint64_t& done)
 {
-  const auto* const bytes = static_cast<const uint8_t*>(*data);
-  before_.assign(bytes, bytes + *done);
   uint64_t unused = 0;
   static_cast<void>(pFile->findData(from, &unused)); // Linux has it wait for whoever writes to the file
-  position = from;
-  needSeek = 1;
-  return TAVSSFile::read(wanted, data, room, done, false, false);
+  again_.resize(static_cast<size_t>(length));
+  KORFileSeekParam place;
+  place.offset = from;
+  KORFileReadParam param;
+  param.length = length;
+  const uint32_t code = pFile->seek(&place, nullptr);
+  return code == TAV_RC_OK ? pFile->read(&param, again_.data(), &done) : code;
 }
 
 /// What was read before and after the end of a write is no part of one. A writer that does not let go of a place is
@@ -39,23 +42,33 @@ uint32_t FollowedFile::readSettled(uint64_t wanted, void** data, uint64_t room, 
   constexpr int chances = 8;
   constexpr int chancesOfNeeded = 1000;
   const uint64_t from = position;
+  auto* const bytes = static_cast<uint8_t*>(*data);
   uint32_t code = TAVSSFile::read(wanted, data, room, done, false, false);
   for (int i = 0; i < chancesOfNeeded && (code == TAV_RC_OK || code == TAV_RC_END_OF_STORAGE) && *done != 0; ++i)
   {
-    code = readAgain(from, wanted, data, room, done);
-    const auto* const bytes = static_cast<const uint8_t*>(*data);
-    const auto same = static_cast<uint64_t>(
-        std::mismatch(before_.begin(), before_.end(), bytes, bytes + *done).first - before_.begin());
-    if (same == before_.size() && same == *done)
+    uint64_t got = 0;
+    const uint32_t again = readAgain(from, *done, got);
+    if (again != TAV_RC_OK && again != TAV_RC_END_OF_STORAGE)
+    {
+      *done = 0;
+      return again;
+    }
+    const auto end = again_.begin() + static_cast<ptrdiff_t>(got);
+    const auto same = static_cast<uint64_t>(std::mismatch(again_.begin(), end, bytes).first - again_.begin());
+    if (same == *done)
     {
       break;
     }
-    if (i >= chances && from + same >= needed_)
+    const bool isLet = i >= chances && from + same >= needed_;
+    const uint64_t left = isLet ? same : got;
+    std::copy(again_.begin(), end, bytes);
+    code = left < *done ? TAV_RC_END_OF_STORAGE : code;
+    *done = left;
+    position = from + left;
+    needSeek = 1;
+    if (isLet)
     {
-      *done = same;
-      position = from + same;
-      needSeek = 1;
-      return TAV_RC_END_OF_STORAGE;
+      break;
     }
   }
   return code;

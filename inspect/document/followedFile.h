@@ -39,10 +39,10 @@ public:
 
 private:
   uint32_t readSettled(uint64_t wanted, void** data, uint64_t room, uint64_t* done);
-  uint32_t readAgain(uint64_t from, uint64_t wanted, void** data, uint64_t room, uint64_t* done);
+  uint32_t readAgain(uint64_t from, uint64_t length, uint64_t& done);
 
-  std::vector<uint8_t> before_; ///< what the same place held a moment ago
-  uint64_t size_ = 0;           ///< at the last look
+  std::vector<uint8_t> again_; ///< what a place holds a moment later
+  uint64_t size_ = 0;          ///< at the last look
   uint64_t end_ = 0;
   uint64_t needed_ = 0;
   bool isShort_ = false;
