@@ -173,6 +173,8 @@ INSTANTIATE_TEST_SUITE_P(
         Fault{"/system/hostt", 9, "no element is called 'hostt'; did you mean host?", true},
         Fault{"//host[cpuOnlin > 4]", 8, "no element is called 'cpuOnlin'; did you mean cpuOnline?", true},
         Fault{"hots[", 6, "a value or a condition is missing"}, Fault{"qqqq*", 1, "no element is called 'qqqq*'", true},
+        Fault{"host[1=not(2)]", 8, "only values can be compared"}, Fault{"host[@", 7, "the path ends too early"},
+        Fault{"host[hostName \xC2\xA7]", 15, "'\xC2\xA7' does not belong here"},
         Fault{"h\xC3\xB6st/[", 6, "a step is empty"},
         Fault{"/h\xC3\xB6st/\xC3\xA4", 2, "no element is called 'h\xC3\xB6st'; did you mean host?", true}));
 

@@ -1,5 +1,6 @@
 #include <algorithm>
 #include <map>
+#include <memory>
 #include <random>
 #include <span>
 #include <string>
@@ -66,6 +67,20 @@ TEST(LayerIndex, FindsWhatAPathFinds)
                                  "hostName", "*/*", "host[2]/*[2]", "host/hostName/host", "7", "#65001"})
   {
     expectSame(index, root, path);
+  }
+}
+
+TEST(LayerIndex, IsCopiedWithAllThatItHolds)
+{
+  const Bytes bytes = threeHosts();
+  const tav::Reader reader(spanOf(bytes));
+  const tav::Node root = reader.root();
+  auto index = std::make_unique<tav::Index>(root);
+  const tav::Index copy = *index;
+  index.reset();
+  for (const char* const path : {"host", "host[2]/hostName", "//cpuOnline", "host/memFree"})
+  {
+    expectSame(copy, root, path);
   }
 }
 
