@@ -1,6 +1,7 @@
 // read_tav: a row for each node.
 #include <algorithm>
 #include <array>
+#include <exception>
 #include <memory>
 #include <optional>
 #include <string>
@@ -137,7 +138,7 @@ void NodeThread::readPart(const NodeScan& scan, const Task& task)
   }
   catch (...)
   {
-    task.parted->fail();
+    task.parted->fail(std::current_exception());
     throw;
   }
 }

@@ -5,7 +5,6 @@
 #include <utility>
 
 #include "duckdb/src/parts.h"
-#include "tav/inspect/problem.hpp"
 
 namespace tav::sql
 {
@@ -27,11 +26,10 @@ std::optional<PartedFile::Before> PartedFile::settle(size_t number, uint64_t row
                                                      const inspect::PartEnd& end)
 {
   std::unique_lock lock(mutex_);
-  changed_.wait(lock, [&] { return failed_ || ends_.size() == number; });
-  if (failed_)
+  changed_.wait(lock, [&] { return failed_ != nullptr || ends_.size() == number; });
+  if (failed_ != nullptr)
   {
-    throw inspect::Error(
-        inspect::Problem{.file = name, .sentence = "a part of the file before this one cannot be read"});
+    std::rethrow_exception(failed_);
   }
   ends_.push_back(end);
   if (inspect::mendParts(std::span(parts_).first(number + 1), ends_))
@@ -52,10 +50,13 @@ std::optional<PartedFile::Before> PartedFile::settle(size_t number, uint64_t row
   return before;
 }
 
-void PartedFile::fail()
+void PartedFile::fail(std::exception_ptr error)
 {
   const std::lock_guard lock(mutex_);
-  failed_ = true;
+  if (failed_ == nullptr)
+  {
+    failed_ = std::move(error);
+  }
   changed_.notify_all();
 }
 

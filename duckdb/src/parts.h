@@ -3,6 +3,7 @@
 
 #include <condition_variable>
 #include <cstdint>
+#include <exception>
 #include <functional>
 #include <memory>
 #include <mutex>
@@ -42,11 +43,12 @@ public:
 
   /// Waits until all parts before this one count. Then this one does, too, and it is told what was before it; or it
   /// does not begin where the one before ended: then nothing, and it is to be read once more as `part` gives it now.
-  /// Throws Error where one before has failed.
+  /// Where a part has failed, throws what it failed with.
   std::optional<Before> settle(size_t number, uint64_t rows, const std::vector<int64_t>& open,
                                const inspect::PartEnd& end);
-  /// The part cannot be read: those behind it do not wait for it any more.
-  void fail();
+  /// A part cannot be read: those behind it do not wait for it any more, and fail with the same, as the engine tells
+  /// what whichever of them comes first says. What another part has failed with before stays.
+  void fail(std::exception_ptr error);
 
   const std::string name;
 
@@ -56,7 +58,7 @@ private:
   std::vector<inspect::Part> parts_;
   std::vector<inspect::PartEnd> ends_{}; ///< of those that count
   Before behind_{};
-  bool failed_ = false;
+  std::exception_ptr failed_{}; ///< what a part failed with
 };
 
 /// What a thread reads next: a file, or a part of one.

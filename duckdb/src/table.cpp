@@ -1,5 +1,6 @@
 // read_tav_table: a row for each node that a path leads to, columns by paths from there.
 #include <algorithm>
+#include <exception>
 #include <memory>
 #include <optional>
 #include <string>
@@ -258,7 +259,7 @@ void readPart(const TableScan& scan, const Task& task, TableThread& thread)
   }
   catch (...)
   {
-    task.parted->fail();
+    task.parted->fail(std::current_exception());
     throw;
   }
 }
