@@ -88,25 +88,19 @@ private:
   {
     constexpr uint64_t step = 4096;
     std::array<uint8_t, step> piece;
-    for (content_ = bytes_.size(); content_ != 0;)
+    uint32_t rc = TAV_RC_OK;
+    uint64_t got = 0; // up to the last byte that is not zero
+    for (content_ = bytes_.size(); rc == TAV_RC_OK && got == 0 && content_ != 0;)
     {
       const uint64_t length = std::min<uint64_t>(step, content_);
-      uint64_t got = 0;
-      const uint32_t rc = bytes_.read(content_ - length, piece.data(), length, got);
-      if (rc != TAV_RC_OK || got != length)
-      {
-        return rc != TAV_RC_OK ? rc : KOR_RC_IO_ERROR;
-      }
+      rc = bytes_.read(content_ - length, piece.data(), length, got);
+      rc = rc == TAV_RC_OK && got != length ? KOR_RC_IO_ERROR : rc;
       for (; got != 0 && piece[static_cast<size_t>(got - 1)] == 0; --got)
       {
       }
       content_ -= length - got;
-      if (got != 0)
-      {
-        return TAV_RC_OK;
-      }
     }
-    return TAV_RC_OK;
+    return rc;
   }
 
   /// No further root: behind the last one stand zeros, or the first bytes of a header, or something else.

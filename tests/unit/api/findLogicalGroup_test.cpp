@@ -2,6 +2,7 @@
 #include <gtest/gtest.h>
 
 #include "support/failingNew.h"
+#include "support/hostileFamilies.h"
 #include "support/nestedGroups.h"
 #include "support/reading.h"
 #include "support/streams.h"
@@ -421,6 +422,32 @@ TEST(FindLogicalGroupArguments, AreCheckedInTheirOrder)
                                             Failure{probe::findLogicalGroup, 70, TAV_RC_BAD_PARAM}));
   EXPECT_TRUE(out.isUntouched());
   EXPECT_THAT(trace.recordsOf(probe::findElement), IsEmpty());
+}
+
+/// Groups each of whose levels is all that follows: the first child of each is the pair that leads to its sibling.
+class OverlappingLevels : public testing::TestWithParam<Form>
+{
+};
+INSTANTIATE_TEST_SUITE_P(Forms, OverlappingLevels, kForms, kFormName);
+
+TEST_P(OverlappingLevels, AreNotSearchedWithoutBound)
+{
+  HostileRows rows(0x40000, GetParam().swap);
+  rows.open(1000);
+  for (int i = 0; i < 100; ++i)
+  {
+    const uint64_t group = rows.open(10);
+    rows.payloadPair(group);
+  }
+  rows.repeatUpTo(rows.length(), 32, [&rows] { rows.h64(16, 0, TAV_TYPE_BINARY, 7).fill(16, 0x11); });
+  rows.marker();
+  StreamReader reader(rows.bytes, GetParam());
+  TAVHeader parent = headerAt(reader.handle(), 0);
+  const Path path{{0, 10}, {0, 20}};
+  TAVFindLogicalGroupParam param = paramOf(path);
+  Untouched out;
+  EXPECT_EQ(tavFindLogicalGroup(0, reader.handle(), &parent, &param, &out.data), TAV_RC_OUTSIDE_PARENT);
+  EXPECT_TRUE(out.isUntouched());
 }
 
 TEST(FindLogicalGroupDepth, APathOf4000EntriesIsFollowedAndALongerOneRefused)

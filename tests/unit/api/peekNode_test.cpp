@@ -24,6 +24,20 @@ public:
   uint32_t getTotalSize(uint64_t*) override { return TAV_RC_NOT_SUPPORTED; }
 };
 
+/// A storage that has bytes up to the last offset that there is.
+class Endless : public VectorStorage
+{
+public:
+  using VectorStorage::VectorStorage;
+  uint32_t read(uint64_t wanted, void** ppData, uint64_t bufSize, uint64_t* pRead, bool, bool) override
+  {
+    *pRead = std::min({wanted, bufSize, uint64_t{0} - position});
+    std::fill_n(static_cast<uint8_t*>(*ppData), *pRead, uint8_t{0x11});
+    position += *pRead;
+    return TAV_RC_OK;
+  }
+};
+
 /// A ring of two pages of 64 bytes over 1,024 bytes, which caches those from 512 on: at 0 an element of 32 bytes, at 48
 /// one that the ring cannot hold, at 64 one that ends behind the stream, at 80 an open group, and at the very end a
 /// header without its data.
@@ -163,6 +177,17 @@ TEST_F(Peek, WhereTheStorageDoesNotTellItsSizeTheRingIsAsked)
   TAVHeaderData node{};
   EXPECT_EQ(tav::inside::peekNode(*handle.get(), 0, node), TAV_RC_OK);
   EXPECT_TRUE(handle->pCircularBuf->isCached(16));
+}
+
+TEST_F(Peek, BytesBehindTheLastOffsetAreNotThoseOfTheFirst)
+{
+  Endless storage(form.pageBytes, bytes, VectorStorage::kReadOnly);
+  Handle handle(storage, TAV_OPT_READ, form);
+  TAVCBUserArea area{};
+  ASSERT_EQ(handle->pCircularBuf->getChunk(~uint64_t{0} - 63, 64, &area, false, false), TAV_RC_OK);
+  Bytes got(16);
+  EXPECT_EQ(tav::inside::peekBytes(*handle->pCircularBuf, ~uint64_t{0} - 7, got.data(), got.size()),
+            tav::core::kNotHere);
 }
 
 TEST_F(Peek, ANodeThatIsReadIfItIsWholeComesWithItsData)

@@ -126,6 +126,21 @@ TEST_P(Remembered, WithoutMemoryTheAnswerIsTheSame)
   }
 }
 
+TEST_P(Remembered, AWalkEndsAsStepsDoWhereNoNodeIsReadableBehindAPair)
+{
+  bytes.resize(behindOuter);
+  for (int i = 0; i < 3; ++i) // eye catchers, and nodes that go on behind the stream
+  {
+    const Bytes more = ByteRows().h64(0x10000, 0, TAV_TYPE_BINARY, 7).pair(8).bytes;
+    bytes.insert(bytes.end(), more.begin(), more.end());
+  }
+  StreamReader reader(bytes, form);
+  TAVHeaderData out{};
+  ASSERT_EQ(tavGetNextChild(0, reader.handle(), &root, &outer, &out), TAV_RC_NOT_FOUND);
+  EXPECT_EQ(tavValidateHierarchy(0, reader.handle(), &root), TAV_RC_NOT_FOUND);
+  EXPECT_EQ(tavGetNextChild(0, reader.handle(), &root, &outer, &out), TAV_RC_NOT_FOUND);
+}
+
 INSTANTIATE_TEST_SUITE_P(Access, Remembered, testing::Bool(),
                          [](const auto& access) { return access.param ? "Buffered" : "Direct"; });
 

@@ -229,6 +229,17 @@ TEST_P(LayerAppend, ClosesWhatAKilledWriterLeftWhereverItWasCut)
   }
 }
 
+TEST_P(LayerAppend, ClosesTheOnlyRootBeforeTheZerosBehindIt)
+{
+  Bytes bytes = openStream(2);
+  bytes.resize(bytes.size() + 5000);
+  store(file_.path, bytes);
+  tav::Writer writer(file_.path, kAppend, options());
+  put(writer, 100, 1);
+  writer.finish();
+  EXPECT_EQ(numbers(), (Numbers{{0, 1, 77}, {100}}));
+}
+
 TEST_P(LayerAppend, KeepsEachNodeThatIsWhole)
 {
   const Bytes all = openStream(3);

@@ -334,3 +334,62 @@ TEST(LayerPathOf, ANodeThatNoWalkComesToBeginsAtIt)
   EXPECT_EQ(text("/system"), std::to_string(TAV_ELM_CMN_SYSTEM));
   EXPECT_EQ(text("/system/osName"), "b");
 }
+
+namespace
+{
+
+/// Paths with a condition for the third of three hosts, over a file of which a ring holds a page.
+class LayerPathOverFailing : public testing::TestWithParam<const char*>
+{
+protected:
+  LayerPathOverFailing()
+  {
+    tav::Writer writer;
+    {
+      tav::Group system = writer.group(TAV_ELM_CMN_SYSTEM);
+      for (const char* const name : {"b", "c", "d"})
+      {
+        tav::Group host = system.group(TAV_ELM_CMN_HOST);
+        host.add(TAV_ELM_CMN_HOST_NAME, "a");
+        host.add(60105, std::string(3000, 'x')); // on pages of its own
+        host.add(TAV_ELM_CMN_HOST_NAME, name);
+        tav::Group os = host.group(TAV_ELM_CMN_OS);
+        os.add(60105, std::string(3000, 'x'));
+        os.add(TAV_ELM_CMN_OS_NAME, name);
+      }
+    }
+    writer.finish();
+    storage_.bytes = bytesOf(writer.bytes());
+    const tav::Reader reader(writer.bytes());
+    third_ = reader.path("system/host[3]")->offset();
+  }
+
+  VectorStorage storage_{0x1000};
+  uint64_t third_ = 0;
+};
+
+INSTANTIATE_TEST_SUITE_P(Conditions, LayerPathOverFailing,
+                         testing::Values("hostName[last()] = 'd' or os/osName = 'e'",
+                                         "(hostName | os/osName) = 'd'",
+                                         "os/@id or hostName[3] or os/osName = 'd'"),
+                         [](const auto& one) { return std::to_string(one.index); });
+
+} // namespace
+
+TEST_P(LayerPathOverFailing, GiveTheCodeOfTheCallThatFails)
+{
+  const std::string path = std::string("system/host[") + GetParam() + "]";
+  constexpr std::pair<uint32_t, uint64_t> failure{KOR_RC_IO_ERROR, ~uint64_t{0}};
+  uint64_t made = 1;
+  uint64_t nth = 0;
+  for (; nth <= made && !HasFailure(); ++nth)
+  {
+    const tav::Reader reader(storage_, {.ringBytes = 0x1000});
+    const uint64_t before = storage_.calls();
+    storage_.failAt(nth, KOR_RC_IO_ERROR); // 0: none fails
+    const auto answer = reached(reader, path);
+    made = nth == 0 ? storage_.calls() - before : made;
+    EXPECT_EQ(answer, nth == 0 ? std::pair(uint32_t{TAV_RC_OK}, third_) : failure) << nth << " of " << made;
+  }
+  EXPECT_GT(nth, 10U);
+}

@@ -233,6 +233,25 @@ TEST(LayerPrintValue, TypesThatThePlainOperationRefusesArePrinted)
   EXPECT_EQ(printedValue(one, {.bare = true}), "78") << "no room for a code page";
 }
 
+TEST(LayerPrintValue, LongerThanWhatIsHandedOverAtOnceIsWhole)
+{
+  const auto print = [](const std::string& value) {
+    tav::Writer writer;
+    {
+      tav::Group system = writer.group(TAV_ELM_CMN_SYSTEM);
+      system.add(TAV_ELM_CMN_HOST_NAME, value);
+      system.add(TAV_ELM_CMN_CPU_ONLINE, 7U);
+    }
+    writer.finish();
+    const tav::Reader reader(writer.bytes());
+    return printed(reader, {.xml = true}, reader.root());
+  };
+  std::string value;
+  for (unsigned i = 0; i < 50000; ++i) value += std::to_string(i);
+  std::string expected = print("@");
+  EXPECT_EQ(print(value), expected.replace(expected.find('@'), 1, value));
+}
+
 TEST(LayerPrintValue, MomentsAreSecondsMillisecondsAndMicroseconds)
 {
   const std::chrono::sys_seconds leapDay{1709164800s}; // 29 February 2024
