@@ -28,7 +28,7 @@ struct Left
 {
   const char* name;
   tav::Width root;
-  uint32_t filler;    ///< bytes of a last element with a pair in each root: searches look at files piece by piece
+  uint32_t filler;    ///< bytes of the first and the last element of a root: searches look at files piece by piece
   bool leavesOneOpen; ///< behind a root that is whole
   size_t zeros;       ///< at the end
 };
@@ -39,11 +39,15 @@ void prepare(const std::string& path, const Left& left)
   const bool pairs = left.root == tav::Width::bits64;
   tav::Writer writer(tav::StreamOptions{.root = left.root});
   const auto fill = [&](tav::Group& root) {
+    const auto addFiller = [&] {
+      if (left.filler != 0)
+      {
+        root.add(TAV_ELM_CMN_HOST_NAME, std::string(left.filler, 'a'), {.eyeSize = pairs});
+      }
+    };
+    addFiller();
     for (uint32_t i = 0; i < kBefore; ++i) root.add(TAV_ELM_CMN_CPU_ONLINE, i);
-    if (left.filler != 0)
-    {
-      root.add(TAV_ELM_CMN_HOST_NAME, std::string(left.filler, 'a'), {.eyeSize = pairs});
-    }
+    addFiller();
   };
   tav::Group whole = writer.group(TAV_ELM_CMN_SYSTEM, {.eyeSize = pairs});
   fill(whole);

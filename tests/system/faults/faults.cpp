@@ -50,6 +50,9 @@ constexpr Fault kFaults[] = {
     {"SeekFails", Kind::seek, ESPIPE, KOR_RC_NOT_SEEKABLE},
     {"LockRefused", Kind::lock, EWOULDBLOCK, KOR_RC_LOCKED},
     {"CloseFails", Kind::close, EIO, KOR_RC_IO_ERROR},
+    {"SyncFails", Kind::sync, EIO, KOR_RC_IO_ERROR},
+    {"SyncInterrupted", Kind::sync, EINTR, kUnseen},
+    {"SyncIsNotPossible", Kind::sync, EINVAL, kUnseen}, // some file systems have none for folders
 };
 
 const Scenario kScenarios[] = {
@@ -60,6 +63,7 @@ const Scenario kScenarios[] = {
     {"ReadFile", faults::readFile},
     {"ReadMemory", readMemory},
     {"FollowPaths", faults::followPaths},
+    {"AskDevice", askDevice},
 };
 
 /// What a step answers to a fault where that is not the code of the call that failed. Each of them is met: a row that
@@ -103,6 +107,8 @@ constexpr OtherAnswer kOtherAnswers[] = {
     {"index", Kind::seek, TAV_RC_NOT_FOUND},
     // The first node is bounded by the storage's size, which counts as 0 when it is not to be had.
     {"child", Kind::stat, TAV_RC_NO_MORE_CHILDREN},
+    // A folder was only read.
+    {"sync", Kind::close, kUnseen},
     // A destructor has no code.
     {"destroy", Kind::close, kUnseen},
 };

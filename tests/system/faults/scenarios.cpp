@@ -407,8 +407,25 @@ std::string followPaths(Steps& steps, const std::string& path)
     names.clear();
     return korListFolder(folder.c_str(), take, &names);
   });
+  steps.call("sync", [&] { return korSyncFolderOf(file.c_str()); });
   steps.call("remove", [&] { return korRemoveFile(file.c_str()); });
   return std::string(target.data() + nameAt) + '\n' + names + (std::filesystem::exists(file) ? "still there" : "gone");
+}
+
+std::string askDevice(Steps& steps, const std::string& /*path*/)
+{
+  uint64_t size = ~uint64_t{0};
+  steps.call("device", [&] {
+    KORHFile device;
+    KORFileOpenParam param;
+    param.pPath = "/dev/null";
+    param.options = KOR_FILE_READ;
+    uint32_t rc = device.open(&param);
+    rc = rc == TAV_RC_OK ? device.getSize(&size) : rc;
+    const uint32_t closed = device.close();
+    return rc == TAV_RC_OK ? closed : rc;
+  });
+  return std::to_string(size);
 }
 
 } // namespace faults

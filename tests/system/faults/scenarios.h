@@ -31,8 +31,11 @@ std::string readFile(Steps& steps, const std::string& path);
 /// The same on memory.
 std::string readMemory(Steps& steps, const std::string& path);
 
-/// What is done with files by their paths: links are followed, a folder is listed, a file removed.
+/// What is done with files by their paths: links are followed, a folder is listed and made durable, a file removed.
 std::string followPaths(Steps& steps, const std::string& path);
+
+/// The size of a device, which only its end tells.
+std::string askDevice(Steps& steps, const std::string& path);
 
 /// The bytes of a file.
 std::string contentOf(const std::string& path);

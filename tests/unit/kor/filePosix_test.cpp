@@ -227,15 +227,12 @@ TEST(FilePosix, ThatWasClosedBehindItsBackFailsWithItsCode)
 TEST(FilePosix, IsNotFoundFromAFolderThatIsGone)
 {
   const TestFolder folder;
-  const uint32_t code = inChild([&] {
-    std::filesystem::create_directory(folder / "gone");
-    std::filesystem::current_path(folder / "gone");
-    std::filesystem::remove(folder / "gone");
-    std::array<char, 4096> target{};
-    uint64_t nameAt = 0;
-    return korFollowLinks("a", target.data(), target.size(), &nameAt);
-  });
-  EXPECT_EQ(code, KOR_RC_NO_SUCH_FILE);
+  std::filesystem::create_directory(folder / "gone");
+  const WorkingFolder working(folder / "gone");
+  std::filesystem::remove(folder / "gone");
+  std::array<char, 4096> target{};
+  uint64_t nameAt = 0;
+  EXPECT_EQ(korFollowLinks("a", target.data(), target.size(), &nameAt), KOR_RC_NO_SUCH_FILE);
 }
 
 TEST(FilePosix, MoreOpenFilesThanAllowedAreRefused)

@@ -1,7 +1,9 @@
 #include <chrono>
 #include <filesystem>
 #include <fstream>
+#include <memory>
 #include <string>
+#include <sys/resource.h>
 #include <thread>
 
 #include <gtest/gtest.h>
@@ -15,6 +17,24 @@ namespace
 {
 
 using Clock = std::chrono::steady_clock;
+
+/// Lets the process open nothing for as long as it lives.
+class NoDescriptors
+{
+public:
+  NoDescriptors()
+  {
+    EXPECT_EQ(getrlimit(RLIMIT_NOFILE, &before_), 0);
+    const rlimit none = {0, before_.rlim_max};
+    EXPECT_EQ(setrlimit(RLIMIT_NOFILE, &none), 0);
+  }
+  ~NoDescriptors() { EXPECT_EQ(setrlimit(RLIMIT_NOFILE, &before_), 0); }
+  NoDescriptors(const NoDescriptors&) = delete;
+  NoDescriptors& operator=(const NoDescriptors&) = delete;
+
+private:
+  rlimit before_{};
+};
 
 class FileWatch : public testing::Test
 {
@@ -90,5 +110,35 @@ TEST_F(FileWatch, NeedsNoFolder)
   tav::kor::FileWatch watch((folder_ / "none" / "watched").string());
   const auto start = Clock::now();
   watch.wait(20);
+  EXPECT_GE(Clock::now() - start, 20ms);
+}
+
+TEST_F(FileWatch, TakesANameAloneForAFileOfTheWorkingFolder)
+{
+  const WorkingFolder working(folder_);
+  tav::kor::FileWatch watch("watched");
+  append("watched");
+  EXPECT_TRUE(endsEarly(watch));
+}
+
+TEST_F(FileWatch, WaitsItsTimeForAFileOfTheTopFolderThatDoesNotCome)
+{
+  tav::kor::FileWatch watch("/no such file");
+  append("no such file");
+  const auto start = Clock::now();
+  watch.wait(20);
+  EXPECT_GE(Clock::now() - start, 20ms);
+}
+
+TEST_F(FileWatch, SleepsForItsTimeWhereTheSystemHasNoWatchLeft)
+{
+  append("watched");
+  const auto watch = [&] {
+    const NoDescriptors none;
+    return std::make_unique<tav::kor::FileWatch>(path_);
+  }();
+  append("watched");
+  const auto start = Clock::now();
+  watch->wait(20);
   EXPECT_GE(Clock::now() - start, 20ms);
 }

@@ -33,6 +33,27 @@ private:
   std::string path_;
 };
 
+/// Makes a folder the working one for as long as it lives.
+class WorkingFolder
+{
+public:
+  explicit WorkingFolder(const std::filesystem::path& folder)
+      : before_(std::filesystem::current_path())
+  {
+    std::filesystem::current_path(folder);
+  }
+  ~WorkingFolder()
+  {
+    std::error_code ignored;
+    std::filesystem::current_path(before_, ignored);
+  }
+  WorkingFolder(const WorkingFolder&) = delete;
+  WorkingFolder& operator=(const WorkingFolder&) = delete;
+
+private:
+  std::filesystem::path before_;
+};
+
 inline uint32_t openFile(KORHFile& file, const std::string& path, uint64_t options, uint32_t permissions = 0666)
 {
   KORFileOpenParam param;
