@@ -85,7 +85,8 @@ void goOn(Steps& steps, const std::string& path, const Left& left, tav::OpenRoot
   if (!root->isOpen())
   {
     steps.call("group", [&] {
-      root = std::make_unique<tav::Group>(writer->group(TAV_ELM_CMN_SYSTEM, {.eyeSize = left.root == tav::Width::bits64}, ec));
+      const tav::GroupOptions form{.eyeSize = left.root == tav::Width::bits64};
+      root = std::make_unique<tav::Group>(writer->group(TAV_ELM_CMN_SYSTEM, form, ec));
       return done();
     });
   }
