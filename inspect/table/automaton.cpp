@@ -131,12 +131,8 @@ uint32_t Automaton::makeMove(uint32_t state, uint16_t elm, int isRow)
   {
     beginRow(met);
   }
-  // Two routes of a column can lead to the same node.
-  const auto isLess = [](const Target& a, const Target& b) {
-    return a.up != b.up ? a.up < b.up : a.column < b.column;
-  };
+  // Two routes of a column can lead to the same node. They stand side by side: threads are in order, routes by columns.
   const auto isSame = [](const Target& a, const Target& b) { return a.up == b.up && a.column == b.column; };
-  putInOrder(met.targets, isLess);
   met.targets.erase(std::unique(met.targets.begin(), met.targets.end(), isSame), met.targets.end());
   Move move{.elm = elm, .isRow = met.isRow, .targetCount = static_cast<uint32_t>(met.targets.size())};
   if (!met.targets.empty())
