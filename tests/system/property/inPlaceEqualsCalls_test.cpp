@@ -14,6 +14,7 @@
 
 #include "support/damage.h"
 #include "support/environment.h"
+#include "support/layerOptions.h"
 #include "support/randomScript.h"
 #include "support/randomTree.h"
 #include "tav/tav.hpp"
@@ -178,9 +179,7 @@ public:
       : random_(seed), trace_(program, seed), bytes_(std::make_unique<uint8_t[]>(stream.bytes.size()))
   {
     std::memcpy(bytes_.get(), stream.bytes.data(), stream.bytes.size()); // a block that ends with its last byte
-    const tav::StreamOptions options{stream.form.swap ? tav::ByteOrder::swapped : tav::ByteOrder::native,
-                                     stream.form.align, stream.form.root32 ? tav::Width::bits32 : tav::Width::bits64,
-                                     stream.form.ringBytes};
+    const tav::StreamOptions options = layerOptions(stream.form, stream.form.ringBytes);
     std::error_code ec;
     if (stream.form.buffered)
     {

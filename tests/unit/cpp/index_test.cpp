@@ -10,6 +10,7 @@
 
 #include "cpp/layer.h"
 #include "support/damage.h"
+#include "support/layerOptions.h"
 #include "support/randomTree.h"
 
 using namespace test;
@@ -323,9 +324,7 @@ TEST(LayerIndex, FindsEveryNodeOfRandomTrees)
   {
     const Tree tree = randomTree(seed, {.width = 8, .forget = false});
     const Bytes bytes = bytesOfTree(tree);
-    const tav::StreamOptions options{tree.form.swap ? tav::ByteOrder::swapped : tav::ByteOrder::native,
-                                     tree.form.align,
-                                     tree.form.root32 ? tav::Width::bits32 : tav::Width::bits64, 256};
+    const tav::StreamOptions options = layerOptions(tree.form, 256);
     VectorStorage storage(64, bytes, VectorStorage::kReadOnly);
     const tav::Reader reader = seed % 2 == 0 ? tav::Reader(spanOf(bytes), options) : tav::Reader(storage, options);
     const tav::Index index(reader.root());
@@ -356,9 +355,7 @@ TEST(LayerIndex, HoldsWhatComesBeforeDamage)
     Bytes bytes = bytesOfTree(tree);
     Damage damage(bytes, seed);
     seed % 2 == 0 ? damage.flipBits() : damage.setBytes();
-    const tav::Reader reader(spanOf(bytes), {tree.form.swap ? tav::ByteOrder::swapped : tav::ByteOrder::native,
-                                             tree.form.align,
-                                             tree.form.root32 ? tav::Width::bits32 : tav::Width::bits64});
+    const tav::Reader reader(spanOf(bytes), layerOptions(tree.form));
     std::error_code ec;
     const tav::Node root = reader.root(ec);
     if (ec)
@@ -424,9 +421,7 @@ TEST(LayerIndex, IsTheSameWhereverPartsOfItsWalkAreToldToBegin)
     {
       Damage(bytes, seed).flipBits();
     }
-    const tav::Reader reader(spanOf(bytes), {tree.form.swap ? tav::ByteOrder::swapped : tav::ByteOrder::native,
-                                             tree.form.align,
-                                             tree.form.root32 ? tav::Width::bits32 : tav::Width::bits64});
+    const tav::Reader reader(spanOf(bytes), layerOptions(tree.form));
     std::error_code ec;
     const tav::Node root = reader.root(ec);
     if (ec)

@@ -6,6 +6,7 @@
 #include <gmock/gmock.h>
 
 #include "inspect/cHandles.h"
+#include "support/layerOptions.h"
 
 using namespace test;
 using testing::ElementsAre;
@@ -154,10 +155,7 @@ TEST(C, AgreesWithTheLayerOverRandomTrees)
     const bool isLittle = tree.form.swap == test::kBigEndianHost;
     const tav_form form{isLittle ? uint8_t{1} : uint8_t{2}, tree.form.root32 ? uint8_t{32} : uint8_t{64},
                         tree.form.align ? uint8_t{2} : uint8_t{1}};
-    const tav::Reader layer(test::spanOf(bytes), {.byteOrder = tree.form.swap ? tav::ByteOrder::swapped
-                                                                              : tav::ByteOrder::native,
-                                                  .align8 = tree.form.align,
-                                                  .root = tree.form.root32 ? tav::Width::bits32 : tav::Width::bits64});
+    const tav::Reader layer(test::spanOf(bytes), test::layerOptions(tree.form));
     std::vector<tav::Node> expected{layer.root()};
     for (const tav::Node& node : layer.root().descendants())
     {

@@ -9,6 +9,7 @@
 #include <gtest/gtest.h>
 
 #include "inspect/streams.h"
+#include "support/layerOptions.h"
 #include "support/vectorStorage.h"
 
 using tav::inspect::indexOf;
@@ -22,12 +23,6 @@ constexpr unsigned kThreads = 3;
 std::span<const std::byte> spanOf(const Bytes& bytes)
 {
   return std::as_bytes(std::span(bytes));
-}
-
-tav::StreamOptions optionsOf(const test::Form& form)
-{
-  return {form.swap ? tav::ByteOrder::swapped : tav::ByteOrder::native, form.align,
-          form.root32 ? tav::Width::bits32 : tav::Width::bits64};
 }
 
 std::vector<uint64_t> offsetsOf(const tav::Index& index, const std::string& path)
@@ -82,7 +77,7 @@ TEST(IndexOf, IsThatOfOneWalkForRandomTrees)
   for (uint64_t seed = 1; seed <= 60; ++seed)
   {
     const test::Tree tree = test::randomTree(seed, {.depth = 6, .width = 9});
-    expectSameOf(test::bytesOfTree(tree), optionsOf(tree.form), "seed " + std::to_string(seed));
+    expectSameOf(test::bytesOfTree(tree), test::layerOptions(tree.form), "seed " + std::to_string(seed));
   }
 }
 
@@ -91,7 +86,8 @@ TEST(IndexOf, IsThatOfOneWalkUntilDamage)
   for (uint64_t seed = 1; seed <= 120; ++seed)
   {
     const test::Tree tree = test::randomTree(seed, {.depth = 5, .width = 9});
-    expectSameOf(test::damaged(test::bytesOfTree(tree), seed), optionsOf(tree.form), "seed " + std::to_string(seed));
+    expectSameOf(test::damaged(test::bytesOfTree(tree), seed), test::layerOptions(tree.form),
+                 "seed " + std::to_string(seed));
   }
 }
 
@@ -205,7 +201,7 @@ TEST(IndexOf, OfAFileThroughARingIsMadeByOneThread)
 {
   const test::Tree tree = test::randomTree(3, {.depth = 5, .width = 9});
   const Bytes bytes = test::bytesOfTree(tree);
-  tav::StreamOptions options = optionsOf(tree.form);
+  tav::StreamOptions options = test::layerOptions(tree.form);
   options.ringBytes = 256;
   test::VectorStorage storage(64, bytes, test::VectorStorage::kReadOnly);
   const tav::Reader reader(storage, options);
