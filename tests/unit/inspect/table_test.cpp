@@ -418,6 +418,32 @@ TEST(TableAtDamage, HasTheRowsBeforeItAndSaysWhereItIs)
   EXPECT_THAT(passed, ElementsAre(second + 16));
 }
 
+TEST(TableAtDamage, IsWholeWhereNothingIsSoughtInWhatIsDamaged)
+{
+  Bytes bytes = hosts(false, false, false);
+  const size_t inCpu = 16 + 16 + (16 + 3) + (16 + 4) + 16; // what the first host's cpu holds
+  bytes[inCpu + 3] = 0xFF;                                 // its size
+  ByteSource source("x", std::span<const uint8_t>(bytes));
+  for (const bool onlyWalker : {false, true})
+  {
+    const TableQuery query = queryOf("/system/host", {"hostName"});
+    Table rows(query);
+    TableReader reader(source, {}, query, {.onlyWalker = onlyWalker});
+    while (reader.next(rows))
+    {
+    }
+    EXPECT_EQ(rowsOf(rows), (Rows{{"\"ada\""}, {"\"grace\""}, {"-"}}));
+    EXPECT_FALSE(reader.stopped().has_value());
+  }
+  const TableQuery deeper = queryOf("/system/host", {"cpu/cpuOnline"});
+  TableReader reader(source, {}, deeper);
+  Table rows(deeper);
+  while (reader.next(rows))
+  {
+  }
+  EXPECT_TRUE(reader.stopped().has_value());
+}
+
 namespace
 {
 
