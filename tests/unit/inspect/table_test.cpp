@@ -214,6 +214,15 @@ TEST(TableOfValues, KeepsEachOfThem)
   EXPECT_EQ(static_cast<int64_t>(table.cell(0, 4).number), 1714559430127567000);
 }
 
+TEST(TableOfValues, HasTimesAsFarAsNanosecondsReachWithAnyFractions)
+{
+  constexpr uint64_t last = INT64_MAX / 1'000'000'000 - 100; // the two fractions reach a minute farther at most
+  const Table table = columnOf(TAVTimeStamp{last, 65535, 65535, 0, 0}, TAVTimeStamp{last + 1, 0, 0, 0, 0});
+  EXPECT_EQ(table.cell(0, 0).kind, CellKind::time);
+  EXPECT_EQ(table.cell(0, 0).number, (last * 1'000'000 + 65'535'000 + 65'535) * 1000);
+  EXPECT_EQ(table.cell(0, 1).kind, CellKind::text);
+}
+
 namespace
 {
 
