@@ -167,10 +167,16 @@ void Judge::lookAtGroup(Candidate& found, uint64_t limit) const
   {
     found.trust = named ? Trust::followed : Trust::alone;
   }
-  else if (!found.open || (named && (isCutAt(start, wide) || (header.nodeOffset == 0 && !isOdd(header)))))
+  else if (!found.open || (named && (isCutAt(start, wide) || isMovedHeader(header))))
   {
     found.trust = Trust::alone;
   }
+}
+
+/// Whether a header is such as a writer makes of a group of this file: it may have been moved away from what it holds.
+bool Judge::isMovedHeader(const TAVHeader& group) const
+{
+  return !isOdd(group) && (group.nodeOffset == 0 || sizeOf(group) < source_.size());
 }
 
 /// Whether the file may have been cut in the node at a place: its header is cut, or claims more than there is.

@@ -115,6 +115,7 @@ private:
   Belief beliefBehind(uint64_t end, bool wide, uint64_t limit) const;
   static bool isOdd(const TAVHeader& group);
   bool isMovedRoot(const Candidate& found) const;
+  bool isMovedHeader(const TAVHeader& group) const;
   bool isTail(const Candidate& found, uint64_t from) const;
 
   ByteSource& source_;
