@@ -584,6 +584,41 @@ TEST(TableInParts, AreCutOnlyWhereTheRowsBehindFollowFromTheBytesBehind)
   EXPECT_THROW(TableReader(source, queryOf("/system", {"host/hostName"}), parts[1]), Error);
 }
 
+TEST(TableInParts, SayWhereDamageIsWithoutAPathThatTheyCannotKnow)
+{
+  tav::Writer writer;
+  {
+    tav::Group system = writer.group(TAV_ELM_CMN_SYSTEM);
+    for (uint32_t i = 0; i < 100; ++i)
+    {
+      system.group(TAV_ELM_CMN_HOST).add(TAV_ELM_CMN_CPU_ONLINE, i);
+    }
+  }
+  Bytes bytes = bytesOf(writer);
+  const TableQuery query = queryOf("/system/host", {"cpuOnline"});
+  ByteSource sound("x", std::span<const uint8_t>(bytes));
+  const auto parts = planTable(sound, query, {.targetBytes = 500});
+  ASSERT_GT(parts.size(), 2U);
+  const auto inHost = static_cast<size_t>(parts[1].offset) + 16;
+  bytes[inHost + 2] = 0xFF; // a byte of the size
+  ByteSource source("x", std::span<const uint8_t>(bytes));
+  const auto stopped = [&](TableReader reader) {
+    Table rows(query);
+    while (reader.next(rows))
+    {
+    }
+    return reader.stopped();
+  };
+  const auto inPart = stopped(TableReader(source, query, parts[1]));
+  ASSERT_TRUE(inPart.has_value());
+  EXPECT_EQ(inPart->offset, inHost);
+  EXPECT_EQ(inPart->path, "");
+  const auto inWhole = stopped(TableReader(source, {}, query));
+  ASSERT_TRUE(inWhole.has_value());
+  EXPECT_EQ(inWhole->offset, inHost);
+  EXPECT_THAT(inWhole->path, testing::StartsWith("/system/host["));
+}
+
 TEST(TableInParts, IsTheWholeWhenTheyAreAppended)
 {
   Bytes bytes = hosts(false, false, true);
