@@ -633,7 +633,7 @@ TEST(TableInParts, IsTheWholeWhenTheyAreAppended)
   ASSERT_TRUE(query.isDivisible());
   Table parts = readTable(source, {}, query, {.end = one});
   EXPECT_EQ(parts.rows(), 3U);
-  EXPECT_EQ(rowsOf(readTable(source, {}, query, {.end = 1})), rowsOf(parts)) << "a root that begins before is read whole";
+  EXPECT_EQ(rowsOf(readTable(source, {}, query, {.end = 1})), rowsOf(parts)); // a root that begins before is read whole
   parts.append(readTable(source, {}, query, {.start = {.offset = one}}));
   EXPECT_EQ(rowsOf(parts), rowsOf(readTable(source, {}, query)));
   EXPECT_EQ(parts.rows(), 9U);
