@@ -209,6 +209,24 @@ TEST(NodeRows, AreAllThereWhereTheyAreOfOtherSizesThanThoseBefore)
   }
 }
 
+TEST(NodeRows, AreAsManyAsOneAdds)
+{
+  constexpr uint64_t kRows = 20'000;
+  NodeColumns columns;
+  for (uint64_t i = 0; i < kRows; ++i)
+  {
+    columns.add({.offset = 16 * i, .size = i % 7, .elm = TAV_ELM_CMN_HOST}, static_cast<int64_t>(i) - 1);
+  }
+  ASSERT_EQ(columns.count(), kRows);
+  for (uint64_t i = 0; i < kRows; ++i)
+  {
+    ASSERT_EQ(columns.offset[i], 16 * i);
+    ASSERT_EQ(columns.size[i], i % 7);
+    ASSERT_EQ(columns.id[i], TAV_ELM_CMN_HOST);
+    ASSERT_EQ(columns.parent[i], static_cast<int64_t>(i) - 1);
+  }
+}
+
 TEST(NodeRows, HaveTheirValuesInTheColumnOfTheirKind)
 {
   tav::Writer writer;
