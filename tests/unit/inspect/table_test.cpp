@@ -617,6 +617,11 @@ TEST(TableInParts, SayWhereDamageIsWithoutAPathThatTheyCannotKnow)
   ASSERT_TRUE(inWhole.has_value());
   EXPECT_EQ(inWhole->offset, inHost);
   EXPECT_THAT(inWhole->path, testing::StartsWith("/system/host["));
+
+  bytes[16 + 16 + 2] = 0xFF; // what the first host holds
+  const auto inFirst = stopped(TableReader(source, query, parts[0]));
+  ASSERT_TRUE(inFirst.has_value());
+  EXPECT_EQ(inFirst->path, "/system/host");
 }
 
 TEST(TableInParts, IsTheWholeWhenTheyAreAppended)
