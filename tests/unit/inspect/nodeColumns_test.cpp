@@ -215,14 +215,18 @@ TEST(NodeRows, AreAsManyAsOneAdds)
   NodeColumns columns;
   for (uint64_t i = 0; i < kRows; ++i)
   {
-    columns.add({.offset = 16 * i, .size = i % 7, .elm = TAV_ELM_CMN_HOST}, static_cast<int64_t>(i) - 1);
+    const auto key = static_cast<uint16_t>(i % 5);
+    columns.add({.offset = 16 * i, .size = i % 7, .depth = i % 3, .elm = TAV_ELM_CMN_HOST, .key = key},
+                static_cast<int64_t>(i) - 1);
   }
   ASSERT_EQ(columns.count(), kRows);
   for (uint64_t i = 0; i < kRows; ++i)
   {
     ASSERT_EQ(columns.offset[i], 16 * i);
     ASSERT_EQ(columns.size[i], i % 7);
+    ASSERT_EQ(columns.depth[i], i % 3);
     ASSERT_EQ(columns.id[i], TAV_ELM_CMN_HOST);
+    ASSERT_EQ(columns.key[i], i % 5);
     ASSERT_EQ(columns.parent[i], static_cast<int64_t>(i) - 1);
   }
 }
