@@ -9,7 +9,7 @@ work=$(mktemp -d)
 trap 'rm -rf "$work"' EXIT
 # What is built already is taken; else a build without optimisation, which is there sooner.
 folder=build/release options=()
-[[ -x $folder/tools/tav ]] || folder=build/demo options=(-DCMAKE_CXX_FLAGS_RELEASE=-O0 -DTAV_HARDEN=OFF)
+[[ -x $folder/tools/tav ]] || folder=build/demo options=(-DCMAKE_CXX_FLAGS_RELEASE=-O0 -DTAV_HARDEN=OFF -DTAV_PRECOMPILE=ON)
 if ! { cmake --preset release -B "$folder" -DTAV_BUILD_TESTS=OFF "${options[@]}" &&
   cmake --build "$folder" --target snapshot tav_tool; } >"$work/log" 2>&1; then
   cat "$work/log" >&2

@@ -56,3 +56,12 @@ if(TAV_SANITIZE)
   add_compile_options(-fsanitize=${TAV_SANITIZE} -fno-sanitize-recover=all -fno-omit-frame-pointer)
   add_link_options(-fsanitize=${TAV_SANITIZE})
 endif()
+
+# The standard library's headers compiled once, for a build from scratch that is to be there soon.
+option(TAV_PRECOMPILE "Precompile the standard library's headers for inspect and tools" OFF)
+function(tav_precompile target)
+  if(TAV_PRECOMPILE)
+    target_precompile_headers(${target} PRIVATE <algorithm> <array> <charconv> <functional> <map> <memory>
+      <optional> <span> <string> <system_error> <unordered_map> <vector>)
+  endif()
+endfunction()
