@@ -55,6 +55,14 @@ TableQuery queryOf(std::string_view each, const std::vector<std::string>& paths,
   return {each, columns, std::move(joiner)};
 }
 
+/// Reads until nothing is left, or damage stops it.
+void readOut(TableReader& reader, Table& rows, uint64_t atOnce = TableReader::kBatch)
+{
+  while (reader.next(rows, atOnce))
+  {
+  }
+}
+
 Bytes bytesOf(tav::Writer& writer)
 {
   writer.finish();
@@ -295,9 +303,7 @@ void expectSameWays(const Bytes& bytes, const tav::inspect::Form& form, const Ta
                        {.onDamage = onDamage, .onlyWalker = onlyWalker, .passedOver = [&](const PassedOver& passed) {
                           told[onlyWalker ? 1 : 0].push_back(hexOffset(passed.offset) + passed.sentence);
                         }});
-    while (reader.next(table, 3))
-    {
-    }
+    readOut(reader, table, 3);
     rows[onlyWalker ? 1 : 0] = rowsOf(table);
     if (reader.stopped())
     {
@@ -412,9 +418,7 @@ TEST(TableAtDamage, HasTheRowsBeforeItAndSaysWhereItIs)
   const TableQuery query = queryOf("/system/host", {"hostName"});
   Table rows(query);
   TableReader reader(source, {}, query);
-  while (reader.next(rows))
-  {
-  }
+  readOut(reader, rows);
   EXPECT_EQ(rowsOf(rows), (Rows{{"\"ada\""}}));
   ASSERT_TRUE(reader.stopped().has_value());
   EXPECT_EQ(reader.stopped()->offset, second + 16);
@@ -438,18 +442,14 @@ TEST(TableAtDamage, IsWholeWhereNothingIsSoughtInWhatIsDamaged)
     const TableQuery query = queryOf("/system/host", {"hostName"});
     Table rows(query);
     TableReader reader(source, {}, query, {.onlyWalker = onlyWalker});
-    while (reader.next(rows))
-    {
-    }
+    readOut(reader, rows);
     EXPECT_EQ(rowsOf(rows), (Rows{{"\"ada\""}, {"\"grace\""}, {"-"}}));
     EXPECT_FALSE(reader.stopped().has_value());
   }
   const TableQuery deeper = queryOf("/system/host", {"cpu/cpuOnline"});
   TableReader reader(source, {}, deeper);
   Table rows(deeper);
-  while (reader.next(rows))
-  {
-  }
+  readOut(reader, rows);
   EXPECT_TRUE(reader.stopped().has_value());
 }
 
@@ -469,9 +469,7 @@ Rows rowsInParts(ByteSource& source, const TableQuery& query, uint64_t target, O
     {
       Table table(query);
       TableReader reader(source, query, part, {.onDamage = onDamage});
-      while (reader.next(table))
-      {
-      }
+      readOut(reader, table);
       EXPECT_FALSE(reader.stopped().has_value());
       isSure = part.offset == 0 || holdsBehind(behind, part, reader.end());
       if (!isSure)
@@ -604,9 +602,7 @@ TEST(TableInParts, SayWhereDamageIsWithoutAPathThatTheyCannotKnow)
   ByteSource source("x", std::span<const uint8_t>(bytes));
   const auto stopped = [&](TableReader reader) {
     Table rows(query);
-    while (reader.next(rows))
-    {
-    }
+    readOut(reader, rows);
     return reader.stopped();
   };
   const auto inPart = stopped(TableReader(source, query, parts[1]));
