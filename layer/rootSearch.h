@@ -91,10 +91,10 @@ public:
   {
     bool found = false;
     uint32_t rc = look(offset, root, found);
-    // Zeros, and the first bytes of a root behind them, can look like an empty one.
+    // Zeros, and the first bytes of a root behind them, can look like an empty one, or like a large one.
     if (rc != TAV_RC_OK || (found && layout::sizeOf(root) != 0))
     {
-      return rc;
+      return rc != TAV_RC_OK ? rc : unlessBehindZeros(offset, root);
     }
     uint64_t first = offset;
     rc = skipZeros(bytes_, offset, first);
@@ -144,30 +144,63 @@ private:
     return rc;
   }
 
-  /// A root may begin with zeros itself: of those places that its own leave, the last one where a root is that has
-  /// a child, and behind which there is nothing, zeros, or another root. One that ends in the file is preferred.
+  /// A root that begins with zeros may be none, but zeros and the first bytes of one: that is taken where it is likely
+  /// and the other is not.
+  uint32_t unlessBehindZeros(uint64_t offset, TAVHeader& root) noexcept
+  {
+    uint64_t first = offset;
+    bool found = true;
+    uint32_t rc = skipZeros(bytes_, offset, first);
+    rc = rc == TAV_RC_OK && first != offset ? isLikelyInside(root, found) : rc;
+    if (rc != TAV_RC_OK || found)
+    {
+      return rc;
+    }
+    TAVHeader other;
+    rc = likelyAround(offset, first, true, other, found);
+    root = found ? other : root;
+    return rc;
+  }
+
   uint32_t behindZeros(uint64_t from, uint64_t first, TAVHeader& root) noexcept
   {
-    const uint64_t length = form_.wide ? layout::kHeaderSize64 : layout::kHeaderSize32;
-    for (const bool cut : {false, true})
+    bool found = false;
+    uint32_t rc = likelyAround(from, first, true, root, found);
+    rc = rc == TAV_RC_OK && !found ? likelyAround(from, first, false, root, found) : rc;
+    if (rc == TAV_RC_OK && !found)
     {
-      for (uint64_t back = 0; back < length && back <= first - from; ++back)
-      {
-        bool found = false;
-        bool inside = false;
-        uint32_t rc = look(first - back, root, found);
-        rc = rc == TAV_RC_OK && found ? isLikely(root, found) : rc;
-        rc = rc == TAV_RC_OK && found ? endsInside(root, inside) : rc;
-        found = found && inside != cut;
-        if (rc != TAV_RC_OK || found)
-        {
-          return rc;
-        }
-      }
+      root = {};
+      root.nodeOffset = first;
+      rc = TAV_RC_BAD_CHILD_HDR;
     }
-    root = {};
-    root.nodeOffset = first;
-    return TAV_RC_BAD_CHILD_HDR;
+    return rc;
+  }
+
+  /// A root may begin with zeros itself: of those places that its own leave, the last one where a root is that has
+  /// a child, that ends in the file or does not, and behind which there is nothing, zeros, or another root.
+  uint32_t likelyAround(uint64_t from, uint64_t first, bool endsInFile, TAVHeader& root, bool& found) noexcept
+  {
+    const uint64_t length = form_.wide ? layout::kHeaderSize64 : layout::kHeaderSize32;
+    uint32_t rc = TAV_RC_OK;
+    found = false;
+    for (uint64_t back = 0; rc == TAV_RC_OK && !found && back < length && back <= first - from; ++back)
+    {
+      bool inside = false;
+      rc = look(first - back, root, found);
+      rc = rc == TAV_RC_OK && found ? isLikely(root, found) : rc;
+      rc = rc == TAV_RC_OK && found ? endsInside(root, inside) : rc;
+      found = found && inside == endsInFile;
+    }
+    return rc;
+  }
+
+  uint32_t isLikelyInside(const TAVHeader& root, bool& likely) noexcept
+  {
+    bool inside = false;
+    uint32_t rc = endsInside(root, inside);
+    rc = rc == TAV_RC_OK && inside ? isLikely(root, likely) : rc;
+    likely = likely && inside;
+    return rc;
   }
 
   /// Whether a root ends in the file, or is open.

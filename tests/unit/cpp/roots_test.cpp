@@ -1,5 +1,6 @@
 /// The roots of several streams that stand one behind another.
 #include <fstream>
+#include <random>
 
 #include <gmock/gmock.h>
 
@@ -102,7 +103,7 @@ TEST_P(LayerRoots, OfNothingAreNone)
 TEST_P(LayerRoots, FollowEachOtherWithAnyNumberOfZerosBetween)
 {
   const std::vector<size_t> payloads{1, 0, 2, 240, 256, 65536, 131074 - 16, 131074 - 8, 0, 512};
-  for (const size_t zeros : std::initializer_list<size_t>{0, 1, 7, 8, 12, 13, 16, 100, 5000})
+  for (const size_t zeros : std::initializer_list<size_t>{0, 1, 2, 3, 4, 6, 7, 8, 12, 13, 16, 100, 5000})
   {
     SCOPED_TRACE(zeros);
     content_.clear();
@@ -111,6 +112,26 @@ TEST_P(LayerRoots, FollowEachOtherWithAnyNumberOfZerosBetween)
     {
       expected.push_back(content_.size());
       add(stream(payload), zeros);
+    }
+    EXPECT_EQ(offsets(), expected);
+  }
+}
+
+TEST_P(LayerRoots, OfAnySizesFollowEachOtherWithAnyFewZerosBetween)
+{
+  std::mt19937 random(20'261'123);
+  constexpr int kRounds = 60;
+  for (int round = 0; round < kRounds; ++round)
+  {
+    SCOPED_TRACE(round);
+    content_.clear();
+    std::vector<uint64_t> expected;
+    for (int i = 0; i < 4; ++i)
+    {
+      expected.push_back(content_.size());
+      const auto bits = random() % 18;
+      const size_t payload = random() % (size_t{1} << bits);
+      add(stream(payload), random() % 20);
     }
     EXPECT_EQ(offsets(), expected);
   }
