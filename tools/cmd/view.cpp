@@ -151,8 +151,8 @@ private:
     std::error_code error;
     const auto size = std::filesystem::file_size(path, error);
     const auto time = std::filesystem::last_write_time(path, error);
-    const std::string when = std::to_string(time.time_since_epoch().count());
-    return error ? std::string() : '"' + std::to_string(size) + '-' + when + '"';
+    const std::chrono::nanoseconds when = time.time_since_epoch(); // other libraries count in wider types
+    return error ? std::string() : '"' + std::to_string(size) + '-' + std::to_string(when.count()) + '"';
   }
 
   std::string path_;
