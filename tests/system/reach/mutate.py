@@ -169,6 +169,11 @@ def mutants_of(group, source):
             before = code.strip()
 
 
+def is_run(group, source):
+    """Whether a group's test programs run what a source becomes: only those of inspection run that."""
+    return not source.startswith("inspect/") or "inspect_tests" in PROGRAMS[group]
+
+
 def run(command, **more):
     return subprocess.run(command, check=True, stdout=subprocess.PIPE, stderr=subprocess.STDOUT, text=True, **more).stdout
 
@@ -264,7 +269,10 @@ class Builder:
         changed.parent.mkdir(parents=True)
         changed.write_text("\n".join(text))
         made = {}
-        for source in [mutant.source] if mutant.source in self.compiles else self.users[mutant.source]:
+        users = [mutant.source] if mutant.source in self.compiles else self.users.get(mutant.source, [])
+        for source in sorted(users, key=lambda one: not is_run(mutant.group, one)):
+            if made and not is_run(mutant.group, source):
+                break # that there is a change is known, and no test would run this one
             after = self.assembly(source, folder, changed if source == mutant.source else ROOT / source)
             if after is None:
                 return None
