@@ -2,7 +2,7 @@
 # What CI has no time for, and a line in docs/nightly.md for each part that was run: when, of which commit, what, how long,
 # and what came of it. A part that fails does not keep the others from running.
 #   ./nightly.sh MINUTES [PART...]    MINUTES: how much of a part that can go on for ever; parts: all unless some are named
-#     fuzz         every target of fuzz/, in the time together
+#     fuzz         every target of fuzz/, in the time together, which docs/fuzzing.md sums up
 #     hostile      the growth of cost over hostile streams: all sizes and accesses from 90 minutes on, else the shortest
 #     crash        disks as a power failure may leave them, 200 a minute
 #     kill         writers and recorders that are killed, 5 a minute each
@@ -53,7 +53,7 @@ part_fuzz()
   local targets seconds
   targets=$(sed -n 's/^.*|| targets=(\(.*\))$/\1/p' fuzz/run.sh | wc -w)
   seconds=$((minutes * 60 * $(nproc) / targets))
-  fuzz/run.sh "$seconds" | tee "$logs/fuzz.targets"
+  fuzz/run.sh "$seconds" | fuzz/tally.py | tee "$logs/fuzz.targets"
   awk -v seconds="$seconds" '/executions/ { gsub(/[^0-9]/, "", $2); sum += $2; ++targets }
     END { printf "%d targets for %d s each, %d executions, no finding\n", targets, seconds, sum }' "$logs/fuzz.targets"
 }
@@ -162,7 +162,7 @@ say()
 {
   local commit
   commit=$(git rev-parse --short HEAD)
-  [[ -z $(git status --porcelain --untracked-files=no -- . ":!$record") ]] || commit+=" and changes"
+  [[ -z $(git status --porcelain --untracked-files=no -- . ":!$record" ":!docs/fuzzing.md") ]] || commit+=" and changes"
   if [[ ! -s $record ]]; then
     cat >"$record" <<'HEAD'
 # Long runs

@@ -42,7 +42,7 @@ fi
 # fuzz TARGET: runs it from everything that is known for it.
 fuzz()
 {
-  local target=$1 log=$work/$1.log made=$work/corpus/$1 found=$work/findings/$1 kind runs reached
+  local target=$1 log=$work/$1.log made=$work/corpus/$1 found=$work/findings/$1 kind runs reached TIMEFORMAT='%U %S' user system
   [[ $seconds != fixed ]] || rm -rf "$made"
   mkdir -p "$made" "$found"
   local folders=("$made" "$work/seeds/$target")
@@ -53,11 +53,12 @@ fuzz()
   local more=("-max_total_time=$seconds" "-seed=${FUZZ_SEED:-0}")
   [[ $seconds != fixed ]] || more=("-runs=${executions[$target]}" "-seed=${FUZZ_SEED:-1}" -reload=0)
   [[ -f fuzz/$target.dict ]] && more+=("-dict=fuzz/$target.dict")
-  if "${surroundings[@]}" "$build/fuzz/fuzz_$target" -timeout=20 -rss_limit_mb=2048 -max_len=1024 -close_fd_mask=3 \
-    -print_final_stats=1 -artifact_prefix="$found/" "${more[@]}" "${folders[@]}" 2>"$log"; then
+  if { time "${surroundings[@]}" "$build/fuzz/fuzz_$target" -timeout=20 -rss_limit_mb=2048 -max_len=1024 -close_fd_mask=3 \
+    -print_final_stats=1 -artifact_prefix="$found/" "${more[@]}" "${folders[@]}" 2>"$log"; } 2>"$work/$target.time"; then
+    read -r user system <"$work/$target.time"
     runs=$(sed -n 's/^stat::number_of_executed_units: //p' "$log")
     reached=$(grep -oE 'cov: [0-9]+ ft: [0-9]+ corp: [0-9]+/[0-9a-zA-Z]+' "$log" | tail -n 1)
-    echo "$target: ${runs:-?} executions, $reached, no finding"
+    echo "$target: ${runs:-?} executions, $((${user%.*} + ${system%.*})) s, $reached, no finding"
     return 0
   fi
   echo "$target: FOUND, see $log and $found"

@@ -16,6 +16,16 @@ FAILS = """#!/bin/sh
 echo "no such machine"
 false
 """
+FUZZES = """#!/bin/sh
+# ... || targets=(read write)
+echo "read: 1000 executions, 61 s, cov: 10 ft: 20 corp: 5/70b, no finding"
+echo "write: $1, see a file"
+"""
+SUMS = """| target | seconds | executions | edges | features | last run |
+| --- | ---: | ---: | ---: | ---: | --- |
+| read | 7,000 | 200,000 | 11 | 18 | 2026-01-02 |
+| write | 7,000 | 200,000 | 11 | 18 | 2026-01-02 |
+"""
 
 
 @unittest.skipUnless(shutil.which("git"), "a commit needs git")
@@ -61,6 +71,16 @@ class Record(unittest.TestCase):
         self.assertEqual([row[3] for row in rows], ["1", "2"])
         self.assertFalse(rows[0][1].endswith(" and changes"))
         self.assertTrue(rows[1][1].endswith(" and changes"))
+
+    def test_fuzzing_is_summed_up_and_a_finding_begins_a_sum_anew(self):
+        (self.tree / "fuzz").mkdir()
+        shutil.copy(ROOT / "fuzz/tally.py", self.tree / "fuzz")
+        (self.tree / "docs/fuzzing.md").write_text(SUMS)
+        (self.tree / "fuzz/run.sh").write_text(FUZZES.replace("$1", "FOUND"))
+        (self.tree / "fuzz/run.sh").chmod(0o755)
+        self.run_in_tree("./nightly.sh", "1", "fuzz")
+        sums = [line.rsplit("|", 2)[0] for line in (self.tree / "docs/fuzzing.md").read_text().splitlines()[2:]]
+        self.assertEqual(sums, ["| read | 7,061 | 201,000 | 11 | 20 ", "| write | 0 | 0 | 11 | 18 "])
 
     def test_what_is_no_part_is_refused_before_anything_runs(self):
         done = self.run_in_tree("./nightly.sh", "1", "reproduce", "nothing")
