@@ -72,6 +72,9 @@ PROGRAMS = {
     "recover": ["inspect_tests"],
     "columns": ["inspect_tests"],
 }
+# The program whose sources are compiled with the changed header, too, and run first: they use it as programs do that
+# compile it into themselves. Mostly it notices, and the library need not be compiled.
+OWN = {"core": "core_tests"}
 # The tests that a group's programs are run with where all of them take most of a minute: those of its own sources, and
 # of what is built on them as far as they are quick. What others alone would notice counts as unnoticed.
 ONLY = {
@@ -186,16 +189,18 @@ class Builder:
              "-DTAV_BUILD_TESTS=ON", "-DTAV_BUILD_TOOLS=OFF", "-DTAV_BUILD_EXAMPLES=OFF"])
         subprocess.run(["cmake", "--build", BUILD, "--parallel", str(os.cpu_count()), "--target", "tav_internal",
                         *programs], check=True, stdout=subprocess.DEVNULL)
-        self.compiles = self._compiles()
-        self.users = self._users()
+        self.compiles = self._compiles("tav_internal", "_objects")
+        self.users = self._users(self.compiles)
+        self.own = {program: self._compiles(program, program) for program in OWN.values() if program in programs}
+        self.own_users = {program: self._users(compiles) for program, compiles in self.own.items()}
         self.original = {}
         self.links = {program: self._link(program) for program in programs}
 
-    def _compiles(self):
-        """Source to (object, command that writes assembly to its end)."""
+    def _compiles(self, target, folder):
+        """Source to (object, command that writes assembly to its end), of the objects in folders that end so."""
         found = {}
-        for line in run(["ninja", "-C", BUILD, "-t", "commands", "tav_internal"]).splitlines():
-            match = re.search(r"-o (\S+_objects\.dir/\S+\.o) -c (\S+)$", line)
+        for line in run(["ninja", "-C", BUILD, "-t", "commands", target]).splitlines():
+            match = re.search(rf"-o (\S+{folder}\.dir/\S+\.o) -c (\S+)$", line)
             if match:
                 words = [word for word in shlex.split(line[:match.start()]) if not word.startswith("-W")]
                 words = self._without_dependencies(words)
@@ -217,10 +222,11 @@ class Builder:
                 kept.append(word)
         return kept
 
-    def _users(self):
-        """Header to the library's sources that include it."""
+    @staticmethod
+    def _users(compiles):
+        """Header to those of the sources that include it."""
         users = {}
-        objects = {name: source for source, (name, _) in self.compiles.items()}
+        objects = {name: source for source, (name, _) in compiles.items()}
         current = None
         for line in run(["ninja", "-C", BUILD, "-t", "deps"]).splitlines():
             if line and not line.startswith(" "):
@@ -231,20 +237,23 @@ class Builder:
         return users
 
     def _link(self, program):
-        """The command's words, with the library's place at its front; the tests' objects are joined once."""
+        """The command's words, with the library's place at its front; the tests' objects are joined once, but for those
+        that may be compiled anew."""
         line = run(["ninja", "-C", BUILD, "-t", "commands", program]).splitlines()[-1]
         words = [word for word in shlex.split(line) if word not in (":", "&&")]
         ours = set(run(["ar", "t", BUILD / "libtav_internal.a"]).split())
-        objects = [word for word in words if word.endswith(".o") and pathlib.Path(word).name not in ours]
+        anew = {name for name, _ in self.own.get(program, {}).values()}
+        objects = [word for word in words
+                   if word.endswith(".o") and pathlib.Path(word).name not in ours and word not in anew]
         joined = BUILD / f"{program}.joined.o"
         run(["ld", "-r", "-o", joined, *objects], cwd=BUILD)
         at = words.index("-o")
         libraries = [word for word in words[at + 2:] if word != "libtav_internal.a" and not word.endswith(".o")]
         return [words[0], str(joined), *libraries]
 
-    def assembly(self, source, folder, path):
+    @staticmethod
+    def assembly(command, source, folder, path):
         """What a source at `path` becomes; headers in `folder` come first. None when it does not compile."""
-        _, command = self.compiles[source]
         target = folder / (source.replace("/", "_") + ".s")
         search = [f"-I{folder}", f"-I{folder}/include"]
         done = subprocess.run([command[0], *search, *command[1:], "-o", target, path], cwd=BUILD, text=True,
@@ -257,29 +266,53 @@ class Builder:
     def assembly_before(self, source):
         if source not in self.original:
             with tempfile.TemporaryDirectory() as folder:
-                self.original[source] = self.assembly(source, pathlib.Path(folder), ROOT / source)[0]
+                command = self.compiles[source][1]
+                self.original[source] = self.assembly(command, source, pathlib.Path(folder), ROOT / source)[0]
         return self.original[source]
 
-    def objects(self, mutant, folder):
-        """Compiles what a mutant changes: the new objects by those that they replace, none when no instruction changes,
-        None when it does not compile."""
+    @staticmethod
+    def assembled(text_and_target):
+        target = text_and_target[1].with_suffix(".o")
+        run(["as", "-o", target, text_and_target[1]])
+        return target
+
+    @staticmethod
+    def write(mutant, folder):
+        """Writes the changed source, and returns its place."""
         text = (ROOT / mutant.source).read_text().split("\n")
         text[mutant.line - 1] = mutant.after
         changed = folder / mutant.source
         changed.parent.mkdir(parents=True)
         changed.write_text("\n".join(text))
+        return changed
+
+    def own_objects(self, mutant, folder):
+        """The group's own tests with a changed header: their objects by those that they replace, None when one does not
+        compile, which says nothing of the library."""
+        program = OWN.get(mutant.group)
+        made = {}
+        for source in self.own_users[program].get(mutant.source, []) if program else []:
+            name, command = self.own[program][source]
+            after = self.assembly(command, source, folder, ROOT / source)
+            if after is None:
+                return None
+            made[name] = self.assembled(after)
+        return made
+
+    def objects(self, mutant, folder, changed):
+        """Compiles what a mutant changes: the new objects by those that they replace, none when no instruction changes,
+        None when it does not compile."""
         made = {}
         users = [mutant.source] if mutant.source in self.compiles else self.users.get(mutant.source, [])
         for source in sorted(users, key=lambda one: not is_run(mutant.group, one)):
             if made and not is_run(mutant.group, source):
                 break # that there is a change is known, and no test would run this one
-            after = self.assembly(source, folder, changed if source == mutant.source else ROOT / source)
+            name, command = self.compiles[source]
+            after = self.assembly(command, source, folder, changed if source == mutant.source else ROOT / source)
             if after is None:
                 return None
             if after[0] != self.assembly_before(source):
-                target = after[1].with_suffix(".o")
-                run(["as", "-o", target, after[1]])
-                made[self.compiles[source][0]] = target
+                made[name] = self.assembled(after)
         return made
 
     def link(self, program, replaced, folder):
@@ -287,8 +320,8 @@ class Builder:
         same names, so an archive would not do."""
         target = folder / program
         compiler, *rest = self.links[program]
-        library = [replaced.get(name, name) for name, _ in self.compiles.values()]
-        run([compiler, *library, *rest, "-o", target], cwd=BUILD)
+        parts = [*self.own.get(program, {}).values(), *self.compiles.values()]
+        run([compiler, *[replaced.get(name, name) for name, _ in parts], *rest, "-o", target], cwd=BUILD)
         return target
 
 
@@ -343,14 +376,22 @@ def time_limits(builder, groups):
 
 def judge(builder, limits, mutant):
     start = time.monotonic()
+
+    def is_noticed(program, objects):
+        return not passes(builder.link(program, objects, folder), folder, limits[mutant.group, program],
+                          tests_of(mutant.group))
+
     with tempfile.TemporaryDirectory(ignore_cleanup_errors=True) as name:
         folder = pathlib.Path(name)
-        objects = builder.objects(mutant, folder)
+        changed = builder.write(mutant, folder)
+        own = builder.own_objects(mutant, folder)
+        if own and is_noticed(OWN[mutant.group], own):
+            return Verdict(mutant, "killed", OWN[mutant.group], time.monotonic() - start)
+        objects = builder.objects(mutant, folder, changed)
         if not objects:
             return Verdict(mutant, "broken" if objects is None else "same")
         for program in PROGRAMS[mutant.group]:
-            if not passes(builder.link(program, objects, folder), folder, limits[mutant.group, program],
-                          tests_of(mutant.group)):
+            if is_noticed(program, objects):
                 return Verdict(mutant, "killed", program, time.monotonic() - start)
     return Verdict(mutant, "survived", "", time.monotonic() - start)
 

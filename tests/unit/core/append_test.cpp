@@ -104,6 +104,18 @@ TEST_P(FastAppend, LeavesAPayloadThatIsNotWholeToTheOperation)
   expectNotHere<tav::core::AnyForm>(node);
 }
 
+TEST_P(FastAppend, TakesAPayloadThatIsAllThereOrMore)
+{
+  for (const uint64_t more : {0, 1, 100})
+  {
+    Element element = u32(kChild, 7);
+    TAVHeaderData node = element.data();
+    node.dataBufSize += more;
+    EXPECT_EQ(append<tav::core::HostForm>(*writer.handle(), node), TAV_RC_OK);
+    EXPECT_EQ(append<tav::core::AnyForm>(*writer.handle(), node), TAV_RC_OK);
+  }
+}
+
 /// Most callers fill in the header alone: they pay no more than those who give the payload's size, too.
 TEST_P(FastAppend, TakesAPayloadWhoseSizeIsLeftToTheHeader)
 {
