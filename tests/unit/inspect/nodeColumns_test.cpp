@@ -209,6 +209,47 @@ TEST(NodeRows, AreAllThereWhereTheyAreOfOtherSizesThanThoseBefore)
   }
 }
 
+/// Of paths, so much text is handed out at once; what the exact steps have begun then is read by the walker.
+TEST(NodeRows, HaveTheirPathsBehindAsMuchTextAsIsHandedOutAtOnce)
+{
+  constexpr size_t kDeep = 60;
+  constexpr size_t kGroups = 40'000; // and over 500 characters each
+  tav::Writer writer;
+  {
+    std::vector<tav::Group> around;
+    around.push_back(writer.group(TAV_ELM_CMN_SYSTEM));
+    for (size_t i = 1; i < kDeep; ++i)
+    {
+      around.push_back(around.back().group(TAV_ELM_CMN_SYSTEM));
+    }
+    for (size_t i = 0; i < kGroups; ++i)
+    {
+      const tav::Group empty = around.back().group(TAV_ELM_CMN_HOST);
+    }
+    while (!around.empty()) around.pop_back();
+  }
+  writer.finish();
+  const Bytes bytes = test::bytesOf(writer.bytes());
+  const RowsSeen expected = byWalker(bytes, {});
+  ASSERT_GT(expected.rows.back().size() * kGroups, size_t{16} << 20U);
+  const RowsSeen found = byReader(bytes, {}, true, bytes.size());
+  ASSERT_EQ(found.rows.size(), expected.rows.size());
+  ASSERT_TRUE(found.rows == expected.rows) << "their lines are too long to be shown";
+}
+
+TEST(NodeRows, KeepTheMemoryThatTheyPointToUntilTheyAreCleared)
+{
+  const auto memory = std::make_shared<int>(7);
+  NodeColumns columns;
+  columns.keep(memory);
+  columns.keep(memory);
+  EXPECT_EQ(memory.use_count(), 3);
+  columns.cut(0);
+  EXPECT_EQ(memory.use_count(), 3);
+  columns.clear();
+  EXPECT_EQ(memory.use_count(), 1);
+}
+
 TEST(NodeRows, AreAsManyAsOneAdds)
 {
   constexpr uint64_t kRows = 20'000;
