@@ -149,16 +149,31 @@ private:
   uint32_t unlessBehindZeros(uint64_t offset, TAVHeader& root) noexcept
   {
     uint64_t first = offset;
-    bool found = true;
+    bool hasOther = false;
+    bool found = false;
     uint32_t rc = skipZeros(bytes_, offset, first);
-    rc = rc == TAV_RC_OK && first != offset ? isLikelyInside(root, found) : rc;
-    if (rc != TAV_RC_OK || found)
+    rc = rc == TAV_RC_OK ? hasGroup(offset + 1, first, hasOther) : rc;
+    rc = rc == TAV_RC_OK && hasOther ? isLikelyInside(root, found) : rc;
+    if (rc != TAV_RC_OK || found || !hasOther)
     {
       return rc;
     }
     TAVHeader other;
     rc = likelyAround(offset, first, true, other, found);
     root = found ? other : root;
+    return rc;
+  }
+
+  /// Whether a header at one of a few offsets, the last one among them, is a group's. Mostly none is, and then nothing
+  /// but a root's header was read.
+  uint32_t hasGroup(uint64_t from, uint64_t last, bool& found) noexcept
+  {
+    uint32_t rc = TAV_RC_OK;
+    for (uint64_t at = from; rc == TAV_RC_OK && !found && at <= last; ++at)
+    {
+      TAVHeader header;
+      rc = look(at, header, found);
+    }
     return rc;
   }
 

@@ -147,8 +147,7 @@ TEST_F(FastSearch, AsksOfEachWhatVisitSays)
   uint8_t* spot = places.at(kFirst);
   std::vector<uint64_t> seen;
   const auto isOther = [](const NodeFound<true>&) { return true; };
-  const auto visit = [&](const NodeFound<true>& node)
-  {
+  const auto visit = [&](const NodeFound<true>& node) {
     seen.push_back(node.offset());
     return seen.size() < 3;
   };
@@ -253,8 +252,7 @@ TEST_F(Plain, NodesAreNotPassedBehindOneOfAnotherForm)
 
 TEST_F(Plain, NodesAreThoseOfAStreamInHostOrder)
 {
-  const auto passesAny = [&](const Level& one)
-  {
+  const auto passesAny = [&](const Level& one) {
     Node node{};
     const auto pass = [](const BlockLevel& places, uint8_t*& spot) { return passOthers(places, spot, kWanted, true); };
     return PlainNodes(handle_, one).behind(true, node, pass);

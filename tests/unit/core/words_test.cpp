@@ -118,8 +118,7 @@ protected:
   static std::vector<uint8_t> expected(Words... words)
   {
     std::vector<uint8_t> bytes{0xAA};
-    const auto add = [&bytes](auto word)
-    {
+    const auto add = [&bytes](auto word) {
       std::array<uint8_t, sizeof word> own{};
       std::memcpy(own.data(), &word, sizeof word);
       if (GetParam()) std::reverse(own.begin(), own.end());
