@@ -106,7 +106,7 @@ TEST_P(FastAppend, LeavesAPayloadThatIsNotWholeToTheOperation)
 
 TEST_P(FastAppend, TakesAPayloadThatIsAllThereOrMore)
 {
-  for (const uint64_t more : {0, 1, 100})
+  for (const uint64_t more : {0U, 1U, 100U})
   {
     Element element = u32(kChild, 7);
     TAVHeaderData node = element.data();

@@ -34,7 +34,7 @@ TYPED_TEST(Ways, KnowAStreamInHostOrderByItsHandle)
   constexpr uint64_t kDirect = TAV_OPT_DIRECT;
   static_assert(kDirect > 0xFFFF);
   TAVHandle handle{};
-  for (const uint64_t mode : {0, 1, 0x8000, 0xFFFF})
+  for (const uint64_t mode : {0U, 1U, 0x8000U, 0xFFFFU})
   {
     handle.options = mode;
     EXPECT_TRUE(TypeParam::isHostWith(handle, 0)) << mode;
@@ -121,7 +121,10 @@ protected:
     const auto add = [&bytes](auto word) {
       std::array<uint8_t, sizeof word> own{};
       std::memcpy(own.data(), &word, sizeof word);
-      if (GetParam()) std::reverse(own.begin(), own.end());
+      if (GetParam())
+      {
+        std::reverse(own.begin(), own.end());
+      }
       bytes.insert(bytes.end(), own.begin(), own.end());
     };
     (add(words), ...);
