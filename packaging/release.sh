@@ -17,6 +17,7 @@ version=$(cmake/version.sh)
 [[ -z $key ]] || command -v minisign >/dev/null || refuse "nothing can be signed without minisign"
 [[ -z $(git status --porcelain) ]] || refuse "the tree has changes that are in no commit"
 grep -qE "^## \[$version\] - [0-9]{4}-[0-9]{2}-[0-9]{2}$" CHANGELOG.md || refuse "CHANGELOG.md has no dated section for $version"
+! sed -n '/^## \[Unreleased\]$/,/^## \[[0-9]/p' CHANGELOG.md | grep -q '^- ' || refuse "CHANGELOG.md tells of changes that are in no version"
 cmake/check-version.sh >&2 || refuse "the version is not the same everywhere"
 SOURCE_DATE_EPOCH=$(git log -1 --format=%ct)
 export SOURCE_DATE_EPOCH

@@ -59,6 +59,12 @@ class Refusals(unittest.TestCase):
         self.commit()
         self.refused("no dated section")
 
+    def test_changes_that_are_in_no_version(self):
+        (self.tree / "CHANGELOG.md").write_text(
+            f"# Changelog\n\n## [Unreleased]\n\n### Fixed\n\n- One more.\n\n## [{self.version}] - 2026-01-02\n\n- All.\n")
+        self.commit()
+        self.refused("changes that are in no version")
+
     def test_versions_that_differ(self):
         for name in ("packaging/vcpkg/vcpkg.json", f"{RECORDED}/VERSION"):
             with self.subTest(place=name):
