@@ -1,5 +1,7 @@
 /// The fast way of appending and closing, without the operations that follow it: "not here" has stored nothing.
+#include <array>
 #include <string>
+#include <vector>
 
 #include <gtest/gtest.h>
 
@@ -153,6 +155,43 @@ TEST_P(FastAppend, LeavesAGroupForWhichTheStackHasToGrowToTheOperation)
   writer.handle()->pHdrStack->capacity = 1;
   expectNotHere<tav::core::AnyForm>(group64(kChild));
   writer.handle()->pHdrStack->capacity = 1000;
+}
+
+/// Turning a payload in its own place would read what is turned already.
+TEST(Payload, IsApartWhereItTouchesNoByteOfItsPlace)
+{
+  const std::vector<uint8_t> bytes(100);
+  const uint8_t* const to = bytes.data() + 40;
+  constexpr uint64_t kLength = 20;
+  EXPECT_TRUE(tav::core::isApart(bytes.data() + 36, 4, to, kLength));
+  EXPECT_FALSE(tav::core::isApart(bytes.data() + 37, 4, to, kLength));
+  EXPECT_FALSE(tav::core::isApart(bytes.data() + 45, 4, to, kLength));
+  EXPECT_FALSE(tav::core::isApart(bytes.data() + 59, 4, to, kLength));
+  EXPECT_TRUE(tav::core::isApart(bytes.data() + 60, 4, to, kLength));
+}
+
+TEST(Payload, IsTurnedAsItsTypeSays)
+{
+  const std::array<uint8_t, 6> payload{1, 2, 3, 4, 5, 6};
+  std::array<uint8_t, 6> to{};
+  tav::core::encodePayload(TAV_TYPE_UINT32, true, payload.data(), 4, to.data());
+  EXPECT_EQ(to, (std::array<uint8_t, 6>{4, 3, 2, 1, 0, 0}));
+  tav::core::encodePayload(TAV_TYPE_UINT32, false, payload.data(), 6, to.data());
+  EXPECT_EQ(to, payload);
+}
+
+TEST_P(FastAppend, InTheOtherOrderLeavesAPayloadInItsOwnPlaceToTheOperation)
+{
+  writer.handle()->swapBytes = 1;
+  Element element = u32(kChild, 7);
+  TAVHeaderData node = element.data();
+  TAVHandle& handle = *writer.handle();
+  uint8_t* const bytes = GetParam() ? handle.pCircularBuf->pRing : handle.pDirectData;
+  node.pDataBuf = bytes + handle.streamBytes + 17;
+  expectNotHere<tav::core::AnyForm>(node);
+  node.pDataBuf = element.payload.data();
+  EXPECT_EQ(append<tav::core::AnyForm>(handle, node), TAV_RC_OK);
+  writer.handle()->swapBytes = 0;
 }
 
 TEST_P(FastAppend, ClosesNoGroupWithAnEndElement)

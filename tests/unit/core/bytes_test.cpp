@@ -92,6 +92,27 @@ TEST(BlockBytes, AreThoseOfADirectHandle)
   EXPECT_FALSE((RingBytes<AnyForm>::canRead(block.handle))) << "without a ring";
 }
 
+TEST(RingBytes, AreThoseOfABufferedHandleHoweverItWasOpened)
+{
+  StreamWriter writer({.buffered = true});
+  TAVHandle handle = *writer.handle();
+  for (const uint64_t mode : {TAV_OPT_READ, TAV_OPT_WRITE, TAV_OPT_WRITE | TAV_OPT_ROOT32})
+  {
+    handle.options = mode;
+    EXPECT_TRUE((RingOf<HostForm, LibraryWay>::canRead(handle)));
+    EXPECT_TRUE((RingOf<HostForm, PlainWay>::canRead(handle)));
+    EXPECT_TRUE((RingOf<AnyForm, PlainWay>::canWrite(handle)));
+  }
+  handle.options = TAV_OPT_READ | TAV_OPT_DIRECT;
+  EXPECT_FALSE((RingOf<HostForm, LibraryWay>::canRead(handle)));
+  EXPECT_FALSE((RingOf<HostForm, PlainWay>::canRead(handle)));
+  EXPECT_FALSE((RingOf<AnyForm, PlainWay>::canRead(handle)));
+  handle.options = TAV_OPT_READ;
+  handle.swapBytes = 1;
+  EXPECT_FALSE((RingOf<HostForm, PlainWay>::canRead(handle)));
+  EXPECT_TRUE((RingOf<AnyForm, PlainWay>::canRead(handle)));
+}
+
 TEST(BlockBytes, HoldDataOfEveryTypeButGroups)
 {
   EXPECT_FALSE((BlockBytes<HostForm>::hasData<true>(TAV_TYPE_HEADER32)));

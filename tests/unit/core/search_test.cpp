@@ -109,6 +109,12 @@ TEST_F(FastSearch, PassesAGroupOf32BitChildrenToo)
   EXPECT_EQ(passed(false), (Passed{kFirst, kGroup}));
 }
 
+TEST_F(FastSearch, PassesDataOfTheLeastTypeWithoutGroups)
+{
+  put(kFirst + offsetof(TAVHeader64, type), uint16_t{TAV_TYPE_HEADER64 + 1});
+  EXPECT_EQ(passed(false), (Passed{kFirst, kGroup}));
+}
+
 TEST_F(FastSearch, PassesNothingWhereTheFirstIsWanted)
 {
   put(kFirst + offsetof(TAVHeader64, elm), kWanted);
