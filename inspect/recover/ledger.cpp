@@ -38,10 +38,10 @@ void Ledger::lose(uint64_t to, std::string reason)
   damaged_ = true;
 }
 
-void Ledger::keepZeros()
+void Ledger::keepZeros(uint64_t to)
 {
-  totals_.zeros = source_.size() - place_.position();
-  keep(source_.size());
+  totals_.zeros += to - place_.position();
+  keep(to);
 }
 
 void Ledger::leaveUnread()

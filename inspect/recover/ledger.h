@@ -33,8 +33,8 @@ public:
   /// The bytes up to there are lost.
   void lose(uint64_t to, std::string reason);
 
-  /// The rest is zeros behind the stream, which count as kept.
-  void keepZeros();
+  /// The bytes up to there are zeros behind a stream, which count as kept.
+  void keepZeros(uint64_t to);
 
   /// The rest was not searched.
   void leaveUnread();

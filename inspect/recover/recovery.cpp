@@ -38,7 +38,7 @@ bool Recovery::step()
     take(found);
     return true;
   }
-  if (!endByZeros() && !loseStranger(found.header()))
+  if (!endByZeros() && !passZeros() && !loseStranger(found.header()))
   {
     gap();
   }
@@ -236,7 +236,7 @@ void Recovery::takeGroup(const Candidate& found)
   group.fixed = place_.inFile() && !ledger_.isDamaged();
   const uint64_t around = place_.top().limit;
   const bool repaired = found.open || found.end > around;
-  group.claim = !repaired && place_.inFile() && !group.sure && endsTooSoon(found.end) ? found.end : 0;
+  group.claim = !repaired && place_.inFile() && !group.sure && endsTooSoon(header, found.end) ? found.end : 0;
   group.open = repaired || group.claim != 0;
   group.limit = group.open ? around : found.end;
   if (group.sure && found.end > around)
@@ -294,11 +294,14 @@ bool Recovery::loseStranger(const TAVHeader& header)
   return true;
 }
 
-/// Whether there is more than zeros where a root ends by its size, and no other root begins.
-bool Recovery::endsTooSoon(uint64_t end)
+/// Whether there is more than zeros where a root ends by its size, and no other root begins, and what is in it does not
+/// end there.
+bool Recovery::endsTooSoon(const TAVHeader& root, uint64_t end)
 {
   bool gaveUp = false;
-  return end < source_.size() && !judge_.goesOn(end, form_.root64) && !prober_.zerosToEnd(end, gaveUp);
+  const uint64_t start = position() + headerLength(root.hdrType);
+  return end < source_.size() && !judge_.goesOn(end, form_.root64) && !prober_.zerosToEnd(end, gaveUp) &&
+         (start == end || !prober_.isWholeChain(start, hasChildren64(root), end));
 }
 
 bool Recovery::mayEndInZeros() const
@@ -314,7 +317,20 @@ bool Recovery::endByZeros()
   {
     return false;
   }
-  ledger_.keepZeros();
+  ledger_.keepZeros(source_.size());
+  return true;
+}
+
+/// Zeros between a root and the next one, where a page was not full.
+bool Recovery::passZeros()
+{
+  const bool isBetween = place_.inFile() && !ledger_.isDamaged() && position() != 0;
+  const uint64_t end = isBetween ? prober_.behindZeros(position()) : position();
+  if (end == position() || !prober_.rootBegins(end))
+  {
+    return false;
+  }
+  ledger_.keepZeros(end);
   return true;
 }
 
@@ -342,7 +358,10 @@ void Recovery::gap()
   const uint64_t place = found.header().nodeOffset;
   if (place > from)
   {
+    const bool canHideRoot = from == 0 || !place_.inFile() || ledger_.isDamaged() ||
+                             place - from >= (form_.root64 ? kHeaderSize64 : kHeaderSize32);
     ledger_.lose(place, reasonAt(source_, form_, from));
+    ledger_.setDamaged(canHideRoot || !found.isGroup());
   }
   nesting_.closeFinished();
   if (!takeEnd(place, is64(found.header())))

@@ -69,9 +69,10 @@ private:
   void gap();
   uint64_t endOfGap() const;
   void loseGap(uint64_t to);
-  bool endsTooSoon(uint64_t end);
+  bool endsTooSoon(const TAVHeader& root, uint64_t end);
   bool mayEndInZeros() const;
   bool endByZeros();
+  bool passZeros();
 
   ByteSource& source_;
   Form form_;

@@ -6,6 +6,7 @@
 
 #include "inspect/dictionary/builtIn.h"
 #include "inspect/walk/sizeSuits.h"
+#include "tav/inspect/form.hpp"
 
 namespace tav::inspect
 {
@@ -254,32 +255,53 @@ bool Prober::isFollowed(const TAVHeader& node, uint64_t limit) const
          (typeOf(node) == TAV_TYPE_UTF8_STRING && isFollowedAt(end + 2, wide, limit));
 }
 
-bool Prober::isChain(uint64_t offset, bool wide, uint64_t limit, bool toTheEnd) const
+/// Behind a node of a chain: its payload, the two bytes that may stand behind a text, and its pair.
+uint64_t Prober::behindLink(const TAVHeader& node, uint64_t limit) const
 {
-  constexpr int kEnough = 16;
-  for (int i = 0; i < kEnough && offset != limit; ++i)
+  const bool wide = is64(node);
+  const uint64_t start = node.nodeOffset + headerLength(node.hdrType);
+  uint64_t end = start + (isGroup(node) ? sizeOf(node) : std::min(paddedSize(node), limit - start));
+  if (typeOf(node) == TAV_TYPE_UTF8_STRING && limit - end >= 2 && !pairAt(end, limit) &&
+      (end + 2 == limit || pairAt(end + 2, limit) || judge(end + 2, wide, limit) > judge(end, wide, limit)))
+  {
+    end += 2;
+  }
+  return end + (!isGroup(node) && pairAt(end, limit) ? kEyeSizeLength : 0);
+}
+
+Prober::Chain Prober::chain(uint64_t offset, bool wide, uint64_t limit, uint64_t most, Belief least) const
+{
+  Chain found{.end = offset};
+  while (found.nodes < most && found.end != limit)
   {
     TAVHeader node{};
-    if (!header(offset, wide, limit, node) || judgeHeader(node, limit) == Belief::none ||
-        (typeOf(node) == 0 && sizeOf(node) == 0))
+    found.isBroken = !header(found.end, wide, limit, node) || judgeHeader(node, limit) < least ||
+                     (typeOf(node) == 0 && sizeOf(node) == 0);
+    found.isOpen = !found.isBroken && isGroup(node) && isSizeUnknown(node);
+    if (found.isBroken || found.isOpen)
     {
-      return false;
+      return found;
     }
-    const uint64_t start = offset + headerLength(node.hdrType);
-    if (isGroup(node) && isSizeUnknown(node))
-    {
-      return i > 2 || (!toTheEnd && judge(offset, wide, limit) == Belief::followed);
-    }
-    offset = start + (isGroup(node) ? sizeOf(node) : std::min(paddedSize(node), limit - start));
-    if (typeOf(node) == TAV_TYPE_UTF8_STRING && limit - offset >= 2 && !pairAt(offset, limit) &&
-        (offset + 2 == limit || pairAt(offset + 2, limit) ||
-         judge(offset + 2, wide, limit) > judge(offset, wide, limit)))
-    {
-      offset += 2;
-    }
-    offset += !isGroup(node) && pairAt(offset, limit) ? kEyeSizeLength : 0;
+    found.end = behindLink(node, limit);
+    ++found.nodes;
   }
-  return !toTheEnd || offset == limit;
+  return found;
+}
+
+bool Prober::isChain(uint64_t offset, bool wide, uint64_t limit, bool toTheEnd) const
+{
+  constexpr uint64_t kEnough = 16;
+  const Chain found = chain(offset, wide, limit, kEnough, Belief::fits);
+  if (found.isOpen)
+  {
+    return found.nodes > 2 || (!toTheEnd && judge(found.end, wide, limit) == Belief::followed);
+  }
+  return !found.isBroken && (!toTheEnd || found.end == limit);
+}
+
+bool Prober::isWholeChain(uint64_t offset, bool wide, uint64_t limit) const
+{
+  return chain(offset, wide, limit, kNoOffset, Belief::typed).end == limit;
 }
 
 Belief Prober::judge(uint64_t offset, bool wide, uint64_t limit) const
@@ -460,6 +482,46 @@ bool Prober::zerosToEnd(uint64_t offset, bool& gaveUp)
     }
   }
   return true;
+}
+
+uint64_t Prober::behindZeros(uint64_t offset) const
+{
+  // Writers fill up to a page, and the next stream begins behind that.
+  constexpr uint64_t fewest = kHeaderSize64;
+  uint64_t end = offset;
+  for (auto bytes = source_.view(end); !bytes.empty(); bytes = source_.view(end))
+  {
+    const auto other = std::find_if(bytes.begin(), bytes.end(), [](uint8_t byte) { return byte != 0; });
+    end += static_cast<uint64_t>(other - bytes.begin());
+    if (other != bytes.end())
+    {
+      break;
+    }
+    end = source_.zerosUntil(end);
+  }
+  for (uint64_t back = 0; back < fewest && back <= end - offset; ++back)
+  {
+    if (rootBegins(end - back))
+    {
+      end -= back;
+      break;
+    }
+  }
+  return end - offset < fewest ? offset : end;
+}
+
+bool Prober::rootBegins(uint64_t offset) const
+{
+  for (const bool wide : {form_.root64, !form_.root64})
+  {
+    TAVHeader root{};
+    if (header(offset, wide, source_.size(), root) && isGroup(root) &&
+        judge(offset, wide, source_.size()) >= Belief::named)
+    {
+      return true;
+    }
+  }
+  return otherStreamAt(source_, form_, offset).has_value();
 }
 
 uint64_t Prober::zerosStart(uint64_t from)

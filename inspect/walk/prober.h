@@ -64,6 +64,14 @@ public:
   /// suffice to tell.
   bool zerosToEnd(uint64_t offset, bool& gaveUp);
 
+  /// Where zeros end that begin behind a root, in the header of another root perhaps, which can begin with zeros
+  /// itself. The offset itself where there are fewer than a header has: they can be a part of a damaged one.
+  uint64_t behindZeros(uint64_t offset) const;
+
+  /// Whether a root begins at an offset: a group of the dictionary with a header of either width, or a stream of
+  /// another form.
+  bool rootBegins(uint64_t offset) const;
+
   /// Where the zeros begin that the file ends in, `from` at the earliest; the file's end when there are fewer than 8.
   uint64_t zerosStart(uint64_t from);
 
@@ -75,6 +83,9 @@ public:
   /// With `toTheEnd`, only up to the limit will do.
   bool isChain(uint64_t offset, bool wide, uint64_t limit, bool toTheEnd = false) const;
 
+  /// Whether any number of nodes of known types follow one another from `offset` exactly up to the limit.
+  bool isWholeChain(uint64_t offset, bool wide, uint64_t limit) const;
+
   /// Whether the dictionary has an element.
   static bool isNamed(uint16_t elm);
 
@@ -85,6 +96,17 @@ public:
   uint64_t spent() const { return spent_; }
 
 private:
+  /// How far a chain of so many nodes at the most leads, each worth at least so much: to the limit, to an open group or
+  /// to where none is.
+  struct Chain
+  {
+    uint64_t end = 0;
+    uint64_t nodes = 0;
+    bool isBroken = false;
+    bool isOpen = false;
+  };
+  Chain chain(uint64_t offset, bool wide, uint64_t limit, uint64_t most, Belief least) const;
+  uint64_t behindLink(const TAVHeader& node, uint64_t limit) const;
   static bool suits(const TAVHeader& header);
   bool isFollowedAt(uint64_t offset, bool wide, uint64_t limit) const;
   bool restartAt(const uint8_t* bytes, uint64_t offset, bool wide, uint64_t limit);

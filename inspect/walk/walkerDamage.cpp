@@ -56,33 +56,8 @@ bool Walker::endByZeros()
 
 bool Walker::passZeros()
 {
-  // Writers fill up to a page, and the next stream begins behind that. Fewer zeros can be a part of a damaged header.
-  constexpr uint64_t fewest = kHeaderSize64;
-  if (frames_.size() > 1 || position_ == 0)
-  {
-    return false;
-  }
-  uint64_t end = position_;
-  for (auto bytes = source_.view(end); !bytes.empty(); bytes = source_.view(end))
-  {
-    const auto other = std::find_if(bytes.begin(), bytes.end(), [](uint8_t byte) { return byte != 0; });
-    end += static_cast<uint64_t>(other - bytes.begin());
-    if (other != bytes.end())
-    {
-      break;
-    }
-    end = source_.zerosUntil(end);
-  }
-  // A root's header can itself begin with zeros.
-  for (uint64_t back = 0; back < fewest && back <= end - position_; ++back)
-  {
-    if (rootBegins(end - back))
-    {
-      end -= back;
-      break;
-    }
-  }
-  if (end - position_ < fewest)
+  const uint64_t end = frames_.size() == 1 && position_ != 0 ? prober_->behindZeros(position_) : position_;
+  if (end == position_)
   {
     return false;
   }
@@ -90,20 +65,6 @@ bool Walker::passZeros()
   shared_.node = {};
   position_ = end;
   return true;
-}
-
-bool Walker::rootBegins(uint64_t offset)
-{
-  for (const bool wide : {form_.root64, !form_.root64})
-  {
-    TAVHeader root{};
-    if (prober_->header(offset, wide, source_.size(), root) && isGroup(root) &&
-        prober_->judge(offset, wide, source_.size()) >= Belief::named)
-    {
-      return true;
-    }
-  }
-  return otherStreamAt(source_, form_, offset).has_value();
 }
 
 void Walker::damage(uint64_t from, uint32_t code, std::string reason)

@@ -42,7 +42,7 @@ struct RecoveryTotals
   uint64_t kept = 0; ///< of nodes that came back, their paddings, pairs and end elements, and zeros behind the stream
   uint64_t lost = 0;
   uint64_t unread = 0; ///< behind the place where searching was given up
-  uint64_t zeros = 0;  ///< of the kept: behind the stream
+  uint64_t zeros = 0;  ///< of the kept: behind the stream, and between streams
   uint64_t nodes = 0;  ///< that came back, end elements not counted
   uint64_t ends = 0;   ///< end elements that were written
   uint64_t losses = 0; ///< runs of lost bytes

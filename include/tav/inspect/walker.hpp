@@ -187,7 +187,6 @@ private:
   void endByLimit();
   bool endByZeros();
   bool passZeros();
-  bool rootBegins(uint64_t offset);
   void begin(TAVHeader& header);
   void beginGroup(Node& node);
   bool holdsNodes(TAVHeader group, uint64_t limit);

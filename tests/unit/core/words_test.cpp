@@ -10,6 +10,7 @@
 #include "core/word.h"
 #include "support/streams.h"
 #include "tav/core/copySmall.hpp"
+#include "tav/core/fastWay.hpp"
 
 namespace
 {
@@ -81,6 +82,17 @@ void expectCopies()
 TYPED_TEST(Ways, CopyAHeaderFromAnyPlace)
 {
   expectCopies<TypeParam>();
+}
+
+TEST(FastWays, AreOpenToAProgramThatHasNeverTraced)
+{
+  EXPECT_EQ(g_pWTCB, nullptr) << "nothing here has traced";
+  EXPECT_TRUE(tav::core::hasNeverTraced());
+  KORTraceCB* const before = g_pWTCB;
+  KORTraceCB block{};
+  g_pWTCB = &block;
+  EXPECT_FALSE(tav::core::hasNeverTraced());
+  g_pWTCB = before;
 }
 
 TEST(Words, LoadTheFieldsOfAHeader)

@@ -121,7 +121,7 @@ TEST_P(Ledgers, CountZerosAtTheEndAsKeptAndWhatIsNotSearchedAsUnread)
   rows.fill(100);
   Kept zeros(rows.bytes, form);
   zeros.ledger.keep(20);
-  zeros.ledger.keepZeros();
+  zeros.ledger.keepZeros(rows.at());
   EXPECT_EQ(zeros.ledger.totals().zeros, 100U);
   EXPECT_EQ(zeros.ledger.totals().kept, 120U);
   EXPECT_EQ(zeros.it.place.position(), 120U);

@@ -414,6 +414,56 @@ TEST(Recover, BringsASoundStreamBackByteForByte)
   }
 }
 
+/// Where a page was not full, zeros stand between streams; they are no damage, and roots stay roots.
+TEST(Recover, BringsStreamsBackThatZerosPart)
+{
+  for (uint64_t seed = 0; seed < 60; ++seed)
+  {
+    SCOPED_TRACE(seed);
+    const tav::inspect::Form form{.swapped = seed % 2 == 0, .aligned = seed % 4 < 2};
+    Bytes bytes;
+    Bytes streams;
+    uint64_t zeros = 0;
+    for (const size_t gap : {size_t{16}, size_t{100}, 16 + static_cast<size_t>(seed) * 97, size_t{0}})
+    {
+      const Bytes stream = test::namedStream(seed + gap, form.swapped, form.aligned);
+      bytes.insert(bytes.end(), stream.begin(), stream.end());
+      bytes.resize(bytes.size() + gap);
+      streams.insert(streams.end(), stream.begin(), stream.end());
+      zeros += gap;
+    }
+    ByteSource source("x", std::span<const uint8_t>(bytes));
+    test::Made made;
+    const RecoveryTotals totals = recover(source, form, made.file());
+    EXPECT_EQ(totals.kept, bytes.size());
+    EXPECT_EQ(totals.zeros, zeros);
+    EXPECT_EQ(totals.closed + totals.made, 0U);
+    EXPECT_TRUE(made.bytes() == streams);
+  }
+}
+
+/// Fewer bytes than a header has hide no root: what is behind them is one.
+TEST(Recover, BringsStreamsBackThatAFewBytesPart)
+{
+  for (uint64_t seed = 0; seed < 60; ++seed)
+  {
+    SCOPED_TRACE(seed);
+    const Bytes first = test::namedStream(seed);
+    const Bytes second = test::namedStream(seed + 1000);
+    Bytes streams = first;
+    streams.insert(streams.end(), second.begin(), second.end());
+    Bytes bytes = first;
+    bytes.resize(bytes.size() + 1 + seed % 7, 'x');
+    bytes.insert(bytes.end(), second.begin(), second.end());
+    ByteSource source("x", std::span<const uint8_t>(bytes));
+    test::Made made;
+    const RecoveryTotals totals = recover(source, {}, made.file());
+    EXPECT_EQ(totals.lost, 1 + seed % 7);
+    EXPECT_EQ(totals.closed + totals.made, 0U);
+    EXPECT_TRUE(made.bytes() == streams);
+  }
+}
+
 TEST(Recover, AccountsForEveryByteAndLeavesASoundStream)
 {
   const auto structure = [](RuleId id) {
