@@ -122,6 +122,9 @@ const std::vector<Question> kQuestions = {
     {"/system/host/*", {"."}, {{"\"ada\""}, {"8"}, {"-"}, {"\"grace\""}, {"\"\""}}},
     {"/system/host", {"hostName | * | hostName"}, {{"\"ada|8\""}, {"\"grace|\""}, {"-"}}, "|"},
     {"/system", {"../osName", "../../system/osName", "../*[1]", "osName"}, {{"-", "-", "-", "\"os\u00e4\""}}},
+    {"/system",
+     {"../../*[osName]/osName", "../../../system[osName]/osName", "../system[osName]/osName"},
+     {{"-", "-", "-"}}},
     {"/system/host/cpu", {"../../../osName", "../../../../system/osName | cpuOnline"}, {{"-", "-2"}}},
 };
 
