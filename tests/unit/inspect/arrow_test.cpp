@@ -181,6 +181,8 @@ TEST(TableByArrow, HasATypeForEachKindOfColumn)
   EXPECT_THAT(one(most38, tav::Sint128{.high = -2, .low = 1}),
               ElementsAre("d:38,0", std::string(38, '9'), "-36893488147419103231"));
   EXPECT_THAT(one(least39, uint8_t{1}), ElementsAre("u", '1' + std::string(38, '0'), "1"));
+  EXPECT_THAT(one(tav::Uint128{.high = ~uint64_t{0}, .low = ~uint64_t{0}}, uint8_t{1}),
+              ElementsAre("u", "340282366920938463463374607431768211455", "1"));
   constexpr int64_t mostNegative = -0x4B3B4CA85A86C47B;
   EXPECT_THAT(one(tav::Sint128{.high = mostNegative, .low = 0xF675DDC000000001}, uint8_t{1}),
               ElementsAre("d:38,0", '-' + std::string(38, '9'), "1"));

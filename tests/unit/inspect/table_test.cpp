@@ -1,5 +1,6 @@
 #include <algorithm>
 #include <map>
+#include <memory>
 #include <optional>
 #include <random>
 #include <string>
@@ -150,6 +151,10 @@ TEST_P(TableOfAForm, HasTheRowsThatItsPathsLeadTo)
       const Table table = readTable(source, form, queryOf(question.each, question.columns, question.joiner),
                                     {.onlyWalker = onlyWalker});
       EXPECT_EQ(rowsOf(table), question.rows);
+      ByteSource pages("x", std::make_unique<TAVSSMemory>(const_cast<uint8_t*>(bytes.data()), bytes.size()));
+      EXPECT_EQ(rowsOf(readTable(pages, form, queryOf(question.each, question.columns, question.joiner),
+                                 {.onlyWalker = onlyWalker})),
+                question.rows);
     }
   }
 }
