@@ -131,6 +131,15 @@ public:
   }
 
 private:
+  /// How likely it is that a place is a root's, the likeliest first.
+  enum class Likely : uint8_t
+  {
+    endsInFile, ///< or is open
+    isUnnamed,  ///< as before, with the id 0: its id may be the zeros behind a root that begins before it
+    endsBehind, ///< the file is cut off
+    no
+  };
+
   static bool isRoot(const TAVHeader& header) noexcept
   {
     return layout::isGroup(header);
@@ -159,8 +168,9 @@ private:
       return rc;
     }
     TAVHeader other;
-    rc = likelyAround(offset, first, true, other, found);
-    root = found ? other : root;
+    Likely likely = Likely::no;
+    rc = likeliestAround(offset, first, other, likely);
+    root = likely < Likely::endsBehind ? other : root;
     return rc;
   }
 
@@ -179,10 +189,9 @@ private:
 
   uint32_t behindZeros(uint64_t from, uint64_t first, TAVHeader& root) noexcept
   {
-    bool found = false;
-    uint32_t rc = likelyAround(from, first, true, root, found);
-    rc = rc == TAV_RC_OK && !found ? likelyAround(from, first, false, root, found) : rc;
-    if (rc == TAV_RC_OK && !found)
+    Likely likely = Likely::no;
+    uint32_t rc = likeliestAround(from, first, root, likely);
+    if (rc == TAV_RC_OK && likely == Likely::no)
     {
       root = {};
       root.nodeOffset = first;
@@ -191,21 +200,39 @@ private:
     return rc;
   }
 
-  /// A root may begin with zeros itself: of those places that its own leave, the last one where a root is that has
-  /// a child, that ends in the file or does not, and behind which there is nothing, zeros, or another root.
-  uint32_t likelyAround(uint64_t from, uint64_t first, bool endsInFile, TAVHeader& root, bool& found) noexcept
+  /// A root may begin with zeros itself: of those places that its own leave, the likeliest one, and of several the
+  /// last.
+  uint32_t likeliestAround(uint64_t from, uint64_t first, TAVHeader& root, Likely& most) noexcept
   {
     const uint64_t length = form_.wide ? layout::kHeaderSize64 : layout::kHeaderSize32;
     uint32_t rc = TAV_RC_OK;
-    found = false;
-    for (uint64_t back = 0; rc == TAV_RC_OK && !found && back < length && back <= first - from; ++back)
+    most = Likely::no;
+    for (uint64_t back = 0; rc == TAV_RC_OK && most != Likely::endsInFile && back < length && back <= first - from;
+         ++back)
     {
-      bool inside = false;
-      rc = look(first - back, root, found);
-      rc = rc == TAV_RC_OK && found ? isLikely(root, found) : rc;
-      rc = rc == TAV_RC_OK && found ? endsInside(root, inside) : rc;
-      found = found && inside == endsInFile;
+      TAVHeader other;
+      Likely likely = Likely::no;
+      rc = judge(first - back, other, likely);
+      if (rc == TAV_RC_OK && likely < most)
+      {
+        root = other;
+        most = likely;
+      }
     }
+    return rc;
+  }
+
+  uint32_t judge(uint64_t offset, TAVHeader& root, Likely& likely) noexcept
+  {
+    bool found = false;
+    bool inside = false;
+    uint32_t rc = look(offset, root, found);
+    rc = rc == TAV_RC_OK && found ? isLikely(root, found) : rc;
+    rc = rc == TAV_RC_OK && found ? endsInside(root, inside) : rc;
+    likely = !found                     ? Likely::no
+             : !inside                  ? Likely::endsBehind
+             : layout::elmOf(root) == 0 ? Likely::isUnnamed
+                                        : Likely::endsInFile;
     return rc;
   }
 
@@ -229,6 +256,7 @@ private:
     return rc;
   }
 
+  /// Whether a root has a child that fits, and behind it is nothing, zeros, or another root.
   uint32_t isLikely(const TAVHeader& root, bool& likely) noexcept
   {
     const uint32_t rc = hasFittingChild(root, likely);

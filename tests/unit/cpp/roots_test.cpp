@@ -28,10 +28,10 @@ protected:
   }
 
   /// A stream whose root has elements of `payload` bytes in all: sizes with zeros at either end among them.
-  [[nodiscard]] Bytes stream(size_t payload) const
+  [[nodiscard]] Bytes stream(size_t payload, uint16_t elm = TAV_ELM_CMN_SYSTEM) const
   {
     tav::Writer writer(options());
-    tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM);
+    tav::Group root = writer.group(elm);
     if (payload != 0)
     {
       const std::vector<std::byte> bytes(payload);
@@ -66,12 +66,13 @@ protected:
     for (const tav::Node& root : read.roots())
     {
       all.push_back(root.offset());
-      EXPECT_EQ(root.elm(), TAV_ELM_CMN_SYSTEM);
+      EXPECT_EQ(root.elm(), all.size() == 1 ? first_ : TAV_ELM_CMN_SYSTEM);
     }
     return all;
   }
 
   Bytes content_;
+  uint16_t first_ = TAV_ELM_CMN_SYSTEM; ///< the first root's id
   const TemporaryPath file_;
 };
 
@@ -134,6 +135,24 @@ TEST_P(LayerRoots, OfAnySizesFollowEachOtherWithAnyFewZerosBetween)
       add(stream(payload), random() % 20);
     }
     EXPECT_EQ(offsets(), expected);
+  }
+}
+
+/// Ids that are the types of groups: two bytes further on, such a root and the zeros behind it read as an empty group.
+TEST_P(LayerRoots, BeginWhereTheirIdIsNotMadeOfZeros)
+{
+  for (const uint16_t id : {TAV_TYPE_HEADER32, TAV_TYPE_HEADER64})
+  {
+    for (size_t zeros = 0; zeros < 20; ++zeros)
+    {
+      SCOPED_TRACE(zeros);
+      content_.clear();
+      first_ = id;
+      add(stream(0, id), zeros);
+      const uint64_t second = content_.size();
+      add(stream(3));
+      EXPECT_EQ(offsets(), (std::vector<uint64_t>{0, second}));
+    }
   }
 }
 
