@@ -119,7 +119,7 @@ void Checker::placeIsTaken()
 
 void Checker::beginNode()
 {
-  isEndElement(event_.node.elm()) ? ++endElements_ : ++nodes_;
+  isEndNode(event_.node) ? ++endElements_ : ++nodes_;
   placeIsTaken();
   groups_.back().damagedTail = false;
   paddingCut_ = 0;

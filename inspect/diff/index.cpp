@@ -139,7 +139,7 @@ void DiffIndex::add(const Event& event, bool ignore)
     return;
   }
   // End elements say nothing but where a group ends.
-  if (ignore || isEndElement(event.node.elm()))
+  if (ignore || isEndNode(event.node))
   {
     ignoredDepth_ = event.depth;
     return;

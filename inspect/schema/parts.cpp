@@ -136,9 +136,7 @@ void Schema::enter(const Walker::State& state)
   open_.clear();
   for (size_t i = 1; i < state.frames.size(); ++i)
   {
-    const uint16_t elm = state.frames[i].node.elm();
-    const uint32_t around = open_.empty() ? 0 : open_.back();
-    open_.push_back(isCounted(elm) ? childOf(around, elm) : around);
+    open_.push_back(childOf(open_.empty() ? 0 : open_.back(), state.frames[i].node.elm()));
   }
 }
 

@@ -78,24 +78,10 @@ void Schema::add(ByteSource& source, const Form& form, const std::function<void(
 
 void Schema::see(ByteSource& source, const Form& form, const Event& event)
 {
-  if (event.what != What::nodeBegin)
-  {
-    return;
-  }
-  if (isCounted(event.node.elm()))
+  if (event.what == What::nodeBegin && (options_.ends || !isEndNode(event.node)))
   {
     addNode(source, form, event.node);
   }
-  else if (event.node.isGroup()) // what is in it belongs to the group around it
-  {
-    open_.resize(static_cast<size_t>(event.node.depth));
-    open_.push_back(open_.empty() ? 0 : open_.back());
-  }
-}
-
-bool Schema::isCounted(uint16_t elm) const
-{
-  return options_.ends || !layout::isEndElement(elm);
 }
 
 uint32_t Schema::childOf(uint32_t parent, uint16_t elm)

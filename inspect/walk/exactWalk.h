@@ -150,7 +150,8 @@ template<class Bytes>
 typename ExactWalk<Sink>::Way ExactWalk<Sink>::enter(const Bytes& bytes, const core::Node& group,
                                                      const core::Level& level)
 {
-  if (!group.wide() && group.type() == TAV_TYPE_HEADER64)
+  // Behind an element that ends its group, the steps find nothing, even when it is a group itself.
+  if ((!group.wide() && group.type() == TAV_TYPE_HEADER64) || layout::isEndElement(group.elm()))
   {
     return Way::notHere;
   }

@@ -59,7 +59,7 @@ struct Counts
 
 void countNode(const Node& node, Counts& counts)
 {
-  const bool end = layout::isEndElement(node.elm());
+  const bool end = isEndNode(node);
   counts.pairs += node.elm() == TAV_ELM_CMN_END_HDR_EYE_SIZE ? 1 : 0;
   (end ? counts.ends : counts.nodes) += 1;
   if (end)

@@ -204,7 +204,7 @@ void TreePrinter::fold(const Folded& folded)
 /// What only ends a group is shown where it is asked for.
 bool TreePrinter::isLeftOut(const Node& node) const
 {
-  const bool end = layout::isEndElement(node.elm()) && !ends_ && node.offset() != named_;
+  const bool end = isEndNode(node) && !ends_ && node.offset() != named_;
   const bool named = std::find(only_.begin(), only_.end(), node.elm()) != only_.end();
   return only_.empty() ? end : !named;
 }

@@ -120,7 +120,6 @@ private:
 
   void enter(const Walker::State& state);
   void see(ByteSource& source, const Form& form, const Event& event);
-  bool isCounted(uint16_t elm) const;
   void merge(const Schema& part);
   void mergePath(const PathNode& part, PathNode& path) const;
   void mergeTexts(const Texts& part, Texts& texts) const;

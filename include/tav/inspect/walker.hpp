@@ -52,10 +52,17 @@ struct Event
   std::string reason{};      ///< of damaged
 };
 
-/// Whether a piece belongs to an element that only ends a group, which is structure and no content.
+/// Whether a node only ends a group, which is structure and no content. A group does not, whatever its id is: it is
+/// a place that its children's paths lead through.
+inline bool isEndNode(const Node& node)
+{
+  return layout::isEndElement(node.elm()) && !node.isGroup();
+}
+
+/// Whether a piece belongs to a node that only ends a group.
 inline bool isEndPiece(const Event& event)
 {
-  return event.node.header.hdrType != 0 && layout::isEndElement(event.node.elm());
+  return event.node.header.hdrType != 0 && isEndNode(event.node);
 }
 
 /// How a path is written. A text with a whole path for each node grows with the square of the depth.

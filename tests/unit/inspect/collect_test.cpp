@@ -198,3 +198,14 @@ TEST(CollectFound, RefusesWhatIsNoGroupAndWhatIsNotThere)
     EXPECT_EQ(error.trouble(), Trouble::notFound);
   }
 }
+
+TEST(Collect, KeepsAGroupWithTheIdOfAnEndElement)
+{
+  const Bytes bytes = test::streamWithGroupNamedAsAnEnd(1);
+  ByteSource source("x", std::span<const uint8_t>(bytes));
+  test::Made made;
+  Collector collector(made.file(), {});
+  collector.add(source, {});
+  collector.finish();
+  EXPECT_EQ(made.bytes(), bytes);
+}

@@ -126,6 +126,12 @@ TEST(DiffPairs, TwoNodesThatPathsLeadToAreComparedWhateverTheirNames)
   }
 }
 
+TEST(DiffPairs, WhatIsInAGroupWithTheIdOfAnEndElementIsCompared)
+{
+  EXPECT_THAT(linesOf(test::streamWithGroupNamedAsAnEnd(1), test::streamWithGroupNamedAsAnEnd(7)),
+              ElementsAre("! /system/endHdrEyeSize/cpuOnline 1 -> 7"));
+}
+
 TEST(DiffPairs, DamagedBytesAreComparedAsBytes)
 {
   const auto withBytes = [](uint8_t value, uint64_t count) {

@@ -141,6 +141,17 @@ TEST(NodeRows, AreTheNodesOfAWalkOverRandomTrees)
   }
 }
 
+TEST(NodeRows, AreThereForAGroupWithTheIdOfAnEndElement)
+{
+  const Bytes bytes = test::streamWithGroupNamedAsAnEnd(1);
+  const std::vector<std::string> rows = byWalker(bytes, {}).rows;
+  ASSERT_EQ(rows.size(), 4U);
+  EXPECT_THAT(rows[2], testing::StartsWith("1 ")) << "the group's row";
+  EXPECT_THAT(rows[2], testing::EndsWith(" /system/endHdrEyeSize/cpuOnline"));
+  expectEqual(bytes, {});
+  expectEqual(test::damaged(bytes, 3), {});
+}
+
 TEST(NodeRows, AreNamedByTheirOffsetsAmongMoreIdsThanAreCounted)
 {
   tav::Writer writer;

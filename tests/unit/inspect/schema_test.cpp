@@ -77,6 +77,19 @@ TEST_P(SchemaOfAForm, CountsThePathsOfSeveralStreams)
   EXPECT_EQ(schema.paths(), expected.size());
 }
 
+TEST(Schema, HasAPathThroughAGroupWithTheIdOfAnEndElement)
+{
+  Schema schema;
+  add(schema, test::streamWithGroupNamedAsAnEnd(1), {});
+  std::vector<std::string> paths;
+  for (const SchemaEntry& entry : entriesOf(schema))
+  {
+    paths.push_back(entry.path);
+  }
+  EXPECT_THAT(paths, testing::ElementsAre("/system", "/system/endHdrEyeSize", "/system/endHdrEyeSize/cpuOnline",
+                                          "/system/cpuOnline"));
+}
+
 TEST(Schema, ShowsEveryEventToWhoeverWantsToSeeIt)
 {
   const Bytes bytes = test::namedStream(7);

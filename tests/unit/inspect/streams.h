@@ -122,6 +122,24 @@ inline Bytes namedStream(uint64_t seed, bool swap = false, bool align = false)
   return {first, first + bytes.size()};
 }
 
+/// A stream with a group in it that has the id of an element that ends a group.
+inline Bytes streamWithGroupNamedAsAnEnd(uint32_t number)
+{
+  tav::Writer writer;
+  {
+    tav::Group root = writer.group(TAV_ELM_CMN_SYSTEM);
+    {
+      tav::Group named = root.group(TAV_ELM_CMN_END_HDR_EYE_SIZE);
+      named.add(TAV_ELM_CMN_CPU_ONLINE, number);
+    }
+    root.add(TAV_ELM_CMN_CPU_ONLINE, uint32_t{2});
+  }
+  writer.finish();
+  const auto bytes = writer.bytes();
+  const auto* const first = reinterpret_cast<const uint8_t*>(bytes.data());
+  return {first, first + bytes.size()};
+}
+
 /// All nodes of a tree in stream order.
 inline void listNodes(const TreeNode& node, std::vector<const TreeNode*>& list)
 {

@@ -170,6 +170,15 @@ TEST_P(XmlOfValue, DamagedBytesStandWithTheirReason)
   EXPECT_EQ(xml.passed[0].path, "/system");
 }
 
+TEST(Xml, HasAnElementForAGroupWithTheIdOfAnEndElement)
+{
+  const Xml xml(test::streamWithGroupNamedAsAnEnd(1));
+  EXPECT_TRUE(isNested(xml.text));
+  const size_t group = xml.text.find("<endHdrEyeSize ");
+  EXPECT_LT(group, xml.text.find("<cpuOnline"));
+  EXPECT_LT(xml.text.find("<cpuOnline"), xml.text.find("</endHdrEyeSize>"));
+}
+
 TEST(Xml, IsNestedWhateverTheStreamHolds)
 {
   size_t damages = 0;
